@@ -1,0 +1,107 @@
+// The log lines and the failure checks: a small language of six macros.
+//
+//   VEMO_ATOKEN_LOG(message, location, ...)        an ordinary line, always
+//   VEMO_ATOKEN_DEBUG(message, location, ...)      an ordinary line in debug mode only
+//   VEMO_ATOKEN_FAIL(message, location, ...)       a failure line with a message of its own
+//   VEMO_ATOKEN_FAILED(szCondition, location)      the failure line of a condition that held
+//   VEMO_ATOKEN_CHECK_RETURN(condition, result)    if it holds: failure line, return result
+//   VEMO_ATOKEN_CHECK_GOTO(condition, label)       if it holds: failure line, jump to label
+//
+// message is a literal without the closing newline; location is VEMO_ATOKEN_HERE or, in code
+// expanded from the field list, VEMO_ATOKEN_HERE_IN_LIST. Conditions are evaluated once, in every
+// build, and are logged exactly as they are written; so their blanks are part of the log. Arguments
+// are evaluated only when the line is written.
+//
+// A failure line tells errno as the failed call left it: writing a line preserves errno, and so must
+// whatever stands among a line's arguments or between a failure and its line.
+
+#ifndef VEMO_ACCESS_TOKEN_LOG_H
+#define VEMO_ACCESS_TOKEN_LOG_H
+
+#include <syslog.h>
+
+#include <cerrno>
+
+#include "AccessTokenUtil.h"
+#include "internal/ErrnoKeeper.h"
+
+namespace VEMO_ACCESS_TOKEN {
+
+// printf and syslog themselves: the system headers of a hardened build would replace them by
+// __printf_chk and __syslog_chk, and callers who interpose the plain names would miss the lines.
+extern "C" int logPrintf(const char* szFormat, ...) __asm__("printf");
+extern "C" void logSyslog(int nPriority, const char* szFormat, ...) __asm__("syslog");
+
+// Never defined: lets the compiler compare a message with its arguments. (logPrintf cannot carry
+// the attribute, since ISO C++ knows no "%m".)
+int checkFormat(const char* szFormat, ...) __attribute__((format(printf, 1, 2)));
+
+// What stands in a log line for text that may be missing.
+inline const char* textOrNull(const char* szText)
+{
+    return szText ? szText : "(null)";
+}
+
+} // namespace VEMO_ACCESS_TOKEN
+
+#define VEMO_ATOKEN_HERE __FILE_NAME__, __LINE__
+#define VEMO_ATOKEN_HERE_IN_LIST __FILE__, __LINE__
+
+// Standard output never shows errno in front of the message, the system log does when there is one.
+#define VEMO_ATOKEN_WRITE_LINE(message, ...)                                                                 \
+    do {                                                                                                     \
+        const VEMO_ACCESS_TOKEN::ErrnoKeeper keeperOfLine;                                                   \
+        if (VEMO_ACCESS_TOKEN::logToStdoutGet()) {                                                           \
+            VEMO_ACCESS_TOKEN::logPrintf("%s:%d " message "\n", __VA_ARGS__);                                \
+        } else if (0 != errno) {                                                                             \
+            VEMO_ACCESS_TOKEN::logSyslog(LOG_ERR, "%s:%d (%m)" message "\n", __VA_ARGS__);                   \
+        } else {                                                                                             \
+            VEMO_ACCESS_TOKEN::logSyslog(LOG_ERR, "%s:%d " message "\n", __VA_ARGS__);                       \
+        }                                                                                                    \
+    } while (0)
+
+#define VEMO_ATOKEN_CHECK_FORMAT(message, ...)                                                               \
+    static_cast<void>(sizeof VEMO_ACCESS_TOKEN::checkFormat("%s:%d " message, __VA_ARGS__))
+
+#define VEMO_ATOKEN_LOG(message, ...)                                                                        \
+    do {                                                                                                     \
+        VEMO_ATOKEN_CHECK_FORMAT(message, __VA_ARGS__);                                                      \
+        VEMO_ATOKEN_WRITE_LINE(message, __VA_ARGS__);                                                        \
+    } while (0)
+
+#define VEMO_ATOKEN_DEBUG(message, ...)                                                                      \
+    do {                                                                                                     \
+        if (VEMO_ACCESS_TOKEN::debugInfoGet()) {                                                             \
+            VEMO_ATOKEN_LOG(message, __VA_ARGS__);                                                           \
+        }                                                                                                    \
+    } while (0)
+
+// Failure lines carry the location twice and end in two newlines.
+#define VEMO_ATOKEN_FAIL(message, ...)                                                                       \
+    do {                                                                                                     \
+        VEMO_ATOKEN_CHECK_FORMAT(message, __VA_ARGS__);                                                      \
+        VEMO_ATOKEN_WRITE_LINE("(%s:%d)(%m)" message "\n", VEMO_ATOKEN_HERE, __VA_ARGS__);                   \
+    } while (0)
+
+#define VEMO_ATOKEN_FAILED(szCondition, ...)                                                                 \
+    VEMO_ATOKEN_WRITE_LINE("(%s:%d)(%m)Failed [%s], err=%m\n", __VA_ARGS__, __VA_ARGS__, szCondition)
+
+// The two checks make their text themselves: passed on to another macro, the condition would have
+// its own macros (UID_ERR, SQLITE_OK) expanded first.
+#define VEMO_ATOKEN_CHECK_RETURN(condition, result)                                                          \
+    do {                                                                                                     \
+        if (condition) {                                                                                     \
+            VEMO_ATOKEN_FAILED(#condition, VEMO_ATOKEN_HERE);                                                \
+            return result;                                                                                   \
+        }                                                                                                    \
+    } while (0)
+
+#define VEMO_ATOKEN_CHECK_GOTO(condition, label)                                                             \
+    do {                                                                                                     \
+        if (condition) {                                                                                     \
+            VEMO_ATOKEN_FAILED(#condition, VEMO_ATOKEN_HERE);                                                \
+            goto label;                                                                                      \
+        }                                                                                                    \
+    } while (0)
+
+#endif

@@ -1,0 +1,82 @@
+#include "vemorandom.h"
+
+#include <sys/random.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdint>
+#include <limits>
+
+namespace VEMO {
+namespace RANDOM {
+
+namespace {
+
+int failInvalid()
+{
+    errno = EINVAL;
+    return -1;
+}
+
+} // namespace
+
+int VEMORandomBase::random(int nMin, int nMax)
+{
+    if (0 > nMin || nMin > nMax) {
+        return failInvalid();
+    }
+    // A draw from the incomplete last run of nChoices would favour its first members.
+    const uint64_t nChoices = static_cast<uint64_t>(nMax - nMin) + 1;
+    const uint64_t nLimit = std::numeric_limits<uint64_t>::max() / nChoices * nChoices;
+    uint64_t nDraw = 0;
+    do {
+        if (0 > fill(&nDraw, sizeof(nDraw))) {
+            return -1;
+        }
+    } while (nDraw >= nLimit);
+    return nMin + static_cast<int>(nDraw % nChoices);
+}
+
+int VEMORandomBase::getString(const std::string& strAlphabet, unsigned int cchLength, std::string& strOut)
+{
+    const size_t nChoices = strAlphabet.size();
+    if (0 == nChoices || 256 < nChoices) {
+        return failInvalid();
+    }
+    const size_t nLimit = 256 / nChoices * nChoices; // as in random(), one byte a draw
+    std::string strResult;
+    unsigned char rgDraw[256];
+    while (strResult.size() < cchLength) {
+        const size_t cbDraw = std::min(sizeof(rgDraw), cchLength - strResult.size());
+        if (0 > fill(rgDraw, cbDraw)) {
+            return -1;
+        }
+        for (size_t i = 0; i < cbDraw; ++i) {
+            if (rgDraw[i] < nLimit) {
+                strResult += strAlphabet[rgDraw[i] % nChoices];
+            }
+        }
+    }
+    strOut.swap(strResult);
+    return 0;
+}
+
+int VEMORandom::fill(void* pBuffer, size_t cbBuffer)
+{
+    unsigned char* pNext = static_cast<unsigned char*>(pBuffer);
+    while (0 < cbBuffer) {
+        const ssize_t cbGot = getrandom(pNext, cbBuffer, 0);
+        if (0 > cbGot) {
+            if (EINTR == errno) {
+                continue;
+            }
+            return -1;
+        }
+        pNext += cbGot;
+        cbBuffer -= static_cast<size_t>(cbGot);
+    }
+    return 0;
+}
+
+} // namespace RANDOM
+} // namespace VEMO

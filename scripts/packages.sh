@@ -1,0 +1,26 @@
+# Sourced by the other scripts: installs what is missing of the Debian packages named to it.
+
+install_packages()
+{
+    local package missing=() sudo=()
+    for package in "$@"; do
+        if [ "$(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null)" != installed ]; then
+            missing+=("$package")
+        fi
+    done
+    [ ${#missing[@]} -eq 0 ] && return
+    if [ "$(id -u)" -ne 0 ]; then
+        if ! command -v sudo >/dev/null; then
+            echo "$0: packages are missing and there is no sudo. As root, run:" >&2
+            echo "    apt-get install --no-install-recommends ${missing[*]}" >&2
+            exit 1
+        fi
+        sudo=(sudo)
+    fi
+    echo "Installing ${missing[*]}"
+    "${sudo[@]}" apt-get update -q=2
+    "${sudo[@]}" env DEBIAN_FRONTEND=noninteractive \
+        apt-get install -q=2 --no-install-recommends -o Dpkg::Use-Pty=0 "${missing[@]}" >/dev/null
+}
+
+BUILD_PACKAGES=(g++ cmake ninja-build libjsoncpp-dev libsqlite3-dev)

@@ -1,0 +1,190 @@
+#include "AccessTokenUtil.h"
+
+#include <ctime>
+
+#include "internal/AccessTokenLog.h"
+#include "internal/JsonText.h"
+#include "vemorandom.h"
+
+namespace {
+
+bool g_blLogToStdout = false;
+bool g_blDebugInfo = false;
+
+struct TypeCheck {
+    const char* szType;
+    bool (Json::Value::*pAccepts)() const;
+};
+
+// More types than the field list uses today, so that a field of any of them can be added to it.
+const TypeCheck g_rgTypeCheck[] = {
+    {"int", &Json::Value::isIntegral},
+    {"long long", &Json::Value::isIntegral},
+    {"uid_t", &Json::Value::isIntegral},
+    {"time_t", &Json::Value::isIntegral},
+    {"bool", &Json::Value::isBool},
+    {"string", &Json::Value::isString},
+    {"Json::arrayValue", &Json::Value::isArray},
+    {"Json::objectValue", &Json::Value::isObject},
+};
+
+const TypeCheck* findTypeCheck(const std::string& strType)
+{
+    for (const TypeCheck& check : g_rgTypeCheck) {
+        if (strType == check.szType) {
+            return &check;
+        }
+    }
+    return nullptr;
+}
+
+} // namespace
+
+namespace VEMO_ACCESS_TOKEN {
+
+bool logToStdout(bool blOn)
+{
+    if (blOn) {
+        g_blLogToStdout = true;
+    }
+    return g_blLogToStdout;
+}
+
+bool logToStdoutGet()
+{
+    return logToStdout(false);
+}
+
+bool debugInfo(bool blOn)
+{
+    if (blOn) {
+        g_blDebugInfo = true;
+    }
+    return g_blDebugInfo;
+}
+
+bool debugInfoGet()
+{
+    return debugInfo(false);
+}
+
+Json::Value& tokenType()
+{
+    static Json::Value jTokenType;
+
+    if (jTokenType.isNull()) {
+        Json::Value jTable(Json::objectValue);
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
+    jTable[#name].append(type);                                                                              \
+    jTable[#name].append(Json::Value(value));
+#include "internal/vemo-access-token-data-member"
+#undef VEMO_ATOKEN_DATA_MEMBER
+        jTokenType.swap(jTable);
+    }
+    return jTokenType;
+}
+
+int checkJsonType(Json::Value& jTokenParam)
+{
+    VEMO_ATOKEN_CHECK_RETURN(!jTokenParam.isObject(), -1);
+
+    const Json::Value& jTokenType = tokenType();
+    for (const std::string& strName : jTokenParam.getMemberNames()) {
+        if (!jTokenType.isMember(strName)) {
+            continue;
+        }
+        const TypeCheck* pCheck = findTypeCheck(jTokenType[strName][0U].asString());
+        if (!pCheck) {
+            VEMO_ATOKEN_FAIL("type not found!!, key=%s", VEMO_ATOKEN_HERE, strName.c_str());
+            return -1;
+        }
+        if (!(jTokenParam[strName].*pCheck->pAccepts)()) {
+            VEMO_ATOKEN_FAIL("type failed, jmList[i]=%s, jTokenParam=%s", VEMO_ATOKEN_HERE, strName.c_str(),
+                             toString(jTokenParam).c_str());
+            return -1;
+        }
+    }
+    return 0;
+}
+
+int fillDefaultValue(Json::Value& jToken, bool blCheck)
+{
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
+    if (!jToken.isMember(#name)) {                                                                           \
+        if (blCheck) {                                                                                       \
+            VEMO_ATOKEN_LOG("lost data member=%s", VEMO_ATOKEN_HERE_IN_LIST, #name);                         \
+            return -1;                                                                                       \
+        }                                                                                                    \
+        jToken[#name] = Json::Value(value);                                                                  \
+    }
+#include "internal/vemo-access-token-data-member"
+#undef VEMO_ATOKEN_DATA_MEMBER
+    return 0;
+}
+
+int tokenGenerate(std::string& strTid)
+{
+    const std::string strAlphabet = "0987654321abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ";
+    VEMO::RANDOM::VEMORandom source;
+
+    const int nLength = source.random(VEMO_ATOKEN_LENGTH_MIN, 255);
+    if (0 > nLength) {
+        return nLength;
+    }
+    return source.getString(strAlphabet, static_cast<unsigned int>(nLength), strTid);
+}
+
+int getTimeAfterNow(int offsetSecond, long& now)
+{
+    now = time(nullptr) + offsetSecond;
+    return 0;
+}
+
+int getTimeAfterNow(int offsetSecond, std::string& strTime)
+{
+    long now = 0;
+    VEMO_ATOKEN_CHECK_RETURN(0 > getTimeAfterNow(offsetSecond, now), -1);
+
+    struct tm tmNow = {};
+    char szTime[64] = "";
+    gmtime_r(&now, &tmNow);
+    strftime(szTime, sizeof(szTime), "%a, %d %b %Y %T GMT", &tmNow);
+    strTime = szTime;
+    return 0;
+}
+
+int checkPermission(Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod)
+{
+    VEMO_ATOKEN_CHECK_GOTO(jToken.type() != Json::objectValue, Error);
+    VEMO_ATOKEN_CHECK_GOTO(!szWebapiName || !szWebapiName[0], Error);
+    VEMO_ATOKEN_CHECK_GOTO(!jToken.isMember("webapi_allow"), Error);
+    VEMO_ATOKEN_CHECK_GOTO(jToken["webapi_allow"].type() != Json::objectValue, Error);
+    if (!jToken["webapi_allow"].isMember(szWebapiName)) {
+        VEMO_ATOKEN_DEBUG("webapi=%s not in allow list, jToken=%s", VEMO_ATOKEN_HERE, szWebapiName,
+                          toString(jToken).c_str());
+        goto Error;
+    }
+
+    // An API that is listed allows every method to a caller who names none, whatever its entry is.
+    if (!szWebapiMethod || !szWebapiMethod[0]) {
+        return 1;
+    }
+
+    VEMO_ATOKEN_CHECK_GOTO(jToken["webapi_allow"][szWebapiName].type() != Json::objectValue, Error);
+    VEMO_ATOKEN_CHECK_GOTO(!jToken["webapi_allow"][szWebapiName].isMember("method"), Error);
+    VEMO_ATOKEN_CHECK_GOTO(jToken["webapi_allow"][szWebapiName]["method"].type() != Json::arrayValue, Error);
+    for (const Json::Value& jMethod : jToken["webapi_allow"][szWebapiName]["method"]) {
+        if (jMethod.asString() == szWebapiMethod) {
+            return 1;
+        }
+    }
+    VEMO_ATOKEN_DEBUG("webapi=%s , method=%s, not in allow list, jToken=%s", VEMO_ATOKEN_HERE, szWebapiName,
+                      szWebapiMethod, toString(jToken).c_str());
+    return 0;
+
+Error:
+    VEMO_ATOKEN_DEBUG("jToken=%s", VEMO_ATOKEN_HERE, toString(jToken).c_str());
+    return -1;
+}
+
+} // namespace VEMO_ACCESS_TOKEN

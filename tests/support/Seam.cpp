@@ -1,0 +1,343 @@
+#include "Seam.h"
+
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <link.h>
+#include <sys/random.h>
+#include <sys/time.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+#include <cstring>
+#include <new>
+
+namespace {
+
+struct Range {
+    const char* szLibrary;
+    uintptr_t nBegin = 0;
+    uintptr_t nEnd = 0;
+
+    bool holds(const void* pAddress)
+    {
+        if (0 == nEnd) {
+            dl_iterate_phdr(&Range::find, this);
+        }
+        const uintptr_t nAddress = reinterpret_cast<uintptr_t>(pAddress);
+        return nBegin <= nAddress && nAddress < nEnd;
+    }
+
+    static int find(struct dl_phdr_info* pInfo, size_t, void* pArgument)
+    {
+        Range* pRange = static_cast<Range*>(pArgument);
+        if (!strstr(pInfo->dlpi_name, pRange->szLibrary)) {
+            return 0;
+        }
+        pRange->nBegin = pInfo->dlpi_addr;
+        for (int i = 0; i < pInfo->dlpi_phnum; ++i) {
+            const ElfW(Phdr)& header = pInfo->dlpi_phdr[i];
+            if (PT_LOAD == header.p_type) {
+                pRange->nEnd =
+                    std::max<uintptr_t>(pRange->nEnd, pInfo->dlpi_addr + header.p_vaddr + header.p_memsz);
+            }
+        }
+        return 1;
+    }
+};
+
+bool isLibrary(const void* pCaller)
+{
+    static Range range{"libvemoaccesstoken.so"};
+    return range.holds(pCaller);
+}
+
+bool isSqlite(const void* pCaller)
+{
+    static Range range{"libsqlite3.so"};
+    return range.holds(pCaller);
+}
+
+// Records a call; true, with errno set, when this one is to fail.
+bool fails(const std::string& strName, const std::string& strArguments = "")
+{
+    const int nErrno = errno;
+    seam().calls.push_back(strArguments.empty() ? strName : strName + " " + strArguments);
+    const int nCall = ++seam().counts[strName];
+    const auto failure = seam().failures.find(strName);
+    const bool blFails =
+        seam().failures.end() != failure && failure->second.nFirst <= nCall && nCall <= failure->second.nLast;
+    errno = blFails ? failure->second.nErrno : nErrno;
+    return blFails;
+}
+
+void record(const std::string& strName, const std::string& strArguments = "")
+{
+    fails(strName, strArguments);
+}
+
+// "util.cpp:123" becomes "util.cpp:#".
+std::string withoutLineNumbers(std::string strText)
+{
+    const std::string strSuffix = ".cpp:";
+    size_t nAt = strText.find(strSuffix);
+    while (std::string::npos != nAt) {
+        nAt += strSuffix.size();
+        strText.replace(nAt, strText.find_first_not_of("0123456789", nAt) - nAt, "#");
+        nAt = strText.find(strSuffix, nAt);
+    }
+    return strText;
+}
+
+void logged(Destination destination, const char* szFormat, va_list args)
+{
+    const int nErrno = errno;
+    char* szText = nullptr;
+    if (0 > vasprintf(&szText, szFormat, args)) {
+        throw std::bad_alloc();
+    }
+    seam().lines.push_back({destination, withoutLineNumbers(szText)});
+    free(szText);
+    errno = nErrno;
+}
+
+std::string octal(mode_t mode)
+{
+    char szMode[16];
+    snprintf(szMode, sizeof(szMode), "%04o", mode);
+    return szMode;
+}
+
+template <typename Function>
+Function* next(const char* szName, Function* /* of this type */)
+{
+    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szName));
+}
+
+} // namespace
+
+// The next definition of a function, and whether the caller of the one we are in is the library.
+#define NEXT(name) next(#name, &name)
+#define CALLED_BY_LIBRARY isLibrary(__builtin_return_address(0))
+
+Seam& seam()
+{
+    static Seam theSeam;
+    return theSeam;
+}
+
+std::vector<std::string> Seam::callsOf(const std::vector<std::string>& names) const
+{
+    std::vector<std::string> found;
+    for (const std::string& strCall : calls) {
+        const std::string strName = strCall.substr(0, strCall.find(' '));
+        if (names.end() != std::find(names.begin(), names.end(), strName)) {
+            found.push_back(strCall);
+        }
+    }
+    return found;
+}
+
+void Seam::fail(const std::string& strName, int nErrno, int nFirst, int nLast)
+{
+    failures[strName] = {nFirst, nLast, nErrno};
+}
+
+extern "C" {
+
+uid_t geteuid() noexcept
+{
+    if (CALLED_BY_LIBRARY && fails("geteuid")) {
+        return static_cast<uid_t>(-1);
+    }
+    return NEXT(geteuid)();
+}
+
+int seteuid(uid_t uid) noexcept
+{
+    if (CALLED_BY_LIBRARY && fails("seteuid", std::to_string(uid))) {
+        return -1;
+    }
+    return NEXT(seteuid)(uid);
+}
+
+int access(const char* szPath, int nMode) noexcept
+{
+    if (CALLED_BY_LIBRARY && fails("access", szPath)) {
+        return -1;
+    }
+    return NEXT(access)(szPath, nMode);
+}
+
+int chmod(const char* szPath, mode_t mode) noexcept
+{
+    if (CALLED_BY_LIBRARY && fails("chmod", std::string(szPath) + " " + octal(mode))) {
+        return -1;
+    }
+    return NEXT(chmod)(szPath, mode);
+}
+
+int open(const char* szPath, int nFlags, ...)
+{
+    va_list args;
+    va_start(args, nFlags);
+    const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
+    va_end(args);
+    if (CALLED_BY_LIBRARY && fails("open", szPath)) {
+        return -1;
+    }
+    return NEXT(open)(szPath, nFlags, mode);
+}
+
+int usleep(useconds_t nMicroseconds)
+{
+    if (!CALLED_BY_LIBRARY) {
+        return NEXT(usleep)(nMicroseconds);
+    }
+    record("usleep", std::to_string(nMicroseconds));
+    return seam().sleep ? seam().sleep(nMicroseconds) : 0;
+}
+
+time_t time(time_t* pTime) noexcept
+{
+    if (!CALLED_BY_LIBRARY) {
+        return NEXT(time)(pTime);
+    }
+    record("time");
+    const time_t now = seam().clock ? *seam().clock : NEXT(time)(nullptr);
+    if (pTime) {
+        *pTime = now;
+    }
+    return now;
+}
+
+int gettimeofday(struct timeval* pTime, void* pZone) noexcept
+{
+    if (isSqlite(__builtin_return_address(0)) && seam().clock) {
+        pTime->tv_sec = *seam().clock;
+        pTime->tv_usec = 0;
+        return 0;
+    }
+    return NEXT(gettimeofday)(pTime, pZone);
+}
+
+int printf(const char* szFormat, ...)
+{
+    const bool blLibrary = CALLED_BY_LIBRARY;
+    int nResult = 0;
+    va_list args;
+    va_start(args, szFormat);
+    if (blLibrary) {
+        logged(Destination::Stdout, szFormat, args);
+        record("printf");
+    } else {
+        nResult = vprintf(szFormat, args);
+    }
+    va_end(args);
+    return nResult;
+}
+
+void syslog(int nPriority, const char* szFormat, ...)
+{
+    const bool blLibrary = CALLED_BY_LIBRARY;
+    va_list args;
+    va_start(args, szFormat);
+    if (blLibrary) {
+        logged(Destination::Syslog, szFormat, args);
+        record("syslog", std::to_string(nPriority));
+        errno = EDESTADDRREQ; // as a system without a log daemon leaves some error behind
+    } else {
+        vsyslog(nPriority, szFormat, args);
+    }
+    va_end(args);
+}
+
+ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned int nFlags)
+{
+    if (CALLED_BY_LIBRARY && fails("getrandom")) {
+        return -1;
+    }
+    return NEXT(getrandom)(pBuffer, cbBuffer, nFlags);
+}
+
+int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer, struct passwd** ppEntry)
+{
+    if (!CALLED_BY_LIBRARY) {
+        return NEXT(getpwuid_r)(uid, pEntry, szBuffer, cbBuffer, ppEntry);
+    }
+    if (fails("getpwuid_r", std::to_string(uid))) {
+        *ppEntry = nullptr;
+        return errno;
+    }
+    return seam().getUser ? seam().getUser(uid, pEntry, szBuffer, cbBuffer, ppEntry)
+                          : NEXT(getpwuid_r)(uid, pEntry, szBuffer, cbBuffer, ppEntry);
+}
+
+int sqlite3_open(const char* szPath, sqlite3** ppDb)
+{
+    if (CALLED_BY_LIBRARY) {
+        record("sqlite3_open", szPath);
+        if (seam().sqliteOpen) {
+            return seam().sqliteOpen(szPath, ppDb);
+        }
+    }
+    return NEXT(sqlite3_open)(szPath, ppDb);
+}
+
+int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(void*, int, char**, char**),
+                 void* pArgument, char** pszError)
+{
+    if (CALLED_BY_LIBRARY) {
+        record("sqlite3_exec", szSql);
+        if (seam().sqliteExec) {
+            return seam().sqliteExec(pDb, szSql, callback, pArgument, pszError);
+        }
+    }
+    return NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
+}
+
+int sqlite3_changes(sqlite3* pDb)
+{
+    if (CALLED_BY_LIBRARY) {
+        record("sqlite3_changes");
+    }
+    return NEXT(sqlite3_changes)(pDb);
+}
+
+int sqlite3_close(sqlite3* pDb)
+{
+    if (CALLED_BY_LIBRARY) {
+        record("sqlite3_close");
+        if (seam().sqliteClose) {
+            return seam().sqliteClose(pDb);
+        }
+    }
+    return NEXT(sqlite3_close)(pDb);
+}
+
+char* sqlite3_mprintf(const char* szFormat, ...)
+{
+    const bool blFails = CALLED_BY_LIBRARY && fails("sqlite3_mprintf", szFormat);
+    va_list args;
+    va_start(args, szFormat);
+    char* szText = blFails ? nullptr : sqlite3_vmprintf(szFormat, args);
+    va_end(args);
+    return szText;
+}
+
+} // extern "C"
+
+void* operator new(std::size_t cbSize, const std::nothrow_t&) noexcept
+{
+    if (CALLED_BY_LIBRARY && fails("operator new")) {
+        return nullptr;
+    }
+    try {
+        return ::operator new(cbSize);
+    } catch (const std::bad_alloc&) {
+        return nullptr;
+    }
+}

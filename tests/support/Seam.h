@@ -1,0 +1,69 @@
+// The seam between the library and the system. The test programs define the C functions that the
+// library calls (Seam.cpp), so the shared object that ships calls them here instead. The seam
+// records each call, writes the log lines down, fails what a test wants failed, and otherwise goes
+// on to the real function; the fixed database path is led elsewhere by examples/redirect.cpp.
+//
+// Only calls that come from the library are treated so; those of SQLite and of the test itself go
+// straight to the real function (but for the clock, which SQLite shares).
+
+#ifndef TESTS_SEAM_H
+#define TESTS_SEAM_H
+
+#include <pwd.h>
+#include <sqlite3.h>
+#include <sys/types.h>
+
+#include <functional>
+#include <map>
+#include <optional>
+#include <string>
+#include <vector>
+
+enum class Destination { Stdout, Syslog };
+
+// One log line, expanded. Line numbers of source files are no part of the design and read '#':
+// "util.cpp:# ..."; those of the field list stay.
+struct LogLine {
+    Destination destination;
+    std::string strText;
+};
+
+struct Seam {
+    // The calls in order: "geteuid", "seteuid 0", "access PATH", "open PATH", "chmod PATH 0700",
+    // "sqlite3_open PATH", "sqlite3_exec SQL", "sqlite3_changes", "sqlite3_close", "usleep 10000",
+    // "time", "sqlite3_mprintf FORMAT", "getrandom", "getpwuid_r UID", "syslog PRIORITY", "printf".
+    std::vector<std::string> calls;
+
+    // The calls whose first word is one of the names.
+    std::vector<std::string> callsOf(const std::vector<std::string>& names) const;
+
+    // What the library logged.
+    std::vector<LogLine> lines;
+
+    // Functions that fail: name, then the numbers (from 1) of the calls that do, and the errno they
+    // leave. Functions: geteuid (answers (uid_t)-1), seteuid, access, open, chmod, sqlite3_mprintf
+    // (no memory), getrandom, getpwuid_r (returns the errno), "operator new" (the non-throwing one).
+    struct Failure {
+        int nFirst;
+        int nLast;
+        int nErrno;
+    };
+    std::map<std::string, Failure> failures;
+    void fail(const std::string& strName, int nErrno, int nFirst = 1, int nLast = 1);
+
+    // Stand-ins, when set, for whole functions. They may call the real ones.
+    std::function<int(const char*, sqlite3**)> sqliteOpen;
+    std::function<int(sqlite3*, const char*, int (*)(void*, int, char**, char**), void*, char**)> sqliteExec;
+    std::function<int(sqlite3*)> sqliteClose;
+    std::function<int(useconds_t)> sleep; // nobody really sleeps; this is told instead
+    std::function<int(uid_t, struct passwd*, char*, size_t, struct passwd**)> getUser;
+
+    // The time that the library and SQLite see, when set; seconds since the epoch.
+    std::optional<time_t> clock;
+
+    std::map<std::string, int> counts; // calls so far, by name
+};
+
+Seam& seam();
+
+#endif
