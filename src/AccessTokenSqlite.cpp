@@ -266,6 +266,7 @@ int AccessTokenDbApi::createTable()
     return 0;
 }
 
+// NOLINTNEXTLINE(performance-unnecessary-value-param): callers are compiled against it
 int AccessTokenDbApi::runSqlEx(std::string strSql, int (*callback)(void*, int, char**, char**), void* arg)
 {
     SqliteText szErr;

@@ -1,0 +1,136 @@
+// What only root can show: the real path, owner and mode, and the real effective uid.
+
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <filesystem>
+
+#include "AccessTokenApi.h"
+#include "AccessTokenUtil.h"
+#include "StoreTest.h"
+#include "internal/AccessTokenDbApi.h"
+#include "vemo-access-token.h"
+
+namespace {
+
+const char* const TREE = "/usr/vemo";
+const uid_t UID_NOBODY = 65534;
+
+class System : public SeamTest {
+protected:
+    void SetUp() override
+    {
+        SeamTest::SetUp();
+        unsetenv("VEMO_REDIRECT_DIR");
+        if (0 != getuid() || 0 != geteuid()) {
+            GTEST_SKIP() << "needs root";
+        }
+        if (std::filesystem::exists(TREE)) {
+            GTEST_SKIP() << TREE << " exists: this machine's own tokens are left alone";
+        }
+        const std::filesystem::path directory = std::filesystem::path(VEMO_ATOKEN_DB_PATH).parent_path();
+        std::filesystem::create_directories(directory);
+        m_blMade = true;
+        ASSERT_EQ(0, chmod(directory.c_str(), 0700));
+    }
+
+    void TearDown() override
+    {
+        if (m_blMade) {
+            EXPECT_EQ(0, seteuid(0));
+            std::filesystem::remove_all(TREE);
+        }
+    }
+
+    int create(std::string& strTid)
+    {
+        unsigned int uid = 0;
+        std::string strFunction = "VPN";
+        Json::Value jOption = json(R"({"webapi_allow": {"Api": {}}})");
+        return VemoAccessTokenCreate(uid, strFunction, jOption, strTid);
+    }
+
+private:
+    bool m_blMade = false;
+};
+
+TEST_F(System, KeepsTokensInAPrivateFileOfRoot)
+{
+    std::string strTid;
+    char szUser[16] = "";
+
+    EXPECT_EQ(0, create(strTid));
+    EXPECT_EQ(0, VemoAccessTokenGrant(strTid, "Api", nullptr, szUser, sizeof(szUser)));
+
+    EXPECT_STREQ("root", szUser);
+    struct stat status;
+    ASSERT_EQ(0, stat(VEMO_ATOKEN_DB_PATH, &status));
+    EXPECT_EQ(S_IFREG | 0700u, status.st_mode);
+    EXPECT_EQ(0u, status.st_uid);
+    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+}
+
+TEST_F(System, OpensAsRootAndPutsTheEffectiveUidBack)
+{
+    ASSERT_EQ(0, seteuid(UID_NOBODY));
+    AccessTokenDbApi db;
+
+    EXPECT_EQ(0, db.initDb());
+
+    EXPECT_EQ(UID_NOBODY, geteuid());
+    ASSERT_EQ(0, seteuid(0));
+    struct stat status;
+    ASSERT_EQ(0, stat(VEMO_ATOKEN_DB_PATH, &status));
+    EXPECT_EQ(S_IFREG | 0700u, status.st_mode);
+    EXPECT_EQ(0u, status.st_uid);
+}
+
+// Why a process should stay at effective uid 0: SQLite opens the journal for each change anew.
+TEST_F(System, CannotWriteAtAnotherEffectiveUid)
+{
+    std::string strTid;
+    ASSERT_EQ(0, create(strTid));
+    ASSERT_EQ(0, seteuid(UID_NOBODY));
+    AccessTokenDbApi db;
+    Json::Value jTokens;
+    Json::Value jAll(Json::objectValue);
+
+    EXPECT_EQ(0, db.tokenGet(jAll, jTokens));
+    EXPECT_EQ(1u, jTokens.size());
+    EXPECT_EQ(-1, db.tokenDelete(jAll, true));
+
+    EXPECT_EQ("attempt to write a readonly database", db.m_strErr);
+    EXPECT_EQ(UID_NOBODY, geteuid());
+}
+
+TEST_F(System, FailedOpeningLeavesTheEffectiveUidAtRoot)
+{
+    ASSERT_EQ(0, mkdir(VEMO_ATOKEN_DB_PATH, 0700));
+    ASSERT_EQ(0, seteuid(UID_NOBODY));
+    AccessTokenDbApi db;
+
+    EXPECT_EQ(-1, db.initDb());
+
+    EXPECT_EQ(0u, geteuid());
+}
+
+TEST_F(System, NeedsTheRightToBecomeRoot)
+{
+    const pid_t nChild = fork();
+    if (0 == nChild) {
+        std::string strTid;
+        const bool blRefused =
+            0 == setresuid(UID_NOBODY, UID_NOBODY, UID_NOBODY) && -1 == create(strTid) &&
+            failed("AccessTokenSqlite.cpp", "0 > seteuid(0)", EPERM) == takeLines().front();
+        _exit(blRefused ? 0 : 1);
+    }
+    int nStatus = -1;
+    ASSERT_EQ(nChild, waitpid(nChild, &nStatus, 0));
+
+    EXPECT_EQ(0, nStatus);
+    EXPECT_FALSE(std::filesystem::exists(VEMO_ATOKEN_DB_PATH));
+}
+
+} // namespace

@@ -1,0 +1,47 @@
+#!/bin/bash
+# Runs scripts/demo and checks that it tells the whole story and leaves nothing behind.
+# usage: demo.sh SOURCE-DIRECTORY [--system]
+# Exit status 77: skipped, for the reason printed.
+set -euo pipefail
+source=$1
+mode=${2-}
+dir=$(mktemp -d)
+trap 'rm -rf "$dir"' EXIT
+
+if [ -n "$mode" ]; then
+    if [ "$(id -u)" -ne 0 ]; then
+        echo "skipped: needs root"
+        exit 77
+    fi
+    if [ -e /usr/vemo ]; then
+        echo "skipped: /usr/vemo exists: this machine's own tokens are left alone"
+        exit 77
+    fi
+fi
+
+mkdir "$dir/tmp"
+(cd "$source" && find . -path ./build -prune -o -path ./.git -prune -o -print | LC_ALL=C sort) >"$dir/before"
+TMPDIR=$dir/tmp "$source/scripts/demo" $mode | tee "$dir/transcript"
+(cd "$source" && find . -path ./build -prune -o -path ./.git -prune -o -print | LC_ALL=C sort) >"$dir/after"
+
+diff "$dir/before" "$dir/after"
+rmdir "$dir/tmp" # fails unless it is empty
+if [ -n "$mode" ] && [ -e /usr/vemo ]; then
+    echo "/usr/vemo is left behind"
+    exit 1
+fi
+grep -q 'On the real path, as root' "$dir/transcript" || [ -z "$mode" ]
+for line in \
+    'VemoAccessTokenCreate(uid, strFunction, jOption, strTid)' \
+    'VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid)' \
+    'VemoAccessTokenGenerate(strTid)' \
+    'VemoAccessTokenGrantEx(strTid, "Demo.File", "delete", jToken)' \
+    'VemoAccessTokenGrantEx(strTid, "Demo.User", "get", jToken)' \
+    'VemoAccessTokenGrant(strTid, "Demo.File", "get", szUser, sizeof(szUser))' \
+    'szUser = root' \
+    'VemoAccessTokenDeleteByTid(strUnknown)' \
+    'VemoAccessTokenDeleteByBindSid("demo-login-1")' \
+    'VemoAccessTokenDeleteByFunction(strFunction)' \
+    'The table: no tokens'; do
+    grep -qF "$line" "$dir/transcript"
+done

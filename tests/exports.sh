@@ -1,0 +1,27 @@
+#!/bin/bash
+# What the shared object shows to the outside: its name, what it exports, and what it calls that
+# callers may interpose.
+# usage: exports.sh LIBRARY EXPORTED-SYMBOLS.TXT
+set -euo pipefail
+library=$1
+list=$2
+status=0
+
+soname=$(objdump -p "$library" | awk '$1 == "SONAME" { print $2 }')
+if [ "$soname" != libvemoaccesstoken.so.6 ]; then
+    echo "SONAME is $soname"
+    status=1
+fi
+
+echo "Exported symbols (< the list, > the library):"
+nm -D --defined-only "$library" | awk '{ print $2, $3 }' | LC_ALL=C sort | diff "$list" - || status=1
+
+undefined=$(nm -D --undefined-only "$library" | awk '{ sub(/@.*/, "", $2); print $2 }')
+for name in sqlite3_open sqlite3_exec sqlite3_changes sqlite3_close geteuid seteuid access chmod usleep \
+    time printf syslog; do
+    if ! grep -qx $name <<<"$undefined"; then
+        echo "$name is not called dynamically"
+        status=1
+    fi
+done
+exit $status

@@ -1,0 +1,39 @@
+#!/bin/bash
+# Installs the library below a prefix of its own, and builds and runs README's example with it.
+# usage: install.sh BUILD-DIRECTORY JSONCPP-INCLUDE-DIRECTORY README COMPILER...
+set -euo pipefail
+build=$1
+json=$2
+readme=$3
+shift 3
+dir=$(mktemp -d)
+trap 'rm -rf "$dir"' EXIT
+
+cmake --install "$build" --prefix "$dir/usr" >"$dir/log"
+library=$(find "$dir/usr" -name libvemoaccesstoken.so.6.0.0)
+libdir=$(dirname "$library")
+include=$dir/usr/include/vemo-access-token
+[ "$(readlink "$libdir/libvemoaccesstoken.so.6")" = libvemoaccesstoken.so.6.0.0 ]
+[ "$(readlink "$libdir/libvemoaccesstoken.so")" = libvemoaccesstoken.so.6 ]
+
+echo "The installed headers:"
+(cd "$include" && find . -type f | LC_ALL=C sort) | tee "$dir/headers"
+diff "$dir/headers" - <<END
+./AccessTokenApi.h
+./AccessTokenDefine.h
+./AccessTokenUtil.h
+./internal/AccessTokenDbApi.h
+./vemo-access-token.h
+END
+compile=("$@" -std=c++17 -Wall -Wextra -Wpedantic -Werror "-I$include" -isystem "$json")
+while read -r header; do
+    echo "#include \"$header\"" >"$dir/alone.cpp"
+    "${compile[@]}" -fsyntax-only "$dir/alone.cpp"
+done <"$dir/headers"
+
+echo "The example of README:"
+sed -n '/^```cpp$/,/^```$/p' "$readme" | grep -v '^```' >"$dir/example.cpp"
+"${compile[@]}" "$dir/example.cpp" -o "$dir/example" "-L$libdir" "-Wl,-rpath,$libdir" -lvemoaccesstoken -ljsoncpp
+mkdir "$dir/database"
+LD_PRELOAD=$build/examples/libredirect.so VEMO_REDIRECT_DIR=$dir/database "$dir/example" | tee "$dir/output"
+grep -xE '    (granted on behalf of root|1 token deleted)' "$readme" | sed 's/^ *//' | diff "$dir/output" -

@@ -1,0 +1,26 @@
+#!/bin/bash
+# Builds against a prefix with the platform's libraries (here the stand-ins, made into such) and
+# checks that the library then takes the three from there.
+# usage: platform-option.sh SOURCE-DIRECTORY COMPILER
+set -euo pipefail
+source=$1
+compiler=$2
+dir=$(mktemp -d)
+trap 'rm -rf "$dir"' EXIT
+
+mkdir "$dir/include" "$dir/lib"
+for name in plibc vemouser vemorandom; do
+    cp "$source/platform/$name.h" "$dir/include"
+    "$compiler" -std=c++17 -shared -fPIC "$source/platform/$name.cpp" -o "$dir/lib/lib$name.so"
+done
+cmake -S "$source" -B "$dir/build" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" -DBUILD_TESTING=OFF \
+    -DVEMO_ATOKEN_PLATFORM="$dir" >/dev/null
+cmake --build "$dir/build" -- --quiet
+
+undefined=$(nm -D --undefined-only -C "$dir/build/src/libvemoaccesstoken.so")
+for name in PLIBCFileTouch VEMOUserGetByUID VEMOUserFree 'VEMO::RANDOM::VEMORandomBase::random'; do
+    grep "U $name(" <<<"$undefined"
+done
+mkdir "$dir/database"
+LD_PRELOAD=$dir/build/examples/libredirect.so VEMO_REDIRECT_DIR=$dir/database "$dir/build/examples/token-life" |
+    tail -n 2
