@@ -69,7 +69,7 @@ void showTable()
             blEmpty = false;
         }
         printf("\n     %-12s%-14s%-13s%-5s%-7s%-12s%s", shortened(jToken["tid"].asString()).c_str(),
-               jToken["function"].asCString(), jToken["bind_sid"].asCString(),
+               jToken["function"].asString().c_str(), jToken["bind_sid"].asString().c_str(),
                jToken["uid"].asString().c_str(), jToken["count"].asString().c_str(), lifetime(jToken).c_str(),
                text(jToken["webapi_allow"]).c_str());
     }
@@ -136,7 +136,7 @@ void grantToTheLastUse(std::string& strTid)
 
     step("The second grant spends the last use, and the token is deleted. A third one is refused.");
     CALL(0, VemoAccessTokenGrantEx(strTid, "Demo.File", "list", jToken));
-    printf("   jToken[\"function\"] = %s\n", jToken["function"].asCString());
+    printf("   jToken[\"function\"] = %s\n", jToken["function"].asString().c_str());
     CALL(-1, VemoAccessTokenGrantEx(strTid, "Demo.File", "list", jToken));
     showTable();
 }

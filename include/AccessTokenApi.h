@@ -37,7 +37,8 @@ class AccessTokenDbApi;
 class VEMO_ATOKEN_EXPORT AccessTokenApi {
 public:
     // Opens the database, and creates file and table if the file is missing. Reports nothing: what
-    // went wrong shows in the operations, each of which tries to open again.
+    // went wrong shows in the operations. Each tries to open again, unless SQLite itself refused the
+    // file; then all fail until the object is destroyed.
     AccessTokenApi();
 
     // Closes the database.
@@ -112,7 +113,8 @@ public:
     // spends none.
     // Returns 0 and sets jTokenOut to the token's record with the uses that are left (after the last
     // use it still shows the count before it), or -1, for an unknown token, a call that is not
-    // allowed and a failure alike, with jTokenOut as it was.
+    // allowed and a failure alike, with jTokenOut as it was. An unknown token and a method that is
+    // not listed are logged in debug mode only.
     int tokenGrant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
                    Json::Value& jTokenOut);
 

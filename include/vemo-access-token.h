@@ -4,9 +4,10 @@
 // otherwise), does its work and closes the database again; nothing is kept between calls. The
 // process must be able to set its effective uid to 0 and should have it (README says why).
 //
-// Results: 0 or more is success, -1 a failure or refusal that has written its log lines (see
-// AccessTokenUtil.h). Arguments not named as results are only read. The strings and JSON values are
-// those of C++, so a caller is built with the same libstdc++ and jsoncpp.
+// Results: 0 or more is success, -1 a failure or refusal. Failures have written their log lines (see
+// AccessTokenUtil.h); an unknown token and a method that is not listed are logged in debug mode only.
+// Arguments not named as results are only read. The strings and JSON values are those of C++, so a
+// caller is built with the same libstdc++ and jsoncpp.
 //
 // Exceptions, -1 after waiting for a lock, threads and processes: as AccessTokenApi.h says. Calls may
 // overlap in any threads and processes; overlapping grants of one token can spend one use for two.

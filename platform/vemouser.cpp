@@ -14,7 +14,8 @@ struct UserDeleter {
     void operator()(VEMOUser* pUser) const { VEMOUserFree(pUser); }
 };
 
-// The errors that getpwuid_r documents for "no such uid", besides success without an entry.
+// Some user databases answer so for "no such uid", instead of success without an entry. The other
+// answers that the manual allows for it (EBADF, EPERM) are more often real failures.
 bool isNotFound(int nError)
 {
     return ENOENT == nError || ESRCH == nError;

@@ -1,10 +1,12 @@
+# shellcheck shell=bash
 # Sourced by the other scripts: installs what is missing of the Debian packages named to it.
 
 install_packages()
 {
     local package missing=() sudo=()
     for package in "$@"; do
-        if [ "$(dpkg-query -W -f '${db:Status-Status}' "$package" 2>/dev/null)" != installed ]; then
+        # A package can be installed for several architectures: one line for each.
+        if ! dpkg-query -W -f '${db:Status-Status}\n' "$package" 2>/dev/null | grep -qx installed; then
             missing+=("$package")
         fi
     done
@@ -23,4 +25,5 @@ install_packages()
         apt-get install -q=2 --no-install-recommends -o Dpkg::Use-Pty=0 "${missing[@]}" >/dev/null
 }
 
+# shellcheck disable=SC2034 # for those who source this
 BUILD_PACKAGES=(g++ cmake ninja-build libjsoncpp-dev libsqlite3-dev)

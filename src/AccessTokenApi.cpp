@@ -10,6 +10,7 @@
 
 using VEMO_ACCESS_TOKEN::checkJsonType;
 using VEMO_ACCESS_TOKEN::checkPermission;
+using VEMO_ACCESS_TOKEN::ErrnoKeeper;
 using VEMO_ACCESS_TOKEN::fillDefaultValue;
 using VEMO_ACCESS_TOKEN::textOrNull;
 using VEMO_ACCESS_TOKEN::tokenGenerate;
@@ -40,12 +41,14 @@ AccessTokenApi::AccessTokenApi() : m_pDb(new (std::nothrow) AccessTokenDbApi())
         VEMO_ATOKEN_LOG("new AccessTokenDbApi failed", VEMO_ATOKEN_HERE);
         return;
     }
-    // A failed opening is tried again, and reported, by the first operation.
+    // A failure is reported by the first operation, which tries again if there is no handle yet.
     m_pDb->initDb();
 }
 
 AccessTokenApi::~AccessTokenApi()
 {
+    // A caller may have a failure of its last operation still to report.
+    const ErrnoKeeper keeper;
     if (m_pDb) {
         m_pDb->freeDb();
     }

@@ -56,6 +56,12 @@ private:
     uid_t m_uid;
 };
 
+void waitForLock()
+{
+    const ErrnoKeeper keeper;
+    usleep(LOCK_WAIT_USEC);
+}
+
 // How a field's value is written in SQL; its type name decides.
 enum class Rendering { Text, Json, Number };
 
@@ -108,8 +114,9 @@ private:
     sqlite3_int64 m_nNumber;
 };
 
-// Appends a filter's value, escaped and quoted as its field demands. The two conditions are the
-// caller's, for the log line of a failed allocation.
+// Appends a filter's value, escaped and quoted as its field demands. Number fields take the value
+// without quotes whatever its type, so a string in their place becomes part of the statement. The two
+// conditions are the caller's, for the log line of a failed allocation.
 int appendValue(Rendering rendering, const Json::Value& jValue, const char* szAsStringFailed,
                 const char* szToStringFailed, std::string& strSqlOut)
 {
@@ -289,7 +296,7 @@ int AccessTokenDbApi::runSqlEx(std::string strSql, int (*callback)(void*, int, c
         }
         VEMO_ATOKEN_DEBUG("i=%d,run sql failed, error=%s, sql=%s", VEMO_ATOKEN_HERE, i, szErr.get(),
                           strSql.c_str());
-        usleep(LOCK_WAIT_USEC);
+        waitForLock();
         if (LOCK_TRIES == ++i) {
             VEMO_ATOKEN_LOG("i=%d,run sql failed, error=%s, sql=%s", VEMO_ATOKEN_HERE, i, szErr.get(),
                             strSql.c_str());
@@ -474,17 +481,23 @@ int AccessTokenDbApi::SqlMakeByMatchField(std::string& strField, Json::Value& jP
 {
     const Json::Value& jTokenType = tokenType();
 
+    std::string strCondition = strField + "=";
+
     VEMO_ATOKEN_CHECK_RETURN(!jTokenType.isMember(strField), -1);
-    strSqlWhereOut.append(strField).append("=");
-    return appendValue(renderingOf(jTokenType[strField][0U].asString()), jParam,
-                       "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.asString().c_str()))",
-                       "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.toString().c_str()))",
-                       strSqlWhereOut);
+    if (0 > appendValue(renderingOf(jTokenType[strField][0U].asString()), jParam,
+                        "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.asString().c_str()))",
+                        "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.toString().c_str()))",
+                        strCondition)) {
+        return -1;
+    }
+    strSqlWhereOut.append(strCondition);
+    return 0;
 }
 
 int AccessTokenDbApi::SqlMakeByListField(const char* szField, Json::Value& jList, std::string& strSqlWhereOut)
 {
     const Json::Value& jTokenType = tokenType();
+    const Json::Value& jElements = jList; // reading through it adds no element where there is a gap
     std::string strList;
 
     VEMO_ATOKEN_CHECK_RETURN(!szField || !szField[0], -1);
@@ -494,8 +507,8 @@ int AccessTokenDbApi::SqlMakeByListField(const char* szField, Json::Value& jList
 
     // No separator stands between the elements: 'a''b' is the one text a'b, and 12 the one number.
     // So a list matches as intended only with one element. Callers have always seen this.
-    for (const Json::Value& jElement : jList) {
-        if (0 > appendValue(rendering, jElement,
+    for (Json::ArrayIndex i = 0; i < jElements.size(); ++i) {
+        if (0 > appendValue(rendering, jElements[i],
                             "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].asString().c_str()))",
                             "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].toString().c_str()))",
                             strList)) {

@@ -10,36 +10,38 @@
 
 namespace {
 
-std::unique_ptr<Json::StreamWriter> makeWriter()
+// The two configurations are built once and never destroyed, so that a program may still use the
+// library while it exits.
+
+const Json::StreamWriterBuilder* makeWriterBuilder()
 {
-    Json::StreamWriterBuilder builder;
-    builder["indentation"] = "";
-    builder["commentStyle"] = "None";
-    builder["precision"] = 17;
-    builder["useSpecialFloats"] = true;
+    auto pBuilder = std::make_unique<Json::StreamWriterBuilder>();
+    (*pBuilder)["indentation"] = "";
+    (*pBuilder)["commentStyle"] = "None";
+    (*pBuilder)["precision"] = 17;
+    (*pBuilder)["useSpecialFloats"] = true;
     // The default escapes would replace what is not valid UTF-8.
-    builder["emitUTF8"] = true;
-    return std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter());
+    (*pBuilder)["emitUTF8"] = true;
+    return pBuilder.release();
 }
 
-std::unique_ptr<Json::CharReader> makeReader()
+const Json::CharReaderBuilder* makeReaderBuilder()
 {
-    Json::CharReaderBuilder builder;
-    builder["collectComments"] = false;
-    builder["allowSpecialFloats"] = true;
-    return std::unique_ptr<Json::CharReader>(builder.newCharReader());
+    auto pBuilder = std::make_unique<Json::CharReaderBuilder>();
+    (*pBuilder)["collectComments"] = false;
+    (*pBuilder)["allowSpecialFloats"] = true;
+    return pBuilder.release();
 }
 
 } // namespace
 
 namespace VEMO_ACCESS_TOKEN {
 
-// Writer and reader are built once per thread: building them costs more than the texts of a token.
-
 std::string toString(const Json::Value& jValue)
 {
-    static thread_local const std::unique_ptr<Json::StreamWriter> pWriter = makeWriter();
     const ErrnoKeeper keeper;
+    static const Json::StreamWriterBuilder* pBuilder = makeWriterBuilder();
+    const std::unique_ptr<Json::StreamWriter> pWriter(pBuilder->newStreamWriter());
     std::ostringstream stream;
     pWriter->write(jValue, &stream);
     return stream.str();
@@ -47,7 +49,8 @@ std::string toString(const Json::Value& jValue)
 
 void fromString(const std::string& strText, Json::Value& jValue)
 {
-    static thread_local const std::unique_ptr<Json::CharReader> pReader = makeReader();
+    static const Json::CharReaderBuilder* pBuilder = makeReaderBuilder();
+    const std::unique_ptr<Json::CharReader> pReader(pBuilder->newCharReader());
     try {
         pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, nullptr);
     } catch (const Json::Exception&) {

@@ -1,5 +1,6 @@
 #include "AccessTokenUtil.h"
 
+#include <atomic>
 #include <ctime>
 
 #include "internal/AccessTokenLog.h"
@@ -8,8 +9,8 @@
 
 namespace {
 
-bool g_blLogToStdout = false;
-bool g_blDebugInfo = false;
+std::atomic<bool> g_blLogToStdout(false);
+std::atomic<bool> g_blDebugInfo(false);
 
 struct TypeCheck {
     const char* szType;
@@ -66,6 +67,11 @@ bool debugInfo(bool blOn)
 bool debugInfoGet()
 {
     return debugInfo(false);
+}
+
+void logFailed(const char* szCondition, const char* szFile, int nLine)
+{
+    VEMO_ATOKEN_WRITE_LINE("(%s:%d)(%m)Failed [%s], err=%m\n", szFile, nLine, szFile, nLine, szCondition);
 }
 
 Json::Value& tokenType()

@@ -1,39 +1,17 @@
 // Defaults, token ids and times.
 
-#include <dlfcn.h>
-
 #include <climits>
 #include <ctime>
 #include <set>
 
 #include "AccessTokenUtil.h"
+#include "StandIns.h"
 #include "StoreTest.h"
 
 using VEMO_ACCESS_TOKEN::debugInfo;
 using VEMO_ACCESS_TOKEN::fillDefaultValue;
 using VEMO_ACCESS_TOKEN::getTimeAfterNow;
 using VEMO_ACCESS_TOKEN::tokenGenerate;
-
-namespace {
-
-bool g_blClockFails = false;
-bool g_blClockAsked = false;
-
-} // namespace
-
-// Stands in front of the library's own function, which never fails, so that its caller's check can
-// be seen to work.
-int VEMO_ACCESS_TOKEN::getTimeAfterNow(int offsetSecond, long& now)
-{
-    g_blClockAsked = true;
-    if (g_blClockFails) {
-        return -1;
-    }
-    typedef int (*Function)(int, long&);
-    static const Function pReal =
-        reinterpret_cast<Function>(dlsym(RTLD_NEXT, "_ZN17VEMO_ACCESS_TOKEN15getTimeAfterNowEiRl"));
-    return pReal(offsetSecond, now);
-}
 
 namespace {
 
@@ -69,7 +47,7 @@ TEST_F(Defaults, CompleteAnEmptyRecord)
         EXPECT_EQ(Json::uintValue, jToken["uid"].type());
         EXPECT_EQ(Json::intValue, jToken["create_time"].type());
     }
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(Defaults, CompleteRecordPassesTheCheck)
@@ -79,21 +57,21 @@ TEST_F(Defaults, CompleteRecordPassesTheCheck)
     EXPECT_EQ(0, fillDefaultValue(jToken, true));
 
     EXPECT_EQ(defaults(), jToken);
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
-    EXPECT_EQ((std::vector<std::string>{}), seam().callsOf({"time"}));
+    EXPECT_EQ(Texts{}, takeLines());
+    EXPECT_EQ(Texts{}, seam().callsOf({"time"}));
 }
 
 TEST_F(Defaults, CheckReportsTheFirstMissingFieldAndAddsNothing)
 {
     const struct {
         std::vector<const char*> missing;
-        const char* szLine;
+        int nLine;
         const char* szName;
     } rows[] = {
-        {{"extra"}, "22", "extra"},
-        {{"create_time"}, "14", "create_time"},
-        {{"function", "extra", "webapi_allow"}, "16", "function"},
-        {{"uid", "tid"}, "2", "tid"},
+        {{"extra"}, 22, "extra"},
+        {{"create_time"}, 14, "create_time"},
+        {{"function", "extra", "webapi_allow"}, 16, "function"},
+        {{"uid", "tid"}, 2, "tid"},
     };
     for (const auto& row : rows) {
         SCOPED_TRACE(row.szName);
@@ -106,11 +84,10 @@ TEST_F(Defaults, CheckReportsTheFirstMissingFieldAndAddsNothing)
         EXPECT_EQ(-1, fillDefaultValue(jToken, true));
 
         EXPECT_EQ(jBefore, jToken);
-        EXPECT_EQ((std::vector<std::string>{ordinary(FIELD_LIST + std::string(":") + row.szLine,
-                                                     std::string("lost data member=") + row.szName)}),
+        EXPECT_EQ((Texts{ordinary(fieldList(row.nLine), std::string("lost data member=") + row.szName)}),
                   takeLines());
     }
-    EXPECT_EQ((std::vector<std::string>{}), seam().callsOf({"time"}));
+    EXPECT_EQ(Texts{}, seam().callsOf({"time"}));
 }
 
 TEST_F(Defaults, CheckOfAnEmptyRecordMissesTheId)
@@ -122,9 +99,7 @@ TEST_F(Defaults, CheckOfAnEmptyRecordMissesTheId)
         EXPECT_EQ(-1, fillDefaultValue(jToken, true));
 
         EXPECT_EQ(Json::Value(type), jToken);
-        EXPECT_EQ(
-            (std::vector<std::string>{ordinary(FIELD_LIST + std::string(":2"), "lost data member=tid")}),
-            takeLines());
+        EXPECT_EQ((Texts{ordinary(fieldList(2), "lost data member=tid")}), takeLines());
     }
 }
 
@@ -142,7 +117,7 @@ TEST_F(Defaults, PresentMembersStayAsTheyAre)
     EXPECT_EQ(jExpected, jToken);
     EXPECT_EQ(0, fillDefaultValue(jToken, true));
     EXPECT_EQ(jExpected, jToken);
-    EXPECT_EQ((std::vector<std::string>{}), seam().callsOf({"time"}));
+    EXPECT_EQ(Texts{}, seam().callsOf({"time"}));
 }
 
 TEST_F(Defaults, ClockIsReadForEachRecord)
@@ -156,7 +131,7 @@ TEST_F(Defaults, ClockIsReadForEachRecord)
 
     EXPECT_EQ(Json::Value(1767355200), jFirst["create_time"]);
     EXPECT_EQ(Json::Value(1767355205), jSecond["create_time"]);
-    EXPECT_EQ((std::vector<std::string>{"time", "time"}), seam().calls);
+    EXPECT_EQ((Texts{"time", "time"}), seam().calls);
 }
 
 TEST_F(Defaults, ClockMayPass32Bits)
@@ -204,7 +179,43 @@ TEST_F(TokenId, HasEveryLengthFrom127To255AndEveryLetterAndDigit)
     EXPECT_EQ(255u, *lengths.rbegin());
     EXPECT_EQ("0123456789ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz",
               std::string(letters.begin(), letters.end()));
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
+}
+
+// Eight bytes, least significant first, choose the length; then each byte chooses a character, 62
+// different ones in turn. The last 8 of the 256 bytes would favour the first characters and are passed
+// over.
+TEST_F(TokenId, TakesCharactersInTheOrderOfTheAlphabet)
+{
+    const std::string strAlphabet = "0987654321abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ";
+    const struct {
+        unsigned char nLength; // of 129
+        unsigned char nFirst;  // of the bytes that follow, each one greater than the one before it
+        std::string strTid;
+    } rows[] = {
+        {0, 0, strAlphabet + strAlphabet + "098"},
+        {61, 0, strAlphabet + strAlphabet + strAlphabet + "09"},
+        {128, 0, strAlphabet + strAlphabet + strAlphabet + strAlphabet + "0987654"},
+        {0, 61, "Z" + strAlphabet + strAlphabet + "09"},
+        {0, 246, "YZ" + strAlphabet + strAlphabet + "0"},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.strTid);
+        seam().calls.clear();
+        seam().random = [&row, nByte = row.nFirst](void* pBuffer, size_t cbBuffer, unsigned int) mutable {
+            unsigned char* const pBytes = static_cast<unsigned char*>(pBuffer);
+            const bool blLength = 1 == seam().calls.size();
+            for (size_t i = 0; i < cbBuffer; ++i) {
+                pBytes[i] = blLength ? (0 == i ? row.nLength : 0) : nByte++;
+            }
+            return static_cast<ssize_t>(cbBuffer);
+        };
+        std::string strTid;
+
+        EXPECT_LE(0, tokenGenerate(strTid));
+
+        EXPECT_EQ(row.strTid, strTid);
+    }
 }
 
 TEST_F(TokenId, ReplacesTheCallersText)
@@ -235,7 +246,7 @@ TEST_F(TokenId, FailsWithTheRandomSource)
         EXPECT_EQ(ENOSYS, errno);
         EXPECT_EQ("before", strTid);
         EXPECT_EQ(static_cast<size_t>(row.nCall), seam().calls.size());
-        EXPECT_EQ((std::vector<std::string>{}), takeLines());
+        EXPECT_EQ(Texts{}, takeLines());
     }
 }
 
@@ -261,7 +272,7 @@ TEST_F(TimeAfterNow, AddsTheOffset)
         EXPECT_EQ(0, getTimeAfterNow(nOffset, nNow));
 
         EXPECT_EQ(static_cast<long>(NOW) + nOffset, nNow);
-        EXPECT_EQ((std::vector<std::string>{"time"}), seam().calls);
+        EXPECT_EQ((Texts{"time"}), seam().calls);
     }
 }
 
@@ -290,26 +301,22 @@ TEST_F(TimeAfterNow, IsToldAsDateOfTheInternet)
 
         EXPECT_EQ(row.szText, strTime);
     }
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(TimeAfterNow, TextFailsWithTheTime)
 {
+    SKIP_WITHOUT_INTERPOSITION();
     std::string strTime;
     EXPECT_EQ(0, getTimeAfterNow(3600, strTime));
-    if (!g_blClockAsked) {
-        GTEST_SKIP() << "this compiler lets the library call its own functions directly";
-    }
-    g_blClockFails = true;
+    standIns().getTimeAfterNow = [](int, long&) { return -1; };
     errno = EACCES;
     strTime = "before";
 
     EXPECT_EQ(-1, getTimeAfterNow(3600, strTime));
 
     EXPECT_EQ("before", strTime);
-    EXPECT_EQ(
-        (std::vector<std::string>{failed("util.cpp", "0 > getTimeAfterNow(offsetSecond, now)", EACCES)}),
-        takeLines());
+    EXPECT_EQ((Texts{failed(UTIL, "0 > getTimeAfterNow(offsetSecond, now)", EACCES)}), takeLines());
 }
 
 } // namespace

@@ -27,7 +27,7 @@ struct Field {
     Json::Value jSample;
     std::string strSampleSql;
 
-    std::string location() const { return FIELD_LIST + (":" + std::to_string(nLine)); }
+    std::string location() const { return fieldList(nLine); }
 };
 
 std::ostream& operator<<(std::ostream& stream, const Field& field)
@@ -79,9 +79,9 @@ std::string joined(Piece piece)
     return strJoined;
 }
 
-std::vector<std::string> linesOfFieldList()
+Texts linesOfFieldList()
 {
-    std::vector<std::string> lines = takeLines(Destination::Stdout);
+    Texts lines = takeLines(Destination::Stdout);
     lines.erase(std::remove_if(lines.begin(), lines.end(),
                                [](const std::string& strLine) { return 0 != strLine.find(FIELD_LIST); }),
                 lines.end());
@@ -94,6 +94,14 @@ protected:
     {
         StoreTest::SetUp();
         seam().clock = NOW;
+    }
+
+    // The tid of a stored token.
+    std::string insertOld() const
+    {
+        makeDatabase();
+        insert(tid("old"), "'',7,8,9,10,'purpose','{}','{}'");
+        return tid("old");
     }
 };
 
@@ -122,7 +130,7 @@ TEST_P(FieldListEach, IsDefaultedWhenItAloneIsMissing)
     EXPECT_EQ(0, fillDefaultValue(jToken, false));
 
     EXPECT_EQ(jExpected, jToken);
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_P(FieldListEach, IsReportedLostWithItsLine)
@@ -134,8 +142,7 @@ TEST_P(FieldListEach, IsReportedLostWithItsLine)
     EXPECT_EQ(-1, fillDefaultValue(jToken, true));
 
     EXPECT_EQ(jBefore, jToken);
-    EXPECT_EQ((std::vector<std::string>{
-                  ordinary(GetParam().location(), std::string("lost data member=") + GetParam().szName)}),
+    EXPECT_EQ((Texts{ordinary(GetParam().location(), std::string("lost data member=") + GetParam().szName)}),
               takeLines());
 }
 
@@ -152,8 +159,8 @@ TEST_P(FieldListEach, IsAskedForBeforeSavingWithItsLine)
         EXPECT_EQ(-1, db.tokenSave(jToken, blCreate));
 
         EXPECT_EQ("", db.m_strSql);
-        EXPECT_EQ((std::vector<std::string>{failed(GetParam().location(), strCondition)}), takeLines());
-        EXPECT_EQ((std::vector<std::string>{}), seam().callsOf(OPENING_CALLS));
+        EXPECT_EQ((Texts{failed(GetParam().location(), strCondition)}), takeLines());
+        EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
     }
 }
 
@@ -168,16 +175,14 @@ TEST_P(FieldListEach, IsTypeCheckedByItsTypeName)
     EXPECT_EQ(-1, checkJsonType(jBad));
 
     const std::string strName = GetParam().szName;
-    EXPECT_EQ((std::vector<std::string>{fail("util.cpp", "type failed, jmList[i]=" + strName +
-                                                             ", jTokenParam={\"" + strName + "\":[]}")}),
-              takeLines());
+    EXPECT_EQ(
+        (Texts{fail(UTIL, "type failed, jmList[i]=" + strName + ", jTokenParam={\"" + strName + "\":[]}")}),
+        takeLines());
 }
 
 TEST_P(FieldListEach, IsUpdatedAloneWithADebugLine)
 {
-    makeDatabase();
-    std::string strTid = tid("old");
-    insert(strTid, "'',7,8,9,10,'purpose','{}','{}'");
+    std::string strTid = insertOld();
     Json::Value jExpected = json(R"({"bind_sid":"","uid":7,"deadline":8,"count":9,"create_time":10,
                                      "function":"purpose","webapi_allow":{},"extra":{}})");
     jExpected["tid"] = strTid;
@@ -189,9 +194,9 @@ TEST_P(FieldListEach, IsUpdatedAloneWithADebugLine)
 
     EXPECT_EQ(0, api.tokenUpdateByTid(strTid, jParam));
 
-    EXPECT_EQ((std::vector<std::string>{ordinary(GetParam().location(),
-                                                 std::string("overwrite token[") + GetParam().szName + "]")}),
-              linesOfFieldList());
+    EXPECT_EQ(
+        (Texts{ordinary(GetParam().location(), std::string("overwrite token[") + GetParam().szName + "]")}),
+        linesOfFieldList());
     Json::Value jToken;
     std::string strTidWritten = jExpected["tid"].asString();
     EXPECT_EQ(1, api.tokenGetByTid(strTidWritten, jToken));
@@ -210,10 +215,9 @@ TEST_F(FieldList, FirstMissingFieldStopsTheCheckAndTheSave)
         EXPECT_EQ(-1, db.tokenSave(jToken, true));
 
         const std::string strName = field->szName;
-        EXPECT_EQ(
-            (std::vector<std::string>{ordinary(field->location(), "lost data member=" + strName),
-                                      failed(field->location(), "!jParam.isMember(\"" + strName + "\")")}),
-            takeLines());
+        EXPECT_EQ((Texts{ordinary(field->location(), "lost data member=" + strName),
+                         failed(field->location(), "!jParam.isMember(\"" + strName + "\")")}),
+                  takeLines());
     }
 }
 
@@ -248,7 +252,7 @@ TEST_F(FieldList, DeclaresAllColumnsOfTheTable)
                   joined([](const Field& field) { return field.szColumn; }) + ");",
               strSql);
     EXPECT_EQ(0, db.createTable());
-    EXPECT_EQ((std::vector<std::string>{joined([](const Field& field) { return field.szName; })}),
+    EXPECT_EQ((Texts{joined([](const Field& field) { return field.szName; })}),
               query("SELECT group_concat(name, ',') FROM pragma_table_info('token')"));
 }
 
@@ -267,21 +271,19 @@ TEST_F(FieldList, WritesAndReadsAllValues)
     EXPECT_EQ(0, db.tokenGet(jFilter, jRead));
     ASSERT_EQ(1u, jRead.size());
     EXPECT_EQ(sampleRecord(), jRead[0]);
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(FieldList, UpdatesAllFieldsInOrder)
 {
-    makeDatabase();
-    std::string strTid = tid("old");
-    insert(strTid, "'',7,8,9,10,'purpose','{}','{}'");
+    std::string strTid = insertOld();
     Json::Value jParam = sampleRecord();
     AccessTokenApi api;
     debugInfo(true);
 
     EXPECT_EQ(0, api.tokenUpdateByTid(strTid, jParam));
 
-    std::vector<std::string> expected;
+    Texts expected;
     for (const Field& field : fields()) {
         expected.push_back(ordinary(field.location(), std::string("overwrite token[") + field.szName + "]"));
     }
@@ -290,15 +292,13 @@ TEST_F(FieldList, UpdatesAllFieldsInOrder)
 
 TEST_F(FieldList, UpdateIsSilentWithoutDebug)
 {
-    makeDatabase();
-    std::string strTid = tid("old");
-    insert(strTid, "'',7,8,9,10,'purpose','{}','{}'");
+    std::string strTid = insertOld();
     Json::Value jParam = sampleRecord();
     AccessTokenApi api;
 
     EXPECT_EQ(0, api.tokenUpdateByTid(strTid, jParam));
 
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(FieldList, HoldsNoOtherField)
@@ -330,7 +330,7 @@ TEST_F(FieldList, MembersOfOtherNamesAreNeitherDefaultedNorCheckedNorStored)
     EXPECT_EQ("INSERT INTO token (tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra) "
               "VALUES ('INVALID_TOKEN_ID','',4294967295,-1,1,1767355200,'VEMO_ACCESS_TOKEN','{}','{}')",
               db.m_strSql);
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 } // namespace

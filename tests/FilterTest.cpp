@@ -1,18 +1,11 @@
-// Filters as SQL.
+// Filters as SQL conditions.
 
-#include <cerrno>
-#include <cstring>
-#include <limits>
-
-#include "AccessTokenUtil.h"
-#include "StoreTest.h"
-#include "internal/AccessTokenDbApi.h"
+#include "FilterTest.h"
 
 using VEMO_ACCESS_TOKEN::tokenType;
 
 namespace {
 
-const char* const FILE_NAME = "AccessTokenSqlite.cpp";
 const std::string MATCH_TEXT_FAILED = "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.asString().c_str()))";
 const std::string MATCH_JSON_FAILED = "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.toString().c_str()))";
 const std::string LIST_TEXT_FAILED = "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].asString().c_str()))";
@@ -20,59 +13,10 @@ const std::string LIST_JSON_FAILED = "NULL == (szSql = sqlite3_mprintf(\"%q\", j
 const std::string MATCH_FAILED = "0 > SqlMakeByMatchField(jmFieldName[i], jTmp, strSqlWhereOut)";
 const std::string LIST_FAILED = "0 > SqlMakeByListField(jmFieldName[i].c_str(), jTmp, strSqlWhereOut)";
 
-typedef std::vector<std::string> Texts;
-
-class Filter : public SeamTest {
-protected:
-    // The builders' results; what they append is in m_strOut. A builder changes nothing else.
-    int where(const std::string& strFilter, bool bAnd = true)
-    {
-        return builds(json(strFilter),
-                      [&](Json::Value& jFilter) { return m_db.SqlWhereFromJson(jFilter, m_strOut, bAnd); });
-    }
-    int match(const std::string& strName, const Json::Value& jParam)
-    {
-        return builds(jParam, [&](Json::Value& jCopy) {
-            std::string strField = strName;
-            const int nResult = m_db.SqlMakeByMatchField(strField, jCopy, m_strOut);
-            EXPECT_EQ(strName, strField);
-            return nResult;
-        });
-    }
-    int list(const char* szField, const Json::Value& jList)
-    {
-        return builds(jList,
-                      [&](Json::Value& jCopy) { return m_db.SqlMakeByListField(szField, jCopy, m_strOut); });
-    }
-    int condition(const Json::Value& jFilter)
-    {
-        return builds(jFilter,
-                      [&](Json::Value& jCopy) { return m_db.SqlFilterConditionFromJson(jCopy, m_strOut); });
-    }
-
-    AccessTokenDbApi m_db;
-    std::string m_strOut;
-    int m_nErrno = 0; // what a builder finds in errno
-
-private:
-    template <typename Builder>
-    int builds(const Json::Value& jInput, Builder builder)
-    {
-        const Json::Value jTypes = tokenType();
-        Json::Value jCopy = jInput;
-        errno = m_nErrno;
-        const int nResult = builder(jCopy);
-        EXPECT_EQ(jInput, jCopy);
-        EXPECT_EQ(jTypes, tokenType());
-        EXPECT_EQ("", m_db.m_strSql);
-        return nResult;
-    }
-};
-
-class FilterWhere : public Filter {};
-class FilterMatch : public Filter {};
-class FilterList : public Filter {};
-class FilterPaging : public Filter {};
+class Filter : public FilterTest {};
+class FilterWhere : public FilterTest {};
+class FilterMatch : public FilterTest {};
+class FilterList : public FilterTest {};
 
 TEST_F(FilterWhere, MakesOneConditionOfTheFields)
 {
@@ -141,9 +85,9 @@ TEST_F(FilterWhere, RefusesWhatIsNoObject)
         SCOPED_TRACE(szFilter);
         m_strOut = "held";
         EXPECT_EQ(-1, where(szFilter));
-        EXPECT_EQ((Texts{failed(FILE_NAME, "jTokenParam.type() != Json::objectValue")}), takeLines());
+        EXPECT_EQ((Texts{failed(STORE, "jTokenParam.type() != Json::objectValue")}), takeLines());
         EXPECT_EQ(-1, condition(json(szFilter)));
-        EXPECT_EQ((Texts{failed(FILE_NAME, "jFilter.type() != Json::objectValue")}), takeLines());
+        EXPECT_EQ((Texts{failed(STORE, "jFilter.type() != Json::objectValue")}), takeLines());
         EXPECT_EQ("held", m_strOut);
     }
 }
@@ -167,7 +111,7 @@ TEST_F(FilterWhere, RefusesObjectAsValueAndKeepsWhatItWrote)
             m_nErrno = nErrno;
             EXPECT_EQ(-1, where(row.szFilter));
             EXPECT_EQ(std::string("held") + row.szOutput, m_strOut);
-            EXPECT_EQ((Texts{fail(FILE_NAME, "err input type, jTokenParam=(null)", nErrno)}), takeLines());
+            EXPECT_EQ((Texts{fail(STORE, "err input type, jTokenParam=(null)", nErrno)}), takeLines());
         }
     }
 }
@@ -197,8 +141,8 @@ TEST_F(FilterWhere, ReportsLackOfMemoryForEachKindOfText)
         seam().counts.clear();
         seam().fail("sqlite3_mprintf", ENOMEM, row.nCall, row.nCall);
         EXPECT_EQ(-1, where(row.szFilter));
-        EXPECT_EQ(row.szKept, m_strOut.substr(0, strlen(row.szKept)));
-        EXPECT_EQ((Texts{failed(FILE_NAME, row.strInner, ENOMEM), failed(FILE_NAME, row.strOuter, ENOMEM)}),
+        EXPECT_EQ(row.szKept, m_strOut);
+        EXPECT_EQ((Texts{failed(STORE, row.strInner, ENOMEM), failed(STORE, row.strOuter, ENOMEM)}),
                   takeLines());
     }
 }
@@ -339,7 +283,7 @@ TEST_F(FilterMatch, ClassifiesByTheTypeThatTheTableHoldsNow)
     EXPECT_EQ(0, where(R"({"tid":"a","uid":7})"));
     EXPECT_EQ(" (uid='7' )", m_strOut);
     EXPECT_EQ(-1, match("tid", "a"));
-    EXPECT_EQ((Texts{failed(FILE_NAME, "!jTokenType.isMember(strField)")}), takeLines());
+    EXPECT_EQ((Texts{failed(STORE, "!jTokenType.isMember(strField)")}), takeLines());
 }
 
 TEST_F(FilterMatch, RefusesWhatIsNoField)
@@ -349,7 +293,7 @@ TEST_F(FilterMatch, RefusesWhatIsNoField)
                                         std::string("limit"), std::string("tid\0", 4)}) {
         SCOPED_TRACE(strField);
         EXPECT_EQ(-1, match(strField, "a"));
-        EXPECT_EQ((Texts{failed(FILE_NAME, "!jTokenType.isMember(strField)")}), takeLines());
+        EXPECT_EQ((Texts{failed(STORE, "!jTokenType.isMember(strField)")}), takeLines());
     }
     EXPECT_EQ("held", m_strOut);
 }
@@ -373,9 +317,18 @@ TEST_F(FilterList, RefusesWhatIsNoFieldOrNoList)
     for (const auto& row : rows) {
         SCOPED_TRACE(row.szField ? row.szField : "(null)");
         EXPECT_EQ(-1, list(row.szField, json(row.szList)));
-        EXPECT_EQ((Texts{failed(FILE_NAME, row.strCondition)}), takeLines());
+        EXPECT_EQ((Texts{failed(STORE, row.strCondition)}), takeLines());
     }
     EXPECT_EQ("held", m_strOut);
+}
+
+TEST_F(FilterList, ReadsGapsAsNullAndLeavesThem)
+{
+    Json::Value jList;
+    jList[2] = "a";
+    EXPECT_EQ(0, list("tid", jList));
+    EXPECT_EQ(0, list("extra", jList));
+    EXPECT_EQ("tid in ('''''a' )extra in ('null''null''\"a\"' )", m_strOut);
 }
 
 TEST_F(FilterList, ReachesTheOutputWholeOrNotAtAll)
@@ -385,138 +338,10 @@ TEST_F(FilterList, ReachesTheOutputWholeOrNotAtAll)
     seam().fail("sqlite3_mprintf", ENOMEM, 3, 3);
     EXPECT_EQ(-1, list("tid", json(R"(["a","b","c"])")));
     EXPECT_EQ("held", m_strOut);
-    EXPECT_EQ((Texts{failed(FILE_NAME, LIST_TEXT_FAILED, ENOMEM)}), takeLines());
+    EXPECT_EQ((Texts{failed(STORE, LIST_TEXT_FAILED, ENOMEM)}), takeLines());
 
     EXPECT_EQ(0, list("tid", json(R"(["a","b","c"])")));
     EXPECT_EQ("heldtid in ('a''b''c' )", m_strOut);
-}
-
-TEST_F(FilterPaging, SortsByATextAndInOneOfTwoDirections)
-{
-    const std::pair<const char*, const char*> rows[] = {
-        {R"({"sort_by":"create_time"})", " order by 'create_time'"},
-        {R"({"sort_by":"create_time","sort_direction":"desc"})", " order by 'create_time' DESC"},
-        {R"({"sort_by":"uid","sort_direction":"DESC"})", " order by 'uid' ASC"},
-        {R"({"sort_direction":"desc"})", ""},
-        {R"({"limit":0,"offset":0})", " LIMIT  OFFSET "},
-        {R"({"limit":1})", "LIMIT "},
-        {R"({"offset":3})", ""},
-        {"{}", ""},
-        {R"({"tid":"a","foo":1})", ""},
-        {R"({"sort_by":"uid","sort_direction":"asc"})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":"Desc"})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":"desc "})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":"desc\u0000"})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":""})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":null})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":1})", " order by 'uid' ASC"},
-        {R"({"sort_by":""})", " order by ''"},
-        {R"({"sort_by":"no such column"})", " order by 'no such column'"},
-        {R"({"sort_by":"x'; DROP TABLE token; --"})", " order by 'x''; DROP TABLE token; --'"},
-        {R"({"sort_by":"%s%n%q"})", " order by '%s%n%q'"},
-        {R"({"sort_by":"a\u0000b"})", " order by 'a'"},
-        {R"({"sort_by":"uid","sort_direction":"desc","limit":0,"offset":1})",
-         " order by 'uid' DESC LIMIT OFFSET "},
-        {R"({"sort_by":"uid","limit":7})", " order by 'uid'"},
-        // What is not read does not matter.
-        {R"({"sort_direction":{},"offset":"x"})", ""},
-    };
-
-    for (const auto& [szFilter, szAppended] : rows) {
-        for (const std::string strBefore : {"", "held"}) {
-            SCOPED_TRACE(szFilter);
-            m_strOut = strBefore;
-            EXPECT_EQ(0, condition(json(szFilter)));
-            EXPECT_EQ(strBefore + szAppended, m_strOut);
-        }
-    }
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(FilterPaging, WritesTheKeywordsTailThatTheNumberPointsTo)
-{
-    const Json::Int64 nMin = std::numeric_limits<Json::Int64>::min();
-    const Json::Int64 nMax = std::numeric_limits<Json::Int64>::max();
-    const Json::Int64 n2To32 = Json::Int64(1) << 32;
-    const struct {
-        Json::Value jNumber;
-        const char *szLimit, *szOffset;
-    } rows[] = {
-        {0, " LIMIT ", " OFFSET "},
-        {1, "LIMIT ", "OFFSET "},
-        {2, "IMIT ", "FFSET "},
-        {3, "MIT ", "FSET "},
-        {4, "IT ", "SET "},
-        {5, "T ", "ET "},
-        {6, " ", "T "},
-        {7, "", " "},
-        {8, "", ""},
-        {9, "", ""},
-        {16, "", ""},
-        {1000000, "", ""},
-        {-1, "", ""},
-        {-7, "", ""},
-        {n2To32 / 2, "", ""},
-        {n2To32 - 1, "", ""},
-        {n2To32, " LIMIT ", " OFFSET "},
-        {n2To32 + 1, "LIMIT ", "OFFSET "},
-        {n2To32 + 7, "", " "},
-        {-n2To32, " LIMIT ", " OFFSET "},
-        {6 - n2To32, " ", "T "},
-        {nMax, "", ""},
-        {nMin, " LIMIT ", " OFFSET "},
-        {nMin + 5, "T ", "ET "},
-        {Json::UInt64(nMax), "", ""},
-        {3U, "MIT ", "FSET "},
-        // Read as a number; a fraction is cut off.
-        {Json::nullValue, " LIMIT ", " OFFSET "},
-        {false, " LIMIT ", " OFFSET "},
-        {true, "LIMIT ", "OFFSET "},
-        {1.9, "LIMIT ", "OFFSET "},
-        {-0.9, " LIMIT ", " OFFSET "},
-    };
-
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.jNumber.asString());
-        Json::Value jFilter;
-        jFilter["limit"] = row.jNumber;
-        m_strOut = "held";
-        EXPECT_EQ(0, condition(jFilter));
-        EXPECT_EQ(std::string("held") + row.szLimit, m_strOut);
-
-        jFilter["limit"] = 8;
-        jFilter["offset"] = row.jNumber;
-        m_strOut.clear();
-        EXPECT_EQ(0, condition(jFilter));
-        EXPECT_EQ(row.szOffset, m_strOut);
-    }
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(FilterPaging, LetsTheJsonLibraryRefuseValuesOfUnsuitableType)
-{
-    for (const char* szFilter :
-         {R"({"sort_by":5})", R"({"sort_by":null})", R"({"sort_by":[]})", R"({"sort_by":{}})",
-          R"({"sort_by":"uid","sort_direction":[]})", R"({"sort_by":"uid","sort_direction":{}})",
-          R"({"limit":"5"})", R"({"limit":[]})", R"({"limit":{}})", R"({"limit":1e30})",
-          R"({"limit":18446744073709551615})", R"({"limit":0,"offset":"5"})", R"({"limit":0,"offset":[]})",
-          R"({"limit":9,"offset":{}})", R"({"limit":0,"offset":-1e30})"}) {
-        SCOPED_TRACE(szFilter);
-        EXPECT_THROW(condition(json(szFilter)), Json::Exception);
-    }
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(FilterPaging, ReportsLackOfMemoryForTheColumn)
-{
-    for (const int nErrno : {0, ENOMEM}) {
-        m_strOut = "held";
-        seam().counts.clear();
-        seam().fail("sqlite3_mprintf", nErrno);
-        EXPECT_EQ(-1, condition(json(R"({"sort_by":"uid","sort_direction":"desc","limit":0})")));
-        EXPECT_EQ("held", m_strOut);
-        EXPECT_EQ((Texts{failed(FILE_NAME, "!szSql", nErrno)}), takeLines());
-    }
 }
 
 TEST_F(Filter, TracesNothingInDebugModeAndReleasesItsTexts)
@@ -535,35 +360,22 @@ TEST_F(Filter, TracesNothingInDebugModeAndReleasesItsTexts)
     EXPECT_EQ(Texts{}, takeLines());
 }
 
-// The switch to standard output cannot be taken back, so this fixture never makes it.
-class FilterInSystemLog : public ::testing::Test {
+class FilterInSystemLog : public FilterTest {
 protected:
-    void SetUp() override
-    {
-        seam() = Seam();
-        errno = 0;
-    }
+    FilterInSystemLog() : FilterTest(Destination::Syslog) {}
 };
 
 TEST_F(FilterInSystemLog, TellsTheErrorInFrontWhenThereIsOne)
 {
-    const size_t nMessage = (std::string(FILE_NAME) + ":# ").size();
     for (const int nErrno : {0, ENOMEM}) {
-        AccessTokenDbApi db;
-        std::string strOut;
-        Json::Value jFilter = json(R"({"tid":"a"})");
-        Texts expected;
-        for (const std::string& strCondition : {MATCH_TEXT_FAILED, MATCH_FAILED}) {
-            const std::string strError = nErrno ? std::string("(") + strerror(nErrno) + ")" : "";
-            expected.push_back(failed(FILE_NAME, strCondition, nErrno).insert(nMessage, strError));
-        }
         seam().counts.clear();
         seam().fail("sqlite3_mprintf", nErrno);
-        errno = 0;
 
-        EXPECT_EQ(-1, db.SqlWhereFromJson(jFilter, strOut, true));
+        EXPECT_EQ(-1, where(R"({"tid":"a"})"));
 
-        EXPECT_EQ(expected, takeLines(Destination::Syslog));
+        EXPECT_EQ(inSystemLog({failed(STORE, MATCH_TEXT_FAILED, nErrno), failed(STORE, MATCH_FAILED, nErrno)},
+                              nErrno),
+                  takeLines(Destination::Syslog));
     }
 }
 

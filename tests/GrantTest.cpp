@@ -1,38 +1,10 @@
-// Granting tokens and counting their uses.
+// Granting tokens: who is granted what, and how the store's failures show.
 
-#include <climits>
-#include <cstring>
-#include <functional>
-#include <optional>
-
-#include "AccessTokenApi.h"
 #include "AccessTokenUtil.h"
-#include "StoreTest.h"
+#include "OneGrant.h"
+#include "Statements.h"
 
 namespace {
-
-typedef std::vector<std::string> Texts;
-
-const char* const API = "AccessTokenApi.cpp";
-const char* const STORE = "AccessTokenSqlite.cpp";
-const char* const UTIL = "util.cpp";
-const Json::Value UNTOUCHED = "what the caller had";
-const std::string ALLOW = R"({"Api":{"method":["get","post"]},"Odd":7})";
-const std::string SELECT = std::string("SELECT ") + COLUMNS + " FROM token  WHERE  (tid='t' );";
-const std::string DELETE = "DELETE FROM token WHERE  (tid in ('t' ) );";
-
-std::string replaceSql(Json::Int64 nCount)
-{
-    return std::string("REPLACE INTO token (") + COLUMNS + ") VALUES ('t','S1',1000,1700000100," +
-           std::to_string(nCount) + R"(,1700000000,'VPN',')" + ALLOW + R"(','{"note":"mine"}'))";
-}
-
-std::string recordText(Json::Int64 nCount)
-{
-    return R"({"bind_sid":"S1","count":)" + std::to_string(nCount) +
-           R"(,"create_time":1700000000,"deadline":1700000100,"extra":{"note":"mine"},"function":"VPN",)" +
-           R"("tid":"t","uid":1000,"webapi_allow":)" + ALLOW + "}";
-}
 
 // A line, and whether only debug mode has it.
 struct Line {
@@ -47,8 +19,8 @@ Line debug(const std::string& strFile, const std::string& strMessage)
 
 Line refused(const std::string& strTid, const std::string& strApi, const std::string& strMethod)
 {
-    return debug(API, "token grant failed!!, strTid=" + strTid + ", szWebapiName=" + strApi +
-                          ", szWebapiMethod=" + strMethod);
+    return debug(SERVICE, "token grant failed!!, strTid=" + strTid + ", szWebapiName=" + strApi +
+                              ", szWebapiMethod=" + strMethod);
 }
 
 Texts texts(const std::vector<Line>& lines, bool blDebug)
@@ -62,115 +34,14 @@ Texts texts(const std::vector<Line>& lines, bool blDebug)
     return found;
 }
 
-// Fails the first statement that starts with strStart; leaves EIO. What SQLite does to errno in the
-// statements that run is its own affair and is hidden from the log lines.
-void failStatement(const std::string& strStart, const char* szError)
-{
-    seam().sqliteExec = [strStart, szError, blDone = false](sqlite3* pDb, const char* szSql, auto callback,
-                                                            void* pArgument, char** pszError) mutable {
-        if (!blDone && 0 == strncmp(szSql, strStart.c_str(), strStart.size())) {
-            blDone = true;
-            *pszError = sqlite3_mprintf("%s", szError);
-            errno = EIO;
-            return SQLITE_ERROR;
-        }
-        const int nErrno = errno;
-        const int nResult = sqlite3_exec(pDb, szSql, callback, pArgument, pszError);
-        errno = nErrno;
-        return nResult;
-    };
-}
-
-class Grant : public StoreTest {
-protected:
-    void SetUp() override
-    {
-        StoreTest::SetUp();
-        makeDatabase();
-        m_api.emplace();
-        failStatement("none", "");
-        seam().calls.clear();
-        errno = 0;
-    }
-
-    void insertToken(const std::string& strCount, const std::string& strAllow = ALLOW) const
-    {
-        insert("t", "'S1',1000,1700000100," + strCount + ",1700000000,'VPN','" + strAllow +
-                        R"(','{"note":"mine"}')");
-    }
-
-    // The count of the token in the table, "" when it is gone.
-    std::string stored() const
-    {
-        const Texts rows = query("SELECT count FROM token WHERE tid = 't'");
-        return rows.empty() ? "" : rows[0];
-    }
-
-    int grant(std::string strTid, const char* szApi, const char* szMethod)
-    {
-        errno = 0; // what the test's own SQL left there
-        return m_api->tokenGrant(strTid, szApi, szMethod, m_jToken);
-    }
-
-    AccessTokenApi& api() { return *m_api; }
-
-    Json::Value m_jToken = UNTOUCHED;
-
-private:
-    std::optional<AccessTokenApi> m_api; // opened when its database stands
-};
-
-struct CountCase {
-    const char* szName;
-    const char* szCount;
-    const char* szStored; // after the grant
-    Json::Int64 nHandedBack;
-    std::string strStatement; // besides the SELECT
-};
-
-void PrintTo(const CountCase& count, std::ostream* pStream)
-{
-    *pStream << count.szName;
-}
-
-const CountCase COUNTS[] = {
-    {"Three", "3", "2", 2, replaceSql(2)},
-    {"Two", "2", "1", 1, replaceSql(1)},
-    {"One", "1", "", 1, DELETE},
-    {"Zero", "0", "", 0, DELETE},
-    {"MinusOne", "-1", "-1", -1, ""},
-    {"Least", "-9223372036854775808", "-9223372036854775808", INT64_MIN, ""},
-    {"Most", "9223372036854775807", "9223372036854775806", INT64_MAX - 1, replaceSql(INT64_MAX - 1)}};
-
-class GrantOfCount : public Grant, public ::testing::WithParamInterface<CountCase> {};
-
-TEST_P(GrantOfCount, SpendsOneUse)
-{
-    insertToken(GetParam().szCount);
-
-    EXPECT_EQ(0, grant("t", "Api", "get"));
-
-    EXPECT_EQ(GetParam().szStored, stored());
-    Json::Value jExpected = json(recordText(0));
-    jExpected["count"] = GetParam().nHandedBack;
-    EXPECT_EQ(jExpected, m_jToken);
-    Texts statements = {"sqlite3_exec " + SELECT};
-    if (!GetParam().strStatement.empty()) {
-        statements.push_back("sqlite3_exec " + GetParam().strStatement);
-    }
-    EXPECT_EQ(statements, seam().callsOf({"sqlite3_exec"}));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-INSTANTIATE_TEST_SUITE_P(Counts, GrantOfCount, ::testing::ValuesIn(COUNTS),
-                         [](const auto& test) { return std::string(test.param.szName); });
+class Grant : public OneGrant {};
 
 TEST_F(Grant, OfThreeUsesSucceedsThreeTimes)
 {
     insertToken("3");
     for (const char* szStored : {"2", "1", ""}) {
         EXPECT_EQ(0, grant("t", "Api", "get"));
-        EXPECT_EQ(szStored, stored());
+        EXPECT_EQ(szStored, countOf("t"));
     }
     m_jToken = UNTOUCHED;
 
@@ -186,7 +57,7 @@ TEST_F(Grant, OfUnlimitedTokenNeverEnds)
     for (int i = 0; i < 10; ++i) {
         EXPECT_EQ(0, grant("t", "Api", "get"));
         EXPECT_EQ(json(recordText(-1)), m_jToken);
-        EXPECT_EQ("-1", stored());
+        EXPECT_EQ("-1", countOf("t"));
     }
 }
 
@@ -235,24 +106,26 @@ TEST_F(Grant, IsTracedInDebugMode)
 
     EXPECT_EQ(0, grant("t", "Api", "get"));
     const std::string strReplace = replaceSql(1);
-    EXPECT_EQ((Texts{ordinary(STORE, "run sql=" + SELECT), ordinary(API, "get token tid=t"),
+    EXPECT_EQ((Texts{ordinary(STORE, "run sql=" + SELECT_T), ordinary(SERVICE, "get token tid=t"),
                      ordinary(STORE, "tokenSave, blCreate=0, jParam=" + recordText(1)),
                      ordinary(STORE, "run sql=" + strReplace), ordinary(STORE, "run sql=" + strReplace),
                      ordinary(STORE, "change rv=1, run sql=" + strReplace),
-                     ordinary(API, "token grant success!!")}),
+                     ordinary(SERVICE, "token grant success!!")}),
               takeLines());
 
     EXPECT_EQ(0, grant("t", "Api", nullptr));
-    EXPECT_EQ((Texts{ordinary(STORE, "run sql=" + SELECT), ordinary(API, "get token tid=t"),
-                     ordinary(STORE, "run sql=" + DELETE), ordinary(STORE, "change rv=1, run sql=" + DELETE),
-                     ordinary(STORE, "delete token number=1"), ordinary(API, "token grant success!!")}),
-              takeLines());
+    EXPECT_EQ(
+        (Texts{ordinary(STORE, "run sql=" + SELECT_T), ordinary(SERVICE, "get token tid=t"),
+               ordinary(STORE, "run sql=" + DELETE_T), ordinary(STORE, "change rv=1, run sql=" + DELETE_T),
+               ordinary(STORE, "delete token number=1"), ordinary(SERVICE, "token grant success!!")}),
+        takeLines());
 }
 
-const Line FOUND = debug(API, "get token tid=t");
-const Line NO_API = {failed(API, "!szWebapiName || !szWebapiName[0]")};
-const Line NO_TID = {failed(API, "strTid.empty()")};
-const Line NOT_PERMITTED = {failed(API, "0 > (err = checkPermission(jToken, szWebapiName, szWebapiMethod))")};
+const Line FOUND = debug(SERVICE, "get token tid=t");
+const Line NO_API = {failed(SERVICE, "!szWebapiName || !szWebapiName[0]")};
+const Line NO_TID = {failed(SERVICE, "strTid.empty()")};
+const Line NOT_PERMITTED = {
+    failed(SERVICE, "0 > (err = checkPermission(jToken, szWebapiName, szWebapiMethod))")};
 const Line RECORD = debug(UTIL, "jToken=" + recordText(2));
 const Line UNLISTED_API = debug(UTIL, "webapi=api not in allow list, jToken=" + recordText(2));
 const Line MALFORMED_API = {
@@ -260,8 +133,7 @@ const Line MALFORMED_API = {
 
 Line lookup(const std::string& strTidInSql)
 {
-    return debug(STORE, std::string("run sql=SELECT ") + COLUMNS + " FROM token  WHERE  (tid='" +
-                            strTidInSql + "' );");
+    return debug(STORE, "run sql=" + selectSql(strTidInSql));
 }
 
 std::vector<Line> unknownTid(const std::string& strTid, const std::string& strTidInSql)
@@ -307,7 +179,7 @@ const Refusal REFUSALS[] = {
     {"MethodOfOtherCase", "t", "Api", "Get", unlistedMethod("Get")},
     {"MethodThatOnlyStartsSo", "t", "Api", "ge", unlistedMethod("ge")}};
 
-class GrantRefuses : public Grant, public ::testing::WithParamInterface<std::tuple<Refusal, bool>> {};
+class GrantRefuses : public OneGrant, public ::testing::WithParamInterface<std::tuple<Refusal, bool>> {};
 
 TEST_P(GrantRefuses, AndSpendsNothing)
 {
@@ -319,7 +191,7 @@ TEST_P(GrantRefuses, AndSpendsNothing)
 
     EXPECT_EQ(texts(refusal.lines, blDebug), takeLines());
     EXPECT_EQ(UNTOUCHED, m_jToken);
-    EXPECT_EQ("2", stored());
+    EXPECT_EQ("2", countOf("t"));
     EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_changes"})); // nothing but a SELECT was run
 }
 
@@ -342,7 +214,7 @@ TEST_F(Grant, RefusesAllowListsThatAreNoObjects)
         EXPECT_EQ((Texts{failed(UTIL, "jToken[\"webapi_allow\"].type() != Json::objectValue"),
                          NOT_PERMITTED.strText}),
                   takeLines());
-        EXPECT_EQ("2", stored());
+        EXPECT_EQ("2", countOf("t"));
     }
 }
 
@@ -353,14 +225,14 @@ TEST_F(Grant, LetsTheExceptionOfAMalformedMethodPass)
     EXPECT_THROW(grant("t", "Api", "get"), Json::LogicError);
 
     EXPECT_EQ(UNTOUCHED, m_jToken);
-    EXPECT_EQ("2", stored());
+    EXPECT_EQ("2", countOf("t"));
     EXPECT_EQ(Texts{}, takeLines());
 }
 
 struct StoreFailure {
     const char* szName;
     const char* szStatement; // the one that fails: how it starts
-    const char* szError;
+    Answer failure;
     const char* szCount;
     const char* szStored;
     Texts lines;
@@ -371,16 +243,19 @@ void PrintTo(const StoreFailure& failure, std::ostream* pStream)
     *pStream << failure.szName;
 }
 
-Texts operator+(Texts left, const Texts& right)
+Texts inStore(const Texts& conditions)
 {
-    left.insert(left.end(), right.begin(), right.end());
-    return left;
+    return allFailed(STORE, conditions, EIO);
 }
 
-Texts notRun(const std::string& strSql)
+Texts inService(const Texts& conditions)
 {
-    return {ordinary(STORE, "i=0,run sql failed, error=disk I/O error, sql=" + strSql),
-            fail(STORE, "run sql failed, sql=" + strSql, EIO)};
+    return allFailed(SERVICE, conditions, EIO);
+}
+
+Texts refusedBySqlite(const std::string& strSql)
+{
+    return failureOf(strSql, DISK_ERROR.szError, EIO);
 }
 
 Texts lockedBefore(const std::string& strSql)
@@ -388,121 +263,49 @@ Texts lockedBefore(const std::string& strSql)
     return {fail(STORE, "sql error, sql=" + strSql, EIO)};
 }
 
-Texts failures(const char* szFile, const Texts& conditions)
-{
-    Texts lines;
-    for (const std::string& strCondition : conditions) {
-        lines.push_back(failed(szFile, strCondition, EIO));
-    }
-    return lines;
-}
-
-const Texts LOOKUP_FAILED = failures(STORE, {"0 > tokenGet(jParam, jTokenArray)"}) +
-                            failures(API, {"0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))",
-                                           "0 > (err = tokenGetByTid(strTid, jToken))"});
-const Texts SAVE_FAILED =
-    failures(API, {"0 > m_pDb->tokenUpdate(jToken)"}) +
-    Texts{ordinary(API, "tokenSaveByOverwrite failed, jToken=" + recordText(1))} +
-    failures(API, {"0 > tokenSaveByOverwrite(jToken)", "0 > tokenCountDegrade(jToken)"});
-const Texts DELETE_FAILED = failures(API, {"0 > (err = m_pDb->tokenDelete(jParam))"}) +
-                            Texts{ordinary(API, "tokenDeleteByArray failed, name=tid, strVector=t")} +
-                            failures(API, {"0 > (err = tokenDeleteByArray(strVector, szName))"}) +
-                            Texts{ordinary(API, "tokenDeleteByName failed, name=tid, strValue=t")} +
-                            failures(API, {"0 > tokenDeleteByTid(strTid)", "0 > tokenCountDegrade(jToken)"});
-const char* const DISK = "disk I/O error";
-const char* const LOCK = "database is locked";
+const Texts LOOKUP_FAILED = inStore({"0 > tokenGet(jParam, jTokenArray)"}) +
+                            inService({"0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))",
+                                       "0 > (err = tokenGetByTid(strTid, jToken))"});
+const Texts SAVE_FAILED = inService({"0 > m_pDb->tokenUpdate(jToken)"}) +
+                          Texts{ordinary(SERVICE, "tokenSaveByOverwrite failed, jToken=" + recordText(1))} +
+                          inService({"0 > tokenSaveByOverwrite(jToken)", "0 > tokenCountDegrade(jToken)"});
+const Texts DELETE_FAILED = inService({"0 > (err = m_pDb->tokenDelete(jParam))"}) +
+                            Texts{ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=t")} +
+                            inService({"0 > (err = tokenDeleteByArray(strVector, szName))"}) +
+                            Texts{ordinary(SERVICE, "tokenDeleteByName failed, name=tid, strValue=t")} +
+                            inService({"0 > tokenDeleteByTid(strTid)", "0 > tokenCountDegrade(jToken)"});
 
 // After a lock that was waited out the statement has taken effect, and the grant is refused.
 const StoreFailure STORE_FAILURES[] = {
-    {"InLookup", "SELECT", DISK, "2", "2",
-     notRun(SELECT) + failures(STORE, {"0 > runSql(FillList, &jTokenArrayOut)"}) + LOOKUP_FAILED},
-    {"InLookupAfterLock", "SELECT", LOCK, "2", "2", lockedBefore(SELECT) + LOOKUP_FAILED},
-    {"InSave", "REPLACE", DISK, "2", "2",
-     notRun(replaceSql(1)) + failures(STORE, {"0 > runSql()"}) + SAVE_FAILED},
-    {"InSaveAfterLock", "REPLACE", LOCK, "2", "1", lockedBefore(replaceSql(1)) + SAVE_FAILED},
-    {"InDelete", "DELETE", DISK, "1", "1",
-     notRun(DELETE) + failures(STORE, {"0 > (err = runSql())"}) + DELETE_FAILED},
-    {"InDeleteAfterLock", "DELETE", LOCK, "1", "", lockedBefore(DELETE) + DELETE_FAILED}};
+    {"InLookup", "SELECT", DISK_ERROR, "2", "2",
+     refusedBySqlite(SELECT_T) + inStore({"0 > runSql(FillList, &jTokenArrayOut)"}) + LOOKUP_FAILED},
+    {"InLookupAfterLock", "SELECT", LOCKED, "2", "2", lockedBefore(SELECT_T) + LOOKUP_FAILED},
+    {"InSave", "REPLACE", DISK_ERROR, "2", "2",
+     refusedBySqlite(replaceSql(1)) + inStore({"0 > runSql()"}) + SAVE_FAILED},
+    {"InSaveAfterLock", "REPLACE", LOCKED, "2", "1", lockedBefore(replaceSql(1)) + SAVE_FAILED},
+    {"InDelete", "DELETE", DISK_ERROR, "1", "1",
+     refusedBySqlite(DELETE_T) + inStore({"0 > (err = runSql())"}) + DELETE_FAILED},
+    {"InDeleteAfterLock", "DELETE", LOCKED, "1", "", lockedBefore(DELETE_T) + DELETE_FAILED}};
 
-class GrantFails : public Grant, public ::testing::WithParamInterface<StoreFailure> {};
+class GrantFails : public OneGrant, public ::testing::WithParamInterface<StoreFailure> {};
 
 TEST_P(GrantFails, AndLeavesTheCallersRecordAlone)
 {
     insertToken(GetParam().szCount);
-    failStatement(GetParam().szStatement, GetParam().szError);
+    failStatements(GetParam().szStatement, GetParam().failure);
 
     EXPECT_EQ(-1, grant("t", "Api", "get"));
 
     EXPECT_EQ(GetParam().lines, takeLines());
     EXPECT_EQ(UNTOUCHED, m_jToken);
-    EXPECT_EQ(GetParam().szStored, stored());
+    EXPECT_EQ(GetParam().szStored, countOf("t"));
 }
 
 INSTANTIATE_TEST_SUITE_P(Store, GrantFails, ::testing::ValuesIn(STORE_FAILURES),
                          [](const auto& test) { return std::string(test.param.szName); });
 
-// Nothing is locked between the lookup and the change: another process may come in between.
-class GrantOverlaps : public Grant {
-protected:
-    // Runs something once, just ahead of the first statement that is no SELECT.
-    void meanwhile(std::function<void()> run)
-    {
-        seam().sqliteExec = [run](sqlite3* pDb, const char* szSql, auto callback, void* pArgument,
-                                  char** pszError) mutable {
-            if (run && 0 != strncmp(szSql, "SELECT", 6)) {
-                const std::function<void()> runOnce = std::move(run);
-                run = nullptr;
-                runOnce();
-            }
-            return sqlite3_exec(pDb, szSql, callback, pArgument, pszError);
-        };
-    }
-
-    // The whole grant by another service.
-    void grantElsewhere()
-    {
-        AccessTokenApi another;
-        std::string strTid = "t";
-        Json::Value jToken;
-        EXPECT_EQ(0, another.tokenGrant(strTid, "Api", "get", jToken));
-    }
-};
-
-TEST_F(GrantOverlaps, AndSpendsOneUseForTwoGrants)
-{
-    insertToken("3");
-    meanwhile([this] { grantElsewhere(); });
-
-    EXPECT_EQ(0, grant("t", "Api", "get"));
-
-    EXPECT_EQ("2", stored());
-    EXPECT_EQ(json(recordText(2)), m_jToken);
-}
-
-TEST_F(GrantOverlaps, AndBothSpendTheLastUse)
-{
-    insertToken("1");
-    meanwhile([this] { grantElsewhere(); });
-
-    EXPECT_EQ(0, grant("t", "Api", "get"));
-
-    EXPECT_EQ("", stored());
-    EXPECT_EQ(json(recordText(1)), m_jToken);
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(GrantOverlaps, AndSavesATokenThatWasDeletedMeanwhile)
-{
-    insertToken("3");
-    meanwhile([this] { query("DELETE FROM token"); });
-
-    EXPECT_EQ(0, grant("t", "Api", "get"));
-
-    EXPECT_EQ("2", stored());
-}
-
 // The record that the table yields, reduced to some columns, as an older table may have them.
-class GrantOfPart : public Grant {
+class GrantOfPart : public OneGrant {
 protected:
     void answer(std::vector<const char*> names, std::vector<const char*> values)
     {
@@ -520,7 +323,7 @@ protected:
 TEST_F(GrantOfPart, NamesWhatIsMissing)
 {
     const char* const szAllow = R"({"Api":{}})";
-    const std::string strDegrade = failed(API, "0 > tokenCountDegrade(jToken)");
+    const std::string strDegrade = failed(SERVICE, "0 > tokenCountDegrade(jToken)");
     const struct {
         std::vector<const char*> names;
         std::vector<const char*> values;
@@ -528,11 +331,13 @@ TEST_F(GrantOfPart, NamesWhatIsMissing)
     } parts[] = {
         {{"uid"}, {"7"}, {failed(UTIL, "!jToken.isMember(\"webapi_allow\")"), NOT_PERMITTED.strText}},
         {{"webapi_allow"}, {"{}"}, {NOT_PERMITTED.strText}},
-        {{"webapi_allow"}, {szAllow}, {failed(API, "!jToken.isMember(\"uid\")")}},
-        {{"webapi_allow", "uid"}, {szAllow, "7"}, {failed(API, "!jToken.isMember(\"count\")"), strDegrade}},
+        {{"webapi_allow"}, {szAllow}, {failed(SERVICE, "!jToken.isMember(\"uid\")")}},
+        {{"webapi_allow", "uid"},
+         {szAllow, "7"},
+         {failed(SERVICE, "!jToken.isMember(\"count\")"), strDegrade}},
         {{"webapi_allow", "uid", "count"},
          {szAllow, "7", "1"},
-         {failed(API, "!jToken.isMember(\"tid\")"), strDegrade}}};
+         {failed(SERVICE, "!jToken.isMember(\"tid\")"), strDegrade}}};
     for (const auto& part : parts) {
         SCOPED_TRACE(part.names.size());
         answer(part.names, part.values);
@@ -542,105 +347,6 @@ TEST_F(GrantOfPart, NamesWhatIsMissing)
         EXPECT_EQ(part.lines, takeLines());
         EXPECT_EQ(UNTOUCHED, m_jToken);
     }
-}
-
-class Degrade : public Grant {};
-
-// What a record may be that no table yielded.
-TEST_F(Degrade, RefusesMalformedRecords)
-{
-    const std::string strCount = failed(API, "!jToken.isMember(\"count\")");
-    const std::string strObject = failed(API, "jToken.type() != Json::objectValue");
-    const std::string strTid = failed(API, "!jToken.isMember(\"tid\")");
-    const std::string strString = failed(API, "jToken[\"tid\"].type() != Json::stringValue");
-    const std::pair<const char*, Texts> records[] = {
-        {"null", {strObject}},
-        {"[1]", {strObject}},
-        {"\"count\"", {strObject}},
-        {"{}", {strCount}},
-        {R"({"tid":"t"})", {strCount}},
-        {R"({"count":1})", {strTid}},
-        {R"({"count":0})", {strTid}},
-        {R"({"count":1,"tid":7})", {strString}},
-        {R"({"count":null,"tid":null})", {strString}},
-        {R"({"count":1,"tid":""})",
-         {failed(API, "strValue.empty()"), ordinary(API, "tokenDeleteByName failed, name=tid, strValue="),
-          failed(API, "0 > tokenDeleteByTid(strTid)")}}};
-    for (const bool blDebug : {false, true}) {
-        VEMO_ACCESS_TOKEN::debugInfo(blDebug);
-        for (const auto& [szRecord, lines] : records) {
-            SCOPED_TRACE(szRecord);
-            Json::Value jToken = json(szRecord);
-
-            EXPECT_EQ(-1, api().tokenCountDegrade(jToken));
-
-            Texts expected = lines;
-            if (blDebug) {
-                expected.push_back(
-                    ordinary(API, std::string("tokenCountDegrade failed, jToken=") + szRecord));
-            }
-            EXPECT_EQ(expected, takeLines());
-            EXPECT_EQ(json(szRecord), jToken);
-        }
-    }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
-}
-
-// The count is lowered before the record is saved, and stays so when the save refuses the record.
-TEST_F(Degrade, LowersTheCountOfARecordThatCannotBeSaved)
-{
-    Json::Value jToken = json(R"({"count":2,"tid":"t"})");
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-
-    EXPECT_EQ(-1, api().tokenCountDegrade(jToken));
-
-    EXPECT_EQ(json(R"({"count":1,"tid":"t"})"), jToken);
-    EXPECT_EQ((Texts{ordinary(std::string(FIELD_LIST) + ":4", "lost data member=bind_sid"),
-                     failed(API, "0 > fillDefaultValue(jToken, true)"),
-                     ordinary(API, R"(tokenSaveByOverwrite failed, jToken={"count":1,"tid":"t"})"),
-                     failed(API, "0 > tokenSaveByOverwrite(jToken)"),
-                     ordinary(API, R"(tokenCountDegrade failed, jToken={"count":1,"tid":"t"})")}),
-              takeLines());
-}
-
-TEST_F(Degrade, LeavesUnlimitedRecordsAlone)
-{
-    for (const char* szRecord : {R"({"count":-1})", R"({"count":-9223372036854775808,"tid":7})"}) {
-        Json::Value jToken = json(szRecord);
-
-        EXPECT_EQ(0, api().tokenCountDegrade(jToken));
-
-        EXPECT_EQ(json(szRecord), jToken);
-    }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Degrade, DeletesByTidWhateverElseTheRecordHolds)
-{
-    insertToken("5");
-    Json::Value jToken = json(R"({"count":1,"tid":"t"})");
-
-    EXPECT_EQ(0, api().tokenCountDegrade(jToken));
-    EXPECT_EQ("", stored());
-    // A token that has gone already is no failure.
-    EXPECT_EQ(0, api().tokenCountDegrade(jToken));
-
-    EXPECT_EQ(json(R"({"count":1,"tid":"t"})"), jToken);
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Degrade, LetsTheExceptionOfACountThatIsNoNumberPass)
-{
-    for (const char* szRecord :
-         {R"({"count":"2","tid":"t"})", R"({"count":18446744073709551615,"tid":"t"})"}) {
-        Json::Value jToken = json(szRecord);
-
-        EXPECT_THROW(api().tokenCountDegrade(jToken), Json::LogicError);
-
-        EXPECT_EQ(json(szRecord), jToken);
-    }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
 }
 
 } // namespace

@@ -6,6 +6,7 @@
 
 #include "AccessTokenApi.h"
 #include "AccessTokenUtil.h"
+#include "Statements.h"
 #include "StoreTest.h"
 #include "internal/AccessTokenDbApi.h"
 
@@ -32,13 +33,9 @@ extern "C" void openlog(const char*, int, int)
 namespace {
 
 // Logs as the library does when nobody has said anything.
-class Unswitched : public ::testing::Test {
+class Unswitched : public SeamTest {
 protected:
-    void SetUp() override
-    {
-        seam() = Seam();
-        errno = 0;
-    }
+    Unswitched() : SeamTest(Destination::Syslog) {}
 };
 
 class Switch : public Unswitched {
@@ -54,7 +51,7 @@ protected:
         EXPECT_TRUE(pGet());
         EXPECT_TRUE(pSwitch(true));
         EXPECT_FALSE(pGetOther());
-        EXPECT_EQ((std::vector<std::string>{}), seam().calls);
+        EXPECT_EQ(Texts{}, seam().calls);
     }
 };
 
@@ -71,7 +68,7 @@ TEST_F(Switch, DebugInfoNeverGoesOff)
 // What one call logs at each destination and errno.
 struct Setting {
     const char* szTestName;
-    bool blStdout;
+    Destination destination;
     int nErrno;
 };
 
@@ -80,23 +77,19 @@ std::ostream& operator<<(std::ostream& stream, const Setting& setting)
     return stream << setting.szTestName;
 }
 
-class LineForm : public Unswitched, public ::testing::WithParamInterface<Setting> {
+class LineForm : public SeamTest, public ::testing::WithParamInterface<Setting> {
 protected:
+    LineForm() : SeamTest(GetParam().destination) {}
+
     void SetUp() override
     {
-        logToStdout(GetParam().blStdout);
-        Unswitched::SetUp();
+        SeamTest::SetUp();
         errno = GetParam().nErrno;
-    }
-
-    Destination destination() const
-    {
-        return GetParam().blStdout ? Destination::Stdout : Destination::Syslog;
     }
 
     std::string line(const std::string& strLocation, const std::string& strMessage) const
     {
-        const bool blErrno = !GetParam().blStdout && 0 != GetParam().nErrno;
+        const bool blErrno = Destination::Syslog == destination() && 0 != GetParam().nErrno;
         return strLocation + " " + (blErrno ? "(" + errorText() + ")" : "") + strMessage;
     }
 
@@ -104,9 +97,9 @@ protected:
     void expectLine(const std::string& strLocation, const std::string& strMessage)
     {
         EXPECT_EQ(GetParam().nErrno, errno);
-        EXPECT_EQ((std::vector<std::string>{GetParam().blStdout ? "printf" : "syslog 3"}),
+        EXPECT_EQ((Texts{Destination::Stdout == destination() ? "printf" : "syslog 3"}),
                   seam().callsOf({"printf", "syslog"}));
-        EXPECT_EQ((std::vector<std::string>{line(strLocation, strMessage)}), takeLines(destination()));
+        EXPECT_EQ((Texts{line(strLocation, strMessage)}), takeLines(destination()));
         EXPECT_FALSE(g_blOpenlog);
     }
 
@@ -114,11 +107,11 @@ protected:
 };
 
 INSTANTIATE_TEST_SUITE_P(Settings, LineForm,
-                         ::testing::Values(Setting{"StdoutWithoutErrno", true, 0},
-                                           Setting{"StdoutWithErrno", true, EACCES},
-                                           Setting{"SyslogWithoutErrno", false, 0},
-                                           Setting{"SyslogWithErrno", false, EACCES},
-                                           Setting{"SyslogWithUnknownErrno", false, 4095}),
+                         ::testing::Values(Setting{"StdoutWithoutErrno", Destination::Stdout, 0},
+                                           Setting{"StdoutWithErrno", Destination::Stdout, EACCES},
+                                           Setting{"SyslogWithoutErrno", Destination::Syslog, 0},
+                                           Setting{"SyslogWithErrno", Destination::Syslog, EACCES},
+                                           Setting{"SyslogWithUnknownErrno", Destination::Syslog, 4095}),
                          [](const auto& testInfo) { return testInfo.param.szTestName; });
 
 TEST_P(LineForm, OfAnOrdinaryLine)
@@ -181,7 +174,7 @@ TEST_P(LineForm, OfNothingForADebugLineWithoutDebug)
     EXPECT_EQ(-1, checkPermission(jToken, "Other", "get"));
 
     EXPECT_EQ(GetParam().nErrno, errno);
-    EXPECT_EQ((std::vector<std::string>{}), seam().calls);
+    EXPECT_EQ(Texts{}, seam().calls);
 }
 
 TEST_P(LineForm, HoldsTextOfCallersAsItIs)
@@ -191,9 +184,8 @@ TEST_P(LineForm, HoldsTextOfCallersAsItIs)
 
     EXPECT_EQ(-1, checkPermission(jToken, "%m %n\n%s", "get"));
 
-    EXPECT_EQ((std::vector<std::string>{
-                  line("util.cpp:#", "webapi=%m %n\n%s not in allow list, jToken={\"webapi_allow\":{}}\n"),
-                  line("util.cpp:#", "jToken={\"webapi_allow\":{}}\n")}),
+    EXPECT_EQ((Texts{line("util.cpp:#", "webapi=%m %n\n%s not in allow list, jToken={\"webapi_allow\":{}}\n"),
+                     line("util.cpp:#", "jToken={\"webapi_allow\":{}}\n")}),
               takeLines(destination()));
 }
 
@@ -207,7 +199,7 @@ TEST_F(Unswitched, LinesMoveToStdoutFromTheMomentOfTheSwitch)
     logToStdout(false);
     fillDefaultValue(jToken, true);
 
-    EXPECT_EQ((std::vector<std::string>{"syslog 3", "printf", "printf"}), seam().calls);
+    EXPECT_EQ((Texts{"syslog 3", "printf", "printf"}), seam().calls);
 }
 
 TEST_F(Unswitched, DebugLinesStartAtTheMomentOfTheSwitch)
@@ -215,35 +207,21 @@ TEST_F(Unswitched, DebugLinesStartAtTheMomentOfTheSwitch)
     Json::Value jToken = json(R"({"webapi_allow":{}})");
 
     checkPermission(jToken, "Api", "get");
-    EXPECT_EQ((std::vector<std::string>{}), seam().calls);
+    EXPECT_EQ(Texts{}, seam().calls);
     debugInfo(true);
     checkPermission(jToken, "Api", "get");
     debugInfo(false);
     checkPermission(jToken, "Api", "get");
 
-    EXPECT_EQ((std::vector<std::string>{"syslog 3", "syslog 3", "syslog 3", "syslog 3"}), seam().calls);
+    EXPECT_EQ((Texts{"syslog 3", "syslog 3", "syslog 3", "syslog 3"}), seam().calls);
 }
 
 // One failure that several functions report on its way up. Writing to the system log leaves an errno
 // of its own behind (the seam's does), which must not show in the lines that follow.
-class FailureOnItsWayUp : public Unswitched {
-protected:
-    static std::string systemFailure(const std::string& strFile, const std::string& strMessage, int nErrno)
-    {
-        const std::string strError = strerror(nErrno);
-        return ordinary(strFile, "(" + strFile + ":#)(" + strError + ")" + strMessage + "\n", nErrno);
-    }
-
-    static std::string systemFailed(const std::string& strFile, const std::string& strCondition, int nErrno)
-    {
-        return systemFailure(strFile, "Failed [" + strCondition + "], err=" + strerror(nErrno), nErrno);
-    }
-};
+class FailureOnItsWayUp : public Unswitched {};
 
 TEST_F(FailureOnItsWayUp, TellsOneErrnoInEveryLine)
 {
-    const char* const DB = "AccessTokenSqlite.cpp";
-    const char* const API = "AccessTokenApi.cpp";
     const std::string strTid = tid("a");
     const std::string strRecord = R"({"count":1,"tid":")" + strTid + "\"}";
     Json::Value jToken = json(strRecord);
@@ -255,44 +233,33 @@ TEST_F(FailureOnItsWayUp, TellsOneErrnoInEveryLine)
 
     EXPECT_EQ(-1, api.tokenCountDegrade(jToken));
 
-    EXPECT_EQ((std::vector<std::string>{
-                  systemFailed(DB, "0 > seteuid(0)", EPERM), systemFailed(DB, "0 > initDb()", EPERM),
-                  systemFailed(DB, "0 > (err = runSql())", EPERM),
-                  systemFailed(API, "0 > (err = m_pDb->tokenDelete(jParam))", EPERM),
-                  ordinary(API, "tokenDeleteByArray failed, name=tid, strVector=" + strTid, EPERM),
-                  systemFailed(API, "0 > (err = tokenDeleteByArray(strVector, szName))", EPERM),
-                  ordinary(API, "tokenDeleteByName failed, name=tid, strValue=" + strTid, EPERM),
-                  systemFailed(API, "0 > tokenDeleteByTid(strTid)", EPERM),
-                  ordinary(API, "tokenCountDegrade failed, jToken=" + strRecord, EPERM)}),
-              takeLines(Destination::Syslog));
-    EXPECT_EQ(std::vector<std::string>(10, "syslog 3"), seam().callsOf({"syslog", "printf"}));
+    const Texts lines = {failed(STORE, "0 > (err = runSql())", EPERM),
+                         failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))", EPERM),
+                         ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=" + strTid),
+                         failed(SERVICE, "0 > (err = tokenDeleteByArray(strVector, szName))", EPERM),
+                         ordinary(SERVICE, "tokenDeleteByName failed, name=tid, strValue=" + strTid),
+                         failed(SERVICE, "0 > tokenDeleteByTid(strTid)", EPERM),
+                         ordinary(SERVICE, "tokenCountDegrade failed, jToken=" + strRecord)};
+    EXPECT_EQ(inSystemLog(NOT_OPENED + lines, EPERM), takeLines(Destination::Syslog));
+    EXPECT_EQ(Texts(10, "syslog 3"), seam().callsOf({"syslog", "printf"}));
     EXPECT_EQ(EPERM, errno);
 }
 
 // SQLite reports by its error text, and errno is whatever it left, zero included.
 TEST_F(FailureOnItsWayUp, TellsTheErrnoThatSqliteLeft)
 {
-    const char* const DB = "AccessTokenSqlite.cpp";
-    const std::string strSql = "DELETE FROM token where deadline < strftime('%s', 'now');";
     AccessTokenDbApi db;
     ASSERT_EQ(SQLITE_OK, sqlite3_open(":memory:", &db.m_pDb));
 
     for (const int nErrno : {0, EIO, 0}) {
         SCOPED_TRACE(nErrno);
-        seam().sqliteExec = [nErrno](sqlite3*, const char*, int (*)(void*, int, char**, char**), void*,
-                                     char** pszError) {
-            *pszError = sqlite3_mprintf("disk I/O error");
-            errno = nErrno;
-            return SQLITE_IOERR;
-        };
+        failStatements(PURGE, {SQLITE_IOERR, "disk I/O error", nErrno});
 
         EXPECT_EQ(-1, db.cleanExpireToken(true));
 
-        EXPECT_EQ((std::vector<std::string>{
-                      ordinary(DB, "i=0,run sql failed, error=disk I/O error, sql=" + strSql, nErrno),
-                      systemFailure(DB, "run sql failed, sql=" + strSql, nErrno),
-                      systemFailure(DB, "run sql failed", nErrno)}),
-                  takeLines(Destination::Syslog));
+        const Texts lines =
+            failureOf(PURGE, "disk I/O error", nErrno) + Texts{fail(STORE, "run sql failed", nErrno)};
+        EXPECT_EQ(inSystemLog(lines, nErrno), takeLines(Destination::Syslog));
         EXPECT_EQ(nErrno, errno);
     }
 }

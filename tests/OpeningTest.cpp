@@ -6,6 +6,7 @@
 #include <fstream>
 
 #include "BothLogs.h"
+#include "Statements.h"
 
 namespace {
 
@@ -39,7 +40,7 @@ void danglingLink(const std::string& strPath)
 
 void fullDisk(const std::string&)
 {
-    answer({{SQLITE_FULL, "database or disk is full"}});
+    failStatements(SCHEMA, {SQLITE_FULL, "database or disk is full"});
 }
 
 void unknownUid(const std::string&)

@@ -10,7 +10,6 @@ namespace {
 using VEMO_ACCESS_TOKEN::checkPermission;
 using VEMO_ACCESS_TOKEN::debugInfo;
 
-const char* const FILE_NAME = "util.cpp";
 const char* const NO_OBJECT = "jToken.type() != Json::objectValue";
 const char* const NO_NAME = "!szWebapiName || !szWebapiName[0]";
 const char* const NO_ALLOW = "!jToken.isMember(\"webapi_allow\")";
@@ -97,7 +96,7 @@ const std::vector<Case> CASES = {
 
 class Permission : public SeamTest, public ::testing::WithParamInterface<Case> {
 protected:
-    void check(const std::vector<std::string>& expectedLines)
+    void check(const Texts& expectedLines)
     {
         const Case& testCase = GetParam();
         Json::Value jToken = json(testCase.szRecord);
@@ -108,11 +107,11 @@ protected:
         EXPECT_EQ(json(testCase.szRecord), jToken);
     }
 
-    std::vector<std::string> failureLines() const
+    Texts failureLines() const
     {
-        std::vector<std::string> lines;
+        Texts lines;
         if (GetParam().szCondition) {
-            lines.push_back(failed(FILE_NAME, GetParam().szCondition));
+            lines.push_back(failed(UTIL, GetParam().szCondition));
         }
         return lines;
     }
@@ -129,17 +128,17 @@ TEST_P(Permission, IsDecided)
 TEST_P(Permission, IsDecidedAndExplainedInDebugMode)
 {
     const Case& testCase = GetParam();
-    std::vector<std::string> expected = failureLines();
+    Texts expected = failureLines();
     if (0 == testCase.nResult) {
-        expected.push_back(ordinary(FILE_NAME, std::string("webapi=") + testCase.szApi +
-                                                   " , method=" + testCase.szMethod +
-                                                   ", not in allow list, jToken=" + testCase.szRecord));
+        expected.push_back(ordinary(UTIL, std::string("webapi=") + testCase.szApi +
+                                              " , method=" + testCase.szMethod +
+                                              ", not in allow list, jToken=" + testCase.szRecord));
     } else if (-1 == testCase.nResult) {
         if (!testCase.szCondition) {
-            expected.push_back(ordinary(FILE_NAME, std::string("webapi=") + testCase.szApi +
-                                                       " not in allow list, jToken=" + testCase.szRecord));
+            expected.push_back(ordinary(UTIL, std::string("webapi=") + testCase.szApi +
+                                                  " not in allow list, jToken=" + testCase.szRecord));
         }
-        expected.push_back(ordinary(FILE_NAME, std::string("jToken=") + testCase.szRecord));
+        expected.push_back(ordinary(UTIL, std::string("jToken=") + testCase.szRecord));
     }
     debugInfo(true);
 
@@ -156,7 +155,7 @@ TEST_F(PermissionRecord, ElementsAreReadAsTextUpToTheMatch)
     EXPECT_EQ(1, checkPermission(jToken, "Api", "5"));
     EXPECT_EQ(1, checkPermission(jToken, "Api", "get"));
     EXPECT_THROW(checkPermission(jToken, "Api", "set"), Json::LogicError);
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(PermissionRecord, NothingButWebapiAllowIsLookedAt)
@@ -177,7 +176,7 @@ TEST_F(PermissionRecord, FailureTellsErrno)
     EXPECT_EQ(-1, checkPermission(jToken, "Api", "get"));
 
     EXPECT_EQ(EACCES, errno);
-    EXPECT_EQ((std::vector<std::string>{failed(FILE_NAME, NO_ALLOW, EACCES)}), takeLines());
+    EXPECT_EQ((Texts{failed(UTIL, NO_ALLOW, EACCES)}), takeLines());
 }
 
 TEST_F(PermissionRecord, NamesAreNoFormats)
@@ -189,10 +188,9 @@ TEST_F(PermissionRecord, NamesAreNoFormats)
     EXPECT_EQ(-1, checkPermission(jToken, "%s%n", "%m"));
     EXPECT_EQ(0, checkPermission(jToken, "%n", "%m"));
 
-    EXPECT_EQ((std::vector<std::string>{
-                  ordinary(FILE_NAME, "webapi=%s%n not in allow list, jToken=" + strRecord),
-                  ordinary(FILE_NAME, "jToken=" + strRecord),
-                  ordinary(FILE_NAME, "webapi=%n , method=%m, not in allow list, jToken=" + strRecord)}),
+    EXPECT_EQ((Texts{ordinary(UTIL, "webapi=%s%n not in allow list, jToken=" + strRecord),
+                     ordinary(UTIL, "jToken=" + strRecord),
+                     ordinary(UTIL, "webapi=%n , method=%m, not in allow list, jToken=" + strRecord)}),
               takeLines());
 }
 

@@ -1,10 +1,9 @@
 // Purging the tokens whose deadline has passed.
 
 #include "BothLogs.h"
+#include "Statements.h"
 
 namespace {
-
-const std::string PURGE = "DELETE FROM token where deadline < strftime('%s', 'now');";
 
 class Purge : public WithSwitches {
 protected:
@@ -23,7 +22,7 @@ TEST_P(Purge, ReportsAFailure)
     say(ordinaryLine("i=0,run sql failed, error=disk I/O error, sql=" + PURGE, EIO));
     say(failLine("run sql failed, sql=" + PURGE, EIO));
     sayIfAsked(failLine("run sql failed", EIO));
-    answer({{SQLITE_IOERR, "disk I/O error"}});
+    failStatements(PURGE, DISK_ERROR);
 
     EXPECT_EQ(-1, m_db.cleanExpireToken(theCase().blLog));
 
@@ -37,9 +36,9 @@ TEST_P(Purge, ReportsALockThatWasWaitedOut)
     sayInDebug(ordinaryLine("run sql=" + PURGE, 0));
     sayInDebug(ordinaryLine("i=0,run sql failed, error=database is locked, sql=" + PURGE, EIO));
     sayInDebug(ordinaryLine("run sql=" + PURGE, EIO));
-    sayInDebug(ordinaryLine("change rv=1, run sql=" + PURGE, 0));
-    sayIfAsked(failLine("sql error, sql=" + PURGE, 0));
-    answer({{SQLITE_BUSY, "database is locked"}, {SQLITE_OK, nullptr}});
+    sayInDebug(ordinaryLine("change rv=1, run sql=" + PURGE, EIO));
+    sayIfAsked(failLine("sql error, sql=" + PURGE, EIO));
+    failStatements(PURGE, LOCKED);
 
     EXPECT_EQ(-1, m_db.cleanExpireToken(theCase().blLog));
 
@@ -54,7 +53,6 @@ TEST_P(Purge, ReturnsNoNumber)
 {
     sayInDebug(ordinaryLine("run sql=" + PURGE, 0));
     sayInDebug(ordinaryLine("change rv=1, run sql=" + PURGE, 0));
-    answer({{SQLITE_OK, nullptr}});
     m_db.m_strErr = "stale";
 
     EXPECT_EQ(0, m_db.cleanExpireToken(theCase().blLog));
@@ -93,7 +91,7 @@ TEST_F(PurgeByDeadline, TakesDeadlinesBeforeNow)
         const Texts kept = {"NULL", strNow, strNow, strAfter, "9223372036854775807", "'never'"};
         EXPECT_EQ(kept, query("SELECT quote(deadline) FROM token ORDER BY rowid"));
         EXPECT_EQ(0, db.cleanExpireToken(true)); // with none to delete
-        EXPECT_EQ(NOTHING, takeLines());
+        EXPECT_EQ(Texts{}, takeLines());
     }
 }
 

@@ -1,169 +1,14 @@
-// Querying and deleting tokens.
+// Reading tokens of the store.
 
-#include <dlfcn.h>
-
-#include <cerrno>
-#include <cstring>
-#include <utility>
-
+#include "QueryTest.h"
 #include "AccessTokenUtil.h"
-#include "StoreTest.h"
-#include "internal/AccessTokenDbApi.h"
+#include "StandIns.h"
+#include "Statements.h"
 
 namespace {
-
-// SqlExpandMemberName cannot fail by itself. While the switch is set, it does.
-bool g_blExpandFails = false;
-
-} // namespace
-
-int AccessTokenDbApi::SqlExpandMemberName(std::string& strSql)
-{
-    typedef int (*Function)(AccessTokenDbApi*, std::string&);
-    static const Function pNext = reinterpret_cast<Function>(
-        dlsym(RTLD_NEXT, "_ZN16AccessTokenDbApi19SqlExpandMemberNameERNSt7__cxx1112basic_"
-                         "stringIcSt11char_traitsIcESaIcEEE"));
-    return g_blExpandFails ? -1 : pNext(this, strSql);
-}
-
-namespace {
-
-const char* const FILE_NAME = "AccessTokenSqlite.cpp";
-const std::string SELECT = std::string("SELECT ") + COLUMNS + " FROM token ";
-const std::string RUN_QUERY_FAILED = "0 > runSql(FillList, &jTokenArrayOut)";
-const std::string RUN_DELETE_FAILED = "0 > (err = runSql())";
-const std::string WHERE_FAILED = "0 > SqlWhereFromJson(jTokenParam, strSql, true)";
-
-typedef std::vector<std::string> Texts;
-
-// What a row's callback is wrapped in.
-struct Callback {
-    int (*pFunction)(void*, int, char**, char**);
-    void* pArgument;
-    int nErrno;
-};
-
-int callWithErrno(void* pCallback, int nColumns, char** szValues, char** szNames)
-{
-    const Callback& callback = *static_cast<Callback*>(pCallback);
-    errno = callback.nErrno;
-    return callback.pFunction(callback.pArgument, nColumns, szValues, szNames);
-}
-
-class QueryTest : public StoreTest {
-protected:
-    void SetUp() override
-    {
-        StoreTest::SetUp();
-        // SQLite leaves some errno of its file's calls; here every line finds this one.
-        seam().sqliteExec = [this](sqlite3* pDb, const char* szSql,
-                                   int (*pFunction)(void*, int, char**, char**), void* pArgument,
-                                   char** pszError) {
-            Callback callback = {pFunction, pArgument, m_nErrno};
-            const int nResult =
-                sqlite3_exec(pDb, szSql, pFunction ? callWithErrno : nullptr, &callback, pszError);
-            errno = m_nErrno;
-            return nResult;
-        };
-    }
-
-    // Three tokens: Ab12 and Cd34 of user 1024, Ef56 of user 7.
-    void fill() const
-    {
-        makeDatabase();
-        query("DELETE FROM token");
-        insert("Ab12", "'S1',1024,4000000000,1,100,'VPN','{}','{\"a\":\"it''s\"}'");
-        insert("Cd34", "'S2',1024,4000000000,-1,300,'VPN','{\"api\":{\"method\":[\"get\"]}}','{}'");
-        insert("Ef56", "'S1',7,4000000000,5,200,'FTP','{}','{}'");
-    }
-
-    // The operations, given their filter as text.
-    int get(const std::string& strFilter) { return get(strFilter, m_jOut = Json::Value()); }
-    int get(const std::string& strFilter, Json::Value& jOut)
-    {
-        return keeps(strFilter, [&](Json::Value& jFilter) { return m_db.tokenGet(jFilter, jOut); });
-    }
-    int remove(const std::string& strFilter, bool bAll = false)
-    {
-        return keeps(strFilter, [&](Json::Value& jFilter) { return m_db.tokenDelete(jFilter, bAll); });
-    }
-    int getOne(const char* szName, std::string strValue)
-    {
-        const std::string strCopy = strValue;
-        m_jOut = json(R"({"old":1})");
-        errno = m_nErrno;
-        const int nResult = m_db.tokenGetOne(szName, strValue, m_jOut);
-        EXPECT_EQ(strCopy, strValue);
-        return nResult;
-    }
-
-    // The ids in m_jOut, and those in the table, each followed by a blank.
-    std::string found() const
-    {
-        std::string strIds;
-        for (const Json::Value& jToken : m_jOut) {
-            strIds += jToken["tid"].asString() + " ";
-        }
-        return strIds;
-    }
-    std::string left() const
-    {
-        std::string strIds;
-        for (const std::string& strTid : query("SELECT tid FROM token ORDER BY rowid")) {
-            strIds += strTid + " ";
-        }
-        return strIds;
-    }
-
-    // The lines of a statement that SQLite refuses.
-    Texts refused(const std::string& strError, const std::string& strSql, const std::string& strCondition)
-    {
-        return {ordinary(FILE_NAME, "i=0,run sql failed, error=" + strError + ", sql=" + strSql),
-                fail(FILE_NAME, "run sql failed, sql=" + strSql, m_nErrno),
-                failed(FILE_NAME, strCondition, m_nErrno)};
-    }
-
-    // Locks the database over a connection of its own; the library's second wait ends the lock.
-    void lockForTwoTries()
-    {
-        ASSERT_EQ(SQLITE_OK, sqlite3_open(path().c_str(), &m_pOther));
-        ASSERT_EQ(SQLITE_OK, sqlite3_exec(m_pOther, "BEGIN EXCLUSIVE", nullptr, nullptr, nullptr));
-        seam().sleep = [this](useconds_t) {
-            if (2 == seam().callsOf({"usleep"}).size()) {
-                EXPECT_EQ(SQLITE_OK, sqlite3_close(std::exchange(m_pOther, nullptr)));
-            }
-            return 0;
-        };
-    }
-
-    void TearDown() override
-    {
-        sqlite3_close(m_pOther);
-        m_db.freeDb();
-        StoreTest::TearDown();
-    }
-
-    AccessTokenDbApi m_db;
-    Json::Value m_jOut;
-    int m_nErrno = 0;
-
-private:
-    template <typename Operation>
-    int keeps(const std::string& strFilter, Operation operation)
-    {
-        Json::Value jFilter = json(strFilter);
-        errno = m_nErrno;
-        const int nResult = operation(jFilter);
-        EXPECT_EQ(json(strFilter), jFilter);
-        return nResult;
-    }
-
-    sqlite3* m_pOther = nullptr;
-};
 
 class Query : public QueryTest {};
 class QueryOne : public QueryTest {};
-class QueryDelete : public QueryTest {};
 
 TEST_F(Query, RunsTheStatementThatTheFilterMakes)
 {
@@ -313,12 +158,12 @@ TEST_F(Query, RefusesWhatItCannotUseAndRunsNothing)
         m_jOut = json(row.szOut);
         EXPECT_EQ(-1, get(row.szFilter, m_jOut));
         EXPECT_EQ(json(row.szOut), m_jOut);
-        EXPECT_EQ((Texts{failed(FILE_NAME, row.strCondition)}), takeLines());
+        EXPECT_EQ((Texts{failed(STORE, row.strCondition)}), takeLines());
     }
     for (const char* szFilter : {"null", "[1,2]", R"("x")", "5", "true"}) {
         SCOPED_TRACE(szFilter);
         EXPECT_EQ(-1, remove(szFilter, true));
-        EXPECT_EQ((Texts{failed(FILE_NAME, NO_FILTER)}), takeLines());
+        EXPECT_EQ((Texts{failed(STORE, NO_FILTER)}), takeLines());
     }
     EXPECT_EQ("earlier", m_db.m_strSql);
     EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
@@ -326,19 +171,19 @@ TEST_F(Query, RefusesWhatItCannotUseAndRunsNothing)
 
 TEST_F(Query, PassesOnTheFailuresOfTheFilter)
 {
-    const std::string OBJECT_LINE = fail(FILE_NAME, "err input type, jTokenParam=(null)");
+    const std::string OBJECT_LINE = fail(STORE, "err input type, jTokenParam=(null)");
 
     m_db.m_strSql = "earlier";
     EXPECT_EQ(-1, get(R"({"tid":{"a":1}})"));
-    EXPECT_EQ((Texts{OBJECT_LINE, failed(FILE_NAME, WHERE_FAILED)}), takeLines());
+    EXPECT_EQ((Texts{OBJECT_LINE, failed(STORE, WHERE_FAILED)}), takeLines());
     EXPECT_EQ(-1, remove(R"({"tid":{"a":1}})", true));
-    EXPECT_EQ((Texts{OBJECT_LINE, failed(FILE_NAME, WHERE_FAILED)}), takeLines());
+    EXPECT_EQ((Texts{OBJECT_LINE, failed(STORE, WHERE_FAILED)}), takeLines());
 
     // The text of the field is the first, that of the order the second.
     seam().fail("sqlite3_mprintf", ENOMEM, 2, 2);
     EXPECT_EQ(-1, get(R"({"uid":7,"sort_by":"uid"})"));
-    EXPECT_EQ((Texts{failed(FILE_NAME, "!szSql", ENOMEM),
-                     failed(FILE_NAME, "0 > SqlFilterConditionFromJson(jTokenParam, strSql)", ENOMEM)}),
+    EXPECT_EQ((Texts{failed(STORE, "!szSql", ENOMEM),
+                     failed(STORE, "0 > SqlFilterConditionFromJson(jTokenParam, strSql)", ENOMEM)}),
               takeLines());
 
     EXPECT_THROW(get(R"({"sort_by":5})"), Json::Exception);
@@ -352,16 +197,12 @@ TEST_F(Query, PassesOnTheFailuresOfTheFilter)
 
 TEST_F(Query, FailsWithoutItsColumns)
 {
-#ifdef __clang__
-    GTEST_SKIP() << "clang sees that the column list never fails and leaves its check out";
-#endif
+    SKIP_WITHOUT_INTERPOSITION();
     fill();
-    g_blExpandFails = true;
+    standIns().sqlExpandMemberName = [](std::string&) { return -1; };
     m_db.m_strSql = "earlier";
-    const int nResult = get("{}");
-    g_blExpandFails = false;
-    EXPECT_EQ(-1, nResult);
-    EXPECT_EQ((Texts{failed(FILE_NAME, "0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)")}), takeLines());
+    EXPECT_EQ(-1, get("{}"));
+    EXPECT_EQ((Texts{failed(STORE, "0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)")}), takeLines());
     EXPECT_EQ("earlier", m_db.m_strSql);
 }
 
@@ -371,17 +212,14 @@ TEST_F(Query, KeepsTheRowsBeforeOneThatCannotBeDecoded)
     query("UPDATE token SET extra = NULL WHERE tid = 'Cd34'");
     for (const int nErrno : {0, EIO}) {
         m_nErrno = nErrno;
-        Texts expected = {
-            failed(FILE_NAME, "NULL == column_name[i] || NULL == column_value[i]", nErrno),
-            failed(FILE_NAME, "0 > FillToken(&jTmp, n_column, column_value, column_name)", nErrno)};
-        for (const std::string& strLine :
-             refused(sqlite3_errstr(SQLITE_ABORT), SELECT + ";", RUN_QUERY_FAILED)) {
-            expected.push_back(strLine);
-        }
+        const Texts decoding = {
+            failed(STORE, "NULL == column_name[i] || NULL == column_value[i]", nErrno),
+            failed(STORE, "0 > FillToken(&jTmp, n_column, column_value, column_name)", nErrno)};
         EXPECT_EQ(-1, get("{}"));
         EXPECT_EQ("Ab12 ", found());
         EXPECT_EQ(sqlite3_errstr(SQLITE_ABORT), m_db.m_strErr);
-        EXPECT_EQ(expected, takeLines());
+        EXPECT_EQ(decoding + refused(sqlite3_errstr(SQLITE_ABORT), SELECT + ";", RUN_QUERY_FAILED),
+                  takeLines());
     }
 
     EXPECT_EQ(-1, getOne("tid", "Cd34"));
@@ -400,159 +238,35 @@ TEST_F(Query, OpensTheDatabaseOnceAndWhenItIsNeeded)
 
 TEST_F(Query, FailsWhereTheDatabaseCannotBeOpened)
 {
-    const Texts opening = {failed(FILE_NAME, "0 > seteuid(0)", EPERM),
-                           failed(FILE_NAME, "0 > initDb()", EPERM)};
+    const Texts reading = NOT_OPENED + Texts{failed(STORE, RUN_QUERY_FAILED, EPERM)};
     seam().fail("seteuid", EPERM, 1, 99);
 
     EXPECT_EQ(-1, get(R"({"uid":7})"));
-    Texts expected = opening;
-    expected.push_back(failed(FILE_NAME, RUN_QUERY_FAILED, EPERM));
-    EXPECT_EQ(expected, takeLines());
+    EXPECT_EQ(reading, takeLines());
     EXPECT_EQ(SELECT + " WHERE  (uid=7 );", m_db.m_strSql);
 
     EXPECT_EQ(-1, getOne("uid", "8"));
-    expected.push_back(failed(FILE_NAME, "0 > tokenGet(jParam, jTokenArray)", EPERM));
-    EXPECT_EQ(expected, takeLines());
+    EXPECT_EQ(reading + Texts{failed(STORE, "0 > tokenGet(jParam, jTokenArray)", EPERM)}, takeLines());
     EXPECT_EQ(json("{}"), m_jOut);
     EXPECT_EQ(SELECT + " WHERE  (uid=8 );", m_db.m_strSql);
 
     EXPECT_EQ(-1, remove(R"({"uid":9})"));
-    expected = opening;
-    expected.push_back(failed(FILE_NAME, RUN_DELETE_FAILED, EPERM));
-    EXPECT_EQ(expected, takeLines());
+    EXPECT_EQ(NOT_OPENED + Texts{failed(STORE, RUN_DELETE_FAILED, EPERM)}, takeLines());
     EXPECT_EQ("DELETE FROM token WHERE  (uid=9 );", m_db.m_strSql);
 }
 
 TEST_F(Query, ReportsFailureAfterALockThatItWaitedOut)
 {
     fill();
-    lockForTwoTries();
+    const Lock lock(path(), 2);
     EXPECT_EQ(-1, get(R"({"uid":1024})"));
     EXPECT_EQ("Ab12 Cd34 ", found());
     EXPECT_EQ("database is locked", m_db.m_strErr);
     EXPECT_EQ((Texts{"usleep 10000", "usleep 10000"}), seam().callsOf({"usleep"}));
-    EXPECT_EQ((Texts{fail(FILE_NAME, "sql error, sql=" + SELECT + " WHERE  (uid=1024 );")}), takeLines());
+    EXPECT_EQ((Texts{fail(STORE, "sql error, sql=" + SELECT + " WHERE  (uid=1024 );")}), takeLines());
 
     EXPECT_EQ(0, get(R"({"uid":1024})"));
     EXPECT_EQ("", m_db.m_strErr);
-}
-
-TEST_F(QueryDelete, DeletesAfterALockThatItWaitedOutAndReportsFailure)
-{
-    for (const int nErrno : {0, EIO}) {
-        seam().calls.clear();
-        m_nErrno = nErrno;
-        fill();
-        lockForTwoTries();
-        EXPECT_EQ(-1, remove(R"({"uid":1024})"));
-        EXPECT_EQ("Ef56 ", left());
-        EXPECT_EQ("database is locked", m_db.m_strErr);
-        EXPECT_EQ((Texts{fail(FILE_NAME, "sql error, sql=DELETE FROM token WHERE  (uid=1024 );", nErrno)}),
-                  takeLines());
-    }
-}
-
-TEST_F(QueryDelete, TracesEachTryInDebugMode)
-{
-    const std::string SQL = "DELETE FROM token WHERE  (uid=1024 );";
-    const std::string RUN = ordinary(FILE_NAME, "run sql=" + SQL);
-    fill();
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    lockForTwoTries();
-
-    EXPECT_EQ(-1, remove(R"({"uid":1024})"));
-
-    EXPECT_EQ(
-        (Texts{RUN, ordinary(FILE_NAME, "i=0,run sql failed, error=database is locked, sql=" + SQL), RUN,
-               ordinary(FILE_NAME, "i=1,run sql failed, error=database is locked, sql=" + SQL), RUN,
-               ordinary(FILE_NAME, "change rv=2, run sql=" + SQL), fail(FILE_NAME, "sql error, sql=" + SQL)}),
-        takeLines());
-}
-
-TEST_F(QueryDelete, GivesUpOnALockThatLasts)
-{
-    const std::string SQL = "DELETE FROM token;";
-    fill();
-    lockForTwoTries();
-    seam().sleep = nullptr;
-
-    EXPECT_EQ(-1, remove("{}", true));
-
-    EXPECT_EQ(500u, seam().callsOf({"usleep"}).size());
-    EXPECT_EQ("database is locked", m_db.m_strErr);
-    EXPECT_EQ((Texts{ordinary(FILE_NAME, "i=500,run sql failed, error=database is locked, sql=" + SQL),
-                     fail(FILE_NAME, "run sql failed, sql=" + SQL), failed(FILE_NAME, RUN_DELETE_FAILED)}),
-              takeLines());
-}
-
-TEST_F(QueryDelete, RunsTheStatementThatTheFilterMakes)
-{
-    const struct {
-        const char* szFilter;
-        bool bAll;
-        const char* szSql;
-        int nResult;
-        const char* szLeft;
-    } rows[] = {
-        {R"({"tid":"Ab12"})", false, "DELETE FROM token WHERE  (tid='Ab12' );", 1, "Cd34 Ef56 "},
-        {R"({"bind_sid":"S1","function":"VPN"})", false,
-         "DELETE FROM token WHERE  (bind_sid='S1' and function='VPN' );", 1, "Cd34 Ef56 "},
-        {"{}", true, "DELETE FROM token;", 3, ""},
-        {"{}", false, "earlier", -1, "Ab12 Cd34 Ef56 "},
-        {R"({"limit":3})", false, "earlier", -1, "Ab12 Cd34 Ef56 "},
-        {R"({"limit":3})", true, "DELETE FROM token;", 3, ""},
-        {R"({"foo":"x"})", false, "earlier", -1, "Ab12 Cd34 Ef56 "},
-        {R"({"foo":{},"sort_by":5,"limit":"x"})", true, "DELETE FROM token;", 3, ""},
-        // A condition counts whatever bAll says; no row is no failure.
-        {R"({"uid":7})", true, "DELETE FROM token WHERE  (uid=7 );", 1, "Ab12 Cd34 "},
-        {R"({"tid":"nobody"})", false, "DELETE FROM token WHERE  (tid='nobody' );", 0, "Ab12 Cd34 Ef56 "},
-        {R"({"uid":1024,"limit":0,"offset":0,"sort_by":"uid"})", false,
-         "DELETE FROM token WHERE  (uid=1024 );", 2, "Ef56 "},
-        {R"({"tid":"' OR 1; --"})", true, "DELETE FROM token WHERE  (tid=''' OR 1; --' );", 0,
-         "Ab12 Cd34 Ef56 "},
-    };
-
-    for (const auto& row : rows) {
-        SCOPED_TRACE(std::string(row.szFilter) + (row.bAll ? " all" : ""));
-        fill();
-        m_db.m_strSql = "earlier";
-        EXPECT_EQ(row.nResult, remove(row.szFilter, row.bAll));
-        EXPECT_EQ(row.szSql, m_db.m_strSql);
-        EXPECT_EQ(row.szLeft, left());
-        EXPECT_EQ("", m_db.m_strErr);
-        EXPECT_EQ(0 > row.nResult ? Texts{failed(FILE_NAME, "strSql.empty()")} : Texts{}, takeLines());
-    }
-}
-
-TEST_F(QueryDelete, DeletesNothingWhereSqliteRefusesTheStatement)
-{
-    fill();
-    for (const bool bAll : {false, true}) {
-        const std::string strSql = "DELETE FROM token WHERE  ( );";
-        m_nErrno = bAll ? EIO : 0;
-        EXPECT_EQ(-1, remove(R"({"uid":[]})", bAll));
-        EXPECT_EQ(strSql, m_db.m_strSql);
-        EXPECT_EQ("near \")\": syntax error", m_db.m_strErr);
-        EXPECT_EQ(refused("near \")\": syntax error", strSql, RUN_DELETE_FAILED), takeLines());
-    }
-    EXPECT_EQ("Ab12 Cd34 Ef56 ", left());
-}
-
-TEST_F(QueryDelete, TellsTheNumberInDebugMode)
-{
-    fill();
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    for (const int nNumber : {2, 0}) {
-        const std::string strSql = "DELETE FROM token WHERE  (function='VPN' );";
-        EXPECT_EQ(nNumber, remove(R"({"function":"VPN"})"));
-        EXPECT_EQ((Texts{ordinary(FILE_NAME, "run sql=" + strSql),
-                         ordinary(FILE_NAME, "change rv=" + std::to_string(nNumber) + ", run sql=" + strSql),
-                         ordinary(FILE_NAME, "delete token number=" + std::to_string(nNumber))}),
-                  takeLines());
-    }
-
-    EXPECT_EQ(0, get("{}"));
-    EXPECT_EQ((Texts{ordinary(FILE_NAME, "run sql=" + SELECT + ";")}), takeLines());
 }
 
 TEST_F(QueryOne, TakesTheFirstRowWhoseFieldMatches)
@@ -614,7 +328,7 @@ TEST_F(QueryOne, RefusesEmptyNameAndEmptyValueAndRunsNothing)
     for (const auto& row : rows) {
         EXPECT_EQ(-1, getOne(row.szName, row.szValue));
         EXPECT_EQ(json(R"({"old":1})"), m_jOut);
-        EXPECT_EQ((Texts{failed(FILE_NAME, row.strCondition)}), takeLines());
+        EXPECT_EQ((Texts{failed(STORE, row.strCondition)}), takeLines());
     }
     EXPECT_EQ("earlier", m_db.m_strSql);
     EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
@@ -627,82 +341,52 @@ TEST_F(QueryOne, LeavesAnEmptyObjectAfterAFailedQuery)
     // The name of an ordering key is one as well.
     EXPECT_EQ(-1, getOne("sort_by", "uid"));
     EXPECT_EQ(json("{}"), m_jOut);
-    Texts expected = refused("near \"order\": syntax error", SQL, RUN_QUERY_FAILED);
-    expected.push_back(failed(FILE_NAME, "0 > tokenGet(jParam, jTokenArray)"));
-    EXPECT_EQ(expected, takeLines());
+    EXPECT_EQ(refused("near \"order\": syntax error", SQL, RUN_QUERY_FAILED) +
+                  Texts{failed(STORE, "0 > tokenGet(jParam, jTokenArray)")},
+              takeLines());
 
     EXPECT_THROW(getOne("limit", "0"), Json::Exception);
     EXPECT_EQ(json("{}"), m_jOut);
 
-    lockForTwoTries();
+    const Lock lock(path(), 2);
     EXPECT_EQ(-1, getOne("tid", "Ab12"));
     EXPECT_EQ(json("{}"), m_jOut);
-    EXPECT_EQ((Texts{fail(FILE_NAME, "sql error, sql=" + SELECT + " WHERE  (tid='Ab12' );"),
-                     failed(FILE_NAME, "0 > tokenGet(jParam, jTokenArray)")}),
+    EXPECT_EQ((Texts{fail(STORE, "sql error, sql=" + SELECT + " WHERE  (tid='Ab12' );"),
+                     failed(STORE, "0 > tokenGet(jParam, jTokenArray)")}),
               takeLines());
 }
 
-// The switch to standard output cannot be taken back, so this fixture never makes it.
-class QueryInSystemLog : public ::testing::Test {
+class QueryInSystemLog : public QueryTest {
 protected:
-    void SetUp() override
-    {
-        seam() = Seam();
-        ASSERT_EQ(SQLITE_OK, sqlite3_open(":memory:", &m_db.m_pDb));
-        ASSERT_EQ(0, m_db.createTable());
-    }
-
-    static std::string withError(std::string strLine, int nErrno)
-    {
-        const std::string strError = nErrno ? std::string("(") + strerror(nErrno) + ")" : "";
-        return strLine.insert(strLine.find(' ') + 1, strError);
-    }
-
-    AccessTokenDbApi m_db;
+    QueryInSystemLog() : QueryTest(Destination::Syslog) {}
 };
 
 TEST_F(QueryInSystemLog, TellsTheErrorInFrontWhenThereIsOne)
 {
     const std::string SQL = "DELETE FROM token WHERE  (uid=7 );";
     const std::string SORTED = SELECT + " WHERE  order by 'uid';";
-    const std::string SYNTAX_ERROR = "i=0,run sql failed, error=near \"order\": syntax error, sql=";
-    Json::Value jUser = json(R"({"uid":7})");
-    Json::Value jSorted = json(R"({"sort_by":"uid"})");
-    Json::Value jOut;
+    const std::string SYNTAX_ERROR = "near \"order\": syntax error";
+    makeDatabase();
+    ASSERT_EQ(0, m_db.initDb());
 
     VEMO_ACCESS_TOKEN::debugInfo(true);
     for (const int nErrno : {0, EIO}) {
-        int nTry = 0;
-        seam().sqliteExec = [&](sqlite3* pDb, const char* szSql, auto pFunction, void* pArgument,
-                                char** pszError) {
-            const bool blLocked = 1 == ++nTry;
-            const int nResult =
-                blLocked ? SQLITE_BUSY : sqlite3_exec(pDb, szSql, pFunction, pArgument, pszError);
-            if (blLocked) {
-                *pszError = sqlite3_mprintf("database is locked");
-            }
-            errno = nErrno;
-            return nResult;
-        };
-        errno = nErrno;
-        EXPECT_EQ(-1, m_db.tokenDelete(jUser, false));
-        EXPECT_EQ(0, m_db.tokenDelete(jUser, false));
-        EXPECT_EQ(-1, m_db.tokenGet(jSorted, jOut));
+        m_nErrno = nErrno;
+        failStatements("DELETE", {SQLITE_BUSY, "database is locked", nErrno});
+        EXPECT_EQ(-1, remove(R"({"uid":7})"));
+        EXPECT_EQ(0, remove(R"({"uid":7})"));
+        EXPECT_EQ(-1, get(R"({"sort_by":"uid"})"));
 
-        Texts expected;
-        for (const std::string& strLine :
-             {ordinary(FILE_NAME, "run sql=" + SQL),
-              ordinary(FILE_NAME, "i=0,run sql failed, error=database is locked, sql=" + SQL),
-              ordinary(FILE_NAME, "run sql=" + SQL), ordinary(FILE_NAME, "change rv=0, run sql=" + SQL),
-              fail(FILE_NAME, "sql error, sql=" + SQL, nErrno), ordinary(FILE_NAME, "run sql=" + SQL),
-              ordinary(FILE_NAME, "change rv=0, run sql=" + SQL),
-              ordinary(FILE_NAME, "delete token number=0"), ordinary(FILE_NAME, "run sql=" + SORTED),
-              ordinary(FILE_NAME, SYNTAX_ERROR + SORTED),
-              fail(FILE_NAME, "run sql failed, sql=" + SORTED, nErrno),
-              failed(FILE_NAME, RUN_QUERY_FAILED, nErrno)}) {
-            expected.push_back(withError(strLine, nErrno));
-        }
-        EXPECT_EQ(expected, takeLines(Destination::Syslog));
+        EXPECT_EQ(inSystemLog(
+                      Texts{ordinary(STORE, "run sql=" + SQL),
+                            ordinary(STORE, "i=0,run sql failed, error=database is locked, sql=" + SQL),
+                            ordinary(STORE, "run sql=" + SQL), ordinary(STORE, "change rv=0, run sql=" + SQL),
+                            fail(STORE, "sql error, sql=" + SQL, nErrno), ordinary(STORE, "run sql=" + SQL),
+                            ordinary(STORE, "change rv=0, run sql=" + SQL),
+                            ordinary(STORE, "delete token number=0"), ordinary(STORE, "run sql=" + SORTED)} +
+                          refused(SYNTAX_ERROR, SORTED, RUN_QUERY_FAILED),
+                      nErrno),
+                  takeLines(Destination::Syslog));
     }
 }
 

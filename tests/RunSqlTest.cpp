@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include "BothLogs.h"
+#include "Statements.h"
 
 namespace {
 
@@ -25,7 +26,7 @@ TEST_F(RunSql, FirstStatementOpens)
                      CHANGES}),
               seam().callsOf(OPENING_CALLS));
     EXPECT_EQ(UPDATE, db.m_strSql);
-    EXPECT_EQ(NOTHING, takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(RunSql, NeverOpensAsRunSqlEx)
@@ -38,7 +39,7 @@ TEST_F(RunSql, NeverOpensAsRunSqlEx)
     EXPECT_EQ(UNKNOWN, db.m_strErr);
     EXPECT_EQ("", db.m_strSql);
     EXPECT_EQ((Texts{"sqlite3_exec " + UPDATE}), seam().callsOf(OPENING_CALLS));
-    EXPECT_EQ(onStdout({ordinaryLine("i=0,run sql failed, error=(null), sql=" + UPDATE)}), takeLines());
+    EXPECT_EQ((Texts{ordinary(STORE, "i=0,run sql failed, error=(null), sql=" + UPDATE)}), takeLines());
 }
 
 TEST_F(RunSql, PassesConnectionStatementCallbackAndArgument)
@@ -52,9 +53,9 @@ TEST_F(RunSql, PassesConnectionStatementCallbackAndArgument)
     EXPECT_EQ(2, nRows);
     EXPECT_EQ(0, db.runSqlEx("SELECT 1", countRow, &nRows));
     EXPECT_EQ(3, nRows);
-    EXPECT_EQ(NOTHING, seam().callsOf({"sqlite3_changes"}));
+    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_changes"}));
 
-    seam().sqliteExec = [&](sqlite3* pDb, const char* szSql, Callback callback, void* pArgument,
+    seam().sqliteExec = [&](sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument,
                             char** pszError) {
         EXPECT_EQ(db.m_pDb, pDb);
         EXPECT_STREQ("SELECT 2", szSql);
@@ -78,7 +79,7 @@ TEST_F(RunSql, CallbackThatStopsFailsTheStatement)
 
     EXPECT_EQ("query aborted", db.m_strErr);
     EXPECT_EQ((Texts{"sqlite3_exec SELECT tid FROM token"}), seam().callsOf({"sqlite3_exec", "usleep"}));
-    EXPECT_EQ(failureOf(db.m_strSql, "query aborted", errno), takeLines());
+    EXPECT_EQ(failureOf(db.m_strSql, "query aborted"), takeLines());
 }
 
 // The number is SQLite's own, which outlives statements that change no row.
@@ -101,7 +102,7 @@ TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
         EXPECT_EQ(nChanges, db.runSql());
         EXPECT_EQ("", db.m_strErr);
     }
-    EXPECT_EQ(NOTHING, takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(RunSql, EmptiesTheErrorTextWhichRunSqlExDoesNot)
@@ -128,25 +129,25 @@ struct StatementCase {
 };
 
 const std::vector<StatementCase> STATEMENTS = {
-    {"Success", {{SQLITE_OK, nullptr}}, true, "", ""},
+    {"Success", {RUN}, true, "", ""},
     {"SuccessWithText", {{SQLITE_OK, "no matter"}}, true, "", ""},
     {"LockEndsAfterTwoTries",
-     {{SQLITE_BUSY, "database is locked"}, {SQLITE_BUSY, "(2) database is locked"}, {SQLITE_OK, nullptr}},
+     {LOCKED, {SQLITE_BUSY, "(2) database is locked"}, RUN},
      true,
      "(2) database is locked",
      ""},
     {"LockTextOfAnotherCode",
-     {{SQLITE_ERROR, "cannot commit: database is locked, somehow"}, {SQLITE_OK, nullptr}},
+     {{SQLITE_ERROR, "cannot commit: database is locked, somehow"}, RUN},
      true,
      "cannot commit: database is locked, somehow",
      ""},
     {"LockThenError",
-     {{SQLITE_BUSY, "database is locked"}, {SQLITE_IOERR, "disk I/O error"}},
+     {LOCKED, DISK_ERROR},
      false,
      "disk I/O error",
      "i=1,run sql failed, error=disk I/O error"},
     {"LockThenNoText",
-     {{SQLITE_BUSY, "database is locked"}, {SQLITE_MISUSE, nullptr}},
+     {LOCKED, {SQLITE_MISUSE, nullptr}},
      false,
      UNKNOWN,
      "i=1,run sql failed, error=(null)"},
@@ -199,7 +200,8 @@ TEST_P(RunSqlAnswered, RetriesOnlyLocks)
     for (const bool blCallback : {false, true}) {
         SCOPED_TRACE(blCallback);
         seam().calls.clear();
-        answer(theCase().answers);
+        errno = 0;
+        answerStatements(UPDATE, theCase().answers);
         db.m_strErr = "stale";
         EXPECT_EQ(theCase().blSuccess ? (blCallback ? 0 : 2) : -1,
                   db.runSql(blCallback ? countRow : nullptr, nullptr));
@@ -215,18 +217,7 @@ TEST_F(RunSql, WaitsForAnotherConnection)
 {
     AccessTokenDbApi db;
     openWithTwoRows(db);
-    sqlite3* pOther = nullptr;
-    ASSERT_EQ(SQLITE_OK, sqlite3_open(path().c_str(), &pOther));
-    ASSERT_EQ(SQLITE_OK, sqlite3_exec(pOther, "BEGIN EXCLUSIVE; DELETE FROM token WHERE tid = 'a'", nullptr,
-                                      nullptr, nullptr));
-    int nSleeps = 0;
-    seam().sleep = [&](useconds_t) {
-        if (3 == ++nSleeps) {
-            EXPECT_EQ(SQLITE_OK, sqlite3_exec(pOther, "COMMIT", nullptr, nullptr, nullptr));
-        }
-        errno = EINTR; // an interrupted sleep is none the less a try
-        return -1;
-    };
+    const Lock lock(path(), 3, "DELETE FROM token WHERE tid = 'a'");
     db.m_strSql = UPDATE;
 
     EXPECT_EQ(1, db.runSql());
@@ -234,8 +225,7 @@ TEST_F(RunSql, WaitsForAnotherConnection)
     EXPECT_EQ("database is locked", db.m_strErr);
     EXPECT_EQ((Texts{"usleep 10000", "usleep 10000", "usleep 10000"}), seam().callsOf({"usleep"}));
     EXPECT_EQ((Texts{"b|%n%s"}), query("SELECT tid, extra FROM token"));
-    EXPECT_EQ(NOTHING, takeLines());
-    EXPECT_EQ(SQLITE_OK, sqlite3_close(pOther));
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 class RunSqlLocked : public WithSwitches {};
@@ -249,15 +239,13 @@ TEST_P(RunSqlLocked, TellsStatementTriesAndChangesInDebugMode)
     sayInDebug(ordinaryLine("i=1" + strTail, EIO));
     sayInDebug(ordinaryLine("run sql=" + UPDATE, EIO));
     const std::vector<Line> linesOfTries = m_lines;
-    sayInDebug(ordinaryLine("change rv=2, run sql=" + UPDATE, 0));
+    sayInDebug(ordinaryLine("change rv=2, run sql=" + UPDATE, EIO));
 
-    const std::vector<Answer> answers = {
-        {SQLITE_BUSY, "database is locked"}, {SQLITE_BUSY, "database is locked"}, {SQLITE_OK, nullptr}};
-    answer(answers);
+    failStatements(UPDATE, LOCKED, 2);
     EXPECT_EQ(2, m_db.runSqlEx(UPDATE, nullptr, nullptr));
     expectLines(m_lines);
 
-    answer(answers);
+    failStatements(UPDATE, LOCKED, 2);
     errno = 0;
     EXPECT_EQ(0, m_db.runSqlEx(UPDATE, countRow, nullptr));
     expectLines(linesOfTries);
@@ -280,7 +268,7 @@ TEST_P(RunSqlLocked, GivesUpAfter500Tries)
     for (const std::string& strError : errors) {
         answers.push_back({SQLITE_BUSY, strError.c_str()});
     }
-    answer(answers);
+    answerStatements(UPDATE, answers);
     m_db.m_strSql = UPDATE;
 
     EXPECT_EQ(-1, m_db.runSql());

@@ -13,7 +13,6 @@ using VEMO_ACCESS_TOKEN::checkJsonType;
 using VEMO_ACCESS_TOKEN::fillDefaultValue;
 using VEMO_ACCESS_TOKEN::tokenType;
 
-const char* const FILE_NAME = "util.cpp";
 const std::string NO_OBJECT = "!jTokenParam.isObject()";
 
 std::string typeFailed(const std::string& strName, const std::string& strRecord)
@@ -41,7 +40,7 @@ TEST_F(TypeTable, HoldsTypeNameAndDefaultOfEachField)
     EXPECT_EQ(jExpected, tokenType());
     EXPECT_EQ(Json::uintValue, tokenType()["uid"][1].type());
     EXPECT_EQ(Json::intValue, tokenType()["create_time"][1].type());
-    EXPECT_EQ((std::vector<std::string>{}), takeLines());
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(TypeTable, IsBuiltByTheFirstCallAlone)
@@ -53,7 +52,7 @@ TEST_F(TypeTable, IsBuiltByTheFirstCallAlone)
 
     EXPECT_EQ(pFirst, pSecond);
     EXPECT_EQ(Json::Value(1767355200), tokenType()["create_time"][1]);
-    EXPECT_EQ((std::vector<std::string>{"time"}), seam().calls);
+    EXPECT_EQ((Texts{"time"}), seam().calls);
 }
 
 TEST_F(TypeTable, FrozenTimeDoesNotReachRecords)
@@ -92,7 +91,7 @@ const std::vector<std::pair<std::string, Json::Value>>& kinds()
 struct Type {
     const char* szTestName;
     const char* szType;
-    std::vector<std::string> accepted;
+    Texts accepted;
 };
 
 std::ostream& operator<<(std::ostream& stream, const Type& type)
@@ -100,7 +99,7 @@ std::ostream& operator<<(std::ostream& stream, const Type& type)
     return stream << type.szType;
 }
 
-const std::vector<std::string> INTEGRAL = {"int", "negative", "unsigned", "least", "greatest"};
+const Texts INTEGRAL = {"int", "negative", "unsigned", "least", "greatest"};
 
 class EachType : public SeamTest, public ::testing::WithParamInterface<Type> {};
 
@@ -146,9 +145,9 @@ protected:
             SCOPED_TRACE(row.szRecord);
             Json::Value jToken = json(row.szRecord);
             const Json::Value jBefore = jToken;
-            std::vector<std::string> expected;
+            Texts expected;
             if (row.szMessage) {
-                expected.push_back(fail(FILE_NAME, row.szMessage, nErrno));
+                expected.push_back(fail(UTIL, row.szMessage, nErrno));
             }
             errno = nErrno;
 
@@ -168,7 +167,7 @@ TEST_F(Validation, RefusesWhatIsNoObject)
 
         EXPECT_EQ(-1, checkJsonType(jToken));
 
-        EXPECT_EQ((std::vector<std::string>{failed(FILE_NAME, NO_OBJECT)}), takeLines());
+        EXPECT_EQ((Texts{failed(UTIL, NO_OBJECT)}), takeLines());
         EXPECT_EQ(json(szRecord), jToken);
     }
 }
@@ -242,8 +241,7 @@ TEST_F(Validation, UnknownTypeNameIsAnError)
         errno = EACCES;
         EXPECT_EQ(-1, checkJsonType(jToken));
 
-        EXPECT_EQ((std::vector<std::string>{fail(FILE_NAME, "type not found!!, key=count", EACCES)}),
-                  takeLines());
+        EXPECT_EQ((Texts{fail(UTIL, "type not found!!, key=count", EACCES)}), takeLines());
     }
 }
 
@@ -255,8 +253,7 @@ TEST_F(Validation, WholeRecordIsLoggedHoweverLong)
 
     EXPECT_EQ(-1, checkJsonType(jToken));
 
-    EXPECT_EQ((std::vector<std::string>{
-                  fail(FILE_NAME, typeFailed("count", R"({"count":"5","tid":")" + strLong + "\"}"))}),
+    EXPECT_EQ((Texts{fail(UTIL, typeFailed("count", R"({"count":"5","tid":")" + strLong + "\"}"))}),
               takeLines());
 }
 

@@ -33,7 +33,10 @@ done <"$dir/headers"
 
 echo "The example of README:"
 sed -n '/^```cpp$/,/^```$/p' "$readme" | grep -v '^```' >"$dir/example.cpp"
-"${compile[@]}" "$dir/example.cpp" -o "$dir/example" "-L$libdir" "-Wl,-rpath,$libdir" -lvemoaccesstoken -ljsoncpp
+# The redirection is linked ahead of the library rather than preloaded: where it cannot be found the
+# program does not start, instead of working on the real database.
+"${compile[@]}" "$dir/example.cpp" -o "$dir/example" -Wl,--no-as-needed "$build/examples/libredirect.so" \
+    "-Wl,-rpath,$build/examples" "-L$libdir" "-Wl,-rpath,$libdir" -lvemoaccesstoken -ljsoncpp
 mkdir "$dir/database"
-LD_PRELOAD=$build/examples/libredirect.so VEMO_REDIRECT_DIR=$dir/database "$dir/example" | tee "$dir/output"
+VEMO_REDIRECT_DIR=$dir/database "$dir/example" | tee "$dir/output"
 grep -xE '    (granted on behalf of root|1 token deleted)' "$readme" | sed 's/^ *//' | diff "$dir/output" -

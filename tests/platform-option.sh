@@ -22,5 +22,4 @@ for name in PLIBCFileTouch VEMOUserGetByUID VEMOUserFree 'VEMO::RANDOM::VEMORand
     grep "U $name(" <<<"$undefined"
 done
 mkdir "$dir/database"
-LD_PRELOAD=$dir/build/examples/libredirect.so VEMO_REDIRECT_DIR=$dir/database "$dir/build/examples/token-life" |
-    tail -n 2
+VEMO_REDIRECT_DIR=$dir/database "$dir/build/examples/token-life-redirected" | tail -n 2

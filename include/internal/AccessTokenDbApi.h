@@ -85,6 +85,8 @@ public:
     int SqlExpandMemberSymbol(std::string& strSql);
 
     // Filters as SQL. All append to strSqlWhereOut; what they appended before a failure stays.
+    // Values of text and JSON fields are quoted and escaped. Those of number fields are not quoted,
+    // whatever their type: a string there becomes part of the statement.
 
     // The condition made of the filter's token fields, joined by "and" or "or". Returns 0, 1 when
     // the filter names no token field (nothing is appended), or -1.
@@ -104,7 +106,8 @@ public:
     int tokenGet(Json::Value& jTokenParam, Json::Value& jTokenArrayOut);
 
     // Sets jTokenOut to the first record whose field szName equals strValue and returns 1, or to an
-    // empty object and returns 0 or -1. A szName that is no token field selects every token.
+    // empty object and returns 0 when there is none, -1 when the query fails. Without a name or a
+    // value it returns -1 and leaves jTokenOut. A szName that is no token field selects every token.
     int tokenGetOne(const char* szName, std::string& strValue, Json::Value& jTokenOut);
 
     // Deletes what the filter's fields select; sort_by, limit and so on have no effect. A filter
@@ -112,7 +115,7 @@ public:
     // Returns the number of tokens deleted, or -1.
     int tokenDelete(Json::Value& jTokenParam, bool bAll);
 
-    // State, for callers to read
+    // State: for callers to read, but for m_strSql, which is set ahead of runSql
 
     sqlite3* m_pDb;       // the connection; null when closed
     std::string m_strSql; // the statement that runSql runs, or ran last

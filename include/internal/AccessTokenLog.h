@@ -36,6 +36,9 @@ extern "C" void logSyslog(int nPriority, const char* szFormat, ...) __asm__("sys
 // the attribute, since ISO C++ knows no "%m".)
 int checkFormat(const char* szFormat, ...) __attribute__((format(printf, 1, 2)));
 
+// Writes the line of VEMO_ATOKEN_FAILED.
+void logFailed(const char* szCondition, const char* szFile, int nLine);
+
 // What stands in a log line for text that may be missing.
 inline const char* textOrNull(const char* szText)
 {
@@ -83,8 +86,7 @@ inline const char* textOrNull(const char* szText)
         VEMO_ATOKEN_WRITE_LINE("(%s:%d)(%m)" message "\n", VEMO_ATOKEN_HERE, __VA_ARGS__);                   \
     } while (0)
 
-#define VEMO_ATOKEN_FAILED(szCondition, ...)                                                                 \
-    VEMO_ATOKEN_WRITE_LINE("(%s:%d)(%m)Failed [%s], err=%m\n", __VA_ARGS__, __VA_ARGS__, szCondition)
+#define VEMO_ATOKEN_FAILED(szCondition, ...) VEMO_ACCESS_TOKEN::logFailed(szCondition, __VA_ARGS__)
 
 // The two checks make their text themselves: passed on to another macro, the condition would have
 // its own macros (UID_ERR, SQLITE_OK) expanded first.

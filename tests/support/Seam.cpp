@@ -15,6 +15,10 @@
 #include <cstring>
 #include <new>
 
+#include "internal/ErrnoKeeper.h"
+
+using VEMO_ACCESS_TOKEN::ErrnoKeeper;
+
 namespace {
 
 struct Range {
@@ -111,6 +115,30 @@ std::string octal(mode_t mode)
     return szMode;
 }
 
+// A callback of the library, which is to find errno as the library left it.
+struct Receiver {
+    SqlCallback callback;
+    void* pArgument;
+    int nErrno;
+
+    static int call(void* pReceiver, int nColumns, char** szValues, char** szNames)
+    {
+        const Receiver& receiver = *static_cast<Receiver*>(pReceiver);
+        errno = receiver.nErrno;
+        return receiver.callback(receiver.pArgument, nColumns, szValues, szNames);
+    }
+};
+
+template <typename Allocation>
+void* withoutThrowing(Allocation allocation)
+{
+    try {
+        return allocation();
+    } catch (const std::bad_alloc&) {
+        return nullptr;
+    }
+}
+
 template <typename Function>
 Function* next(const char* szName, Function* /* of this type */)
 {
@@ -125,7 +153,8 @@ Function* next(const char* szName, Function* /* of this type */)
 
 Seam& seam()
 {
-    static Seam theSeam;
+    // Never destroyed: the library may be called, and call, until the very end of the process.
+    static Seam& theSeam = *new Seam;
     return theSeam;
 }
 
@@ -144,6 +173,13 @@ std::vector<std::string> Seam::callsOf(const std::vector<std::string>& names) co
 void Seam::fail(const std::string& strName, int nErrno, int nFirst, int nLast)
 {
     failures[strName] = {nFirst, nLast, nErrno};
+}
+
+int Seam::exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument, char** pszError)
+{
+    const ErrnoKeeper keeper;
+    Receiver receiver = {callback, pArgument, errno};
+    return NEXT(sqlite3_exec)(pDb, szSql, callback ? &Receiver::call : nullptr, &receiver, pszError);
 }
 
 extern "C" {
@@ -198,7 +234,11 @@ int usleep(useconds_t nMicroseconds)
         return NEXT(usleep)(nMicroseconds);
     }
     record("usleep", std::to_string(nMicroseconds));
-    return seam().sleep ? seam().sleep(nMicroseconds) : 0;
+    if (seam().sleep) {
+        seam().sleep();
+    }
+    errno = EINTR; // an interrupted sleep is a wait none the less, and its errno nobody's concern
+    return -1;
 }
 
 time_t time(time_t* pTime) noexcept
@@ -257,17 +297,15 @@ void syslog(int nPriority, const char* szFormat, ...)
 
 ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned int nFlags)
 {
-    if (CALLED_BY_LIBRARY && fails("getrandom")) {
+    if (fails("getrandom")) {
         return -1;
     }
-    return NEXT(getrandom)(pBuffer, cbBuffer, nFlags);
+    return seam().random ? seam().random(pBuffer, cbBuffer, nFlags)
+                         : NEXT(getrandom)(pBuffer, cbBuffer, nFlags);
 }
 
 int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer, struct passwd** ppEntry)
 {
-    if (!CALLED_BY_LIBRARY) {
-        return NEXT(getpwuid_r)(uid, pEntry, szBuffer, cbBuffer, ppEntry);
-    }
     if (fails("getpwuid_r", std::to_string(uid))) {
         *ppEntry = nullptr;
         return errno;
@@ -278,25 +316,25 @@ int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer
 
 int sqlite3_open(const char* szPath, sqlite3** ppDb)
 {
-    if (CALLED_BY_LIBRARY) {
-        record("sqlite3_open", szPath);
-        if (seam().sqliteOpen) {
-            return seam().sqliteOpen(szPath, ppDb);
-        }
+    if (!CALLED_BY_LIBRARY) {
+        return NEXT(sqlite3_open)(szPath, ppDb);
     }
+    record("sqlite3_open", szPath);
+    if (seam().sqliteOpen) {
+        return seam().sqliteOpen(szPath, ppDb);
+    }
+    const ErrnoKeeper keeper;
     return NEXT(sqlite3_open)(szPath, ppDb);
 }
 
-int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(void*, int, char**, char**),
-                 void* pArgument, char** pszError)
+int sqlite3_exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument, char** pszError)
 {
-    if (CALLED_BY_LIBRARY) {
-        record("sqlite3_exec", szSql);
-        if (seam().sqliteExec) {
-            return seam().sqliteExec(pDb, szSql, callback, pArgument, pszError);
-        }
+    if (!CALLED_BY_LIBRARY) {
+        return NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
     }
-    return NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
+    record("sqlite3_exec", szSql);
+    return seam().sqliteExec ? seam().sqliteExec(pDb, szSql, callback, pArgument, pszError)
+                             : Seam::exec(pDb, szSql, callback, pArgument, pszError);
 }
 
 int sqlite3_changes(sqlite3* pDb)
@@ -309,12 +347,14 @@ int sqlite3_changes(sqlite3* pDb)
 
 int sqlite3_close(sqlite3* pDb)
 {
-    if (CALLED_BY_LIBRARY) {
-        record("sqlite3_close");
-        if (seam().sqliteClose) {
-            return seam().sqliteClose(pDb);
-        }
+    if (!CALLED_BY_LIBRARY) {
+        return NEXT(sqlite3_close)(pDb);
     }
+    record("sqlite3_close");
+    if (seam().sqliteClose) {
+        return seam().sqliteClose(pDb);
+    }
+    const ErrnoKeeper keeper;
     return NEXT(sqlite3_close)(pDb);
 }
 
@@ -335,9 +375,10 @@ void* operator new(std::size_t cbSize, const std::nothrow_t&) noexcept
     if (CALLED_BY_LIBRARY && fails("operator new")) {
         return nullptr;
     }
-    try {
-        return ::operator new(cbSize);
-    } catch (const std::bad_alloc&) {
-        return nullptr;
-    }
+    return withoutThrowing([cbSize] { return ::operator new(cbSize); });
+}
+
+void* operator new[](std::size_t cbSize, const std::nothrow_t&) noexcept
+{
+    return fails("operator new[]") ? nullptr : withoutThrowing([cbSize] { return ::operator new[](cbSize); });
 }

@@ -4,7 +4,8 @@
 // on to the real function; the fixed database path is led elsewhere by examples/redirect.cpp.
 //
 // Only calls that come from the library are treated so; those of SQLite and of the test itself go
-// straight to the real function (but for the clock, which SQLite shares).
+// straight to the real function. The clock is shared with SQLite; and getrandom, getpwuid_r and the
+// allocation of arrays are the seam's whoever calls, for tests that have the callers linked in.
 
 #ifndef TESTS_SEAM_H
 #define TESTS_SEAM_H
@@ -21,6 +22,8 @@
 
 enum class Destination { Stdout, Syslog };
 
+typedef int (*SqlCallback)(void*, int, char**, char**);
+
 // One log line, expanded. Line numbers of source files are no part of the design and read '#':
 // "util.cpp:# ..."; those of the field list stay.
 struct LogLine {
@@ -31,7 +34,8 @@ struct LogLine {
 struct Seam {
     // The calls in order: "geteuid", "seteuid 0", "access PATH", "open PATH", "chmod PATH 0700",
     // "sqlite3_open PATH", "sqlite3_exec SQL", "sqlite3_changes", "sqlite3_close", "usleep 10000",
-    // "time", "sqlite3_mprintf FORMAT", "getrandom", "getpwuid_r UID", "syslog PRIORITY", "printf".
+    // "time", "sqlite3_mprintf FORMAT", "getrandom", "getpwuid_r UID", "operator new", "operator
+    // new[]", "syslog PRIORITY", "printf".
     std::vector<std::string> calls;
 
     // The calls whose first word is one of the names.
@@ -42,7 +46,8 @@ struct Seam {
 
     // Functions that fail: name, then the numbers (from 1) of the calls that do, and the errno they
     // leave. Functions: geteuid (answers (uid_t)-1), seteuid, access, open, chmod, sqlite3_mprintf
-    // (no memory), getrandom, getpwuid_r (returns the errno), "operator new" (the non-throwing one).
+    // (no memory), getrandom, getpwuid_r (returns the errno), "operator new" and "operator new[]" (the
+    // non-throwing ones).
     struct Failure {
         int nFirst;
         int nLast;
@@ -53,10 +58,16 @@ struct Seam {
 
     // Stand-ins, when set, for whole functions. They may call the real ones.
     std::function<int(const char*, sqlite3**)> sqliteOpen;
-    std::function<int(sqlite3*, const char*, int (*)(void*, int, char**, char**), void*, char**)> sqliteExec;
+    std::function<int(sqlite3*, const char*, SqlCallback, void*, char**)> sqliteExec;
     std::function<int(sqlite3*)> sqliteClose;
-    std::function<int(useconds_t)> sleep; // nobody really sleeps; this is told instead
+    std::function<void()> sleep; // nobody really sleeps; this is told instead
     std::function<int(uid_t, struct passwd*, char*, size_t, struct passwd**)> getUser;
+    std::function<ssize_t(void*, size_t, unsigned int)> random; // getrandom
+
+    // sqlite3_exec as the library sees it when there is no stand-in: errno stays as it was, in the
+    // callback too, and so it does with sqlite3_open and sqlite3_close. (What SQLite really leaves there
+    // is its own affair, and differs between systems.)
+    static int exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument, char** pszError);
 
     // The time that the library and SQLite see, when set; seconds since the epoch.
     std::optional<time_t> clock;

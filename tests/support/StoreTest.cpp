@@ -1,28 +1,14 @@
 #include "StoreTest.h"
 
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
-#include <memory>
 
 #include "AccessTokenUtil.h"
+#include "internal/ErrnoKeeper.h"
 
 namespace {
-
-// "util.cpp" stands for all its lines; the field list's are told.
-std::string location(const std::string& strFile)
-{
-    return std::string::npos == strFile.find(':') ? strFile + ":#" : strFile;
-}
-
-std::string failureMessage(const std::string& strFile, const std::string& strMessage, int nErrno)
-{
-    return "(" + location(strFile) + ")(" + strerror(nErrno) + ")" + strMessage + "\n";
-}
 
 int appendRow(void* pRows, int nColumns, char** szValues, char**)
 {
@@ -30,7 +16,7 @@ int appendRow(void* pRows, int nColumns, char** szValues, char**)
     for (int i = 0; i < nColumns; ++i) {
         strRow.append(0 == i ? "" : "|").append(szValues[i] ? szValues[i] : "NULL");
     }
-    static_cast<std::vector<std::string>*>(pRows)->push_back(strRow);
+    static_cast<Texts*>(pRows)->push_back(strRow);
     return 0;
 }
 
@@ -55,65 +41,9 @@ int main(int nArguments, char** szArguments)
     return RUN_ALL_TESTS();
 }
 
-Json::Value json(const std::string& strText)
-{
-    const std::unique_ptr<Json::CharReader> pReader(Json::CharReaderBuilder().newCharReader());
-    Json::Value jValue;
-    std::string strErrors;
-    EXPECT_TRUE(pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, &strErrors))
-        << strErrors;
-    return jValue;
-}
-
-std::string tid(const std::string& strStart)
-{
-    std::string strTid = strStart;
-    strTid.resize(127, 'x');
-    return strTid;
-}
-
-std::string ordinary(const std::string& strFile, const std::string& strMessage)
-{
-    return location(strFile) + " " + strMessage + "\n";
-}
-
-std::string ordinary(const std::string& strFile, const std::string& strMessage, int nErrno)
-{
-    const std::string strPrefix = 0 == nErrno ? "" : std::string("(") + strerror(nErrno) + ")";
-    return ordinary(strFile, strPrefix + strMessage);
-}
-
-std::string fail(const std::string& strFile, const std::string& strMessage, int nErrno)
-{
-    return ordinary(strFile, failureMessage(strFile, strMessage, nErrno));
-}
-
-std::string failed(const std::string& strFile, const std::string& strCondition, int nErrno)
-{
-    return fail(strFile, "Failed [" + strCondition + "], err=" + strerror(nErrno), nErrno);
-}
-
-std::vector<std::string> takeLines()
-{
-    std::vector<std::string> texts;
-    for (const LogLine& line : seam().lines) {
-        texts.push_back(line.strText);
-    }
-    seam().lines.clear();
-    return texts;
-}
-
-std::vector<std::string> takeLines(Destination destination)
-{
-    for (const LogLine& line : seam().lines) {
-        EXPECT_EQ(destination, line.destination) << line.strText;
-    }
-    return takeLines();
-}
-
 void SeamTest::SetUp()
 {
-    VEMO_ACCESS_TOKEN::logToStdout(true);
+    VEMO_ACCESS_TOKEN::logToStdout(Destination::Stdout == m_destination);
     seam() = Seam();
     errno = 0;
 }
@@ -134,11 +64,12 @@ void StoreTest::TearDown()
     }
 }
 
-std::vector<std::string> StoreTest::query(const std::string& strSql) const
+Texts StoreTest::query(const std::string& strSql) const
 {
+    const VEMO_ACCESS_TOKEN::ErrnoKeeper keeper;
     sqlite3* pDb = nullptr;
     EXPECT_EQ(SQLITE_OK, sqlite3_open(path().c_str(), &pDb));
-    std::vector<std::string> rows;
+    Texts rows;
     char* szError = nullptr;
     EXPECT_EQ(SQLITE_OK, sqlite3_exec(pDb, strSql.c_str(), appendRow, &rows, &szError)) << szError;
     sqlite3_free(szError);
@@ -146,12 +77,15 @@ std::vector<std::string> StoreTest::query(const std::string& strSql) const
     return rows;
 }
 
+std::string StoreTest::countOf(const std::string& strTid) const
+{
+    const Texts rows = query("SELECT count FROM token WHERE tid = '" + strTid + "'");
+    return rows.empty() ? "" : rows[0];
+}
+
 void StoreTest::makeDatabase() const
 {
-    query("PRAGMA auto_vacuum = FULL; CREATE TABLE if not exists token (tid TEXT primary key NOT NULL,"
-          "bind_sid TEXT,uid INTEGER,deadline INTEGER default -1,count INTEGER default 1,"
-          "create_time INTEGER default CURRENT_TIMESTAMP,function TEXT NOT NULL,webapi_allow TEXT,"
-          "extra TEXT);");
+    query(SCHEMA);
 }
 
 void StoreTest::insert(const std::string& strTid, const std::string& strValues) const

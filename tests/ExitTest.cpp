@@ -1,0 +1,39 @@
+// The library while the process exits.
+
+#include <cstdlib>
+
+#include "StoreTest.h"
+#include "vemo-access-token.h"
+
+namespace {
+
+std::string g_strTid;
+
+class Exit : public StoreTest {};
+
+void grantAndLeave()
+{
+    Json::Value jToken;
+    const bool blGranted = 0 == VemoAccessTokenGrantEx(g_strTid, "Api", nullptr, jToken) &&
+                           json(R"({"Api": {}})") == jToken["webapi_allow"];
+    _exit(blGranted ? 0 : 1);
+}
+
+TEST_F(Exit, HandlersCanStillGrant)
+{
+    unsigned int uid = 0;
+    std::string strFunction = "VPN";
+    Json::Value jOption = json(R"({"count": 3, "webapi_allow": {"Api": {}}})");
+    ASSERT_EQ(0, VemoAccessTokenCreate(uid, strFunction, jOption, g_strTid));
+
+    EXPECT_EXIT(
+        {
+            Json::Value jToken;
+            VemoAccessTokenGrantEx(g_strTid, "Api", nullptr, jToken);
+            atexit(grantAndLeave);
+            exit(2);
+        },
+        ::testing::ExitedWithCode(0), "");
+}
+
+} // namespace

@@ -1,0 +1,46 @@
+// Statements that fail, and databases that are locked.
+
+#ifndef TESTS_STATEMENTS_H
+#define TESTS_STATEMENTS_H
+
+#include <cerrno>
+#include <string>
+#include <vector>
+
+#include "Seam.h"
+
+// What one try of a statement is answered instead of being run; SQLITE_OK runs it.
+struct Answer {
+    int nResult;
+    const char* szError; // null: no text
+    int nErrno = EIO;    // left behind by what was not run
+};
+
+const Answer RUN = {SQLITE_OK, nullptr};
+const Answer DISK_ERROR = {SQLITE_IOERR, "disk I/O error"};
+const Answer LOCKED = {SQLITE_BUSY, "database is locked"};
+
+// Answers the tries of the library's statements that start with strStart, in turn. All other
+// statements are run, and so are these when no answer is left.
+void answerStatements(const std::string& strStart, const std::vector<Answer>& answers);
+
+// Answers so many of them alike.
+void failStatements(const std::string& strStart, const Answer& failure, int nTimes = 1);
+
+// Another connection, which holds the database locked until the library has waited nWaits times; with
+// 0, and at the latest, until it ends. What it changes comes into effect then.
+class Lock {
+public:
+    explicit Lock(const std::string& strPath, int nWaits = 0, const std::string& strChange = "");
+    ~Lock();
+    Lock(const Lock&) = delete;
+    Lock& operator=(const Lock&) = delete;
+
+private:
+    void end();
+
+    sqlite3* m_pDb = nullptr;
+    int m_nWaits;
+};
+
+#endif
