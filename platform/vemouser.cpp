@@ -3,16 +3,11 @@
 #include <pwd.h>
 
 #include <cerrno>
-#include <cstdlib>
 #include <cstring>
 #include <memory>
 #include <new>
 
 namespace {
-
-struct UserDeleter {
-    void operator()(VEMOUser* pUser) const { VEMOUserFree(pUser); }
-};
 
 // Some user databases answer so for "no such uid", instead of success without an entry. The other
 // answers that the manual allows for it (EBADF, EPERM) are more often real failures.
@@ -50,18 +45,19 @@ int VEMOUserGetByUID(uid_t uid, VEMOUser** ppUser)
         return 0;
     }
 
-    std::unique_ptr<VEMOUser, UserDeleter> pUser(new (std::nothrow) VEMOUser());
-    if (!pUser || !(pUser->szName = strdup(pEntry->pw_name))) {
+    // The name stands behind its record, in one piece of memory.
+    const size_t cbName = strlen(pEntry->pw_name) + 1;
+    char* pMemory = new (std::nothrow) char[sizeof(VEMOUser) + cbName];
+    if (!pMemory) {
         return fail(ENOMEM);
     }
-    *ppUser = pUser.release();
+    VEMOUser* pUser = new (pMemory) VEMOUser();
+    pUser->szName = static_cast<char*>(memcpy(pUser + 1, pEntry->pw_name, cbName));
+    *ppUser = pUser;
     return 0;
 }
 
 void VEMOUserFree(VEMOUser* pUser)
 {
-    if (pUser) {
-        free(pUser->szName);
-        delete pUser;
-    }
+    delete[] reinterpret_cast<char*>(pUser);
 }

@@ -192,7 +192,7 @@ TEST_F(GrantWithName, FailsForUsersThatCannotBeFound)
 
 TEST_F(GrantWithName, FailsWithoutMemoryForTheUser)
 {
-    seam().fail("operator new", ENOMEM, 2, 2); // the first is the store
+    seam().fail("operator new[]", ENOMEM);
 
     EXPECT_EQ(-1, grant());
 

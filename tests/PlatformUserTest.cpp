@@ -7,6 +7,15 @@
 
 namespace {
 
+char g_szName[] = "alice";
+
+int findAlice(uid_t, struct passwd* pEntry, char*, size_t, struct passwd** ppEntry)
+{
+    pEntry->pw_name = g_szName;
+    *ppEntry = pEntry;
+    return 0;
+}
+
 class User : public SeamTest {
 protected:
     void TearDown() override { VEMOUserFree(m_pUser); }
@@ -25,17 +34,12 @@ protected:
 
 TEST_F(User, IsFoundWithANameOfItsOwn)
 {
-    static char szName[] = "alice";
-    seam().getUser = [](uid_t uid, struct passwd* pEntry, char*, size_t, struct passwd** ppEntry) {
-        EXPECT_EQ(4294967294u, uid);
-        pEntry->pw_name = szName;
-        *ppEntry = pEntry;
-        return 0;
-    };
+    seam().getUser = findAlice;
 
     EXPECT_EQ(0, VEMOUserGetByUID(4294967294u, &m_pUser));
 
-    szName[0] = 'A';
+    g_szName[0] = 'A';
+    EXPECT_EQ((Texts{"getpwuid_r 4294967294"}), seam().callsOf({"getpwuid_r"}));
     ASSERT_NE(nullptr, m_pUser);
     EXPECT_STREQ("alice", m_pUser->szName);
 }
@@ -113,6 +117,17 @@ TEST_F(User, LookupFailsWithoutMemory)
         EXPECT_EQ(ENOMEM, errno);
         EXPECT_EQ(nullptr, m_pUser);
     }
+}
+
+TEST_F(User, FoundUserNeedsMemoryToo)
+{
+    seam().getUser = findAlice;
+    seam().fail("operator new[]", 0, 2, 2);
+
+    EXPECT_EQ(-1, VEMOUserGetByUID(1026, &m_pUser));
+
+    EXPECT_EQ(ENOMEM, errno);
+    EXPECT_EQ(nullptr, m_pUser);
 }
 
 TEST_F(User, NoneIsReleasedAsWell)
