@@ -19,7 +19,7 @@
 // processes, may use the database at once. The constructor, or the first operation after a failed
 // opening, changes the effective uid of the whole process for a moment. The process should have
 // effective uid 0 as long as the object lives (README says why). Reading and then writing a token
-// is no transaction: overlapping updates and grants of one token can overwrite each other.
+// is no transaction: overlapping updates, grants and deletions of one token can overwrite each other.
 
 #ifndef VEMO_ACCESS_TOKEN_API_H
 #define VEMO_ACCESS_TOKEN_API_H
