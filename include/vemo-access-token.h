@@ -5,7 +5,8 @@
 // process must be able to set its effective uid to 0 and should have it (README says why).
 //
 // Results: 0 or more is success, -1 a failure or refusal. Failures have written their log lines (see
-// AccessTokenUtil.h); an unknown token and a method that is not listed are logged in debug mode only.
+// AccessTokenUtil.h); that a token is unknown or a method not listed is logged in debug mode only,
+// though VemoAccessTokenGrant logs every refusal as such.
 // Arguments not named as results are only read. The strings and JSON values are those of C++, so a
 // caller is built with the same libstdc++ and jsoncpp.
 //

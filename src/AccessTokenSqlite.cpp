@@ -480,7 +480,6 @@ int AccessTokenDbApi::SqlMakeByMatchField(std::string& strField, Json::Value& jP
                                           std::string& strSqlWhereOut)
 {
     const Json::Value& jTokenType = tokenType();
-
     std::string strCondition = strField + "=";
 
     VEMO_ATOKEN_CHECK_RETURN(!jTokenType.isMember(strField), -1);
