@@ -12,6 +12,7 @@
 
 #include <cstdarg>
 #include <cstdlib>
+#include <cstring>
 #include <string>
 
 #include "AccessTokenDefine.h"
@@ -29,22 +30,20 @@ const char* directory()
 
 std::string redirected(const char* szPath)
 {
-    if (directory() && std::string(VEMO_ATOKEN_DB_PATH) == szPath) {
+    if (0 == strcmp(VEMO_ATOKEN_DB_PATH, szPath) && directory()) {
         return std::string(directory()) + "/vemo-access-token.db";
     }
     return szPath;
 }
 
-// The function of that name that would run if this object were not here.
-template <typename Function>
-Function* next(const char* szName, Function* /* of this type */)
-{
-    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szName));
-}
-
 } // namespace
 
-#define NEXT(name) next(#name, &name)
+// The function of that name that would run if this object were not here; looked up once.
+#define NEXT(name)                                                                                           \
+    ([] {                                                                                                    \
+        static const auto pNext = reinterpret_cast<decltype(&::name)>(dlsym(RTLD_NEXT, #name));              \
+        return pNext;                                                                                        \
+    }())
 
 extern "C" {
 
@@ -74,7 +73,7 @@ REDIRECT_EXPORT int chmod(const char* szPath, mode_t mode) noexcept
 
 REDIRECT_EXPORT int stat(const char* szPath, struct stat* pStatus) noexcept
 {
-    return next<int(const char*, struct stat*)>("stat", nullptr)(redirected(szPath).c_str(), pStatus);
+    return NEXT(stat)(redirected(szPath).c_str(), pStatus);
 }
 
 REDIRECT_EXPORT int open(const char* szPath, int nFlags, ...)

@@ -39,12 +39,13 @@ int VEMORandomBase::random(int nMin, int nMax)
 
 int VEMORandomBase::getString(const std::string& strAlphabet, unsigned int cchLength, std::string& strOut)
 {
-    const size_t nChoices = strAlphabet.size();
-    if (0 == nChoices || 256 < nChoices) {
+    if (strAlphabet.empty() || 256 < strAlphabet.size()) {
         return failInvalid();
     }
-    const size_t nLimit = 256 / nChoices * nChoices; // as in random(), one byte a draw
+    const unsigned int nChoices = static_cast<unsigned int>(strAlphabet.size());
+    const unsigned int nLimit = 256 / nChoices * nChoices; // as in random(), one byte a draw
     std::string strResult;
+    strResult.reserve(cchLength);
     unsigned char rgDraw[256];
     while (strResult.size() < cchLength) {
         const size_t cbDraw = std::min(sizeof(rgDraw), cchLength - strResult.size());

@@ -207,11 +207,8 @@ int AccessTokenApi::tokenDeleteByArray(std::vector<std::string>& strVector, cons
     VEMO_ATOKEN_CHECK_GOTO(jType[szName][0].asString() != "string", Error);
     VEMO_ATOKEN_CHECK_GOTO(0 > VectorParamToJson(strVector, szName, jParam), Error);
     VEMO_ATOKEN_CHECK_GOTO(!m_pDb, Error);
-    err = m_pDb->tokenDelete(jParam, false);
-    if (0 > err) {
-        VEMO_ATOKEN_FAILED("0 > (err = m_pDb->tokenDelete(jParam))", VEMO_ATOKEN_HERE);
-        goto Error;
-    }
+    VEMO_ATOKEN_CHECK_GOTO_AS(0 > (err = m_pDb->tokenDelete(jParam, false)),
+                              "0 > (err = m_pDb->tokenDelete(jParam))", Error);
     return err;
 
 Error:

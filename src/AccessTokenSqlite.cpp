@@ -13,12 +13,17 @@
 #include "AccessTokenUtil.h"
 #include "internal/AccessTokenDbApi.h"
 #include "internal/AccessTokenLog.h"
+#include "internal/FieldType.h"
+#include "internal/JsonAccess.h"
 #include "internal/JsonText.h"
 #include "plibc.h"
 
 using VEMO_ACCESS_TOKEN::debugInfoGet;
 using VEMO_ACCESS_TOKEN::ErrnoKeeper;
+using VEMO_ACCESS_TOKEN::fieldType;
+using VEMO_ACCESS_TOKEN::findMember;
 using VEMO_ACCESS_TOKEN::fromString;
+using VEMO_ACCESS_TOKEN::textOf;
 using VEMO_ACCESS_TOKEN::textOrNull;
 using VEMO_ACCESS_TOKEN::tokenType;
 using VEMO_ACCESS_TOKEN::toString;
@@ -145,29 +150,26 @@ void appendTail(std::string_view strKeyword, Json::Int64 nValue, std::string& st
 
 int FillField(Json::Value& jToken, char** column_name, char** column_value, int idx)
 {
-    const Json::Value& jTokenType = tokenType();
-
     VEMO_ATOKEN_CHECK_RETURN(jToken.type() != Json::objectValue && jToken.type() != Json::nullValue, -1);
     VEMO_ATOKEN_CHECK_RETURN(0 > idx, -1);
-    const std::string strName = column_name[idx];
-    VEMO_ATOKEN_CHECK_RETURN(!jTokenType.isMember(strName), -1);
+    const char* szName = column_name[idx];
+    const Json::Value* pType = fieldType(szName);
+    VEMO_ATOKEN_CHECK_RETURN_AS(!pType, "!jTokenType.isMember(strName)", -1);
 
     const char* szValue = column_value[idx];
-    const std::string strType = jTokenType[strName][0U].asString();
-    Json::Value jValue;
+    const std::string_view strType = textOf(*pType);
     if (strType == "string") {
-        jValue = szValue;
+        jToken[szName] = szValue;
     } else if (strType == "int") {
-        jValue = static_cast<Json::Int>(strtol(szValue, nullptr, 10));
+        jToken[szName] = static_cast<Json::Int>(strtol(szValue, nullptr, 10));
     } else if (strType == "long long") {
-        jValue = static_cast<Json::Int64>(strtoll(szValue, nullptr, 10));
+        jToken[szName] = static_cast<Json::Int64>(strtoll(szValue, nullptr, 10));
     } else if (Rendering::Json == renderingOf(strType)) {
-        fromString(szValue, jValue);
+        fromString(szValue, jToken[szName]);
     } else {
-        VEMO_ATOKEN_FAIL("type error, strType=%s", VEMO_ATOKEN_HERE, strType.c_str());
+        VEMO_ATOKEN_FAIL("type error, strType=%s", VEMO_ATOKEN_HERE, pType->asString().c_str());
         return -1;
     }
-    jToken[strName].swap(jValue);
     return 0;
 }
 
@@ -255,11 +257,13 @@ int AccessTokenDbApi::initDb()
 
 int AccessTokenDbApi::SqlExpandCreateTable(std::string& strSql)
 {
-    std::string strColumns;
-#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) strColumns.append(",").append(column);
+    const char* szColumns =
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) "," column
 #include "internal/vemo-access-token-data-member"
 #undef VEMO_ATOKEN_DATA_MEMBER
-    strSql = "PRAGMA auto_vacuum = FULL; CREATE TABLE if not exists token (" + strColumns.substr(1) + ");";
+        ;
+    strSql = "PRAGMA auto_vacuum = FULL; CREATE TABLE if not exists token (";
+    strSql.append(&szColumns[1]).append(");"); // without the first comma
     return 0;
 }
 
@@ -380,7 +384,8 @@ int AccessTokenDbApi::tokenSave(Json::Value& jParam, bool blCreate)
     VEMO_ATOKEN_DEBUG("tokenSave, blCreate=%d, jParam=%s", VEMO_ATOKEN_HERE, blCreate ? 1 : 0,
                       toString(jParam).c_str());
 #define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
-    if (!jParam.isMember(#name)) {                                                                           \
+    const Json::Value* p_##name = findMember(jParam, #name);                                                 \
+    if (!p_##name) {                                                                                         \
         VEMO_ATOKEN_FAILED("!jParam.isMember(\"" #name "\")", VEMO_ATOKEN_HERE_IN_LIST);                     \
         return -1;                                                                                           \
     }
@@ -391,8 +396,7 @@ int AccessTokenDbApi::tokenSave(Json::Value& jParam, bool blCreate)
     strSqlPrefix.append(") VALUES (");
     VEMO_ATOKEN_CHECK_RETURN(0 > SqlExpandMemberSymbol(strSqlPrefix), -1);
 
-#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
-    , SqlArgument<renderingOf(type)>(jParam[#name]).get()
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) , SqlArgument<renderingOf(type)>(*p_##name).get()
     const SqliteText szSql(sqlite3_mprintf(strSqlPrefix.c_str()
 #include "internal/vemo-access-token-data-member"
                                                ));
@@ -421,22 +425,28 @@ int AccessTokenDbApi::tokenUpdate(Json::Value& jParam)
 
 int AccessTokenDbApi::SqlExpandMemberName(std::string& strSql)
 {
-    std::string strNames;
-#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) strNames.append(",").append(#name);
+    const char* szNames =
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) "," #name
 #include "internal/vemo-access-token-data-member"
 #undef VEMO_ATOKEN_DATA_MEMBER
-    strSql.append(strNames, 1);
+        ;
+    strSql.append(&szNames[1]); // without the first comma
     return 0;
 }
 
 int AccessTokenDbApi::SqlExpandMemberSymbol(std::string& strSql)
 {
-    std::string strSymbols;
-#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
-    strSymbols.append(",").append(SqlArgument<renderingOf(type)>::DIRECTIVE);
+    const char* rgszDirective[] = {
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) SqlArgument<renderingOf(type)>::DIRECTIVE,
 #include "internal/vemo-access-token-data-member"
 #undef VEMO_ATOKEN_DATA_MEMBER
-    strSql.append(strSymbols, 1).append(")");
+    };
+    const char* szSeparator = "";
+    for (const char* szDirective : rgszDirective) {
+        strSql.append(szSeparator).append(szDirective);
+        szSeparator = ",";
+    }
+    strSql.append(")");
     return 0;
 }
 
@@ -479,11 +489,11 @@ int AccessTokenDbApi::SqlWhereFromJson(Json::Value& jTokenParam, std::string& st
 int AccessTokenDbApi::SqlMakeByMatchField(std::string& strField, Json::Value& jParam,
                                           std::string& strSqlWhereOut)
 {
-    const Json::Value& jTokenType = tokenType();
     std::string strCondition = strField + "=";
 
-    VEMO_ATOKEN_CHECK_RETURN(!jTokenType.isMember(strField), -1);
-    if (0 > appendValue(renderingOf(jTokenType[strField][0U].asString()), jParam,
+    const Json::Value* pType = fieldType(strField);
+    VEMO_ATOKEN_CHECK_RETURN_AS(!pType, "!jTokenType.isMember(strField)", -1);
+    if (0 > appendValue(renderingOf(textOf(*pType)), jParam,
                         "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.asString().c_str()))",
                         "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.toString().c_str()))",
                         strCondition)) {
@@ -495,13 +505,13 @@ int AccessTokenDbApi::SqlMakeByMatchField(std::string& strField, Json::Value& jP
 
 int AccessTokenDbApi::SqlMakeByListField(const char* szField, Json::Value& jList, std::string& strSqlWhereOut)
 {
-    const Json::Value& jTokenType = tokenType();
     const Json::Value& jElements = jList; // reading through it adds no element where there is a gap
     std::string strList;
 
     VEMO_ATOKEN_CHECK_RETURN(!szField || !szField[0], -1);
-    VEMO_ATOKEN_CHECK_RETURN(!jTokenType.isMember(szField), -1);
-    const Rendering rendering = renderingOf(jTokenType[szField][0U].asString());
+    const Json::Value* pType = fieldType(szField);
+    VEMO_ATOKEN_CHECK_RETURN_AS(!pType, "!jTokenType.isMember(szField)", -1);
+    const Rendering rendering = renderingOf(textOf(*pType));
     VEMO_ATOKEN_CHECK_RETURN(jList.type() != Json::arrayValue, -1);
 
     // No separator stands between the elements: 'a''b' is the one text a'b, and 12 the one number.
@@ -551,10 +561,8 @@ int AccessTokenDbApi::tokenGet(Json::Value& jTokenParam, Json::Value& jTokenArra
         jTokenArrayOut.type() != Json::nullValue && jTokenArrayOut.type() != Json::arrayValue, -1);
     VEMO_ATOKEN_CHECK_RETURN(0 > SqlWhereFromJson(jTokenParam, strSql, true), -1);
     VEMO_ATOKEN_CHECK_RETURN(0 > SqlFilterConditionFromJson(jTokenParam, strSql), -1);
-    if (0 > SqlExpandMemberName(strStatement)) {
-        VEMO_ATOKEN_FAILED("0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)", VEMO_ATOKEN_HERE);
-        return -1;
-    }
+    VEMO_ATOKEN_CHECK_RETURN_AS(0 > SqlExpandMemberName(strStatement),
+                                "0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)", -1);
     strStatement.append(" FROM token ");
     // Ordering without a field condition gives "WHERE  order by", which SQLite refuses; that stays.
     if (!strSql.empty()) {

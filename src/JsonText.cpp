@@ -10,27 +10,78 @@
 
 namespace {
 
-// The two configurations are built once and never destroyed, so that a program may still use the
-// library while it exits.
-
-const Json::StreamWriterBuilder* makeWriterBuilder()
+std::unique_ptr<Json::StreamWriter> makeWriter()
 {
-    auto pBuilder = std::make_unique<Json::StreamWriterBuilder>();
-    (*pBuilder)["indentation"] = "";
-    (*pBuilder)["commentStyle"] = "None";
-    (*pBuilder)["precision"] = 17;
-    (*pBuilder)["useSpecialFloats"] = true;
+    Json::StreamWriterBuilder builder;
+    builder["indentation"] = "";
+    builder["commentStyle"] = "None";
+    builder["precision"] = 17;
+    builder["useSpecialFloats"] = true;
     // The default escapes would replace what is not valid UTF-8.
-    (*pBuilder)["emitUTF8"] = true;
-    return pBuilder.release();
+    builder["emitUTF8"] = true;
+    return std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter());
 }
 
-const Json::CharReaderBuilder* makeReaderBuilder()
+std::unique_ptr<Json::CharReader> makeReader()
 {
-    auto pBuilder = std::make_unique<Json::CharReaderBuilder>();
-    (*pBuilder)["collectComments"] = false;
-    (*pBuilder)["allowSpecialFloats"] = true;
-    return pBuilder.release();
+    Json::CharReaderBuilder builder;
+    builder["collectComments"] = false;
+    builder["allowSpecialFloats"] = true;
+    return std::unique_ptr<Json::CharReader>(builder.newCharReader());
+}
+
+// A writer and a reader, which cost more to make than a token's texts to write and to read.
+class Codec {
+public:
+    Codec() : m_pWriter(makeWriter()), m_pReader(makeReader())
+    {
+        // A stream would hide that its memory ran out, and the text would be cut short.
+        m_stream.exceptions(std::ios_base::badbit);
+    }
+
+    std::string write(const Json::Value& jValue)
+    {
+        m_stream.clear();
+        m_stream.str(std::string());
+        m_pWriter->write(jValue, &m_stream);
+        return m_stream.str();
+    }
+
+    void read(std::string_view strText, Json::Value& jValue)
+    {
+        jValue = Json::Value();
+        try {
+            m_pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, nullptr);
+        } catch (const Json::Exception&) {
+            // Nested beyond the reader's limit. What was read stands, as after any other bad text.
+        }
+    }
+
+private:
+    const std::unique_ptr<Json::StreamWriter> m_pWriter;
+    const std::unique_ptr<Json::CharReader> m_pReader;
+    std::ostringstream m_stream;
+};
+
+// Set when the thread has destroyed its codec. It needs no destruction itself, so it can be read to
+// the very end.
+thread_local bool t_blEnded = false;
+
+struct ThreadCodec : Codec {
+    ~ThreadCodec() { t_blEnded = true; }
+};
+
+// Each thread keeps a codec. What still runs when it is gone, such as an exit handler, gets one of
+// its own.
+template <typename Use>
+auto withCodec(Use use)
+{
+    if (t_blEnded) {
+        Codec codec;
+        return use(codec);
+    }
+    thread_local ThreadCodec codec;
+    return use(codec);
 }
 
 } // namespace
@@ -39,23 +90,20 @@ namespace VEMO_ACCESS_TOKEN {
 
 std::string toString(const Json::Value& jValue)
 {
+    if (jValue.isObject() && jValue.empty()) {
+        return "{}"; // what most tokens hold in a field
+    }
     const ErrnoKeeper keeper;
-    static const Json::StreamWriterBuilder* pBuilder = makeWriterBuilder();
-    const std::unique_ptr<Json::StreamWriter> pWriter(pBuilder->newStreamWriter());
-    std::ostringstream stream;
-    pWriter->write(jValue, &stream);
-    return stream.str();
+    return withCodec([&](Codec& codec) { return codec.write(jValue); });
 }
 
-void fromString(const std::string& strText, Json::Value& jValue)
+void fromString(std::string_view strText, Json::Value& jValue)
 {
-    static const Json::CharReaderBuilder* pBuilder = makeReaderBuilder();
-    const std::unique_ptr<Json::CharReader> pReader(pBuilder->newCharReader());
-    try {
-        pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, nullptr);
-    } catch (const Json::Exception&) {
-        // Nested beyond the reader's limit. What was read stands, as after any other bad text.
+    if (strText == "{}") {
+        jValue = Json::Value(Json::objectValue);
+        return;
     }
+    withCodec([&](Codec& codec) { codec.read(strText, jValue); });
 }
 
 } // namespace VEMO_ACCESS_TOKEN

@@ -4,6 +4,8 @@
 #include <ctime>
 
 #include "internal/AccessTokenLog.h"
+#include "internal/FieldType.h"
+#include "internal/JsonAccess.h"
 #include "internal/JsonText.h"
 #include "vemorandom.h"
 
@@ -29,7 +31,7 @@ const TypeCheck g_rgTypeCheck[] = {
     {"Json::objectValue", &Json::Value::isObject},
 };
 
-const TypeCheck* findTypeCheck(const std::string& strType)
+const TypeCheck* findTypeCheck(std::string_view strType)
 {
     for (const TypeCheck& check : g_rgTypeCheck) {
         if (strType == check.szType) {
@@ -53,7 +55,7 @@ bool logToStdout(bool blOn)
 
 bool logToStdoutGet()
 {
-    return logToStdout(false);
+    return g_blLogToStdout;
 }
 
 bool debugInfo(bool blOn)
@@ -66,7 +68,7 @@ bool debugInfo(bool blOn)
 
 bool debugInfoGet()
 {
-    return debugInfo(false);
+    return g_blDebugInfo;
 }
 
 void logFailed(const char* szCondition, const char* szFile, int nLine)
@@ -90,21 +92,28 @@ Json::Value& tokenType()
     return jTokenType;
 }
 
+const Json::Value* fieldType(std::string_view strField)
+{
+    const Json::Value* pEntry = findMember(tokenType(), strField);
+    return pEntry ? &(*pEntry)[0U] : nullptr;
+}
+
 int checkJsonType(Json::Value& jTokenParam)
 {
     VEMO_ATOKEN_CHECK_RETURN(!jTokenParam.isObject(), -1);
 
-    const Json::Value& jTokenType = tokenType();
-    for (const std::string& strName : jTokenParam.getMemberNames()) {
-        if (!jTokenType.isMember(strName)) {
+    for (auto it = jTokenParam.begin(); it != jTokenParam.end(); ++it) {
+        const std::string strName = it.name();
+        const Json::Value* pType = fieldType(strName);
+        if (!pType) {
             continue;
         }
-        const TypeCheck* pCheck = findTypeCheck(jTokenType[strName][0U].asString());
+        const TypeCheck* pCheck = findTypeCheck(textOf(*pType));
         if (!pCheck) {
             VEMO_ATOKEN_FAIL("type not found!!, key=%s", VEMO_ATOKEN_HERE, strName.c_str());
             return -1;
         }
-        if (!(jTokenParam[strName].*pCheck->pAccepts)()) {
+        if (!((*it).*pCheck->pAccepts)()) {
             VEMO_ATOKEN_FAIL("type failed, jmList[i]=%s, jTokenParam=%s", VEMO_ATOKEN_HERE, strName.c_str(),
                              toString(jTokenParam).c_str());
             return -1;
@@ -116,7 +125,7 @@ int checkJsonType(Json::Value& jTokenParam)
 int fillDefaultValue(Json::Value& jToken, bool blCheck)
 {
 #define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
-    if (!jToken.isMember(#name)) {                                                                           \
+    if (!findMember(jToken, #name)) {                                                                        \
         if (blCheck) {                                                                                       \
             VEMO_ATOKEN_LOG("lost data member=%s", VEMO_ATOKEN_HERE_IN_LIST, #name);                         \
             return -1;                                                                                       \
@@ -161,11 +170,18 @@ int getTimeAfterNow(int offsetSecond, std::string& strTime)
 
 int checkPermission(Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod)
 {
+    const Json::Value* pAllow = nullptr;
+    const Json::Value* pEntry = nullptr;
+    const Json::Value* pMethods = nullptr;
+
     VEMO_ATOKEN_CHECK_GOTO(jToken.type() != Json::objectValue, Error);
     VEMO_ATOKEN_CHECK_GOTO(!szWebapiName || !szWebapiName[0], Error);
-    VEMO_ATOKEN_CHECK_GOTO(!jToken.isMember("webapi_allow"), Error);
-    VEMO_ATOKEN_CHECK_GOTO(jToken["webapi_allow"].type() != Json::objectValue, Error);
-    if (!jToken["webapi_allow"].isMember(szWebapiName)) {
+    pAllow = findMember(jToken, "webapi_allow");
+    VEMO_ATOKEN_CHECK_GOTO_AS(!pAllow, "!jToken.isMember(\"webapi_allow\")", Error);
+    VEMO_ATOKEN_CHECK_GOTO_AS(pAllow->type() != Json::objectValue,
+                              "jToken[\"webapi_allow\"].type() != Json::objectValue", Error);
+    pEntry = findMember(*pAllow, szWebapiName);
+    if (!pEntry) {
         VEMO_ATOKEN_DEBUG("webapi=%s not in allow list, jToken=%s", VEMO_ATOKEN_HERE, szWebapiName,
                           toString(jToken).c_str());
         goto Error;
@@ -176,10 +192,15 @@ int checkPermission(Json::Value& jToken, const char* szWebapiName, const char* s
         return 1;
     }
 
-    VEMO_ATOKEN_CHECK_GOTO(jToken["webapi_allow"][szWebapiName].type() != Json::objectValue, Error);
-    VEMO_ATOKEN_CHECK_GOTO(!jToken["webapi_allow"][szWebapiName].isMember("method"), Error);
-    VEMO_ATOKEN_CHECK_GOTO(jToken["webapi_allow"][szWebapiName]["method"].type() != Json::arrayValue, Error);
-    for (const Json::Value& jMethod : jToken["webapi_allow"][szWebapiName]["method"]) {
+    VEMO_ATOKEN_CHECK_GOTO_AS(pEntry->type() != Json::objectValue,
+                              "jToken[\"webapi_allow\"][szWebapiName].type() != Json::objectValue", Error);
+    pMethods = findMember(*pEntry, "method");
+    VEMO_ATOKEN_CHECK_GOTO_AS(!pMethods, "!jToken[\"webapi_allow\"][szWebapiName].isMember(\"method\")",
+                              Error);
+    VEMO_ATOKEN_CHECK_GOTO_AS(pMethods->type() != Json::arrayValue,
+                              "jToken[\"webapi_allow\"][szWebapiName][\"method\"].type() != Json::arrayValue",
+                              Error);
+    for (const Json::Value& jMethod : *pMethods) {
         if (jMethod.asString() == szWebapiMethod) {
             return 1;
         }

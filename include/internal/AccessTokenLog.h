@@ -1,4 +1,4 @@
-// The log lines and the failure checks: a small language of six macros.
+// The log lines and the failure checks: a small language of eight macros.
 //
 //   VEMO_ATOKEN_LOG(message, location, ...)        an ordinary line, always
 //   VEMO_ATOKEN_DEBUG(message, location, ...)      an ordinary line in debug mode only
@@ -6,6 +6,8 @@
 //   VEMO_ATOKEN_FAILED(szCondition, location)      the failure line of a condition that held
 //   VEMO_ATOKEN_CHECK_RETURN(condition, result)    if it holds: failure line, return result
 //   VEMO_ATOKEN_CHECK_GOTO(condition, label)       if it holds: failure line, jump to label
+//   VEMO_ATOKEN_CHECK_RETURN_AS, ..._GOTO_AS       the same with the text of the condition as second
+//                                                  argument, where the log has always shown another
 //
 // message is a literal without the closing newline; location is VEMO_ATOKEN_HERE or, in code
 // expanded from the field list, VEMO_ATOKEN_HERE_IN_LIST. Conditions are evaluated once, in every
@@ -29,15 +31,15 @@ namespace VEMO_ACCESS_TOKEN {
 
 // printf and syslog themselves: the system headers of a hardened build would replace them by
 // __printf_chk and __syslog_chk, and callers who interpose the plain names would miss the lines.
-extern "C" int logPrintf(const char* szFormat, ...) __asm__("printf");
-extern "C" void logSyslog(int nPriority, const char* szFormat, ...) __asm__("syslog");
+extern "C" int logPrintf(const char* szFormat, ...) __asm__("printf") __attribute__((cold));
+extern "C" void logSyslog(int nPriority, const char* szFormat, ...) __asm__("syslog") __attribute__((cold));
 
 // Never defined: lets the compiler compare a message with its arguments. (logPrintf cannot carry
 // the attribute, since ISO C++ knows no "%m".)
 int checkFormat(const char* szFormat, ...) __attribute__((format(printf, 1, 2)));
 
 // Writes the line of VEMO_ATOKEN_FAILED.
-void logFailed(const char* szCondition, const char* szFile, int nLine);
+void logFailed(const char* szCondition, const char* szFile, int nLine) __attribute__((cold));
 
 // What stands in a log line for text that may be missing.
 inline const char* textOrNull(const char* szText)
@@ -88,20 +90,23 @@ inline const char* textOrNull(const char* szText)
 
 #define VEMO_ATOKEN_FAILED(szCondition, ...) VEMO_ACCESS_TOKEN::logFailed(szCondition, __VA_ARGS__)
 
-// The two checks make their text themselves: passed on to another macro, the condition would have
-// its own macros (UID_ERR, SQLITE_OK) expanded first.
-#define VEMO_ATOKEN_CHECK_RETURN(condition, result)                                                          \
+// The text of a condition is made here, not further on: passed on to another macro, the condition
+// would have its own macros (UID_ERR, SQLITE_OK) expanded first.
+#define VEMO_ATOKEN_CHECK_RETURN(condition, result) VEMO_ATOKEN_CHECK_RETURN_AS(condition, #condition, result)
+#define VEMO_ATOKEN_CHECK_GOTO(condition, label) VEMO_ATOKEN_CHECK_GOTO_AS(condition, #condition, label)
+
+#define VEMO_ATOKEN_CHECK_RETURN_AS(condition, szCondition, result)                                          \
     do {                                                                                                     \
         if (condition) {                                                                                     \
-            VEMO_ATOKEN_FAILED(#condition, VEMO_ATOKEN_HERE);                                                \
+            VEMO_ATOKEN_FAILED(szCondition, VEMO_ATOKEN_HERE);                                               \
             return result;                                                                                   \
         }                                                                                                    \
     } while (0)
 
-#define VEMO_ATOKEN_CHECK_GOTO(condition, label)                                                             \
+#define VEMO_ATOKEN_CHECK_GOTO_AS(condition, szCondition, label)                                             \
     do {                                                                                                     \
         if (condition) {                                                                                     \
-            VEMO_ATOKEN_FAILED(#condition, VEMO_ATOKEN_HERE);                                                \
+            VEMO_ATOKEN_FAILED(szCondition, VEMO_ATOKEN_HERE);                                               \
             goto label;                                                                                      \
         }                                                                                                    \
     } while (0)

@@ -8,6 +8,7 @@
 #include <json/value.h>
 
 #include <string>
+#include <string_view>
 
 namespace VEMO_ACCESS_TOKEN {
 
@@ -19,7 +20,7 @@ std::string toString(const Json::Value& jValue);
 // Parses text into jValue. Never throws on bad text, and reports nothing: text that does not parse,
 // or is nested deeper than the reader allows (1000 levels), leaves in jValue what was read up to
 // there.
-void fromString(const std::string& strText, Json::Value& jValue);
+void fromString(std::string_view strText, Json::Value& jValue);
 
 } // namespace VEMO_ACCESS_TOKEN
 
