@@ -148,6 +148,23 @@ void appendTail(std::string_view strKeyword, Json::Int64 nValue, std::string& st
     }
 }
 
+// The record's member, made if it is missing. A field's name is not copied into each record: records
+// point at the names in the library, which for that reason is never unloaded.
+Json::Value& recordMember(Json::Value& jToken, const char* szName)
+{
+    static const Json::StaticString rgFieldName[] = {
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) Json::StaticString(#name),
+#include "internal/vemo-access-token-data-member"
+#undef VEMO_ATOKEN_DATA_MEMBER
+    };
+    for (const Json::StaticString& fieldName : rgFieldName) {
+        if (0 == strcmp(fieldName.c_str(), szName)) {
+            return jToken[fieldName];
+        }
+    }
+    return jToken[szName];
+}
+
 int FillField(Json::Value& jToken, char** column_name, char** column_value, int idx)
 {
     VEMO_ATOKEN_CHECK_RETURN(jToken.type() != Json::objectValue && jToken.type() != Json::nullValue, -1);
@@ -159,13 +176,13 @@ int FillField(Json::Value& jToken, char** column_name, char** column_value, int 
     const char* szValue = column_value[idx];
     const std::string_view strType = textOf(*pType);
     if (strType == "string") {
-        jToken[szName] = szValue;
+        recordMember(jToken, szName) = szValue;
     } else if (strType == "int") {
-        jToken[szName] = static_cast<Json::Int>(strtol(szValue, nullptr, 10));
+        recordMember(jToken, szName) = static_cast<Json::Int>(strtol(szValue, nullptr, 10));
     } else if (strType == "long long") {
-        jToken[szName] = static_cast<Json::Int64>(strtoll(szValue, nullptr, 10));
+        recordMember(jToken, szName) = static_cast<Json::Int64>(strtoll(szValue, nullptr, 10));
     } else if (Rendering::Json == renderingOf(strType)) {
-        fromString(szValue, jToken[szName]);
+        fromString(szValue, recordMember(jToken, szName));
     } else {
         VEMO_ATOKEN_FAIL("type error, strType=%s", VEMO_ATOKEN_HERE, pType->asString().c_str());
         return -1;

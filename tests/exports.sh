@@ -1,6 +1,6 @@
 #!/bin/bash
-# What the shared object shows to the outside: its name, what it exports, and what it calls that
-# callers may interpose.
+# What the shared object shows to the outside: its name, that it stays loaded, what it exports, and
+# what it calls that callers may interpose.
 # usage: exports.sh LIBRARY EXPORTED-SYMBOLS.TXT
 set -euo pipefail
 library=$1
@@ -10,6 +10,12 @@ status=0
 soname=$(objdump -p "$library" | awk '$1 == "SONAME" { print $2 }')
 if [ "$soname" != libvemoaccesstoken.so.6 ]; then
     echo "SONAME is $soname"
+    status=1
+fi
+
+# Records that callers keep point at names in the library.
+if ! readelf -d "$library" | grep -q NODELETE; then
+    echo "the library can be unloaded"
     status=1
 fi
 
