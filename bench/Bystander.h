@@ -1,0 +1,24 @@
+// Another process with a connection to the store in use, for as long as the object, or until this
+// process is gone. A connection of this process would not do: SQLite shares descriptors and locks
+// within a process.
+
+#ifndef VEMO_ACCESS_TOKEN_BENCH_BYSTANDER_H
+#define VEMO_ACCESS_TOKEN_BENCH_BYSTANDER_H
+
+#include <sys/types.h>
+
+class Bystander {
+public:
+    Bystander();
+    ~Bystander();
+    Bystander(const Bystander&) = delete;
+    Bystander& operator=(const Bystander&) = delete;
+
+private:
+    [[noreturn]] static void holdAndExit(int nEnd) noexcept;
+
+    int m_rgnEnd[2];
+    pid_t m_pid;
+};
+
+#endif

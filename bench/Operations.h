@@ -1,0 +1,38 @@
+// The operations that are measured: each exported function, and what a held object is used for.
+
+#ifndef VEMO_ACCESS_TOKEN_BENCH_OPERATIONS_H
+#define VEMO_ACCESS_TOKEN_BENCH_OPERATIONS_H
+
+#include <json/value.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "AccessTokenApi.h"
+#include "BareEngine.h"
+
+// What an operation works on.
+struct Call {
+    BareToken token;
+    Json::Value jArgument;
+    Json::Value jResult;
+    std::string strTid;
+    char szUser[64];
+    std::unique_ptr<AccessTokenApi> pApi; // the held object
+};
+
+struct Operation {
+    const char* szName;
+    void (*prepare)(Call&); // makes what the operation is to find; not measured
+    int (*run)(Call&);
+    int nExpected;          // what run returns
+    void (*runBare)(Call&); // what run must execute; null for a held object, and where that is nothing
+};
+
+const std::vector<Operation>& operations();
+
+// Deletes the tokens that operations and their preparation may leave in the store in use.
+void removeFreshTokens();
+
+#endif

@@ -1,0 +1,112 @@
+#include "Store.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <ctime>
+#include <filesystem>
+#include <random>
+
+#include "AccessTokenApi.h"
+
+namespace {
+
+const char* baseOf(Place place)
+{
+    const char* szBase = getenv(Place::Memory == place ? "VEMO_BENCH_MEMORY" : "VEMO_BENCH_DISK");
+    if (szBase) {
+        return szBase;
+    }
+    return Place::Memory == place ? "/dev/shm" : "/var/tmp";
+}
+
+std::string randomText(std::mt19937& source, size_t cchText)
+{
+    const char szAlphabet[] = "0987654321abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ";
+    std::uniform_int_distribution<size_t> draw(0, sizeof(szAlphabet) - 2);
+    std::string strText;
+    while (strText.size() < cchText) {
+        strText += szAlphabet[draw(source)];
+    }
+    return strText;
+}
+
+} // namespace
+
+const char* nameOf(Place place)
+{
+    return Place::Memory == place ? "memory" : "disk";
+}
+
+Store::Store(Place place) : m_nTokens(0)
+{
+    std::string strTemplate = std::string(baseOf(place)) + "/vemo-bench-XXXXXX";
+    if (!mkdtemp(strTemplate.data())) {
+        perror(strTemplate.c_str());
+        exit(1);
+    }
+    m_strDirectory = strTemplate;
+    use();
+    const AccessTokenApi creator;
+}
+
+Store::~Store()
+{
+    std::filesystem::remove_all(m_strDirectory);
+}
+
+void Store::use() const
+{
+    setenv("VEMO_REDIRECT_DIR", m_strDirectory.c_str(), 1);
+}
+
+void Store::grow(int nTokens)
+{
+    use();
+    BareEngine engine;
+    engine.run("PRAGMA cache_size = -2000000; BEGIN;");
+    for (; m_nTokens < nTokens; ++m_nTokens) {
+        engine.create(tokenOf(m_nTokens));
+    }
+    engine.run("COMMIT;");
+}
+
+void Store::makeIndexes()
+{
+    use();
+    BareEngine().run("CREATE INDEX token_deadline ON token (deadline);"
+                     "CREATE INDEX token_bind_sid ON token (bind_sid);"
+                     "CREATE INDEX token_function ON token (function);");
+}
+
+void Store::useWriteAheadLog()
+{
+    use();
+    BareEngine().run("PRAGMA journal_mode = WAL;");
+}
+
+BareToken tokenOf(int nNumber)
+{
+    std::mt19937 source(static_cast<unsigned int>(nNumber));
+    const long long nNow = time(nullptr);
+    BareToken token;
+    token.strTid = randomText(source, 127 + source() % 129);
+    token.strBindSid = randomText(source, 32);
+    token.nUid = 1000 + nNumber % 10;
+    token.nDeadline = nNow + 86400 + nNumber / 10;
+    token.nCount = 1000000;
+    token.nCreateTime = nNow;
+    token.strFunction = "purpose-" + std::to_string(nNumber % 100);
+    token.strWebapiAllow = R"({"Example.File":{"method":["get","list"]}})";
+    token.strExtra = "{}";
+    return token;
+}
+
+const char* webapi()
+{
+    return "Example.File";
+}
+
+const char* method()
+{
+    return "list";
+}

@@ -1,0 +1,218 @@
+// Runs each operation of the library once, for callgrind to count the instructions; instructions.sh runs
+// this program and reads the counts. With --environment it tells what the counts depend on instead.
+//
+// The functions through which the library leaves its own code are defined here once more, ahead of the
+// real ones, and cut the count: callgrind writes down the instructions since the last cut, under the
+// name of whoever executed them, and begins anew. An operation's last part is the library's own, and
+// bears the operation's name.
+
+#include <dlfcn.h>
+#include <gnu/libc-version.h>
+#include <json/version.h>
+#include <pwd.h>
+#include <sqlite3.h>
+#include <sys/random.h>
+#include <unistd.h>
+#include <valgrind/callgrind.h>
+
+#include <cstdio>
+#include <cstring>
+
+#include "Operations.h"
+#include "Store.h"
+
+#define INSTRUCTIONS_EXPORT __attribute__((visibility("default")))
+
+namespace {
+
+const char OWN[] = "own";          // the library, with all that it calls but for the two below
+const char SQLITE[] = "sqlite";    // opening, statements and closing
+const char STANDIN[] = "stand-in"; // what stands in for the system here, and is no part of any count
+
+const char* g_szRunning = OWN;
+bool g_blCounting = false;
+
+void passTo(const char* szNext)
+{
+    if (g_blCounting) {
+        CALLGRIND_DUMP_STATS_AT(g_szRunning);
+    }
+    g_szRunning = szNext;
+}
+
+// Until the end of the scope someone else is running.
+class Turn {
+public:
+    explicit Turn(const char* szWho) : m_szBefore(g_szRunning) { passTo(szWho); }
+    ~Turn() { passTo(m_szBefore); }
+    Turn(const Turn&) = delete;
+    Turn& operator=(const Turn&) = delete;
+
+private:
+    const char* const m_szBefore;
+};
+
+// The function of that name that would run if this program did not define it. Whoever needs one looks it
+// up once, in a first call that is not counted.
+template <typename Function>
+Function* next(const char* szName, Function* /* of this type */)
+{
+    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szName));
+}
+
+#define NEXT(name) next(#name, &name)
+
+typedef int RowCallback(void*, int, char**, char**);
+
+struct RowReceiver {
+    RowCallback* callback;
+    void* pArgument;
+};
+
+int receiveRow(void* pReceiver, int nColumns, char** rgszValue, char** rgszName)
+{
+    const Turn turn(OWN);
+    const RowReceiver& receiver = *static_cast<RowReceiver*>(pReceiver);
+    return receiver.callback(receiver.pArgument, nColumns, rgszValue, rgszName);
+}
+
+} // namespace
+
+extern "C" {
+
+INSTRUCTIONS_EXPORT int sqlite3_open(const char* szPath, sqlite3** ppDb)
+{
+    static const auto pNext = NEXT(sqlite3_open);
+    const Turn turn(SQLITE);
+    return pNext(szPath, ppDb);
+}
+
+INSTRUCTIONS_EXPORT int sqlite3_exec(sqlite3* pDb, const char* szSql, RowCallback* callback, void* pArgument,
+                                     char** pszError)
+{
+    static const auto pNext = NEXT(sqlite3_exec);
+    // SQLite reads the schema through this function too, with a callback of its own.
+    const bool blOurs = OWN == g_szRunning && callback;
+    RowReceiver receiver = {callback, pArgument};
+    const Turn turn(SQLITE);
+    return blOurs ? pNext(pDb, szSql, receiveRow, &receiver, pszError)
+                  : pNext(pDb, szSql, callback, pArgument, pszError);
+}
+
+INSTRUCTIONS_EXPORT int sqlite3_close(sqlite3* pDb)
+{
+    static const auto pNext = NEXT(sqlite3_close);
+    const Turn turn(SQLITE);
+    return pNext(pDb);
+}
+
+// The redirection (examples/redirect.cpp) follows these three.
+
+INSTRUCTIONS_EXPORT uid_t geteuid() noexcept
+{
+    static const auto pNext = NEXT(geteuid);
+    const Turn turn(STANDIN);
+    return pNext();
+}
+
+INSTRUCTIONS_EXPORT int seteuid(uid_t uid) noexcept
+{
+    static const auto pNext = NEXT(seteuid);
+    const Turn turn(STANDIN);
+    return pNext(uid);
+}
+
+INSTRUCTIONS_EXPORT int access(const char* szPath, int nMode) noexcept
+{
+    static const auto pNext = NEXT(access);
+    const Turn turn(STANDIN);
+    return pNext(szPath, nMode);
+}
+
+// The same bytes always, so that generated ids are of one length.
+INSTRUCTIONS_EXPORT ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned int /* flags */)
+{
+    const Turn turn(STANDIN);
+    unsigned char* pByte = static_cast<unsigned char*>(pBuffer);
+    for (size_t i = 0; i < cbBuffer; ++i) {
+        pByte[i] = static_cast<unsigned char>(7 * i);
+    }
+    return static_cast<ssize_t>(cbBuffer);
+}
+
+// The same name always, whatever users the machine has.
+INSTRUCTIONS_EXPORT int getpwuid_r(uid_t /* any */, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+                                   struct passwd** ppResult)
+{
+    const Turn turn(STANDIN);
+    snprintf(szBuffer, cbBuffer, "example");
+    pEntry->pw_name = szBuffer;
+    *ppResult = pEntry;
+    return 0;
+}
+
+} // extern "C"
+
+namespace {
+
+const int TOKENS = 10;
+
+int count(const Operation& operation, Call& call)
+{
+    CALLGRIND_ZERO_STATS;
+    g_blCounting = true;
+    const int nResult = operation.run(call);
+    g_blCounting = false;
+    CALLGRIND_DUMP_STATS_AT(operation.szName);
+    return nResult;
+}
+
+// Runs an operation twice, as what only a first call does is no part of the count.
+bool measure(const Operation& operation)
+{
+    for (const bool blCounted : {false, true}) {
+        Store store(Place::Memory);
+        store.grow(TOKENS);
+        Call call;
+        operation.prepare(call);
+        const int nResult = blCounted ? count(operation, call) : operation.run(call);
+        if (operation.nExpected != nResult) {
+            fprintf(stderr, "%s returned %d\n", operation.szName, nResult);
+            return false;
+        }
+    }
+    return true;
+}
+
+void tellEnvironment()
+{
+#ifdef __clang__
+    const char szCompiler[] = "clang++ " __clang_version__;
+#else
+    const char szCompiler[] = "g++ " __VERSION__;
+#endif
+#if defined(__OPTIMIZE__) && defined(__SSP_STRONG__) && 2 == _FORTIFY_SOURCE
+    const char szBuild[] = "optimised and hardened";
+#else
+    const char szBuild[] = "other than the release preset's";
+#endif
+    printf("compiler: %s\nbuild: %s\n", szCompiler, szBuild);
+    printf("SQLite: %s\njsoncpp: %s\n", sqlite3_libversion(), JSONCPP_VERSION_STRING);
+    printf("C library: glibc %s\n", gnu_get_libc_version());
+}
+
+} // namespace
+
+int main(int argc, char** argv)
+{
+    if (2 == argc && 0 == strcmp("--environment", argv[1])) {
+        tellEnvironment();
+        return 0;
+    }
+    for (const Operation& operation : operations()) {
+        if (!measure(operation)) {
+            return 1;
+        }
+    }
+    return 0;
+}

@@ -1,0 +1,132 @@
+#!/bin/bash
+# Counts the instructions of each operation with callgrind and holds them against a baseline, so that
+# what makes a call dearer shows on any machine, however busy it is.
+# usage: instructions.sh PROGRAM BASELINE [--update]
+#   --update   writes the counts to BASELINE
+# Exit status 77: skipped, for the reason printed.
+set -euo pipefail
+program=$(realpath "$1")
+baseline=$(realpath "$2")
+mode=${3-}
+
+# By how much, in per cent, a count may differ from the baseline's: that of all instructions of a call,
+# and that of the library's own, outside of sqlite3_open, sqlite3_exec and sqlite3_close. One build
+# counts the same within 0.02 %. The rest is for what moves pieces of the heap elsewhere, and for other
+# patch levels of compiler and libraries.
+tolerance_total=2
+tolerance_own=1
+
+# Two things that the C library would choose by itself. The functions on strings and memory are those
+# that every x86-64 processor can run. And malloc keeps all small pieces that it gets back as they are:
+# the work of joining and dividing them depends on everything that went before.
+functions=-AVX2,-AVX_Fast_Unaligned_Load,-ERMS,-Fast_Unaligned_Load,-SSE4_2,-SSSE3
+tunables=glibc.cpu.hwcaps=$functions:glibc.malloc.tcache_count=65535
+
+skip()
+{
+    echo "skipped: $1"
+    exit 77
+}
+
+# The environment without the last numbers of versions, which are taken to make no difference.
+comparable()
+{
+    sed -E 's/([0-9]+\.[0-9]+)\.[0-9]+.*/\1/'
+}
+
+[ "$(uname -m)" = x86_64 ] || skip "the counts are those of x86-64 processors"
+valgrind=$(command -v valgrind) || skip "valgrind is missing"
+
+# In memory, and by a name of the same length everywhere, since SQLite works on the path.
+dir=$(mktemp -d /dev/shm/vemo-instructions-XXXXXX)
+trap 'rm -rf "$dir"' EXIT
+
+"$program" --environment >"$dir/environment"
+if [ "$mode" != --update ]; then
+    if [ ! -s "$baseline" ]; then
+        echo "$baseline is missing"
+        exit 1
+    fi
+    difference=$(diff <(sed -n 's/^#   //p' "$baseline" | comparable) <(comparable <"$dir/environment")) ||
+        skip "the baseline (<) was not taken in this environment (>):"$'\n'"$difference"
+fi
+
+env -i LD_BIND_NOW=1 GLIBC_TUNABLES=$tunables VEMO_BENCH_MEMORY="$dir" \
+    "$valgrind" --command-line-only=yes -q --vgdb=no --tool=callgrind --combine-dumps=yes \
+    --callgrind-out-file="$dir/parts" "$program"
+
+# A part's summary is exact. Its "totals" are not: they take in some of what was executed before.
+awk '
+    /^desc: Trigger: / { who = /Client Request/ ? $NF : "" }
+    /^summary: / && who != "" {
+        if (who == "sqlite") {
+            sqlite += $2
+        } else if (who != "stand-in") {
+            own += $2
+        }
+        if (who !~ /^(own|sqlite|stand-in)$/) {
+            print who, own + sqlite, own
+            own = sqlite = 0
+        }
+    }' "$dir/parts" >"$dir/counts"
+
+if [ "$mode" = --update ]; then
+    {
+        echo "# Instructions of one call of each operation: all, and the library's own."
+        echo "# Written by instructions.sh --update, with"
+        sed 's/^/#   /' "$dir/environment"
+        awk '{ printf "%-18s %8d %8d\n", $1, $2, $3 }' "$dir/counts"
+    } | tee "$baseline"
+    exit
+fi
+
+awk -v tolerance_total=$tolerance_total -v tolerance_own=$tolerance_own '
+    # The columns of one count; "!" marks it as out of tolerance.
+    function compare(count, expected, tolerance,    difference, mark)
+    {
+        difference = 100 * (count - expected) / expected
+        mark = " "
+        if (difference > tolerance) {
+            more = 1
+            mark = "!"
+        } else if (difference < -tolerance) {
+            fewer = 1
+            mark = "!"
+        }
+        return sprintf("%9d %9d %+8.2f %%%s", count, expected, difference, mark)
+    }
+    BEGIN { print "operation              total  baseline difference        own  baseline difference" }
+    /^#/ { next }
+    FILENAME == ARGV[1] {
+        total[$1] = $2
+        own[$1] = $3
+        next
+    }
+    !($1 in total) {
+        printf "%-18s is not in the baseline\n", $1
+        changed = 1
+        next
+    }
+    {
+        printf "%-18s", $1
+        printf "%s", compare($2, total[$1], tolerance_total)
+        print compare($3, own[$1], tolerance_own)
+        delete total[$1]
+    }
+    END {
+        for (operation in total) {
+            printf "%-18s was not run\n", operation
+            changed = 1
+        }
+        print "tolerance: " tolerance_total " % of the total, " tolerance_own " % of the own"
+        if (more) {
+            print "FAILED: more instructions than the baseline has"
+        }
+        if (fewer) {
+            print "FAILED: fewer instructions: make them the baseline with --update"
+        }
+        if (changed) {
+            print "FAILED: other operations than the baseline has: if they are meant to be, --update"
+        }
+        exit more || fewer || changed
+    }' "$baseline" "$dir/counts"

@@ -1,0 +1,140 @@
+// Listing every token beside a plain query that builds the same values: what decoding costs, in time
+// and in memory.
+
+#include <benchmark/benchmark.h>
+#include <malloc.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <memory>
+
+#include "AccessTokenApi.h"
+#include "Run.h"
+#include "Samples.h"
+#include "Store.h"
+
+namespace {
+
+const int TOKENS = 100000;
+
+// The members that the columns hold as text but for the ids and texts, which come from the row.
+struct KnownValues {
+    Json::Value jUid;
+    Json::Value jDeadline;
+    Json::Value jCount;
+    Json::Value jCreateTime;
+    Json::Value jWebapiAllow;
+    Json::Value jExtra;
+};
+
+KnownValues knownValues()
+{
+    KnownValues known;
+    known.jUid = Json::Int64(1000);
+    known.jDeadline = Json::Int64(1800000000);
+    known.jCount = Json::Int64(1000000);
+    known.jCreateTime = Json::Int64(1800000000);
+    known.jWebapiAllow["Example.File"]["method"].append("get");
+    known.jWebapiAllow["Example.File"]["method"].append("list");
+    known.jExtra = Json::Value(Json::objectValue);
+    return known;
+}
+
+int appendRow(void* pArray, int /* nine */, char** rgszValue, char** /* names */)
+{
+    static const KnownValues known = knownValues();
+    Json::Value jToken(Json::objectValue);
+    jToken["tid"] = rgszValue[0];
+    jToken["bind_sid"] = rgszValue[1];
+    jToken["uid"] = known.jUid;
+    jToken["deadline"] = known.jDeadline;
+    jToken["count"] = known.jCount;
+    jToken["create_time"] = known.jCreateTime;
+    jToken["function"] = rgszValue[6];
+    jToken["webapi_allow"] = known.jWebapiAllow;
+    jToken["extra"] = known.jExtra;
+    static_cast<Json::Value*>(pArray)->append(std::move(jToken));
+    return 0;
+}
+
+Json::Value listBare(BareEngine& engine)
+{
+    Json::Value jTokens(Json::arrayValue);
+    engine.run("SELECT tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra FROM token ;",
+               appendRow, &jTokens);
+    return jTokens;
+}
+
+Json::Value listOurs(AccessTokenApi& api)
+{
+    Json::Value jAll;
+    Json::Value jTokens(Json::arrayValue);
+    if (0 != api.tokenList(jAll, jTokens) || TOKENS != jTokens.size()) {
+        fprintf(stderr, "the library failed\n");
+        exit(1);
+    }
+    return jTokens;
+}
+
+void time(benchmark::State& state)
+{
+    Store store(Place::Memory);
+    store.grow(TOKENS);
+    AccessTokenApi api;
+    BareEngine engine;
+    Samples ours;
+    Samples bare;
+    for (auto _ : state) {
+        malloc_trim(0);
+        bare.time([&] { return listBare(engine); });
+        malloc_trim(0);
+        ours.time([&] { return listOurs(api); });
+        state.SetIterationTime(ours.last());
+    }
+    state.counters["ours_us"] = ours.percentile(50) * 1e6;
+    state.counters["bare_us"] = bare.percentile(50) * 1e6;
+    state.counters["ratio"] = ours.percentile(50) / bare.percentile(50);
+}
+
+// A number of kilobytes that the kernel tells of this process.
+long status(const std::string& strName)
+{
+    std::ifstream file("/proc/self/status");
+    std::string strLine;
+    while (std::getline(file, strLine)) {
+        if (0 == strLine.compare(0, strName.size(), strName)) {
+            return std::stol(strLine.substr(strName.size()));
+        }
+    }
+    return 0;
+}
+
+void memory(benchmark::State& state)
+{
+    Store store(Place::Memory);
+    store.grow(TOKENS);
+    for (auto _ : state) {
+        auto pApi = std::make_unique<AccessTokenApi>();
+        malloc_trim(0);
+        std::ofstream("/proc/self/clear_refs") << "5"; // the peak is now what there is now
+        const long nBefore = status("VmRSS:");
+        const Json::Value jTokens = listOurs(*pApi);
+        const long nPeak = status("VmHWM:") - nBefore;
+        pApi.reset();
+        malloc_trim(0);
+        const long nValues = status("VmRSS:") - nBefore;
+        state.counters["peak_kB"] = static_cast<double>(nPeak);
+        state.counters["values_kB"] = static_cast<double>(nValues);
+        state.counters["ratio"] = static_cast<double>(nPeak) / static_cast<double>(nValues);
+    }
+}
+
+} // namespace
+
+int main(int argc, char** argv)
+{
+    benchmark::RegisterBenchmark("Listing/time", time)->UseManualTime()->Iterations(10);
+    benchmark::RegisterBenchmark("Listing/memory", memory)->Iterations(1);
+    return runBenchmarks(argc, argv);
+}
