@@ -36,6 +36,7 @@ comparable()
 
 [ "$(uname -m)" = x86_64 ] || skip "the counts are those of x86-64 processors"
 valgrind=$(command -v valgrind) || skip "valgrind is missing"
+[ -w /dev/shm ] || skip "there is no /dev/shm"
 
 # In memory, and by a name of the same length everywhere, since SQLite works on the path.
 dir=$(mktemp -d /dev/shm/vemo-instructions-XXXXXX)
