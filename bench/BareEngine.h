@@ -7,7 +7,6 @@
 #ifndef VEMO_ACCESS_TOKEN_BARE_ENGINE_H
 #define VEMO_ACCESS_TOKEN_BARE_ENGINE_H
 
-#include <array>
 #include <string>
 
 struct sqlite3;

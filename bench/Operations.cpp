@@ -5,7 +5,6 @@
 
 namespace {
 
-const int FRESH = 100000000; // the number of a token that no store holds by itself
 const char* const FRESH_FUNCTION = "fresh";
 
 BareToken freshToken(long long nCount)
@@ -147,6 +146,12 @@ void bareGrant(Call& call)
     engine.grant(call.token.strTid);
 }
 
+int controlGrant(Call& call)
+{
+    bareGrant(call);
+    return 0;
+}
+
 void bareRead(Call& call)
 {
     BareEngine engine;
@@ -194,6 +199,12 @@ const std::vector<Operation>& operations()
         {"tokenGrant.saved", holdConnection, tokenGrant, 0, nullptr},
     };
     return rgOperation;
+}
+
+const Operation& control()
+{
+    static const Operation operation = {"Control", useStoredToken, controlGrant, 0, bareGrant};
+    return operation;
 }
 
 void removeFreshTokens()

@@ -32,6 +32,9 @@ struct Operation {
 
 const std::vector<Operation>& operations();
 
+// The bare engine in the place of the library.
+const Operation& control();
+
 // Deletes the tokens that operations and their preparation may leave in the store in use.
 void removeFreshTokens();
 

@@ -44,6 +44,10 @@ private:
 // of 0 to n - 1. Each has many uses left and two methods of one API (webapi() and
 // method()), and expires in a day, ten tokens a second.
 BareToken tokenOf(int nNumber);
+
+const int FRESH = 100000000; // the number of a token that no store holds by itself
+
+// What the tokens allow, among others.
 const char* webapi();
 const char* method();
 

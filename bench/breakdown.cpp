@@ -22,7 +22,6 @@
 #undef _FORTIFY_SOURCE // with it, headers define functions that this program defines
 
 #include <benchmark/benchmark.h>
-#include <dlfcn.h>
 #include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/mman.h>
@@ -40,6 +39,7 @@
 
 #include "AccessTokenApi.h"
 #include "Bystander.h"
+#include "Interpose.h"
 #include "Run.h"
 #include "Samples.h"
 #include "Store.h"
@@ -137,18 +137,9 @@ void count(Quantity call)
 
 } // namespace
 
-#define BREAKDOWN_EXPORT __attribute__((visibility("default")))
-
-// The function of that name that would run if this program did not define it; looked up once.
-#define NEXT(name)                                                                                           \
-    ([] {                                                                                                    \
-        static const auto pNext = reinterpret_cast<decltype(&::name)>(dlsym(RTLD_NEXT, #name));              \
-        return pNext;                                                                                        \
-    }())
-
 // Defines a function that counts its calls.
 #define COUNTED(call, result, name, parameters, arguments)                                                   \
-    BREAKDOWN_EXPORT result name parameters                                                                  \
+    INTERPOSED result name parameters                                                                        \
     {                                                                                                        \
         count(call);                                                                                         \
         return NEXT(name) arguments;                                                                         \
@@ -156,20 +147,20 @@ void count(Quantity call)
 
 extern "C" {
 
-BREAKDOWN_EXPORT int sqlite3_open(const char* szPath, sqlite3** ppDb)
+INTERPOSED int sqlite3_open(const char* szPath, sqlite3** ppDb)
 {
     const Step step(Open);
     return NEXT(sqlite3_open)(szPath, ppDb);
 }
 
-BREAKDOWN_EXPORT int sqlite3_close(sqlite3* pDb)
+INTERPOSED int sqlite3_close(sqlite3* pDb)
 {
     const Step step(Close);
     return NEXT(sqlite3_close)(pDb);
 }
 
-BREAKDOWN_EXPORT int sqlite3_exec(sqlite3* pDb, const char* szSql,
-                                  int (*callback)(void*, int, char**, char**), void* arg, char** pszErr)
+INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(void*, int, char**, char**),
+                            void* arg, char** pszErr)
 {
     if (Library != g_step) { // SQLite reads the schema in the middle of a statement
         return NEXT(sqlite3_exec)(pDb, szSql, callback, arg, pszErr);
@@ -179,7 +170,7 @@ BREAKDOWN_EXPORT int sqlite3_exec(sqlite3* pDb, const char* szSql,
     return NEXT(sqlite3_exec)(pDb, szSql, callback ? runRowCallback : nullptr, &row, pszErr);
 }
 
-BREAKDOWN_EXPORT int open64(const char* szPath, int nFlags, ...)
+INTERPOSED int open64(const char* szPath, int nFlags, ...)
 {
     va_list args;
     va_start(args, nFlags);
@@ -189,7 +180,7 @@ BREAKDOWN_EXPORT int open64(const char* szPath, int nFlags, ...)
     return NEXT(open64)(szPath, nFlags, mode);
 }
 
-BREAKDOWN_EXPORT int fcntl64(int nFile, int nCommand, ...)
+INTERPOSED int fcntl64(int nFile, int nCommand, ...)
 {
     va_list args;
     va_start(args, nCommand);

@@ -11,7 +11,6 @@
 //                       had read the same count, or wrote back an older one
 
 #include <benchmark/benchmark.h>
-#include <dlfcn.h>
 #include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/file.h>
@@ -32,6 +31,7 @@
 #include <vector>
 
 #include "AccessTokenUtil.h"
+#include "Interpose.h"
 #include "Run.h"
 #include "Samples.h"
 #include "Store.h"
@@ -50,12 +50,10 @@ long long g_nWritten = 0;
 } // namespace
 
 // Found ahead of SQLite's own, by the library too.
-extern "C" __attribute__((visibility("default"))) int
-sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(void*, int, char**, char**), void* arg,
-             char** pszErr)
+extern "C" INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql,
+                                       int (*callback)(void*, int, char**, char**), void* arg, char** pszErr)
 {
-    static const auto next = reinterpret_cast<decltype(&sqlite3_exec)>(dlsym(RTLD_NEXT, "sqlite3_exec"));
-    const int nResult = next(pDb, szSql, callback, arg, pszErr);
+    const int nResult = NEXT(sqlite3_exec)(pDb, szSql, callback, arg, pszErr);
     if (SQLITE_OK == nResult && 0 == strncmp(szSql, "REPLACE", strlen("REPLACE"))) {
         ++g_nWritten;
     }

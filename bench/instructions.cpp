@@ -6,7 +6,6 @@
 // name of whoever executed them, and begins anew. An operation's last part is the library's own, and
 // bears the operation's name.
 
-#include <dlfcn.h>
 #include <gnu/libc-version.h>
 #include <json/version.h>
 #include <pwd.h>
@@ -18,10 +17,9 @@
 #include <cstdio>
 #include <cstring>
 
+#include "Interpose.h"
 #include "Operations.h"
 #include "Store.h"
-
-#define INSTRUCTIONS_EXPORT __attribute__((visibility("default")))
 
 namespace {
 
@@ -52,16 +50,6 @@ private:
     const char* const m_szBefore;
 };
 
-// The function of that name that would run if this program did not define it. Whoever needs one looks it
-// up once, in a first call that is not counted.
-template <typename Function>
-Function* next(const char* szName, Function* /* of this type */)
-{
-    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szName));
-}
-
-#define NEXT(name) next(#name, &name)
-
 typedef int RowCallback(void*, int, char**, char**);
 
 struct RowReceiver {
@@ -80,57 +68,51 @@ int receiveRow(void* pReceiver, int nColumns, char** rgszValue, char** rgszName)
 
 extern "C" {
 
-INSTRUCTIONS_EXPORT int sqlite3_open(const char* szPath, sqlite3** ppDb)
+INTERPOSED int sqlite3_open(const char* szPath, sqlite3** ppDb)
 {
-    static const auto pNext = NEXT(sqlite3_open);
     const Turn turn(SQLITE);
-    return pNext(szPath, ppDb);
+    return NEXT(sqlite3_open)(szPath, ppDb);
 }
 
-INSTRUCTIONS_EXPORT int sqlite3_exec(sqlite3* pDb, const char* szSql, RowCallback* callback, void* pArgument,
-                                     char** pszError)
+INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql, RowCallback* callback, void* pArgument,
+                            char** pszError)
 {
-    static const auto pNext = NEXT(sqlite3_exec);
     // SQLite reads the schema through this function too, with a callback of its own.
     const bool blOurs = OWN == g_szRunning && callback;
     RowReceiver receiver = {callback, pArgument};
     const Turn turn(SQLITE);
-    return blOurs ? pNext(pDb, szSql, receiveRow, &receiver, pszError)
-                  : pNext(pDb, szSql, callback, pArgument, pszError);
+    return blOurs ? NEXT(sqlite3_exec)(pDb, szSql, receiveRow, &receiver, pszError)
+                  : NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
 }
 
-INSTRUCTIONS_EXPORT int sqlite3_close(sqlite3* pDb)
+INTERPOSED int sqlite3_close(sqlite3* pDb)
 {
-    static const auto pNext = NEXT(sqlite3_close);
     const Turn turn(SQLITE);
-    return pNext(pDb);
+    return NEXT(sqlite3_close)(pDb);
 }
 
 // The redirection (examples/redirect.cpp) follows these three.
 
-INSTRUCTIONS_EXPORT uid_t geteuid() noexcept
+INTERPOSED uid_t geteuid() noexcept
 {
-    static const auto pNext = NEXT(geteuid);
     const Turn turn(STANDIN);
-    return pNext();
+    return NEXT(geteuid)();
 }
 
-INSTRUCTIONS_EXPORT int seteuid(uid_t uid) noexcept
+INTERPOSED int seteuid(uid_t uid) noexcept
 {
-    static const auto pNext = NEXT(seteuid);
     const Turn turn(STANDIN);
-    return pNext(uid);
+    return NEXT(seteuid)(uid);
 }
 
-INSTRUCTIONS_EXPORT int access(const char* szPath, int nMode) noexcept
+INTERPOSED int access(const char* szPath, int nMode) noexcept
 {
-    static const auto pNext = NEXT(access);
     const Turn turn(STANDIN);
-    return pNext(szPath, nMode);
+    return NEXT(access)(szPath, nMode);
 }
 
 // The same bytes always, so that generated ids are of one length.
-INSTRUCTIONS_EXPORT ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned int /* flags */)
+INTERPOSED ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned int /* flags */)
 {
     const Turn turn(STANDIN);
     unsigned char* pByte = static_cast<unsigned char*>(pBuffer);
@@ -141,8 +123,8 @@ INSTRUCTIONS_EXPORT ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned i
 }
 
 // The same name always, whatever users the machine has.
-INSTRUCTIONS_EXPORT int getpwuid_r(uid_t /* any */, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
-                                   struct passwd** ppResult)
+INTERPOSED int getpwuid_r(uid_t /* any */, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+                          struct passwd** ppResult)
 {
     const Turn turn(STANDIN);
     snprintf(szBuffer, cbBuffer, "example");

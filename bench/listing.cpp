@@ -18,7 +18,7 @@ namespace {
 
 const int TOKENS = 100000;
 
-// The members that the columns hold as text but for the ids and texts, which come from the row.
+// What the plain query is spared to read: numbers and JSON. The other columns are copied from the row.
 struct KnownValues {
     Json::Value jUid;
     Json::Value jDeadline;
@@ -45,15 +45,15 @@ int appendRow(void* pArray, int /* nine */, char** rgszValue, char** /* names */
 {
     static const KnownValues known = knownValues();
     Json::Value jToken(Json::objectValue);
-    jToken["tid"] = rgszValue[0];
-    jToken["bind_sid"] = rgszValue[1];
-    jToken["uid"] = known.jUid;
-    jToken["deadline"] = known.jDeadline;
-    jToken["count"] = known.jCount;
-    jToken["create_time"] = known.jCreateTime;
-    jToken["function"] = rgszValue[6];
-    jToken["webapi_allow"] = known.jWebapiAllow;
-    jToken["extra"] = known.jExtra;
+    jToken[Json::StaticString("tid")] = rgszValue[0];
+    jToken[Json::StaticString("bind_sid")] = rgszValue[1];
+    jToken[Json::StaticString("uid")] = known.jUid;
+    jToken[Json::StaticString("deadline")] = known.jDeadline;
+    jToken[Json::StaticString("count")] = known.jCount;
+    jToken[Json::StaticString("create_time")] = known.jCreateTime;
+    jToken[Json::StaticString("function")] = rgszValue[6];
+    jToken[Json::StaticString("webapi_allow")] = known.jWebapiAllow;
+    jToken[Json::StaticString("extra")] = known.jExtra;
     static_cast<Json::Value*>(pArray)->append(std::move(jToken));
     return 0;
 }
@@ -77,7 +77,7 @@ Json::Value listOurs(AccessTokenApi& api)
     return jTokens;
 }
 
-void time(benchmark::State& state)
+void listingTime(benchmark::State& state)
 {
     Store store(Place::Memory);
     store.grow(TOKENS);
@@ -110,14 +110,17 @@ long status(const std::string& strName)
     return 0;
 }
 
-void memory(benchmark::State& state)
+void listingMemory(benchmark::State& state)
 {
     Store store(Place::Memory);
     store.grow(TOKENS);
     for (auto _ : state) {
         auto pApi = std::make_unique<AccessTokenApi>();
         malloc_trim(0);
-        std::ofstream("/proc/self/clear_refs") << "5"; // the peak is now what there is now
+        if (!(std::ofstream("/proc/self/clear_refs") << "5" << std::flush)) { // the peak is now what there is
+            state.SkipWithError("the kernel does not forget the peak");
+            return;
+        }
         const long nBefore = status("VmRSS:");
         const Json::Value jTokens = listOurs(*pApi);
         const long nPeak = status("VmHWM:") - nBefore;
@@ -134,7 +137,7 @@ void memory(benchmark::State& state)
 
 int main(int argc, char** argv)
 {
-    benchmark::RegisterBenchmark("Listing/time", time)->UseManualTime()->Iterations(10);
-    benchmark::RegisterBenchmark("Listing/memory", memory)->Iterations(1);
+    benchmark::RegisterBenchmark("Listing/time", listingTime)->UseManualTime()->Iterations(10);
+    benchmark::RegisterBenchmark("Listing/memory", listingMemory)->Iterations(1);
     return runBenchmarks(argc, argv);
 }

@@ -162,7 +162,7 @@ Json::Value& recordMember(Json::Value& jToken, const char* szName)
             return jToken[fieldName];
         }
     }
-    return jToken[szName];
+    return jToken[szName]; // a field that has been added to tokenType() meanwhile
 }
 
 int FillField(Json::Value& jToken, char** column_name, char** column_value, int idx)

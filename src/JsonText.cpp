@@ -30,21 +30,29 @@ std::unique_ptr<Json::CharReader> makeReader()
     return std::unique_ptr<Json::CharReader>(builder.newCharReader());
 }
 
+std::unique_ptr<std::ostringstream> makeStream()
+{
+    auto pStream = std::make_unique<std::ostringstream>();
+    // A stream would hide that its memory ran out, and the text would be cut short.
+    pStream->exceptions(std::ios_base::badbit);
+    return pStream;
+}
+
 // A writer and a reader, which cost more to make than a token's texts to write and to read.
 class Codec {
 public:
-    Codec() : m_pWriter(makeWriter()), m_pReader(makeReader())
-    {
-        // A stream would hide that its memory ran out, and the text would be cut short.
-        m_stream.exceptions(std::ios_base::badbit);
-    }
+    Codec() : m_pWriter(makeWriter()), m_pReader(makeReader()), m_pStream(makeStream()) {}
 
     std::string write(const Json::Value& jValue)
     {
-        m_stream.clear();
-        m_stream.str(std::string());
-        m_pWriter->write(jValue, &m_stream);
-        return m_stream.str();
+        m_pStream->clear();
+        m_pStream->str(std::string());
+        m_pWriter->write(jValue, m_pStream.get());
+        std::string strText = m_pStream->str();
+        if (KEPT_MAX < strText.size()) {
+            m_pStream = makeStream();
+        }
+        return strText;
     }
 
     void read(std::string_view strText, Json::Value& jValue)
@@ -58,9 +66,11 @@ public:
     }
 
 private:
+    static constexpr size_t KEPT_MAX = 4096; // the longest text whose memory is kept for the next
+
     const std::unique_ptr<Json::StreamWriter> m_pWriter;
     const std::unique_ptr<Json::CharReader> m_pReader;
-    std::ostringstream m_stream;
+    std::unique_ptr<std::ostringstream> m_pStream;
 };
 
 // Set when the thread has destroyed its codec. It needs no destruction itself, so it can be read to

@@ -1,6 +1,7 @@
-// The library while the process exits.
+// The library while a thread or the process ends.
 
 #include <cstdlib>
+#include <thread>
 
 #include "StoreTest.h"
 #include "vemo-access-token.h"
@@ -34,6 +35,35 @@ TEST_F(Exit, HandlersCanStillGrant)
             exit(2);
         },
         ::testing::ExitedWithCode(0), "");
+}
+
+// Grants when it is destroyed.
+struct LastGrant {
+    bool* pGranted = nullptr;
+    ~LastGrant()
+    {
+        Json::Value jToken;
+        *pGranted = 0 == VemoAccessTokenGrantEx(g_strTid, "Api", nullptr, jToken) &&
+                    json(R"({"Api": {}})") == jToken["webapi_allow"];
+    }
+};
+
+TEST_F(Exit, ThreadsCanStillGrantAtTheirEnd)
+{
+    unsigned int uid = 0;
+    std::string strFunction = "VPN";
+    Json::Value jOption = json(R"({"count": 3, "webapi_allow": {"Api": {}}})");
+    ASSERT_EQ(0, VemoAccessTokenCreate(uid, strFunction, jOption, g_strTid));
+
+    bool blGranted = false;
+    std::thread([&] {
+        // Made ahead of what the library keeps for the thread, so destroyed after it.
+        static thread_local LastGrant lastGrant;
+        lastGrant.pGranted = &blGranted;
+        Json::Value jToken;
+        VemoAccessTokenGrantEx(g_strTid, "Api", nullptr, jToken);
+    }).join();
+    EXPECT_TRUE(blGranted);
 }
 
 } // namespace

@@ -1,5 +1,5 @@
-// The same grant on this library, on Redis and on PostgreSQL, side by side. with-peers starts
-// the two servers and runs this program.
+// The same grant on this library, on Redis and on PostgreSQL, side by side. with-peers starts the
+// servers and runs this program.
 //
 // Every contender holds 1000 tokens. One more is made, which is not timed, and granted until its
 // last use deletes it; each of these grants is timed. A repetition begins with fresh data, so that
@@ -22,7 +22,6 @@
 namespace {
 
 const int TOKENS = 1000;
-const int FRESH = 100000000; // the number of a token that is not among them
 const int USES = 10;
 const int CALLS = 200; // of a repetition: the whole lives of some tokens
 
