@@ -1,8 +1,9 @@
 // Lets a program that uses the token library run without root and without the real database: preload
 // this shared object (or link it ahead of the library) and name a directory of your own in
-// VEMO_REDIRECT_DIR. The database is then that directory's vemo-access-token.db, and the effective
-// uid that the process sees and sets is a number kept here, 0 at first. Without the variable,
-// everything goes through unchanged.
+// VEMO_REDIRECT_DIR. It takes the place of the private directory that holds the database. The
+// effective uid that the process sees and sets is a number kept here, 0 at first, and what belongs to
+// the real user there belongs to root for the process. Without the variable, everything goes through
+// unchanged.
 
 #include <dlfcn.h>
 #include <fcntl.h>
@@ -28,12 +29,23 @@ const char* directory()
     return getenv("VEMO_REDIRECT_DIR");
 }
 
+// The private directory and all paths in it.
 std::string redirected(const char* szPath)
 {
-    if (0 == strcmp(VEMO_ATOKEN_DB_PATH, szPath) && directory()) {
-        return std::string(directory()) + "/vemo-access-token.db";
+    static const std::string strPrivate(VEMO_ATOKEN_DB_PATH, strrchr(VEMO_ATOKEN_DB_PATH, '/'));
+    const size_t cchPrivate = strPrivate.size();
+    const bool blPrivate = 0 == strPrivate.compare(0, cchPrivate, szPath, strnlen(szPath, cchPrivate)) &&
+                           (szPath[cchPrivate] == '\0' || szPath[cchPrivate] == '/');
+    return blPrivate && directory() ? std::string(directory()) + &szPath[cchPrivate] : szPath;
+}
+
+// What a path's status says when the real user is taken for root.
+int redirectedStatus(int nResult, struct stat* pStatus)
+{
+    if (0 == nResult && directory() && pStatus->st_uid == getuid()) {
+        pStatus->st_uid = 0;
     }
-    return szPath;
+    return nResult;
 }
 
 } // namespace
@@ -71,9 +83,24 @@ REDIRECT_EXPORT int chmod(const char* szPath, mode_t mode) noexcept
     return NEXT(chmod)(redirected(szPath).c_str(), mode);
 }
 
+REDIRECT_EXPORT int chown(const char* szPath, uid_t uid, gid_t gid) noexcept
+{
+    return NEXT(chown)(redirected(szPath).c_str(), directory() && 0 == uid ? getuid() : uid, gid);
+}
+
+REDIRECT_EXPORT int mkdir(const char* szPath, mode_t mode) noexcept
+{
+    return NEXT(mkdir)(redirected(szPath).c_str(), mode);
+}
+
 REDIRECT_EXPORT int stat(const char* szPath, struct stat* pStatus) noexcept
 {
-    return NEXT(stat)(redirected(szPath).c_str(), pStatus);
+    return redirectedStatus(NEXT(stat)(redirected(szPath).c_str(), pStatus), pStatus);
+}
+
+REDIRECT_EXPORT int lstat(const char* szPath, struct stat* pStatus) noexcept
+{
+    return redirectedStatus(NEXT(lstat)(redirected(szPath).c_str(), pStatus), pStatus);
 }
 
 REDIRECT_EXPORT int open(const char* szPath, int nFlags, ...)

@@ -27,7 +27,8 @@ install_packages()
 
 # shellcheck disable=SC2034 # for those who source this
 {
-    BUILD_PACKAGES=(g++ cmake ninja-build libjsoncpp-dev libsqlite3-dev)
+    BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libcli11-dev libsmartcols-dev
+        libbsd-dev)
     BENCH_PACKAGES=(libbenchmark-dev)
     PEER_PACKAGES=(libhiredis-dev libpq-dev) # to build what measures Redis and PostgreSQL
 }

@@ -1,0 +1,127 @@
+// create and generate: new tokens, new ids.
+
+#include <ctime>
+#include <memory>
+
+#include "AccessTokenDefine.h"
+#include "AccessTokenUtil.h"
+#include "Arguments.h"
+#include "Commands.h"
+#include "Console.h"
+#include "Store.h"
+
+namespace {
+
+struct Options {
+    std::optional<unsigned int> nUid;
+    std::string strFunction;
+    std::optional<int64_t> nTtl;
+    std::optional<int64_t> nCount;
+    std::vector<tool::Allowance> allowances;
+    std::string strSid;
+    std::optional<Json::Value> jExtra;
+    std::string strTid;
+};
+
+const int64_t TTL_DEFAULT = 86400; // the library's
+
+std::string newTid()
+{
+    std::string strTid;
+    if (0 > VEMO_ACCESS_TOKEN::tokenGenerate(strTid)) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, "the kernel gives no random numbers");
+    }
+    return strTid;
+}
+
+std::string ownTid(const std::string& strArgument)
+{
+    const std::string strTid = tool::readTid(strArgument);
+    if (strTid.size() < VEMO_ATOKEN_LENGTH_MIN) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE,
+                            "--tid: an id needs " + std::to_string(VEMO_ATOKEN_LENGTH_MIN) +
+                                " characters at least, this one has " + std::to_string(strTid.size()));
+    }
+    return strTid;
+}
+
+Json::Value recordOf(const Options& options)
+{
+    Json::Value jToken(Json::objectValue);
+    jToken["tid"] = options.strTid.empty() ? newTid() : ownTid(options.strTid);
+    jToken["bind_sid"] = options.strSid;
+    jToken["uid"] = *options.nUid;
+    jToken["create_time"] = Json::Int64{time(nullptr)};
+    jToken["deadline"] = jToken["create_time"].asInt64() + options.nTtl.value_or(TTL_DEFAULT);
+    jToken["count"] = Json::Int64{options.nCount.value_or(1)};
+    jToken["function"] = options.strFunction;
+    jToken["webapi_allow"] = tool::allowanceJson(options.allowances);
+    jToken["extra"] = options.jExtra.value_or(Json::Value(Json::objectValue));
+    return jToken;
+}
+
+// Deletes a token whose id nobody got to know.
+void takeBack(const std::string& strTid)
+{
+    tool::Store store(tool::Store::Access::Write);
+    store.removeTid(strTid);
+    store.commit();
+}
+
+int create(const Options& options)
+{
+    if (!options.nUid) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, "--uid or --user is required");
+    }
+    const Json::Value jToken = recordOf(options);
+    const std::string strTid = jToken["tid"].asString();
+    tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
+    store.purge();
+    if (store.find(strTid)) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, "--tid: there is a token with this id already");
+    }
+    store.create(jToken);
+    store.commit();
+    try {
+        tool::print(strTid + "\n");
+        tool::flushResult();
+    } catch (const tool::Failure& failure) {
+        takeBack(strTid);
+        throw tool::Failure(failure.status(), std::string(failure.what()) + "; the token was taken back");
+    }
+    return tool::EXIT_STATUS_DONE;
+}
+
+} // namespace
+
+namespace tool {
+
+void addCreate(Commands& commands)
+{
+    auto pOptions = std::make_shared<Options>();
+    CLI::App& command = commands.add("create", "create a token and print its id, this once",
+                                     [pOptions] { return create(*pOptions); });
+    addUser(command, pOptions->nUid);
+    command.add_option("--function", pOptions->strFunction, "its purpose")
+        ->required()
+        ->check(notEmpty())
+        ->type_name("TAG");
+    addTtl(command, pOptions->nTtl)->default_str("1d");
+    addUses(command, pOptions->nCount);
+    addAllowances(command, "--allow", pOptions->allowances, "an API, and methods of it, that it opens");
+    command.add_option("--bind-sid", pOptions->strSid, "bind it to this login session")->type_name("SID");
+    addExtra(command, pOptions->jExtra);
+    command.add_option("--tid", pOptions->strTid, "an id of your own; \"-\" reads it from standard input")
+        ->type_name("TID");
+}
+
+void addGenerate(Commands& commands)
+{
+    const auto generate = [] {
+        print(newTid() + "\n");
+        return EXIT_STATUS_DONE;
+    };
+    commands.add("generate", "print a fresh id; touches no database", generate, Commands::Needs::Nothing);
+}
+
+} // namespace tool

@@ -1,0 +1,118 @@
+// doctor: says what is wrong, what that means and what helps.
+
+#include <memory>
+
+#include "Commands.h"
+#include "Console.h"
+#include "Examination.h"
+#include "Failure.h"
+#include "Json.h"
+#include "Layout.h"
+
+namespace {
+
+using tool::Finding;
+
+const int ROUNDS_MAX = 5; // what one repair lets doctor look at can need the next
+
+struct Options {
+    bool blRepair = false;
+    tool::Layout layout;
+};
+
+const char* severityText(const Finding& finding)
+{
+    return Finding::Severity::Error == finding.severity ? "error" : "warning";
+}
+
+Json::Value jsonOf(const Finding& finding, bool blRepaired)
+{
+    Json::Value jFinding;
+    jFinding["severity"] = severityText(finding);
+    jFinding["finding"] = finding.strWhat;
+    jFinding["meaning"] = finding.strMeaning;
+    jFinding["remedy"] = finding.strRemedy;
+    jFinding["repaired"] = blRepaired;
+    return jFinding;
+}
+
+void printText(const Finding& finding, bool blRepaired)
+{
+    const bool blError = Finding::Severity::Error == finding.severity;
+    const char* szColour = blRepaired ? "\x1b[32m" : blError ? "\x1b[31m" : "\x1b[33m";
+    const bool blColoured = tool::isColoured(tool::resultStream());
+    const std::string strMark = blRepaired ? "repaired" : severityText(finding);
+    tool::print((blColoured ? szColour + strMark + "\x1b[0m" : strMark) + ": " +
+                tool::printable(finding.strWhat) + "\n    meaning: " + tool::printable(finding.strMeaning) +
+                "\n");
+    if (!blRepaired) {
+        tool::print("    remedy: " + tool::printable(finding.strRemedy) + "\n");
+    }
+}
+
+void report(const std::vector<Finding>& repaired, const std::vector<Finding>& left,
+            const tool::Layout& layout)
+{
+    Json::Value jFindings(Json::arrayValue);
+    const auto add = [&](const Finding& finding, bool blRepaired) {
+        if (tool::Layout::Form::Table == layout.form) {
+            printText(finding, blRepaired);
+        } else if (tool::Layout::Form::JsonLines == layout.form) {
+            tool::print(tool::compactJson(jsonOf(finding, blRepaired)) + "\n");
+        }
+        jFindings.append(jsonOf(finding, blRepaired));
+    };
+    for (const Finding& finding : repaired) {
+        add(finding, true);
+    }
+    for (const Finding& finding : left) {
+        add(finding, false);
+    }
+    if (tool::Layout::Form::Json == layout.form) {
+        tool::print(tool::styledJson(jFindings) + "\n");
+    } else if (tool::Layout::Form::Table == layout.form && left.empty()) {
+        tool::print("no findings\n");
+    }
+}
+
+// Repairs what can be repaired, and what comes to light by that. Returns what was.
+std::vector<Finding> repairAll()
+{
+    std::vector<Finding> repaired;
+    bool blMore = true;
+    for (int i = 0; blMore && i < ROUNDS_MAX; ++i) {
+        blMore = false;
+        for (const Finding& finding : tool::examine()) {
+            if (finding.repair) {
+                finding.repair();
+                repaired.push_back(finding);
+                blMore = true;
+            }
+        }
+    }
+    return repaired;
+}
+
+int doctor(const Options& options)
+{
+    const std::vector<Finding> repaired = options.blRepair ? repairAll() : std::vector<Finding>();
+    const std::vector<Finding> left = tool::examine();
+    report(repaired, left, options.layout);
+    return left.empty() ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_FINDINGS;
+}
+
+} // namespace
+
+namespace tool {
+
+void addDoctor(Commands& commands)
+{
+    auto pOptions = std::make_shared<Options>();
+    CLI::App& command = commands.add(
+        "doctor", "say what is wrong with the store, what it means and what helps",
+        [pOptions] { return doctor(*pOptions); }, Commands::Needs::Nothing);
+    command.add_flag("--repair", pOptions->blRepair, "repair what needs no decision");
+    addFormOptions(command, pOptions->layout);
+}
+
+} // namespace tool

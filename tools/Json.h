@@ -1,0 +1,23 @@
+// JSON texts, in and out.
+
+#ifndef TOOLS_JSON_H
+#define TOOLS_JSON_H
+
+#include <json/value.h>
+
+#include <string>
+
+namespace tool {
+
+// Reads one JSON object, strictly. Throws BadValue.
+Json::Value parseObject(const std::string& strText);
+
+// On one line.
+std::string compactJson(const Json::Value& jValue);
+
+// For people, with line breaks and indentation.
+std::string styledJson(const Json::Value& jValue);
+
+} // namespace tool
+
+#endif

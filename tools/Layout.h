@@ -1,0 +1,45 @@
+// How tokens are shown: as a table, as JSON or as single fields.
+
+#ifndef TOOLS_LAYOUT_H
+#define TOOLS_LAYOUT_H
+
+#include <json/value.h>
+
+#include <optional>
+#include <string>
+
+namespace CLI {
+class App;
+}
+
+namespace tool {
+
+struct Layout {
+    enum class Form { Table, Json, JsonLines };
+
+    Form form = Form::Table;
+    bool blNoHeader = false;
+    bool blUtc = false;
+    bool blEpoch = false;
+    bool blShowIds = false;
+    std::string strField; // this one only; "" for all
+};
+
+// Adds -o and --no-header to a command.
+void addFormOptions(CLI::App& command, Layout& layout);
+
+// Adds what commands that show tokens have besides: --field, --utc, --epoch.
+void addTokenOptions(CLI::App& command, Layout& layout);
+
+// Prints a list of tokens, their ids masked unless the layout shows them.
+void printTokens(Json::Value& jTokens, const Layout& layout);
+
+// Prints one token in full.
+void printToken(const Json::Value& jToken, const Layout& layout);
+
+// The start of an id, enough to tell tokens apart but not to use one.
+std::string masked(const std::string& strTid);
+
+} // namespace tool
+
+#endif

@@ -1,0 +1,97 @@
+#include "Place.h"
+
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+#include "AccessTokenDefine.h"
+#include "Failure.h"
+
+namespace {
+
+const mode_t PRIVATE_MODE = 0700;
+const mode_t PARENT_MODE = 0755;
+
+[[noreturn]] void failOn(const std::string& strPath)
+{
+    throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno));
+}
+
+void makeParents(const std::string& strPath)
+{
+    for (size_t nEnd = strPath.find('/', 1); nEnd != std::string::npos; nEnd = strPath.find('/', nEnd + 1)) {
+        const std::string strParent = strPath.substr(0, nEnd);
+        if (0 != mkdir(strParent.c_str(), PARENT_MODE) && EEXIST != errno) {
+            failOn(strParent);
+        }
+    }
+}
+
+} // namespace
+
+namespace tool {
+
+std::string databaseDirectory()
+{
+    const std::string strPath = VEMO_ATOKEN_DB_PATH;
+    return strPath.substr(0, strPath.rfind('/'));
+}
+
+std::optional<struct stat> statusOf(const std::string& strPath)
+{
+    struct stat status = {};
+    if (0 == lstat(strPath.c_str(), &status)) {
+        return status;
+    }
+    if (ENOENT != errno) {
+        failOn(strPath);
+    }
+    return std::nullopt;
+}
+
+void requireDatabase(bool blCreate)
+{
+    struct stat status = {};
+    if (0 == stat(VEMO_ATOKEN_DB_PATH, &status)) {
+        if (!S_ISREG(status.st_mode)) {
+            throw Failure(EXIT_STATUS_STORE, VEMO_ATOKEN_DB_PATH " is no regular file");
+        }
+        return;
+    }
+    if (ENOENT != errno) {
+        failOn(VEMO_ATOKEN_DB_PATH);
+    }
+    if (!statusOf(databaseDirectory())) {
+        throw Failure(EXIT_STATUS_STORE, "there is no directory " + databaseDirectory() +
+                                             "; \"vemo-access-token init\" makes it");
+    }
+    if (!blCreate) {
+        throw Failure(EXIT_STATUS_STORE,
+                      "there is no database " VEMO_ATOKEN_DB_PATH "; \"vemo-access-token init\" makes it");
+    }
+}
+
+bool makeDirectory()
+{
+    const std::string strDirectory = databaseDirectory();
+    if (statusOf(strDirectory)) {
+        return false;
+    }
+    makeParents(strDirectory);
+    if (0 != mkdir(strDirectory.c_str(), PRIVATE_MODE) || 0 != chmod(strDirectory.c_str(), PRIVATE_MODE)) {
+        failOn(strDirectory);
+    }
+    return true;
+}
+
+void requireRoot()
+{
+    if (0 != geteuid()) {
+        throw Failure(EXIT_STATUS_STORE, "only root may do this: the token database belongs to root, and "
+                                         "the effective uid is " +
+                                             std::to_string(geteuid()));
+    }
+}
+
+} // namespace tool

@@ -1,0 +1,201 @@
+// stats: what the store holds, in numbers.
+
+#include <memory>
+
+#include "Commands.h"
+#include "Console.h"
+#include "Failure.h"
+#include "Json.h"
+#include "Layout.h"
+#include "Place.h"
+#include "Store.h"
+#include "Table.h"
+#include "Values.h"
+
+namespace {
+
+struct Options {
+    bool blPrometheus = false;
+    tool::Layout layout;
+};
+
+struct Group {
+    std::string strName;
+    int64_t nTokens;
+};
+
+struct UserGroup {
+    int64_t nUid;
+    int64_t nTokens;
+};
+
+struct Statistics {
+    int64_t nTokens;
+    int64_t nExpired;
+    int64_t nUnlimited;
+    std::vector<Group> functions;
+    std::vector<UserGroup> users;
+    int64_t nFileBytes;
+    int64_t nFreePages;
+    int64_t nPageBytes;
+};
+
+int64_t numberOf(const std::optional<std::string>& strText)
+{
+    return strtoll(strText.value_or("").c_str(), nullptr, 10);
+}
+
+Statistics collect()
+{
+    tool::Store store(tool::Store::Access::Read);
+    const std::string strCount = "SELECT count(*) FROM token";
+    Statistics statistics = {};
+    statistics.nTokens = store.number(strCount);
+    statistics.nExpired = store.number(strCount + " WHERE " + tool::SQL_EXPIRED);
+    statistics.nUnlimited = store.number(strCount + " WHERE count < 0");
+    for (const auto& row :
+         store.query("SELECT function, count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
+        statistics.functions.push_back({row[0].value_or(""), numberOf(row[1])});
+    }
+    for (const auto& row : store.query("SELECT uid, count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
+        statistics.users.push_back({numberOf(row[0]), numberOf(row[1])});
+    }
+    statistics.nFreePages = store.number("PRAGMA freelist_count");
+    statistics.nPageBytes = store.number("PRAGMA page_size");
+    const auto status = tool::statusOf(VEMO_ATOKEN_DB_PATH);
+    statistics.nFileBytes = status ? status->st_size : 0;
+    return statistics;
+}
+
+std::string nameOf(int64_t nUid)
+{
+    return tool::userName(nUid).value_or("");
+}
+
+void printTables(const Statistics& statistics, bool blHeader)
+{
+    tool::Table totals({"STORE", ">NUMBER"}, blHeader);
+    totals.add({"tokens", std::to_string(statistics.nTokens)});
+    totals.add({"expired", std::to_string(statistics.nExpired)});
+    totals.add({"unlimited uses", std::to_string(statistics.nUnlimited)});
+    totals.add({"file size in bytes", std::to_string(statistics.nFileBytes)});
+    totals.add({"free pages of " + std::to_string(statistics.nPageBytes) + " bytes",
+                std::to_string(statistics.nFreePages)});
+    totals.print();
+    tool::Table functions({"FUNCTION", ">TOKENS"}, blHeader);
+    for (const Group& group : statistics.functions) {
+        functions.add({group.strName, std::to_string(group.nTokens)});
+    }
+    tool::print("\n");
+    functions.print();
+    tool::Table users({">UID", "USER", ">TOKENS"}, blHeader);
+    for (const UserGroup& group : statistics.users) {
+        users.add({std::to_string(group.nUid), nameOf(group.nUid), std::to_string(group.nTokens)});
+    }
+    tool::print("\n");
+    users.print();
+}
+
+Json::Value jsonOf(const Statistics& statistics)
+{
+    Json::Value jStatistics;
+    jStatistics["tokens"] = Json::Int64{statistics.nTokens};
+    jStatistics["expired"] = Json::Int64{statistics.nExpired};
+    jStatistics["unlimited"] = Json::Int64{statistics.nUnlimited};
+    jStatistics["file_bytes"] = Json::Int64{statistics.nFileBytes};
+    jStatistics["free_pages"] = Json::Int64{statistics.nFreePages};
+    jStatistics["page_bytes"] = Json::Int64{statistics.nPageBytes};
+    jStatistics["functions"] = Json::Value(Json::arrayValue);
+    for (const Group& group : statistics.functions) {
+        Json::Value jGroup;
+        jGroup["function"] = group.strName;
+        jGroup["tokens"] = Json::Int64{group.nTokens};
+        jStatistics["functions"].append(jGroup);
+    }
+    jStatistics["users"] = Json::Value(Json::arrayValue);
+    for (const UserGroup& group : statistics.users) {
+        Json::Value jGroup;
+        jGroup["uid"] = Json::Int64{group.nUid};
+        jGroup["user"] = nameOf(group.nUid);
+        jGroup["tokens"] = Json::Int64{group.nTokens};
+        jStatistics["users"].append(jGroup);
+    }
+    return jStatistics;
+}
+
+// A label's value in the exposition format.
+std::string label(const std::string& strValue)
+{
+    std::string strEscaped;
+    for (const char c : strValue) {
+        strEscaped += c == '\\' ? "\\\\" : c == '"' ? "\\\"" : c == '\n' ? "\\n" : std::string(1, c);
+    }
+    return "\"" + strEscaped + "\"";
+}
+
+void printFamily(const std::string& strName, const std::string& strHelp)
+{
+    tool::print("# HELP " + strName + " " + strHelp + "\n# TYPE " + strName + " gauge\n");
+}
+
+void printMetric(const std::string& strName, const std::string& strHelp, int64_t nValue)
+{
+    printFamily(strName, strHelp);
+    tool::print(strName + " " + std::to_string(nValue) + "\n");
+}
+
+void printMetrics(const Statistics& statistics)
+{
+    const std::string strPrefix = "vemo_access_token_";
+    printMetric(strPrefix + "tokens", "Tokens in the store.", statistics.nTokens);
+    printMetric(strPrefix + "expired_tokens", "Tokens whose deadline has passed.", statistics.nExpired);
+    printMetric(strPrefix + "unlimited_tokens", "Tokens with any number of uses.", statistics.nUnlimited);
+    printMetric(strPrefix + "database_bytes", "Size of the database file.", statistics.nFileBytes);
+    printMetric(strPrefix + "database_free_pages", "Unused pages of the database file.",
+                statistics.nFreePages);
+    printMetric(strPrefix + "database_page_bytes", "Size of a page of the database file.",
+                statistics.nPageBytes);
+    printFamily(strPrefix + "function_tokens", "Tokens by the purpose they were made for.");
+    for (const Group& group : statistics.functions) {
+        tool::print(strPrefix + "function_tokens{function=" + label(group.strName) + "} " +
+                    std::to_string(group.nTokens) + "\n");
+    }
+    printFamily(strPrefix + "user_tokens", "Tokens by the user who owns them.");
+    for (const UserGroup& group : statistics.users) {
+        tool::print(strPrefix + "user_tokens{uid=\"" + std::to_string(group.nUid) +
+                    "\",user=" + label(nameOf(group.nUid)) + "} " + std::to_string(group.nTokens) + "\n");
+    }
+}
+
+int stats(const Options& options)
+{
+    const Statistics statistics = collect();
+    if (options.blPrometheus) {
+        printMetrics(statistics);
+        return tool::EXIT_STATUS_DONE;
+    }
+    switch (options.layout.form) {
+    case tool::Layout::Form::Table: printTables(statistics, !options.layout.blNoHeader); break;
+    case tool::Layout::Form::Json: tool::print(tool::styledJson(jsonOf(statistics)) + "\n"); break;
+    case tool::Layout::Form::JsonLines: tool::print(tool::compactJson(jsonOf(statistics)) + "\n"); break;
+    }
+    return tool::EXIT_STATUS_DONE;
+}
+
+} // namespace
+
+namespace tool {
+
+void addStats(Commands& commands)
+{
+    auto pOptions = std::make_shared<Options>();
+    CLI::App& command = commands.add("stats", "count the tokens, by purpose and by owner",
+                                     [pOptions] { return stats(*pOptions); });
+    auto* pPrometheus =
+        command.add_flag("--prometheus", pOptions->blPrometheus,
+                         "as metrics for the textfile collector of Prometheus' node exporter");
+    addFormOptions(command, pOptions->layout);
+    command.get_option("--output")->excludes(pPrometheus);
+}
+
+} // namespace tool

@@ -1,0 +1,228 @@
+#include "Store.h"
+
+#include <sqlite3.h>
+
+#include <cerrno>
+#include <cstdarg>
+#include <cstdlib>
+#include <cstring>
+#include <exception>
+#include <memory>
+#include <sstream>
+
+#include "Failure.h"
+#include "Place.h"
+
+namespace {
+
+int appendRow(void* pRows, int nColumns, char** rgValue, char**)
+{
+    try {
+        auto& rows = *static_cast<tool::Rows*>(pRows);
+        rows.emplace_back();
+        for (int i = 0; i < nColumns; ++i) {
+            rows.back().push_back(rgValue[i] ? std::optional<std::string>(rgValue[i]) : std::nullopt);
+        }
+        return 0;
+    } catch (const std::exception&) {
+        return -1; // the caller is a C function
+    }
+}
+
+bool isLocked(const std::string& strErr)
+{
+    return std::string::npos != strErr.find("database is locked");
+}
+
+std::string explained(const std::string& strErr)
+{
+    const auto contains = [&strErr](const char* szText) { return std::string::npos != strErr.find(szText); };
+    if (isLocked(strErr)) {
+        return "stayed locked by another process for 5 seconds";
+    }
+    if (contains("no such table: token")) {
+        return "has no table of tokens; \"vemo-access-token doctor --repair\" makes it";
+    }
+    if (contains("file is not a database")) {
+        return "is no token database, or a damaged one (" + strErr + ")";
+    }
+    if (contains("malformed")) {
+        return "is damaged (" + strErr + "); \"vemo-access-token doctor\" says how badly";
+    }
+    if (contains("query aborted")) {
+        return "holds a token that cannot be read; \"vemo-access-token doctor\" finds it";
+    }
+    return "failed: " + strErr;
+}
+
+} // namespace
+
+namespace tool {
+
+const char* const SQL_EXPIRED = "deadline < strftime('%s', 'now')";
+
+std::string sqlText(const char* szFormat, ...)
+{
+    va_list args;
+    va_start(args, szFormat);
+    const std::unique_ptr<char, decltype(&sqlite3_free)> szText(sqlite3_vmprintf(szFormat, args),
+                                                                &sqlite3_free);
+    va_end(args);
+    if (!szText) {
+        throw std::bad_alloc();
+    }
+    return szText.get();
+}
+
+std::vector<std::string> fieldNames()
+{
+    std::string strList;
+    AccessTokenDbApi().SqlExpandMemberName(strList);
+    std::istringstream list(strList);
+    std::vector<std::string> strNames;
+    for (std::string strName; std::getline(list, strName, ',');) {
+        strNames.push_back(strName);
+    }
+    return strNames;
+}
+
+Store::Store(Access access, Missing missing) : m_access(access)
+{
+    requireDatabase(Missing::Make == missing);
+    errno = 0;
+    if (0 > m_db.initDb()) {
+        const std::string strReason = errno ? std::string(": ") + strerror(errno) : "";
+        throw Failure(EXIT_STATUS_STORE, std::string(VEMO_ATOKEN_DB_PATH) + " cannot be opened" + strReason);
+    }
+    switch (access) {
+    case Access::Plain: break;
+    case Access::Read:
+        query("BEGIN");
+        query("SELECT count(*) FROM sqlite_schema"); // takes the lock
+        break;
+    case Access::Write: query("BEGIN IMMEDIATE"); break;
+    }
+}
+
+void Store::require(int nResult)
+{
+    if (0 > nResult) {
+        const bool blUndone = Access::Write == m_access && isLocked(m_db.m_strErr);
+        throw Failure(EXIT_STATUS_STORE, std::string(VEMO_ATOKEN_DB_PATH) + " " + explained(m_db.m_strErr) +
+                                             (blUndone ? "; nothing was changed" : ""));
+    }
+}
+
+void Store::commit()
+{
+    query("COMMIT");
+}
+
+Json::Value Store::tokens(const Json::Value& jFilter)
+{
+    Json::Value jFilterCopy = jFilter;
+    Json::Value jTokens(Json::arrayValue);
+    require(m_db.tokenGet(jFilterCopy, jTokens));
+    return jTokens;
+}
+
+std::optional<Json::Value> Store::find(const std::string& strTid)
+{
+    std::string strTidCopy = strTid;
+    Json::Value jToken;
+    const int nFound = m_db.tokenGetOne("tid", strTidCopy, jToken);
+    require(nFound);
+    return nFound ? std::optional<Json::Value>(jToken) : std::nullopt;
+}
+
+std::optional<Json::Value> Store::findByPrefix(const std::string& strTid)
+{
+    std::optional<Json::Value> jToken = find(strTid);
+    if (jToken) {
+        return jToken;
+    }
+    if (strTid.size() < PREFIX_MIN) {
+        throw Failure(EXIT_STATUS_USAGE,
+                      "TID: \"" + strTid + "\" is too short: give the id or its first 8 characters, or more");
+    }
+    // U+10FFFF sorts after all that may follow.
+    const Rows rows =
+        query(sqlText("SELECT tid FROM token WHERE tid >= %Q AND tid < %Q || char(1114111) LIMIT 2",
+                      strTid.c_str(), strTid.c_str()));
+    if (rows.size() > 1) {
+        throw Failure(EXIT_STATUS_USAGE,
+                      "TID: several tokens begin with \"" + strTid + "\"; give more of the id");
+    }
+    return rows.empty() ? std::nullopt : find(rows[0][0].value_or(""));
+}
+
+void Store::create(const Json::Value& jToken)
+{
+    Json::Value jTokenCopy = jToken;
+    require(m_db.tokenCreate(jTokenCopy));
+}
+
+void Store::save(const Json::Value& jToken)
+{
+    Json::Value jTokenCopy = jToken;
+    require(m_db.tokenUpdate(jTokenCopy));
+}
+
+int64_t Store::count(const Json::Value& jFilter)
+{
+    Json::Value jFilterCopy = jFilter;
+    std::string strWhere;
+    require(m_db.SqlWhereFromJson(jFilterCopy, strWhere, true));
+    return number("SELECT count(*) FROM token" + (strWhere.empty() ? "" : " WHERE" + strWhere));
+}
+
+int64_t Store::remove(const Json::Value& jFilter)
+{
+    Json::Value jFilterCopy = jFilter;
+    const int nRemoved = m_db.tokenDelete(jFilterCopy, true);
+    require(nRemoved);
+    return nRemoved;
+}
+
+void Store::removeTid(const std::string& strTid)
+{
+    Json::Value jFilter;
+    jFilter["tid"] = strTid;
+    remove(jFilter);
+}
+
+int64_t Store::purge()
+{
+    require(m_db.cleanExpireToken(true));
+    return number("SELECT changes()");
+}
+
+bool Store::hasTable()
+{
+    return 0 != number("SELECT count(*) FROM sqlite_schema WHERE type = 'table' AND name = 'token'");
+}
+
+void Store::makeTable()
+{
+    require(m_db.createTable());
+}
+
+Rows Store::query(const std::string& strSql)
+{
+    Rows rows;
+    require(m_db.runSqlEx(strSql, appendRow, &rows));
+    return rows;
+}
+
+std::string Store::text(const std::string& strSql)
+{
+    const Rows rows = query(strSql);
+    return rows.empty() ? "" : rows[0][0].value_or("");
+}
+
+int64_t Store::number(const std::string& strSql)
+{
+    return strtoll(text(strSql).c_str(), nullptr, 10);
+}
+
+} // namespace tool

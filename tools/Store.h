@@ -1,0 +1,99 @@
+// The token database through the library's store, in transactions of the tool's own.
+//
+// The library's operations report failure when they had to wait for a lock, although they took effect.
+// Here all waiting happens where a transaction begins and where it is committed, and there the result
+// is exact. So what a command says is what happened.
+//
+// All members throw Failure. A transaction that is not committed is undone when the object ends.
+
+#ifndef TOOLS_STORE_H
+#define TOOLS_STORE_H
+
+#include <json/value.h>
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "internal/AccessTokenDbApi.h"
+
+namespace tool {
+
+// What an argument may name a token by, at least.
+const size_t PREFIX_MIN = 8;
+
+// A row's columns as texts; nothing where it is NULL.
+typedef std::vector<std::vector<std::optional<std::string>>> Rows;
+
+// The SQL that sqlite3_mprintf makes of a format: %Q quotes and escapes a text.
+std::string sqlText(const char* szFormat, ...);
+
+// The fields of a token, in their order.
+std::vector<std::string> fieldNames();
+
+// Those tokens whose deadline has passed by now, as the purge sees it.
+extern const char* const SQL_EXPIRED;
+
+class Store {
+public:
+    enum class Access {
+        Plain, // no transaction
+        Read,  // nothing changes meanwhile
+        Write, // nobody else writes meanwhile
+    };
+
+    // What to do where there is no database.
+    enum class Missing { Fail, Make };
+
+    explicit Store(Access access, Missing missing = Missing::Fail);
+
+    // Waits, for 5 s at most, until the change can be written.
+    void commit();
+
+    // The tokens whose fields equal the filter's.
+    Json::Value tokens(const Json::Value& jFilter);
+
+    // The token of an id.
+    std::optional<Json::Value> find(const std::string& strTid);
+
+    // The token of an id, or the one whose id begins with these 8 or more characters. Fails with a
+    // usage failure when the prefix is too short or fits several.
+    std::optional<Json::Value> findByPrefix(const std::string& strTid);
+
+    // Writes a token that is new, or one that is there already.
+    void create(const Json::Value& jToken);
+    void save(const Json::Value& jToken);
+
+    // How many tokens there are whose fields equal the filter's.
+    int64_t count(const Json::Value& jFilter);
+
+    // Deletes the tokens whose fields equal the filter's, all of them for an empty one. Returns how
+    // many there were.
+    int64_t remove(const Json::Value& jFilter);
+    void removeTid(const std::string& strTid);
+
+    // Deletes the expired tokens, as the library does. Returns how many there were.
+    int64_t purge();
+
+    // Whether there is a table of tokens; makes it. To be made without a transaction.
+    bool hasTable();
+    void makeTable();
+
+    // Any other statement.
+    Rows query(const std::string& strSql);
+
+    // The first column of a query's first row, as text and as a number.
+    std::string text(const std::string& strSql);
+    int64_t number(const std::string& strSql);
+
+private:
+    void require(int nResult);
+
+    const Access m_access;
+    AccessTokenDbApi m_db;
+};
+
+} // namespace tool
+
+#endif

@@ -1,0 +1,67 @@
+#include "Table.h"
+
+#include <sys/ioctl.h>
+
+#include <cerrno>
+#include <cstring>
+#include <new>
+
+#include "Console.h"
+#include "Failure.h"
+
+namespace {
+
+void require(bool blDone)
+{
+    if (!blDone) {
+        throw std::bad_alloc(); // the one thing that these calls can fail of
+    }
+}
+
+} // namespace
+
+namespace tool {
+
+Table::Table(const std::vector<std::string>& strTitles, bool blHeader) : m_pTable(scols_new_table())
+{
+    require(nullptr != m_pTable);
+    struct libscols_table* pTable = m_pTable.get();
+    const bool blTerminal = isTerminal(resultStream());
+    scols_table_set_stream(pTable, resultStream());
+    scols_table_enable_noheadings(pTable, !blHeader);
+    scols_table_enable_colors(pTable, isColoured(resultStream()));
+    scols_table_set_column_separator(pTable, "  ");
+    // libsmartcols would look at standard output, which need not be where the result goes. Only a
+    // terminal has a width to keep to.
+    scols_table_set_termforce(pTable, blTerminal ? SCOLS_TERMFORCE_ALWAYS : SCOLS_TERMFORCE_NEVER);
+    struct winsize size = {};
+    if (blTerminal && 0 == ioctl(fileno(resultStream()), TIOCGWINSZ, &size) && size.ws_col) {
+        scols_table_set_termwidth(pTable, size.ws_col);
+    }
+    for (const std::string& strTitle : strTitles) {
+        const bool blRight = strTitle[0] == '>';
+        // Long values are continued on the next line, not cut.
+        require(nullptr != scols_table_new_column(pTable, strTitle.c_str() + (blRight ? 1 : 0), 0,
+                                                  blRight ? SCOLS_FL_RIGHT : SCOLS_FL_WRAP));
+    }
+}
+
+void Table::add(const std::vector<std::string>& strCells, const char* szColour)
+{
+    struct libscols_line* pLine = scols_table_new_line(m_pTable.get(), nullptr);
+    require(nullptr != pLine);
+    for (size_t i = 0; i < strCells.size(); ++i) {
+        require(0 == scols_line_set_data(pLine, i, strCells[i].c_str()));
+    }
+    require(!szColour || 0 == scols_line_set_color(pLine, szColour));
+}
+
+void Table::print() const
+{
+    const int nResult = scols_print_table(m_pTable.get());
+    if (0 != nResult) {
+        throw Failure(EXIT_STATUS_STORE, std::string("cannot print the table: ") + strerror(-nResult));
+    }
+}
+
+} // namespace tool

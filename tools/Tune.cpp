@@ -1,0 +1,154 @@
+// tune: indexes and the write-ahead journal, for large stores.
+
+#include <algorithm>
+#include <chrono>
+#include <memory>
+
+#include "Commands.h"
+#include "Console.h"
+#include "Failure.h"
+#include "Layout.h"
+#include "Store.h"
+#include "Table.h"
+
+namespace {
+
+using tool::Store;
+
+const std::vector<std::string> INDEXED = {"deadline", "bind_sid", "function"};
+const int MEASUREMENTS = 5;
+
+struct Options {
+    bool blWal = false;
+    bool blUndo = false;
+    bool blDryRun = false;
+    bool blNoHeader = false;
+};
+
+// The median time of a statement, in milliseconds, as text.
+std::string timeOf(Store& store, const std::string& strSql)
+{
+    std::vector<double> dMilliseconds;
+    for (int i = 0; i < MEASUREMENTS; ++i) {
+        const auto start = std::chrono::steady_clock::now();
+        store.query(strSql);
+        dMilliseconds.push_back(
+            std::chrono::duration<double, std::milli>(std::chrono::steady_clock::now() - start).count());
+    }
+    std::nth_element(dMilliseconds.begin(), dMilliseconds.begin() + MEASUREMENTS / 2, dMilliseconds.end());
+    char szText[32];
+    snprintf(szText, sizeof(szText), "%.2f ms", dMilliseconds[MEASUREMENTS / 2]);
+    return szText;
+}
+
+std::string indexesText(Store& store)
+{
+    const std::string strNames =
+        store.text("SELECT group_concat(name, ', ') FROM (SELECT name FROM sqlite_schema "
+                   "WHERE type = 'index' AND tbl_name = 'token' AND sql IS NOT NULL "
+                   "ORDER BY name)");
+    return strNames.empty() ? "none" : strNames;
+}
+
+// What a store does, and how fast; with the same words before and after.
+std::vector<std::pair<std::string, std::string>> measured(Store& store, bool blWrite)
+{
+    std::vector<std::pair<std::string, std::string>> lines = {
+        {"look for expired tokens, as every call does",
+         timeOf(store, std::string("SELECT tid FROM token WHERE ") + tool::SQL_EXPIRED)},
+        {"look for a session's tokens", timeOf(store, "SELECT tid FROM token WHERE bind_sid = '\x01'")},
+        {"look for a purpose's tokens", timeOf(store, "SELECT tid FROM token WHERE function = '\x01'")},
+        {"indexes", indexesText(store)},
+        {"journal", store.text("PRAGMA journal_mode")}};
+    if (blWrite) {
+        // It changes nothing, and costs what any small change does.
+        const std::string strVersion = store.text("PRAGMA user_version");
+        lines.emplace_back("write a small change", timeOf(store, "PRAGMA user_version = " + strVersion));
+    }
+    return lines;
+}
+
+std::string indexStatement(const std::string& strField, bool blUndo)
+{
+    const std::string strName = "token_" + strField;
+    return blUndo ? "DROP INDEX IF EXISTS " + strName
+                  : "CREATE INDEX IF NOT EXISTS " + strName + " ON token (" + strField + ")";
+}
+
+// The journal first: other programs' connections can stand in its way, and then nothing has changed.
+std::vector<std::string> statements(const Options& options)
+{
+    std::vector<std::string> strStatements;
+    if (options.blUndo || options.blWal) {
+        strStatements.push_back(std::string("PRAGMA journal_mode = ") + (options.blUndo ? "delete" : "wal"));
+    }
+    strStatements.push_back("BEGIN IMMEDIATE");
+    for (const std::string& strField : INDEXED) {
+        strStatements.push_back(indexStatement(strField, options.blUndo));
+    }
+    strStatements.push_back("COMMIT");
+    return strStatements;
+}
+
+// The journal's mode can stay as it was without an error.
+void requireJournal(Store& store, const Options& options)
+{
+    const std::string strWanted = options.blUndo ? "delete" : "wal";
+    if ((options.blUndo || options.blWal) && store.text("PRAGMA journal_mode") != strWanted) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, "the journal cannot be made \"" + strWanted + "\" here");
+    }
+}
+
+void execute(Store& store, const std::vector<std::string>& strStatements)
+{
+    tool::Progress progress("Tuning", strStatements.size());
+    for (const std::string& strStatement : strStatements) {
+        store.query(strStatement);
+        progress.step();
+    }
+}
+
+int tune(const Options& options)
+{
+    Store store(Store::Access::Plain);
+    const auto before = measured(store, !options.blDryRun);
+    if (options.blDryRun) {
+        tool::Table table({"WHAT", "NOW"}, !options.blNoHeader);
+        for (const auto& [strWhat, strNow] : before) {
+            table.add({strWhat, strNow});
+        }
+        table.print();
+        for (const std::string& strStatement : statements(options)) {
+            tool::print("would run: " + strStatement + "\n");
+        }
+        return tool::EXIT_STATUS_DONE;
+    }
+    execute(store, statements(options));
+    requireJournal(store, options);
+    const auto after = measured(store, true);
+    tool::Table table({"WHAT", "BEFORE", "AFTER"}, !options.blNoHeader);
+    for (size_t i = 0; i < before.size(); ++i) {
+        table.add({before[i].first, before[i].second, after[i].second});
+    }
+    table.print();
+    return tool::EXIT_STATUS_DONE;
+}
+
+} // namespace
+
+namespace tool {
+
+void addTune(Commands& commands)
+{
+    auto pOptions = std::make_shared<Options>();
+    CLI::App& command = commands.add("tune", "add indexes for a large store; says before and after, measured",
+                                     [pOptions] { return tune(*pOptions); });
+    auto* pWal = command.add_flag("--wal", pOptions->blWal,
+                                  "the write-ahead journal too, for programs that hold their connection");
+    command.add_flag("--undo", pOptions->blUndo, "remove the indexes and the write-ahead journal")
+        ->excludes(pWal);
+    command.add_flag("--dry-run", pOptions->blDryRun, "only measure, and tell what would be run");
+    command.add_flag("--no-header", pOptions->blNoHeader, "no line of titles above the table");
+}
+
+} // namespace tool

@@ -1,0 +1,183 @@
+// update: changes fields of a token.
+
+#include <algorithm>
+#include <ctime>
+#include <memory>
+
+#include "Arguments.h"
+#include "Commands.h"
+#include "Console.h"
+#include "Store.h"
+
+namespace {
+
+struct Options {
+    std::string strTid;
+    std::optional<int64_t> nCount;
+    std::optional<int64_t> nDeadline;
+    std::optional<int64_t> nTtl;
+    std::vector<tool::Allowance> allow;
+    std::vector<tool::Allowance> addAllow;
+    std::vector<tool::Allowance> removeAllow;
+    std::optional<std::string> strSid;
+    std::optional<Json::Value> jExtra;
+
+    bool empty() const
+    {
+        return !nCount && !nDeadline && !nTtl && allow.empty() && addAllow.empty() && removeAllow.empty() &&
+               !strSid && !jExtra;
+    }
+};
+
+int64_t parseDeadline(const std::string& strText)
+{
+    const int64_t nDeadline = tool::parseTime(strText);
+    if (nDeadline < time(nullptr)) {
+        throw tool::BadValue("\"" + strText + "\" has passed; to take the token back, revoke it");
+    }
+    return nDeadline;
+}
+
+[[noreturn]] void failOnMalformed()
+{
+    throw tool::Failure(
+        tool::EXIT_STATUS_USAGE,
+        "what the token opens is malformed and cannot be changed in part; replace it with --allow");
+}
+
+// The methods that a token lists for an API.
+Json::Value& methodsOf(Json::Value& jAllow, const std::string& strApi)
+{
+    if (!jAllow[strApi].isObject() || !jAllow[strApi]["method"].isArray()) {
+        failOnMalformed();
+    }
+    return jAllow[strApi]["method"];
+}
+
+void addAllowed(Json::Value& jAllow, const std::vector<tool::Allowance>& allowances)
+{
+    const Json::Value jAdded = tool::allowanceJson(allowances);
+    for (const std::string& strApi : jAdded.getMemberNames()) {
+        if (!jAllow.isMember(strApi)) {
+            jAllow[strApi] = jAdded[strApi];
+            continue;
+        }
+        Json::Value& jMethods = methodsOf(jAllow, strApi);
+        for (const Json::Value& jMethod : jAdded[strApi]["method"]) {
+            if (std::find(jMethods.begin(), jMethods.end(), jMethod) == jMethods.end()) {
+                jMethods.append(jMethod);
+            }
+        }
+    }
+}
+
+void removeMethod(Json::Value& jMethods, const std::string& strApi, const std::string& strMethod)
+{
+    Json::Value jKept(Json::arrayValue);
+    for (const Json::Value& jMethod : jMethods) {
+        if (jMethod != Json::Value(strMethod)) {
+            jKept.append(jMethod);
+        }
+    }
+    if (jKept.size() == jMethods.size()) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE,
+                            "--remove-allow: the token does not list \"" + strApi + ":" + strMethod + "\"");
+    }
+    jMethods = jKept;
+}
+
+void removeAllowed(Json::Value& jAllow, const std::vector<tool::Allowance>& allowances)
+{
+    for (const tool::Allowance& allowance : allowances) {
+        if (!jAllow.isMember(allowance.strApi)) {
+            throw tool::Failure(tool::EXIT_STATUS_USAGE,
+                                "--remove-allow: the token does not list \"" + allowance.strApi + "\"");
+        }
+        if (allowance.strMethods.empty()) {
+            jAllow.removeMember(allowance.strApi);
+            continue;
+        }
+        Json::Value& jMethods = methodsOf(jAllow, allowance.strApi);
+        for (const std::string& strMethod : allowance.strMethods) {
+            removeMethod(jMethods, allowance.strApi, strMethod);
+        }
+    }
+}
+
+void change(Json::Value& jToken, const Options& options)
+{
+    if (options.nCount) {
+        jToken["count"] = Json::Int64{*options.nCount};
+    }
+    if (options.nDeadline) {
+        jToken["deadline"] = Json::Int64{*options.nDeadline};
+    }
+    if (options.nTtl) {
+        jToken["deadline"] = Json::Int64{time(nullptr) + *options.nTtl};
+    }
+    if (options.strSid) {
+        jToken["bind_sid"] = *options.strSid;
+    }
+    if (options.jExtra) {
+        jToken["extra"] = *options.jExtra;
+    }
+    Json::Value& jAllow = jToken["webapi_allow"];
+    if (!options.allow.empty()) {
+        jAllow = tool::allowanceJson(options.allow);
+    }
+    if (!jAllow.isObject() && !(options.addAllow.empty() && options.removeAllow.empty())) {
+        failOnMalformed();
+    }
+    addAllowed(jAllow, options.addAllow);
+    removeAllowed(jAllow, options.removeAllow);
+}
+
+int update(const Options& options)
+{
+    if (options.empty()) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE,
+                            "say what to change; \"update --help\" lists the fields");
+    }
+    const std::string strTid = tool::readTid(options.strTid);
+    tool::Store store(tool::Store::Access::Write);
+    std::optional<Json::Value> jToken = store.findByPrefix(strTid);
+    if (!jToken) {
+        throw tool::noSuchToken();
+    }
+    change(*jToken, options);
+    store.save(*jToken);
+    store.commit();
+    tool::print("1 token updated\n");
+    if ((*jToken)["deadline"].asInt64() < time(nullptr)) {
+        tool::complain(
+            "the token has expired; the next call of a program purges it, unless --ttl or --deadline "
+            "give it time");
+    }
+    return tool::EXIT_STATUS_DONE;
+}
+
+} // namespace
+
+namespace tool {
+
+void addUpdate(Commands& commands)
+{
+    auto pOptions = std::make_shared<Options>();
+    CLI::App& command =
+        commands.add("update", "change fields of a token", [pOptions] { return update(*pOptions); });
+    addTid(command, pOptions->strTid);
+    addUses(command, pOptions->nCount);
+    auto* pDeadline = addParsed(command, "--deadline", "TIME", pOptions->nDeadline, parseDeadline,
+                                "expiry: 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @SECONDS");
+    addTtl(command, pOptions->nTtl)->excludes(pDeadline);
+    auto* pAllow =
+        addAllowances(command, "--allow", pOptions->allow, "what it opens, instead of what it did");
+    addAllowances(command, "--add-allow", pOptions->addAllow, "what it opens besides")->excludes(pAllow);
+    addAllowances(command, "--remove-allow", pOptions->removeAllow, "what it no longer opens")
+        ->excludes(pAllow);
+    command.add_option("--bind-sid", pOptions->strSid, "bind it to this login session; \"\" to none")
+        ->type_name("SID");
+    addExtra(command, pOptions->jExtra);
+}
+
+} // namespace tool

@@ -1,0 +1,235 @@
+#include "Values.h"
+
+#include <pwd.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <charconv>
+#include <cstring>
+#include <ctime>
+#include <fstream>
+
+#include "AccessTokenDefine.h"
+#include "Failure.h"
+#include "Json.h"
+
+namespace {
+
+const int64_t MINUTE = 60;
+const int64_t HOUR = 60 * MINUTE;
+const int64_t DAY = 24 * HOUR;
+const int64_t WEEK = 7 * DAY;
+const int64_t DURATION_MAX = 365250 * DAY; // a thousand years
+
+int64_t secondsOf(char cUnit)
+{
+    switch (cUnit) {
+    case 's': return 1;
+    case 'm': return MINUTE;
+    case 'h': return HOUR;
+    case 'd': return DAY;
+    case 'w': return WEEK;
+    default: return 0;
+    }
+}
+
+std::string count(int64_t nSeconds)
+{
+    if (nSeconds < MINUTE) {
+        return std::to_string(nSeconds) + " s";
+    }
+    if (nSeconds < HOUR) {
+        return std::to_string(nSeconds / MINUTE) + " min";
+    }
+    if (nSeconds < 2 * DAY) {
+        return std::to_string(nSeconds / HOUR) + " h";
+    }
+    return std::to_string(nSeconds / DAY) + " d";
+}
+
+// The user record that a look-up with a buffer finds.
+template <typename Lookup>
+std::optional<std::pair<std::string, uid_t>> user(Lookup lookup)
+{
+    std::vector<char> buffer(1024);
+    struct passwd entry = {};
+    struct passwd* pFound = nullptr;
+    while (ERANGE == lookup(&entry, buffer.data(), buffer.size(), &pFound)) {
+        buffer.resize(2 * buffer.size());
+    }
+    if (!pFound) {
+        return std::nullopt;
+    }
+    return std::make_pair(std::string(entry.pw_name), entry.pw_uid);
+}
+
+} // namespace
+
+namespace tool {
+
+int64_t parseNumber(const std::string& strText, int64_t nMin, int64_t nMax)
+{
+    int64_t nNumber = 0;
+    const char* szEnd = strText.data() + strText.size();
+    const auto [szRead, error] = std::from_chars(strText.data(), szEnd, nNumber);
+    if (std::errc() != error || szRead != szEnd || nNumber < nMin || nNumber > nMax) {
+        throw BadValue("\"" + strText + "\" is no number from " + std::to_string(nMin) + " to " +
+                       std::to_string(nMax));
+    }
+    return nNumber;
+}
+
+unsigned int parseUid(const std::string& strText)
+{
+    return static_cast<unsigned int>(parseNumber(strText, 0, int64_t{UID_ERR} - 1));
+}
+
+unsigned int parseUser(const std::string& strName)
+{
+    const auto found =
+        user([&strName](auto... arguments) { return getpwnam_r(strName.c_str(), arguments...); });
+    if (!found) {
+        throw BadValue("there is no user \"" + strName + "\"");
+    }
+    return found->second;
+}
+
+std::optional<std::string> userName(Json::Int64 nUid)
+{
+    const auto found =
+        user([nUid](auto... arguments) { return getpwuid_r(static_cast<uid_t>(nUid), arguments...); });
+    return found ? std::optional<std::string>(found->first) : std::nullopt;
+}
+
+int64_t parseDuration(const std::string& strText)
+{
+    const BadValue bad("\"" + strText + "\" is no duration such as 90s, 15m, 8h, 2d12h or 1w");
+    // A number alone is in seconds.
+    const bool blBare = strText.find_first_not_of("0123456789") == std::string::npos;
+    const std::string strParts = blBare ? strText + "s" : strText;
+    const char* szRest = strParts.data();
+    const char* szEnd = szRest + strParts.size();
+    int64_t nTotal = 0;
+    while (szRest != szEnd) {
+        int64_t nNumber = 0;
+        const auto [szUnit, error] = std::from_chars(szRest, szEnd, nNumber);
+        const int64_t nUnit = szUnit == szEnd ? 0 : secondsOf(*szUnit);
+        if (std::errc() != error || nNumber < 0 || 0 == nUnit || nNumber > DURATION_MAX / nUnit) {
+            throw bad;
+        }
+        nTotal += nNumber * nUnit;
+        if (nTotal > DURATION_MAX) {
+            throw bad;
+        }
+        szRest = szUnit + 1;
+    }
+    if (0 == nTotal) {
+        throw bad;
+    }
+    return nTotal;
+}
+
+int64_t parseTime(const std::string& strText)
+{
+    if (!strText.empty() && strText[0] == '@') {
+        return parseNumber(strText.substr(1), 0, INT64_MAX);
+    }
+    const bool blUtc = !strText.empty() && strText.back() == 'Z';
+    const std::string strDate = strText.substr(0, strText.size() - (blUtc ? 1 : 0));
+    for (const char* szFormat :
+         {"%Y-%m-%d", "%Y-%m-%d %H:%M", "%Y-%m-%dT%H:%M", "%Y-%m-%d %H:%M:%S", "%Y-%m-%dT%H:%M:%S"}) {
+        struct tm tmTime = {};
+        const char* szEnd = strptime(strDate.c_str(), szFormat, &tmTime);
+        if (!szEnd || *szEnd) {
+            continue;
+        }
+        const struct tm tmAsked = tmTime;
+        tmTime.tm_isdst = -1;
+        const time_t nTime = blUtc ? timegm(&tmTime) : mktime(&tmTime);
+        // 31 June, and the hour that a clock leaps over, come back as another time.
+        if (tmTime.tm_mday == tmAsked.tm_mday && tmTime.tm_hour == tmAsked.tm_hour) {
+            return nTime;
+        }
+    }
+    throw BadValue(
+        "\"" + strText +
+        "\" is no time such as 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @1798761599");
+}
+
+std::string timeText(Json::Int64 nTime, bool blUtc)
+{
+    const time_t nSeconds = static_cast<time_t>(nTime);
+    struct tm tmTime = {};
+    char szText[64];
+    if (!(blUtc ? gmtime_r(&nSeconds, &tmTime) : localtime_r(&nSeconds, &tmTime)) ||
+        0 == strftime(szText, sizeof(szText), blUtc ? "%Y-%m-%d %H:%M:%SZ" : "%Y-%m-%d %H:%M:%S", &tmTime)) {
+        return "@" + std::to_string(nTime); // beyond the calendar
+    }
+    return szText;
+}
+
+std::string relativeText(Json::Int64 nDeadline, int64_t nNow)
+{
+    int64_t nLeft = 0;
+    if (__builtin_sub_overflow(int64_t{nDeadline}, nNow, &nLeft) || nLeft == INT64_MIN) {
+        return nDeadline < nNow ? "expired" : "far off";
+    }
+    return nLeft < 0 ? "expired " + count(-nLeft) + " ago" : "in " + count(nLeft);
+}
+
+Allowance parseAllowance(const std::string& strText)
+{
+    const size_t nColon = strText.find(':');
+    Allowance allowance{strText.substr(0, nColon), {}};
+    if (allowance.strApi.empty()) {
+        throw BadValue("\"" + strText + "\" names no API: write API or API:METHOD,METHOD");
+    }
+    for (size_t nStart = nColon; nStart != std::string::npos;) {
+        const size_t nEnd = strText.find(',', nStart + 1);
+        const std::string strMethod = strText.substr(nStart + 1, nEnd - nStart - 1);
+        if (strMethod.empty()) {
+            throw BadValue("\"" + strText + "\" has an empty method: write API or API:METHOD,METHOD");
+        }
+        allowance.strMethods.push_back(strMethod);
+        nStart = nEnd;
+    }
+    return allowance;
+}
+
+Json::Value allowanceJson(const std::vector<Allowance>& allowances)
+{
+    Json::Value jAllow(Json::objectValue);
+    for (const Allowance& allowance : allowances) {
+        Json::Value& jMethods = jAllow[allowance.strApi]["method"];
+        if (jMethods.isNull()) {
+            jMethods = Json::Value(Json::arrayValue);
+        }
+        for (const std::string& strMethod : allowance.strMethods) {
+            if (std::find(jMethods.begin(), jMethods.end(), Json::Value(strMethod)) == jMethods.end()) {
+                jMethods.append(strMethod);
+            }
+        }
+    }
+    return jAllow;
+}
+
+Json::Value parseExtra(const std::string& strText)
+{
+    if (strText.empty() || strText[0] != '@') {
+        return parseObject(strText);
+    }
+    const std::string strFile = strText.substr(1);
+    std::ifstream file(strFile, std::ios::binary);
+    std::string strContent;
+    std::getline(file, strContent, '\0');
+    if (!file.is_open() || file.bad()) {
+        throw BadValue(strFile + ": " + strerror(errno));
+    }
+    if (!file.eof()) {
+        throw BadValue(strFile + " holds a NUL byte");
+    }
+    return parseObject(strContent);
+}
+
+} // namespace tool
