@@ -78,8 +78,13 @@ bool makeDirectory()
     if (statusOf(strDirectory)) {
         return false;
     }
-    makeParents(strDirectory);
-    if (0 != mkdir(strDirectory.c_str(), PRIVATE_MODE) || 0 != chmod(strDirectory.c_str(), PRIVATE_MODE)) {
+    int nMade = mkdir(strDirectory.c_str(), PRIVATE_MODE);
+    if (0 != nMade && ENOENT == errno) {
+        makeParents(strDirectory);
+        nMade = mkdir(strDirectory.c_str(), PRIVATE_MODE);
+    }
+    // The umask may have taken bits away that are needed.
+    if (0 != nMade || 0 != chmod(strDirectory.c_str(), PRIVATE_MODE)) {
         failOn(strDirectory);
     }
     return true;
