@@ -32,6 +32,15 @@ if [ -n "$mode" ] && [ -e /usr/vemo ]; then
 fi
 grep -q 'On the real path, as root' "$dir/transcript" || [ -z "$mode" ]
 for line in \
+    "made the table of tokens" \
+    "share=\$(vemo-access-token create --user root --function demo-share --ttl 1h --uses 2" \
+    "refused: method not listed" \
+    "refused: API not listed" \
+    "1 token updated" \
+    "refused: unknown token" \
+    "there is no such token" \
+    "2 tokens would be revoked" \
+    "2 tokens revoked" \
     'VemoAccessTokenCreate(uid, strFunction, jOption, strTid)' \
     'VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid)' \
     'VemoAccessTokenGenerate(strTid)' \

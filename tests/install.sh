@@ -1,5 +1,6 @@
 #!/bin/bash
-# Installs the library below a prefix of its own, and builds and runs README's example with it.
+# Installs the library and the tool below a prefix of their own, and builds and runs README's example
+# with them.
 # usage: install.sh BUILD-DIRECTORY JSONCPP-INCLUDE-DIRECTORY README COMPILER...
 set -euo pipefail
 build=$1
@@ -30,6 +31,9 @@ while read -r header; do
     echo "#include \"$header\"" >"$dir/alone.cpp"
     "${compile[@]}" -fsyntax-only "$dir/alone.cpp"
 done <"$dir/headers"
+
+echo "The installed tool:"
+LD_LIBRARY_PATH=$libdir "$dir/usr/sbin/vemo-access-token" --version
 
 echo "The example of README:"
 sed -n '/^```cpp$/,/^```$/p' "$readme" | grep -v '^```' >"$dir/example.cpp"

@@ -4,22 +4,28 @@
 
 namespace tool {
 
-CLI::Validator notEmpty()
+Command::Take into(std::string& strTarget)
 {
-    return CLI::Validator([](const std::string& str) { return str.empty() ? "must not be empty" : ""; }, "");
+    return [&strTarget](const std::string& strText) { strTarget = strText; };
 }
 
-CLI::Option* addAllowances(CLI::App& command, const std::string& strName, std::vector<Allowance>& allowances,
-                           const std::string& strDescription)
+Command::Take notEmptyInto(std::string& strTarget)
 {
-    const auto read = [strName, &allowances](const std::vector<std::string>& strTexts) {
-        for (const std::string& strText : strTexts) {
-            allowances.push_back(argument(strName, [&] { return parseAllowance(strText); }));
+    return [&strTarget](const std::string& strText) {
+        if (strText.empty()) {
+            throw BadValue("must not be empty");
         }
+        strTarget = strText;
     };
-    return command.add_option_function<std::vector<std::string>>(strName, read, strDescription)
-        ->type_name("API[:METHOD,...]")
-        ->allow_extra_args(false);
+}
+
+void addAllowances(Command& command, const std::string& strName, std::vector<Allowance>& allowances,
+                   const std::string& strDescription)
+{
+    command.repeatedOption(
+        strName, "API[:METHOD,...]",
+        [&allowances](const std::string& strText) { allowances.push_back(parseAllowance(strText)); },
+        strDescription);
 }
 
 Json::Value Selection::filter() const
@@ -37,46 +43,45 @@ Json::Value Selection::filter() const
     return jFilter;
 }
 
-void addSelection(CLI::App& command, Selection& selection)
+void addSelection(Command& command, Selection& selection)
 {
+    const auto keep = [](const std::string& strText) { return strText; };
     addUser(command, selection.nUid);
-    command.add_option("--function", selection.strFunction, "those of this purpose")->type_name("TAG");
-    command.add_option("--bind-sid", selection.strSid, "those bound to this login session")->type_name("SID");
+    addParsed(command, "--function", "TAG", selection.strFunction, keep, "those of this purpose");
+    addParsed(command, "--bind-sid", "SID", selection.strSid, keep, "those bound to this login session");
 }
 
-void addUser(CLI::App& command, std::optional<unsigned int>& nUid)
+void addUser(Command& command, std::optional<unsigned int>& nUid)
 {
-    auto* pUid = addParsed(command, "--uid", "N", nUid, parseUid, "the owner, as a number");
-    addParsed(command, "--user", "NAME", nUid, parseUser, "the owner, by name")->excludes(pUid);
+    addParsed(command, "--uid", "N", nUid, parseUid, "the owner, as a number");
+    addParsed(command, "--user", "NAME", nUid, parseUser, "the owner, by name");
+    command.exclude("--user", "--uid");
 }
 
-void addUses(CLI::App& command, std::optional<int64_t>& nCount)
+void addUses(Command& command, std::optional<int64_t>& nCount)
 {
     const auto parse = [](const std::string& strText) { return parseNumber(strText, 1, INT64_MAX); };
-    auto* pUses = addParsed(command, "--uses", "N", nCount, parse, "how many times it can be granted");
-    command
-        .add_flag_callback(
-            "--unlimited", [&nCount] { nCount = -1; }, "any number of times")
-        ->excludes(pUses);
+    addParsed(command, "--uses", "N", nCount, parse, "how many times it can be granted");
+    command.flag(
+        "--unlimited", [&nCount] { nCount = -1; }, "any number of times");
+    command.exclude("--unlimited", "--uses");
 }
 
-CLI::Option* addTtl(CLI::App& command, std::optional<int64_t>& nTtl)
+void addTtl(Command& command, std::optional<int64_t>& nTtl)
 {
-    return addParsed(command, "--ttl", "DURATION", nTtl, parseDuration,
-                     "lifetime from now: 45s, 90m, 8h, 2d12h, 1w, or seconds");
+    addParsed(command, "--ttl", "DURATION", nTtl, parseDuration,
+              "lifetime from now: 45s, 90m, 8h, 2d12h, 1w, or seconds");
 }
 
-CLI::Option* addExtra(CLI::App& command, std::optional<Json::Value>& jExtra)
+void addExtra(Command& command, std::optional<Json::Value>& jExtra)
 {
-    return addParsed(command, "--extra", "JSON|@FILE", jExtra, parseExtra,
-                     "data of your own, a JSON object or a file of one");
+    addParsed(command, "--extra", "JSON|@FILE", jExtra, parseExtra,
+              "data of your own, a JSON object or a file of one");
 }
 
-void addTid(CLI::App& command, std::string& strTid)
+void addTid(Command& command, std::string& strTid)
 {
-    command.add_option("TID", strTid, "the id; \"-\" reads it from standard input")
-        ->required()
-        ->type_name("");
+    command.argument("TID", into(strTid), "the id; \"-\" reads it from standard input");
 }
 
 std::vector<std::string> readTids(const std::string& strArgument)

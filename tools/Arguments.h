@@ -3,7 +3,6 @@
 #ifndef TOOLS_ARGUMENTS_H
 #define TOOLS_ARGUMENTS_H
 
-#include <CLI/CLI.hpp>
 #include <json/value.h>
 
 #include <cstdint>
@@ -11,29 +10,19 @@
 #include <string>
 #include <vector>
 
+#include "Commands.h"
 #include "Failure.h"
 #include "Values.h"
 
 namespace tool {
 
-// Adds an option whose text a function of Values.h reads into target.
-template <typename Target, typename Parse>
-CLI::Option* addParsed(CLI::App& command, const std::string& strName, const std::string& strType,
-                       Target& target, Parse parse, const std::string& strDescription)
-{
-    const std::string strLongName = strName.substr(strName.find("--"));
-    const auto read = [strLongName, &target, parse](const std::string& strText) {
-        target = argument(strLongName, [&] { return parse(strText); });
-    };
-    return command.add_option_function<std::string>(strName, read, strDescription)->type_name(strType);
-}
-
-// Refuses the empty text.
-CLI::Validator notEmpty();
+// For Command::option and the like: keeps the text; or refuses the empty one and keeps the others.
+Command::Take into(std::string& strTarget);
+Command::Take notEmptyInto(std::string& strTarget);
 
 // Adds an option that takes "API:METHOD,..." and may be given several times.
-CLI::Option* addAllowances(CLI::App& command, const std::string& strName, std::vector<Allowance>& allowances,
-                           const std::string& strDescription);
+void addAllowances(Command& command, const std::string& strName, std::vector<Allowance>& allowances,
+                   const std::string& strDescription);
 
 // Whose tokens, made for what, bound to which session.
 struct Selection {
@@ -44,21 +33,21 @@ struct Selection {
     bool empty() const { return !nUid && !strFunction && !strSid; }
     Json::Value filter() const; // in the library's filter language
 };
-void addSelection(CLI::App& command, Selection& selection);
+void addSelection(Command& command, Selection& selection);
 
 // --uid and --user, which exclude each other.
-void addUser(CLI::App& command, std::optional<unsigned int>& nUid);
+void addUser(Command& command, std::optional<unsigned int>& nUid);
 
 // --uses and --unlimited, which exclude each other, as a token's count.
-void addUses(CLI::App& command, std::optional<int64_t>& nCount);
+void addUses(Command& command, std::optional<int64_t>& nCount);
 
 // The lifetime that an option names.
-CLI::Option* addTtl(CLI::App& command, std::optional<int64_t>& nTtl);
+void addTtl(Command& command, std::optional<int64_t>& nTtl);
 
-CLI::Option* addExtra(CLI::App& command, std::optional<Json::Value>& jExtra);
+void addExtra(Command& command, std::optional<Json::Value>& jExtra);
 
 // The argument TID.
-void addTid(CLI::App& command, std::string& strTid);
+void addTid(Command& command, std::string& strTid);
 
 // The ids that an argument stands for: itself, or for "-" the lines of standard input. Fails when
 // there is none.

@@ -99,20 +99,19 @@ namespace tool {
 void addCreate(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    CLI::App& command = commands.add("create", "create a token and print its id, this once",
-                                     [pOptions] { return create(*pOptions); });
+    Command command =
+        commands.add("create", "create a token, of one use and for a day unless told otherwise; print its id",
+                     [pOptions] { return create(*pOptions); });
     addUser(command, pOptions->nUid);
-    command.add_option("--function", pOptions->strFunction, "its purpose")
-        ->required()
-        ->check(notEmpty())
-        ->type_name("TAG");
-    addTtl(command, pOptions->nTtl)->default_str("1d");
+    command.option("--function", "TAG", notEmptyInto(pOptions->strFunction), "its purpose");
+    command.require("--function");
+    addTtl(command, pOptions->nTtl);
     addUses(command, pOptions->nCount);
     addAllowances(command, "--allow", pOptions->allowances, "an API, and methods of it, that it opens");
-    command.add_option("--bind-sid", pOptions->strSid, "bind it to this login session")->type_name("SID");
+    command.option("--bind-sid", "SID", into(pOptions->strSid), "bind it to this login session");
     addExtra(command, pOptions->jExtra);
-    command.add_option("--tid", pOptions->strTid, "an id of your own; \"-\" reads it from standard input")
-        ->type_name("TID");
+    command.option("--tid", "TID", into(pOptions->strTid),
+                   "an id of your own; \"-\" reads it from standard input");
 }
 
 void addGenerate(Commands& commands)

@@ -108,10 +108,10 @@ namespace tool {
 void addDoctor(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    CLI::App& command = commands.add(
+    Command command = commands.add(
         "doctor", "say what is wrong with the store, what it means and what helps",
         [pOptions] { return doctor(*pOptions); }, Commands::Needs::Nothing);
-    command.add_flag("--repair", pOptions->blRepair, "repair what needs no decision");
+    command.flag("--repair", pOptions->blRepair, "repair what needs no decision");
     addFormOptions(command, pOptions->layout);
 }
 

@@ -111,14 +111,12 @@ int grant(const Options& options)
     return tool::EXIT_STATUS_DONE;
 }
 
-void addCall(CLI::App& command, Options& options)
+void addCall(tool::Command& command, Options& options)
 {
     tool::addTid(command, options.strTid);
-    command.add_option("API", options.strApi, "the API that is called")
-        ->required()
-        ->check(tool::notEmpty())
-        ->type_name("");
-    command.add_option("METHOD", options.strMethod, "its method; without it, the API alone")->type_name("");
+    command.argument("API", tool::notEmptyInto(options.strApi), "the API that is called");
+    command.optionalArgument("METHOD", tool::into(options.strMethod),
+                             "its method; without it, the API alone");
 }
 
 } // namespace
@@ -128,9 +126,8 @@ namespace tool {
 void addCheck(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    CLI::App& command =
-        commands.add("check", "tell whether a grant would succeed, and why not; spends nothing",
-                     [pOptions] { return check(*pOptions); });
+    Command command = commands.add("check", "tell whether a grant would succeed, and why not; spends nothing",
+                                   [pOptions] { return check(*pOptions); });
     addCall(command, *pOptions);
     addFormOptions(command, pOptions->layout);
 }
@@ -138,10 +135,10 @@ void addCheck(Commands& commands)
 void addGrant(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    CLI::App& command = commands.add("grant", "grant a call, which spends one use of the token",
-                                     [pOptions] { return grant(*pOptions); });
+    Command command = commands.add("grant", "grant a call, which spends one use of the token",
+                                   [pOptions] { return grant(*pOptions); });
     addCall(command, *pOptions);
-    command.add_flag("--print-user", pOptions->blPrintUser, "print the owner's name");
+    command.flag("--print-user", pOptions->blPrintUser, "print the owner's name");
 }
 
 } // namespace tool

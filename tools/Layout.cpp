@@ -1,5 +1,6 @@
 #include "Layout.h"
 
+#include <algorithm>
 #include <ctime>
 #include <vector>
 
@@ -121,20 +122,28 @@ void printSheet(const Json::Value& jToken, const Layout& layout)
 
 namespace tool {
 
-void addFormOptions(CLI::App& command, Layout& layout)
+std::string parseField(const std::string& strText)
 {
-    addParsed(command, "-o,--output", "FORM", layout.form, parseForm, "table (the default), json or jsonl");
-    command.add_flag("--no-header", layout.blNoHeader, "no line of titles above a table");
+    const std::vector<std::string> strNames = fieldNames();
+    if (strNames.end() == std::find(strNames.begin(), strNames.end(), strText)) {
+        throw BadValue("\"" + strText + "\" is no field of a token");
+    }
+    return strText;
 }
 
-void addTokenOptions(CLI::App& command, Layout& layout)
+void addFormOptions(Command& command, Layout& layout)
+{
+    addParsed(command, "-o,--output", "FORM", layout.form, parseForm, "table (the default), json or jsonl");
+    command.flag("--no-header", layout.blNoHeader, "no line of titles above a table");
+}
+
+void addTokenOptions(Command& command, Layout& layout)
 {
     addFormOptions(command, layout);
-    command.add_option("--field", layout.strField, "this field only, as it is stored")
-        ->check(CLI::IsMember(fieldNames()).description(""))
-        ->type_name("NAME");
-    auto* pUtc = command.add_flag("--utc", layout.blUtc, "times in UTC instead of local time");
-    command.add_flag("--epoch", layout.blEpoch, "times in seconds since the epoch")->excludes(pUtc);
+    addParsed(command, "--field", "NAME", layout.strField, parseField, "this field only, as it is stored");
+    command.flag("--utc", layout.blUtc, "times in UTC instead of local time");
+    command.flag("--epoch", layout.blEpoch, "times in seconds since the epoch");
+    command.exclude("--epoch", "--utc");
 }
 
 void printTokens(Json::Value& jTokens, const Layout& layout)

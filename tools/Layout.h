@@ -8,9 +8,7 @@
 #include <optional>
 #include <string>
 
-namespace CLI {
-class App;
-}
+#include "Commands.h"
 
 namespace tool {
 
@@ -25,11 +23,14 @@ struct Layout {
     std::string strField; // this one only; "" for all
 };
 
+// The name of a field, if it is one. Throws BadValue.
+std::string parseField(const std::string& strText);
+
 // Adds -o and --no-header to a command.
-void addFormOptions(CLI::App& command, Layout& layout);
+void addFormOptions(Command& command, Layout& layout);
 
 // Adds what commands that show tokens have besides: --field, --utc, --epoch.
-void addTokenOptions(CLI::App& command, Layout& layout);
+void addTokenOptions(Command& command, Layout& layout);
 
 // Prints a list of tokens, their ids masked unless the layout shows them.
 void printTokens(Json::Value& jTokens, const Layout& layout);

@@ -41,10 +41,7 @@ Order parseOrder(const std::string& strText)
         0 == strText.compare(strText.size() - strDescending.size(), strDescending.size(), strDescending)) {
         order = {strText.substr(0, strText.size() - strDescending.size()), true};
     }
-    const std::vector<std::string> strNames = tool::fieldNames();
-    if (strNames.end() == std::find(strNames.begin(), strNames.end(), order.strField)) {
-        throw tool::BadValue("\"" + order.strField + "\" is no field of a token");
-    }
+    order.strField = tool::parseField(order.strField);
     return order;
 }
 
@@ -122,26 +119,26 @@ namespace tool {
 void addList(Commands& commands)
 {
     auto pOptions = std::make_shared<ListOptions>();
-    CLI::App& command =
+    Command command =
         commands.add("list", "list tokens; purges nothing", [pOptions] { return list(*pOptions); });
     addSelection(command, pOptions->selection);
-    command.add_flag("--expired", pOptions->blExpired, "those whose deadline has passed");
+    command.flag("--expired", pOptions->blExpired, "those whose deadline has passed");
     addParsed(command, "--expiring", "DURATION", pOptions->nExpiring, parseDuration,
               "those that expire within this time");
     addParsed(command, "--sort", "FIELD[:desc]", pOptions->order, parseOrder,
               "by this field, not by deadline");
     const auto parseLimit = [](const std::string& strText) { return parseNumber(strText, 1, INT64_MAX); };
     addParsed(command, "--limit", "N", pOptions->nLimit, parseLimit, "the first N; says how many there are");
-    command.add_flag("--count", pOptions->blCount, "how many there are, no more");
+    command.flag("--count", pOptions->blCount, "how many there are, no more");
     addTokenOptions(command, pOptions->layout);
-    command.add_flag("--show-ids", pOptions->layout.blShowIds, "whole ids, not their first 8 characters");
+    command.flag("--show-ids", pOptions->layout.blShowIds, "whole ids, not their first 8 characters");
 }
 
 void addShow(Commands& commands)
 {
     auto pOptions = std::make_shared<ShowOptions>();
-    CLI::App& command = commands.add("show", "show one token in full, its id too; spends and purges nothing",
-                                     [pOptions] { return show(*pOptions); });
+    Command command = commands.add("show", "show one token in full, its id too; spends and purges nothing",
+                                   [pOptions] { return show(*pOptions); });
     addTid(command, pOptions->strTid);
     addTokenOptions(command, pOptions->layout);
 }

@@ -132,22 +132,21 @@ namespace tool {
 void addRevoke(Commands& commands)
 {
     auto pOptions = std::make_shared<RevokeOptions>();
-    CLI::App& command = commands.add("revoke", "delete tokens", [pOptions] { return revoke(*pOptions); });
-    command
-        .add_option("TID", pOptions->strTids, "ids; \"-\" reads them from standard input, one on each line")
-        ->type_name("");
+    Command command = commands.add("revoke", "delete tokens", [pOptions] { return revoke(*pOptions); });
+    const auto add = [pOptions](const std::string& strTid) { pOptions->strTids.push_back(strTid); };
+    command.remainingArguments("TID", add, "ids; \"-\" reads them from standard input, one on each line");
     addSelection(command, pOptions->selection);
-    command.add_flag("--all", pOptions->blAll, "every token there is");
-    command.add_flag("--dry-run", pOptions->blDryRun, "only tell how many");
-    command.add_flag("--yes", pOptions->blYes, "do not ask");
+    command.flag("--all", pOptions->blAll, "every token there is");
+    command.flag("--dry-run", pOptions->blDryRun, "only tell how many");
+    command.flag("--yes", pOptions->blYes, "do not ask");
 }
 
 void addPurge(Commands& commands)
 {
     auto pOptions = std::make_shared<PurgeOptions>();
-    CLI::App& command =
+    Command command =
         commands.add("purge", "delete the expired tokens", [pOptions] { return purge(*pOptions); });
-    command.add_flag("--dry-run", pOptions->blDryRun, "only tell how many");
+    command.flag("--dry-run", pOptions->blDryRun, "only tell how many");
 }
 
 } // namespace tool

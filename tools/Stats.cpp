@@ -189,13 +189,12 @@ namespace tool {
 void addStats(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    CLI::App& command = commands.add("stats", "count the tokens, by purpose and by owner",
-                                     [pOptions] { return stats(*pOptions); });
-    auto* pPrometheus =
-        command.add_flag("--prometheus", pOptions->blPrometheus,
-                         "as metrics for the textfile collector of Prometheus' node exporter");
+    Command command = commands.add("stats", "count the tokens, by purpose and by owner",
+                                   [pOptions] { return stats(*pOptions); });
+    command.flag("--prometheus", pOptions->blPrometheus,
+                 "as metrics for the textfile collector of Prometheus' node exporter");
     addFormOptions(command, pOptions->layout);
-    command.get_option("--output")->excludes(pPrometheus);
+    command.exclude("--output", "--prometheus");
 }
 
 } // namespace tool

@@ -238,21 +238,21 @@ namespace tool {
 void addExport(Commands& commands)
 {
     auto pOptions = std::make_shared<ExportOptions>();
-    CLI::App& command = commands.add("export", "write all tokens, whole ids included, as JSON lines",
-                                     [pOptions] { return exportTokens(*pOptions); });
-    command.add_option("FILE", pOptions->strFile, "the file, of mode 0600; without it, standard output")
-        ->type_name("");
+    Command command = commands.add("export", "write all tokens, whole ids included, as JSON lines",
+                                   [pOptions] { return exportTokens(*pOptions); });
+    command.optionalArgument("FILE", notEmptyInto(pOptions->strFile),
+                             "the file, of mode 0600; without it, standard output");
 }
 
 void addImport(Commands& commands)
 {
     auto pOptions = std::make_shared<ImportOptions>();
-    CLI::App& command =
+    Command command =
         commands.add("import", "create the tokens of files that export wrote; all of a file or none",
                      [pOptions] { return importTokens(*pOptions); });
-    command.add_option("FILE", pOptions->strFiles, "the files; \"-\" is standard input")
-        ->required()
-        ->type_name("");
+    const auto add = [pOptions](const std::string& strFile) { pOptions->strFiles.push_back(strFile); };
+    command.remainingArguments("FILE", add, "the files; \"-\" is standard input");
+    command.require("FILE");
 }
 
 } // namespace tool

@@ -141,14 +141,14 @@ namespace tool {
 void addTune(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    CLI::App& command = commands.add("tune", "add indexes for a large store; says before and after, measured",
-                                     [pOptions] { return tune(*pOptions); });
-    auto* pWal = command.add_flag("--wal", pOptions->blWal,
-                                  "the write-ahead journal too, for programs that hold their connection");
-    command.add_flag("--undo", pOptions->blUndo, "remove the indexes and the write-ahead journal")
-        ->excludes(pWal);
-    command.add_flag("--dry-run", pOptions->blDryRun, "only measure, and tell what would be run");
-    command.add_flag("--no-header", pOptions->blNoHeader, "no line of titles above the table");
+    Command command = commands.add("tune", "add indexes for a large store; says before and after, measured",
+                                   [pOptions] { return tune(*pOptions); });
+    command.flag("--wal", pOptions->blWal,
+                 "the write-ahead journal too, for programs that hold their connection");
+    command.flag("--undo", pOptions->blUndo, "remove the indexes and the write-ahead journal");
+    command.exclude("--undo", "--wal");
+    command.flag("--dry-run", pOptions->blDryRun, "only measure, and tell what would be run");
+    command.flag("--no-header", pOptions->blNoHeader, "no line of titles above the table");
 }
 
 } // namespace tool

@@ -163,20 +163,22 @@ namespace tool {
 void addUpdate(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    CLI::App& command =
+    Command command =
         commands.add("update", "change fields of a token", [pOptions] { return update(*pOptions); });
     addTid(command, pOptions->strTid);
     addUses(command, pOptions->nCount);
-    auto* pDeadline = addParsed(command, "--deadline", "TIME", pOptions->nDeadline, parseDeadline,
-                                "expiry: 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @SECONDS");
-    addTtl(command, pOptions->nTtl)->excludes(pDeadline);
-    auto* pAllow =
-        addAllowances(command, "--allow", pOptions->allow, "what it opens, instead of what it did");
-    addAllowances(command, "--add-allow", pOptions->addAllow, "what it opens besides")->excludes(pAllow);
-    addAllowances(command, "--remove-allow", pOptions->removeAllow, "what it no longer opens")
-        ->excludes(pAllow);
-    command.add_option("--bind-sid", pOptions->strSid, "bind it to this login session; \"\" to none")
-        ->type_name("SID");
+    addParsed(command, "--deadline", "TIME", pOptions->nDeadline, parseDeadline,
+              "expiry: 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @SECONDS");
+    addTtl(command, pOptions->nTtl);
+    command.exclude("--ttl", "--deadline");
+    addAllowances(command, "--allow", pOptions->allow, "what it opens, instead of what it did");
+    addAllowances(command, "--add-allow", pOptions->addAllow, "what it opens besides");
+    addAllowances(command, "--remove-allow", pOptions->removeAllow, "what it no longer opens");
+    command.exclude("--add-allow", "--allow");
+    command.exclude("--remove-allow", "--allow");
+    const auto keep = [](const std::string& strText) { return strText; };
+    addParsed(command, "--bind-sid", "SID", pOptions->strSid, keep,
+              "bind it to this login session; \"\" to none");
     addExtra(command, pOptions->jExtra);
 }
 

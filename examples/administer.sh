@@ -1,0 +1,79 @@
+#!/bin/bash
+# The life of access tokens, as the administrator of a machine sees and steers it: each step shows
+# commands and what they print. Ends with status 1 when one does not end as the step is meant to show.
+# Needs vemo-access-token in the PATH. Tokens of other programs are neither shown nor used.
+set -uo pipefail
+
+tool=vemo-access-token
+step=0
+as_expected=yes
+
+step()
+{
+    step=$((step + 1))
+    [ $step -eq 1 ] || echo
+    printf '%s. %s\n\n' $step "$1"
+}
+
+# call STATUS ARGUMENTS...: shows a command, ids shortened, and runs it
+call()
+{
+    local expected=$1 argument shown=() got
+    shift
+    for argument in "$@"; do
+        if [ ${#argument} -ge 127 ]; then
+            argument=${argument:0:8}...
+        fi
+        shown+=("$argument")
+    done
+    echo "   \$ $tool ${shown[*]}"
+    "$tool" "$@" 2>&1 | sed 's/^/     /'
+    got=${PIPESTATUS[0]}
+    [ "$got" -eq 0 ] || echo "     (exit status $got)"
+    if [ "$got" -ne "$expected" ]; then
+        echo "     NOT WHAT THIS STEP SHOWS"
+        as_expected=
+    fi
+}
+
+# create VARIABLE ARGUMENTS...: shows the creation of a token and keeps its id in the variable
+create()
+{
+    local -n id=$1
+    shift
+    echo "   \$ ${!id}=\$($tool create $*)"
+    id=$("$tool" create "$@") || as_expected=
+}
+
+step "Before the first program needs them: the private directory, the file and the table."
+call 0 init
+
+step "A token for root: two uses, for an hour, of two methods of one API. The id is printed once."
+create share --user root --function demo-share --ttl 1h --uses 2 --allow Demo.File:get,list
+echo "   (${share:0:8}..., ${#share} characters)"
+call 0 list --function demo-share
+
+step "Would it open this? Nothing is spent by asking. Eight characters of the id are enough for that."
+call 0 check "${share:0:8}" Demo.File get
+call 1 check "${share:0:8}" Demo.File delete
+call 1 check "${share:0:8}" Demo.User get
+
+step "It gets another method and more time."
+call 0 update "${share:0:8}" --add-allow Demo.File:delete --ttl 2d
+call 0 list --function demo-share
+
+step "A grant spends one use, and needs the whole id. The last use deletes the token."
+call 0 grant "$share" Demo.File get --print-user
+call 0 grant "$share" Demo.File delete
+call 1 grant "$share" Demo.File get
+call 3 show "${share:0:8}"
+
+step "Two tokens of a login session; the session ends, and they are taken back."
+create sync --uid 0 --function demo-sync --unlimited --allow Demo.Sync --bind-sid demo-login-1
+create view --uid 0 --function demo-view --allow Demo.View:get --bind-sid demo-login-1
+call 0 list --bind-sid demo-login-1
+call 0 revoke --bind-sid demo-login-1 --dry-run
+call 0 revoke --bind-sid demo-login-1 --yes
+call 0 list --bind-sid demo-login-1
+
+[ -n "$as_expected" ]
