@@ -9,6 +9,7 @@
 #include <cstring>
 #include <ctime>
 #include <fstream>
+#include <map>
 
 #include "AccessTokenDefine.h"
 #include "Failure.h"
@@ -97,9 +98,14 @@ unsigned int parseUser(const std::string& strName)
 
 std::optional<std::string> userName(Json::Int64 nUid)
 {
-    const auto found =
-        user([nUid](auto... arguments) { return getpwuid_r(static_cast<uid_t>(nUid), arguments...); });
-    return found ? std::optional<std::string>(found->first) : std::nullopt;
+    static std::map<Json::Int64, std::optional<std::string>> known; // a look-up can go over the network
+    const auto [pKnown, blNew] = known.try_emplace(nUid);
+    if (blNew) {
+        const auto found =
+            user([nUid](auto... arguments) { return getpwuid_r(static_cast<uid_t>(nUid), arguments...); });
+        pKnown->second = found ? std::optional<std::string>(found->first) : std::nullopt;
+    }
+    return pKnown->second;
 }
 
 int64_t parseDuration(const std::string& strText)
