@@ -84,10 +84,13 @@ void addTid(Command& command, std::string& strTid)
     command.argument("TID", into(strTid), "the id; \"-\" reads it from standard input");
 }
 
-std::vector<std::string> readTids(const std::string& strArgument)
+std::vector<std::string> readTids(const std::string& strName, const std::string& strArgument)
 {
+    const auto bad = [&strName](const char* szReason) {
+        return Failure(EXIT_STATUS_USAGE, strName + ": " + szReason);
+    };
     if (strArgument.empty()) {
-        throw Failure(EXIT_STATUS_USAGE, "TID: the id is empty");
+        throw bad("the id is empty");
     }
     if (strArgument != "-") {
         return {strArgument};
@@ -95,23 +98,23 @@ std::vector<std::string> readTids(const std::string& strArgument)
     std::vector<std::string> strTids;
     for (const std::string& strLine : readSecrets("Token id: ")) {
         if (strLine.find('\0') != std::string::npos) {
-            throw Failure(EXIT_STATUS_USAGE, "TID: an id on standard input holds a NUL byte");
+            throw bad("an id on standard input holds a NUL byte");
         }
         if (!strLine.empty()) {
             strTids.push_back(strLine);
         }
     }
     if (strTids.empty()) {
-        throw Failure(EXIT_STATUS_USAGE, "TID: there is no id on standard input");
+        throw bad("there is no id on standard input");
     }
     return strTids;
 }
 
-std::string readTid(const std::string& strArgument)
+std::string readTid(const std::string& strName, const std::string& strArgument)
 {
-    const std::vector<std::string> strTids = readTids(strArgument);
+    const std::vector<std::string> strTids = readTids(strName, strArgument);
     if (strTids.size() > 1) {
-        throw Failure(EXIT_STATUS_USAGE, "TID: there is more than one id on standard input");
+        throw Failure(EXIT_STATUS_USAGE, strName + ": there is more than one id on standard input");
     }
     return strTids[0];
 }

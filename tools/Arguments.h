@@ -49,12 +49,12 @@ void addExtra(Command& command, std::optional<Json::Value>& jExtra);
 // The argument TID.
 void addTid(Command& command, std::string& strTid);
 
-// The ids that an argument stands for: itself, or for "-" the lines of standard input. Fails when
-// there is none.
-std::vector<std::string> readTids(const std::string& strArgument);
+// The ids that an argument of a name stands for: itself, or for "-" the lines of standard input. Fails
+// when there is none.
+std::vector<std::string> readTids(const std::string& strName, const std::string& strArgument);
 
 // The same for commands that take one id.
-std::string readTid(const std::string& strArgument);
+std::string readTid(const std::string& strName, const std::string& strArgument);
 
 // What is said of an id that no token has.
 Failure noSuchToken();

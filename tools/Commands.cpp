@@ -2,8 +2,10 @@
 
 #include <CLI/CLI.hpp>
 
+#include "AccessTokenDefine.h"
 #include "Console.h"
 #include "Place.h"
+#include "Store.h"
 
 namespace {
 
@@ -31,6 +33,46 @@ CLI::Option& addRepeated(CLI::App& app, const std::string& strName, const tool::
     return *app.add_option_function<std::vector<std::string>>(strName, takenAll, strDescription);
 }
 
+// The arguments, with "--name=" as "--name" and an empty text: the parser would take the next argument
+// for its value.
+std::vector<std::string> argumentsOf(int nArguments, char** rgArguments)
+{
+    std::vector<std::string> strArguments;
+    for (int i = 1; i < nArguments; ++i) {
+        std::string strArgument = rgArguments[i];
+        const bool blEmptyValue =
+            0 == strArgument.compare(0, 2, "--") && strArgument.find('=') == strArgument.size() - 1;
+        if (blEmptyValue) {
+            strArgument.pop_back();
+        }
+        strArguments.push_back(strArgument);
+        if (blEmptyValue) {
+            strArguments.push_back("");
+        }
+    }
+    return strArguments;
+}
+
+// The parser's "NAME: At Most 1 required but received 2" and "NAME: 1 required TYPE missing", in English.
+std::string mismatchText(const std::string& strSentence)
+{
+    const bool blMissing = strSentence.find(" missing") != std::string::npos;
+    return strSentence.substr(0, strSentence.find(": ")) +
+           (blMissing ? ": needs a value" : ": can be given once only");
+}
+
+// A sentence about the arguments; one that is long may be an id in the wrong place, and is shortened.
+std::string withoutIds(std::string strSentence, const std::vector<std::string>& strArguments)
+{
+    for (const std::string& strArgument : strArguments) {
+        const size_t nPosition = strSentence.find(strArgument);
+        if (strArgument.size() >= VEMO_ATOKEN_LENGTH_MIN && nPosition != std::string::npos) {
+            strSentence.replace(nPosition, strArgument.size(), tool::shortened(strArgument));
+        }
+    }
+    return strSentence;
+}
+
 } // namespace
 
 namespace tool {
@@ -45,30 +87,32 @@ void Command::flag(const std::string& strName, std::function<void()> set, const 
     m_app.add_flag_callback(strName, std::move(set), strDescription);
 }
 
-void Command::option(const std::string& strName, const std::string& strType, Take take,
+void Command::option(const std::string& strName, const std::string& strType, const Take& take,
                      const std::string& strDescription)
 {
     addSingle(m_app, strName, strName.substr(strName.find("--")), take, strDescription).type_name(strType);
 }
 
-void Command::repeatedOption(const std::string& strName, const std::string& strType, Take take,
+void Command::repeatedOption(const std::string& strName, const std::string& strType, const Take& take,
                              const std::string& strDescription)
 {
     addRepeated(m_app, strName, take, strDescription).allow_extra_args(false)->type_name(strType);
 }
 
-void Command::argument(const std::string& strName, Take take, const std::string& strDescription)
+void Command::argument(const std::string& strName, const Take& take, const std::string& strDescription)
 {
-    optionalArgument(strName, std::move(take), strDescription);
+    optionalArgument(strName, take, strDescription);
     require(strName);
 }
 
-void Command::optionalArgument(const std::string& strName, Take take, const std::string& strDescription)
+void Command::optionalArgument(const std::string& strName, const Take& take,
+                               const std::string& strDescription)
 {
     addSingle(m_app, strName, strName, take, strDescription).type_name("");
 }
 
-void Command::remainingArguments(const std::string& strName, Take take, const std::string& strDescription)
+void Command::remainingArguments(const std::string& strName, const Take& take,
+                                 const std::string& strDescription)
 {
     addRepeated(m_app, strName, take, strDescription).type_name("");
 }
@@ -90,6 +134,8 @@ Commands::Commands()
     m_pApp->set_help_flag("-h,--help", "print this help and exit");
     m_pApp->set_version_flag("--version", VERSION_TEXT, "print the version and exit");
     m_pApp->require_subcommand(0, 1);
+    m_pApp->get_formatter()->label("SUBCOMMAND", "COMMAND");
+    m_pApp->get_formatter()->label("Subcommands", "Commands");
     m_pApp->footer("\"vemo-access-token COMMAND --help\" tells more, and so does vemo-access-token(8).\n\n"
                    "Exit status: 0 done or granted, 1 refused (grant, check), 2 usage, 3 no such token,\n"
                    "4 store or permission failure, 5 doctor has findings.");
@@ -97,7 +143,8 @@ Commands::Commands()
 
 Commands::~Commands() = default;
 
-Command Commands::add(const std::string& strName, const std::string& strDescription, Run run, Needs needs)
+Command Commands::add(const std::string& strName, const std::string& strDescription, const Run& run,
+                      Needs needs)
 {
     CLI::App& app = *m_pApp->add_subcommand(strName, strDescription);
     app.footer("");
@@ -117,16 +164,22 @@ Command Commands::add(const std::string& strName, const std::string& strDescript
 
 int Commands::run(int nArguments, char** rgArguments)
 {
+    const std::vector<std::string> strArguments = argumentsOf(nArguments, rgArguments);
     try {
-        m_pApp->parse(nArguments, rgArguments);
-    } catch (const CLI::Success& help) { // --help or --version
+        m_pApp->parse(
+            std::vector<std::string>(strArguments.rbegin(), strArguments.rend())); // as it wants them
+    } catch (const CLI::Success& help) {                                           // --help or --version
         std::ostringstream text;
         m_pApp->exit(help, text, text);
         print(text.str());
         flushResult();
         return EXIT_STATUS_DONE;
+    } catch (const CLI::ArgumentMismatch& error) {
+        throw Failure(EXIT_STATUS_USAGE, mismatchText(error.what()));
     } catch (const CLI::ParseError& error) {
-        throw Failure(EXIT_STATUS_USAGE, error.what());
+        throw Failure(EXIT_STATUS_USAGE, withoutIds(error.what(), strArguments));
+    } catch (const Failure& failure) {
+        throw Failure(failure.status(), withoutIds(failure.what(), strArguments));
     }
     if (!m_run) {
         throw Failure(EXIT_STATUS_USAGE, "say what to do; \"vemo-access-token --help\" lists the commands");

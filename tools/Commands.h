@@ -25,15 +25,15 @@ public:
 
     // Takes the text of each occurrence; a BadValue becomes a usage failure that names the option.
     typedef std::function<void(const std::string&)> Take;
-    void option(const std::string& strName, const std::string& strType, Take take,
+    void option(const std::string& strName, const std::string& strType, const Take& take,
                 const std::string& strDescription);
-    void repeatedOption(const std::string& strName, const std::string& strType, Take take,
+    void repeatedOption(const std::string& strName, const std::string& strType, const Take& take,
                         const std::string& strDescription);
 
     // The next argument, or all that are left.
-    void argument(const std::string& strName, Take take, const std::string& strDescription);
-    void optionalArgument(const std::string& strName, Take take, const std::string& strDescription);
-    void remainingArguments(const std::string& strName, Take take, const std::string& strDescription);
+    void argument(const std::string& strName, const Take& take, const std::string& strDescription);
+    void optionalArgument(const std::string& strName, const Take& take, const std::string& strDescription);
+    void remainingArguments(const std::string& strName, const Take& take, const std::string& strDescription);
 
     void require(const std::string& strName);
     void exclude(const std::string& strName, const std::string& strOther);
@@ -63,7 +63,7 @@ public:
     ~Commands();
 
     // Adds a command. run keeps alive what the options are stored in.
-    Command add(const std::string& strName, const std::string& strDescription, Run run,
+    Command add(const std::string& strName, const std::string& strDescription, const Run& run,
                 Needs needs = Needs::Root);
 
     // Reads the arguments and runs the command. Throws Failure.

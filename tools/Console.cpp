@@ -2,11 +2,14 @@
 
 #include <bsd/readpassphrase.h>
 #include <fcntl.h>
+#include <locale.h>
 #include <unistd.h>
+#include <wctype.h>
 
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <cwchar>
 #include <iostream>
 
 #include "AccessTokenUtil.h"
@@ -17,6 +20,40 @@ namespace {
 FILE* g_pResult = stdout;
 
 const int BAR_WIDTH = 40;
+
+locale_t utf8()
+{
+    static const locale_t locale = newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr);
+    return locale;
+}
+
+// The text with \xNN for each byte of what is no UTF-8 or what does not pass.
+template <typename Passes>
+std::string escaped(const std::string& strText, Passes passes)
+{
+    const locale_t before = uselocale(utf8());
+    std::string strOut;
+    for (size_t i = 0; i < strText.size();) {
+        wchar_t cWide = 0;
+        mbstate_t state = {};
+        const size_t cbRead = mbrtowc(&cWide, &strText[i], strText.size() - i, &state);
+        // What is too large is an error's number, or none that UTF-8 goes to.
+        const bool blValid = cbRead <= strText.size() - i && cWide <= 0x10ffff;
+        const size_t cbCharacter = blValid && cbRead ? cbRead : 1;
+        if (blValid && passes(cWide)) {
+            strOut.append(strText, i, cbCharacter);
+        } else {
+            for (size_t j = i; j < i + cbCharacter; ++j) {
+                char szEscape[5];
+                snprintf(szEscape, sizeof(szEscape), "\\x%02x", static_cast<unsigned char>(strText[j]));
+                strOut += szEscape;
+            }
+        }
+        i += cbCharacter;
+    }
+    uselocale(before);
+    return strOut;
+}
 
 } // namespace
 
@@ -80,18 +117,18 @@ void flushResult()
 
 std::string printable(const std::string& strText)
 {
-    std::string strOut;
-    for (const char c : strText) {
-        const unsigned char nByte = static_cast<unsigned char>(c);
-        if (nByte < 0x20 || nByte == 0x7f) {
-            char szEscape[5];
-            snprintf(szEscape, sizeof(szEscape), "\\x%02x", nByte);
-            strOut += szEscape;
-        } else {
-            strOut += c;
-        }
-    }
-    return strOut;
+    return escaped(strText,
+                   [](wchar_t cWide) { return 0 != iswprint_l(static_cast<wint_t>(cWide), utf8()); });
+}
+
+std::string validUtf8(const std::string& strText)
+{
+    return escaped(strText, [](wchar_t) { return true; });
+}
+
+void printLine(const std::string& strText)
+{
+    print((isTerminal(g_pResult) ? printable(strText) : strText) + "\n");
 }
 
 std::vector<std::string> readSecrets(const std::string& strPrompt)
@@ -116,12 +153,14 @@ bool confirm(const std::string& strQuestion)
 {
     fprintf(stderr, "%s [y/N] ", printable(strQuestion).c_str());
     std::string strAnswer;
-    std::getline(std::cin, strAnswer);
+    if (!std::getline(std::cin, strAnswer)) {
+        fputc('\n', stderr); // that an answer would have ended with
+    }
     return strAnswer == "y" || strAnswer == "yes";
 }
 
-Progress::Progress(const std::string& strTitle, size_t nTotal)
-    : m_strTitle(strTitle), m_nTotal(nTotal), m_blShown(isTerminal(stderr))
+Progress::Progress(const std::string& strTitle, size_t nTotal, bool blWanted)
+    : m_strTitle(strTitle), m_nTotal(nTotal), m_blShown(blWanted && isTerminal(stderr))
 {
     draw();
 }

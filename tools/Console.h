@@ -35,8 +35,14 @@ void complain(const std::string& strSentence);
 // Writes out what is still buffered. Fails when the result could not be written.
 void flushResult();
 
-// Text for a terminal's eyes: control characters, which could command it, become \xNN.
+// Text for a terminal: control characters, which could command it, and what is no UTF-8 become \xNN.
 std::string printable(const std::string& strText);
+
+// The same without the control characters.
+std::string validUtf8(const std::string& strText);
+
+// Writes a line to the result; to a terminal, printable.
+void printLine(const std::string& strText);
 
 // The lines of standard input; on a terminal one line, asked for and not shown.
 std::vector<std::string> readSecrets(const std::string& strPrompt);
@@ -47,7 +53,7 @@ bool confirm(const std::string& strQuestion);
 // A progress bar on standard error, where that is a terminal.
 class Progress {
 public:
-    Progress(const std::string& strTitle, size_t nTotal);
+    Progress(const std::string& strTitle, size_t nTotal, bool blWanted = true);
     ~Progress();
     Progress(const Progress&) = delete;
     Progress& operator=(const Progress&) = delete;

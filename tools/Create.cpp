@@ -1,5 +1,6 @@
 // create and generate: new tokens, new ids.
 
+#include <csignal>
 #include <ctime>
 #include <memory>
 
@@ -20,7 +21,7 @@ struct Options {
     std::vector<tool::Allowance> allowances;
     std::string strSid;
     std::optional<Json::Value> jExtra;
-    std::string strTid;
+    std::optional<std::string> strTid;
 };
 
 const int64_t TTL_DEFAULT = 86400; // the library's
@@ -36,7 +37,7 @@ std::string newTid()
 
 std::string ownTid(const std::string& strArgument)
 {
-    const std::string strTid = tool::readTid(strArgument);
+    std::string strTid = tool::readTid("--tid", strArgument);
     if (strTid.size() < VEMO_ATOKEN_LENGTH_MIN) {
         throw tool::Failure(tool::EXIT_STATUS_USAGE,
                             "--tid: an id needs " + std::to_string(VEMO_ATOKEN_LENGTH_MIN) +
@@ -48,7 +49,7 @@ std::string ownTid(const std::string& strArgument)
 Json::Value recordOf(const Options& options)
 {
     Json::Value jToken(Json::objectValue);
-    jToken["tid"] = options.strTid.empty() ? newTid() : ownTid(options.strTid);
+    jToken["tid"] = options.strTid ? ownTid(*options.strTid) : newTid();
     jToken["bind_sid"] = options.strSid;
     jToken["uid"] = *options.nUid;
     jToken["create_time"] = Json::Int64{time(nullptr)};
@@ -82,6 +83,7 @@ int create(const Options& options)
     }
     store.create(jToken);
     store.commit();
+    signal(SIGPIPE, SIG_IGN); // for write() to fail, where nobody reads
     try {
         tool::print(strTid + "\n");
         tool::flushResult();
@@ -110,8 +112,9 @@ void addCreate(Commands& commands)
     addAllowances(command, "--allow", pOptions->allowances, "an API, and methods of it, that it opens");
     command.option("--bind-sid", "SID", into(pOptions->strSid), "bind it to this login session");
     addExtra(command, pOptions->jExtra);
-    command.option("--tid", "TID", into(pOptions->strTid),
-                   "an id of your own; \"-\" reads it from standard input");
+    const auto keep = [](const std::string& strText) { return strText; };
+    addParsed(command, "--tid", "TID", pOptions->strTid, keep,
+              "an id of your own; \"-\" reads it from standard input");
 }
 
 void addGenerate(Commands& commands)

@@ -50,8 +50,7 @@ void printText(const Finding& finding, bool blRepaired)
     }
 }
 
-void report(const std::vector<Finding>& repaired, const std::vector<Finding>& left,
-            const tool::Layout& layout)
+void report(const tool::Findings& repaired, const tool::Findings& left, const tool::Layout& layout)
 {
     Json::Value jFindings(Json::arrayValue);
     const auto add = [&](const Finding& finding, bool blRepaired) {
@@ -75,16 +74,26 @@ void report(const std::vector<Finding>& repaired, const std::vector<Finding>& le
     }
 }
 
-// Repairs what can be repaired, and what comes to light by that. Returns what was.
-std::vector<Finding> repairAll()
+bool repair(const Finding& finding)
 {
-    std::vector<Finding> repaired;
+    try {
+        finding.repair();
+        return true;
+    } catch (const tool::Failure& failure) {
+        tool::complain(std::string("cannot repair: ") + failure.what());
+        return false;
+    }
+}
+
+// Repairs what can be repaired, and what comes to light by that. Returns what was.
+tool::Findings repairAll()
+{
+    tool::Findings repaired;
     bool blMore = true;
     for (int i = 0; blMore && i < ROUNDS_MAX; ++i) {
         blMore = false;
         for (const Finding& finding : tool::examine()) {
-            if (finding.repair) {
-                finding.repair();
+            if (finding.repair && repair(finding)) {
                 repaired.push_back(finding);
                 blMore = true;
             }
@@ -95,8 +104,8 @@ std::vector<Finding> repairAll()
 
 int doctor(const Options& options)
 {
-    const std::vector<Finding> repaired = options.blRepair ? repairAll() : std::vector<Finding>();
-    const std::vector<Finding> left = tool::examine();
+    const tool::Findings repaired = options.blRepair ? repairAll() : tool::Findings();
+    const tool::Findings left = tool::examine();
     report(repaired, left, options.layout);
     return left.empty() ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_FINDINGS;
 }
@@ -111,8 +120,9 @@ void addDoctor(Commands& commands)
     Command command = commands.add(
         "doctor", "say what is wrong with the store, what it means and what helps",
         [pOptions] { return doctor(*pOptions); }, Commands::Needs::Nothing);
-    command.flag("--repair", pOptions->blRepair, "repair what needs no decision");
-    addFormOptions(command, pOptions->layout);
+    command.flag("--repair", pOptions->blRepair,
+                 "repair what can be; deletes tokens that cannot be read, and the expired");
+    addForm(command, pOptions->layout);
 }
 
 } // namespace tool

@@ -19,8 +19,14 @@ struct Finding {
     std::function<void()> repair; // empty where an administrator must decide; throws Failure
 };
 
+typedef std::vector<Finding> Findings;
+
 // Everything that is wrong now. What cannot be looked at because of one finding is left out.
-std::vector<Finding> examine();
+Findings examine();
+
+// Its two parts, which add to the findings. The first returns whether the database can be opened.
+bool examinePlace(Findings& findings);
+void examineStore(Findings& findings);
 
 } // namespace tool
 

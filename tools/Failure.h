@@ -19,14 +19,24 @@ enum ExitStatus {
 
 class Failure : public std::runtime_error {
 public:
-    Failure(ExitStatus status, const std::string& strSentence)
-        : std::runtime_error(strSentence), m_status(status)
+    // The hint is for whoever called the command; it ends the sentence.
+    Failure(ExitStatus status, const std::string& strFact, const std::string& strHint = "")
+        : std::runtime_error(strFact + (strHint.empty() ? "" : "; " + strHint)),
+          m_status(status),
+          m_strFact(strFact)
     {
     }
     ExitStatus status() const { return m_status; }
+    const std::string& fact() const { return m_strFact; }
 
 private:
     ExitStatus m_status;
+    std::string m_strFact;
+};
+
+// Others held the database for too long: a failure that passes.
+class LockedFailure : public Failure {
+    using Failure::Failure;
 };
 
 // A value that cannot be used; who knows where it came from says so in front of the reason.

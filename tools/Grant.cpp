@@ -13,6 +13,8 @@
 
 namespace {
 
+const char* const EXPIRED = "expired";
+
 struct Options {
     std::string strTid;
     std::string strApi;
@@ -39,7 +41,7 @@ std::string refusal(const std::optional<Json::Value>& jFound, const Options& opt
     }
     Json::Value jToken = *jFound;
     if (jToken["deadline"].asInt64() < time(nullptr)) {
-        return "expired";
+        return EXPIRED;
     }
     const int nPermission = permission(jToken, options);
     const Json::Value& jAllow = jToken["webapi_allow"];
@@ -56,7 +58,7 @@ std::string refusal(const std::optional<Json::Value>& jFound, const Options& opt
 
 int check(const Options& options)
 {
-    const std::string strTid = tool::readTid(options.strTid);
+    const std::string strTid = tool::readTid("TID", options.strTid);
     const auto jToken = tool::Store(tool::Store::Access::Read).findByPrefix(strTid);
     const std::string strReason = refusal(jToken, options);
     if (tool::Layout::Form::Table == options.layout.form) {
@@ -76,9 +78,9 @@ void spend(tool::Store& store, const Json::Value& jToken)
 {
     const Json::Int64 nCount = jToken["count"].asInt64();
     if (nCount > 1) {
-        Json::Value jSaved = jToken;
-        jSaved["count"] = nCount - 1;
-        store.save(jSaved);
+        Json::Value jChange;
+        jChange["count"] = nCount - 1;
+        store.update(jToken["tid"].asString(), jChange);
     } else if (nCount >= 0) {
         store.removeTid(jToken["tid"].asString());
     }
@@ -86,11 +88,12 @@ void spend(tool::Store& store, const Json::Value& jToken)
 
 int grant(const Options& options)
 {
-    const std::string strTid = tool::readTid(options.strTid);
+    const std::string strTid = tool::readTid("TID", options.strTid);
     tool::Store store(tool::Store::Access::Write);
+    const bool blThere = store.find(strTid).has_value();
     store.purge();
     const std::optional<Json::Value> jToken = store.find(strTid);
-    const std::string strReason = refusal(jToken, options);
+    const std::string strReason = blThere && !jToken ? EXPIRED : refusal(jToken, options);
     if (strReason.empty()) {
         spend(store, *jToken);
     }
@@ -129,7 +132,7 @@ void addCheck(Commands& commands)
     Command command = commands.add("check", "tell whether a grant would succeed, and why not; spends nothing",
                                    [pOptions] { return check(*pOptions); });
     addCall(command, *pOptions);
-    addFormOptions(command, pOptions->layout);
+    addForm(command, pOptions->layout);
 }
 
 void addGrant(Commands& commands)

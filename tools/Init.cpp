@@ -14,8 +14,11 @@ int init()
     const bool blDirectory = tool::makeDirectory();
     const bool blFile = !tool::statusOf(VEMO_ATOKEN_DB_PATH);
     tool::Store store(tool::Store::Access::Plain, tool::Store::Missing::Make);
-    const bool blTable = blFile || !store.hasTable();
-    store.makeTable();
+    bool blTable = blFile; // made with it
+    if (!store.hasTable()) {
+        store.makeTable();
+        blTable = true;
+    }
     if (blDirectory) {
         tool::print("made the directory " + tool::databaseDirectory() + "\n");
     }

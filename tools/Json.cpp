@@ -10,6 +10,26 @@
 
 namespace {
 
+// JSON may hold some control characters as they are, but a terminal would obey them.
+std::string withoutControls(const std::string& strJson)
+{
+    std::string strOut;
+    for (size_t i = 0; i < strJson.size(); ++i) {
+        const unsigned char nByte = static_cast<unsigned char>(strJson[i]);
+        const unsigned char nNext = i + 1 < strJson.size() ? static_cast<unsigned char>(strJson[i + 1]) : 0;
+        const bool blC1 = nByte == 0xc2 && nNext >= 0x80 && nNext < 0xa0; // U+0080 to U+009F
+        if (nByte == 0x7f || blC1) {
+            char szEscape[7];
+            snprintf(szEscape, sizeof(szEscape), "\\u%04x", blC1 ? nNext : nByte);
+            strOut += szEscape;
+            i += blC1 ? 1 : 0;
+        } else {
+            strOut += strJson[i];
+        }
+    }
+    return strOut;
+}
+
 std::string write(const Json::Value& jValue, const char* szIndentation)
 {
     Json::StreamWriterBuilder builder;
@@ -19,7 +39,7 @@ std::string write(const Json::Value& jValue, const char* szIndentation)
     // are not valid UTF-8.
     builder["useSpecialFloats"] = true;
     builder["emitUTF8"] = true;
-    return Json::writeString(builder, jValue);
+    return withoutControls(Json::writeString(builder, jValue));
 }
 
 // The first error of the reader's report, each of which stands behind a "*" and on several lines.
@@ -30,18 +50,21 @@ std::string firstError(const std::string& strReport)
     for (std::string strWord; words >> strWord && (strWord != "*" || strError.empty());) {
         strError += strWord == "*" ? "" : (strError.empty() ? "" : " ") + strWord;
     }
-    return strError;
+    const std::string strFirstLine = "Line 1, "; // of one line there is nothing to tell
+    return 0 == strError.compare(0, strFirstLine.size(), strFirstLine) ? strError.substr(strFirstLine.size())
+                                                                       : strError;
 }
 
 } // namespace
 
 namespace tool {
 
-Json::Value parseObject(const std::string& strText)
+Json::Value parseObject(const std::string& strText, int nNestedMax)
 {
     Json::CharReaderBuilder builder;
     Json::CharReaderBuilder::strictMode(&builder.settings_);
     builder["allowSpecialFloats"] = true; // as compactJson writes them
+    builder["stackLimit"] = nNestedMax;
     const std::unique_ptr<Json::CharReader> pReader(builder.newCharReader());
     Json::Value jValue;
     std::string strReport;

@@ -9,8 +9,11 @@
 
 namespace tool {
 
+// How deep the library reads what is nested.
+const int NESTED_MAX = 1000;
+
 // Reads one JSON object, strictly. Throws BadValue.
-Json::Value parseObject(const std::string& strText);
+Json::Value parseObject(const std::string& strText, int nNestedMax = NESTED_MAX);
 
 // On one line.
 std::string compactJson(const Json::Value& jValue);

@@ -14,6 +14,7 @@
 namespace {
 
 using tool::Layout;
+typedef tool::Table::Kind Kind;
 
 Layout::Form parseForm(const std::string& strText)
 {
@@ -72,7 +73,14 @@ bool isExpired(const Json::Value& jToken, time_t nNow)
 
 void printTable(const Json::Value& jTokens, const Layout& layout)
 {
-    tool::Table table({"TID", "USER", "FUNCTION", ">USES", "DEADLINE", "EXPIRES", "SESSION", "ALLOWS"},
+    tool::Table table({{"TID", Kind::Short},
+                       {"USER", Kind::Short},
+                       {"FUNCTION", Kind::Long},
+                       {"USES", Kind::Right},
+                       {"DEADLINE", Kind::Short},
+                       {"EXPIRES", Kind::Short},
+                       {"SESSION", Kind::Long},
+                       {"ALLOWS", Kind::Long}},
                       !layout.blNoHeader);
     const time_t nNow = time(nullptr);
     for (const Json::Value& jToken : jTokens) {
@@ -90,14 +98,14 @@ void printField(const Json::Value& jToken, const std::string& strField)
 {
     const Json::Value& jValue = jToken[strField];
     const std::string strValue = jValue.isString() ? jValue.asString() : tool::compactJson(jValue);
-    tool::print((tool::isTerminal(tool::resultStream()) ? tool::printable(strValue) : strValue) + "\n");
+    tool::printLine(strValue);
 }
 
 void printSheet(const Json::Value& jToken, const Layout& layout)
 {
     const time_t nNow = time(nullptr);
     const char* szColour = isExpired(jToken, nNow) ? "red" : nullptr;
-    tool::Table table({"FIELD", "VALUE"}, !layout.blNoHeader);
+    tool::Table table({{"FIELD", Kind::Short}, {"VALUE", Kind::Long}}, !layout.blNoHeader);
     for (const std::string& strField : tool::fieldNames()) {
         const Json::Value& jValue = jToken[strField];
         if (strField == "uid") {
@@ -131,9 +139,14 @@ std::string parseField(const std::string& strText)
     return strText;
 }
 
-void addFormOptions(Command& command, Layout& layout)
+void addForm(Command& command, Layout& layout)
 {
     addParsed(command, "-o,--output", "FORM", layout.form, parseForm, "table (the default), json or jsonl");
+}
+
+void addFormOptions(Command& command, Layout& layout)
+{
+    addForm(command, layout);
     command.flag("--no-header", layout.blNoHeader, "no line of titles above a table");
 }
 
@@ -177,11 +190,6 @@ void printToken(const Json::Value& jToken, const Layout& layout)
     } else {
         print((Layout::Form::Json == layout.form ? styledJson(jToken) : compactJson(jToken)) + "\n");
     }
-}
-
-std::string masked(const std::string& strTid)
-{
-    return strTid.substr(0, PREFIX_MIN);
 }
 
 } // namespace tool

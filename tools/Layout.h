@@ -26,7 +26,8 @@ struct Layout {
 // The name of a field, if it is one. Throws BadValue.
 std::string parseField(const std::string& strText);
 
-// Adds -o and --no-header to a command.
+// Adds -o to a command; the second, --no-header too.
+void addForm(Command& command, Layout& layout);
 void addFormOptions(Command& command, Layout& layout);
 
 // Adds what commands that show tokens have besides: --field, --utc, --epoch.
@@ -37,9 +38,6 @@ void printTokens(Json::Value& jTokens, const Layout& layout);
 
 // Prints one token in full.
 void printToken(const Json::Value& jToken, const Layout& layout);
-
-// The start of an id, enough to tell tokens apart but not to use one.
-std::string masked(const std::string& strTid);
 
 } // namespace tool
 

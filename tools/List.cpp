@@ -103,7 +103,7 @@ int list(const ListOptions& options)
 
 int show(const ShowOptions& options)
 {
-    const std::string strTid = tool::readTid(options.strTid);
+    const std::string strTid = tool::readTid("TID", options.strTid);
     const auto jToken = tool::Store(tool::Store::Access::Read).findByPrefix(strTid);
     if (!jToken) {
         throw tool::noSuchToken();

@@ -1,5 +1,6 @@
 #include "Place.h"
 
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -22,7 +23,12 @@ void makeParents(const std::string& strPath)
 {
     for (size_t nEnd = strPath.find('/', 1); nEnd != std::string::npos; nEnd = strPath.find('/', nEnd + 1)) {
         const std::string strParent = strPath.substr(0, nEnd);
-        if (0 != mkdir(strParent.c_str(), PARENT_MODE) && EEXIST != errno) {
+        if (0 == mkdir(strParent.c_str(), PARENT_MODE)) {
+            // The umask may have taken bits away that are needed.
+            if (0 != chmod(strParent.c_str(), PARENT_MODE)) {
+                failOn(strParent);
+            }
+        } else if (EEXIST != errno) {
             failOn(strParent);
         }
     }
@@ -50,6 +56,18 @@ std::optional<struct stat> statusOf(const std::string& strPath)
     return std::nullopt;
 }
 
+std::string firstBytes(const std::string& strPath, size_t cbWanted)
+{
+    std::string strBytes(cbWanted, '\0');
+    const int nFile = open(strPath.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
+    const ssize_t cbRead = 0 > nFile ? 0 : read(nFile, strBytes.data(), cbWanted);
+    if (0 <= nFile) {
+        close(nFile);
+    }
+    strBytes.resize(cbRead > 0 ? static_cast<size_t>(cbRead) : 0);
+    return strBytes;
+}
+
 void requireDatabase(bool blCreate)
 {
     struct stat status = {};
@@ -62,13 +80,17 @@ void requireDatabase(bool blCreate)
     if (ENOENT != errno) {
         failOn(VEMO_ATOKEN_DB_PATH);
     }
+    if (statusOf(VEMO_ATOKEN_DB_PATH)) {
+        throw Failure(EXIT_STATUS_STORE,
+                      VEMO_ATOKEN_DB_PATH " is a symbolic link to a file that is not there");
+    }
     if (!statusOf(databaseDirectory())) {
-        throw Failure(EXIT_STATUS_STORE, "there is no directory " + databaseDirectory() +
-                                             "; \"vemo-access-token init\" makes it");
+        throw Failure(EXIT_STATUS_STORE, "there is no directory " + databaseDirectory(),
+                      "\"vemo-access-token init\" makes it");
     }
     if (!blCreate) {
-        throw Failure(EXIT_STATUS_STORE,
-                      "there is no database " VEMO_ATOKEN_DB_PATH "; \"vemo-access-token init\" makes it");
+        throw Failure(EXIT_STATUS_STORE, "there is no database " VEMO_ATOKEN_DB_PATH,
+                      "\"vemo-access-token init\" makes it");
     }
 }
 
@@ -83,7 +105,6 @@ bool makeDirectory()
         makeParents(strDirectory);
         nMade = mkdir(strDirectory.c_str(), PRIVATE_MODE);
     }
-    // The umask may have taken bits away that are needed.
     if (0 != nMade || 0 != chmod(strDirectory.c_str(), PRIVATE_MODE)) {
         failOn(strDirectory);
     }

@@ -16,6 +16,9 @@ std::string databaseDirectory();
 // What lstat tells of a path; nothing when there is no such file. Throws Failure.
 std::optional<struct stat> statusOf(const std::string& strPath);
 
+// The first bytes of a file, as many as there are; none where it cannot be read.
+std::string firstBytes(const std::string& strPath, size_t cbWanted);
+
 // Fails, with the reason, unless the database can be opened, or made if blCreate.
 void requireDatabase(bool blCreate);
 

@@ -24,14 +24,9 @@ struct PurgeOptions {
     bool blDryRun = false;
 };
 
-std::string tokensText(int64_t nTokens)
+void report(uint64_t nTokens, const std::string& strDone, bool blDryRun)
 {
-    return std::to_string(nTokens) + (1 == nTokens ? " token" : " tokens");
-}
-
-void report(int64_t nTokens, const std::string& strDone, bool blDryRun)
-{
-    tool::print(tokensText(nTokens) + (blDryRun ? " would be " : " ") + strDone + "\n");
+    tool::print(tool::countText(nTokens, "token") + (blDryRun ? " would be " : " ") + strDone + "\n");
 }
 
 // The ids that the arguments stand for.
@@ -39,7 +34,7 @@ std::vector<std::string> readAll(const std::vector<std::string>& strArguments)
 {
     std::vector<std::string> strTids;
     for (const std::string& strArgument : strArguments) {
-        for (const std::string& strTid : tool::readTids(strArgument)) {
+        for (const std::string& strTid : tool::readTids("TID", strArgument)) {
             strTids.push_back(strTid);
         }
     }
@@ -63,38 +58,40 @@ int revokeNamed(const RevokeOptions& options)
         }
         store.commit();
     }
-    report(static_cast<int64_t>(strTids.size()), "revoked", options.blDryRun);
+    report(strTids.size(), "revoked", options.blDryRun);
     return tool::EXIT_STATUS_DONE;
+}
+
+uint64_t countOf(const Json::Value& jFilter)
+{
+    return tool::Store(tool::Store::Access::Read).count(jFilter);
 }
 
 // Whether the administrator wants it. Tokens that come or go meanwhile do not matter: those that are
 // there in the end are revoked, and counted.
-bool isWanted(int64_t nTokens, bool blYes)
+bool isWanted(const Json::Value& jFilter)
 {
-    if (blYes) {
-        return true;
-    }
     if (!tool::isTerminal(stdin) || !tool::isTerminal(stderr)) {
         throw tool::Failure(tool::EXIT_STATUS_USAGE,
                             "--yes is needed to revoke many where there is nobody to ask");
     }
-    return 0 == nTokens || tool::confirm("Revoke " + tokensText(nTokens) + "?");
+    const uint64_t nTokens = countOf(jFilter);
+    return 0 == nTokens || tool::confirm("Revoke " + tool::countText(nTokens, "token") + "?");
 }
 
 int revokeMany(const RevokeOptions& options)
 {
     const Json::Value jFilter = options.selection.filter();
-    const int64_t nTokens = tool::Store(tool::Store::Access::Read).count(jFilter);
     if (options.blDryRun) {
-        report(nTokens, "revoked", true);
+        report(countOf(jFilter), "revoked", true);
         return tool::EXIT_STATUS_DONE;
     }
-    if (!isWanted(nTokens, options.blYes)) {
+    if (!options.blYes && !isWanted(jFilter)) {
         report(0, "revoked", false);
         return tool::EXIT_STATUS_DONE;
     }
     tool::Store store(tool::Store::Access::Write);
-    const int64_t nRevoked = store.remove(jFilter);
+    const uint64_t nRevoked = store.remove(jFilter);
     store.commit();
     report(nRevoked, "revoked", false);
     return tool::EXIT_STATUS_DONE;
@@ -108,13 +105,17 @@ int revoke(const RevokeOptions& options)
             tool::EXIT_STATUS_USAGE,
             "say which tokens: by TID, by --uid, --user, --function and --bind-sid, or --all");
     }
+    // A script's empty variable shall not revoke all that is bound to no session.
+    if (options.selection.strSid == "") {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, "--bind-sid: must not be empty");
+    }
     return options.strTids.empty() ? revokeMany(options) : revokeNamed(options);
 }
 
 int purge(const PurgeOptions& options)
 {
     tool::Store store(options.blDryRun ? tool::Store::Access::Read : tool::Store::Access::Write);
-    int64_t nTokens = 0;
+    uint64_t nTokens = 0;
     if (options.blDryRun) {
         nTokens = store.number(std::string("SELECT count(*) FROM token WHERE ") + tool::SQL_EXPIRED);
     } else {

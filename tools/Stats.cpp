@@ -14,6 +14,8 @@
 
 namespace {
 
+typedef tool::Table::Kind Kind;
+
 struct Options {
     bool blPrometheus = false;
     tool::Layout layout;
@@ -25,7 +27,7 @@ struct Group {
 };
 
 struct UserGroup {
-    int64_t nUid;
+    std::optional<int64_t> nUid; // nothing for a NULL
     int64_t nTokens;
 };
 
@@ -57,8 +59,10 @@ Statistics collect()
          store.query("SELECT function, count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
         statistics.functions.push_back({row[0].value_or(""), numberOf(row[1])});
     }
-    for (const auto& row : store.query("SELECT uid, count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
-        statistics.users.push_back({numberOf(row[0]), numberOf(row[1])});
+    for (const auto& row :
+         store.query("SELECT CAST(uid AS INTEGER), count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
+        const auto nUid = row[0] ? std::optional<int64_t>(numberOf(row[0])) : std::nullopt;
+        statistics.users.push_back({nUid, numberOf(row[1])});
     }
     statistics.nFreePages = store.number("PRAGMA freelist_count");
     statistics.nPageBytes = store.number("PRAGMA page_size");
@@ -67,14 +71,19 @@ Statistics collect()
     return statistics;
 }
 
-std::string nameOf(int64_t nUid)
+std::string numberText(const UserGroup& group)
 {
-    return tool::userName(nUid).value_or("");
+    return group.nUid ? std::to_string(*group.nUid) : "NULL";
+}
+
+std::string nameOf(const UserGroup& group)
+{
+    return group.nUid ? tool::userName(*group.nUid).value_or("") : "";
 }
 
 void printTables(const Statistics& statistics, bool blHeader)
 {
-    tool::Table totals({"STORE", ">NUMBER"}, blHeader);
+    tool::Table totals({{"STORE", Kind::Short}, {"NUMBER", Kind::Right}}, blHeader);
     totals.add({"tokens", std::to_string(statistics.nTokens)});
     totals.add({"expired", std::to_string(statistics.nExpired)});
     totals.add({"unlimited uses", std::to_string(statistics.nUnlimited)});
@@ -82,15 +91,15 @@ void printTables(const Statistics& statistics, bool blHeader)
     totals.add({"free pages of " + std::to_string(statistics.nPageBytes) + " bytes",
                 std::to_string(statistics.nFreePages)});
     totals.print();
-    tool::Table functions({"FUNCTION", ">TOKENS"}, blHeader);
+    tool::Table functions({{"FUNCTION", Kind::Long}, {"TOKENS", Kind::Right}}, blHeader);
     for (const Group& group : statistics.functions) {
         functions.add({group.strName, std::to_string(group.nTokens)});
     }
     tool::print("\n");
     functions.print();
-    tool::Table users({">UID", "USER", ">TOKENS"}, blHeader);
+    tool::Table users({{"UID", Kind::Right}, {"USER", Kind::Short}, {"TOKENS", Kind::Right}}, blHeader);
     for (const UserGroup& group : statistics.users) {
-        users.add({std::to_string(group.nUid), nameOf(group.nUid), std::to_string(group.nTokens)});
+        users.add({numberText(group), nameOf(group), std::to_string(group.nTokens)});
     }
     tool::print("\n");
     users.print();
@@ -115,19 +124,19 @@ Json::Value jsonOf(const Statistics& statistics)
     jStatistics["users"] = Json::Value(Json::arrayValue);
     for (const UserGroup& group : statistics.users) {
         Json::Value jGroup;
-        jGroup["uid"] = Json::Int64{group.nUid};
-        jGroup["user"] = nameOf(group.nUid);
+        jGroup["uid"] = group.nUid ? Json::Value(Json::Int64{*group.nUid}) : Json::Value();
+        jGroup["user"] = nameOf(group);
         jGroup["tokens"] = Json::Int64{group.nTokens};
         jStatistics["users"].append(jGroup);
     }
     return jStatistics;
 }
 
-// A label's value in the exposition format.
+// A label's value in the exposition format, which is UTF-8.
 std::string label(const std::string& strValue)
 {
     std::string strEscaped;
-    for (const char c : strValue) {
+    for (const char c : tool::validUtf8(strValue)) {
         strEscaped += c == '\\' ? "\\\\" : c == '"' ? "\\\"" : c == '\n' ? "\\n" : std::string(1, c);
     }
     return "\"" + strEscaped + "\"";
@@ -157,13 +166,13 @@ void printMetrics(const Statistics& statistics)
                 statistics.nPageBytes);
     printFamily(strPrefix + "function_tokens", "Tokens by the purpose they were made for.");
     for (const Group& group : statistics.functions) {
-        tool::print(strPrefix + "function_tokens{function=" + label(group.strName) + "} " +
-                    std::to_string(group.nTokens) + "\n");
+        tool::printLine(strPrefix + "function_tokens{function=" + label(group.strName) + "} " +
+                        std::to_string(group.nTokens));
     }
     printFamily(strPrefix + "user_tokens", "Tokens by the user who owns them.");
     for (const UserGroup& group : statistics.users) {
-        tool::print(strPrefix + "user_tokens{uid=\"" + std::to_string(group.nUid) +
-                    "\",user=" + label(nameOf(group.nUid)) + "} " + std::to_string(group.nTokens) + "\n");
+        tool::printLine(strPrefix + "user_tokens{uid=\"" + numberText(group) +
+                        "\",user=" + label(nameOf(group)) + "} " + std::to_string(group.nTokens));
     }
 }
 

@@ -29,31 +29,30 @@ int appendRow(void* pRows, int nColumns, char** rgValue, char**)
     }
 }
 
-bool isLocked(const std::string& strErr)
+bool contains(const std::string& strErr, const char* szText)
 {
-    return std::string::npos != strErr.find("database is locked");
+    return std::string::npos != strErr.find(szText);
 }
 
-std::string explained(const std::string& strErr)
+// What SQLite says, as a fact about the database and a hint at what helps.
+std::pair<std::string, std::string> explained(const std::string& strErr)
 {
-    const auto contains = [&strErr](const char* szText) { return std::string::npos != strErr.find(szText); };
-    if (isLocked(strErr)) {
-        return "stayed locked by another process for 5 seconds";
+    if (contains(strErr, "no such table: token")) {
+        return {"has no table of tokens", "\"vemo-access-token doctor --repair\" makes it"};
     }
-    if (contains("no such table: token")) {
-        return "has no table of tokens; \"vemo-access-token doctor --repair\" makes it";
+    if (contains(strErr, "file is not a database")) {
+        return {"is no token database, or a damaged one (" + strErr + ")", ""};
     }
-    if (contains("file is not a database")) {
-        return "is no token database, or a damaged one (" + strErr + ")";
+    if (contains(strErr, "malformed")) {
+        return {"is damaged (" + strErr + ")", "\"vemo-access-token doctor\" says how badly"};
     }
-    if (contains("malformed")) {
-        return "is damaged (" + strErr + "); \"vemo-access-token doctor\" says how badly";
+    if (contains(strErr, "query aborted")) {
+        return {"holds a token that cannot be read", "\"vemo-access-token doctor\" finds it"};
     }
-    if (contains("query aborted")) {
-        return "holds a token that cannot be read; \"vemo-access-token doctor\" finds it";
-    }
-    return "failed: " + strErr;
+    return {"failed: " + strErr, ""};
 }
+
+bool g_blChanged = false; // what stays when the process fails now
 
 } // namespace
 
@@ -72,6 +71,24 @@ std::string sqlText(const char* szFormat, ...)
         throw std::bad_alloc();
     }
     return szText.get();
+}
+
+std::string masked(const std::string& strTid)
+{
+    size_t nCharacters = 0;
+    for (size_t i = 0; i < strTid.size(); ++i) {
+        const bool blContinued = (static_cast<unsigned char>(strTid[i]) & 0xc0) == 0x80; // UTF-8
+        if (!blContinued && ++nCharacters > PREFIX_MIN) {
+            return strTid.substr(0, i);
+        }
+    }
+    return strTid;
+}
+
+std::string shortened(const std::string& strTid)
+{
+    const std::string strMasked = masked(strTid);
+    return strMasked + (strMasked.size() < strTid.size() ? "..." : "");
 }
 
 std::vector<std::string> fieldNames()
@@ -100,22 +117,43 @@ Store::Store(Access access, Missing missing) : m_access(access)
         query("BEGIN");
         query("SELECT count(*) FROM sqlite_schema"); // takes the lock
         break;
-    case Access::Write: query("BEGIN IMMEDIATE"); break;
+    case Access::Write:
+        if (!hasTable()) {
+            fail("no such table: token"); // before an empty file becomes a database without one
+        }
+        query("BEGIN IMMEDIATE");
+        break;
     }
+}
+
+void Store::noteChange()
+{
+    g_blChanged = true;
+}
+
+void Store::fail(const std::string& strErr)
+{
+    const std::string strPath = VEMO_ATOKEN_DB_PATH " ";
+    if (contains(strErr, "database is locked")) {
+        const bool blNothing = Access::Read != m_access && !g_blChanged;
+        throw LockedFailure(EXIT_STATUS_STORE, strPath + "stayed locked by another process for 5 seconds",
+                            blNothing ? "nothing was changed" : "");
+    }
+    const auto [strFact, strHint] = explained(strErr);
+    throw Failure(EXIT_STATUS_STORE, strPath + strFact, strHint);
 }
 
 void Store::require(int nResult)
 {
     if (0 > nResult) {
-        const bool blUndone = Access::Write == m_access && isLocked(m_db.m_strErr);
-        throw Failure(EXIT_STATUS_STORE, std::string(VEMO_ATOKEN_DB_PATH) + " " + explained(m_db.m_strErr) +
-                                             (blUndone ? "; nothing was changed" : ""));
+        fail(m_db.m_strErr);
     }
 }
 
 void Store::commit()
 {
     query("COMMIT");
+    noteChange();
 }
 
 Json::Value Store::tokens(const Json::Value& jFilter)
@@ -151,7 +189,7 @@ std::optional<Json::Value> Store::findByPrefix(const std::string& strTid)
                       strTid.c_str(), strTid.c_str()));
     if (rows.size() > 1) {
         throw Failure(EXIT_STATUS_USAGE,
-                      "TID: several tokens begin with \"" + strTid + "\"; give more of the id");
+                      "TID: several tokens begin with \"" + shortened(strTid) + "\"; give more of the id");
     }
     return rows.empty() ? std::nullopt : find(rows[0][0].value_or(""));
 }
@@ -162,13 +200,24 @@ void Store::create(const Json::Value& jToken)
     require(m_db.tokenCreate(jTokenCopy));
 }
 
-void Store::save(const Json::Value& jToken)
+void Store::update(const std::string& strTid, const Json::Value& jChange)
 {
-    Json::Value jTokenCopy = jToken;
-    require(m_db.tokenUpdate(jTokenCopy));
+    std::string strChanges;
+    for (const std::string& strName : jChange.getMemberNames()) {
+        strChanges += (strChanges.empty() ? "" : ", ") + equation(strName, jChange[strName]);
+    }
+    query("UPDATE token SET " + strChanges + " WHERE " + equation("tid", strTid));
 }
 
-int64_t Store::count(const Json::Value& jFilter)
+// "name='value'", with the value written and quoted as the library does.
+std::string Store::equation(std::string strName, Json::Value jValue)
+{
+    std::string strEquation;
+    require(m_db.SqlMakeByMatchField(strName, jValue, strEquation));
+    return strEquation;
+}
+
+uint64_t Store::count(const Json::Value& jFilter)
 {
     Json::Value jFilterCopy = jFilter;
     std::string strWhere;
@@ -176,12 +225,12 @@ int64_t Store::count(const Json::Value& jFilter)
     return number("SELECT count(*) FROM token" + (strWhere.empty() ? "" : " WHERE" + strWhere));
 }
 
-int64_t Store::remove(const Json::Value& jFilter)
+uint64_t Store::remove(const Json::Value& jFilter)
 {
     Json::Value jFilterCopy = jFilter;
     const int nRemoved = m_db.tokenDelete(jFilterCopy, true);
     require(nRemoved);
-    return nRemoved;
+    return static_cast<uint64_t>(nRemoved);
 }
 
 void Store::removeTid(const std::string& strTid)
@@ -191,7 +240,7 @@ void Store::removeTid(const std::string& strTid)
     remove(jFilter);
 }
 
-int64_t Store::purge()
+uint64_t Store::purge()
 {
     require(m_db.cleanExpireToken(true));
     return number("SELECT changes()");
@@ -205,6 +254,7 @@ bool Store::hasTable()
 void Store::makeTable()
 {
     require(m_db.createTable());
+    noteChange();
 }
 
 Rows Store::query(const std::string& strSql)
@@ -214,15 +264,20 @@ Rows Store::query(const std::string& strSql)
     return rows;
 }
 
+std::string Store::queryAsFarAsItGoes(const std::string& strSql, Rows& rows)
+{
+    return 0 > m_db.runSqlEx(strSql, appendRow, &rows) ? m_db.m_strErr : "";
+}
+
 std::string Store::text(const std::string& strSql)
 {
     const Rows rows = query(strSql);
     return rows.empty() ? "" : rows[0][0].value_or("");
 }
 
-int64_t Store::number(const std::string& strSql)
+uint64_t Store::number(const std::string& strSql)
 {
-    return strtoll(text(strSql).c_str(), nullptr, 10);
+    return strtoull(text(strSql).c_str(), nullptr, 10);
 }
 
 } // namespace tool

@@ -23,6 +23,12 @@ namespace tool {
 // What an argument may name a token by, at least.
 const size_t PREFIX_MIN = 8;
 
+// An id's first characters: enough to tell tokens apart, but not to use one.
+std::string masked(const std::string& strTid);
+
+// The same with "..." where more follows.
+std::string shortened(const std::string& strTid);
+
 // A row's columns as texts; nothing where it is NULL.
 typedef std::vector<std::vector<std::optional<std::string>>> Rows;
 
@@ -61,20 +67,23 @@ public:
     // usage failure when the prefix is too short or fits several.
     std::optional<Json::Value> findByPrefix(const std::string& strTid);
 
-    // Writes a token that is new, or one that is there already.
+    // Writes a new token.
     void create(const Json::Value& jToken);
-    void save(const Json::Value& jToken);
+
+    // Writes those fields of a token that are members of jChange. The others stay as they are, even if
+    // they could not be read.
+    void update(const std::string& strTid, const Json::Value& jChange);
 
     // How many tokens there are whose fields equal the filter's.
-    int64_t count(const Json::Value& jFilter);
+    uint64_t count(const Json::Value& jFilter);
 
     // Deletes the tokens whose fields equal the filter's, all of them for an empty one. Returns how
     // many there were.
-    int64_t remove(const Json::Value& jFilter);
+    uint64_t remove(const Json::Value& jFilter);
     void removeTid(const std::string& strTid);
 
     // Deletes the expired tokens, as the library does. Returns how many there were.
-    int64_t purge();
+    uint64_t purge();
 
     // Whether there is a table of tokens; makes it. To be made without a transaction.
     bool hasTable();
@@ -83,12 +92,21 @@ public:
     // Any other statement.
     Rows query(const std::string& strSql);
 
-    // The first column of a query's first row, as text and as a number.
+    // The same for a statement that can give rows before it fails; returns why it did, or "".
+    std::string queryAsFarAsItGoes(const std::string& strSql, Rows& rows);
+
+    // The first column of a query's first row, as text and as a number of 0 or more.
     std::string text(const std::string& strSql);
-    int64_t number(const std::string& strSql);
+    uint64_t number(const std::string& strSql);
+
+    // To be told of changes that stay, made by another way than commit(): failures say whether there
+    // are any.
+    static void noteChange();
 
 private:
+    [[noreturn]] void fail(const std::string& strErr);
     void require(int nResult);
+    std::string equation(std::string strName, Json::Value jValue);
 
     const Access m_access;
     AccessTokenDbApi m_db;

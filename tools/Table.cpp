@@ -18,11 +18,21 @@ void require(bool blDone)
     }
 }
 
+int flagsOf(tool::Table::Kind kind)
+{
+    switch (kind) {
+    case tool::Table::Kind::Long: return SCOLS_FL_WRAP;
+    case tool::Table::Kind::Right: return SCOLS_FL_RIGHT;
+    case tool::Table::Kind::Short: break;
+    }
+    return 0;
+}
+
 } // namespace
 
 namespace tool {
 
-Table::Table(const std::vector<std::string>& strTitles, bool blHeader) : m_pTable(scols_new_table())
+Table::Table(const std::vector<Column>& columns, bool blHeader) : m_pTable(scols_new_table())
 {
     require(nullptr != m_pTable);
     struct libscols_table* pTable = m_pTable.get();
@@ -38,11 +48,8 @@ Table::Table(const std::vector<std::string>& strTitles, bool blHeader) : m_pTabl
     if (blTerminal && 0 == ioctl(fileno(resultStream()), TIOCGWINSZ, &size) && size.ws_col) {
         scols_table_set_termwidth(pTable, size.ws_col);
     }
-    for (const std::string& strTitle : strTitles) {
-        const bool blRight = strTitle[0] == '>';
-        // Long values are continued on the next line, not cut.
-        require(nullptr != scols_table_new_column(pTable, strTitle.c_str() + (blRight ? 1 : 0), 0,
-                                                  blRight ? SCOLS_FL_RIGHT : SCOLS_FL_WRAP));
+    for (const Column& column : columns) {
+        require(nullptr != scols_table_new_column(pTable, column.szTitle, 0, flagsOf(column.kind)));
     }
 }
 

@@ -13,8 +13,17 @@ namespace tool {
 
 class Table {
 public:
-    // A column title that begins with '>' makes a column that is aligned to the right.
-    Table(const std::vector<std::string>& strTitles, bool blHeader);
+    enum class Kind {
+        Short, // is never broken
+        Long,  // goes on in the next line where a terminal has no more room
+        Right, // short, aligned to the right
+    };
+    struct Column {
+        const char* szTitle;
+        Kind kind;
+    };
+
+    Table(const std::vector<Column>& columns, bool blHeader);
 
     // Adds a line, in a colour of libsmartcols ("red", ...) or nullptr. Colours show where the result
     // is a coloured terminal.

@@ -14,6 +14,7 @@
 namespace {
 
 using tool::Store;
+typedef tool::Table::Kind Kind;
 
 const std::vector<std::string> INDEXED = {"deadline", "bind_sid", "function"};
 const int MEASUREMENTS = 5;
@@ -41,13 +42,10 @@ std::string timeOf(Store& store, const std::string& strSql)
     return szText;
 }
 
-std::string indexesText(Store& store)
+bool hasIndex(Store& store, const std::string& strField)
 {
-    const std::string strNames =
-        store.text("SELECT group_concat(name, ', ') FROM (SELECT name FROM sqlite_schema "
-                   "WHERE type = 'index' AND tbl_name = 'token' AND sql IS NOT NULL "
-                   "ORDER BY name)");
-    return strNames.empty() ? "none" : strNames;
+    return 0 != store.number("SELECT count(*) FROM sqlite_schema WHERE type = 'index' AND name = 'token_" +
+                             strField + "'");
 }
 
 // What a store does, and how fast; with the same words before and after.
@@ -58,8 +56,10 @@ std::vector<std::pair<std::string, std::string>> measured(Store& store, bool blW
          timeOf(store, std::string("SELECT tid FROM token WHERE ") + tool::SQL_EXPIRED)},
         {"look for a session's tokens", timeOf(store, "SELECT tid FROM token WHERE bind_sid = '\x01'")},
         {"look for a purpose's tokens", timeOf(store, "SELECT tid FROM token WHERE function = '\x01'")},
-        {"indexes", indexesText(store)},
         {"journal", store.text("PRAGMA journal_mode")}};
+    for (const std::string& strField : INDEXED) {
+        lines.emplace_back("index token_" + strField, hasIndex(store, strField) ? "yes" : "no");
+    }
     if (blWrite) {
         // It changes nothing, and costs what any small change does.
         const std::string strVersion = store.text("PRAGMA user_version");
@@ -108,25 +108,33 @@ void execute(Store& store, const std::vector<std::string>& strStatements)
     }
 }
 
+// What is, and what would be done.
+int tell(const Options& options)
+{
+    Store store(Store::Access::Read);
+    tool::Table table({{"WHAT", Kind::Short}, {"NOW", Kind::Short}}, !options.blNoHeader);
+    for (const auto& [strWhat, strNow] : measured(store, false)) {
+        table.add({strWhat, strNow});
+    }
+    table.print();
+    for (const std::string& strStatement : statements(options)) {
+        tool::print("would run: " + strStatement + "\n");
+    }
+    return tool::EXIT_STATUS_DONE;
+}
+
 int tune(const Options& options)
 {
-    Store store(Store::Access::Plain);
-    const auto before = measured(store, !options.blDryRun);
     if (options.blDryRun) {
-        tool::Table table({"WHAT", "NOW"}, !options.blNoHeader);
-        for (const auto& [strWhat, strNow] : before) {
-            table.add({strWhat, strNow});
-        }
-        table.print();
-        for (const std::string& strStatement : statements(options)) {
-            tool::print("would run: " + strStatement + "\n");
-        }
-        return tool::EXIT_STATUS_DONE;
+        return tell(options);
     }
+    Store store(Store::Access::Plain);
+    const auto before = measured(store, true);
     execute(store, statements(options));
     requireJournal(store, options);
     const auto after = measured(store, true);
-    tool::Table table({"WHAT", "BEFORE", "AFTER"}, !options.blNoHeader);
+    tool::Table table({{"WHAT", Kind::Short}, {"BEFORE", Kind::Short}, {"AFTER", Kind::Short}},
+                      !options.blNoHeader);
     for (size_t i = 0; i < before.size(); ++i) {
         table.add({before[i].first, before[i].second, after[i].second});
     }

@@ -104,32 +104,44 @@ void removeAllowed(Json::Value& jAllow, const std::vector<tool::Allowance>& allo
     }
 }
 
-void change(Json::Value& jToken, const Options& options)
+// What the token opens after the change.
+Json::Value changedAllow(const Json::Value& jToken, const Options& options)
 {
-    if (options.nCount) {
-        jToken["count"] = Json::Int64{*options.nCount};
-    }
-    if (options.nDeadline) {
-        jToken["deadline"] = Json::Int64{*options.nDeadline};
-    }
-    if (options.nTtl) {
-        jToken["deadline"] = Json::Int64{time(nullptr) + *options.nTtl};
-    }
-    if (options.strSid) {
-        jToken["bind_sid"] = *options.strSid;
-    }
-    if (options.jExtra) {
-        jToken["extra"] = *options.jExtra;
-    }
-    Json::Value& jAllow = jToken["webapi_allow"];
     if (!options.allow.empty()) {
-        jAllow = tool::allowanceJson(options.allow);
+        return tool::allowanceJson(options.allow);
     }
-    if (!jAllow.isObject() && !(options.addAllow.empty() && options.removeAllow.empty())) {
+    Json::Value jAllow = jToken["webapi_allow"];
+    if (!jAllow.isObject()) {
         failOnMalformed();
     }
     addAllowed(jAllow, options.addAllow);
     removeAllowed(jAllow, options.removeAllow);
+    return jAllow;
+}
+
+// The fields that change.
+Json::Value changeOf(const Json::Value& jToken, const Options& options)
+{
+    Json::Value jChange(Json::objectValue);
+    if (options.nCount) {
+        jChange["count"] = Json::Int64{*options.nCount};
+    }
+    if (options.nDeadline) {
+        jChange["deadline"] = Json::Int64{*options.nDeadline};
+    }
+    if (options.nTtl) {
+        jChange["deadline"] = Json::Int64{time(nullptr) + *options.nTtl};
+    }
+    if (options.strSid) {
+        jChange["bind_sid"] = *options.strSid;
+    }
+    if (options.jExtra) {
+        jChange["extra"] = *options.jExtra;
+    }
+    if (!options.allow.empty() || !options.addAllow.empty() || !options.removeAllow.empty()) {
+        jChange["webapi_allow"] = changedAllow(jToken, options);
+    }
+    return jChange;
 }
 
 int update(const Options& options)
@@ -138,17 +150,17 @@ int update(const Options& options)
         throw tool::Failure(tool::EXIT_STATUS_USAGE,
                             "say what to change; \"update --help\" lists the fields");
     }
-    const std::string strTid = tool::readTid(options.strTid);
+    const std::string strTid = tool::readTid("TID", options.strTid);
     tool::Store store(tool::Store::Access::Write);
-    std::optional<Json::Value> jToken = store.findByPrefix(strTid);
+    const std::optional<Json::Value> jToken = store.findByPrefix(strTid);
     if (!jToken) {
         throw tool::noSuchToken();
     }
-    change(*jToken, options);
-    store.save(*jToken);
+    const Json::Value jChange = changeOf(*jToken, options);
+    store.update((*jToken)["tid"].asString(), jChange);
     store.commit();
     tool::print("1 token updated\n");
-    if ((*jToken)["deadline"].asInt64() < time(nullptr)) {
+    if (jChange.get("deadline", (*jToken)["deadline"]).asInt64() < time(nullptr)) {
         tool::complain(
             "the token has expired; the next call of a program purges it, unless --ttl or --deadline "
             "give it time");

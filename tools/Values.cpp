@@ -65,6 +65,11 @@ std::optional<std::pair<std::string, uid_t>> user(Lookup lookup)
     return std::make_pair(std::string(entry.pw_name), entry.pw_uid);
 }
 
+[[noreturn]] void failOnDuration(const std::string& strText)
+{
+    throw tool::BadValue("\"" + strText + "\" is no duration such as 90s, 15m, 8h, 2d12h or 1w");
+}
+
 } // namespace
 
 namespace tool {
@@ -98,6 +103,9 @@ unsigned int parseUser(const std::string& strName)
 
 std::optional<std::string> userName(Json::Int64 nUid)
 {
+    if (nUid < 0 || nUid >= Json::Int64{UID_ERR}) {
+        return std::nullopt; // not to be narrowed to another's number
+    }
     static std::map<Json::Int64, std::optional<std::string>> known; // a look-up can go over the network
     const auto [pKnown, blNew] = known.try_emplace(nUid);
     if (blNew) {
@@ -110,7 +118,6 @@ std::optional<std::string> userName(Json::Int64 nUid)
 
 int64_t parseDuration(const std::string& strText)
 {
-    const BadValue bad("\"" + strText + "\" is no duration such as 90s, 15m, 8h, 2d12h or 1w");
     // A number alone is in seconds.
     const bool blBare = strText.find_first_not_of("0123456789") == std::string::npos;
     const std::string strParts = blBare ? strText + "s" : strText;
@@ -122,16 +129,16 @@ int64_t parseDuration(const std::string& strText)
         const auto [szUnit, error] = std::from_chars(szRest, szEnd, nNumber);
         const int64_t nUnit = szUnit == szEnd ? 0 : secondsOf(*szUnit);
         if (std::errc() != error || nNumber < 0 || 0 == nUnit || nNumber > DURATION_MAX / nUnit) {
-            throw bad;
+            failOnDuration(strText);
         }
         nTotal += nNumber * nUnit;
         if (nTotal > DURATION_MAX) {
-            throw bad;
+            failOnDuration(strText);
         }
         szRest = szUnit + 1;
     }
     if (0 == nTotal) {
-        throw bad;
+        failOnDuration(strText);
     }
     return nTotal;
 }
@@ -154,13 +161,19 @@ int64_t parseTime(const std::string& strText)
         tmTime.tm_isdst = -1;
         const time_t nTime = blUtc ? timegm(&tmTime) : mktime(&tmTime);
         // 31 June, and the hour that a clock leaps over, come back as another time.
-        if (tmTime.tm_mday == tmAsked.tm_mday && tmTime.tm_hour == tmAsked.tm_hour) {
+        if (tmTime.tm_mday == tmAsked.tm_mday && tmTime.tm_hour == tmAsked.tm_hour &&
+            tmTime.tm_sec == tmAsked.tm_sec) {
             return nTime;
         }
     }
     throw BadValue(
         "\"" + strText +
         "\" is no time such as 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @1798761599");
+}
+
+std::string countText(uint64_t nCount, const std::string& strWhat)
+{
+    return std::to_string(nCount) + " " + strWhat + (1 == nCount ? "" : "s");
 }
 
 std::string timeText(Json::Int64 nTime, bool blUtc)

@@ -29,6 +29,9 @@ int64_t parseDuration(const std::string& strText);
 // the last three with a "Z" behind them in UTC, otherwise in local time.
 int64_t parseTime(const std::string& strText);
 
+// "1 token", "2 tokens".
+std::string countText(uint64_t nCount, const std::string& strWhat);
+
 // A time as text, with seconds, in local time or UTC.
 std::string timeText(Json::Int64 nTime, bool blUtc);
 

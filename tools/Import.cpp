@@ -1,9 +1,6 @@
-// export and import: all tokens as JSON lines, for backups and for moving to another machine.
-
-#include <unistd.h>
+// import: creates the tokens of files that export wrote; all of a file or none.
 
 #include <cerrno>
-#include <cstdlib>
 #include <cstring>
 #include <ctime>
 #include <fstream>
@@ -17,16 +14,12 @@
 #include "Commands.h"
 #include "Console.h"
 #include "Json.h"
-#include "Place.h"
 #include "Store.h"
+#include "Values.h"
 
 namespace {
 
-struct ExportOptions {
-    std::string strFile = "-";
-};
-
-struct ImportOptions {
+struct Options {
     std::vector<std::string> strFiles;
 };
 
@@ -36,83 +29,9 @@ struct Line {
     Json::Value jToken;
 };
 
-[[noreturn]] void failOn(const std::string& strFile)
-{
-    throw tool::Failure(tool::EXIT_STATUS_STORE, strFile + ": " + strerror(errno));
-}
-
 [[noreturn]] void failOnReading(const std::string& strFile)
 {
     throw tool::Failure(tool::EXIT_STATUS_USAGE, strFile + ": " + strerror(errno));
-}
-
-// A file that appears under its name only when it is complete, and until then removes itself. It is
-// readable by its owner only.
-class NewFile {
-public:
-    explicit NewFile(const std::string& strName) : m_strName(strName), m_strTemporary(strName + ".XXXXXX")
-    {
-        const auto status = tool::statusOf(strName);
-        if (status && !S_ISREG(status->st_mode)) {
-            throw tool::Failure(tool::EXIT_STATUS_USAGE,
-                                strName +
-                                    " is no regular file; to write to a pipe, write to standard output");
-        }
-        const int nFile = mkstemp(m_strTemporary.data());
-        m_pStream = 0 > nFile ? nullptr : fdopen(nFile, "w");
-        if (!m_pStream) {
-            failOn(strName);
-        }
-    }
-    ~NewFile()
-    {
-        if (m_pStream) {
-            fclose(m_pStream);
-            unlink(m_strTemporary.c_str());
-        }
-    }
-    NewFile(const NewFile&) = delete;
-    NewFile& operator=(const NewFile&) = delete;
-
-    void write(const std::string& strText) { fwrite(strText.data(), 1, strText.size(), m_pStream); }
-    void complete()
-    {
-        if (0 != fflush(m_pStream) || ferror(m_pStream) || 0 != fsync(fileno(m_pStream)) ||
-            0 != rename(m_strTemporary.c_str(), m_strName.c_str())) {
-            failOn(m_strName);
-        }
-        fclose(m_pStream);
-        m_pStream = nullptr;
-    }
-
-private:
-    const std::string m_strName;
-    std::string m_strTemporary;
-    FILE* m_pStream;
-};
-
-template <typename Write>
-void writeLines(const Json::Value& jTokens, Write write)
-{
-    tool::Progress progress("Exporting", jTokens.size());
-    for (const Json::Value& jToken : jTokens) {
-        write(tool::compactJson(jToken) + "\n");
-        progress.step();
-    }
-}
-
-int exportTokens(const ExportOptions& options)
-{
-    const Json::Value jTokens = tool::Store(tool::Store::Access::Read).tokens(Json::Value(Json::objectValue));
-    if (options.strFile == "-") {
-        writeLines(jTokens, tool::print);
-    } else {
-        NewFile file(options.strFile);
-        writeLines(jTokens, [&file](const std::string& strText) { file.write(strText); });
-        file.complete();
-    }
-    tool::complain(std::to_string(jTokens.size()) + " tokens exported");
-    return tool::EXIT_STATUS_DONE;
 }
 
 // Throws BadValue unless a record is one that the library would have created.
@@ -126,7 +45,8 @@ void checkRecord(const Json::Value& jToken)
         const Json::Value& jDefault = VEMO_ACCESS_TOKEN::tokenType()[strName][1];
         const Json::Value& jValue = jToken[strName];
         const bool blNumber = jDefault.isIntegral();
-        if (blNumber ? !jValue.isInt64() : jDefault.type() != jValue.type()) {
+        const bool blWhole = jValue.isInt64() && Json::realValue != jValue.type();
+        if (blNumber ? !blWhole : jDefault.type() != jValue.type()) {
             throw tool::BadValue("\"" + strName + "\" is no " +
                                  (blNumber              ? "whole number"
                                   : jDefault.isString() ? "string"
@@ -160,18 +80,27 @@ tool::Failure badLine(const std::string& strFile, size_t nLine, const std::strin
                                                       strReason + "; nothing of this file was imported");
 }
 
+Json::Value recordOf(const std::string& strText)
+{
+    if (strText.find('\0') != std::string::npos) {
+        throw tool::BadValue("holds a NUL byte");
+    }
+    Json::Value jToken = tool::parseObject(strText, tool::NESTED_MAX + 1); // objects in a record
+    checkRecord(jToken);
+    return jToken;
+}
+
 std::vector<Line> readLines(std::istream& stream, const std::string& strFile)
 {
     std::vector<Line> lines;
     std::map<std::string, size_t> lineOf;
     std::string strText;
     for (size_t nLine = 1; std::getline(stream, strText); ++nLine) {
-        if (strText.empty()) {
+        if (strText.find_first_not_of(" \t\r") == std::string::npos) {
             continue;
         }
         try {
-            const Json::Value jToken = tool::parseObject(strText);
-            checkRecord(jToken);
+            const Json::Value jToken = recordOf(strText);
             const auto [pFirst, blNew] = lineOf.emplace(jToken["tid"].asString(), nLine);
             if (!blNew) {
                 throw tool::BadValue("has the id of line " + std::to_string(pFirst->second));
@@ -181,16 +110,21 @@ std::vector<Line> readLines(std::istream& stream, const std::string& strFile)
             throw badLine(strFile, nLine, bad.what());
         }
     }
-    if (stream.bad()) {
+    if (stream.bad() || ferror(stdin)) {
         failOnReading(strFile);
     }
     return lines;
 }
 
+std::string nameOf(const std::string& strFile)
+{
+    return strFile == "-" ? "standard input" : strFile;
+}
+
 std::vector<Line> readFile(const std::string& strFile)
 {
     if (strFile == "-") {
-        return readLines(std::cin, "standard input");
+        return readLines(std::cin, nameOf(strFile));
     }
     std::ifstream stream(strFile, std::ios::binary);
     if (!stream.is_open()) {
@@ -208,7 +142,7 @@ void importFile(const std::string& strFile)
         tool::Progress progress("Importing", lines.size());
         for (const Line& line : lines) {
             if (store.find(line.jToken["tid"].asString())) {
-                throw badLine(strFile, line.nNumber, "has the id of a token that is there already");
+                throw badLine(nameOf(strFile), line.nNumber, "has the id of a token that is there already");
             }
             store.create(line.jToken);
             nExpired += line.jToken["deadline"].asInt64() < time(nullptr);
@@ -216,14 +150,14 @@ void importFile(const std::string& strFile)
         }
     }
     store.commit();
-    tool::print(std::to_string(lines.size()) + (1 == lines.size() ? " token" : " tokens") + " imported\n");
+    tool::print(tool::countText(lines.size(), "token") + " imported\n");
     if (nExpired) {
         tool::complain(std::to_string(nExpired) +
                        " of them expired: the next call of a program purges those");
     }
 }
 
-int importTokens(const ImportOptions& options)
+int importTokens(const Options& options)
 {
     for (const std::string& strFile : options.strFiles) {
         importFile(strFile);
@@ -235,22 +169,18 @@ int importTokens(const ImportOptions& options)
 
 namespace tool {
 
-void addExport(Commands& commands)
-{
-    auto pOptions = std::make_shared<ExportOptions>();
-    Command command = commands.add("export", "write all tokens, whole ids included, as JSON lines",
-                                   [pOptions] { return exportTokens(*pOptions); });
-    command.optionalArgument("FILE", notEmptyInto(pOptions->strFile),
-                             "the file, of mode 0600; without it, standard output");
-}
-
 void addImport(Commands& commands)
 {
-    auto pOptions = std::make_shared<ImportOptions>();
+    auto pOptions = std::make_shared<Options>();
     Command command =
         commands.add("import", "create the tokens of files that export wrote; all of a file or none",
                      [pOptions] { return importTokens(*pOptions); });
-    const auto add = [pOptions](const std::string& strFile) { pOptions->strFiles.push_back(strFile); };
+    const auto add = [pOptions](const std::string& strFile) {
+        if (strFile.empty()) {
+            throw BadValue("must not be empty");
+        }
+        pOptions->strFiles.push_back(strFile);
+    };
     command.remainingArguments("FILE", add, "the files; \"-\" is standard input");
     command.require("FILE");
 }

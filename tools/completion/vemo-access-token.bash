@@ -1,0 +1,115 @@
+# bash completion for vemo-access-token(8)
+#
+# Ids are credentials, and completion runs as the user: none is completed, and nothing here runs the
+# command.
+
+_vemo_access_token()
+{
+    local cur prev words cword split
+    _init_completion -s -n : || return
+
+    local command= word
+    for word in "${words[@]:1:cword-1}"; do
+        if [[ $word != -* ]]; then
+            command=$word
+            break
+        fi
+    done
+
+    local selection='--uid --user --function --bind-sid'
+    local uses='--uses --unlimited'
+    local form='--output --no-header'
+    local token_form="$form --field --utc --epoch"
+    local options
+    case $command in
+        create) options="--uid --user --function --ttl $uses --allow --bind-sid --extra --tid" ;;
+        list) options="$selection --expired --expiring --sort --limit --count --show-ids $token_form" ;;
+        show) options=$token_form ;;
+        check) options=$form ;;
+        grant) options='--print-user' ;;
+        update)
+            options="$uses --deadline --ttl --allow --add-allow --remove-allow --bind-sid --extra"
+            ;;
+        revoke) options="$selection --all --dry-run --yes" ;;
+        purge) options='--dry-run' ;;
+        stats) options="--prometheus $form" ;;
+        doctor) options="--repair $form" ;;
+        tune) options='--wal --undo --dry-run --no-header' ;;
+        generate | export | import | init) options= ;;
+        '')
+            local commands='create generate list show check grant update revoke purge stats export
+                import init doctor tune'
+            [[ $cur == -* ]] && commands='--help --version'
+            COMPREPLY=($(compgen -W "$commands" -- "$cur"))
+            return
+            ;;
+        *) return ;;
+    esac
+    options+=' --help --version --verbose'
+
+    # The value of an option.
+    local option=$prev fields='tid bind_sid uid deadline count create_time function webapi_allow extra'
+    [[ $option == -o ]] && option=--output
+    if [[ " $options " == *" $option "* ]]; then
+        case $option in
+            --uid)
+                _uids
+                return
+                ;;
+            --user)
+                COMPREPLY=($(compgen -u -- "$cur"))
+                return
+                ;;
+            --output)
+                COMPREPLY=($(compgen -W 'table json jsonl' -- "$cur"))
+                return
+                ;;
+            --field)
+                COMPREPLY=($(compgen -W "$fields" -- "$cur"))
+                return
+                ;;
+            --sort)
+                COMPREPLY=($(compgen -W "$fields ${fields// /:desc }:desc" -- "$cur"))
+                __ltrim_colon_completions "$cur"
+                return
+                ;;
+            --extra)
+                _vemo_access_token_at_file
+                return
+                ;;
+            --function | --ttl | --uses | --allow | --add-allow | --remove-allow | --bind-sid | --tid | \
+                --expiring | --limit | --deadline)
+                return
+                ;;
+        esac
+    fi
+    $split && return
+
+    if [[ $cur == -* ]]; then
+        COMPREPLY=($(compgen -W "$options" -- "$cur"))
+    elif [[ $command == @(export|import) ]]; then
+        _filedir
+    fi
+} &&
+    complete -F _vemo_access_token vemo-access-token
+
+# "@" and the name of a file. Written as "filenames", so that what the shell would take for its own is
+# quoted; but the "@" hides from it which are directories.
+_vemo_access_token_at_file()
+{
+    if [[ $cur != @* ]]; then
+        [[ $cur ]] || COMPREPLY=(@)
+        compopt -o nospace
+        return
+    fi
+    cur=${cur#@}
+    _filedir
+    local i
+    for i in "${!COMPREPLY[@]}"; do
+        if [[ -d ${COMPREPLY[i]} ]]; then
+            COMPREPLY[i]+=/
+            compopt -o nospace
+        fi
+        COMPREPLY[i]=@${COMPREPLY[i]}
+    done
+}
