@@ -34,6 +34,13 @@ done <"$dir/headers"
 
 echo "The installed tool:"
 LD_LIBRARY_PATH=$libdir "$dir/usr/sbin/vemo-access-token" --version
+(cd "$dir/usr/share" && find . -type f | LC_ALL=C sort) | tee "$dir/shared"
+diff "$dir/shared" - <<END
+./bash-completion/completions/vemo-access-token
+./fish/vendor_completions.d/vemo-access-token.fish
+./man/man8/vemo-access-token.8
+./zsh/site-functions/_vemo-access-token
+END
 
 echo "The example of README:"
 sed -n '/^```cpp$/,/^```$/p' "$readme" | grep -v '^```' >"$dir/example.cpp"

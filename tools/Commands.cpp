@@ -53,9 +53,13 @@ std::vector<std::string> argumentsOf(int nArguments, char** rgArguments)
     return strArguments;
 }
 
-// The parser's "NAME: At Most 1 required but received 2" and "NAME: 1 required TYPE missing", in English.
+// The parser's "NAME: At Most 1 required but received 2", "NAME: 1 required TYPE missing" and "NAME was given
+// a disallowed flag override", in English.
 std::string mismatchText(const std::string& strSentence)
 {
+    if (strSentence.find(" disallowed ") != std::string::npos) {
+        return "--" + strSentence.substr(0, strSentence.find(' ')) + ": takes no value";
+    }
     const bool blMissing = strSentence.find(" missing") != std::string::npos;
     return strSentence.substr(0, strSentence.find(": ")) +
            (blMissing ? ": needs a value" : ": can be given once only");
@@ -79,12 +83,12 @@ namespace tool {
 
 void Command::flag(const std::string& strName, bool& blFlag, const std::string& strDescription)
 {
-    m_app.add_flag(strName, blFlag, strDescription);
+    m_app.add_flag(strName, blFlag, strDescription)->disable_flag_override();
 }
 
 void Command::flag(const std::string& strName, std::function<void()> set, const std::string& strDescription)
 {
-    m_app.add_flag_callback(strName, std::move(set), strDescription);
+    m_app.add_flag_callback(strName, std::move(set), strDescription)->disable_flag_override();
 }
 
 void Command::option(const std::string& strName, const std::string& strType, const Take& take,
@@ -135,7 +139,6 @@ Commands::Commands()
     m_pApp->set_version_flag("--version", VERSION_TEXT, "print the version and exit");
     m_pApp->require_subcommand(0, 1);
     m_pApp->get_formatter()->label("SUBCOMMAND", "COMMAND");
-    m_pApp->get_formatter()->label("Subcommands", "Commands");
     m_pApp->footer("\"vemo-access-token COMMAND --help\" tells more, and so does vemo-access-token(8).\n\n"
                    "Exit status: 0 done or granted, 1 refused (grant, check), 2 usage, 3 no such token,\n"
                    "4 store or permission failure, 5 doctor has findings.");
@@ -148,9 +151,11 @@ Command Commands::add(const std::string& strName, const std::string& strDescript
 {
     CLI::App& app = *m_pApp->add_subcommand(strName, strDescription);
     app.footer("");
+    app.group("Commands");
     app.set_help_flag("-h,--help", "print this help and exit");
     app.set_version_flag("--version", VERSION_TEXT, "print the version and exit");
-    app.add_flag("-v,--verbose", m_blVerbose, "show the library's log lines on standard error");
+    app.add_flag("-v,--verbose", m_blVerbose, "show the library's log lines on standard error")
+        ->disable_flag_override();
     app.callback([this, run, needs] {
         m_run = [run, needs] {
             if (Needs::Root == needs) {
@@ -188,7 +193,11 @@ int Commands::run(int nArguments, char** rgArguments)
         showLogLines();
     }
     const int nStatus = m_run();
-    flushResult();
+    try {
+        flushResult();
+    } catch (const Failure& failure) {
+        throw Failure(failure.status(), failure.fact(), Store::hasChanged() ? "the change was made" : "");
+    }
     return nStatus;
 }
 

@@ -81,7 +81,7 @@ void showLogLines()
     g_pResult = 0 > nResult ? nullptr : fdopen(nResult, "w");
     if (!g_pResult || 0 > dup2(STDERR_FILENO, STDOUT_FILENO)) {
         g_pResult = stdout;
-        throw Failure(EXIT_STATUS_STORE, std::string("--verbose: ") + strerror(errno));
+        throw Failure(EXIT_STATUS_STORE, std::string("cannot write the result: ") + strerror(errno));
     }
     setvbuf(stdout, nullptr, _IOLBF, BUFSIZ);
     VEMO_ACCESS_TOKEN::logToStdout(true);
@@ -156,7 +156,7 @@ bool confirm(const std::string& strQuestion)
     if (!std::getline(std::cin, strAnswer)) {
         fputc('\n', stderr); // that an answer would have ended with
     }
-    return strAnswer == "y" || strAnswer == "yes";
+    return 0 == strcasecmp(strAnswer.c_str(), "y") || 0 == strcasecmp(strAnswer.c_str(), "yes");
 }
 
 Progress::Progress(const std::string& strTitle, size_t nTotal, bool blWanted)

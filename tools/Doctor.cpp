@@ -85,17 +85,23 @@ bool repair(const Finding& finding)
     }
 }
 
-// Repairs what can be repaired, and what comes to light by that. Returns what was.
+// Repairs what can be repaired, and what comes to light by that, until one fails. Returns what was.
 tool::Findings repairAll()
 {
     tool::Findings repaired;
     bool blMore = true;
-    for (int i = 0; blMore && i < ROUNDS_MAX; ++i) {
+    bool blFailed = false;
+    for (int i = 0; blMore && !blFailed && i < ROUNDS_MAX; ++i) {
         blMore = false;
         for (const Finding& finding : tool::examine()) {
-            if (finding.repair && repair(finding)) {
+            if (!finding.repair) {
+                continue;
+            }
+            if (repair(finding)) {
                 repaired.push_back(finding);
                 blMore = true;
+            } else {
+                blFailed = true;
             }
         }
     }

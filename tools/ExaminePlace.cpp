@@ -92,6 +92,13 @@ bool examineDirectory(Findings& findings)
     }
     examinePrivacy(strPath, *status, findings);
     examineParents(findings);
+    if (0 != access(strPath.c_str(), W_OK)) {
+        findings.push_back({Finding::Severity::Error,
+                            strPath + " cannot be written to: " + strerror(errno),
+                            "no token can be created, changed or granted",
+                            "make the file system writable, or the directory",
+                            {}});
+    }
     return true;
 }
 

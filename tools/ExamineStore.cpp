@@ -53,13 +53,13 @@ bool examineIntegrity(Store& store, Findings& findings)
     for (size_t i = strReport.find('\n'); i != std::string::npos; i = strReport.find('\n', i)) {
         strReport.replace(i, 1, "; ");
     }
-    findings.push_back(
-        {Finding::Severity::Error,
-         "the database is damaged: " + strReport,
-         "tokens may be lost or wrong",
-         "save what \"vemo-access-token export\" still reads; stop the programs, move the file away, "
-         "and import that or a backup",
-         {}});
+    findings.push_back({Finding::Severity::Error,
+                        "the database is damaged: " + strReport,
+                        "tokens may be lost or wrong",
+                        "save the tokens with \"vemo-access-token export\" if it can still read them; stop "
+                        "the programs, move the file "
+                        "away, and import that or a backup",
+                        {}});
     return false;
 }
 

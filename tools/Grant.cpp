@@ -1,6 +1,5 @@
 // check and grant: whether a token allows a call.
 
-#include <ctime>
 #include <memory>
 
 #include "AccessTokenUtil.h"
@@ -34,13 +33,13 @@ int permission(Json::Value jToken, const Options& options)
 }
 
 // Why the token of an id, if there is one, does not allow the call; "" when it does.
-std::string refusal(const std::optional<Json::Value>& jFound, const Options& options)
+std::string refusal(tool::Store& store, const std::optional<Json::Value>& jFound, const Options& options)
 {
     if (!jFound) {
         return "unknown token";
     }
     Json::Value jToken = *jFound;
-    if (jToken["deadline"].asInt64() < time(nullptr)) {
+    if (store.isExpired(jToken["tid"].asString())) {
         return EXPIRED;
     }
     const int nPermission = permission(jToken, options);
@@ -59,8 +58,8 @@ std::string refusal(const std::optional<Json::Value>& jFound, const Options& opt
 int check(const Options& options)
 {
     const std::string strTid = tool::readTid("TID", options.strTid);
-    const auto jToken = tool::Store(tool::Store::Access::Read).findByPrefix(strTid);
-    const std::string strReason = refusal(jToken, options);
+    tool::Store store(tool::Store::Access::Read);
+    const std::string strReason = refusal(store, store.findByPrefix(strTid), options);
     if (tool::Layout::Form::Table == options.layout.form) {
         tool::print(strReason.empty() ? "allowed\n" : "refused: " + strReason + "\n");
     } else {
@@ -93,7 +92,7 @@ int grant(const Options& options)
     const bool blThere = store.find(strTid).has_value();
     store.purge();
     const std::optional<Json::Value> jToken = store.find(strTid);
-    const std::string strReason = blThere && !jToken ? EXPIRED : refusal(jToken, options);
+    const std::string strReason = blThere && !jToken ? EXPIRED : refusal(store, jToken, options);
     if (strReason.empty()) {
         spend(store, *jToken);
     }

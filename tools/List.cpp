@@ -65,10 +65,12 @@ void sort(std::vector<Json::Value>& jTokens, const Order& order)
 std::vector<Json::Value> selected(const ListOptions& options)
 {
     const int64_t nNow = time(nullptr);
+    tool::Store store(tool::Store::Access::Read);
+    const std::set<std::string> strExpired = store.expiredTids();
     std::vector<Json::Value> jTokens;
-    for (Json::Value& jToken : tool::Store(tool::Store::Access::Read).tokens(options.selection.filter())) {
+    for (Json::Value& jToken : store.tokens(options.selection.filter())) {
         const int64_t nDeadline = jToken["deadline"].asInt64();
-        const bool blExpired = nDeadline < nNow;
+        const bool blExpired = strExpired.count(jToken["tid"].asString()) != 0;
         const bool blExpiring = !blExpired && options.nExpiring && nDeadline - nNow <= *options.nExpiring;
         if ((!options.blExpired && !options.nExpiring) || (options.blExpired && blExpired) || blExpiring) {
             jTokens.push_back(std::move(jToken));

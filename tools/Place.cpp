@@ -5,6 +5,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <ctime>
 
 #include "AccessTokenDefine.h"
 #include "Failure.h"
@@ -13,6 +14,9 @@ namespace {
 
 const mode_t PRIVATE_MODE = 0700;
 const mode_t PARENT_MODE = 0755;
+const time_t CREATION_AGE_MAX = 1; // seconds
+const int CREATION_TRIES = 100;
+const useconds_t CREATION_WAIT_USEC = 10000;
 
 [[noreturn]] void failOn(const std::string& strPath)
 {
@@ -91,6 +95,17 @@ void requireDatabase(bool blCreate)
     if (!blCreate) {
         throw Failure(EXIT_STATUS_STORE, "there is no database " VEMO_ATOKEN_DB_PATH,
                       "\"vemo-access-token init\" makes it");
+    }
+}
+
+void awaitCreation()
+{
+    const auto isBeingMade = [] {
+        const auto status = statusOf(VEMO_ATOKEN_DB_PATH);
+        return status && 0 == status->st_size && time(nullptr) - status->st_mtime <= CREATION_AGE_MAX;
+    };
+    for (int i = 0; i < CREATION_TRIES && isBeingMade(); ++i) {
+        usleep(CREATION_WAIT_USEC);
     }
 }
 

@@ -106,6 +106,9 @@ std::vector<std::string> fieldNames()
 Store::Store(Access access, Missing missing) : m_access(access)
 {
     requireDatabase(Missing::Make == missing);
+    if (Missing::Make == missing) {
+        awaitCreation();
+    }
     errno = 0;
     if (0 > m_db.initDb()) {
         const std::string strReason = errno ? std::string(": ") + strerror(errno) : "";
@@ -131,6 +134,11 @@ void Store::noteChange()
     g_blChanged = true;
 }
 
+bool Store::hasChanged()
+{
+    return g_blChanged;
+}
+
 void Store::fail(const std::string& strErr)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH " ";
@@ -152,8 +160,11 @@ void Store::require(int nResult)
 
 void Store::commit()
 {
+    const bool blChanged = 0 != number("SELECT total_changes()");
     query("COMMIT");
-    noteChange();
+    if (blChanged) {
+        noteChange();
+    }
 }
 
 Json::Value Store::tokens(const Json::Value& jFilter)
@@ -192,6 +203,20 @@ std::optional<Json::Value> Store::findByPrefix(const std::string& strTid)
                       "TID: several tokens begin with \"" + shortened(strTid) + "\"; give more of the id");
     }
     return rows.empty() ? std::nullopt : find(rows[0][0].value_or(""));
+}
+
+std::set<std::string> Store::expiredTids()
+{
+    std::set<std::string> strTids;
+    for (const auto& row : query(std::string("SELECT tid FROM token WHERE ") + SQL_EXPIRED)) {
+        strTids.insert(row[0].value_or(""));
+    }
+    return strTids;
+}
+
+bool Store::isExpired(const std::string& strTid)
+{
+    return 0 != number("SELECT count(*) FROM token WHERE " + equation("tid", strTid) + " AND " + SQL_EXPIRED);
 }
 
 void Store::create(const Json::Value& jToken)

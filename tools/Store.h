@@ -13,6 +13,7 @@
 
 #include <cstdint>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -38,7 +39,8 @@ std::string sqlText(const char* szFormat, ...);
 // The fields of a token, in their order.
 std::vector<std::string> fieldNames();
 
-// Those tokens whose deadline has passed by now, as the purge sees it.
+// Those tokens whose deadline has passed by now, as the purge sees it; who decides otherwise contradicts
+// the library where a deadline is no number.
 extern const char* const SQL_EXPIRED;
 
 class Store {
@@ -66,6 +68,10 @@ public:
     // The token of an id, or the one whose id begins with these 8 or more characters. Fails with a
     // usage failure when the prefix is too short or fits several.
     std::optional<Json::Value> findByPrefix(const std::string& strTid);
+
+    // The ids of those tokens that the purge would delete.
+    std::set<std::string> expiredTids();
+    bool isExpired(const std::string& strTid);
 
     // Writes a new token.
     void create(const Json::Value& jToken);
@@ -102,6 +108,9 @@ public:
     // To be told of changes that stay, made by another way than commit(): failures say whether there
     // are any.
     static void noteChange();
+
+    // Whether this process has made changes that stay.
+    static bool hasChanged();
 
 private:
     [[noreturn]] void fail(const std::string& strErr);

@@ -90,20 +90,21 @@ std::vector<std::string> statements(const Options& options)
     return strStatements;
 }
 
-// The journal's mode can stay as it was without an error.
-void requireJournal(Store& store, const Options& options)
+void execute(Store& store, const Options& options)
 {
-    const std::string strWanted = options.blUndo ? "delete" : "wal";
-    if ((options.blUndo || options.blWal) && store.text("PRAGMA journal_mode") != strWanted) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, "the journal cannot be made \"" + strWanted + "\" here");
-    }
-}
-
-void execute(Store& store, const std::vector<std::string>& strStatements)
-{
+    const std::string strJournal = options.blUndo ? "delete" : "wal";
+    const std::vector<std::string> strStatements = statements(options);
     tool::Progress progress("Tuning", strStatements.size());
     for (const std::string& strStatement : strStatements) {
-        store.query(strStatement);
+        const std::string strResult = store.text(strStatement);
+        // Of all statements only that of the journal gives a row. It can do nothing without an error.
+        if (!strResult.empty() && strResult != strJournal) {
+            throw tool::Failure(tool::EXIT_STATUS_STORE,
+                                "the journal cannot be made \"" + strJournal + "\" here");
+        }
+        if (!strResult.empty()) {
+            Store::noteChange();
+        }
         progress.step();
     }
 }
@@ -130,8 +131,7 @@ int tune(const Options& options)
     }
     Store store(Store::Access::Plain);
     const auto before = measured(store, true);
-    execute(store, statements(options));
-    requireJournal(store, options);
+    execute(store, options);
     const auto after = measured(store, true);
     tool::Table table({{"WHAT", Kind::Short}, {"BEFORE", Kind::Short}, {"AFTER", Kind::Short}},
                       !options.blNoHeader);

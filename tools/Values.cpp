@@ -160,9 +160,12 @@ int64_t parseTime(const std::string& strText)
         const struct tm tmAsked = tmTime;
         tmTime.tm_isdst = -1;
         const time_t nTime = blUtc ? timegm(&tmTime) : mktime(&tmTime);
-        // 31 June, and the hour that a clock leaps over, come back as another time.
-        if (tmTime.tm_mday == tmAsked.tm_mday && tmTime.tm_hour == tmAsked.tm_hour &&
-            tmTime.tm_sec == tmAsked.tm_sec) {
+        // 31 June, and the hour that a clock leaps over, come back as another time. A day that lacks its
+        // midnight has another beginning.
+        const bool blDay = 0 == strcmp(szFormat, "%Y-%m-%d");
+        if (tmTime.tm_mday == tmAsked.tm_mday &&
+            (blDay || (tmTime.tm_hour == tmAsked.tm_hour && tmTime.tm_min == tmAsked.tm_min &&
+                       tmTime.tm_sec == tmAsked.tm_sec))) {
             return nTime;
         }
     }
@@ -239,6 +242,9 @@ Json::Value parseExtra(const std::string& strText)
         return parseObject(strText);
     }
     const std::string strFile = strText.substr(1);
+    if (strFile.empty()) {
+        throw BadValue("\"@\" names no file");
+    }
     std::ifstream file(strFile, std::ios::binary);
     std::string strContent;
     std::getline(file, strContent, '\0');

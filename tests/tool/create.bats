@@ -3,6 +3,36 @@
 
 load common
 
+# What there is of the private directory, to the byte.
+state()
+{
+    [ ! -e "$VEMO_REDIRECT_DIR" ] || find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
+    [ ! -f "$DB" ] || sha256sum "$DB"
+}
+
+# refuses: each line "ARGUMENTS|SENTENCE" of standard input is a call that fails with status 2 and that
+# sentence. All of them change nothing.
+refuses()
+{
+    local arguments sentence before
+    before=$(state)
+    while IFS='|' read -r arguments sentence; do
+        echo "$arguments"
+        eval "run_tool $arguments" </dev/null
+        expect 2 "" "vemo-access-token: $sentence"
+    done
+    [ "$(state)" = "$before" ]
+}
+
+# column COLUMN TID: of the token of that id
+column()
+{
+    sql "SELECT $1 FROM token WHERE tid = '$2'"
+}
+
+# An id of the caller's own: as short as may be.
+OWN=own-$(printf '%0123d' 0)
+
 @test "create prints the id alone, and the library's defaults hold" {
     tool init
     run_tool create --uid 1000 --function VPN
@@ -13,7 +43,322 @@ load common
               WHERE tid = '$output'")" = "|1000|86400|1|VPN|{}|{}" ]
 }
 
-@test "create needs an owner" {
-    run_tool create --function VPN
-    expect 2 "" "vemo-access-token: --uid or --user is required"
+@test "create stores what its options say" {
+    tool init
+    before=$(date +%s)
+    tid=$(tool create --user root --function 'File share' --ttl 1w2d3h4m5s --uses 9223372036854775807 \
+        --allow Example.File:get,list --allow Example.User --bind-sid session-1 \
+        --extra '{"b":[1,2.5,"x"],"a":null}')
+    after=$(date +%s)
+    [ "$(sql "SELECT bind_sid, uid, deadline - create_time, count, function, webapi_allow, extra,
+                     create_time BETWEEN $before AND $after FROM token WHERE tid = '$tid'")" = "$(printf '%s|' \
+        session-1 0 788645 9223372036854775807 'File share' \
+        '{"Example.File":{"method":["get","list"]},"Example.User":{"method":[]}}' \
+        '{"a":null,"b":[1,2.5,"x"]}')1" ]
+
+    [ "$(column count "$(a_token --unlimited)")" = -1 ]
+    [ "$(column uid "$(tool create --uid 4294967294 --function VPN)")" = 4294967294 ]
+}
+
+@test "create refuses options that it cannot use, and touches nothing" {
+    refuses <<'END'
+create --function VPN|--uid or --user is required
+create --uid 0|--function is required
+create --uid 0 --user root --function VPN|--uid excludes --user
+create --uid 0 --function ''|--function: must not be empty
+create --uid x --function VPN|--uid: "x" is no number from 0 to 4294967294
+create --uid -1 --function VPN|--uid: "-1" is no number from 0 to 4294967294
+create --uid 4294967295 --function VPN|--uid: "4294967295" is no number from 0 to 4294967294
+create --uid '' --function VPN|--uid: "" is no number from 0 to 4294967294
+create --user no-such-user --function VPN|--user: there is no user "no-such-user"
+create --user '' --function VPN|--user: there is no user ""
+create --uid 0 --function VPN --uses 0|--uses: "0" is no number from 1 to 9223372036854775807
+create --uid 0 --function VPN --uses -1|--uses: "-1" is no number from 1 to 9223372036854775807
+create --uid 0 --function VPN --uses 1.5|--uses: "1.5" is no number from 1 to 9223372036854775807
+create --uid 0 --function VPN --uses 9223372036854775808|--uses: "9223372036854775808" is no number from 1 to 9223372036854775807
+create --uid 0 --function VPN --uses 2 --unlimited|--uses excludes --unlimited
+create --uid 0 --function|--function: needs a value
+create --uid 0 --uid 1 --function VPN|--uid: can be given once only
+create --uid 0 --function VPN --count|The following argument was not expected: --count
+create --uid 0 --function VPN more|The following argument was not expected: more
+generate more|The following argument was not expected: more
+END
+}
+
+@test "an option with nothing behind its equals sign is given the empty text, not the next argument" {
+    refuses <<'END'
+create --function= --uid 0|--function: must not be empty
+END
+    tid=$(a_token --bind-sid= --unlimited)
+    [ "$(column "bind_sid, count" "$tid")" = "|-1" ]
+}
+
+@test "a lifetime is a number of seconds, or numbers with units" {
+    tool init
+    while read -r ttl seconds; do
+        echo "$ttl"
+        tid=$(tool create --uid 0 --function VPN --ttl "$ttl")
+        [ "$(column "deadline - create_time" "$tid")" = "$seconds" ]
+    done <<'END'
+1 1
+45s 45
+90m 5400
+8h 28800
+1h30m 5400
+2d12h 216000
+1w 604800
+1w1d1h1m1s 694861
+0h1s 1
+52178w 31557254400
+365250d 31557600000
+31557600000 31557600000
+END
+}
+
+@test "a text that is no lifetime of up to a thousand years is refused" {
+    tool init
+    for ttl in 0 0s 00 '' h 1x 1H 1y 1.5h -5m +5m ' 5m' '5 m' 5m, 1h30 P1D 365251d 52179w 31557600001 \
+        365250d1s 9223372036854775807 9223372036854775808s 99999999999999999999w; do
+        run_tool create --uid 0 --function VPN --ttl "$ttl"
+        expect 2 "" "vemo-access-token: --ttl: \"$ttl\" is no duration such as 90s, 15m, 8h, 2d12h or 1w"
+    done
+    [ "$(sql "SELECT count(*) FROM token")" = 0 ]
+}
+
+@test "--allow takes an API, with methods behind a colon, and may be repeated" {
+    tool init
+    while IFS='|' read -r arguments stored; do
+        echo "$arguments"
+        tid=$(eval "tool create --uid 0 --function VPN $arguments")
+        [ "$(column webapi_allow "$tid")" = "$stored" ]
+    done <<'END'
+--allow A|{"A":{"method":[]}}
+--allow A:m|{"A":{"method":["m"]}}
+--allow=A:m,n|{"A":{"method":["m","n"]}}
+--allow A:n,m,n|{"A":{"method":["n","m"]}}
+--allow A:m --allow B --allow A:n,m|{"A":{"method":["m","n"]},"B":{"method":[]}}
+--allow A --allow A:m|{"A":{"method":["m"]}}
+--allow A:m --allow A|{"A":{"method":["m"]}}
+--allow A:m:n|{"A":{"method":["m:n"]}}
+--allow 'A b:m n'|{"A b":{"method":["m n"]}}
+--allow '"\'|{"\"\\":{"method":[]}}
+--allow '[A,B]'|{"[A,B]":{"method":[]}}
+--allow '{}'|{"{}":{"method":[]}}
+--allow %%|{"%%":{"method":[]}}
+--allow -A|{"-A":{"method":[]}}
+--allow Äpi:ü|{"Äpi":{"method":["ü"]}}
+END
+}
+
+@test "an allowance without an API or with an empty method is refused" {
+    tool init
+    for allow in '' : :m; do
+        run_tool create --uid 0 --function VPN --allow A --allow "$allow"
+        expect 2 "" "vemo-access-token: --allow: \"$allow\" names no API: write API or API:METHOD,METHOD"
+    done
+    for allow in 'A:' 'A:,' 'A:m,' 'A:,m' 'A:m,,n'; do
+        run_tool create --uid 0 --function VPN --allow "$allow"
+        expect 2 "" "vemo-access-token: --allow: \"$allow\" has an empty method: write API or API:METHOD,METHOD"
+    done
+    run_tool create --uid 0 --function VPN --allow
+    expect 2 "" "vemo-access-token: --allow: needs a value"
+    [ "$(sql "SELECT count(*) FROM token")" = 0 ]
+}
+
+# nested LEVELS: an object in an object in an object...
+nested()
+{
+    printf '{"a":%.0s' $(seq 2 "$1")
+    printf '{}'
+    printf '}%.0s' $(seq 2 "$1")
+}
+
+@test "--extra takes a JSON object, on the command line or in a file" {
+    tool init
+    while IFS='|' read -r extra stored; do
+        echo "$extra"
+        tid=$(tool create --uid 0 --function VPN --extra "$extra")
+        [ "$(column extra "$tid")" = "$stored" ]
+    done <<'END'
+{}|{}
+ { "b" : [ ] , "a" : { "c" : null } } |{"a":{"c":null},"b":[]}
+{"n":[0,-1,9223372036854775807,18446744073709551615,0.5,2e3]}|{"n":[0,-1,9223372036854775807,18446744073709551615,0.5,2000.0]}
+{"t":[true,false,""]}|{"t":[true,false,""]}
+{"ü":"\u00fc\n\"\\\u0000\u001b'"}|{"ü":"ü\n\"\\\u0000\u001b'"}
+{"@":"@"}|{"@":"@"}
+END
+    # Line breaks, and one at the end, as in files that people write.
+    printf '{\n  "file": [1,\n2]\n}\n' >"$DIR/extra file"
+    tid=$(tool create --uid 0 --function VPN --extra "@$DIR/extra file")
+    [ "$(column extra "$tid")" = '{"file":[1,2]}' ]
+    # As many levels as the library reads back.
+    tid=$(tool create --uid 0 --function VPN --extra "$(nested 1000)")
+    [ "$(column extra "$tid")" = "$(nested 1000)" ]
+    [ "$(tool show "$tid" --field extra)" = "$(nested 1000)" ]
+}
+
+@test "an --extra that is no JSON object is refused" {
+    tool init
+    while IFS='|' read -r extra sentence; do
+        echo "$extra"
+        run_tool create --uid 0 --function VPN --extra "$extra"
+        expect 2 "" "vemo-access-token: --extra: $sentence"
+    done <<'END'
+[]|is no JSON object
+[{"a":1}]|is no JSON object
+|is no JSON: Column 1 Syntax error: value, object or array expected.
+{|is no JSON: Column 2 Missing '}' or object member name
+{"a":1,}|is no JSON: Column 8 Missing '}' or object member name
+{"a" 1}|is no JSON: Column 6 Missing ':' after object member name
+{"a":1} x|is no JSON: Column 9 Extra non-whitespace after JSON value.
+{"a":1,"a":2}|is no JSON: Column 8 Duplicate key: 'a'
+{a:1}|is no JSON: Column 2 Missing '}' or object member name
+{} //|is no JSON: Column 4 Extra non-whitespace after JSON value.
+1|is no JSON: Column 1 A valid JSON document must be either an array or an object value.
+null|is no JSON: Column 1 A valid JSON document must be either an array or an object value.
+END
+    run_tool create --uid 0 --function VPN --extra "$(nested 1001)"
+    expect 2 "" "vemo-access-token: --extra: is nested too deeply for JSON"
+    [ "$(sql "SELECT count(*) FROM token")" = 0 ]
+}
+
+@test "an --extra whose file cannot be used is refused" {
+    tool init
+    printf '[1]' >"$DIR/array"
+    printf '{"a":' >"$DIR/broken"
+    printf '{\n"a":\n}' >"$DIR/lines"
+    printf '{"a":"b\0c"}' >"$DIR/nul"
+    printf '{}\0' >"$DIR/nul-behind"
+    : >"$DIR/empty"
+    while IFS='|' read -r file sentence; do
+        echo "$file"
+        run_tool create --uid 0 --function VPN --extra "@$file"
+        expect 2 "" "vemo-access-token: --extra: $sentence"
+    done <<END
+$DIR/missing|$DIR/missing: No such file or directory
+$DIR|$DIR: Is a directory
+$DIR/nul|$DIR/nul holds a NUL byte
+$DIR/nul-behind|$DIR/nul-behind holds a NUL byte
+$DIR/array|is no JSON object
+$DIR/broken|is no JSON: Column 6 Syntax error: value, object or array expected.
+$DIR/lines|is no JSON: Line 3, Column 1 Syntax error: value, object or array expected.
+$DIR/empty|is no JSON: Column 1 Syntax error: value, object or array expected.
+|"@" names no file
+END
+    [ "$(sql "SELECT count(*) FROM token")" = 0 ]
+}
+
+@test "create takes an id of the caller's own" {
+    tool init
+    run_tool create --uid 0 --function VPN --tid "$OWN"
+    expect 0 "$OWN"
+    run_tool create --uid 0 --function VPN --tid - <<<"${OWN/own/two}"
+    expect 0 "${OWN/own/two}"
+    # Lines that hold nothing count for nothing; neither does a missing line break.
+    run_tool create --uid 0 --function VPN --tid - < <(printf '\n\n%s' "${OWN/own/tre}")
+    expect 0 "${OWN/own/tre}"
+    # What it may hold, and how long it may be, is the caller's business.
+    odd="' \"Ä\\$(printf '%010000d' 0)"
+    run_tool create --uid 0 --function VPN --tid - <<<"$odd"
+    expect 0 "$odd"
+    tool generate | tool create --uid 0 --function VPN --tid - >"$DIR/tid"
+    [ "$(sql "SELECT tid FROM token ORDER BY rowid")" = "$OWN
+${OWN/own/two}
+${OWN/own/tre}
+$odd
+$(cat "$DIR/tid")" ]
+}
+
+@test "an own id that is too short or taken is refused, and nothing changes" {
+    a_token --tid "$OWN"
+    a_token
+    sql "UPDATE token SET deadline = 1 WHERE tid <> '$OWN'"
+    refuses <<END
+create --uid 0 --function VPN --tid "${OWN%0}"|--tid: an id needs 127 characters at least, this one has 126
+create --uid 0 --function Other --tid "$OWN"|--tid: there is a token with this id already
+END
+}
+
+@test "an empty own id is refused: it may come from an unset variable" {
+    tool init
+    refuses <<'END'
+create --uid 0 --function VPN --tid ''|--tid: the id is empty
+create --uid 0 --function VPN --tid=|--tid: the id is empty
+END
+}
+
+@test "an own id on standard input must be one, without a NUL byte" {
+    tool init
+    while IFS='|' read -r input sentence; do
+        echo "$input"
+        run_tool create --uid 0 --function VPN --tid - < <(printf "$input")
+        expect 2 "" "vemo-access-token: --tid: $sentence"
+    done <<END
+|there is no id on standard input
+\n\n|there is no id on standard input
+$OWN\n${OWN/own/two}\n|there is more than one id on standard input
+$OWN\0\n|an id on standard input holds a NUL byte
+\0$OWN|an id on standard input holds a NUL byte
+short\n|an id needs 127 characters at least, this one has 5
+END
+    run --separate-stderr bash -c '"$0" create --uid 0 --function VPN --tid - <&-' "$TOOL"
+    expect 2 "" "vemo-access-token: --tid: there is no id on standard input"
+    [ "$(sql "SELECT count(*) FROM token")" = 0 ]
+}
+
+@test "create purges expired tokens, and may use the id of one again" {
+    a_token --tid "$OWN" --uses 5
+    expired=$(a_token)
+    lasting=$(a_token)
+    sql "UPDATE token SET deadline = 1 WHERE tid IN ('$OWN', '$expired')"
+    run_tool create --uid 0 --function VPN --tid "$OWN"
+    expect 0 "$OWN"
+    [ "$(sql "SELECT tid, count FROM token ORDER BY rowid")" = "$lasting|1
+$OWN|1" ]
+}
+
+@test "texts are stored as they are given" {
+    tool init
+    text=$'a\'b"c\\d\ne\tf\e[31mÄ漢\xff;--'
+    tid=$(tool create --uid 0 --function "$text" --bind-sid "$text" --allow "$text:$text")
+    hex=$(printf %s "$text" | od -An -v -tx1 | tr -d ' \n')
+    [ "$(column "lower(hex(function)), lower(hex(bind_sid))" "$tid")" = "$hex|$hex" ]
+    json=$'a\'b\\"c\\\\d\\ne\\tf\\u001b[31mÄ漢\xff;--'
+    [ "$(column webapi_allow "$tid")" = "{\"$json\":{\"method\":[\"$json\"]}}" ]
+}
+
+@test "create makes the file and the table where only they are missing" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    run_tool create --uid 0 --function VPN
+    [ "$status" -eq 0 ]
+    [ "$stderr" = "" ]
+    [ "$(sql "SELECT tid FROM token")" = "$output" ]
+    [ "$(stat -c %a "$DB")" = 700 ]
+}
+
+@test "create makes no directory, and mends no file" {
+    # says REASON: what a creation fails with, and that it leaves all as it was
+    says()
+    {
+        local before
+        before=$(state)
+        run_tool create --uid 0 --function VPN
+        expect 4 "" "vemo-access-token: $1"
+        [ "$(state)" = "$before" ]
+    }
+    says "there is no directory ${REAL_DB%/*}; \"vemo-access-token init\" makes it"
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    : >"$DB"
+    says "$REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
+    sql "CREATE TABLE other (tid)"
+    says "$REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
+}
+
+@test "generate prints a new id each time, and touches no database" {
+    run_tool generate
+    [ "$status" -eq 0 ]
+    [ "$stderr" = "" ]
+    [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
+    [ "$output" != "$(tool generate)" ]
+    [ ! -e "$VEMO_REDIRECT_DIR" ]
 }

@@ -18,8 +18,9 @@ _vemo_access_token()
 
     local selection='--uid --user --function --bind-sid'
     local uses='--uses --unlimited'
-    local form='--output --no-header'
-    local token_form="$form --field --utc --epoch"
+    local form='--output'
+    local table_form="$form --no-header"
+    local token_form="$table_form --field --utc --epoch"
     local options
     case $command in
         create) options="--uid --user --function --ttl $uses --allow --bind-sid --extra --tid" ;;
@@ -32,7 +33,7 @@ _vemo_access_token()
             ;;
         revoke) options="$selection --all --dry-run --yes" ;;
         purge) options='--dry-run' ;;
-        stats) options="--prometheus $form" ;;
+        stats) options="--prometheus $table_form" ;;
         doctor) options="--repair $form" ;;
         tune) options='--wal --undo --dry-run --no-header' ;;
         generate | export | import | init) options= ;;

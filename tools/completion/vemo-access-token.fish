@@ -78,7 +78,7 @@ __vemo_access_token_option list count 'How many there are, no more'
 __vemo_access_token_option list show-ids 'Whole ids, not their first 8 characters'
 
 __vemo_access_token_option 'list show check stats doctor' output 'The form of the output' -s o -x -a $forms
-__vemo_access_token_option 'list show check stats doctor tune' no-header 'No line of titles above a table'
+__vemo_access_token_option 'list show stats tune' no-header 'No line of titles above a table'
 __vemo_access_token_option 'list show' field 'This field only, as it is stored' -x -a "$fields"
 __vemo_access_token_option 'list show' utc 'Times in UTC instead of local time'
 __vemo_access_token_option 'list show' epoch 'Times in seconds since the epoch'
@@ -96,7 +96,7 @@ __vemo_access_token_option 'revoke purge' dry-run 'Only tell how many'
 
 __vemo_access_token_option stats prometheus "As metrics for Prometheus' node exporter"
 
-__vemo_access_token_option doctor repair 'Repair what needs no decision'
+__vemo_access_token_option doctor repair 'Repair what can be'
 
 __vemo_access_token_option tune wal 'The write-ahead journal too'
 __vemo_access_token_option tune undo 'Remove the indexes and the write-ahead journal'

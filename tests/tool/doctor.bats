@@ -1,0 +1,600 @@
+#!/usr/bin/env bats
+# doctor
+
+load common
+
+DIRECTORY=/usr/vemo/etc/private/session
+
+# [deadline=SQL] [count=SQL] [extra=SQL] ... a_row TID: a token, written behind the tool's back
+a_row()
+{
+    [ -e "$DB" ] || tool init >/dev/null
+    sql "INSERT INTO token VALUES ('$1', '', ${uid-0}, ${deadline-9999999999}, ${count-1}, ${create_time-0},
+         'VPN', ${webapi_allow-"'{}'"}, ${extra-"'{}'"})"
+}
+
+# expect_left TID...: the tokens that are there still, in order
+expect_left()
+{
+    [ "$(sql "SELECT tid FROM token ORDER BY tid" | xargs)" = "$*" ]
+}
+
+# expect_finding SEVERITY WHAT MEANING REMEDY: doctor finds that, and nothing else
+expect_finding()
+{
+    run_tool doctor
+    expect 5 "$1: $2
+    meaning: $3
+    remedy: $4"
+}
+
+# expect_repair WHAT MEANING: doctor repairs that, and then there is nothing left
+expect_repair()
+{
+    run_tool doctor --repair
+    expect 0 "repaired: $1
+    meaning: $2
+no findings"
+    run_tool doctor
+    expect 0 "no findings"
+}
+
+# expect_no_repair SEVERITY WHAT MEANING REMEDY: doctor finds that, and leaves it to the administrator
+expect_no_repair()
+{
+    expect_finding "$@"
+    local found=$output
+    run_tool doctor --repair
+    expect 5 "$found"
+}
+
+# in_namespace COMMANDS ARGUMENTS...: runs them as root of a namespace, where a layer in memory lies over /usr
+in_namespace()
+{
+    local overlay='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
+        mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr'
+    [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
+    mkdir "$DIR/layer"
+    unshare --user --map-root-user --mount bash -c "$overlay" "$DIR/layer" 2>/dev/null ||
+        skip "no namespace with an overlay here"
+    run --separate-stderr unshare --user --map-root-user --mount bash -c "unset VEMO_REDIRECT_DIR; $overlay; $1" \
+        "$DIR/layer" "${@:2}"
+}
+
+@test "a sound store gives no findings, and stays as it is" {
+    local tid
+    tid=$(a_token --allow Example.File:get --extra '{"a":Infinity}')
+    deadline="strftime('%s', 'now') - 3000" a_row expired-just-now
+    count=-1 a_row unlimited
+    cp "$DB" "$DIR/before"
+    run_tool doctor
+    expect 0 "no findings"
+    run_tool doctor --repair
+    expect 0 "no findings"
+    run_tool doctor -o json
+    expect 0 "[]"
+    run_tool doctor -o jsonl
+    expect 0 ""
+    cmp "$DB" "$DIR/before"
+    expect_left $(printf '%s\n' "$tid" expired-just-now unlimited | LC_ALL=C sort)
+}
+
+@test "not being root is a finding, and the only one" {
+    local user=()
+    if [ "$(id -u)" -eq 0 ]; then
+        user=(setpriv --reuid=65534 --regid=65534 --clear-groups)
+        "${user[@]}" test -x "$TOOL" || skip "another user cannot run the tool here"
+    fi
+    run --separate-stderr "${user[@]}" env -u VEMO_REDIRECT_DIR "$TOOL" doctor --repair
+    local uid=65534
+    [ "$(id -u)" -eq 0 ] || uid=$(id -u)
+    expect 5 "error: not run as root: the effective uid is $uid
+    meaning: the database belongs to root and cannot be looked at
+    remedy: run doctor as root"
+}
+
+@test "a missing directory, and then the file, are made" {
+    expect_finding error "there is no directory $DIRECTORY" "no token can be created, and every call fails" \
+        "vemo-access-token init"
+    [ ! -e "$VEMO_REDIRECT_DIR" ]
+    run_tool doctor --repair
+    expect 0 "repaired: there is no directory $DIRECTORY
+    meaning: no token can be created, and every call fails
+repaired: there is no database $REAL_DB
+    meaning: there are no tokens; the first call that needs it makes it
+no findings"
+    [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" | xargs)" = "700 700" ]
+    [ "$(sql "PRAGMA auto_vacuum; SELECT count(*) FROM token" | xargs)" = "1 0" ]
+}
+
+@test "a missing file is made, with its table" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    expect_finding error "there is no database $REAL_DB" "there are no tokens; the first call that needs it makes it" \
+        "vemo-access-token init"
+    [ ! -e "$DB" ]
+    expect_repair "there is no database $REAL_DB" "there are no tokens; the first call that needs it makes it"
+    [ "$(stat -c %a "$DB")" = 700 ]
+    [ "$(sql "PRAGMA auto_vacuum; SELECT count(*) FROM token" | xargs)" = "1 0" ]
+}
+
+@test "a file without the table gets it" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    install -m 0700 /dev/null "$DB"
+    local meaning="every call fails: the table is made together with the file, and never later"
+    expect_finding error "the database has no table of tokens" "$meaning" "vemo-access-token init"
+    [ ! -s "$DB" ]
+    expect_repair "the database has no table of tokens" "$meaning"
+    [ "$(sql "PRAGMA auto_vacuum; SELECT count(*) FROM token" | xargs)" = "1 0" ]
+}
+
+@test "modes that let others in are tightened" {
+    a_row aaaaaaaa
+    local meaning="others than root can use it, and ids are credentials" mode
+    for mode in 0755 0701 0710; do
+        chmod "$mode" "$VEMO_REDIRECT_DIR"
+        expect_finding error "$DIRECTORY has mode $mode" "$meaning" "chmod 0700 $DIRECTORY"
+    done
+    expect_repair "$DIRECTORY has mode 0710" "$meaning"
+    for mode in 0644 0604 0720; do
+        chmod "$mode" "$DB"
+        expect_finding error "$REAL_DB has mode $mode" "$meaning" "chmod 0700 $REAL_DB"
+    done
+    expect_repair "$REAL_DB has mode 0720" "$meaning"
+    [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" | xargs)" = "700 700" ]
+    chmod 0600 "$DB"
+    run_tool doctor
+    expect 0 "no findings"
+}
+
+@test "owners other than root are replaced" {
+    [ "$(id -u)" -eq 0 ] || skip "only root can give files away"
+    a_row aaaaaaaa
+    local meaning="its owner can read and change every token"
+    chown 4000000000 "$DB"
+    expect_finding error "$REAL_DB belongs to uid 4000000000" "$meaning" "chown root $REAL_DB"
+    expect_repair "$REAL_DB belongs to uid 4000000000" "$meaning"
+    chown 4000000000:1 "$VEMO_REDIRECT_DIR"
+    expect_finding error "$DIRECTORY belongs to uid 4000000000" "$meaning" "chown root $DIRECTORY"
+    expect_repair "$DIRECTORY belongs to uid 4000000000" "$meaning"
+    [ "$(stat -c '%u %g' "$VEMO_REDIRECT_DIR")" = "0 1" ]
+}
+
+@test "a symbolic link in place of the directory is left to the administrator" {
+    a_row aaaaaaaa
+    mv "$VEMO_REDIRECT_DIR" "$DIR/elsewhere"
+    ln -s elsewhere "$VEMO_REDIRECT_DIR"
+    expect_no_repair error "$DIRECTORY is a symbolic link" "the tokens stand elsewhere, or nowhere" \
+        "find out who made it; move the database to a directory of that name"
+    # What stands behind it is looked at, too.
+    sql "UPDATE token SET deadline = 0"
+    run_tool doctor
+    [ "$status" -eq 5 ]
+    [ "${lines[0]}" = "error: $DIRECTORY is a symbolic link" ]
+    [ "${lines[3]}" = "warning: a deadline of 0 or less in 1 token (aaaaaaaa)" ]
+    [ "${#lines[@]}" -eq 6 ]
+}
+
+@test "another thing in place of the directory is left to the administrator" {
+    echo text >"$VEMO_REDIRECT_DIR"
+    expect_no_repair error "$DIRECTORY is no directory" "the tokens stand elsewhere, or nowhere" \
+        "find out who made it; move the database to a directory of that name"
+    [ "$(cat "$VEMO_REDIRECT_DIR")" = text ]
+}
+
+@test "a symbolic link in place of the file is left to the administrator" {
+    a_row aaaaaaaa
+    mv "$DB" "$DIR/elsewhere"
+    ln -s ../elsewhere "$DB"
+    expect_no_repair error "$REAL_DB is a symbolic link" "programs work on another file than this one, or on none" \
+        "find out who made it; move the database to this name"
+    rm "$DIR/elsewhere"
+    run_tool doctor
+    [ "$status" -eq 5 ]
+    [ "${lines[0]}" = "error: $REAL_DB is a symbolic link" ]
+    [ ! -e "$DIR/elsewhere" ]
+}
+
+@test "another thing in place of the file is left to the administrator" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    mkdir "$DB"
+    expect_no_repair error "$REAL_DB is no regular file" "programs work on another file than this one, or on none" \
+        "find out who made it; move the database to this name"
+}
+
+@test "hard links are left to the administrator" {
+    a_row aaaaaaaa
+    ln "$DB" "$DIR/second"
+    ln "$DB" "$DIR/third"
+    expect_no_repair warning "$REAL_DB has 3 hard links" \
+        "the tokens can be reached under another name, and a journal of that name is not found" \
+        "find -samefile tells the other names; remove those"
+}
+
+@test "directories above that others can change are left to the administrator" {
+    in_namespace 'mkdir /usr/vemo && chmod 0777 /usr/vemo && "$1" init >/dev/null && "$1" doctor --repair' "$TOOL"
+    expect 5 "warning: /usr/vemo belongs to uid 0 and has mode 0777
+    meaning: others than root can replace the private directory below it
+    remedy: chown root /usr/vemo && chmod go-w /usr/vemo"
+}
+
+@test "a repair that fails is told" {
+    in_namespace '"$1" init >/dev/null && chmod 0755 "$2" && mount -o remount,ro /usr && "$1" doctor --repair' \
+        "$TOOL" "$DIRECTORY"
+    expect 5 "error: $DIRECTORY has mode 0755
+    meaning: others than root can use it, and ids are credentials
+    remedy: chmod 0700 $DIRECTORY
+error: $DIRECTORY cannot be written to: Read-only file system
+    meaning: no token can be created, changed or granted
+    remedy: make the file system writable, or the directory" "vemo-access-token: cannot repair: $DIRECTORY: Read-only file system"
+}
+
+@test "a place that cannot be looked at is a finding" {
+    ln -s session "$VEMO_REDIRECT_DIR"
+    run_tool doctor
+    expect 5 "error: $DIRECTORY is a symbolic link
+    meaning: the tokens stand elsewhere, or nowhere
+    remedy: find out who made it; move the database to a directory of that name
+error: $REAL_DB: Too many levels of symbolic links
+    meaning: programs fail in the same way
+    remedy: mend the cause, or move the file away and import a backup"
+}
+
+@test "a file that is no database is a finding, and left" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
+    chmod 0600 "$DB"
+    cp "$DB" "$DIR/text"
+    expect_no_repair error "$REAL_DB is no token database, or a damaged one (file is not a database)" \
+        "programs fail in the same way" "mend the cause, or move the file away and import a backup"
+    cmp "$DB" "$DIR/text"
+}
+
+@test "an index that does not fit its table is damage" {
+    a_row aaaaaaaa
+    sql "CREATE INDEX i ON token (deadline); PRAGMA writable_schema = ON;
+         UPDATE sqlite_schema SET sql = 'CREATE INDEX i ON token (uid)' WHERE name = 'i'"
+    expect_no_repair error "the database is damaged: row 1 missing from index i" "tokens may be lost or wrong" \
+        'save the tokens with "vemo-access-token export" if it can still read them; stop the programs, move the file away, and import that or a backup'
+    run_tool export
+    [ "$status" -eq 0 ]
+}
+
+@test "a page that is not one is damage, told on one line and without sending the reader in a circle" {
+    tool init
+    sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 100)
+         INSERT INTO token SELECT printf('%0127d', i), '', 0, 9999999999, 1, 0, 'VPN', '{}', '{}' FROM n"
+    # The roots of the table and of its index stand on pages 3 and 4; a leaf comes last.
+    local pages page
+    pages=$(sql "PRAGMA page_count")
+    cp "$DB" "$DIR/sound"
+    for page in 3 4 "$pages"; do
+        cp "$DIR/sound" "$DB"
+        dd if=/dev/zero of="$DB" bs=4096 seek=$((page - 1)) count=1 conv=notrunc status=none
+        run_tool doctor
+        [ "$status" -eq 5 ]
+        [[ ${lines[0]} == "error: the database is damaged: "*"age $page: btreeInitPage() returns error code 11"* ]]
+        [[ ${lines[0]} != *'\x0a'* ]]
+        [ "${lines[1]}" = "    meaning: tokens may be lost or wrong" ]
+        [[ $output != *"vemo-access-token doctor"* ]]
+    done
+}
+
+@test "a table that lacks columns is left to the administrator" {
+    a_row aaaaaaaa
+    sql "ALTER TABLE token DROP COLUMN extra; ALTER TABLE token RENAME uid TO owner"
+    expect_no_repair error "the table of tokens lacks columns: uid, extra" \
+        "every call that reads or writes a token fails" "stop the programs, move the file away, and import a backup"
+}
+
+@test "tokens with a NULL are deleted" {
+    a_row kept
+    uid=NULL a_row aaaaaaaa-long
+    count=NULL a_row bbbbbbbb
+    local meaning="such a token cannot be read or granted, and every listing that meets it fails"
+    expect_finding error "a NULL in 2 tokens (aaaaaaaa, bbbbbbbb)" "$meaning" \
+        "delete them: vemo-access-token doctor --repair"
+    expect_left aaaaaaaa-long bbbbbbbb kept
+    expect_repair "a NULL in 2 tokens (aaaaaaaa, bbbbbbbb)" "$meaning"
+    expect_left kept
+    local column
+    for column in bind_sid deadline count create_time extra; do
+        a_row cccccccc
+        sql "UPDATE token SET $column = NULL WHERE tid = 'cccccccc'"
+        expect_repair "a NULL in 1 token (cccccccc)" "$meaning"
+        expect_left kept
+    done
+}
+
+@test "a finding names five tokens, and that there are more" {
+    local i
+    for i in 1 2 3 4 5 6; do
+        deadline=1 a_row "${i}aaaaaaaaaaa"
+    done
+    expect_finding warning "expired for more than an hour: 6 tokens (1aaaaaaa, 2aaaaaaa, 3aaaaaaa, 4aaaaaaa, 5aaaaaaa, ...)" \
+        "no program has called since, or its purges fail" "vemo-access-token purge"
+    sql "DELETE FROM token WHERE tid LIKE '6%'"
+    expect_finding warning "expired for more than an hour: 5 tokens (1aaaaaaa, 2aaaaaaa, 3aaaaaaa, 4aaaaaaa, 5aaaaaaa)" \
+        "no program has called since, or its purges fail" "vemo-access-token purge"
+}
+
+@test "what is no whole number is left to the administrator" {
+    a_row kept
+    deadline="'soon'" a_row aaaaaaaa
+    count=1.5 a_row bbbbbbbb
+    uid="x'3030'" a_row cccccccc
+    create_time="'CURRENT_TIMESTAMP'" a_row dddddddd
+    count="'7'" a_row becomes-a-number
+    expect_no_repair error "no whole number where there should be one in 4 tokens (aaaaaaaa, bbbbbbbb, cccccccc, dddddddd)" \
+        "it is read as another number, 0 for a word: deadline or uses are not what they seem" \
+        "revoke them, or update what is wrong"
+    run_tool revoke aaaaaaaa bbbbbbbb cccccccc dddddddd
+    expect 0 "4 tokens revoked"
+    run_tool doctor
+    expect 0 "no findings"
+}
+
+@test "what is no JSON object is left to the administrator" {
+    a_row kept
+    extra="'{\"a\":Infinity} // JSON for the library'" a_row kept-too
+    webapi_allow="'[]'" a_row aaaaaaaa-long
+    extra="'text'" a_row bbbbbbbb
+    extra="''" a_row cccccccc
+    webapi_allow="7" a_row dddddddd
+    expect_no_repair error "no JSON object where there should be one in 4 tokens (aaaaaaaa, bbbbbbbb, cccccccc, dddddddd)" \
+        "such a token opens nothing, or cannot be saved with a use less" "revoke them, or update --allow and --extra"
+}
+
+@test "a NULL in place of an object, or beside one that is none, is one finding" {
+    extra=NULL a_row aaaaaaaa
+    webapi_allow="'[]'" extra=NULL a_row bbbbbbbb
+    webapi_allow="'[]'" uid=NULL a_row cccccccc
+    local meaning="such a token cannot be read or granted, and every listing that meets it fails"
+    expect_finding error "a NULL in 3 tokens (aaaaaaaa, bbbbbbbb, cccccccc)" "$meaning" \
+        "delete them: vemo-access-token doctor --repair"
+    expect_repair "a NULL in 3 tokens (aaaaaaaa, bbbbbbbb, cccccccc)" "$meaning"
+    expect_left
+}
+
+@test "of many tokens without an object, five are named" {
+    local i
+    for i in 1 2 3 4 5 6 7; do
+        extra="'[]'" a_row "${i}aaaaaaa"
+    done
+    run_tool doctor
+    [ "$status" -eq 5 ]
+    [[ ${lines[0]} == "error: no JSON object where there should be one in "*"5aaaaaaa, ..."* ]]
+    [[ ${lines[0]} != *6aaaaaaa* ]]
+}
+
+@test "bytes in place of a text, which no look-up finds, are a finding" {
+    local column
+    for column in tid bind_sid function; do
+        a_row aaaaaaaa
+        sql "UPDATE token SET $column = CAST($column || 'x' AS BLOB)"
+        run_tool doctor
+        [ "$status" -eq 5 ]
+        [[ ${lines[0]} == "error: "*"1 token (aaaaaaaa)" ]]
+        sql "DELETE FROM token"
+    done
+}
+
+@test "deadlines that the purge will take are left to the administrator" {
+    deadline=-1 a_row aaaaaaaa
+    deadline=0 a_row bbbbbbbb
+    expect_no_repair warning "a deadline of 0 or less in 2 tokens (aaaaaaaa, bbbbbbbb)" \
+        "there is no value for \"never\": the next purge deletes them" "update --ttl gives them time"
+    expect_left aaaaaaaa bbbbbbbb
+}
+
+@test "a backlog of expired tokens is purged, but not what was meant to last for ever" {
+    a_row kept
+    deadline=-1 a_row meant-to-last
+    deadline=1 a_row aaaaaaaa
+    deadline="strftime('%s', 'now') - 4000" a_row bbbbbbbb
+    deadline="strftime('%s', 'now') - 3000" a_row expired-just-now
+    run_tool doctor
+    expect 5 'warning: a deadline of 0 or less in 1 token (meant-to)
+    meaning: there is no value for "never": the next purge deletes them
+    remedy: update --ttl gives them time
+warning: expired for more than an hour: 2 tokens (aaaaaaaa, bbbbbbbb)
+    meaning: no program has called since, or its purges fail
+    remedy: vemo-access-token purge'
+    run_tool doctor --repair
+    expect 5 'repaired: expired for more than an hour: 2 tokens (aaaaaaaa, bbbbbbbb)
+    meaning: no program has called since, or its purges fail
+warning: a deadline of 0 or less in 1 token (meant-to)
+    meaning: there is no value for "never": the next purge deletes them
+    remedy: update --ttl gives them time'
+    expect_left kept meant-to-last
+}
+
+@test "a large table without an index on the deadline is a finding" {
+    tool init
+    sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 10001)
+         INSERT INTO token SELECT printf('%0127d', i), '', 0, 9999999999, 1, 0, 'VPN', '{}', '{}' FROM n"
+    expect_no_repair warning "10001 tokens, and no index on their deadline" \
+        "every call reads the whole table for expired tokens" "vemo-access-token tune"
+    sql "CREATE INDEX of_another_column ON token (function, deadline)"
+    run_tool doctor
+    [ "$status" -eq 5 ]
+    sql "DROP INDEX of_another_column; CREATE INDEX own ON token (deadline)"
+    run_tool doctor
+    expect 0 "no findings"
+    sql "DROP INDEX own; DELETE FROM token WHERE rowid = 1"
+    run_tool doctor
+    expect 0 "no findings"
+}
+
+# a_half_change: the store as a program leaves it that stops in the middle of a change, with a journal
+a_half_change()
+{
+    tool init
+    sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 40)
+         INSERT INTO token SELECT printf('%0127d', i), '', 0, 9999999999, 1, 0, 'VPN', '{}',
+         json_object('data', hex(zeroblob(1000))) FROM n"
+    # What does not fit into the cache is written before the end of the change.
+    sqlite3 "$DB" >/dev/null <<SQL
+PRAGMA cache_size = 1;
+BEGIN;
+UPDATE token SET function = 'half', extra = json_object('data', hex(randomblob(1000)));
+.shell cp "$DB" "$DIR/half"; cp "$DB-journal" "$DIR/half-journal"
+ROLLBACK;
+SQL
+    cp "$DIR/half" "$DB"
+    cp "$DIR/half-journal" "$DB-journal"
+    # What was written of the change is there indeed.
+    grep -q half "$DB"
+    [ -s "$DB-journal" ]
+}
+
+@test "a journal that was left behind is a finding, and undone by looking" {
+    a_half_change
+    touch -d "1 hour ago" "$DB-journal"
+    local meaning="a program or the machine stopped in the middle of a change"
+    expect_finding warning "$REAL_DB-journal was left behind" "$meaning" \
+        "none needed: reading the database has just undone the half change"
+    [ "$(ls -A "$VEMO_REDIRECT_DIR")" = vemo-access-token.db ]
+    [ "$(sql "SELECT function, count(*) FROM token GROUP BY 1; PRAGMA integrity_check" | xargs)" = "VPN|40 ok" ]
+    run_tool doctor
+    expect 0 "no findings"
+
+    cp "$DIR/half" "$DB"
+    cp "$DIR/half-journal" "$DB-journal"
+    touch -d "1 hour ago" "$DB-journal"
+    expect_repair "$REAL_DB-journal was left behind" "$meaning"
+    [ "$(sql "SELECT function, count(*) FROM token GROUP BY 1; PRAGMA integrity_check" | xargs)" = "VPN|40 ok" ]
+}
+
+@test "a journal of just now can be a living program's, and is no finding" {
+    a_half_change
+    touch -d "1 hour" "$DB-journal"
+    run_tool doctor
+    expect 0 "no findings"
+    [ "$(sql "SELECT function, count(*) FROM token GROUP BY 1")" = "VPN|40" ]
+}
+
+@test "an old journal that is empty, or that its program has ended, holds no half change" {
+    a_row aaaaaaaa
+    : >"$DB-journal"
+    touch -d "1 hour ago" "$DB-journal"
+    run_tool doctor
+    expect 0 "no findings"
+    sql "PRAGMA journal_mode = PERSIST; UPDATE token SET count = 2"
+    touch -d "1 hour ago" "$DB-journal"
+    [ -s "$DB-journal" ]
+    run_tool doctor
+    expect 0 "no findings"
+}
+
+@test "a write-ahead journal that belongs to the database is no finding" {
+    a_row aaaaaaaa
+    # A program that still has the database open, and one that stopped.
+    sqlite3 "$DB" >/dev/null <<SQL
+PRAGMA journal_mode = WAL;
+UPDATE token SET function = 'changed';
+.shell cp "$DB" "$DIR/copy"; cp "$DB-wal" "$DIR/copy-wal"
+.shell "$TOOL" doctor >"$DIR/doctor"
+SQL
+    [ "$(cat "$DIR/doctor")" = "no findings" ]
+    cp "$DIR/copy" "$DB"
+    cp "$DIR/copy-wal" "$DB-wal"
+    touch -d "1 hour ago" "$DB-wal"
+    run_tool doctor
+    expect 0 "no findings"
+    [ "$(sql "SELECT function FROM token")" = changed ]
+}
+
+@test "a write-ahead journal beside a database that has none is left to the administrator" {
+    a_row aaaaaaaa
+    echo journal >"$DB-wal"
+    expect_no_repair warning "$REAL_DB-wal does not belong to the database" \
+        "the database was copied or replaced without it, and may lack changes" \
+        "if the database is complete, remove it while no program runs"
+    [ "$(cat "$DB-wal")" = journal ]
+}
+
+@test "another store's write-ahead journal is not mixed into the database by looking" {
+    a_row aaaaaaaa
+    cp "$DB" "$DIR/backup"
+    sqlite3 "$DB" >/dev/null <<SQL
+PRAGMA journal_mode = WAL;
+UPDATE token SET function = 'changed';
+.shell cp "$DB-wal" "$DIR/copy-wal"
+SQL
+    cp "$DIR/backup" "$DB"
+    cp "$DIR/copy-wal" "$DB-wal"
+    run_tool doctor
+    [ "$status" -eq 5 ]
+    cmp "$DB" "$DIR/backup"
+}
+
+@test "findings come as JSON, and say what was repaired" {
+    deadline=1 a_row aaaaaaaa
+    deadline=0 a_row bbbbbbbb
+    local never='{"finding":"a deadline of 0 or less in 1 token (bbbbbbbb)","meaning":"there is no value for \"never\": the next purge deletes them","remedy":"update --ttl gives them time","repaired":false,"severity":"warning"}'
+    local old='{"finding":"expired for more than an hour: 1 token (aaaaaaaa)","meaning":"no program has called since, or its purges fail","remedy":"vemo-access-token purge","repaired":false,"severity":"warning"}'
+    run_tool doctor -o jsonl
+    expect 5 "$never
+$old"
+    chmod 0750 "$DB"
+    run_tool doctor -o json
+    [ "$status" -eq 5 ]
+    [ "$stderr" = "" ]
+    /usr/bin/python3 -c 'import json, sys
+findings = json.loads(sys.argv[1])
+assert findings[0] == {"severity": "error", "finding": sys.argv[4] + " has mode 0750", "repaired": False,
+                       "meaning": "others than root can use it, and ids are credentials",
+                       "remedy": "chmod 0700 " + sys.argv[4]}
+assert findings[1:] == [json.loads(sys.argv[2]), json.loads(sys.argv[3])]' "$output" "$never" "$old" "$REAL_DB"
+    chmod 0700 "$DB"
+    run_tool doctor --repair --output jsonl
+    expect 5 "${old/false/true}
+$never"
+    sql "DELETE FROM token"
+    deadline=1 a_row aaaaaaaa
+    run_tool doctor --repair -o jsonl
+    expect 0 "${old/false/true}"
+}
+
+@test "control characters of a finding are made visible" {
+    deadline=1 a_row $'a\e[31mb'
+    run_tool doctor
+    [ "${lines[0]}" = 'warning: expired for more than an hour: 1 token (a\x1b[31mb)' ]
+}
+
+@test "doctor colours its findings on a terminal, but not with NO_COLOR" {
+    deadline=1 a_row aaaaaaaa
+    chmod 0750 "$DB"
+    local on_terminal='
+import pexpect, sys
+child = pexpect.spawn(sys.argv[1], sys.argv[2:], timeout=30)
+child.expect(pexpect.EOF)
+child.wait()
+sys.stdout.buffer.write(child.before.replace(b"\r\n", b"\n"))'
+    run /usr/bin/python3 -c "$on_terminal" "$TOOL" doctor
+    [ "${lines[0]}" = $'\e[31merror\e[0m: '"$REAL_DB has mode 0750" ]
+    [ "${lines[3]}" = $'\e[33mwarning\e[0m: expired for more than an hour: 1 token (aaaaaaaa)' ]
+    NO_COLOR=1 run /usr/bin/python3 -c "$on_terminal" "$TOOL" doctor
+    [ "${lines[0]}" = "error: $REAL_DB has mode 0750" ]
+    run /usr/bin/python3 -c "$on_terminal" "$TOOL" doctor --repair
+    [ "${lines[0]}" = $'\e[32mrepaired\e[0m: '"$REAL_DB has mode 0750" ]
+}
+
+@test "bad arguments of doctor end in a sentence that names them" {
+    a_row aaaaaaaa
+    local arguments sentence
+    while IFS='|' read -r arguments sentence; do
+        run_tool doctor $arguments
+        expect 2 "" "vemo-access-token: $sentence"
+    done <<'TABLE'
+-o xml|--output: "xml" is no form: table, json or jsonl
+--fix|The following argument was not expected: --fix
+aaaaaaaa|The following argument was not expected: aaaaaaaa
+TABLE
+}
+
+@test "doctor's result that cannot be written is no success" {
+    a_row aaaaaaaa
+    run --separate-stderr bash -c '"$0" doctor >/dev/full' "$TOOL"
+    expect 4 "" "vemo-access-token: cannot write the result: No space left on device"
+}

@@ -1,0 +1,124 @@
+#!/usr/bin/env bats
+# init
+
+load common
+
+TABLE_COLUMNS="tid TEXT primary key NOT NULL,bind_sid TEXT,uid INTEGER,deadline INTEGER default -1,count INTEGER default 1,create_time INTEGER default CURRENT_TIMESTAMP,function TEXT NOT NULL,webapi_allow TEXT,extra TEXT"
+
+# expect_complete: directory, file and table are there, as programs expect them
+expect_complete()
+{
+    [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" | xargs)" = "700 700" ]
+    [ "$(sql "SELECT sql FROM sqlite_schema WHERE name = 'token'")" = "CREATE TABLE token ($TABLE_COLUMNS)" ]
+    [ "$(sql "PRAGMA auto_vacuum")" -eq 1 ] # FULL
+    [ "$(ls -A "$VEMO_REDIRECT_DIR")" = vemo-access-token.db ]
+}
+
+@test "init makes the directory, the file and the table, and finds them the next time" {
+    run_tool init
+    expect 0 "made the directory ${REAL_DB%/*}
+made the file $REAL_DB
+made the table of tokens"
+    expect_complete
+    cp "$DB" "$DIR/made"
+    run_tool init
+    expect 0 "all was there already"
+    cmp "$DB" "$DIR/made"
+    run_tool doctor
+    expect 0 "no findings"
+}
+
+@test "the modes are those of private files whatever the umask" {
+    local mask
+    for mask in 0000 0077 0277 0777; do
+        rm -rf "$VEMO_REDIRECT_DIR"
+        run --separate-stderr bash -c 'umask "$1" && "$0" init' "$TOOL" "$mask"
+        [ "$status" -eq 0 ]
+        expect_complete
+    done
+}
+
+@test "init makes the file where there is only the directory, which stays as it is" {
+    mkdir -m 0750 "$VEMO_REDIRECT_DIR"
+    run_tool init
+    expect 0 "made the file $REAL_DB
+made the table of tokens"
+    [ "$(stat -c %a "$VEMO_REDIRECT_DIR")" = 750 ]
+    chmod 0700 "$VEMO_REDIRECT_DIR"
+    expect_complete
+}
+
+@test "init makes the table in a file that has none" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    install -m 0700 /dev/null "$DB"
+    run_tool init
+    expect 0 "made the table of tokens"
+    expect_complete
+    rm "$DB"
+    sql "CREATE TABLE other (a); INSERT INTO other VALUES (1)"
+    run_tool init
+    expect 0 "made the table of tokens"
+    [ "$(sql "SELECT a FROM other")" -eq 1 ]
+    run_tool list --count
+    expect 0 0
+}
+
+@test "init leaves tokens alone, expired ones too" {
+    a_token
+    sql "UPDATE token SET deadline = 1"
+    run_tool init
+    expect 0 "all was there already"
+    [ "$(sql "SELECT count(*) FROM token")" -eq 1 ]
+}
+
+@test "init says what stands in its way, and leaves that" {
+    echo text >"$VEMO_REDIRECT_DIR"
+    run_tool init
+    expect 4 "" "vemo-access-token: $REAL_DB: Not a directory"
+    [ "$(cat "$VEMO_REDIRECT_DIR")" = text ]
+    rm "$VEMO_REDIRECT_DIR"
+
+    mkdir -p "$DB"
+    run_tool init
+    expect 4 "" "vemo-access-token: $REAL_DB is no regular file"
+    rmdir "$DB"
+
+    ln -s nowhere/x "$DB"
+    run_tool init
+    expect 4 "" "vemo-access-token: $REAL_DB is a symbolic link to a file that is not there"
+    rm "$DB"
+
+    echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
+    cp "$DB" "$DIR/text"
+    run_tool init
+    expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+    cmp "$DB" "$DIR/text"
+}
+
+@test "bad arguments of init end in a sentence that names them" {
+    run_tool init now
+    expect 2 "" "vemo-access-token: The following argument was not expected: now"
+    [ ! -e "$VEMO_REDIRECT_DIR" ]
+}
+
+@test "init makes the directories above, too, on the real path" {
+    [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
+    # In a namespace of its own, where a layer in memory lies over /usr.
+    local overlay='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
+        mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr'
+    mkdir "$DIR/layer"
+    local namespace=(unshare --user --map-root-user --mount)
+    "${namespace[@]}" bash -c "$overlay" "$DIR/layer" 2>/dev/null || skip "no namespace with an overlay here"
+    run --separate-stderr "${namespace[@]}" bash -c "unset VEMO_REDIRECT_DIR; umask 0022; $overlay"' && "$1" init &&
+        stat -c %a /usr/vemo /usr/vemo/etc /usr/vemo/etc/private /usr/vemo/etc/private/session && "$1" init &&
+        "$1" doctor' "$DIR/layer" "$TOOL"
+    expect 0 "made the directory ${REAL_DB%/*}
+made the file $REAL_DB
+made the table of tokens
+755
+755
+755
+700
+all was there already
+no findings"
+}

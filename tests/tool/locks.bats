@@ -1,0 +1,344 @@
+#!/usr/bin/env bats
+# Locks that other programs hold: what took effect after waiting is reported as done, and what did not
+# changed nothing
+
+load common
+
+EXCLUSIVE="BEGIN EXCLUSIVE;"
+WRITING="BEGIN IMMEDIATE;"
+# What a reader has open stands in the way when a change is committed, not when it begins.
+READING="BEGIN; SELECT count(*) FROM token;"
+
+# lock STATEMENTS: another process executes them and keeps the lock that they take, until stream 7 tells it
+# to commit and go
+lock()
+{
+    rm -f "$DIR/to-holder" "$DIR/from-holder"
+    mkfifo "$DIR/to-holder" "$DIR/from-holder"
+    sqlite3 "$DB" <"$DIR/to-holder" >"$DIR/from-holder" 3>&- &
+    HOLDER=$!
+    exec 7>"$DIR/to-holder" 8<"$DIR/from-holder"
+    echo "$1 SELECT 'held';" >&7
+    local line=
+    until [ "$line" = held ]; do
+        read -r -t 20 -u 8 line
+    done
+}
+
+# unlock: ends that process
+unlock()
+{
+    exec 7>&- 8<&-
+    wait "$HOLDER"
+}
+
+# run_waiting TIMES ARGUMENTS...: runs the tool, and lets go of the lock when it has waited that often.
+# Fails when it has not waited.
+run_waiting()
+{
+    local times=$1 watcher
+    shift
+    rm -f "$DIR/waits" "$DIR/waited"
+    mkfifo "$DIR/waits"
+    exec 9<>"$DIR/waits" # open for reading before the tool writes
+    {
+        for ((i = 0; i < times; ++i)); do
+            read -r -u 9
+        done
+        touch "$DIR/waited"
+        printf 'COMMIT;\n.quit\n' >&7
+    } 3>&- &
+    watcher=$!
+    VEMO_TEST_WAITS=$DIR/waits run_tool "$@"
+    [ -e "$DIR/waited" ] || {
+        kill "$watcher"
+        echo "did not wait $times times: $*; status $status, $stderr"
+        return 1
+    }
+    wait "$watcher"
+    exec 9>&-
+    unlock
+}
+
+# a_store: a token with five uses, $ID, and an expired one; $DIR/other holds a third that is not in it
+a_store()
+{
+    ID=$(a_token --allow Api:get --uses 5 --ttl 90m) # for half an hour, it will show "in 1 h"
+    tool export "$DIR/other" 2>/dev/null
+    sed -i 's/"tid":"......../"tid":"________/' "$DIR/other"
+    sql "INSERT INTO token SELECT 'old' || tid, 'old', uid, strftime('%s', 'now') - 5400, count, create_time, function,
+         webapi_allow, extra FROM token"
+}
+
+# stored: uses and session of each token
+stored()
+{
+    sql "SELECT group_concat(count || '/' || bind_sid, ' ') FROM (SELECT * FROM token ORDER BY deadline, tid)"
+}
+
+@test "reading waits for a lock, and then tells what there is" {
+    a_store
+    local arguments expected
+    while read -r arguments; do
+        # shellcheck disable=SC2086 # several arguments
+        expected=$(tool $arguments 2>/dev/null)
+        lock "$EXCLUSIVE"
+        # shellcheck disable=SC2086
+        run_waiting 1 $arguments
+        expect 0 "$expected" "$([ "$arguments" != export ] || echo "vemo-access-token: 2 tokens exported")"
+    done <<TABLE
+list
+list --count
+show $ID
+check $ID Api get
+stats -o jsonl
+export
+purge --dry-run
+revoke --dry-run --all
+revoke --dry-run $ID
+TABLE
+    tool purge >/dev/null
+    lock "$EXCLUSIVE"
+    run_waiting 3 doctor
+    expect 0 "no findings"
+    lock "$EXCLUSIVE"
+    run_waiting 1 tune --dry-run
+    [ "$status" -eq 0 ]
+    [ "$stderr" = "" ]
+    [ "${lines[-1]}" = "would run: COMMIT" ]
+}
+
+@test "a change that had to wait is reported as done" {
+    a_store
+    [ "$(stored)" = "5/old 5/" ]
+    cp "$DB" "$DIR/before"
+    local arguments output_then stored_then kind times
+    while IFS='|' read -r arguments output_then stored_then; do
+        for kind in EXCLUSIVE READING; do
+            times=1
+            [ $kind = EXCLUSIVE ] || times=3
+            cp "$DIR/before" "$DB"
+            lock "${!kind}"
+            # shellcheck disable=SC2086
+            run_waiting $times $arguments
+            expect 0 "$output_then" && [ "$(stored)" = "$stored_then" ] || {
+                echo "of: $arguments, $kind; stored: $(stored)"
+                return 1
+            }
+        done
+    done <<TABLE
+grant $ID Api get|granted|4/
+grant $ID Api get --print-user|root|4/
+update $ID --uses 2 --bind-sid s|1 token updated|5/old 2/s
+revoke $ID|1 token revoked|5/old
+revoke $ID old$ID|2 tokens revoked|
+revoke --all --yes|2 tokens revoked|
+revoke --bind-sid old --yes|1 token revoked|5/
+purge|1 token purged|5/
+import $DIR/other|1 token imported|5/old 5/ 5/
+TABLE
+}
+
+@test "create prints the id of a token that had to wait" {
+    tool init
+    local kind
+    for kind in EXCLUSIVE READING; do
+        lock "${!kind}"
+        run_waiting 1 create --uid 0 --function VPN
+        [ "$status" -eq 0 ]
+        [ "$stderr" = "" ]
+        [ "$(sql "SELECT tid FROM token")" = "$output" ]
+        sql "DELETE FROM token"
+    done
+}
+
+@test "a refusal that had to wait is a refusal" {
+    a_store
+    lock "$EXCLUSIVE"
+    run_waiting 1 grant "$ID" Api put
+    expect 1 "" "vemo-access-token: refused: method not listed"
+    lock "$EXCLUSIVE"
+    run_waiting 1 check "$ID" Other
+    expect 1 "refused: API not listed"
+    lock "$EXCLUSIVE"
+    run_waiting 1 update unknown-token --uses 1
+    expect 3 "" "vemo-access-token: there is no such token"
+    lock "$EXCLUSIVE"
+    run_waiting 1 create --uid 0 --function VPN --tid "$ID"
+    expect 2 "" "vemo-access-token: --tid: there is a token with this id already"
+}
+
+@test "tuning that had to wait is done" {
+    a_store
+    local kind wanted
+    for kind in EXCLUSIVE WRITING READING; do
+        lock "${!kind}"
+        run_waiting 1 tune --wal
+        [ "$status" -eq 0 ]
+        [ "$stderr" = "" ]
+        [[ $(grep "^journal" <<<"$output") =~ ^journal\ +delete\ +wal$ ]]
+        [ "$(sql "PRAGMA journal_mode")" = wal ]
+        wanted="token_bind_sid token_deadline token_function"
+        [ "$(sql "SELECT group_concat(name, ' ') FROM (SELECT name FROM sqlite_schema
+                  WHERE name LIKE 'token\__%' ESCAPE '\' ORDER BY 1)")" = "$wanted" ]
+        lock "$WRITING"
+        run_waiting 1 tune --undo
+        [ "$status" -eq 0 ]
+        [ "$stderr" = "" ]
+        [ "$(sql "PRAGMA journal_mode; SELECT count(*) FROM sqlite_schema WHERE sql LIKE 'CREATE INDEX%'")" = "delete
+0" ]
+    done
+    [ "$(stored)" = "5/old 5/" ]
+}
+
+@test "reading does not wait for a change that is being prepared" {
+    a_store
+    lock "$WRITING"
+    VEMO_TEST_WAITS=$DIR/none run_tool list --count
+    expect 0 2
+    unlock
+    tool tune --wal >/dev/null
+    lock "$WRITING UPDATE token SET count = 7;"
+    run_tool show "$ID" --field count
+    expect 0 5
+    run_waiting 1 grant "$ID" Api get
+    expect 0 granted
+    [ "$(stored)" = 6/ ]
+    lock "$READING" # with the write-ahead journal, readers are in nobody's way
+    run_tool grant "$ID" Api get
+    unlock
+    expect 0 granted
+}
+
+@test "a lock that stays is a failure, and nothing was changed" {
+    a_store
+    # Beside it two stores that somebody reads all the time: there, it is the commit that fails.
+    cp -r "$VEMO_REDIRECT_DIR" "$DIR/second"
+    cp -r "$VEMO_REDIRECT_DIR" "$DIR/third"
+    lock "PRAGMA main.locking_mode = EXCLUSIVE; $EXCLUSIVE COMMIT;
+          ATTACH '$DIR/second/vemo-access-token.db' AS second; ATTACH '$DIR/third/vemo-access-token.db' AS third;
+          BEGIN; SELECT count(*) FROM second.token; SELECT count(*) FROM third.token;"
+    cp "$DB" "$DIR/before"
+    local arguments i=0 pids=()
+    while IFS='|' read -r _ _ arguments; do
+        {
+            [[ $arguments != second\ * ]] || export VEMO_REDIRECT_DIR=$DIR/second
+            # shellcheck disable=SC2086
+            "$TOOL" ${arguments#second } >"$DIR/out$i" 2>"$DIR/err$i" || echo $? >"$DIR/status$i"
+        } 3>&- &
+        pids+=($!)
+        i=$((i + 1))
+    done < <(locked_commands)
+    "$TOOL" doctor >"$DIR/doctor" 2>&1 3>&- || echo "status $?" >>"$DIR/doctor" &
+    pids+=($!)
+    chmod 0755 "$DIR/third"
+    VEMO_REDIRECT_DIR=$DIR/third "$TOOL" doctor --repair >"$DIR/repair" 2>"$DIR/reason" 3>&- || echo "status $?" >>"$DIR/repair" &
+    pids+=($!)
+    wait "${pids[@]}"
+    cmp "$DB" "$DIR/before"
+    cmp "$DIR/second/vemo-access-token.db" "$DIR/before"
+    cmp "$DIR/third/vemo-access-token.db" "$DIR/before"
+    unlock
+
+    local status_then more failed=0
+    i=0
+    while IFS='|' read -r status_then more arguments; do
+        status=$(cat "$DIR/status$i")
+        output=$(cat "$DIR/out$i")
+        stderr=$(cat "$DIR/err$i")
+        expect "$status_then" "" "vemo-access-token: $REAL_DB stayed locked by another process for 5 seconds$more" || {
+            echo "of: $arguments"
+            failed=1
+        }
+        i=$((i + 1))
+    done < <(locked_commands)
+    [ $failed -eq 0 ]
+
+    # doctor finds it, too. That the file be moved away is no remedy.
+    [ "$(head -n 1 "$DIR/doctor")" = "error: $REAL_DB stayed locked by another process for 5 seconds" ]
+    run cat "$DIR/doctor"
+    [ "${lines[-1]}" = "status 5" ]
+    [[ $output != *"move the file away"* ]]
+    # What was repaired before is told, and what was not is left.
+    run cat "$DIR/repair"
+    [ "${lines[0]}" = "repaired: ${REAL_DB%/*} has mode 0755" ]
+    [[ $output == *"
+warning: expired for more than an hour: 1 token (old${ID:0:5})
+"* ]]
+    [ "${lines[-1]}" = "status 5" ]
+    grep -q "$REAL_DB stayed locked by another process for 5 seconds" "$DIR/reason"
+}
+
+# locked_commands: status, end of the sentence, arguments; on the second store where they begin so
+locked_commands()
+{
+    cat <<TABLE
+4||list
+4||show $ID
+4||check $ID Api get
+4||stats
+4||export
+4||revoke --all --dry-run
+4||purge --dry-run
+4||tune --dry-run
+4|; nothing was changed|create --uid 0 --function VPN
+4|; nothing was changed|grant $ID Api get
+4|; nothing was changed|update $ID --uses 1
+4|; nothing was changed|revoke $ID
+4|; nothing was changed|revoke --all --yes
+4|; nothing was changed|purge
+4|; nothing was changed|import $DIR/other
+4|; nothing was changed|init
+4|; nothing was changed|tune
+4|; nothing was changed|tune --wal
+4|; nothing was changed|second grant $ID Api get
+TABLE
+}
+
+@test "several creations at once, where there is no database yet, all succeed" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    local i pids=()
+    for i in 1 2 3 4 5 6; do
+        "$TOOL" create --uid 0 --function VPN >"$DIR/out$i" 2>"$DIR/err$i" 3>&- &
+        pids+=($!)
+    done
+    for i in "${pids[@]}"; do
+        wait "$i"
+    done
+    [ "$(cat "$DIR"/err*)" = "" ]
+    [ "$(sql "SELECT tid FROM token ORDER BY 1")" = "$(LC_ALL=C sort "$DIR"/out*)" ]
+}
+
+@test "several grants at once spend one use each" {
+    local id i pids=() granted refused
+    id=$(a_token --allow Api:get --uses 3)
+    for i in 1 2 3 4 5 6 7 8; do
+        { "$TOOL" grant "$id" Api get >"$DIR/out$i" 2>&1 || echo "status $?" >>"$DIR/out$i"; } 3>&- &
+        pids+=($!)
+    done
+    wait "${pids[@]}"
+    granted=$(grep -lx granted "$DIR"/out* | wc -l)
+    refused=$(grep -lx "vemo-access-token: refused: unknown token" "$DIR"/out* | wc -l)
+    [ "$granted" -eq 3 ]
+    [ "$refused" -eq 5 ]
+    [ "$(grep -lx "status 1" "$DIR"/out* | wc -l)" -eq 5 ]
+    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
+}
+
+@test "of several that revoke a token at once, one has revoked it" {
+    local id i pids=()
+    id=$(a_token)
+    for i in 1 2 3 4; do
+        "$TOOL" revoke "$id" >"$DIR/out$i" 2>&1 3>&- &
+        pids+=($!)
+    done
+    for i in 5 6 7 8; do
+        "$TOOL" create --uid 0 --function VPN >"$DIR/out$i" 2>&1 3>&- &
+        pids+=($!)
+    done
+    for i in "${pids[@]}"; do
+        wait "$i" # each has succeeded
+    done
+    [ "$(sort "$DIR"/out[1-4] | uniq -c | xargs)" = "3 0 tokens revoked 1 1 token revoked" ]
+    [ "$(sort "$DIR"/out[5-8])" = "$(sql "SELECT tid FROM token" | sort)" ]
+}

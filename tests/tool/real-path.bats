@@ -1,0 +1,185 @@
+#!/usr/bin/env bats
+# The tool as it ships, on the real path: as root, where /usr/vemo is a private file system in memory
+
+load common
+
+setup()
+{
+    [ "$(id -u)" -eq 0 ] || skip "needs root"
+    DIR=$BATS_TEST_TMPDIR
+    REAL_DB=/usr/vemo/etc/private/session/vemo-access-token.db
+    SESSION=${REAL_DB%/*}
+    PLAIN=$(realpath "$(dirname "$TOOL")/../../tools/vemo-access-token")
+    unset VEMO_REDIRECT_DIR NO_COLOR
+    export TZ=Europe/Berlin
+    umask 022
+    WAS_THERE=$([ ! -e /usr/vemo ] || stat -c '%i %y' /usr/vemo)
+    # The namespace lives as long as this process, which ends with its standard input.
+    mkfifo "$DIR/hold" "$DIR/ready"
+    "$BATS_TEST_DIRNAME/private-mount.sh" sh -c 'echo ready; exec cat' <"$DIR/hold" >"$DIR/ready" 2>"$DIR/reason" 3>&- &
+    HOLDER=$!
+    exec 7>"$DIR/hold"
+    local ready=
+    read -r -t 20 ready <"$DIR/ready" || true
+    [ "$ready" = ready ] || skip "$(cat "$DIR/reason")"
+}
+
+teardown()
+{
+    [ -n "${HOLDER-}" ] || return 0
+    exec 7>&-
+    wait "$HOLDER" || true
+    [ "$([ ! -e /usr/vemo ] || stat -c '%i %y' /usr/vemo)" = "$WAS_THERE" ]
+}
+
+# inside COMMAND...: in that namespace
+inside()
+{
+    nsenter --mount="/proc/$HOLDER/ns/mnt" -- "$@"
+}
+
+run_inside()
+{
+    run --separate-stderr nsenter --mount="/proc/$HOLDER/ns/mnt" -- "$PLAIN" "$@"
+}
+
+# owners_and_modes: of the database and the directories above
+owners_and_modes()
+{
+    inside stat -c '%n %u:%g %a %F' /usr/vemo/etc /usr/vemo/etc/private "$SESSION" "$REAL_DB" | sed "s,^/usr/vemo/,,"
+}
+
+SOUND="etc 0:0 755 directory
+etc/private 0:0 755 directory
+etc/private/session 0:0 700 directory
+etc/private/session/vemo-access-token.db 0:0 700 regular file"
+
+@test "on the real path a token goes from its creation to its last use" {
+    run_inside list
+    expect 4 "" "vemo-access-token: there is no directory $SESSION; \"vemo-access-token init\" makes it"
+    run_inside init
+    expect 0 "made the directory $SESSION
+made the file $REAL_DB
+made the table of tokens"
+    [ "$(owners_and_modes)" = "$SOUND" ]
+    run_inside create --user root --function VPN --allow Api:get --ttl 90m
+    [ "$status" -eq 0 ]
+    [ "$stderr" = "" ]
+    [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
+    local id=$output
+    run_inside list --no-header
+    [ "$status" -eq 0 ]
+    [[ $output =~ ^${id:0:8}\ \ root\ \ VPN\ +1\ \ [0-9]{4}-[0-9]{2}-[0-9]{2}\ [0-9:]{8}\ \ in\ 1\ h\ +Api:get$ ]]
+    run_inside check "${id:0:8}" Api get
+    expect 0 allowed
+    run_inside doctor
+    expect 0 "no findings"
+    run_inside grant "$id" Api get --print-user
+    expect 0 root
+    run_inside grant "$id" Api get
+    expect 1 "" "vemo-access-token: refused: unknown token"
+    run_inside list --count
+    expect 0 0
+    [ "$(inside ls -A "$SESSION")" = vemo-access-token.db ]
+    [ "$(owners_and_modes)" = "$SOUND" ]
+}
+
+@test "what init makes is private at any umask" {
+    local mask
+    for mask in 000 077; do
+        run --separate-stderr nsenter --mount="/proc/$HOLDER/ns/mnt" -- sh -c "umask $mask; exec \"\$@\"" - "$PLAIN" init
+        [ "$status" -eq 0 ]
+        [ "$(owners_and_modes | tail -n 2)" = "$(tail -n 2 <<<"$SOUND")" ]
+        [ "$(owners_and_modes | head -n 2 | grep -cE ' 0:0 7(55|00) ')" -eq 2 ]
+        run_inside doctor
+        expect 0 "no findings"
+        inside rm -r /usr/vemo/etc
+    done
+}
+
+@test "doctor finds wrong owners and modes, and repairs them" {
+    run_inside init
+    inside chown 65534 "$SESSION" "$REAL_DB"
+    inside chmod 0755 "$SESSION"
+    inside chmod 0640 "$REAL_DB"
+    local private="others than root can use it, and ids are credentials"
+    local owned="its owner can read and change every token"
+    run_inside doctor
+    expect 5 "error: $SESSION belongs to uid 65534
+    meaning: $owned
+    remedy: chown root $SESSION
+error: $SESSION has mode 0755
+    meaning: $private
+    remedy: chmod 0700 $SESSION
+error: $REAL_DB belongs to uid 65534
+    meaning: $owned
+    remedy: chown root $REAL_DB
+error: $REAL_DB has mode 0640
+    meaning: $private
+    remedy: chmod 0700 $REAL_DB"
+    run_inside doctor --repair
+    expect 0 "repaired: $SESSION belongs to uid 65534
+    meaning: $owned
+repaired: $SESSION has mode 0755
+    meaning: $private
+repaired: $REAL_DB belongs to uid 65534
+    meaning: $owned
+repaired: $REAL_DB has mode 0640
+    meaning: $private
+no findings"
+    [ "$(owners_and_modes)" = "$SOUND" ]
+    run_inside doctor
+    expect 0 "no findings"
+}
+
+@test "doctor finds directories above that others can write to, and leaves them alone" {
+    run_inside init
+    inside chown 65534 /usr/vemo/etc
+    inside chmod 0775 /usr/vemo/etc/private
+    run_inside doctor --repair
+    expect 5 "warning: /usr/vemo/etc/private belongs to uid 0 and has mode 0775
+    meaning: others than root can replace the private directory below it
+    remedy: chown root /usr/vemo/etc/private && chmod go-w /usr/vemo/etc/private
+warning: /usr/vemo/etc belongs to uid 65534 and has mode 0755
+    meaning: others than root can replace the private directory below it
+    remedy: chown root /usr/vemo/etc && chmod go-w /usr/vemo/etc"
+    [ "$(inside stat -c '%u %a' /usr/vemo/etc /usr/vemo/etc/private)" = "65534 755
+0 775" ]
+}
+
+@test "another effective uid than 0 is not enough, even for root" {
+    setpriv --reuid=65534 --clear-groups test -x "$PLAIN" || skip "uid 65534 cannot reach the build directory"
+    # As a program of mode 4755 would run it. But such a process cannot be traced, as the search for leaks must.
+    local arguments as=--euid=65534
+    ! ldd "$PLAIN" | grep -q libasan || as=--reuid=65534
+    for arguments in init "create --uid 0 --function VPN" list purge; do
+        # shellcheck disable=SC2086 # several arguments
+        run --separate-stderr nsenter --mount="/proc/$HOLDER/ns/mnt" -- setpriv "$as" "$PLAIN" $arguments
+        expect 4 "" "vemo-access-token: only root may do this: the token database belongs to root, and the effective uid is 65534"
+    done
+    run --separate-stderr nsenter --mount="/proc/$HOLDER/ns/mnt" -- setpriv "$as" "$PLAIN" doctor
+    expect 5 "error: not run as root: the effective uid is 65534
+    meaning: the database belongs to root and cannot be looked at
+    remedy: run doctor as root"
+    [ "$(inside ls -A /usr/vemo)" = "" ]
+}
+
+@test "a disk that is full or may not be written to is a failure, and nothing was changed" {
+    run_inside init
+    run_inside create --uid 0 --function VPN --allow Api:get
+    local id=$output
+    inside cp "$REAL_DB" "$DIR/before"
+    inside mount -t tmpfs -o mode=0700,size=48k tmpfs "$SESSION"
+    inside cp -p "$DIR/before" "$REAL_DB"
+    inside cmp "$REAL_DB" "$DIR/before"
+    printf '{"data": "%0100000d"}' 0 >"$DIR/large"
+    run_inside create --uid 0 --function VPN --extra "@$DIR/large"
+    expect 4 "" "vemo-access-token: $REAL_DB failed: database or disk is full"
+    run_inside list --count
+    expect 0 1
+    inside mount -o remount,ro "$SESSION"
+    run_inside grant "$id" Api get
+    expect 4 "" "vemo-access-token: $REAL_DB failed: attempt to write a readonly database"
+    run_inside show "$id" --field count
+    expect 0 1
+}

@@ -1,0 +1,220 @@
+#!/usr/bin/env bats
+# stats
+
+load common
+
+# Tokens of several purposes and owners: two expired, two without limit.
+some_tokens()
+{
+    tool init >/dev/null
+    sql "INSERT INTO token VALUES
+         ('a', '', 0,          9999999999, -1, 0, 'VPN',  '{}', '{}'),
+         ('b', '', 4000000000, 1,          -5, 0, 'Mail', '{}', '{}'),
+         ('c', '', 0,          -1,          1, 0, 'VPN',  '{}', '{}'),
+         ('d', '', 0,          9999999999,  0, 0, 'Web',  '{}', '{}')"
+}
+
+# check_metrics: the result holds nothing but comments and samples of the exposition format, a family's
+# samples below its type, no sample twice, in UTF-8
+check_metrics()
+{
+    /usr/bin/python3 -c '
+import re, sys
+text = sys.stdin.buffer.read().decode("utf-8", "strict")
+label = r"[a-z_]+=\"(?:[^\"\\\n]|\\[\\\"n])*\""
+family, families, samples = None, set(), set()
+assert text.endswith("\n")
+for line in text[:-1].split("\n"):
+    comment = re.fullmatch(r"# (HELP|TYPE) ([a-z_]+) (.+)", line)
+    sample = re.fullmatch(r"([a-z_]+)((?:\{%s(?:,%s)*\})?) \d+" % (label, label), line)
+    assert comment or sample, line
+    if comment and comment[1] == "TYPE":
+        assert comment[3] == "gauge" and comment[2] not in families, line
+        family = comment[2]
+        families.add(family)
+    if sample:
+        assert sample[1] == family and sample[1] + sample[2] not in samples, line
+        samples.add(sample[1] + sample[2])'
+}
+
+@test "stats counts tokens by purpose and by owner, and measures the file" {
+    some_tokens
+    run_tool stats
+    expect 0 "STORE                     NUMBER
+tokens                         4
+expired                        2
+unlimited uses                 2
+file size in bytes         16384
+free pages of 4096 bytes       0
+
+FUNCTION  TOKENS
+VPN            2
+Mail           1
+Web            1
+
+       UID  USER  TOKENS
+         0  root       3
+4000000000             1"
+    [ "$(stat -c %s "$DB")" -eq 16384 ]
+    # What is expired is counted, not purged.
+    [ "$(sql "SELECT count(*) FROM token")" -eq 4 ]
+}
+
+@test "stats --no-header leaves the titles out" {
+    some_tokens
+    run_tool stats --no-header
+    expect 0 "tokens                         4
+expired                        2
+unlimited uses                 2
+file size in bytes         16384
+free pages of 4096 bytes       0
+
+VPN            2
+Mail           1
+Web            1
+
+         0  root       3
+4000000000             1"
+}
+
+@test "stats -o json and jsonl tell the same" {
+    some_tokens
+    run_tool stats -o jsonl
+    expect 0 '{"expired":2,"file_bytes":16384,"free_pages":0,"functions":[{"function":"VPN","tokens":2},{"function":"Mail","tokens":1},{"function":"Web","tokens":1}],"page_bytes":4096,"tokens":4,"unlimited":2,"users":[{"tokens":3,"uid":0,"user":"root"},{"tokens":1,"uid":4000000000,"user":""}]}'
+    local line=$output
+    run_tool stats --output json
+    [ "$status" -eq 0 ]
+    [ "${lines[0]}" = "{" ]
+    [ "${lines[1]}" = '  "expired" : 2,' ]
+    [ "$(tr -d ' \n' <<<"$output")" = "$line" ]
+    run_tool stats -o table
+    [ "${lines[0]}" = "STORE                     NUMBER" ]
+}
+
+@test "stats --prometheus gives metrics" {
+    some_tokens
+    run_tool stats --prometheus
+    expect 0 '# HELP vemo_access_token_tokens Tokens in the store.
+# TYPE vemo_access_token_tokens gauge
+vemo_access_token_tokens 4
+# HELP vemo_access_token_expired_tokens Tokens whose deadline has passed.
+# TYPE vemo_access_token_expired_tokens gauge
+vemo_access_token_expired_tokens 2
+# HELP vemo_access_token_unlimited_tokens Tokens with any number of uses.
+# TYPE vemo_access_token_unlimited_tokens gauge
+vemo_access_token_unlimited_tokens 2
+# HELP vemo_access_token_database_bytes Size of the database file.
+# TYPE vemo_access_token_database_bytes gauge
+vemo_access_token_database_bytes 16384
+# HELP vemo_access_token_database_free_pages Unused pages of the database file.
+# TYPE vemo_access_token_database_free_pages gauge
+vemo_access_token_database_free_pages 0
+# HELP vemo_access_token_database_page_bytes Size of a page of the database file.
+# TYPE vemo_access_token_database_page_bytes gauge
+vemo_access_token_database_page_bytes 4096
+# HELP vemo_access_token_function_tokens Tokens by the purpose they were made for.
+# TYPE vemo_access_token_function_tokens gauge
+vemo_access_token_function_tokens{function="VPN"} 2
+vemo_access_token_function_tokens{function="Mail"} 1
+vemo_access_token_function_tokens{function="Web"} 1
+# HELP vemo_access_token_user_tokens Tokens by the user who owns them.
+# TYPE vemo_access_token_user_tokens gauge
+vemo_access_token_user_tokens{uid="0",user="root"} 3
+vemo_access_token_user_tokens{uid="4000000000",user=""} 1'
+    tool stats --prometheus | check_metrics
+}
+
+@test "what a purpose may hold is escaped in each form" {
+    some_tokens
+    sql "UPDATE token SET uid = 0, function = 'a\"b\\c' || char(10) || 'd' || char(9) || 'é\\n'"
+    run_tool stats --prometheus
+    [[ $output == *$'\nvemo_access_token_function_tokens{function="a\\"b\\\\c\\nd\té\\\\n"} 4\n'* ]]
+    tool stats --prometheus | check_metrics
+    run_tool stats -o jsonl
+    [[ $output == *'"functions":[{"function":"a\"b\\c\nd\té\\n","tokens":4}]'* ]]
+    LC_ALL=C.UTF-8 run_tool stats --no-header
+    [ "${lines[5]}" = 'a"b\c\x0ad\x09é\n       4' ]
+}
+
+# Of one bad sample, the collector refuses the whole file.
+
+@test "metrics stay valid where a purpose is no valid UTF-8" {
+    some_tokens
+    # Stray bytes, half a surrogate pair, and beyond the last code point; two purposes stay two.
+    sql "UPDATE token SET function = CAST(CASE tid WHEN 'a' THEN x'61ff62' WHEN 'b' THEN x'61fe62' WHEN 'c' THEN x'eda080'
+         ELSE x'f4908080' END AS TEXT)"
+    tool stats --prometheus | check_metrics
+}
+
+@test "metrics stay valid where owners are no numbers" {
+    some_tokens
+    sql "UPDATE token SET uid = iif(tid = 'b', NULL, iif(tid = 'c', 'x', 0)), function = 'VPN'"
+    tool stats --prometheus | check_metrics
+}
+
+@test "a number that no user can have is no user's" {
+    some_tokens
+    sql "UPDATE token SET uid = iif(tid = 'a', 4294967296, -1)"
+    run_tool stats -o jsonl
+    [[ $output == *'"users":[{"tokens":3,"uid":-1,"user":""},{"tokens":1,"uid":4294967296,"user":""}]}' ]]
+}
+
+@test "stats tells of free pages and of the size that the file has" {
+    some_tokens
+    sql "PRAGMA auto_vacuum = NONE; VACUUM; UPDATE token SET extra = hex(zeroblob(20000));
+         UPDATE token SET extra = '{}'"
+    local free size
+    free=$(sql "PRAGMA freelist_count")
+    size=$(stat -c %s "$DB")
+    [ "$free" -gt 30 ]
+    run_tool stats -o jsonl
+    [[ $output == *"\"file_bytes\":$size,\"free_pages\":$free,"* ]]
+    tool stats --prometheus | grep -qx "vemo_access_token_database_free_pages $free"
+    tool stats --prometheus | grep -qx "vemo_access_token_database_bytes $size"
+}
+
+@test "stats of a store without tokens" {
+    tool init
+    run_tool stats
+    expect 0 "STORE                     NUMBER
+tokens                         0
+expired                        0
+unlimited uses                 0
+file size in bytes         16384
+free pages of 4096 bytes       0"
+    run_tool stats -o jsonl
+    expect 0 '{"expired":0,"file_bytes":16384,"free_pages":0,"functions":[],"page_bytes":4096,"tokens":0,"unlimited":0,"users":[]}'
+    tool stats --prometheus | check_metrics
+}
+
+@test "bad arguments of stats end in a sentence that names them" {
+    some_tokens
+    local arguments sentence
+    while IFS='|' read -r arguments sentence; do
+        run_tool stats $arguments
+        expect 2 "" "vemo-access-token: $sentence"
+    done <<'TABLE'
+-o xml|--output: "xml" is no form: table, json or jsonl
+--prometheus -o json|--prometheus excludes --output
+VPN|The following argument was not expected: VPN
+TABLE
+}
+
+@test "stats never takes an unusable store for an empty one" {
+    local arguments
+    for arguments in "" "-o json" "--prometheus"; do
+        run_tool stats $arguments
+        expect 4 "" "vemo-access-token: there is no directory ${REAL_DB%/*}; \"vemo-access-token init\" makes it"
+        mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+        run_tool stats $arguments
+        expect 4 "" "vemo-access-token: there is no database $REAL_DB; \"vemo-access-token init\" makes it"
+        [ ! -e "$DB" ]
+        : >"$DB"
+        run_tool stats $arguments
+        expect 4 "" "vemo-access-token: $REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
+        echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
+        run_tool stats $arguments
+        expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+        rm -r "$VEMO_REDIRECT_DIR"
+    done
+}

@@ -1,0 +1,399 @@
+#!/usr/bin/env bats
+# What is different on a terminal: hidden prompts, questions, colours, the width of tables, progress bars
+
+load common
+
+ESC=$'\e'
+
+setup_file()
+{
+    export LC_ALL=C.UTF-8
+}
+
+# on_terminal [OPTIONS OF terminal.py...] -- ARGUMENTS...: the tool, with all streams on a terminal
+on_terminal()
+{
+    local options=()
+    while [ "$1" != -- ]; do
+        options+=("$1")
+        shift
+    done
+    shift
+    run --separate-stderr "$BATS_TEST_DIRNAME/terminal.py" --modes "$DIR/modes" "${options[@]}" "$TOOL" "$@"
+}
+
+# sh_on_terminal [OPTIONS OF terminal.py...] -- SCRIPT ARGUMENTS...: the same through a shell, for
+# redirections; the tool is $0 in the script
+sh_on_terminal()
+{
+    local options=()
+    while [ "$1" != -- ]; do
+        options+=("$1")
+        shift
+    done
+    local script=$2
+    shift 2
+    run --separate-stderr "$BATS_TEST_DIRNAME/terminal.py" --modes "$DIR/modes" "${options[@]}" \
+        sh -c "$script" "$TOOL" "$@"
+}
+
+tokens()
+{
+    sql "SELECT count(*) FROM token"
+}
+
+# below TITLE: all that stands below a title of the table in $output, joined, without blanks
+below()
+{
+    awk -v title="$1" '
+        NR == 1 {
+            start = index($0, title)
+            next_title = substr($0, start + length(title))
+            match(next_title, /^ */)
+            width = RLENGTH < length(next_title) ? length(title) + RLENGTH : 10000
+            next
+        }
+        { cells = cells substr($0, start, width) }
+        END { gsub(/ /, "", cells); print cells }' <<<"$output"
+}
+
+@test "an id is asked for, and not shown" {
+    local id shown arguments
+    id=$(a_token --allow Api --unlimited)
+    while IFS='|' read -r arguments shown; do
+        # shellcheck disable=SC2086 # several arguments
+        on_terminal --answer "Token id: " "$id"$'\r' -- $arguments
+        expect 0 "Token id: 
+$shown"
+        [ "$(cat "$DIR/modes")" = "typed: hidden
+modes: as before" ]
+    done <<'TABLE'
+show - --field function|VPN
+check - Api|allowed
+grant - Api|granted
+update - --bind-sid s|1 token updated
+revoke -|1 token revoked
+TABLE
+    on_terminal --answer "Token id: " "$id"$'\r' -- create --uid 0 --function TAG --tid -
+    expect 0 "Token id: 
+$id" # the result
+    [ "$(sql "SELECT tid, function FROM token")" = "$id|TAG" ]
+}
+
+@test "a prompt can be left with nothing" {
+    a_token >"$DIR/id"
+    local reply
+    for reply in $'\r' $'\x04'; do
+        on_terminal --answer "Token id: " "$reply" -- show -
+        expect 2 "Token id: 
+vemo-access-token: TID: there is no id on standard input"
+        [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
+    done
+}
+
+@test "Ctrl-C at a prompt or a question leaves the terminal and the tokens as they were" {
+    a_token >"$DIR/id"
+    on_terminal --answer "Token id: " "$(cut -c1-20 "$DIR/id")"$'\x03' -- revoke -
+    [ "$status" -eq 130 ]
+    [ "$output" = "Token id: " ]
+    [ "$(cat "$DIR/modes")" = "typed: hidden
+modes: as before" ]
+    on_terminal --answer "[y/N] " $'\x03' -- revoke --all
+    [ "$status" -eq 130 ]
+    [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
+    [ "$(tokens)" -eq 1 ]
+}
+
+@test "the prompt does not get into the result, and ids from a pipe need none" {
+    local id
+    id=$(a_token --allow Api)
+    sh_on_terminal --answer "Token id: " "$id"$'\r' -- '"$0" check - Api >"$1"' "$DIR/result"
+    expect 0 "Token id: "
+    [ "$(cat "$DIR/result")" = allowed ]
+    sh_on_terminal -- 'echo "$1" | "$0" check - Api' "$id"
+    expect 0 allowed
+}
+
+@test "many tokens are revoked when the answer is yes" {
+    local reply selection
+    for reply in y yes; do
+        for selection in --all "--function VPN" "--uid 0" "--user root" "--bind-sid s"; do
+            a_token --bind-sid s >"$DIR/id"
+            a_token --bind-sid s >"$DIR/id"
+            # shellcheck disable=SC2086
+            on_terminal --answer "Revoke 2 tokens? [y/N] " "$reply"$'\r' -- revoke $selection
+            expect 0 "Revoke 2 tokens? [y/N] $reply
+2 tokens revoked"
+            [ "$(tokens)" -eq 0 ]
+        done
+    done
+}
+
+@test "many tokens are left alone at any other answer" {
+    a_token >"$DIR/id"
+    local reply
+    for reply in n no '' yep Ye ' '; do
+        on_terminal --answer "Revoke 1 token? [y/N] " "$reply"$'\r' -- revoke --all
+        expect 0 "Revoke 1 token? [y/N] $reply
+0 tokens revoked"
+    done
+    on_terminal --answer "Revoke 1 token? [y/N] " $'\x04' -- revoke --all
+    [ "$status" -eq 0 ]
+    [ "${lines[-1]}" = "0 tokens revoked" ] # on a line of its own
+    [ "$(tokens)" -eq 1 ]
+}
+
+@test "nothing is asked where it is clear, or nobody to ask" {
+    local id
+    id=$(a_token)
+    on_terminal -- revoke --all --dry-run
+    expect 0 "1 token would be revoked"
+    on_terminal -- revoke --function Other
+    expect 0 "0 tokens revoked"
+    sh_on_terminal -- '"$0" revoke --all </dev/null'
+    expect 2 "vemo-access-token: --yes is needed to revoke many where there is nobody to ask"
+    sh_on_terminal -- '"$0" revoke --all 2>"$1"' "$DIR/stderr"
+    expect 2 ""
+    [ "$(cat "$DIR/stderr")" = "vemo-access-token: --yes is needed to revoke many where there is nobody to ask" ]
+    [ "$(tokens)" -eq 1 ]
+    on_terminal -- revoke "$id"
+    expect 0 "1 token revoked"
+    a_token >"$DIR/id"
+    on_terminal -- revoke --all --yes
+    expect 0 "1 token revoked"
+    a_token >"$DIR/id"
+    sh_on_terminal --answer "[y/N] " $'y\r' -- '"$0" revoke --all >"$1"' "$DIR/result"
+    expect 0 "Revoke 1 token? [y/N] y"
+    [ "$(cat "$DIR/result")" = "1 token revoked" ]
+}
+
+@test "expired tokens are red" {
+    local id expired
+    id=$(a_token --ttl 90m | cut -c1-8)
+    expired=$(a_token | cut -c1-8)
+    # Both times are half an hour from showing otherwise.
+    sql "UPDATE token SET deadline = strftime('%s', 'now') - 5400 WHERE tid LIKE '$expired%'"
+
+    on_terminal --columns 200 -- list --no-header --epoch
+    [ "$status" -eq 0 ]
+    [ "${#lines[@]}" -eq 2 ]
+    [[ ${lines[0]} == "${ESC}[31m$expired  root  VPN "*"${ESC}[0m" ]]
+    [[ ${lines[1]} == "$id  root  VPN "* ]]
+    [[ ${lines[1]} != *"$ESC"* ]]
+    local coloured=$output
+    on_terminal --columns 200 -- list --no-header --epoch --verbose
+    expect 0 "$coloured"
+    on_terminal --columns 400 -- show "$expired" --no-header
+    [ "$(grep -c "$ESC" <<<"$output")" -eq 1 ]
+    [[ $(grep "$ESC" <<<"$output") == "${ESC}[31mdeadline "* ]]
+
+    # In all other cases there are no colours.
+    on_terminal --columns 400 -- show "$id"
+    [[ $output != *"$ESC"* ]]
+    on_terminal -- list -o json
+    [ "$status" -eq 0 ]
+    [[ $output != *"$ESC"* ]]
+    sh_on_terminal -- '"$0" list --no-header --epoch >"$1"' "$DIR/result"
+    expect 0 ""
+    sh_on_terminal -- '"$0" list --no-header --epoch --verbose >"$1"' "$DIR/result-verbose"
+    expect 0 ""
+    cmp "$DIR/result" "$DIR/result-verbose"
+    [ "$(cat "$DIR/result")" = "$(tool list --no-header --epoch)" ]
+    [[ $(cat "$DIR/result") != *"$ESC"* ]]
+    NO_COLOR=1 on_terminal --columns 200 -- list --no-header --epoch
+    expect 0 "$(sed "s/$ESC\[[0-9]*m//g" <<<"$coloured")"
+    NO_COLOR= on_terminal --columns 200 -- list --no-header --epoch # as if it were not set
+    expect 0 "$coloured"
+}
+
+@test "doctor's marks are coloured" {
+    a_token >"$DIR/id"
+    local id
+    id=$(cut -c1-8 "$DIR/id")
+    sql "UPDATE token SET deadline = 0"
+    chmod 0755 "$VEMO_REDIRECT_DIR"
+    NO_COLOR=1 on_terminal -- doctor
+    [ "$status" -eq 5 ]
+    [ "$(grep -v '^ ' <<<"$output")" = "error: ${REAL_DB%/*} has mode 0755
+warning: a deadline of 0 or less in 1 token ($id)" ]
+    NO_COLOR= on_terminal -- doctor
+    [ "$status" -eq 5 ]
+    [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[31merror${ESC}[0m: ${REAL_DB%/*} has mode 0755
+${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
+    on_terminal -- doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[32mrepaired${ESC}[0m: ${REAL_DB%/*} has mode 0755
+${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
+    sh_on_terminal -- '"$0" doctor >"$1"' "$DIR/result"
+    expect 5 ""
+    [[ $(cat "$DIR/result") == "warning: "* ]]
+}
+
+@test "long values go on in the next line, and lose nothing" {
+    local id function session allow
+    function=$(printf 'function-%.0s' {1..10})
+    session=$(printf 'session-%.0s' {1..8})
+    allow=Example.$(printf 'Long%.0s' {1..20}):get,list,$(printf 'put%.0s' {1..20})
+    tool init
+    id=$(tool create --uid 0 --function "$function" --bind-sid "$session" --allow "$allow" --allow Api)
+    on_terminal --columns 60 -- list --show-ids
+    [ "$status" -eq 0 ]
+    [ "${#lines[@]}" -gt 10 ]
+    [ "$(below TID)" = "$id" ]
+    [ "$(below FUNCTION)" = "$function" ]
+    [ "$(below SESSION)" = "$session" ]
+    [ "$(below ALLOWS)" = "Api$allow" ]
+    on_terminal --columns 60 -- show "$id"
+    [ "$status" -eq 0 ]
+    [ "$(awk 'length > 60' <<<"$output")" = "" ]
+    local values
+    values=$(below VALUE)
+    [[ $values == "$id$session"0* ]]
+    [[ $values == *"$function$(tool show "$id" --field webapi_allow){}" ]]
+}
+
+@test "wide characters lose nothing either" {
+    tool init
+    tool create --uid 0 --function "$(printf '日本%.0s' {1..40})" --bind-sid "$(printf 'ü%.0s' {1..70})" >/dev/null
+    on_terminal --columns 60 -- list
+    [ "$(grep -o 日本 <<<"$(tr -d ' \n' <<<"$output")" | wc -l)" -eq 40 ]
+    [ "$(grep -o ü <<<"$output" | wc -l)" -eq 70 ]
+}
+
+# They are what is copied or compared; other columns can give way.
+@test "short values are not broken for the sake of long ones" {
+    local id
+    id=$(a_token --allow "$(printf 'Example.Long%.0s' {1..20})" --bind-sid "$(printf 's%.0s' {1..100})")
+    on_terminal --columns 100 -- list --utc
+    [[ ${lines[1]} =~ ^${id:0:8}\ \ root\ \ VPN\ +1\ \ 2[0-9]{3}-[0-9]{2}-[0-9]{2}\ [0-9]{2}:[0-9]{2}:[0-9]{2}Z\ \ in\ [0-9]+\ h\ \  ]]
+    on_terminal --columns 60 -- show "$id"
+    local field
+    for field in tid bind_sid uid deadline count create_time function webapi_allow extra; do
+        grep -q "^$field  " <<<"$output"
+    done
+    on_terminal --columns 80 -- tune
+    grep -qE "^look for a session's tokens +[0-9.]+ ms +[0-9.]+ ms" <<<"$output"
+}
+
+@test "what a token holds cannot command the terminal" {
+    local evil
+    evil=$'x\e[31my\a\x7f\xc2\x9b2Jz'
+    tool init
+    local id
+    id=$(tool create --uid 0 --function "$evil" --bind-sid "$evil" --allow "$evil:$evil" --extra '{"x": "\u001b[31m\u007f\u009b"}')
+    local arguments
+    while read -r arguments; do
+        # shellcheck disable=SC2086
+        NO_COLOR=1 on_terminal --columns 200 -- $arguments
+        [ "$status" -eq 0 ]
+        [[ $output != *[$'\e\a\x7f']* && $output != *$'\xc2\x9b'* ]] || {
+            echo "$arguments: $(cat -v <<<"$output")"
+            return 1
+        }
+    done <<TABLE
+list
+list -o json
+list -o jsonl
+list --field function
+list --field webapi_allow
+show $id
+show $id -o json
+show $id --field bind_sid
+show $id --field extra
+stats
+stats -o json
+TABLE
+    # Elsewhere a value comes out as it is.
+    run_tool show "$id" --field function
+    expect 0 "$evil"
+    # Nor can an argument.
+    NO_COLOR=1 on_terminal -- list --user "$evil"
+    [ "$status" -eq 2 ]
+    [[ $output != *[$'\e\a\x7f']* && $output != *$'\xc2\x9b'* ]]
+}
+
+@test "metrics and exports cannot command the terminal" {
+    tool init
+    tool create --uid 0 --function $'x\e[31my\x7f\xc2\x9b2Jz' >/dev/null
+    local arguments
+    for arguments in "stats --prometheus" export; do
+        # shellcheck disable=SC2086
+        on_terminal --columns 200 -- $arguments
+        [ "$status" -eq 0 ]
+        [[ $output != *[$'\e\x7f']* && $output != *$'\xc2\x9b'* ]] || {
+            echo "$arguments: $(cat -v <<<"$output")"
+            return 1
+        }
+    done
+}
+
+# bar TITLE: a full one ends on the first line of $output, and it grew from an empty one
+bar()
+{
+    local first="$1 [                                        ]   0 %"
+    local last="$1 [########################################] 100 %"
+    [[ ${lines[0]} == $'\r'"$first"$'\r'* ]] && [[ ${lines[0]} == *$'\r'"$last" ]] || {
+        echo "no bar: $(cat -v <<<"${lines[0]}")"
+        return 1
+    }
+}
+
+@test "export, import and tune show a progress bar on a terminal" {
+    a_token >"$DIR/id"
+    a_token >"$DIR/id"
+    on_terminal -- export "$DIR/lines"
+    [ "$status" -eq 0 ]
+    bar Exporting
+    [ "$(tail -n +2 <<<"$output")" = "vemo-access-token: 2 tokens exported" ]
+
+    sql "DELETE FROM token"
+    on_terminal -- import "$DIR/lines"
+    [ "$status" -eq 0 ]
+    bar Importing
+    [ "$(tail -n +2 <<<"$output")" = "2 tokens imported" ]
+
+    # It is on standard error, and not in the result.
+    sh_on_terminal -- '"$0" export >"$1"' "$DIR/result"
+    [ "$status" -eq 0 ]
+    bar Exporting
+    cmp "$DIR/result" "$DIR/lines"
+    sh_on_terminal -- '"$0" tune >"$1"' "$DIR/result"
+    [ "$status" -eq 0 ]
+    bar Tuning
+    [ "${#lines[@]}" -eq 1 ]
+    [[ $(head -n 1 "$DIR/result") =~ ^WHAT\ +BEFORE\ +AFTER$ ]]
+}
+
+@test "a progress bar that does not come to its end is ended before the reason is told" {
+    a_token >"$DIR/id"
+    a_token >"$DIR/id"
+    tool export "$DIR/lines" 2>/dev/null
+    sql "DELETE FROM token WHERE tid <> '$(cat "$DIR/id")'"
+    on_terminal -- import "$DIR/lines"
+    [ "$status" -eq 2 ]
+    [[ ${lines[0]} == $'\r'"Importing ["* ]]
+    [ "${lines[1]}" = "vemo-access-token: $DIR/lines: line 2 has the id of a token that is there already; nothing of this file was imported" ]
+}
+
+@test "there is no progress bar where standard error is no terminal" {
+    a_token >"$DIR/id"
+    a_token >"$DIR/id"
+    sh_on_terminal -- '"$0" export "$1" 2>"$2"' "$DIR/lines" "$DIR/stderr"
+    expect 0 ""
+    [ "$(cat "$DIR/stderr")" = "vemo-access-token: 2 tokens exported" ]
+    sql "DELETE FROM token"
+    sh_on_terminal -- '"$0" import "$1" 2>"$2"' "$DIR/lines" "$DIR/stderr"
+    expect 0 "2 tokens imported"
+    [ ! -s "$DIR/stderr" ]
+    sh_on_terminal -- '"$0" tune 2>"$1" | tail -n 1 | cut -c1-20' "$DIR/stderr"
+    expect 0 "write a small change"
+    [ ! -s "$DIR/stderr" ]
+}
+
+@test "an export to the terminal is not mixed with a progress bar" {
+    a_token >"$DIR/id"
+    a_token >"$DIR/id"
+    on_terminal --columns 1000 -- export
+    expect 0 "$(tool export 2>/dev/null)
+vemo-access-token: 2 tokens exported"
+}

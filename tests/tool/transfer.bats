@@ -1,0 +1,506 @@
+#!/usr/bin/env bats
+# export and import
+
+load common
+
+LINE='{"bind_sid":"","count":1,"create_time":0,"deadline":9999999999,"extra":{},"function":"VPN","tid":"TID","uid":0,"webapi_allow":{}}'
+
+# a_tid LETTERS: an id of 127 characters that begins with them
+a_tid()
+{
+    printf '%s%0*d' "$1" $((127 - ${#1})) 0
+}
+
+# a_line LETTERS: what export writes of a token
+a_line()
+{
+    echo "${LINE/TID/$(a_tid "$1")}"
+}
+
+# a_row LETTERS: that token, written behind the tool's back
+a_row()
+{
+    [ -e "$DB" ] || tool init >/dev/null
+    sql "INSERT INTO token VALUES ('$(a_tid "$1")', '', 0, 9999999999, 1, 0, 'VPN', '{}', '{}')"
+}
+
+many_rows()
+{
+    tool init >/dev/null
+    sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < $1)
+         INSERT INTO token SELECT printf('%0127d', i), '', 0, 9999999999, 1, 0, 'VPN', '{}', '{}' FROM n"
+}
+
+all_rows()
+{
+    sql "SELECT hex(tid), hex(bind_sid), uid, deadline, count, create_time, hex(function), hex(webapi_allow), hex(extra)
+         FROM token ORDER BY tid"
+}
+
+# expect_left LETTERS...: the tokens that are there, by their first letters, in order
+expect_left()
+{
+    [ "$(sql "SELECT rtrim(tid, '0') FROM token ORDER BY tid" | xargs)" = "$*" ]
+}
+
+# on_terminal COMMAND...
+on_terminal()
+{
+    run /usr/bin/python3 -c '
+import pexpect, sys
+child = pexpect.spawn(sys.argv[1], sys.argv[2:], timeout=30, dimensions=(24, 200))
+child.expect(pexpect.EOF)
+child.wait()
+sys.stdout.buffer.write(child.before.replace(b"\r\n", b"\n"))
+sys.exit(child.exitstatus)' "$@"
+}
+
+FULL_BAR='[########################################] 100 %'
+
+# Whatever a field can hold, as the library writes it.
+awkward_rows()
+{
+    tool init >/dev/null
+    sql "INSERT INTO token VALUES
+         ('$(a_tid A)', 's ''1\"', 0, 9999999999, 1, 0,
+          'it''s \"q\" \\ /' || char(10, 13, 9, 1, 127) || 'Grüße 日本 😀', '{}', '{}'),
+         ('$(a_tid B)', CAST(x'ff80fe41' AS TEXT), 0, 1, 0, 0, CAST(x'c328' AS TEXT),
+          CAST(x'7b22ff223a7b226d6574686f64223a5b22c3225d7d7d' AS TEXT), CAST(x'7b2261223a22ff227d' AS TEXT)),
+         ('$(a_tid "C'' ü")', '', 4294967294, 9223372036854775807, -9223372036854775808, -9223372036854775808, 'F',
+          '{\"\":{},\"Example.File\":{\"method\":[\"get\",\"li''st\"]},\"x\":\"y\"}',
+          '{\"a\":{\"b\":[[],{},[1,[2,[null]]],true]},\"nul\":\"a\\u0000b\",\"ü\":\"\\n\\\"\\\\/\"}'),
+         ('$(a_tid D)', '', 1000, 9999999999, 9223372036854775807, 1, 'F', '{}',
+          '{\"d\":0.10000000000000001,\"e\":1.7976931348623157e+308,\"i\":Infinity,\"j\":-Infinity,' ||
+          '\"l\":-9223372036854775808,\"t\":4.9406564584124654e-324,\"u\":18446744073709551615,\"z\":-0.0}')"
+}
+
+# --- export
+
+@test "export writes each token as a line of JSON, its id included, and purges nothing" {
+    a_row A
+    sql "INSERT INTO token VALUES ('$(a_tid B)', 's', 1000, 1, -1, 5, 'Mail', '{\"Example.File\":{\"method\":[\"get\"]}}',
+         '{\"a\":[1.5,\"é\"]}')"
+    run_tool export
+    expect 0 "$(a_line A)
+{\"bind_sid\":\"s\",\"count\":-1,\"create_time\":5,\"deadline\":1,\"extra\":{\"a\":[1.5,\"é\"]},\"function\":\"Mail\",\"tid\":\"$(a_tid B)\",\"uid\":1000,\"webapi_allow\":{\"Example.File\":{\"method\":[\"get\"]}}}" \
+        "vemo-access-token: 2 tokens exported"
+    local text=$output
+    run_tool export -
+    expect 0 "$text" "vemo-access-token: 2 tokens exported"
+    run_tool export "$DIR/file"
+    expect 0 "" "vemo-access-token: 2 tokens exported"
+    [ "$(cat "$DIR/file")" = "$text" ]
+    expect_left A B
+}
+
+@test "export counts in plain English" {
+    tool init
+    run_tool export
+    expect 0 "" "vemo-access-token: 0 tokens exported"
+    a_row A
+    run_tool export
+    expect 0 "$(a_line A)" "vemo-access-token: 1 token exported"
+}
+
+@test "an exported file has mode 0600 whatever the umask, and whatever was there" {
+    a_row A
+    install -m 0666 /dev/null "$DIR/file"
+    local mask
+    for mask in 0000 0077 0277 0777; do
+        run --separate-stderr bash -c 'umask "$1" && "$0" export "$2"' "$TOOL" "$mask" "$DIR/file"
+        [ "$status" -eq 0 ]
+        [ "$(stat -c %a "$DIR/file")" = 600 ]
+    done
+}
+
+@test "export replaces a file in one step" {
+    a_row A
+    mkdir "$DIR/out"
+    echo old >"$DIR/out/file"
+    exec 5<"$DIR/out/file"
+    ln "$DIR/out/file" "$DIR/link"
+    cd "$DIR/out"
+    run_tool export file
+    [ "$status" -eq 0 ]
+    [ "$(cat <&5)" = old ]
+    [ "$(cat "$DIR/link")" = old ]
+    [ "$(cat file)" = "$(a_line A)" ]
+    [ "$(ls -A)" = file ]
+    exec 5<&-
+}
+
+@test "an export that fails leaves what was there, and nothing else" {
+    many_rows 10
+    mkdir "$DIR/out"
+    local limited='trap "" XFSZ; ulimit -f 1; exec "$0" "$@"'
+    run --separate-stderr bash -c "$limited" "$TOOL" export "$DIR/out/file"
+    expect 4 "" "vemo-access-token: $DIR/out/file: File too large"
+    [ "$(ls -A "$DIR/out")" = "" ]
+    echo old >"$DIR/out/file"
+    run --separate-stderr bash -c "$limited" "$TOOL" export "$DIR/out/file"
+    expect 4 "" "vemo-access-token: $DIR/out/file: File too large"
+    [ "$(ls -A "$DIR/out")" = file ]
+    [ "$(cat "$DIR/out/file")" = old ]
+}
+
+@test "export to a place where no file can be made ends in a sentence that names it" {
+    a_row A
+    mkdir "$DIR/work"
+    cd "$DIR/work"
+    mkdir out
+    mkfifo fifo
+    ln -s out/file link
+    local file
+    for file in out fifo link /dev/null; do
+        run_tool export "$file"
+        expect 2 "" "vemo-access-token: $file is no regular file; to write to a pipe, write to standard output"
+    done
+    run_tool export nowhere/file
+    expect 4 "" "vemo-access-token: nowhere/file: No such file or directory"
+    run_tool export "$DB/file"
+    expect 4 "" "vemo-access-token: $DB/file: Not a directory"
+    [ "$(ls -A out)" = "" ]
+    [ ! -e nowhere ]
+}
+
+@test "an empty name is no file" {
+    a_row A
+    local command
+    for command in export import; do
+        run_tool $command ""
+        [ "$status" -eq 2 ]
+        [[ $stderr == "vemo-access-token: FILE: "* ]]
+    done
+}
+
+@test "an export that cannot be written to standard output is no success" {
+    a_row A
+    run --separate-stderr bash -c '"$0" export >/dev/full' "$TOOL"
+    expect 4 "" "vemo-access-token: cannot write the result: No space left on device"
+    run --separate-stderr bash -c '"$0" export >&-' "$TOOL"
+    expect 4 "" "vemo-access-token: cannot write the result: Bad file descriptor"
+}
+
+@test "export takes one file, and no form" {
+    a_row A
+    run_tool export "$DIR/a" "$DIR/b"
+    expect 2 "" "vemo-access-token: The following argument was not expected: $DIR/b"
+    run_tool export -o json
+    expect 2 "" "vemo-access-token: The following argument was not expected: -o"
+    [ ! -e "$DIR/a" ]
+}
+
+@test "export never takes an unusable store for an empty one, and leaves no file" {
+    local arguments
+    mkdir "$DIR/out"
+    for arguments in "" "$DIR/out/file"; do
+        run_tool export $arguments
+        expect 4 "" "vemo-access-token: there is no directory ${REAL_DB%/*}; \"vemo-access-token init\" makes it"
+        mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+        run_tool export $arguments
+        expect 4 "" "vemo-access-token: there is no database $REAL_DB; \"vemo-access-token init\" makes it"
+        [ ! -e "$DB" ]
+        : >"$DB"
+        run_tool export $arguments
+        expect 4 "" "vemo-access-token: $REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
+        echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
+        run_tool export $arguments
+        expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+        rm "$DB"
+        a_row A
+        sql "UPDATE token SET extra = NULL"
+        run_tool export $arguments
+        expect 4 "" "vemo-access-token: $REAL_DB holds a token that cannot be read; \"vemo-access-token doctor\" finds it"
+        rm -r "$VEMO_REDIRECT_DIR"
+    done
+    [ "$(ls -A "$DIR/out")" = "" ]
+}
+
+# --- import
+
+@test "tokens come back from an export as they were, whatever they hold" {
+    awkward_rows
+    local rows
+    rows=$(all_rows)
+    tool export "$DIR/file"
+    sql "DELETE FROM token"
+    run_tool import "$DIR/file"
+    expect 0 "4 tokens imported" "vemo-access-token: 1 of them expired: the next call of a program purges those"
+    [ "$(all_rows)" = "$rows" ]
+    tool export "$DIR/again"
+    cmp "$DIR/file" "$DIR/again"
+}
+
+@test "tokens move through a pipe to a machine that has no database yet" {
+    awkward_rows
+    local rows
+    rows=$(all_rows)
+    mkdir -m 0700 "$DIR/other"
+    run --separate-stderr bash -c '"$0" export 2>/dev/null | VEMO_REDIRECT_DIR=$1 "$0" import -' "$TOOL" "$DIR/other"
+    [ "$status" -eq 0 ]
+    [ "$output" = "4 tokens imported" ]
+    VEMO_REDIRECT_DIR=$DIR/other
+    DB=$DIR/other/vemo-access-token.db
+    [ "$(all_rows)" = "$rows" ]
+    [ "$(stat -c %a "$DB")" = 700 ]
+    run_tool purge
+    expect 0 "1 token purged"
+}
+
+@test "an object nested as deeply as create takes comes back from an export" {
+    tool init
+    local deep
+    deep=$(printf '{"a":%.0s' {1..999})1$(printf '}%.0s' {1..999})
+    tool create --uid 0 --function VPN --extra "$deep"
+    tool export "$DIR/file"
+    sql "DELETE FROM token"
+    run_tool import "$DIR/file"
+    expect 0 "1 token imported"
+    [ "$(sql "SELECT extra FROM token")" = "$deep" ]
+}
+
+@test "import passes over blank lines, and takes a last line without its end" {
+    tool init
+    printf '\n%s\n\n\n%s\r\n\n%s' "$(a_line A)" "$(a_line B)" "$(a_line C)" >"$DIR/file"
+    run_tool import "$DIR/file"
+    expect 0 "3 tokens imported"
+    expect_left A B C
+    : >"$DIR/empty"
+    run_tool import "$DIR/empty"
+    expect 0 "0 tokens imported"
+}
+
+@test "a line of white space is blank" {
+    tool init
+    printf '%s\n \n\t\n\r\n' "$(a_line A)" >"$DIR/file"
+    run_tool import "$DIR/file"
+    expect 0 "1 token imported"
+}
+
+@test "import takes several files and standard input, each for itself" {
+    tool init
+    a_line A >"$DIR/a"
+    { a_line B; a_line C; } >"$DIR/bc"
+    run_tool import "$DIR/a" - "$DIR/bc" < <(a_line D)
+    expect 0 "1 token imported
+1 token imported
+2 tokens imported"
+    expect_left A B C D
+    sql "DELETE FROM token"
+    a_line A >>"$DIR/bc"
+    run_tool import "$DIR/a" "$DIR/bc" "$DIR/unread"
+    expect 2 "1 token imported" "vemo-access-token: $DIR/bc: line 3 has the id of a token that is there already; nothing of this file was imported"
+    expect_left A
+}
+
+@test "an id that is there twice is refused with its line" {
+    a_row A
+    sql "UPDATE token SET function = 'kept'"
+    { a_line B; a_line A; } >"$DIR/file"
+    run_tool import "$DIR/file"
+    expect 2 "" "vemo-access-token: $DIR/file: line 2 has the id of a token that is there already; nothing of this file was imported"
+    run_tool import - <"$DIR/file"
+    expect 2 "" "vemo-access-token: standard input: line 2 has the id of a token that is there already; nothing of this file was imported"
+    { a_line B; echo; a_line C; a_line B; } >"$DIR/file"
+    run_tool import "$DIR/file"
+    expect 2 "" "vemo-access-token: $DIR/file: line 4 has the id of line 1; nothing of this file was imported"
+    run_tool import - <"$DIR/file"
+    expect 2 "" "vemo-access-token: standard input: line 4 has the id of line 1; nothing of this file was imported"
+    expect_left A
+    [ "$(sql "SELECT function FROM token")" = kept ]
+}
+
+@test "a line that is no token's record is refused with its number and the reason, and nothing is imported" {
+    tool init
+    cp "$DB" "$DIR/before"
+    local from to reason
+    while IFS='|' read -r from to reason; do
+        to=${to//NUL/\\u0000}
+        { a_line A; echo; local line=${LINE/"$from"/$to}; echo "${line/TID/$(a_tid B)}"; a_line C; } >"$DIR/file"
+        run_tool import "$DIR/file"
+        expect 2 "" "vemo-access-token: $DIR/file: line 3 $reason; nothing of this file was imported"
+    done <<'TABLE'
+"tid":"TID",||has no "tid"
+"bind_sid":"",||has no "bind_sid"
+"uid":0,||has no "uid"
+"deadline":9999999999,||has no "deadline"
+"count":1,||has no "count"
+"create_time":0,||has no "create_time"
+"function":"VPN",||has no "function"
+,"webapi_allow":{}||has no "webapi_allow"
+"extra":{},||has no "extra"
+"tid":"TID"|"tid":1|"tid" is no string
+"bind_sid":""|"bind_sid":null|"bind_sid" is no string
+"function":"VPN"|"function":["VPN"]|"function" is no string
+"uid":0|"uid":"0"|"uid" is no whole number
+"uid":0|"uid":-1|"uid" is no user's number
+"uid":0|"uid":4294967295|"uid" is no user's number
+"uid":0|"uid":4294967296|"uid" is no user's number
+"deadline":9999999999|"deadline":null|"deadline" is no whole number
+"deadline":9999999999|"deadline":9223372036854775808|"deadline" is no whole number
+"count":1|"count":1.5|"count" is no whole number
+"count":1|"count":true|"count" is no whole number
+"count":1|"count":Infinity|"count" is no whole number
+"count":1|"count":-9223372036854775809|"count" is no whole number
+"create_time":0|"create_time":{}|"create_time" is no whole number
+"webapi_allow":{}|"webapi_allow":[]|"webapi_allow" is no object
+"extra":{}|"extra":"{}"|"extra" is no object
+"extra":{}|"extra":{},"other":1|"other" is no field of a token
+"tid":"TID"|"tid":"short"|"tid" is shorter than 127 characters
+"function":"VPN"|"function":""|"function" is empty
+"function":"VPN"|"function":"VNULN"|"function" holds a NUL character
+"bind_sid":""|"bind_sid":"NUL"|"bind_sid" holds a NUL character
+TID|TIDNUL|"tid" holds a NUL character
+TABLE
+    cmp "$DB" "$DIR/before"
+}
+
+@test "a line that is no JSON object is refused with its number" {
+    tool init
+    cp "$DB" "$DIR/before"
+    local good line
+    good=$(a_line B)
+    for line in '[]' "[$good]"; do
+        { a_line A; echo "$line"; } >"$DIR/file"
+        run_tool import "$DIR/file"
+        expect 2 "" "vemo-access-token: $DIR/file: line 2 is no JSON object; nothing of this file was imported"
+    done
+    for line in x 1 '"a"' null '{' "${good%?}" "$good," "$good$good" "$good x" "'$good'" "//$good" "${good/1/}" \
+        "${good/VPN/\\ud800}" "${good/VPN/\\x}" "${good/:1,/:1,\"count\":2,}" "${good/:/}"; do
+        { a_line A; echo "$line"; } >"$DIR/file"
+        run_tool import "$DIR/file"
+        [ "$status" -eq 2 ]
+        [ "$output" = "" ]
+        [[ $stderr == "vemo-access-token: $DIR/file: line 2 is no JSON: "*"; nothing of this file was imported" ]]
+    done
+    cmp "$DB" "$DIR/before"
+}
+
+@test "of a line that is no JSON, no other line's number is told" {
+    tool init
+    { a_line A; echo "{"; } >"$DIR/file"
+    run_tool import "$DIR/file"
+    [[ $stderr == *": line 2 "* ]]
+    [[ $stderr != *"Line 1"* ]]
+}
+
+@test "a line that holds a NUL byte is refused" {
+    tool init
+    local format
+    for format in '%s\0\n' '%s\0{broken\n' '\0%s\n'; do
+        printf "$format" "$(a_line A)" >"$DIR/file"
+        run_tool import "$DIR/file"
+        [ "$status" -eq 2 ]
+        [[ $stderr == "vemo-access-token: $DIR/file: line 1 "*"; nothing of this file was imported" ]]
+        expect_left
+    done
+}
+
+@test "an object nested too deeply is refused with its line" {
+    tool init
+    local line
+    line=$(a_line A)
+    printf '%s\n' "${line/\{\}/$(printf '{"a":%.0s' {1..2000})1$(printf '}%.0s' {1..2000})}" >"$DIR/file"
+    run_tool import "$DIR/file"
+    expect 2 "" "vemo-access-token: $DIR/file: line 1 is nested too deeply for JSON; nothing of this file was imported"
+}
+
+@test "the fields of a line may stand in any order, with spaces and escapes" {
+    tool init
+    printf '\t{ "webapi_allow" : {}, "uid" : 4294967294, "tid" : "%s", "function" : "\\u0056PN", "extra" : {}, "deadline" : 9999999999, "create_time" : 0, "count" : 2, "bind_sid" : "" } \n' "$(a_tid A)" >"$DIR/file"
+    run_tool import "$DIR/file"
+    expect 0 "1 token imported"
+    [ "$(sql "SELECT uid, deadline, count, function FROM token")" = "4294967294|9999999999|2|VPN" ]
+}
+
+@test "import tells of expired tokens, and keeps them" {
+    tool init
+    local line
+    line=$(a_line A)
+    { echo "${line/9999999999/1}"; line=$(a_line B); echo "${line/9999999999/-1}"; a_line C; } >"$DIR/file"
+    run_tool import "$DIR/file"
+    expect 0 "3 tokens imported" "vemo-access-token: 2 of them expired: the next call of a program purges those"
+    expect_left A B C
+}
+
+@test "a file that cannot be read is refused, and named" {
+    tool init
+    cp "$DB" "$DIR/before"
+    cd "$DIR"
+    ln -s loop loop
+    mkdir directory
+    local file reason
+    while IFS='|' read -r file reason; do
+        run_tool import "$file"
+        expect 2 "" "vemo-access-token: $file: $reason"
+    done <<'TABLE'
+nowhere|No such file or directory
+nowhere/file|No such file or directory
+directory|Is a directory
+loop|Too many levels of symbolic links
+/proc/self/mem|Input/output error
+TABLE
+    run_tool import
+    expect 2 "" "vemo-access-token: FILE is required"
+    run_tool import --force directory
+    expect 2 "" "vemo-access-token: The following argument was not expected: --force"
+    cmp "$DB" "$DIR/before"
+}
+
+@test "standard input that cannot be read is no empty file" {
+    tool init
+    run_tool import - <"$DIR"
+    expect 2 "" "vemo-access-token: standard input: Is a directory"
+}
+
+@test "a file that may not be read is refused, and named" {
+    [ "$(id -u)" -ne 0 ] || skip "root may read any file"
+    tool init
+    a_line A >"$DIR/file"
+    chmod 0 "$DIR/file"
+    run_tool import "$DIR/file"
+    expect 2 "" "vemo-access-token: $DIR/file: Permission denied"
+}
+
+@test "a bad file makes no database" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    echo x >"$DIR/file"
+    run_tool import "$DIR/file"
+    [ "$status" -eq 2 ]
+    [ "$(ls -A "$VEMO_REDIRECT_DIR")" = "" ]
+}
+
+@test "import never takes an unusable store for an empty one" {
+    a_line A >"$DIR/file"
+    : >"$DIR/empty"
+    local file
+    for file in "$DIR/file" "$DIR/empty"; do
+        run_tool import "$file"
+        expect 4 "" "vemo-access-token: there is no directory ${REAL_DB%/*}; \"vemo-access-token init\" makes it"
+        mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+        : >"$DB"
+        run_tool import "$file"
+        expect 4 "" "vemo-access-token: $REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
+        [ ! -s "$DB" ]
+        echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
+        cp "$DB" "$DIR/text"
+        run_tool import "$file"
+        expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+        cmp "$DB" "$DIR/text"
+        rm -r "$VEMO_REDIRECT_DIR"
+    done
+}
+
+@test "export and import show a bar on a terminal, and only there" {
+    many_rows 250
+    on_terminal "$TOOL" export "$DIR/file"
+    [ "$status" -eq 0 ]
+    [[ $output == $'\rExporting ['*$'\rExporting '"$FULL_BAR"$'\n'"vemo-access-token: 250 tokens exported" ]]
+    sql "DELETE FROM token"
+    on_terminal "$TOOL" import "$DIR/file"
+    [ "$status" -eq 0 ]
+    [[ $output == $'\rImporting ['*$'\rImporting '"$FULL_BAR"$'\n'"250 tokens imported" ]]
+    on_terminal bash -c '"$0" export 2>"$1" >/dev/null' "$TOOL" "$DIR/stderr"
+    [ "$output" = "" ]
+    [ "$(cat "$DIR/stderr")" = "vemo-access-token: 250 tokens exported" ]
+}

@@ -1,0 +1,365 @@
+#!/usr/bin/env bats
+# update
+
+load common
+
+ZEROS=$(printf '%0119d' 0)
+
+# row NAME [COLUMN = VALUE, ...]: a token whose id is the name, of 8 characters, and zeros; behind the
+# tool's back
+row()
+{
+    [ -e "$DB" ] || tool init >/dev/null
+    sql "INSERT INTO token VALUES ('$1$ZEROS', 'session-1', 0, 9999999999, 5, 1000000000, 'VPN',
+                                   '{\"Api\":{\"method\":[\"get\"]}}', '{\"n\":[1,\"ü\"]}');
+         ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
+}
+
+rows()
+{
+    sql "SELECT * FROM token ORDER BY tid"
+}
+
+# refuses: each line "ARGUMENTS|SENTENCE" of standard input is a call of update that fails with status 2
+# and that sentence. All of them change nothing.
+refuses()
+{
+    local arguments sentence before
+    before=$(rows)
+    while IFS='|' read -r arguments sentence; do
+        echo "$arguments"
+        eval "run_tool update $arguments" </dev/null
+        expect 2 "" "vemo-access-token: $sentence"
+    done
+    [ "$(rows)" = "$before" ]
+}
+
+@test "each option changes its field, and no other" {
+    tool init
+    echo '{"file":1}' >"$DIR/extra"
+    while IFS='|' read -r arguments set; do
+        echo "$arguments"
+        sql "DELETE FROM token"
+        row token---
+        row likewise
+        row another-
+        eval "run_tool update token--- $arguments"
+        expect 0 "1 token updated"
+        sql "UPDATE token SET ${set:-uid = uid} WHERE tid LIKE 'likewise%'"
+        columns="bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra"
+        [ "$(sql "SELECT $columns FROM token WHERE tid = 'token---$ZEROS'")" = \
+            "$(sql "SELECT $columns FROM token WHERE tid = 'likewise$ZEROS'")" ]
+        [ "$(sql "SELECT count FROM token WHERE tid = 'another-$ZEROS'")" = 5 ]
+    done <<'END'
+--uses 1|count = 1
+--uses 9223372036854775807|count = 9223372036854775807
+--unlimited|count = -1
+--deadline @9000000000|deadline = 9000000000
+--bind-sid session-2|bind_sid = 'session-2'
+--bind-sid ''|bind_sid = ''
+--bind-sid=|bind_sid = ''
+--allow Other:put|webapi_allow = '{"Other":{"method":["put"]}}'
+--add-allow Api:put|webapi_allow = '{"Api":{"method":["get","put"]}}'
+--remove-allow Api|webapi_allow = '{}'
+--extra '{"b": 1, "a": 2}'|extra = '{"a":2,"b":1}'
+--extra '{}'|extra = '{}'
+--extra @"$DIR/extra"|extra = '{"file":1}'
+--uses 5|
+--uses 2 --bind-sid s --deadline 2060-01-01Z --add-allow B --extra '{}'|count = 2, bind_sid = 's', deadline = 2840140800, webapi_allow = '{"Api":{"method":["get"]},"B":{"method":[]}}', extra = '{}'
+END
+}
+
+@test "--ttl counts from now" {
+    row token---
+    while read -r ttl seconds; do
+        before=$(date +%s)
+        run_tool update token--- --ttl $ttl
+        expect 0 "1 token updated"
+        [ "$(sql "SELECT deadline - $seconds BETWEEN $before AND $(date +%s) FROM token")" = 1 ]
+    done <<'END'
+1w2d 777600
+90 90
+365250d 31557600000
+END
+}
+
+@test "a deadline is a day or a time in local time, in UTC with a Z, or in seconds" {
+    row token---
+    while IFS='|' read -r deadline seconds; do
+        echo "$deadline"
+        run_tool update token--- --deadline "$deadline"
+        expect 0 "1 token updated"
+        [ "$(sql "SELECT deadline FROM token")" = "$seconds" ]
+    done <<'END'
+2060-02-29|2845234800
+2060-02-29Z|2845238400
+2060-06-30 12:34|2855817240
+2060-06-30 12:34:56|2855817296
+2060-06-30T12:34|2855817240
+2060-06-30T12:34:56|2855817296
+2060-06-30 12:34Z|2855824440
+2060-06-30 12:34:56Z|2855824496
+2060-06-30T12:34Z|2855824440
+2060-06-30T12:34:56Z|2855824496
+9999-12-31 23:59:59Z|253402300799
+@4294967296|4294967296
+@9223372036854775807|9223372036854775807
+END
+    TZ=America/New_York tool update token--- --deadline 2060-01-01
+    [ "$(sql "SELECT deadline FROM token")" = 2840158800 ]
+    TZ=UTC tool update token--- --deadline 2060-01-01
+    [ "$(sql "SELECT deadline FROM token")" = 2840140800 ]
+}
+
+@test "a deadline near the change of the clocks is the time that it says" {
+    row token---
+    # The clocks go from 2 to 3 o'clock on 28 March and from 3 to 2 on 31 October.
+    while IFS='|' read -r deadline seconds; do
+        echo "$deadline"
+        run_tool update token--- --deadline "$deadline"
+        expect 0 "1 token updated"
+        [ "$(sql "SELECT deadline FROM token")" = "$seconds" ]
+    done <<'END'
+2060-03-28|2847654000
+2060-03-28 01:59:59|2847661199
+2060-03-28 03:00|2847661200
+2060-03-28 02:30Z|2847666600
+2060-10-31|2866399200
+2060-10-31 01:59:59|2866406399
+2060-10-31 03:00|2866413600
+END
+    # This one is twice.
+    tool update token--- --deadline "2060-10-31 02:30"
+    [[ "$(sql "SELECT deadline FROM token")" =~ ^(2866408200|2866411800)$ ]]
+}
+
+@test "a time that does not exist is refused" {
+    no_time='is no time such as 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599'
+    row token---
+    for deadline in '' Z tomorrow 2061-02-29 2060-06-31 2060-00-10 2060-13-01 2060-01-00 2060-01 10000-01-01 \
+        '2060-01-01 ' '2060-01-01 12' '2060-01-01 24:00' '2060-01-01 12:60' '2060-01-01 12:00:60' \
+        '2060-01-01 12:00:61' '2060-01-01 23:59:60' '2060-01-01T12:00:00z' 2060-01-01ZZ \
+        '2060-01-01T12:00:00+01:00' '2060-01-01 12:00:00.5' 01.01.2060 \
+        '2060-03-28 02:00' '2060-03-28 02:30' 2060-03-28T02:59:59; do
+        run_tool update token--- --deadline "$deadline"
+        expect 2 "" "vemo-access-token: --deadline: \"$deadline\" $no_time"
+    done
+    # Here the clocks leap over half an hour.
+    TZ=Australia/Lord_Howe run_tool update token--- --deadline "2060-10-03 02:15"
+    expect 2 "" "vemo-access-token: --deadline: \"2060-10-03 02:15\" $no_time"
+    for seconds in '' -1 ' 1' 1x 1.5 9223372036854775808 4000000000Z; do
+        run_tool update token--- --deadline "@$seconds"
+        expect 2 "" "vemo-access-token: --deadline: \"$seconds\" is no number from 0 to 9223372036854775807"
+    done
+    [ "$(sql "SELECT deadline FROM token")" = 9999999999 ]
+}
+
+@test "a day that lacks its midnight begins an hour later" {
+    row token---
+    TZ=Africa/Cairo run_tool update token--- --deadline 2060-04-30
+    expect 0 "1 token updated"
+    [ "$(sql "SELECT deadline FROM token")" = 2850501600 ] # 01:00 there
+}
+
+@test "a deadline that has passed is refused" {
+    row token---
+    for deadline in @0 @1000000000 2020-01-01 2020-01-01Z '2020-01-01 12:00' 1969-12-31 0060-01-01; do
+        run_tool update token--- --deadline "$deadline"
+        expect 2 "" "vemo-access-token: --deadline: \"$deadline\" has passed; to take the token back, revoke it"
+    done
+    [ "$(sql "SELECT deadline FROM token")" = 9999999999 ]
+}
+
+@test "what a token opens is replaced, added to and taken from" {
+    row token---
+    while IFS='|' read -r stored arguments result; do
+        echo "$stored $arguments"
+        sql "UPDATE token SET webapi_allow = '$stored'"
+        run_tool update token--- $arguments
+        expect 0 "1 token updated"
+        [ "$(sql "SELECT webapi_allow FROM token")" = "$result" ]
+    done <<'END'
+{"A":{"method":["m"]}}|--allow B --allow C:x,y --allow C:z,x|{"B":{"method":[]},"C":{"method":["x","y","z"]}}
+{"A":{"method":["m"]}}|--add-allow B|{"A":{"method":["m"]},"B":{"method":[]}}
+{"A":{"method":["m"]}}|--add-allow B:x --add-allow B:y|{"A":{"method":["m"]},"B":{"method":["x","y"]}}
+{"A":{"method":["m"]}}|--add-allow A:n,m,l|{"A":{"method":["m","n","l"]}}
+{"A":{"method":["m"]}}|--add-allow A:m|{"A":{"method":["m"]}}
+{"A":{"method":["m"]}}|--add-allow A|{"A":{"method":["m"]}}
+{}|--add-allow A:m|{"A":{"method":["m"]}}
+{"A":{"method":["m"],"note":1}}|--add-allow A:n|{"A":{"method":["m","n"],"note":1}}
+{"A":{"method":["m","n"]},"B":{"method":[]}}|--remove-allow A|{"B":{"method":[]}}
+{"A":{"method":["m","n"]},"B":{"method":[]}}|--remove-allow A --remove-allow B|{}
+{"A":{"method":["m","n","o"]}}|--remove-allow A:o,m|{"A":{"method":["n"]}}
+{"A":{"method":["m","n","m"]}}|--remove-allow A:m|{"A":{"method":["n"]}}
+{"A":{"method":["m"],"note":1}}|--remove-allow A:m|{"A":{"method":[],"note":1}}
+{"A":{"method":["m"]}}|--remove-allow A --add-allow B:x|{"B":{"method":["x"]}}
+{"A":{"method":["m"]}}|--remove-allow A:m --add-allow A:n|{"A":{"method":["n"]}}
+END
+}
+
+@test "what a token does not open cannot be taken from it, and then nothing changes" {
+    row token---
+    refuses <<'END'
+token--- --remove-allow Other|--remove-allow: the token does not list "Other"
+token--- --remove-allow api|--remove-allow: the token does not list "api"
+token--- --remove-allow Other:get|--remove-allow: the token does not list "Other"
+token--- --remove-allow Api:put|--remove-allow: the token does not list "Api:put"
+token--- --remove-allow Api:get,put|--remove-allow: the token does not list "Api:put"
+token--- --remove-allow Api --remove-allow Api|--remove-allow: the token does not list "Api"
+token--- --uses 9 --add-allow More --remove-allow Other|--remove-allow: the token does not list "Other"
+END
+}
+
+@test "malformed entries are left alone, refused where they are named, and can be replaced" {
+    malformed="what the token opens is malformed and cannot be changed in part; replace it with --allow"
+    row token---
+    while IFS='|' read -r stored arguments result; do
+        echo "$stored $arguments"
+        sql "UPDATE token SET webapi_allow = '$stored'"
+        run_tool update token--- $arguments
+        if [ "$result" ]; then
+            expect 0 "1 token updated"
+        else
+            expect 2 "" "vemo-access-token: $malformed"
+        fi
+        [ "$(sql "SELECT webapi_allow FROM token")" = "${result:-$stored}" ]
+    done <<'END'
+{"A":1,"B":{"method":["m"]}}|--add-allow B:n --add-allow C|{"A":1,"B":{"method":["m","n"]},"C":{"method":[]}}
+{"A":1,"B":{"method":["m"]}}|--remove-allow B:m|{"A":1,"B":{"method":[]}}
+{"A":1,"B":{"method":["m"]}}|--remove-allow A|{"B":{"method":["m"]}}
+{"A":1}|--add-allow A:m|
+{"A":1}|--add-allow A|
+{"A":1}|--remove-allow A:m|
+{"A":{}}|--add-allow A:m|
+{"A":{"method":"m"}}|--add-allow A:n|
+{"A":{"method":"m"}}|--remove-allow A:m|
+["A"]|--add-allow B|
+["A"]|--remove-allow A|
+no JSON|--add-allow A|
+["A"]|--allow A:m|{"A":{"method":["m"]}}
+no JSON|--allow A|{"A":{"method":[]}}
+END
+}
+
+@test "a damaged field that is not named stays as it is" {
+    row token---
+    while IFS='|' read -r column stored; do
+        sql "UPDATE token SET $column = '$stored'"
+        run_tool update token--- --uses 7 --ttl 1h --bind-sid s
+        expect 0 "1 token updated"
+        [ "$(sql "SELECT count, bind_sid, $column FROM token")" = "7|s|$stored" ]
+        sql "UPDATE token SET count = 1, bind_sid = '', $column = '{}'"
+    done <<'END'
+extra|no JSON
+extra|{"a":1,"b":
+webapi_allow|no JSON
+webapi_allow|{"Api":{"method":["get"
+END
+}
+
+@test "update takes an id from standard input, or the beginning of one" {
+    row first---
+    row second--
+    for arguments in "first--- first---" "first--- first---$ZEROS" "second-- second--000"; do
+        set -- $arguments
+        sql "UPDATE token SET count = 5"
+        run_tool update "$2" --uses 7
+        expect 0 "1 token updated"
+        [ "$(sql "SELECT substr(tid, 1, 8) FROM token WHERE count = 7")" = "$1" ]
+        sql "UPDATE token SET count = 5"
+        run_tool update - --uses 7 <<<"$2"
+        expect 0 "1 token updated"
+        [ "$(sql "SELECT substr(tid, 1, 8) FROM token WHERE count = 7")" = "$1" ]
+    done
+}
+
+@test "where there is no such token, update says so and changes nothing" {
+    row token---
+    before=$(rows)
+    for tid in unknown- "token---${ZEROS}0" token--~; do
+        run_tool update "$tid" --unlimited --ttl 1h
+        expect 3 "" "vemo-access-token: there is no such token"
+        run_tool update - --unlimited <<<"$tid"
+        expect 3 "" "vemo-access-token: there is no such token"
+    done
+    [ "$(rows)" = "$before" ]
+}
+
+@test "what is not one id on standard input is refused" {
+    row token---
+    before=$(rows)
+    while IFS='|' read -r input sentence; do
+        run_tool update - --uses 7 < <(printf "$input")
+        expect 2 "" "vemo-access-token: TID: $sentence"
+    done <<END
+|there is no id on standard input
+\n\n|there is no id on standard input
+token---\ntoken---\n|there is more than one id on standard input
+token---\0\n|an id on standard input holds a NUL byte
+token--\n|"token--" is too short: give the id or its first 8 characters, or more
+END
+    [ "$(rows)" = "$before" ]
+}
+
+@test "update refuses arguments that it cannot use, and changes nothing" {
+    row token---
+    row second-1
+    row second-2 "tid = 'second-1x'"
+    refuses <<END
+--uses 2|TID is required
+token---|say what to change; "update --help" lists the fields
+'' --uses 2|TID: the id is empty
+token-- --uses 2|TID: "token--" is too short: give the id or its first 8 characters, or more
+second-1 --uses 2|TID: several tokens begin with "second-1"; give more of the id
+token--- second-1 --uses 2|The following argument was not expected: second-1
+token--- --uses 0|--uses: "0" is no number from 1 to 9223372036854775807
+token--- --uses -1|--uses: "-1" is no number from 1 to 9223372036854775807
+token--- --uses 2 --unlimited|--uses excludes --unlimited
+token--- --uses 2 --uses 3|--uses: can be given once only
+token--- --ttl 0|--ttl: "0" is no duration such as 90s, 15m, 8h, 2d12h or 1w
+token--- --ttl ''|--ttl: "" is no duration such as 90s, 15m, 8h, 2d12h or 1w
+token--- --ttl 1h --deadline 2060-01-01|--deadline excludes --ttl
+token--- --allow A --add-allow B|--allow excludes --add-allow
+token--- --allow A --remove-allow B|--allow excludes --remove-allow
+token--- --allow :m|--allow: ":m" names no API: write API or API:METHOD,METHOD
+token--- --allow ''|--allow: "" names no API: write API or API:METHOD,METHOD
+token--- --add-allow A:|--add-allow: "A:" has an empty method: write API or API:METHOD,METHOD
+token--- --remove-allow A:m,|--remove-allow: "A:m," has an empty method: write API or API:METHOD,METHOD
+token--- --extra []|--extra: is no JSON object
+token--- --extra '{'|--extra: is no JSON: Column 2 Missing '}' or object member name
+token--- --extra @$DIR|--extra: $DIR: Is a directory
+token--- --extra @$DIR/missing|--extra: $DIR/missing: No such file or directory
+token--- --count|The following argument was not expected: --count
+END
+}
+
+@test "texts come through exactly" {
+    row token---
+    text=$'a\'b"c\\d\ne\tf\e[31mÄ漢\xff;--'
+    run_tool update token--- --bind-sid "$text" --add-allow "$text:$text"
+    expect 0 "1 token updated"
+    [ "$(sql "SELECT lower(hex(bind_sid)) FROM token")" = "$(printf %s "$text" | od -An -v -tx1 | tr -d ' \n')" ]
+    json=$'a\'b\\"c\\\\d\\ne\\tf\\u001b[31mÄ漢\xff;--'
+    [ "$(sql "SELECT webapi_allow FROM token")" = \
+        "{\"Api\":{\"method\":[\"get\"]},\"$json\":{\"method\":[\"$json\"]}}" ]
+    run_tool update token--- --remove-allow "$text:$text"
+    expect 0 "1 token updated"
+    run_tool update token--- --remove-allow "$text:$text"
+    expect 2 "" 'vemo-access-token: --remove-allow: the token does not list "a'\''b"c\d\x0ae\x09f\x1b[31mÄ漢\xff;--:a'\''b"c\d\x0ae\x09f\x1b[31mÄ漢\xff;--"'
+}
+
+@test "update purges nothing, and tells that the token has expired unless it is given time" {
+    row expired- "deadline = 5"
+    row another- "deadline = -1"
+    run_tool update expired- --uses 7
+    expect 0 "1 token updated" "vemo-access-token: the token has expired; the next call of a program purges it,\
+ unless --ttl or --deadline give it time"
+    [ "$(sql "SELECT substr(tid, 1, 8), deadline, count FROM token ORDER BY tid")" = "another-|-1|5
+expired-|5|7" ]
+    run_tool update expired- --ttl 1h
+    expect 0 "1 token updated"
+    run_tool update another- --deadline 2060-01-01
+    expect 0 "1 token updated"
+    run_tool check expired- Api get
+    expect 0 allowed
+}

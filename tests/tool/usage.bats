@@ -1,0 +1,410 @@
+#!/usr/bin/env bats
+# What all commands share: help, arguments, who may call, and what goes to which stream
+
+load common
+
+COMMANDS="create generate list show check grant update revoke purge stats export import init doctor tune"
+
+# plain ARGUMENTS...: the tool as it ships, without the redirection, as a user who is not root
+plain()
+{
+    local plain
+    plain=$(dirname "$TOOL")/../../tools/vemo-access-token
+    local drop=()
+    if [ "$(id -u)" -eq 0 ]; then
+        drop=(setpriv --reuid=65534 --regid=65534 --clear-groups)
+        "${drop[@]}" test -x "$plain" || skip "uid 65534 cannot reach the build directory"
+    fi
+    run --separate-stderr env -u VEMO_REDIRECT_DIR "${drop[@]}" "$plain" "$@"
+}
+
+# into FILE ARGUMENTS...: standard output goes there; "-" closes it
+into()
+{
+    local file=$1
+    shift
+    if [ "$file" = - ]; then
+        run --separate-stderr bash -c '"$@" >&-' - "$TOOL" "$@"
+    else
+        run --separate-stderr bash -c 'file=$1; shift; "$@" >"$file"' - "$file" "$TOOL" "$@"
+    fi
+}
+
+# into_closed_pipe ARGUMENTS...: standard output is a pipe that nobody reads any more. A shell may have
+# been told to ignore the signal of that; the tool is started as by one that has not.
+into_closed_pipe()
+{
+    mkfifo "$DIR/pipe"
+    exec 8<>"$DIR/pipe" 9>"$DIR/pipe" 8<&-
+    run --separate-stderr bash -c 'exec env --default-signal=PIPE "$@" >&9' - "$TOOL" "$@"
+    exec 9>&-
+    rm "$DIR/pipe"
+}
+
+# log_lines_only TEXT: each line of it is one of the library's log lines
+log_lines_only()
+{
+    local rest
+    rest=$(grep -vE '^$|^[A-Za-z]+\.cpp:[0-9]+ ' <<<"$1" || true)
+    [ -n "$1" ] && [ "$rest" = "" ] || {
+        echo "not a line of the log: $rest"
+        return 1
+    }
+}
+
+tokens()
+{
+    sql "SELECT count(*) FROM token"
+}
+
+@test "--help lists every command and the exit statuses, on standard output" {
+    run_tool --help
+    [ "$status" -eq 0 ]
+    [ "$stderr" = "" ]
+    [ "$(sed -n '/^Commands:/,/^$/s/^  \([a-z]*\)  .*/\1/p' <<<"$output" | xargs)" = "$COMMANDS" ]
+    [[ $output == *"Usage: vemo-access-token "* ]]
+    [[ $output == *"Exit status: 0 done or granted, 1 refused (grant, check), 2 usage, 3 no such token,
+4 store or permission failure, 5 doctor has findings."* ]]
+    local help=$output
+    run_tool -h
+    expect 0 "$help"
+}
+
+@test "--help of a command names each of its flags, and no others" {
+    local command flags
+    while IFS='|' read -r command flags; do
+        run_tool "$command" --help
+        [ "$status" -eq 0 ]
+        [ "$stderr" = "" ]
+        [[ $output == *"Usage: vemo-access-token $command "* ]]
+        local got
+        got=$(grep -oE '^  (-[a-z],)?--[a-z-]+' <<<"$output" | tr -d ' ' | sort)
+        [ "$got" = "$(tr ' ' '\n' <<<"-h,--help --version -v,--verbose${flags:+ $flags}" | sort)" ] || {
+            echo "$command: $got"
+            return 1
+        }
+    done <<'TABLE'
+create|--uid --user --function --ttl --uses --unlimited --allow --bind-sid --extra --tid
+generate|
+list|--uid --user --function --bind-sid --expired --expiring --sort --limit --count -o,--output --no-header --field --utc --epoch --show-ids
+show|-o,--output --no-header --field --utc --epoch
+check|-o,--output
+grant|--print-user
+update|--uses --unlimited --deadline --ttl --allow --add-allow --remove-allow --bind-sid --extra
+revoke|--uid --user --function --bind-sid --all --dry-run --yes
+purge|--dry-run
+stats|--prometheus -o,--output --no-header
+export|
+import|
+init|
+doctor|--repair -o,--output
+tune|--wal --undo --dry-run --no-header
+TABLE
+}
+
+@test "--version is the same everywhere" {
+    run_tool --version
+    [ "$status" -eq 0 ]
+    [ "$stderr" = "" ]
+    [[ $output =~ ^vemo-access-token\ [0-9]+\.[0-9]+\.[0-9]+$ ]]
+    local version=$output
+    for command in $COMMANDS; do
+        run_tool "$command" --version
+        expect 0 "$version"
+    done
+}
+
+@test "arguments that cannot be are told in one sentence that names them" {
+    local arguments sentence
+    while IFS='|' read -r arguments sentence; do
+        # shellcheck disable=SC2086 # several arguments
+        run_tool $arguments
+        expect 2 "" "vemo-access-token: $sentence"
+    done <<'TABLE'
+|say what to do; "vemo-access-token --help" lists the commands
+bogus|The following argument was not expected: bogus
+list --count=5|--count: takes no value
+list --expired=false|--expired: takes no value
+list --verbose=1|--verbose: takes no value
+create --unlimited=no|--unlimited: takes no value
+--bogus|The following argument was not expected: --bogus
+list bogus|The following argument was not expected: bogus
+list --bogus|The following argument was not expected: --bogus
+list list|The following argument was not expected: list
+purge -x|The following argument was not expected: -x
+generate more|The following argument was not expected: more
+show|TID is required
+check|TID is required
+check TID|API is required
+check TID API METHOD more|The following argument was not expected: more
+grant|TID is required
+grant TID|API is required
+grant TID API METHOD more|The following argument was not expected: more
+update|TID is required
+update TID|say what to change; "update --help" lists the fields
+revoke|say which tokens: by TID, by --uid, --user, --function and --bind-sid, or --all
+import|FILE is required
+export FILE more|The following argument was not expected: more
+create|--function is required
+create --function|--function: needs a value
+create --function TAG|--uid or --user is required
+create --function TAG --function TAG|--function: can be given once only
+create --function TAG --uid 0 --user root|--uid excludes --user
+create --function TAG --uid 0 --uses 1 --unlimited|--uses excludes --unlimited
+list --uid 0 --user root|--uid excludes --user
+list --utc --epoch|--utc excludes --epoch
+list --output|--output: needs a value
+list -o xml|--output: "xml" is no form: table, json or jsonl
+update TID --ttl 1h --deadline 2999-01-01|--deadline excludes --ttl
+update TID --allow A --add-allow B|--allow excludes --add-allow
+update TID --allow A --remove-allow B|--allow excludes --remove-allow
+stats --prometheus -o json|--prometheus excludes --output
+tune --wal --undo|--wal excludes --undo
+TABLE
+}
+
+@test "who is not root is told so before anything is tried" {
+    local uid=65534
+    [ "$(id -u)" -eq 0 ] || uid=$(id -u)
+    echo '{}' >"$DIR/lines"
+    local arguments
+    while read -r arguments; do
+        # shellcheck disable=SC2086
+        plain $arguments </dev/null
+        expect 4 "" "vemo-access-token: only root may do this: the token database belongs to root, and the effective uid is $uid"
+    done <<'TABLE'
+create --uid 0 --function TAG
+create --uid 0 --function TAG --tid -
+list
+show -
+check - API
+grant - API
+update - --uses 1
+revoke -
+revoke --all
+purge
+stats
+export
+import -
+init
+tune
+TABLE
+    plain doctor
+    expect 5 "error: not run as root: the effective uid is $uid
+    meaning: the database belongs to root and cannot be looked at
+    remedy: run doctor as root"
+    plain generate
+    [ "$status" -eq 0 ]
+    [ "$stderr" = "" ]
+    [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
+    for arguments in --help --version "list --help"; do
+        # shellcheck disable=SC2086
+        plain $arguments
+        [ "$status" -eq 0 ]
+        [ "$stderr" = "" ]
+        [ "$output" != "" ]
+    done
+}
+
+@test "--verbose shows the library's log lines, on standard error only" {
+    local id
+    id=$(a_token --allow Api:get)
+    sql "UPDATE token SET webapi_allow = '[]'"
+    run_tool check "$id" Api get
+    expect 1 "refused: malformed token"
+    run_tool check -v "$id" Api get
+    [ "$status" -eq 1 ]
+    [ "$output" = "refused: malformed token" ]
+    log_lines_only "$stderr"
+    [[ $stderr == *'Failed [jToken["webapi_allow"].type() != Json::objectValue]'* ]]
+
+    run_tool list --verbose --count # nothing fails: nothing is logged
+    expect 0 "1"
+    run_tool generate --verbose
+    [ "$stderr" = "" ]
+
+    echo "no database" >"$DB"
+    run_tool list
+    expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+    run_tool list --verbose
+    [ "$status" -eq 4 ]
+    [ "$output" = "" ]
+    [ "$(tail -n 1 <<<"$stderr")" = "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)" ]
+    log_lines_only "$(sed '$d' <<<"$stderr")"
+    [[ $stderr == *"run sql failed, error=file is not a database"* ]]
+}
+
+@test "a result that cannot be written is a failure" {
+    local id file reason made
+    id=$(a_token --allow Api --uses 100)
+    while read -r file reason; do
+        for arguments in --help --version "list --help" generate list "list -o json" "list --field uid" \
+            "list --count" "show $id" "check $id Api" "grant $id Api" "grant $id Api --print-user" \
+            "update $id --bind-sid x" "revoke --dry-run --all" "purge --dry-run" "purge" stats \
+            "stats --prometheus" doctor "doctor -o json" init "tune --dry-run"; do
+            # shellcheck disable=SC2086
+            into "$file" $arguments
+            made=
+            [[ $arguments != grant\ * && $arguments != update\ * ]] || made="; the change was made"
+            expect 4 "" "vemo-access-token: cannot write the result: $reason$made" || {
+                echo "of: $arguments >$file"
+                return 1
+            }
+        done
+    done <<'TABLE'
+/dev/full No space left on device
+- Bad file descriptor
+TABLE
+}
+
+@test "a large result that cannot be written is a failure" {
+    a_token >"$DIR/id"
+    sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 300)
+         INSERT INTO token SELECT tid || i, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra
+         FROM token, n"
+    for arguments in "list --show-ids" "list -o json --show-ids" "list --field tid --show-ids"; do
+        # shellcheck disable=SC2086
+        into /dev/full $arguments
+        expect 4 "" "vemo-access-token: cannot write the result: No space left on device"
+    done
+}
+
+@test "an export that cannot be written does not say that tokens were exported" {
+    a_token >"$DIR/id"
+    into /dev/full export
+    expect 4 "" "vemo-access-token: cannot write the result: No space left on device"
+}
+
+@test "a token whose id could not be printed does not stay" {
+    tool init
+    into /dev/full create --uid 0 --function VPN
+    expect 4 "" "vemo-access-token: cannot write the result: No space left on device; the token was taken back"
+    into - create --uid 0 --function VPN
+    expect 4 "" "vemo-access-token: cannot write the result: Bad file descriptor; the token was taken back"
+    into /dev/full create --verbose --uid 0 --function VPN
+    expect 4 "" "vemo-access-token: cannot write the result: No space left on device; the token was taken back"
+    into - create --verbose --uid 0 --function VPN
+    [ "$status" -eq 4 ]
+    [ "$(tokens)" -eq 0 ]
+}
+
+@test "a token whose id went into a closed pipe does not stay" {
+    tool init
+    into_closed_pipe create --uid 0 --function VPN
+    expect 4 "" "vemo-access-token: cannot write the result: Broken pipe; the token was taken back"
+    [ "$(tokens)" -eq 0 ]
+}
+
+@test "a reader that has seen enough ends a listing quietly" {
+    a_token >"$DIR/id"
+    into_closed_pipe list
+    expect 141 ""
+}
+
+@test "streams that are closed at the start do not turn into the database" {
+    local id
+    id=$(a_token)
+    cp "$DB" "$DIR/before"
+    run bash -c '"$@" <&- 2>&-' - "$TOOL" show unknown-token
+    [ "$status" -eq 3 ]
+    [ "$output" = "" ]
+    run bash -c '"$@" <&- >&- 2>&-' - "$TOOL" list
+    [ "$status" -eq 4 ]
+    run bash -c '"$@" <&- >&-' - "$TOOL" revoke -
+    [ "$status" -eq 2 ]
+    [ "$output" = "vemo-access-token: TID: there is no id on standard input" ]
+    cmp "$DB" "$DIR/before"
+    run bash -c '"$@" 2>&-' - "$TOOL" list --field uid
+    [ "$status" -eq 0 ]
+    [ "$output" = 0 ]
+}
+
+@test "no id appears on standard error, nor where ids are masked" {
+    local id other
+    id=$(a_token --allow Api:get --unlimited)
+    other=_${id:1} # no character of an id
+    tool export "$DIR/lines"
+    sed "s/${id:0:20}/short/" "$DIR/lines" | sed "s/\"tid\":\"[^\"]*\"/\"tid\":\"${id:0:126}\"/" >"$DIR/too-short"
+    while read -r arguments; do
+        # shellcheck disable=SC2086
+        run_tool $arguments
+        [[ $output$stderr != *"${id:1:20}"* ]] || {
+            echo "$arguments"
+            echo "output: $output"
+            echo "stderr: $stderr"
+            return 1
+        }
+    done <<TABLE
+list
+list -o json
+list -o jsonl
+list --field tid
+stats
+stats --prometheus
+check $id Api get
+check $other Api get
+grant $id Api get
+grant $id Api put
+grant $other Api get
+show $other
+update $id --bind-sid x
+update $other --bind-sid x
+update $id --remove-allow Api:put
+create --uid 0 --function TAG --tid $id
+create --uid 0 --function TAG --tid ${id:0:126}
+import $DIR/lines
+import $DIR/too-short
+revoke --dry-run $id
+revoke $other
+purge
+doctor
+tune --dry-run
+TABLE
+    sql "UPDATE token SET deadline = -1"
+    run_tool doctor
+    [ "$status" -eq 5 ]
+    [ "${lines[0]}" = "warning: a deadline of 0 or less in 1 token (${id:0:8})" ]
+}
+
+# Superfluous arguments are named, but this one may be an id that got there by mistake.
+@test "no id appears on standard error when it stands in a wrong place" {
+    local id
+    id=$(a_token)
+    while read -r arguments; do
+        # shellcheck disable=SC2086
+        run_tool $arguments
+        [ "$status" -eq 2 ]
+        [ "$output" = "" ]
+        [[ $stderr == "vemo-access-token: "* ]]
+        [[ $stderr != *"${id:8:20}"* ]] || {
+            echo "$arguments"
+            echo "stderr: $stderr"
+            return 1
+        }
+    done <<TABLE
+$id
+list $id
+purge $id
+show $id $id
+check $id Api get $id
+update $id $id --uses 1
+show --tid=$id
+grant --id=$id Api
+list --field $id
+list --sort $id
+list --limit $id
+list --user $id
+list -o $id
+create --uid 0 --function TAG --ttl $id
+create --uid $id --function TAG
+TABLE
+}
+
+@test "no id appears on standard error when a long beginning fits several tokens" {
+    local id
+    id=$(a_token)
+    tool create --uid 0 --function VPN --tid "${id:0:126}-1" >/dev/null
+    tool create --uid 0 --function VPN --tid "${id:0:126}-2" >/dev/null
+    run_tool show "${id:0:126}"
+    expect 2 "" "vemo-access-token: TID: several tokens begin with \"${id:0:8}...\"; give more of the id"
+}
