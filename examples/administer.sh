@@ -48,10 +48,9 @@ create()
 step "Before the first program needs them: the private directory, the file and the table."
 call 0 init
 
-share= sync= view= # set by create
-
 step "A token for root: two uses, for an hour, of two methods of one API. The id is printed once."
 create share --user root --function demo-share --ttl 1h --uses 2 --allow Demo.File:get,list
+# shellcheck disable=SC2154 # create has set it
 echo "   (${share:0:8}..., ${#share} characters)"
 call 0 list --function demo-share
 

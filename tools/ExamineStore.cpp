@@ -18,7 +18,7 @@ using tool::Store;
 
 const time_t JOURNAL_AGE_MAX = 10;    // seconds; a change takes far less
 const int64_t BACKLOG_AGE_MAX = 3600; // seconds; every call purges
-const int64_t TOKENS_WITHOUT_INDEX = 10000;
+const uint64_t TOKENS_WITHOUT_INDEX = 10000;
 const size_t NAMED_MAX = 5; // tokens that a finding names
 
 // Whether a journal stands there that holds half a change: one that was carried out is removed, or its
@@ -224,7 +224,7 @@ void examineDeadlines(Store& store, Findings& findings)
 
 void examineIndexes(Store& store, Findings& findings)
 {
-    const int64_t nTokens = store.number("SELECT count(*) FROM token");
+    const uint64_t nTokens = store.number("SELECT count(*) FROM token");
     const std::string strIndexed =
         "SELECT count(*) FROM pragma_index_list('token') AS list, "
         "pragma_index_info(list.name) AS info WHERE info.seqno = 0 AND info.name = 'deadline'";
