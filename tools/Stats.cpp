@@ -23,26 +23,26 @@ struct Options {
 
 struct Group {
     std::string strName;
-    int64_t nTokens;
+    uint64_t nTokens;
 };
 
 struct UserGroup {
-    std::optional<int64_t> nUid; // nothing for a NULL
-    int64_t nTokens;
+    std::optional<Json::Int64> nUid; // nothing for a NULL
+    uint64_t nTokens;
 };
 
 struct Statistics {
-    int64_t nTokens;
-    int64_t nExpired;
-    int64_t nUnlimited;
+    uint64_t nTokens;
+    uint64_t nExpired;
+    uint64_t nUnlimited;
     std::vector<Group> functions;
     std::vector<UserGroup> users;
-    int64_t nFileBytes;
-    int64_t nFreePages;
-    int64_t nPageBytes;
+    uint64_t nFileBytes;
+    uint64_t nFreePages;
+    uint64_t nPageBytes;
 };
 
-int64_t numberOf(const std::optional<std::string>& strText)
+Json::Int64 numberOf(const std::optional<std::string>& strText)
 {
     return strtoll(strText.value_or("").c_str(), nullptr, 10);
 }
@@ -57,17 +57,17 @@ Statistics collect()
     statistics.nUnlimited = store.number(strCount + " WHERE count < 0");
     for (const auto& row :
          store.query("SELECT function, count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
-        statistics.functions.push_back({row[0].value_or(""), numberOf(row[1])});
+        statistics.functions.push_back({row[0].value_or(""), static_cast<uint64_t>(numberOf(row[1]))});
     }
     for (const auto& row :
          store.query("SELECT CAST(uid AS INTEGER), count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
-        const auto nUid = row[0] ? std::optional<int64_t>(numberOf(row[0])) : std::nullopt;
-        statistics.users.push_back({nUid, numberOf(row[1])});
+        const auto nUid = row[0] ? std::optional<Json::Int64>(numberOf(row[0])) : std::nullopt;
+        statistics.users.push_back({nUid, static_cast<uint64_t>(numberOf(row[1]))});
     }
     statistics.nFreePages = store.number("PRAGMA freelist_count");
     statistics.nPageBytes = store.number("PRAGMA page_size");
     const auto status = tool::statusOf(VEMO_ATOKEN_DB_PATH);
-    statistics.nFileBytes = status ? status->st_size : 0;
+    statistics.nFileBytes = status ? static_cast<uint64_t>(status->st_size) : 0;
     return statistics;
 }
 
@@ -108,25 +108,25 @@ void printTables(const Statistics& statistics, bool blHeader)
 Json::Value jsonOf(const Statistics& statistics)
 {
     Json::Value jStatistics;
-    jStatistics["tokens"] = Json::Int64{statistics.nTokens};
-    jStatistics["expired"] = Json::Int64{statistics.nExpired};
-    jStatistics["unlimited"] = Json::Int64{statistics.nUnlimited};
-    jStatistics["file_bytes"] = Json::Int64{statistics.nFileBytes};
-    jStatistics["free_pages"] = Json::Int64{statistics.nFreePages};
-    jStatistics["page_bytes"] = Json::Int64{statistics.nPageBytes};
+    jStatistics["tokens"] = Json::UInt64{statistics.nTokens};
+    jStatistics["expired"] = Json::UInt64{statistics.nExpired};
+    jStatistics["unlimited"] = Json::UInt64{statistics.nUnlimited};
+    jStatistics["file_bytes"] = Json::UInt64{statistics.nFileBytes};
+    jStatistics["free_pages"] = Json::UInt64{statistics.nFreePages};
+    jStatistics["page_bytes"] = Json::UInt64{statistics.nPageBytes};
     jStatistics["functions"] = Json::Value(Json::arrayValue);
     for (const Group& group : statistics.functions) {
         Json::Value jGroup;
         jGroup["function"] = group.strName;
-        jGroup["tokens"] = Json::Int64{group.nTokens};
+        jGroup["tokens"] = Json::UInt64{group.nTokens};
         jStatistics["functions"].append(jGroup);
     }
     jStatistics["users"] = Json::Value(Json::arrayValue);
     for (const UserGroup& group : statistics.users) {
         Json::Value jGroup;
-        jGroup["uid"] = group.nUid ? Json::Value(Json::Int64{*group.nUid}) : Json::Value();
+        jGroup["uid"] = group.nUid ? Json::Value(*group.nUid) : Json::Value();
         jGroup["user"] = nameOf(group);
-        jGroup["tokens"] = Json::Int64{group.nTokens};
+        jGroup["tokens"] = Json::UInt64{group.nTokens};
         jStatistics["users"].append(jGroup);
     }
     return jStatistics;
@@ -147,7 +147,7 @@ void printFamily(const std::string& strName, const std::string& strHelp)
     tool::print("# HELP " + strName + " " + strHelp + "\n# TYPE " + strName + " gauge\n");
 }
 
-void printMetric(const std::string& strName, const std::string& strHelp, int64_t nValue)
+void printMetric(const std::string& strName, const std::string& strHelp, uint64_t nValue)
 {
     printFamily(strName, strHelp);
     tool::print(strName + " " + std::to_string(nValue) + "\n");
