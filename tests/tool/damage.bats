@@ -339,7 +339,7 @@ revoke --all --yes
 create --uid 0 --function TAG
 import $DIR/other"
     chmod 0000 "$VEMO_REDIRECT_DIR"
-    doctor_looks "$REAL_DB: Permission denied"
+    doctor_looks "${REAL_DB%/*} cannot be written to: Permission denied"
     all_fail "$REAL_DB: Permission denied"
     chmod 0700 "$VEMO_REDIRECT_DIR"
 }

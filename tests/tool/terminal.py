@@ -12,6 +12,7 @@ The exit status is the program's, as a shell tells it; 99 when a TEXT or the pro
 import argparse
 import os
 import pty
+import signal
 import sys
 import termios
 
@@ -38,7 +39,9 @@ def main():
     arguments = parser.parse_args()
 
     child = pexpect.spawn(arguments.command[0], arguments.command[1:],
-                          dimensions=(24, arguments.columns), timeout=TIMEOUT)
+                          dimensions=(24, arguments.columns), timeout=TIMEOUT,
+                          # What runs in the background of a script ignores it.
+                          preexec_fn=lambda: signal.signal(signal.SIGINT, signal.SIG_DFL))
     child.delaybeforesend = None
     child.ptyproc.delayafterclose = 0
     shown = b""
