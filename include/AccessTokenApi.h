@@ -61,8 +61,8 @@ public:
     int tokenCreateByTid(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
                          std::string& strTidIn);
 
-    // The same under a new random id, which strTidOut receives on success. On failure strTidOut is
-    // left as it was.
+    // Creates a token as tokenCreateByTid does, under a new random id, which strTidOut receives on
+    // success. On failure strTidOut is left as it was.
     int tokenCreate(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
                     std::string& strTidOut);
 
@@ -92,16 +92,17 @@ public:
     // record that lacks a field or has one of a wrong type. jToken is only read.
     int tokenSaveByOverwrite(Json::Value& jToken);
 
-    // Deletions return the number of tokens deleted, 0 when nothing matched, or -1.
-    // By value of a string field (szName is "tid", "bind_sid" or "function"): the list must not be
-    // empty, and with more than one value it matches nothing (README, lists in filters).
+    // Delete tokens by the value of a string field (szName is "tid", "bind_sid" or "function"), by id,
+    // by login session or by purpose. A list with more than one value matches nothing (README, lists
+    // in filters).
+    // Return the number of tokens deleted, 0 when nothing matched, or -1, also for an empty argument.
     int tokenDeleteByArray(std::vector<std::string>& strVector, const char* szName);
     int tokenDeleteByName(std::string& strValue, const char* szName);
     int tokenDeleteByTid(std::string& strTid);
     int tokenDeleteByBindSid(std::string& strSid);
     int tokenDeleteByFunction(std::string& strFunction);
     int tokenDeleteByTidArray(std::vector<std::string>& strTidVector);
-    // Every token there is.
+    // Deletes every token there is. Returns the number of tokens deleted, or -1.
     int tokenDeleteAll();
 
     // Deletes the tokens whose deadline lies before now; a deadline of -1 does. blLogErr false

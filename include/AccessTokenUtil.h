@@ -50,8 +50,9 @@ VEMO_ATOKEN_EXPORT int tokenGenerate(std::string& strTid);
 // epoch. Always returns 0.
 VEMO_ATOKEN_EXPORT int getTimeAfterNow(int offsetSecond, long& now);
 
-// The same as text in UTC, such as "Fri, 02 Jan 2026 13:00:00 GMT". The names of days and months
-// follow the process's LC_TIME locale. Returns 0, or -1 with strTime unchanged.
+// Sets strTime to the current time plus offsetSecond as text in UTC, such as
+// "Fri, 02 Jan 2026 13:00:00 GMT". The names of days and months follow the process's LC_TIME locale.
+// Returns 0, or -1 with strTime unchanged.
 VEMO_ATOKEN_EXPORT int getTimeAfterNow(int offsetSecond, std::string& strTime);
 
 // Whether the record's webapi_allow lists a web API and its method. Names are compared byte by
@@ -65,10 +66,10 @@ VEMO_ATOKEN_EXPORT int checkPermission(Json::Value& jToken, const char* szWebapi
                                        const char* szWebapiMethod);
 
 // The log switches, both off when the library is loaded. true switches on, for the rest of the
-// process; false only reads. They return the state after the call.
+// process; false only reads, as the functions named ...Get do. All return the state after the call.
 //   logToStdout: lines go to standard output instead of the system log (priority LOG_ERR).
 //   debugInfo: the lines that trace what is done are written as well. They carry whole records,
-//   token ids included.
+//     token ids included.
 // Any thread may call them at any time; a thread that has not yet seen a switch logs the old way.
 VEMO_ATOKEN_EXPORT bool logToStdout(bool blOn);
 VEMO_ATOKEN_EXPORT bool logToStdoutGet();

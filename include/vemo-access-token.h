@@ -26,11 +26,13 @@
 extern "C" {
 
 // Creates a token under a new random id, which strTid receives on success.
-// Arguments and jTokenOption as for AccessTokenApi::tokenCreate. Returns 0 or -1.
+// Arguments and jTokenOption as for AccessTokenApi::tokenCreateByTid. Returns 0, or -1 with strTid
+// unchanged.
 VEMO_ATOKEN_EXPORT int VemoAccessTokenCreate(unsigned int& uid, std::string& strFunction,
                                              Json::Value& jTokenOption, std::string& strTid);
 
-// Creates a token under the caller's id strTid, of 127 characters at least. Returns 0 or -1.
+// Creates a token under the caller's id strTid, of 127 characters at least. Arguments and
+// jTokenOption as for AccessTokenApi::tokenCreateByTid. Returns 0 or -1.
 VEMO_ATOKEN_EXPORT int VemoAccessTokenCreateByTid(unsigned int& uid, std::string& strFunction,
                                                   Json::Value& jTokenOption, std::string& strTid);
 
@@ -40,12 +42,13 @@ VEMO_ATOKEN_EXPORT int VemoAccessTokenGenerate(std::string& strTid);
 
 // Whether the bearer of strTid may call szWebapiMethod of szWebapiName; a null or empty method asks
 // for the API alone. A grant spends one use of the token, a refusal none.
-// Returns 0 and sets jToken to the token's record, or -1 with jToken unchanged.
+// Returns 0 and sets jToken to the token's record (see AccessTokenApi::tokenGrant), or -1 with jToken
+// unchanged.
 VEMO_ATOKEN_EXPORT int VemoAccessTokenGrantEx(std::string& strTid, const char* szWebapiName,
                                               const char* szWebapiMethod, Json::Value& jToken);
 
-// The same, and writes the name of the token's user to szUser, a buffer of cbUser bytes. No name is
-// looked up when szUser is null or cbUser is 0.
+// Grants as VemoAccessTokenGrantEx does, and writes the name of the token's user to szUser, a buffer
+// of cbUser bytes. No name is looked up when szUser is null or cbUser is 0.
 // Returns 0, or -1 when the grant is refused (szUser unchanged), the user is unknown, or the name
 // with its terminator does not fit (szUser then holds what fits, terminated). A grant that fails for
 // the name has spent its use.
@@ -53,7 +56,8 @@ VEMO_ATOKEN_EXPORT int VemoAccessTokenGrant(std::string& strTid, const char* szW
                                             const char* szWebapiMethod, char* szUser, size_t cbUser);
 
 // Delete tokens by id, by login session and by purpose. Return the number of tokens deleted, 0 when
-// there were none, or -1. Deleting by session does not delete expired tokens of other sessions.
+// there were none, or -1, also for an empty argument and a null szSid. Deleting by session does not
+// delete expired tokens of other sessions.
 VEMO_ATOKEN_EXPORT int VemoAccessTokenDeleteByTid(std::string& strTid);
 VEMO_ATOKEN_EXPORT int VemoAccessTokenDeleteByBindSid(const char* szSid);
 VEMO_ATOKEN_EXPORT int VemoAccessTokenDeleteByFunction(std::string& strFunction);

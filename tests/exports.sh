@@ -13,6 +13,12 @@ if [ "$soname" != libvemoaccesstoken.so.6 ]; then
     status=1
 fi
 
+# Json::Value crosses the interface: another jsoncpp would be another interface.
+if ! objdump -p "$library" | grep -q 'NEEDED *libjsoncpp.so.25$'; then
+    echo "the library needs another jsoncpp than callers have been compiled with"
+    status=1
+fi
+
 # Records that callers keep point at names in the library.
 if ! readelf -d "$library" | grep -q NODELETE; then
     echo "the library can be unloaded"

@@ -50,7 +50,7 @@ public:
     // Sets strSql to the statement that creates the table. Returns 0.
     int SqlExpandCreateTable(std::string& strSql);
 
-    // Creates the table if it is missing, for a file that was made without it.
+    // Creates the table if it is missing, for a file that was made without it. Returns 0 or -1.
     int createTable();
 
     // Runs a statement on the open connection. While the database is locked by others it tries
@@ -77,14 +77,16 @@ public:
     // exists, false replaces the row of that tid or inserts it. Types are the caller's business.
     // Returns 0 or -1.
     int tokenSave(Json::Value& jParam, bool blCreate);
-    int tokenCreate(Json::Value& jParam); // tokenSave(jParam, true)
-    int tokenUpdate(Json::Value& jParam); // tokenSave(jParam, false)
+    int tokenCreate(Json::Value& jParam); // the same as tokenSave(jParam, true)
+    int tokenUpdate(Json::Value& jParam); // the same as tokenSave(jParam, false)
 
     // Append the column names, or their formatting directives and ")", to strSql. Return 0.
     int SqlExpandMemberName(std::string& strSql);
     int SqlExpandMemberSymbol(std::string& strSql);
 
-    // Filters as SQL. All append to strSqlWhereOut; what they appended before a failure stays.
+    // Filters as SQL
+    //
+    // All append to strSqlWhereOut; what they appended before a failure stays.
     // Values of text and JSON fields are quoted and escaped. Those of number fields are not quoted,
     // whatever their type: a string there becomes part of the statement.
 
@@ -92,7 +94,8 @@ public:
     // the filter names no token field (nothing is appended), or -1.
     int SqlWhereFromJson(Json::Value& jTokenParam, std::string& strSqlWhereOut, bool bAnd);
 
-    // One field's condition: equality with a value, membership of a list. Return 0 or -1.
+    // One field's condition: equality with the value jParam, or membership of the array jList, where an
+    // empty one appends nothing. Return 0, or -1, also when the name is that of no token field.
     int SqlMakeByMatchField(std::string& strField, Json::Value& jParam, std::string& strSqlWhereOut);
     int SqlMakeByListField(const char* szField, Json::Value& jList, std::string& strSqlWhereOut);
 
@@ -115,7 +118,9 @@ public:
     // Returns the number of tokens deleted, or -1.
     int tokenDelete(Json::Value& jTokenParam, bool bAll);
 
-    // State: for callers to read, but for m_strSql, which is set ahead of runSql
+    // State
+    //
+    // For callers to read, but for m_strSql, which is set ahead of runSql.
 
     sqlite3* m_pDb;       // the connection; null when closed
     std::string m_strSql; // the statement that runSql runs, or ran last
