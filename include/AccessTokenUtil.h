@@ -25,7 +25,8 @@ namespace VEMO_ACCESS_TOKEN {
 // Type names are "string", "long long" and "Json::objectValue". The table is built by the first
 // call, so its default of create_time is the time of that call for the rest of the process.
 // Never fails. The library owns the table, and callers only read it; it lives until the process
-// exits. The very first call is not safe against another first call in a second thread.
+// destroys its static objects: exit handlers registered ahead of the first call must not use it. The
+// very first call is not safe against another first call in a second thread.
 VEMO_ATOKEN_EXPORT Json::Value& tokenType();
 
 // Checks the types of those members of jTokenParam that are token fields; members of other names

@@ -6,6 +6,7 @@ set -euo pipefail
 build=$1
 json=$2
 readme=$3
+source=$(dirname "$readme")
 shift 3
 dir=$(mktemp -d)
 trap 'rm -rf "$dir"' EXIT
@@ -34,13 +35,12 @@ done <"$dir/headers"
 
 echo "The installed tool:"
 LD_LIBRARY_PATH=$libdir "$dir/usr/sbin/vemo-access-token" --version
-(cd "$dir/usr/share" && find . -type f | LC_ALL=C sort) | tee "$dir/shared"
-diff "$dir/shared" - <<END
-./bash-completion/completions/vemo-access-token
-./fish/vendor_completions.d/vemo-access-token.fish
-./man/man8/vemo-access-token.8
-./zsh/site-functions/_vemo-access-token
-END
+
+echo "The installed manual pages and completions:"
+(cd "$dir/usr/share" && find . ! -type d | LC_ALL=C sort) | tee "$dir/shared"
+(cd "$source/man" && find . -name '*.[3578]' | sed -E 's,\./(.*)\.([3578])$,./man/man\2/\1.\2,'
+    printf '%s\n' ./bash-completion/completions/vemo-access-token ./zsh/site-functions/_vemo-access-token \
+        ./fish/vendor_completions.d/vemo-access-token.fish) | LC_ALL=C sort | diff "$dir/shared" -
 
 echo "The example of README:"
 sed -n '/^```cpp$/,/^```$/p' "$readme" | grep -v '^```' >"$dir/example.cpp"
