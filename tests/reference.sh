@@ -9,7 +9,7 @@ trap 'rm -rf "$dir"' EXIT
 
 configure()
 {
-    cmake -S "$source" -B "$dir/build" -DBUILD_TESTING=OFF -DVEMO_ATOKEN_TOOL=OFF "$@" >"$dir/configure.log"
+    cmake -S "$source" -B "$dir/build" -G Ninja -DBUILD_TESTING=OFF -DVEMO_ATOKEN_TOOL=OFF "$@" >"$dir/configure.log"
 }
 
 echo "Without Doxygen:"

@@ -5,7 +5,6 @@
 
 #include <cerrno>
 #include <cstring>
-#include <ctime>
 
 #include "AccessTokenDefine.h"
 #include "Failure.h"
@@ -14,9 +13,6 @@ namespace {
 
 const mode_t PRIVATE_MODE = 0700;
 const mode_t PARENT_MODE = 0755;
-const time_t CREATION_AGE_MAX = 1; // seconds
-const int CREATION_TRIES = 100;
-const useconds_t CREATION_WAIT_USEC = 10000;
 
 [[noreturn]] void failOn(const std::string& strPath)
 {
@@ -84,7 +80,8 @@ void requireDatabase(bool blCreate)
     if (ENOENT != errno) {
         failOn(VEMO_ATOKEN_DB_PATH);
     }
-    if (statusOf(VEMO_ATOKEN_DB_PATH)) {
+    const auto linkStatus = statusOf(VEMO_ATOKEN_DB_PATH);
+    if (linkStatus && S_ISLNK(linkStatus->st_mode)) {
         throw Failure(EXIT_STATUS_STORE,
                       VEMO_ATOKEN_DB_PATH " is a symbolic link to a file that is not there");
     }
@@ -95,17 +92,6 @@ void requireDatabase(bool blCreate)
     if (!blCreate) {
         throw Failure(EXIT_STATUS_STORE, "there is no database " VEMO_ATOKEN_DB_PATH,
                       "\"vemo-access-token init\" makes it");
-    }
-}
-
-void awaitCreation()
-{
-    const auto isBeingMade = [] {
-        const auto status = statusOf(VEMO_ATOKEN_DB_PATH);
-        return status && 0 == status->st_size && time(nullptr) - status->st_mtime <= CREATION_AGE_MAX;
-    };
-    for (int i = 0; i < CREATION_TRIES && isBeingMade(); ++i) {
-        usleep(CREATION_WAIT_USEC);
     }
 }
 

@@ -22,10 +22,6 @@ std::string firstBytes(const std::string& strPath, size_t cbWanted);
 // Fails, with the reason, unless the database can be opened, or made if blCreate.
 void requireDatabase(bool blCreate);
 
-// Waits, for a second at most, while another program is making the database: the table comes a moment
-// after the file.
-void awaitCreation();
-
 // Makes the private directory, and those above it, where they are missing. Returns whether it was
 // made.
 bool makeDirectory();

@@ -106,9 +106,6 @@ std::vector<std::string> fieldNames()
 Store::Store(Access access, Missing missing) : m_access(access)
 {
     requireDatabase(Missing::Make == missing);
-    if (Missing::Make == missing) {
-        awaitCreation();
-    }
     errno = 0;
     if (0 > m_db.initDb()) {
         const std::string strReason = errno ? std::string(": ") + strerror(errno) : "";
@@ -121,6 +118,11 @@ Store::Store(Access access, Missing missing) : m_access(access)
         query("SELECT count(*) FROM sqlite_schema"); // takes the lock
         break;
     case Access::Write:
+        // A database without anything is one that another program is just making, or was kept from making:
+        // the table comes after the file. Whoever is first makes it.
+        if (Missing::Make == missing && 0 == number("SELECT count(*) FROM sqlite_schema")) {
+            makeTable();
+        }
         if (!hasTable()) {
             fail("no such table: token"); // before an empty file becomes a database without one
         }

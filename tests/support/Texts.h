@@ -34,9 +34,9 @@ std::string fieldList(int nLine);
 
 // Statements.
 const char* const COLUMNS = "tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra";
-const std::string SELECT = std::string("SELECT ") + COLUMNS + " FROM token ";
-const std::string PURGE = "DELETE FROM token where deadline < strftime('%s', 'now');";
-const std::string SCHEMA =
+inline const std::string SELECT = std::string("SELECT ") + COLUMNS + " FROM token ";
+inline const std::string PURGE = "DELETE FROM token where deadline < strftime('%s', 'now');";
+inline const std::string SCHEMA =
     "PRAGMA auto_vacuum = FULL; CREATE TABLE if not exists token (tid TEXT primary key NOT NULL,"
     "bind_sid TEXT,uid INTEGER,deadline INTEGER default -1,count INTEGER default 1,"
     "create_time INTEGER default CURRENT_TIMESTAMP,function TEXT NOT NULL,webapi_allow TEXT,extra TEXT);";

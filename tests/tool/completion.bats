@@ -20,13 +20,13 @@ options_of()
 prepare()
 {
     COMPLETION=$BATS_TEST_DIRNAME/../../tools/completion
-    mkdir -p "$DIR/bin" "$DIR/home" "$DIR/work/backups"
-    touch "$DIR/work/data file.json" "$DIR/work/backups/tokens"
+    mkdir -p "$DIR/bin" "$DIR/home" "$DIR/files/backups"
+    touch "$DIR/files/data file.json" "$DIR/files/backups/tokens"
     printf '#!/bin/sh\ntouch "%s/called"\n' "$DIR" >"$DIR/bin/vemo-access-token"
     chmod +x "$DIR/bin/vemo-access-token"
     export PATH=$DIR/bin:$PATH HOME=$DIR/home LC_ALL=C.UTF-8
     unset XDG_CONFIG_HOME XDG_DATA_HOME XDG_CACHE_HOME
-    cd "$DIR/work"
+    cd "$DIR/files"
 }
 
 not_called()

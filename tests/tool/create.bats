@@ -336,7 +336,7 @@ $OWN|1" ]
     [ "$(stat -c %a "$DB")" = 700 ]
 }
 
-@test "create makes no directory, and mends no file" {
+@test "create makes no directory, and no table in another database" {
     # says REASON: what a creation fails with, and that it leaves all as it was
     says()
     {
@@ -348,10 +348,17 @@ $OWN|1" ]
     }
     says "there is no directory ${REAL_DB%/*}; \"vemo-access-token init\" makes it"
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
-    : >"$DB"
-    says "$REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
     sql "CREATE TABLE other (tid)"
     says "$REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
+}
+
+@test "create makes the table in an empty file, as a creation that was caught half-way leaves it" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    : >"$DB"
+    run_tool create --uid 0 --function VPN
+    [ "$status" -eq 0 ]
+    [ "$(sql "SELECT tid FROM token; PRAGMA auto_vacuum")" = "$output
+1" ]
 }
 
 @test "generate prints a new id each time, and touches no database" {

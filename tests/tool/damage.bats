@@ -219,7 +219,8 @@ create --uid 0 --function TAG"
 @test "an empty file has no table, and init makes it" {
     a_store
     : >"$DB"
-    all_fail "$REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it" "$(some_commands)"
+    all_fail "$REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it" \
+        "$(some_commands | grep -v '^create')"
     run_shortly doctor
     [ "$status" -eq 5 ]
     [ "${lines[0]}" = "error: the database has no table of tokens" ]

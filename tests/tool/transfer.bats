@@ -478,10 +478,11 @@ TABLE
         run_tool import "$file"
         expect 4 "" "vemo-access-token: there is no directory ${REAL_DB%/*}; \"vemo-access-token init\" makes it"
         mkdir -m 0700 "$VEMO_REDIRECT_DIR"
-        : >"$DB"
+        sql "CREATE TABLE other (tid)"
+        cp "$DB" "$DIR/other"
         run_tool import "$file"
         expect 4 "" "vemo-access-token: $REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
-        [ ! -s "$DB" ]
+        cmp "$DB" "$DIR/other"
         echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
         cp "$DB" "$DIR/text"
         run_tool import "$file"
