@@ -11,10 +11,11 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <climits>
 #include <cstdarg>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <string>
 
 #include "AccessTokenDefine.h"
 
@@ -29,15 +30,29 @@ const char* directory()
     return getenv("VEMO_REDIRECT_DIR");
 }
 
-// The private directory and all paths in it.
-std::string redirected(const char* szPath)
-{
-    static const std::string strPrivate(VEMO_ATOKEN_DB_PATH, strrchr(VEMO_ATOKEN_DB_PATH, '/'));
-    const size_t cchPrivate = strPrivate.size();
-    const bool blPrivate = 0 == strPrivate.compare(0, cchPrivate, szPath, strnlen(szPath, cchPrivate)) &&
-                           (szPath[cchPrivate] == '\0' || szPath[cchPrivate] == '/');
-    return blPrivate && directory() ? std::string(directory()) + &szPath[cchPrivate] : szPath;
-}
+// A path, led elsewhere if it is the private directory or lies in it. Takes nothing from the heap, like the
+// calls that it serves.
+class Redirected {
+public:
+    explicit Redirected(const char* szPath) : m_szPath(szPath)
+    {
+        const char* szDatabase = VEMO_ATOKEN_DB_PATH;
+        const size_t cchPrivate = static_cast<size_t>(strrchr(szDatabase, '/') - szDatabase);
+        const bool blPrivate = 0 == strncmp(szPath, szDatabase, cchPrivate) &&
+                               (szPath[cchPrivate] == '\0' || szPath[cchPrivate] == '/');
+        if (blPrivate && directory()) {
+            snprintf(m_szOwn, sizeof(m_szOwn), "%s%s", directory(), &szPath[cchPrivate]);
+            m_szPath = m_szOwn;
+        }
+    }
+    Redirected(const Redirected&) = delete;
+    Redirected& operator=(const Redirected&) = delete;
+    const char* path() const { return m_szPath; }
+
+private:
+    const char* m_szPath;
+    char m_szOwn[PATH_MAX];
+};
 
 // What a path's status says when the real user is taken for root.
 int redirectedStatus(int nResult, struct stat* pStatus)
@@ -75,32 +90,32 @@ REDIRECT_EXPORT int seteuid(uid_t uid) noexcept
 
 REDIRECT_EXPORT int access(const char* szPath, int nMode) noexcept
 {
-    return NEXT(access)(redirected(szPath).c_str(), nMode);
+    return NEXT(access)(Redirected(szPath).path(), nMode);
 }
 
 REDIRECT_EXPORT int chmod(const char* szPath, mode_t mode) noexcept
 {
-    return NEXT(chmod)(redirected(szPath).c_str(), mode);
+    return NEXT(chmod)(Redirected(szPath).path(), mode);
 }
 
 REDIRECT_EXPORT int chown(const char* szPath, uid_t uid, gid_t gid) noexcept
 {
-    return NEXT(chown)(redirected(szPath).c_str(), directory() && 0 == uid ? getuid() : uid, gid);
+    return NEXT(chown)(Redirected(szPath).path(), directory() && 0 == uid ? getuid() : uid, gid);
 }
 
 REDIRECT_EXPORT int mkdir(const char* szPath, mode_t mode) noexcept
 {
-    return NEXT(mkdir)(redirected(szPath).c_str(), mode);
+    return NEXT(mkdir)(Redirected(szPath).path(), mode);
 }
 
 REDIRECT_EXPORT int stat(const char* szPath, struct stat* pStatus) noexcept
 {
-    return redirectedStatus(NEXT(stat)(redirected(szPath).c_str(), pStatus), pStatus);
+    return redirectedStatus(NEXT(stat)(Redirected(szPath).path(), pStatus), pStatus);
 }
 
 REDIRECT_EXPORT int lstat(const char* szPath, struct stat* pStatus) noexcept
 {
-    return redirectedStatus(NEXT(lstat)(redirected(szPath).c_str(), pStatus), pStatus);
+    return redirectedStatus(NEXT(lstat)(Redirected(szPath).path(), pStatus), pStatus);
 }
 
 REDIRECT_EXPORT int open(const char* szPath, int nFlags, ...)
@@ -109,12 +124,12 @@ REDIRECT_EXPORT int open(const char* szPath, int nFlags, ...)
     va_start(args, nFlags);
     const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
     va_end(args);
-    return NEXT(open)(redirected(szPath).c_str(), nFlags, mode);
+    return NEXT(open)(Redirected(szPath).path(), nFlags, mode);
 }
 
 REDIRECT_EXPORT int sqlite3_open(const char* szPath, sqlite3** ppDb)
 {
-    return NEXT(sqlite3_open)(redirected(szPath).c_str(), ppDb);
+    return NEXT(sqlite3_open)(Redirected(szPath).path(), ppDb);
 }
 
 } // extern "C"

@@ -3,6 +3,7 @@
 #include <json/reader.h>
 #include <json/writer.h>
 
+#include <cstring>
 #include <memory>
 #include <sstream>
 
@@ -41,31 +42,42 @@ std::unique_ptr<std::ostringstream> makeStream()
 // A writer and a reader, which cost more to make than a token's texts to write and to read.
 class Codec {
 public:
-    Codec() : m_pWriter(makeWriter()), m_pReader(makeReader()), m_pStream(makeStream()) {}
+    Codec() : m_pWriter(makeWriter()), m_pReader(makeReader()) {}
 
     std::string write(const Json::Value& jValue)
     {
-        m_pStream->clear();
-        m_pStream->str(std::string());
-        m_pWriter->write(jValue, m_pStream.get());
-        std::string strText = m_pStream->str();
-        if (KEPT_MAX < strText.size()) {
-            m_pStream = makeStream();
+        // Kept for the next text, unless it has grown too much or failed.
+        std::unique_ptr<std::ostringstream> pStream = m_pStream ? std::move(m_pStream) : makeStream();
+        m_pWriter->write(jValue, pStream.get());
+        std::string strText = pStream->str();
+        if (strText.size() <= KEPT_MAX) {
+            pStream->str(std::string());
+            m_pStream = std::move(pStream);
         }
         return strText;
     }
 
     void read(std::string_view strText, Json::Value& jValue)
     {
-        jValue = Json::Value();
         try {
-            m_pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, nullptr);
-        } catch (const Json::Exception&) {
-            // Nested beyond the reader's limit. What was read stands, as after any other bad text.
+            // A text is bad when it is so twice: the reader takes a number for none when memory runs out.
+            parse(strText, jValue) || parse(strText, jValue);
+        } catch (const Json::RuntimeError& error) {
+            // Nested beyond the reader's limit: what was read stands, as after any other bad text. The
+            // same exception says that memory ran out, and then half a value must not pass for the whole.
+            if (!strstr(error.what(), "stackLimit")) {
+                throw;
+            }
         }
     }
 
 private:
+    bool parse(std::string_view strText, Json::Value& jValue)
+    {
+        jValue = Json::Value();
+        return m_pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, nullptr);
+    }
+
     static constexpr size_t KEPT_MAX = 4096; // the longest text whose memory is kept for the next
 
     const std::unique_ptr<Json::StreamWriter> m_pWriter;

@@ -1,0 +1,86 @@
+// Why a process stays at effective uid 0 while it holds a connection: a writer has crashed half-way, and what
+// undoes its half is a journal that others may not see.
+
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include "AccessTokenApi.h"
+#include "Figures.h"
+#include "TokenStore.h"
+
+namespace {
+
+const unsigned int TOKENS = 300;
+const uid_t UID_OTHER = 65534;
+
+// Past the redirection, which keeps an effective uid of its own.
+void setRealEffectiveUid(uid_t uid)
+{
+    ASSERT_EQ(0, syscall(SYS_setresuid, -1, uid, -1));
+}
+
+void makeTokens()
+{
+    AccessTokenApi api;
+    unsigned int uid = 0;
+    std::string strFunction = "VPN";
+    Json::Value jOption(Json::objectValue);
+    jOption["deadline"] = 1000000;
+    jOption["extra"]["filling"] = std::string(1000, 'f'); // three tokens to a page
+    for (unsigned int i = 0; i < TOKENS; ++i) {
+        std::string strTid;
+        ASSERT_EQ(0, api.tokenCreate(uid, strFunction, jOption, strTid));
+    }
+}
+
+// A process that gives each token 99 uses and dies before it commits: with no memory to keep them in, it has
+// written most of the pages.
+void crashHalfWay(const TokenStore& store)
+{
+    const pid_t pid = fork();
+    if (0 == pid) {
+        sqlite3* pDb = nullptr;
+        sqlite3_open(store.path().c_str(), &pDb);
+        sqlite3_exec(pDb, "PRAGMA cache_size = 1; BEGIN; UPDATE token SET count = 99;", nullptr, nullptr,
+                     nullptr);
+        raise(SIGKILL);
+    }
+    int nStatus = 0;
+    ASSERT_EQ(pid, waitpid(pid, &nStatus, 0));
+}
+
+int tokensWith99Uses(AccessTokenApi& api)
+{
+    Json::Value jFilter(Json::objectValue);
+    jFilter["count"] = 99;
+    Json::Value jTokenArray(Json::arrayValue);
+    EXPECT_EQ(0, api.tokenList(jFilter, jTokenArray));
+    return static_cast<int>(jTokenArray.size());
+}
+
+} // namespace
+
+TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
+{
+    if (0 != getuid()) {
+        GTEST_SKIP() << "only root can take another effective uid";
+    }
+    const TokenStore store;
+    makeTokens();
+    AccessTokenApi api; // its connection is open already
+    crashHalfWay(store);
+
+    setRealEffectiveUid(UID_OTHER);
+    const int nHalfChange = tokensWith99Uses(api);
+    setRealEffectiveUid(0);
+    const int nAtRoot = tokensWith99Uses(api);
+
+    EXPECT_LT(100, nHalfChange); // read from a change that never was
+    EXPECT_GT(TOKENS, static_cast<unsigned int>(nHalfChange));
+    EXPECT_EQ(0, nAtRoot); // the journal has been played back
+    figure("hot journal", std::to_string(nHalfChange) + " of " + std::to_string(TOKENS) +
+                              " tokens read from a change that never was");
+}

@@ -1,0 +1,110 @@
+// Every call that SQLite makes on the files of the store fails: once, and from then on.
+
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+#include "FaultyVfs.h"
+#include "Figures.h"
+#include "Oracle.h"
+
+// Nobody waits for a lock here: each wait is cut short, as by a signal.
+extern "C" int usleep(useconds_t)
+{
+    errno = EINTR;
+    return -1;
+}
+
+namespace {
+
+enum class Fault { Error, FullDisk, TornWrite, Locked };
+
+// What a call that fails so answers; SQLITE_OK when this kind of fault does not meet it.
+int answerOf(Fault fault, const FileCall& call)
+{
+    const std::string strName = call.szName;
+    const bool blWrite = "xWrite" == strName;
+    switch (fault) {
+    case Fault::Error:
+        return "xOpen" == strName ? SQLITE_CANTOPEN : blWrite ? SQLITE_IOERR_WRITE : SQLITE_IOERR;
+    case Fault::FullDisk: return blWrite ? SQLITE_FULL : SQLITE_OK;
+    case Fault::TornWrite: return blWrite ? SQLITE_IOERR_WRITE : SQLITE_OK;
+    case Fault::Locked: return "xLock" == strName ? SQLITE_BUSY : SQLITE_OK;
+    }
+    return SQLITE_OK;
+}
+
+// Lets the calls nFirst to nLast fail of those that the fault meets.
+struct Injection {
+    Fault fault = Fault::Error;
+    int64_t nFirst = 0;
+    int64_t nLast = -1;
+    int64_t nCalls = 0;
+
+    int operator()(const FileCall& call, const std::function<int()>& real)
+    {
+        const int nAnswer = answerOf(fault, call);
+        if (SQLITE_OK == nAnswer) {
+            return real();
+        }
+        ++nCalls;
+        if (nCalls < nFirst || nLast < nCalls) {
+            return real();
+        }
+        if (Fault::TornWrite == fault) {
+            call.write(call.cb / 2);
+        }
+        if (0 == strcmp("xClose", call.szName)) {
+            real(); // whatever close answers, the descriptor is gone
+        }
+        return nAnswer;
+    }
+};
+
+struct Case {
+    const char* szName;
+    Fault fault;
+};
+
+class IoFault : public ::testing::TestWithParam<Case> {};
+
+} // namespace
+
+TEST_P(IoFault, LeavesAStateThatTheCallerKnows)
+{
+    TokenStore store;
+    Injection injection;
+    int64_t nInjected = 0;
+
+    for (const Operation& operation : operations()) {
+        SCOPED_TRACE(operation.szName);
+        const Oracle oracle(store, operation);
+        const FaultyVfs vfs(
+            [&](const FileCall& call, const std::function<int()>& real) { return injection(call, real); });
+        const auto judge = [&](int64_t nFirst, int64_t nLast) {
+            const std::string strWrong = oracle.judge(
+                [&] {
+                    injection = {GetParam().fault, nFirst, nLast, 0};
+                },
+                [&] { injection.nLast = 0; });
+            ++nInjected;
+            EXPECT_EQ("", strWrong) << "call " << nFirst << " to " << nLast;
+        };
+        judge(0, -1);
+        const int64_t nCalls = injection.nCalls;
+        for (int64_t nCall = 1; nCall <= nCalls; ++nCall) {
+            judge(nCall, nCall);
+            judge(nCall, INT64_MAX);
+        }
+    }
+    figure("I/O faults",
+           std::string(GetParam().szName) + ": " + std::to_string(nInjected) + " runs of 12 operations");
+}
+
+INSTANTIATE_TEST_SUITE_P(Each, IoFault,
+                         ::testing::Values(Case{"Error", Fault::Error}, Case{"FullDisk", Fault::FullDisk},
+                                           Case{"TornWrite", Fault::TornWrite},
+                                           Case{"Locked", Fault::Locked}),
+                         [](const auto& instance) { return instance.param.szName; });

@@ -1,0 +1,23 @@
+// The operations into which faults are injected, and the store that they find.
+
+#ifndef TESTS_FAULT_OPERATIONS_H
+#define TESTS_FAULT_OPERATIONS_H
+
+#include <vector>
+
+#include "TokenStore.h"
+
+struct Operation {
+    const char* szName;
+    bool blCreatesStore; // finds no file
+    bool blPurges;       // deletes expired tokens first, and goes on when that fails
+    int (*run)();        // the library's result; for a listing, the number of tokens
+};
+
+// Twelve: creating the store, and each way in which the library changes it or reads it.
+const std::vector<Operation>& operations();
+
+// Puts the store in the state in which the operation finds it.
+void prepareStore(const TokenStore& store, const Operation& operation);
+
+#endif

@@ -1,0 +1,107 @@
+#include "Oracle.h"
+
+#include <sqlite3.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <new>
+#include <numeric>
+#include <set>
+#include <sstream>
+#include <stdexcept>
+
+#include "AccessTokenApi.h"
+#include "ProcessState.h"
+
+namespace {
+
+// The lines of the one state, and those of expired tokens in the other.
+std::string withExpired(const std::string& strState, const std::string& strOther)
+{
+    std::multiset<std::string> lines;
+    std::string strLine;
+    std::istringstream state(strState);
+    while (std::getline(state, strLine)) {
+        lines.insert(strLine + "\n");
+    }
+    std::istringstream other(strOther);
+    while (std::getline(other, strLine)) {
+        if (std::string::npos != strLine.find("|past|5|")) {
+            lines.insert(strLine + "\n");
+        }
+    }
+    return std::accumulate(lines.begin(), lines.end(), std::string());
+}
+
+} // namespace
+
+Oracle::Oracle(const TokenStore& store, const Operation& operation) : m_store(store), m_operation(operation)
+{
+    prepareStore(store, operation);
+    m_strBefore = store.state();
+    AccessTokenApi().cleanExpireToken(true);
+    m_strPurged = store.state();
+    prepareStore(store, operation);
+    const Ending ending = run();
+    m_nResult = ending.nResult;
+    m_strAfter = store.state();
+    m_strAfterWithoutPurge = operation.blPurges ? withExpired(m_strAfter, m_strBefore) : m_strAfter;
+    if (ending.blNoMemory || 0 > m_nResult) {
+        throw std::logic_error(std::string("fails undisturbed: ") + operation.szName);
+    }
+}
+
+Oracle::Ending Oracle::run() const
+{
+    try {
+        return {m_operation.run(), false};
+    } catch (const std::bad_alloc&) {
+        return {-1, true};
+    } catch (const Json::RuntimeError&) { // how jsoncpp tells that it got no memory
+        return {-1, true};
+    }
+}
+
+bool Oracle::isDone(const std::string& strState) const
+{
+    return strState == m_strAfter || strState == m_strAfterWithoutPurge;
+}
+
+bool Oracle::allows(const std::string& strState) const
+{
+    return strState == m_strBefore || strState == m_strPurged || isDone(strState) ||
+           (m_operation.blCreatesStore && strState == STATE_NO_TABLE);
+}
+
+std::string Oracle::judge(const std::function<void()>& arm, const std::function<void()>& disarm,
+                          const std::function<uid_t()>& uidAfter) const
+{
+    prepareStore(m_store, m_operation);
+    Log::clear();
+    static_cast<void>(seteuid(UID_CALLER));
+    ProcessState processBefore = ProcessState::now();
+
+    arm();
+    const Ending ending = run();
+    disarm();
+
+    std::string strWrong;
+    if (0 > ending.nResult && !ending.blNoMemory && !Log::text()[0]) {
+        strWrong += "a failure without a log line; ";
+    }
+    if (0 <= ending.nResult && ending.nResult != m_nResult) {
+        strWrong += "another result: " + std::to_string(ending.nResult) + "; ";
+    }
+    processBefore.uidEffective = strstr(Log::text(), "open sqlite failed") ? 0 : uidAfter();
+    strWrong += processBefore.differenceTo(ProcessState::now());
+    if (0 != sqlite3_memory_used()) {
+        strWrong += "SQLite still holds memory; ";
+    }
+    const std::string strState = m_store.state();
+    if (!allows(strState)) {
+        strWrong += "a third state: " + strState.substr(0, 200) + "; ";
+    } else if (0 <= ending.nResult && !isDone(strState)) {
+        strWrong += "reported success, yet the store is: " + strState.substr(0, 200) + "; ";
+    }
+    return strWrong.empty() ? "" : strWrong + "log: " + std::string(Log::text()).substr(0, 2000);
+}

@@ -1,0 +1,139 @@
+// Every call of the system that opening the store takes, the library's own and SQLite's, fails: once, and
+// from then on. (The wait for a lock fails in IoFaultTest.)
+
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdarg>
+#include <cstring>
+
+#include "Figures.h"
+#include "Oracle.h"
+
+namespace {
+
+struct Injection {
+    const char* szFunction = "";
+    int64_t nFirst = 0;
+    int64_t nLast = -1;
+    int64_t nCalls = 0;
+    bool blUidUnknown = false; // at the last time of asking
+    bool blUidRaised = false;  // to 0
+    bool blUidLost = false;    // raised while unknown, or the last try to put it back failed
+
+    bool fails(const char* szName)
+    {
+        if (0 != strcmp(szName, szFunction)) {
+            return false;
+        }
+        ++nCalls;
+        errno = EACCES;
+        return nFirst <= nCalls && nCalls <= nLast;
+    }
+};
+
+Injection g_injection;
+
+template <typename Function>
+Function* next(const char* szName, Function*)
+{
+    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szName));
+}
+
+class SystemCallFault : public ::testing::TestWithParam<const char*> {};
+
+} // namespace
+
+#define NEXT(name) next(#name, &name)
+
+extern "C" {
+
+uid_t geteuid() noexcept
+{
+    g_injection.blUidUnknown = g_injection.fails("geteuid");
+    return g_injection.blUidUnknown ? static_cast<uid_t>(-1) : NEXT(geteuid)();
+}
+
+int seteuid(uid_t uid) noexcept
+{
+    const bool blFails = g_injection.fails("seteuid");
+    if (0 == uid) {
+        g_injection.blUidRaised = !blFails;
+    }
+    g_injection.blUidLost = g_injection.blUidRaised && (0 == uid ? g_injection.blUidUnknown : blFails);
+    return blFails ? -1 : NEXT(seteuid)(uid);
+}
+
+int access(const char* szPath, int nMode) noexcept
+{
+    return g_injection.fails("access") ? -1 : NEXT(access)(szPath, nMode);
+}
+
+int chmod(const char* szPath, mode_t mode) noexcept
+{
+    return g_injection.fails("chmod") ? -1 : NEXT(chmod)(szPath, mode);
+}
+
+int open(const char* szPath, int nFlags, ...)
+{
+    va_list args;
+    va_start(args, nFlags);
+    const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
+    va_end(args);
+    return g_injection.fails("open") ? -1 : NEXT(open)(szPath, nFlags, mode);
+}
+
+int open64(const char* szPath, int nFlags, ...)
+{
+    va_list args;
+    va_start(args, nFlags);
+    const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
+    va_end(args);
+    return g_injection.fails("open") ? -1 : NEXT(open64)(szPath, nFlags, mode);
+}
+
+} // extern "C"
+
+TEST_P(SystemCallFault, LeavesAStateThatTheCallerKnows)
+{
+    TokenStore store;
+    int64_t nInjected = 0;
+
+    for (const Operation& operation : operations()) {
+        SCOPED_TRACE(operation.szName);
+        const Oracle oracle(store, operation);
+        bool blUidLost = false;
+        const auto judge = [&](int64_t nFirst, int64_t nLast) {
+            const std::string strWrong = oracle.judge(
+                [&] {
+                    g_injection = {};
+                    g_injection.nFirst = nFirst;
+                    g_injection.nLast = nLast;
+                    g_injection.szFunction = GetParam();
+                },
+                [&] {
+                    g_injection.szFunction = "";
+                    blUidLost = g_injection.blUidLost;
+                },
+                [&] { return blUidLost ? 0 : UID_CALLER; });
+            EXPECT_EQ("", strWrong) << "call " << nFirst << " to " << nLast;
+            ++nInjected;
+        };
+        judge(0, -1);
+        const int64_t nCalls = g_injection.nCalls;
+        for (int64_t nCall = 1; nCall <= nCalls; ++nCall) {
+            judge(nCall, nCall);
+            judge(nCall, INT64_MAX);
+        }
+    }
+    figure("system calls",
+           std::string(GetParam()) + ": " + std::to_string(nInjected) + " runs of 12 operations");
+}
+
+INSTANTIATE_TEST_SUITE_P(Each, SystemCallFault,
+                         ::testing::Values("geteuid", "seteuid", "access", "chmod", "open"),
+                         [](const auto& instance) { return instance.param; });

@@ -1,0 +1,141 @@
+#include "TokenStore.h"
+
+#include <sqlite3.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <memory>
+#include <numeric>
+#include <set>
+#include <sstream>
+#include <stdexcept>
+
+namespace {
+
+struct Closer {
+    void operator()(sqlite3* pDb) const { sqlite3_close(pDb); }
+};
+typedef std::unique_ptr<sqlite3, Closer> Database;
+
+// Not over the default VFS, which may be one that fails.
+Database openDatabase(const std::string& strPath)
+{
+    sqlite3* pDb = nullptr;
+    if (SQLITE_OK != sqlite3_open_v2(strPath.c_str(), &pDb, SQLITE_OPEN_READWRITE, "unix")) {
+        sqlite3_close(pDb);
+        throw std::runtime_error("cannot open " + strPath);
+    }
+    return Database(pDb);
+}
+
+int insertLine(void* pLines, int nColumns, char** szValues, char**)
+{
+    std::string strLine;
+    for (int i = 0; i < nColumns; ++i) {
+        strLine.append(0 == i ? "" : "|").append(szValues[i] ? szValues[i] : "NULL");
+    }
+    static_cast<std::multiset<std::string>*>(pLines)->insert(strLine + "\n");
+    return 0;
+}
+
+// The rows in the order of their text, or the error in the form "corrupt: ...".
+std::string rowsOf(sqlite3* pDb, const char* szSql)
+{
+    std::multiset<std::string> lines;
+    char* szError = nullptr;
+    if (SQLITE_OK != sqlite3_exec(pDb, szSql, &insertLine, &lines, &szError)) {
+        lines = {std::string("corrupt: ") + (szError ? szError : sqlite3_errmsg(pDb))};
+        sqlite3_free(szError);
+    }
+    return std::accumulate(lines.begin(), lines.end(), std::string());
+}
+
+std::string contentsOf(const std::filesystem::path& path)
+{
+    std::ostringstream contents;
+    contents << std::ifstream(path, std::ios::binary).rdbuf();
+    return contents.str();
+}
+
+} // namespace
+
+// What SQLite flushes to the disk need not get there: nothing here outlives the machine. Weak, for a test that
+// counts on the syncs.
+extern "C" __attribute__((weak)) int fsync(int)
+{
+    return 0;
+}
+
+extern "C" __attribute__((weak)) int fdatasync(int)
+{
+    return 0;
+}
+
+TokenStore::TokenStore()
+{
+    m_strDirectory = (std::filesystem::temp_directory_path() / "vemo-faults-XXXXXX").string();
+    if (!mkdtemp(m_strDirectory.data())) {
+        throw std::runtime_error("cannot make a directory like " + m_strDirectory);
+    }
+    setenv("VEMO_REDIRECT_DIR", m_strDirectory.c_str(), 1);
+}
+
+TokenStore::~TokenStore()
+{
+    std::error_code ignored;
+    std::filesystem::remove_all(m_strDirectory, ignored);
+}
+
+std::string TokenStore::path() const
+{
+    return m_strDirectory + "/vemo-access-token.db";
+}
+
+Files TokenStore::files() const
+{
+    Files files;
+    for (const auto& entry : std::filesystem::directory_iterator(m_strDirectory)) {
+        files[entry.path().filename()] = contentsOf(entry.path());
+    }
+    return files;
+}
+
+void TokenStore::setFiles(const Files& files) const
+{
+    for (const auto& entry : std::filesystem::directory_iterator(m_strDirectory)) {
+        std::filesystem::remove(entry.path());
+    }
+    for (const auto& [strName, strContents] : files) {
+        std::ofstream(m_strDirectory + "/" + strName, std::ios::binary) << strContents;
+    }
+}
+
+std::string TokenStore::state() const
+{
+    if (!std::filesystem::exists(path())) {
+        return STATE_MISSING;
+    }
+    const Database pDb = openDatabase(path());
+    const std::string strIntegrity = rowsOf(pDb.get(), "PRAGMA integrity_check");
+    if ("ok\n" != strIntegrity) {
+        return 0 == strIntegrity.compare(0, 8, "corrupt:") ? strIntegrity : "corrupt: " + strIntegrity;
+    }
+    if (rowsOf(pDb.get(), "SELECT name FROM sqlite_master WHERE type = 'table' AND name = 'token'").empty()) {
+        return STATE_NO_TABLE;
+    }
+    return rowsOf(pDb.get(), "SELECT CASE WHEN tid LIKE 'known-%' THEN rtrim(tid, 'x') ELSE 'new' END, "
+                             "bind_sid, uid, CASE WHEN deadline < strftime('%s', 'now') THEN 'past' "
+                             "WHEN deadline > 4000000000 THEN 'far' ELSE 'new' END, count, "
+                             "CASE WHEN create_time > 1000000000 THEN 'new' ELSE 'past' END, "
+                             "function, webapi_allow, extra FROM token");
+}
+
+void TokenStore::run(const std::string& strSql) const
+{
+    const Database pDb = openDatabase(path());
+    if (SQLITE_OK != sqlite3_exec(pDb.get(), strSql.c_str(), nullptr, nullptr, nullptr)) {
+        throw std::runtime_error(sqlite3_errmsg(pDb.get()));
+    }
+}

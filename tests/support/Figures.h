@@ -1,0 +1,23 @@
+// How much a test does, and what it measured.
+//
+// Tests that draw at random or repeat themselves do so much every day, and much more when
+// VEMO_TEST_FACTOR, a whole number, says so. VEMO_TEST_SEED, another, starts their draws elsewhere. Both are
+// 1 when they are not set.
+
+#ifndef TESTS_FIGURES_H
+#define TESTS_FIGURES_H
+
+#include <cstdint>
+#include <string>
+
+int64_t scaled(int64_t nEveryday);
+
+uint64_t seed();
+
+// Prints the line "figure: NAME: TEXT", which scripts/test and scripts/stress gather.
+void figure(const std::string& strName, const std::string& strText);
+
+// "12.3 %", or "none" when there is nothing to take a share of.
+std::string share(int64_t nPart, int64_t nWhole);
+
+#endif
