@@ -11,6 +11,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <climits>
 #include <cstdarg>
 #include <cstdio>
@@ -23,7 +24,7 @@
 
 namespace {
 
-uid_t g_uidEffective = 0;
+std::atomic<uid_t> g_uidEffective{0};
 
 const char* directory()
 {
@@ -76,7 +77,7 @@ extern "C" {
 
 REDIRECT_EXPORT uid_t geteuid() noexcept
 {
-    return directory() ? g_uidEffective : NEXT(geteuid)();
+    return directory() ? g_uidEffective.load() : NEXT(geteuid)();
 }
 
 REDIRECT_EXPORT int seteuid(uid_t uid) noexcept

@@ -2,7 +2,9 @@
 
 #include <json/reader.h>
 #include <json/writer.h>
+#include <pthread.h>
 
+#include <climits>
 #include <cstring>
 #include <memory>
 #include <sstream>
@@ -85,26 +87,37 @@ private:
     std::unique_ptr<std::ostringstream> m_pStream;
 };
 
-// Set when the thread has destroyed its codec. It needs no destruction itself, so it can be read to
-// the very end.
-thread_local bool t_blEnded = false;
-
-struct ThreadCodec : Codec {
-    ~ThreadCodec() { t_blEnded = true; }
-};
-
-// Each thread keeps a codec. What still runs when it is gone, such as an exit handler, gets one of
-// its own.
-template <typename Use>
-auto withCodec(Use use)
+// What threads keep their codecs under. (A thread_local object has to be registered for its destruction, and
+// when there is no memory for that the C library ends the process.)
+pthread_key_t codecKey()
 {
-    if (t_blEnded) {
-        Codec codec;
-        return use(codec);
-    }
-    thread_local ThreadCodec codec;
-    return use(codec);
+    static const pthread_key_t key = [] {
+        pthread_key_t made = PTHREAD_KEYS_MAX; // what it stays when the process has no key left: none
+        pthread_key_create(&made, [](void* pCodec) { delete static_cast<Codec*>(pCodec); });
+        return made;
+    }();
+    return key;
 }
+
+// The codec of this thread, made at its first use; where a thread cannot keep one, a codec for this use.
+class ThreadCodec {
+public:
+    ThreadCodec() : m_pCodec(static_cast<Codec*>(pthread_getspecific(codecKey())))
+    {
+        if (!m_pCodec) {
+            m_pOwn = std::make_unique<Codec>();
+            m_pCodec = m_pOwn.get();
+            if (0 == pthread_setspecific(codecKey(), m_pCodec)) {
+                static_cast<void>(m_pOwn.release());
+            }
+        }
+    }
+    Codec* operator->() const { return m_pCodec; }
+
+private:
+    Codec* m_pCodec;
+    std::unique_ptr<Codec> m_pOwn;
+};
 
 } // namespace
 
@@ -116,7 +129,7 @@ std::string toString(const Json::Value& jValue)
         return "{}"; // what most tokens hold in a field
     }
     const ErrnoKeeper keeper;
-    return withCodec([&](Codec& codec) { return codec.write(jValue); });
+    return ThreadCodec()->write(jValue);
 }
 
 void fromString(std::string_view strText, Json::Value& jValue)
@@ -125,7 +138,7 @@ void fromString(std::string_view strText, Json::Value& jValue)
         jValue = Json::Value(Json::objectValue);
         return;
     }
-    withCodec([&](Codec& codec) { codec.read(strText, jValue); });
+    ThreadCodec()->read(strText, jValue);
 }
 
 } // namespace VEMO_ACCESS_TOKEN

@@ -1,4 +1,6 @@
-// The library while a thread or the process ends.
+// The library while a thread or the process ends, and in a thread that can keep nothing for it.
+
+#include <pthread.h>
 
 #include <cstdlib>
 #include <thread>
@@ -11,6 +13,8 @@ namespace {
 std::string g_strTid;
 
 class Exit : public StoreTest {};
+
+class Thread : public StoreTest {};
 
 void grantAndLeave()
 {
@@ -64,6 +68,22 @@ TEST_F(Exit, ThreadsCanStillGrantAtTheirEnd)
         VemoAccessTokenGrantEx(g_strTid, "Api", nullptr, jToken);
     }).join();
     EXPECT_TRUE(blGranted);
+}
+
+// The library keeps something for each thread under a key, of which a process has so many.
+TEST_F(Thread, GrantsThoughTheProcessHasNoKeyLeft)
+{
+    pthread_key_t key;
+    while (0 == pthread_key_create(&key, nullptr)) {
+    }
+    unsigned int uid = 0;
+    std::string strFunction = "VPN";
+    Json::Value jOption = json(R"({"count": 3, "webapi_allow": {"Api": {}}})");
+    ASSERT_EQ(0, VemoAccessTokenCreate(uid, strFunction, jOption, g_strTid));
+
+    Json::Value jToken;
+    EXPECT_EQ(0, VemoAccessTokenGrantEx(g_strTid, "Api", nullptr, jToken));
+    EXPECT_EQ(json(R"({"Api": {}})"), jToken["webapi_allow"]);
 }
 
 } // namespace

@@ -6,6 +6,8 @@
 #include <sqlite3.h>
 
 #include <algorithm>
+#include <functional>
+#include <thread>
 
 #include "Figures.h"
 #include "Heap.h"
@@ -18,6 +20,45 @@ const uid_t NOBODY_KNOWN = 3999999999;
 bool g_blCrossedSqlite = false;
 
 class MemoryFault : public ::testing::TestWithParam<size_t> {};
+
+void inThisThread(const std::function<void()>& judge)
+{
+    judge();
+}
+
+// Finds nothing that the library keeps for a thread.
+void inThreadOfItsOwn(const std::function<void()>& judge)
+{
+    std::thread(judge).join();
+}
+
+void failEachAllocation(const Operation& operation, void (*run)(const std::function<void()>& judge))
+{
+    TokenStore store;
+    getpwuid(NOBODY_KNOWN); // has every user database loaded, which stays
+    const Oracle oracle(store, operation);
+    std::string strWrong;
+    const auto judge = [&](int64_t nFirst, int64_t nLast) {
+        run([&] { strWrong = oracle.judge([&] { Heap::failFrom(nFirst, nLast); }, &Heap::failNone); });
+        EXPECT_EQ("", strWrong) << "allocation " << nFirst << " to " << nLast;
+        EXPECT_FALSE(g_blCrossedSqlite) << "allocation " << nFirst << " to " << nLast;
+    };
+
+    judge(0, -1);
+    const int64_t nAllocations = Heap::allocations();
+    const int64_t cbHeld = Heap::liveBytes();
+    for (int64_t nAllocation = 1; nAllocation <= nAllocations; ++nAllocation) {
+        judge(nAllocation, nAllocation);
+        judge(nAllocation, INT64_MAX);
+        // Less, when something that was kept has been given up.
+        ASSERT_GE(cbHeld, Heap::liveBytes()) << "allocation " << nAllocation;
+        ASSERT_FALSE(::testing::Test::HasFailure());
+    }
+    judge(0, -1);
+    EXPECT_EQ(cbHeld, Heap::liveBytes());
+    figure("memory faults",
+           std::string(operation.szName) + ": " + std::to_string(nAllocations) + " allocations");
+}
 
 } // namespace
 
@@ -36,37 +77,12 @@ extern "C" int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(voi
 
 TEST_P(MemoryFault, LeavesNothingBehind)
 {
-    const Operation& operation = operations()[GetParam()];
-    TokenStore store;
-    getpwuid(NOBODY_KNOWN); // has every user database loaded, which stays
-    const Oracle oracle(store, operation);
-    int64_t cbHeld = 0; // more than after an undisturbed run; less when something kept was given up
-    const auto judge = [&](int64_t nFirst, int64_t nLast) {
-        const std::string strWrong = oracle.judge(
-            [&] {
-                cbHeld -= Heap::liveBytes();
-                Heap::failFrom(nFirst, nLast);
-            },
-            [&] {
-                Heap::failNone();
-                cbHeld += Heap::liveBytes();
-            });
-        EXPECT_EQ("", strWrong) << "allocation " << nFirst << " to " << nLast;
-        EXPECT_GE(0, cbHeld) << "allocation " << nFirst << " to " << nLast;
-        EXPECT_FALSE(g_blCrossedSqlite) << "allocation " << nFirst << " to " << nLast;
-    };
+    failEachAllocation(operations()[GetParam()], &inThisThread);
+}
 
-    judge(0, -1);
-    const int64_t nAllocations = Heap::allocations();
-    for (int64_t nAllocation = 1; nAllocation <= nAllocations; ++nAllocation) {
-        judge(nAllocation, nAllocation);
-        judge(nAllocation, INT64_MAX);
-        ASSERT_FALSE(HasFailure());
-    }
-    judge(0, -1);
-    EXPECT_EQ(0, cbHeld);
-    figure("memory faults",
-           std::string(operation.szName) + ": " + std::to_string(nAllocations) + " allocations");
+TEST(MemoryFaultInAFreshThread, LeavesNothingBehind)
+{
+    failEachAllocation(operations()[3], &inThreadOfItsOwn); // which reads and writes JSON
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, MemoryFault, ::testing::Range<size_t>(0, operations().size()),
