@@ -29,6 +29,8 @@ install_packages()
 {
     BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libcli11-dev libsmartcols-dev
         libbsd-dev)
+    TEST_PACKAGES=(libgtest-dev valgrind bats sqlite3 tzdata python3-pexpect mandoc bash-completion zsh fish doxygen)
+    CLANG_PACKAGES=(clang libclang-rt-14-dev)
     BENCH_PACKAGES=(libbenchmark-dev)
     PEER_PACKAGES=(libhiredis-dev libpq-dev) # to build what measures Redis and PostgreSQL
 }

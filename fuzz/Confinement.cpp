@@ -1,0 +1,303 @@
+#include "Confinement.h"
+
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <pwd.h>
+#include <sqlite3.h>
+#include <sys/mman.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+#include <cstring>
+
+#include "AccessTokenDefine.h"
+#include "Require.h"
+
+namespace {
+
+const int RESULT_DESCRIPTOR = 1 << 20; // no open file's
+const uid_t ANNA = 1000;
+
+bool g_blConfined = false;
+sqlite3* g_pOffered = nullptr;
+int g_nExtraFile = -1;
+int g_nTokensFile = -1;
+FILE* g_pResult = nullptr;
+FILE* g_pComplaints = nullptr;
+FILE* g_pStderr = nullptr;
+std::string g_strResult;
+std::string g_strComplaints;
+
+ssize_t capture(void* pText, const char* szText, size_t cbText)
+{
+    static_cast<std::string*>(pText)->append(szText, cbText);
+    return static_cast<ssize_t>(cbText);
+}
+
+FILE* capturing(std::string& strText)
+{
+    cookie_io_functions_t functions = {};
+    functions.write = capture;
+    FILE* pStream = fopencookie(&strText, "w", functions);
+    FUZZ_REQUIRE(pStream);
+    return pStream;
+}
+
+std::string taken(FILE* pStream, std::string& strText)
+{
+    fflush(pStream);
+    std::string strTaken;
+    strTaken.swap(strText);
+    return strTaken;
+}
+
+int fileOf(const std::string& strText)
+{
+    const int nFile = memfd_create("fuzz", MFD_CLOEXEC);
+    FUZZ_REQUIRE(nFile >= 0 && write(nFile, strText.data(), strText.size()) == ssize_t(strText.size()));
+    return nFile;
+}
+
+int refused(int nErrno)
+{
+    errno = nErrno;
+    return -1;
+}
+
+// The database and the directories that lead to it.
+int statusOf(const char* szPath, struct stat* pStatus)
+{
+    const std::string strDatabase = VEMO_ATOKEN_DB_PATH;
+    const bool blDatabase = strDatabase == szPath;
+    if (!blDatabase && 0 != strDatabase.compare(0, strlen(szPath) + 1, std::string(szPath) + "/")) {
+        return refused(ENOENT);
+    }
+    *pStatus = {};
+    pStatus->st_mode = 0700 | (blDatabase ? S_IFREG : S_IFDIR);
+    pStatus->st_nlink = 1;
+    return 0;
+}
+
+int userOf(bool blFound, const char* szName, uid_t uid, struct passwd* pEntry, struct passwd** ppFound)
+{
+    *ppFound = blFound ? pEntry : nullptr;
+    pEntry->pw_name = const_cast<char*>(szName);
+    pEntry->pw_uid = uid;
+    return 0;
+}
+
+} // namespace
+
+namespace fuzz {
+
+const char* const EXTRA_FILE = "extra.json";
+const char* const TOKENS_FILE = "tokens.jsonl";
+
+Confinement::Confinement()
+{
+    g_blConfined = true;
+    g_pStderr = stderr;
+    stderr = g_pComplaints ? g_pComplaints : stderr;
+}
+
+Confinement::~Confinement()
+{
+    stderr = g_pStderr;
+    g_blConfined = false;
+}
+
+sqlite3* openStore()
+{
+    sqlite3* pDb = nullptr;
+    const int nFlags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE | SQLITE_OPEN_URI;
+    FUZZ_REQUIRE(SQLITE_OK == sqlite3_open_v2("file:/tokens?vfs=memdb", &pDb, nFlags, nullptr));
+    return pDb;
+}
+
+void offer(sqlite3* pDb)
+{
+    g_pOffered = pDb;
+}
+
+void setFileTexts(const std::string& strExtra, const std::string& strTokens)
+{
+    g_nExtraFile = fileOf(strExtra);
+    g_nTokensFile = fileOf(strTokens);
+}
+
+void captureStreams()
+{
+    g_pResult = capturing(g_strResult);
+    g_pComplaints = capturing(g_strComplaints);
+    setvbuf(g_pComplaints, nullptr, _IONBF, 0);
+    stderr = g_pComplaints;
+}
+
+std::string takeResult()
+{
+    return taken(g_pResult, g_strResult);
+}
+
+std::string takeComplaints()
+{
+    return taken(g_pComplaints, g_strComplaints);
+}
+
+} // namespace fuzz
+
+#define CONFINED __attribute__((visibility("default")))
+
+// The function of that name that would run if this one were not here.
+#define NEXT(name)                                                                                           \
+    ([] {                                                                                                    \
+        static const auto pNext = reinterpret_cast<decltype(&::name)>(dlsym(RTLD_NEXT, #name));              \
+        return pNext;                                                                                        \
+    }())
+
+extern "C" {
+
+CONFINED int sqlite3_open(const char*, sqlite3** ppDb)
+{
+    *ppDb = g_pOffered ? g_pOffered : fuzz::openStore();
+    g_pOffered = nullptr;
+    return SQLITE_OK;
+}
+
+CONFINED uid_t geteuid() noexcept
+{
+    return g_blConfined ? 0 : NEXT(geteuid)();
+}
+
+CONFINED int seteuid(uid_t uid) noexcept
+{
+    return g_blConfined ? 0 : NEXT(seteuid)(uid);
+}
+
+CONFINED int access(const char* szPath, int nMode) noexcept
+{
+    struct stat status;
+    return g_blConfined ? statusOf(szPath, &status) : NEXT(access)(szPath, nMode);
+}
+
+CONFINED int stat(const char* szPath, struct stat* pStatus) noexcept
+{
+    return g_blConfined ? statusOf(szPath, pStatus) : NEXT(stat)(szPath, pStatus);
+}
+
+CONFINED int lstat(const char* szPath, struct stat* pStatus) noexcept
+{
+    return g_blConfined ? statusOf(szPath, pStatus) : NEXT(lstat)(szPath, pStatus);
+}
+
+CONFINED int chmod(const char* szPath, mode_t mode) noexcept
+{
+    return g_blConfined ? 0 : NEXT(chmod)(szPath, mode);
+}
+
+CONFINED int chown(const char* szPath, uid_t uid, gid_t gid) noexcept
+{
+    return g_blConfined ? 0 : NEXT(chown)(szPath, uid, gid);
+}
+
+CONFINED int mkdir(const char* szPath, mode_t mode) noexcept
+{
+    return g_blConfined ? refused(EEXIST) : NEXT(mkdir)(szPath, mode);
+}
+
+CONFINED int rename(const char* szFrom, const char* szTo) noexcept
+{
+    return g_blConfined ? 0 : NEXT(rename)(szFrom, szTo);
+}
+
+CONFINED int unlink(const char* szPath) noexcept
+{
+    return g_blConfined ? 0 : NEXT(unlink)(szPath);
+}
+
+CONFINED int mkstemp(char* szName)
+{
+    return g_blConfined ? fileOf("") : NEXT(mkstemp)(szName);
+}
+
+CONFINED int open(const char* szPath, int nFlags, ...)
+{
+    va_list args;
+    va_start(args, nFlags);
+    const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
+    va_end(args);
+    const bool blHarmless = 0 == strcmp(szPath, "/dev/null") || 0 == strcmp(szPath, "/dev/urandom");
+    return g_blConfined && !blHarmless ? refused(ENOENT) : NEXT(open)(szPath, nFlags, mode);
+}
+
+// What file streams open their files with.
+CONFINED FILE* fopen64(const char* szPath, const char* szMode)
+{
+    if (!g_blConfined) {
+        return NEXT(fopen64)(szPath, szMode);
+    }
+    const int nFile = 0 == strcmp(szPath, fuzz::EXTRA_FILE)    ? g_nExtraFile
+                      : 0 == strcmp(szPath, fuzz::TOKENS_FILE) ? g_nTokensFile
+                                                               : refused(ENOENT);
+    return 0 > nFile ? nullptr : NEXT(fopen64)(("/proc/self/fd/" + std::to_string(nFile)).c_str(), "r");
+}
+
+CONFINED int dup(int nFile) noexcept
+{
+    return g_blConfined ? RESULT_DESCRIPTOR : NEXT(dup)(nFile);
+}
+
+CONFINED int dup2(int nFile, int nTarget) noexcept
+{
+    return g_blConfined ? nTarget : NEXT(dup2)(nFile, nTarget);
+}
+
+CONFINED FILE* fdopen(int nFile, const char* szMode) noexcept
+{
+    return RESULT_DESCRIPTOR == nFile ? g_pResult : NEXT(fdopen)(nFile, szMode);
+}
+
+CONFINED int isatty(int nFile) noexcept
+{
+    return g_blConfined ? 0 : NEXT(isatty)(nFile);
+}
+
+CONFINED int usleep(useconds_t nMicroseconds)
+{
+    return g_blConfined ? 0 : NEXT(usleep)(nMicroseconds);
+}
+
+CONFINED int getpwnam_r(const char* szName, struct passwd* pEntry, char*, size_t, struct passwd** ppFound)
+{
+    const bool blAnna = 0 == strcmp(szName, "anna");
+    return userOf(blAnna || 0 == strcmp(szName, "root"), "", blAnna ? ANNA : 0, pEntry, ppFound);
+}
+
+CONFINED int getpwuid_r(uid_t uid, struct passwd* pEntry, char*, size_t, struct passwd** ppFound)
+{
+    return userOf(uid == ANNA || uid == 0, uid ? "anna" : "root", uid, pEntry, ppFound);
+}
+
+CONFINED void syslog(int, const char* szFormat, ...)
+{
+    char szLine[256];
+    va_list args;
+    va_start(args, szFormat);
+    vsnprintf(szLine, sizeof(szLine), szFormat, args);
+    va_end(args);
+}
+
+CONFINED int printf(const char* szFormat, ...)
+{
+    char szLine[256];
+    va_list args;
+    va_start(args, szFormat);
+    const int nWritten =
+        g_blConfined ? vsnprintf(szLine, sizeof(szLine), szFormat, args) : vprintf(szFormat, args);
+    va_end(args);
+    return nWritten;
+}
+
+} // extern "C"

@@ -1,0 +1,175 @@
+// A hostile database: SQL that makes one, or the bytes of a database file. Whatever stands in the table, the
+// library reads the rows that SQLite has, each as the rules of decoding say, or reports failure.
+
+#include <sqlite3.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "AccessTokenApi.h"
+#include "Library.h"
+#include "internal/AccessTokenDbApi.h"
+
+namespace {
+
+const int STEPS_MAX = 20; // thousands of instructions of a statement
+const int LENGTH_MAX = 1 << 20;
+const char FILE_START[] = "SQLite format 3"; // with its NUL
+
+int g_nSteps = 0;
+
+int isTooLong(void*)
+{
+    return ++g_nSteps > STEPS_MAX;
+}
+
+// Chance would make two readings differ.
+int isAllowed(void*, int nAction, const char* szName, const char* szFunction, const char*, const char*)
+{
+    const bool blChance =
+        SQLITE_FUNCTION == nAction && 0 == strncasecmp(szFunction, "random", strlen("random"));
+    const bool blPragma = SQLITE_PRAGMA == nAction && 0 != strcmp(szName, "encoding");
+    return blChance || blPragma || SQLITE_ATTACH == nAction ? SQLITE_DENY : SQLITE_OK;
+}
+
+// The database of a file's bytes, which SQLite gets a copy of.
+void readFile(sqlite3* pDb, std::string_view strFile)
+{
+    auto* pCopy = static_cast<unsigned char*>(sqlite3_malloc64(strFile.size()));
+    FUZZ_REQUIRE(pCopy);
+    memcpy(pCopy, strFile.data(), strFile.size());
+    const auto cbFile = static_cast<sqlite3_int64>(strFile.size());
+    const unsigned int nFlags = SQLITE_DESERIALIZE_FREEONCLOSE | SQLITE_DESERIALIZE_RESIZEABLE;
+    FUZZ_REQUIRE(SQLITE_OK == sqlite3_deserialize(pDb, "main", pCopy, cbFile, cbFile, nFlags));
+}
+
+sqlite3* hostile(std::string_view strInput)
+{
+    sqlite3* pDb = nullptr;
+    FUZZ_REQUIRE(SQLITE_OK == sqlite3_open_v2(":memory:", &pDb, SQLITE_OPEN_READWRITE, nullptr));
+    sqlite3_limit(pDb, SQLITE_LIMIT_LENGTH, LENGTH_MAX);
+    sqlite3_progress_handler(pDb, 1000, isTooLong, nullptr);
+    g_nSteps = 0;
+    if (0 == strInput.compare(0, sizeof(FILE_START), std::string_view(FILE_START, sizeof(FILE_START)))) {
+        readFile(pDb, strInput);
+    }
+    sqlite3_set_authorizer(pDb, isAllowed, nullptr);
+    if (0 != strInput.compare(0, sizeof(FILE_START), std::string_view(FILE_START, sizeof(FILE_START)))) {
+        sqlite3_exec(pDb, std::string(strInput).c_str(), nullptr, nullptr, nullptr);
+    }
+    return pDb;
+}
+
+// The texts of the rows, by SQLite alone: up to a first NUL; nothing for a NULL, and where the table has a
+// field's name in other letters. No rows if they cannot be read to the end.
+typedef std::vector<std::optional<std::string>> Row;
+std::optional<std::vector<Row>> rowsOf(sqlite3* pDb)
+{
+    const std::string strSql =
+        "SELECT tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra FROM token ;";
+    std::vector<Row> rows;
+    sqlite3_stmt* pStatement = nullptr;
+    g_nSteps = 0;
+    if (SQLITE_OK != sqlite3_prepare_v2(pDb, strSql.c_str(), -1, &pStatement, nullptr)) {
+        return std::nullopt;
+    }
+    int nResult = SQLITE_ROW;
+    while (SQLITE_ROW == (nResult = sqlite3_step(pStatement))) {
+        rows.emplace_back();
+        for (int i = 0; i < sqlite3_column_count(pStatement); ++i) {
+            const auto* szText = reinterpret_cast<const char*>(sqlite3_column_text(pStatement, i));
+            const bool blNamed = fuzz::fields()[static_cast<size_t>(i)] == sqlite3_column_name(pStatement, i);
+            rows.back().push_back(szText && blNamed ? std::optional<std::string>(szText) : std::nullopt);
+        }
+    }
+    sqlite3_finalize(pStatement);
+    return SQLITE_DONE == nResult ? std::optional<std::vector<Row>>(rows) : std::nullopt;
+}
+
+Json::Value decoded(const std::string& strField, const std::string& strText)
+{
+    if (strField == "webapi_allow" || strField == "extra") {
+        return fuzz::json(strText);
+    }
+    const bool blText = strField == "tid" || strField == "bind_sid" || strField == "function";
+    return blText ? Json::Value(strText) : Json::Value(Json::Int64{strtoll(strText.c_str(), nullptr, 10)});
+}
+
+// The tokens of the rows; nothing where one cannot be decoded.
+std::optional<Json::Value> tokensOf(const std::optional<std::vector<Row>>& rows)
+{
+    if (!rows) {
+        return std::nullopt;
+    }
+    Json::Value jTokens(Json::arrayValue);
+    for (const Row& row : *rows) {
+        Json::Value& jToken = jTokens.append(Json::Value(Json::objectValue));
+        for (size_t i = 0; i < row.size(); ++i) {
+            if (!row[i]) {
+                return std::nullopt;
+            }
+            jToken[fuzz::fields()[i]] = decoded(fuzz::fields()[i], *row[i]);
+        }
+    }
+    return jTokens;
+}
+
+void checkReading(AccessTokenApi& api, sqlite3* pDb)
+{
+    const auto before = rowsOf(pDb);
+    Json::Value jTokens(Json::arrayValue);
+    Json::Value jAll(Json::objectValue);
+    g_nSteps = 0;
+    const int nResult = api.tokenList(jAll, jTokens);
+    FUZZ_REQUIRE(0 == nResult || -1 == nResult);
+    if (before != rowsOf(pDb)) {
+        return; // a view of the time
+    }
+    const auto jExpected = tokensOf(before);
+    FUZZ_REQUIRE(jExpected.has_value() == (0 == nResult));
+    FUZZ_REQUIRE(!jExpected || fuzz::text(jTokens) == fuzz::text(*jExpected));
+}
+
+// Runs an operation, which may give any number that the headers name. Json::LogicError is one of them too: a
+// method list with arrays in it throws where a call is granted.
+template <typename Operation>
+void run(Operation operation)
+{
+    g_nSteps = 0;
+    fuzz::throwsLogicError([&] { FUZZ_REQUIRE(-1 <= operation()); });
+}
+
+void checkOperations(AccessTokenApi& api)
+{
+    std::string strTid = fuzz::tid("t");
+    std::string strShort = "t";
+    std::string strName = "f";
+    unsigned int uid = 0;
+    Json::Value jToken;
+    Json::Value jChange;
+    jChange["count"] = 7;
+    run([&] { return api.tokenGetByTid(strShort, jToken); });
+    run([&] { return api.tokenGrant(strShort, "a", "get", jToken); });
+    run([&] { return api.cleanExpireToken(true); });
+    run([&] { return api.tokenUpdateByTid(strShort, jChange); });
+    run([&] { return api.tokenCreateByTid(uid, strName, jChange, strTid); });
+    run([&] { return api.tokenGrant(strTid, "a", nullptr, jToken); });
+    run([&] { return api.tokenDeleteByFunction(strName); });
+    run([&] { return api.tokenDeleteAll(); });
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
+{
+    const fuzz::Confinement confinement;
+    sqlite3* pDb = hostile(fuzz::viewOf(pData, cbData));
+    fuzz::offer(pDb);
+    AccessTokenApi api;
+    checkReading(api, pDb);
+    checkOperations(api);
+    return 0;
+}

@@ -1,0 +1,148 @@
+// Command lines: an argument on each line, and behind a NUL byte the text on standard input. The whole
+// program runs, from main() on, on a store of some tokens.
+
+#include <algorithm>
+#include <cctype>
+#include <map>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "AccessTokenDefine.h"
+#include "AccessTokenUtil.h"
+#include "Commands.h"
+#include "Console.h"
+#include "Failure.h"
+#include "Library.h"
+#include "ToolStore.h"
+
+namespace {
+
+typedef std::vector<std::string> Texts;
+
+// What the tool may say of the store and the system here, where nothing fails but what is asked in vain.
+const char* const STORE_FAILURES[] = {"the journal cannot be made", "granted, but there is no user",
+                                      "no regular file", "cannot be repaired"};
+
+const std::map<std::string, void (*)(tool::Commands&)> COMMANDS = {
+    {"create", tool::addCreate}, {"generate", tool::addGenerate}, {"list", tool::addList},
+    {"show", tool::addShow},     {"check", tool::addCheck},       {"grant", tool::addGrant},
+    {"update", tool::addUpdate}, {"revoke", tool::addRevoke},     {"purge", tool::addPurge},
+    {"stats", tool::addStats},   {"export", tool::addExport},     {"import", tool::addImport},
+    {"init", tool::addInit},     {"doctor", tool::addDoctor},     {"tune", tool::addTune}};
+
+const std::set<std::string> READERS = {"list", "show", "check", "stats", "export", "generate", ""};
+
+Texts argumentsOf(std::string_view strLines)
+{
+    Texts strArguments = {"vemo-access-token"};
+    while (!strLines.empty()) {
+        strArguments.push_back(fuzz::takeLine(strLines));
+    }
+    return strArguments;
+}
+
+// The command, if the arguments begin with one; or else "".
+std::string commandOf(const Texts& strArguments)
+{
+    return strArguments.size() > 1 && COMMANDS.count(strArguments[1]) ? strArguments[1] : "";
+}
+
+// The exit status. What main() would take for a failure of the system ends the fuzzing.
+int run(Texts strArguments, const std::string& strInput)
+{
+    const fuzz::Input input(strInput);
+    std::vector<char*> rgArguments;
+    for (std::string& strArgument : strArguments) {
+        rgArguments.push_back(strArgument.data());
+    }
+    // To make all commands would take most of the time.
+    const std::string strCommand = commandOf(strArguments);
+    tool::Commands commands;
+    COMMANDS.at(strCommand.empty() ? "generate" : strCommand)(commands);
+    try {
+        return commands.run(static_cast<int>(rgArguments.size()), rgArguments.data());
+    } catch (const tool::Failure& failure) {
+        tool::complain(failure.what());
+        return failure.status();
+    }
+}
+
+void prepare()
+{
+    fuzz::setFileTexts(
+        R"({"a":[1]})",
+        R"({"tid":")" + fuzz::tid("FromAFile") +
+            R"(","bind_sid":"","uid":0,"deadline":4102444800,"count":1,"create_time":1,"function":"f",)"
+            R"("webapi_allow":{},"extra":{}})");
+    fuzz::captureStreams();
+    tool::showLogLines();
+}
+
+bool has(const Texts& strArguments, const std::string& strArgument)
+{
+    return strArguments.end() != std::find(strArguments.begin(), strArguments.end(), strArgument);
+}
+
+bool mayChange(const Texts& strArguments, int nStatus)
+{
+    const std::string strCommand = commandOf(strArguments);
+    const bool blDryRun = has(strArguments, "--dry-run") && !has(strArguments, "--");
+    if (blDryRun || READERS.count(strCommand) || (strCommand == "doctor" && !has(strArguments, "--repair"))) {
+        return false;
+    }
+    // Of several files, those ahead of a bad one are imported.
+    return strCommand == "import" ||
+           (tool::EXIT_STATUS_USAGE != nStatus && tool::EXIT_STATUS_NO_TOKEN != nStatus);
+}
+
+bool isId(const std::string& strText)
+{
+    return strText.size() >= VEMO_ATOKEN_LENGTH_MIN && std::all_of(strText.begin(), strText.end(), isalnum);
+}
+
+// A failure is said in one sentence, without an id that was given as an argument.
+void checkComplaint(const Texts& strArguments, int nStatus, const std::string& strComplaint)
+{
+    const std::string strStart = "vemo-access-token: ";
+    const bool blSilent = tool::EXIT_STATUS_DONE == nStatus || tool::EXIT_STATUS_FINDINGS == nStatus ||
+                          (tool::EXIT_STATUS_REFUSED == nStatus && commandOf(strArguments) == "check");
+    if (blSilent) {
+        return;
+    }
+    FUZZ_REQUIRE(0 == strComplaint.compare(0, strStart.size(), strStart));
+    FUZZ_REQUIRE(strComplaint.find('\n') == strComplaint.size() - 1);
+    const bool blFiles = "import" == commandOf(strArguments) || "export" == commandOf(strArguments);
+    for (const std::string& strArgument : strArguments) {
+        FUZZ_REQUIRE(blFiles || !isId(strArgument) || std::string::npos == strComplaint.find(strArgument));
+    }
+    const auto isSaid = [&](const char* szText) { return std::string::npos != strComplaint.find(szText); };
+    FUZZ_REQUIRE(tool::EXIT_STATUS_STORE != nStatus ||
+                 std::any_of(std::begin(STORE_FAILURES), std::end(STORE_FAILURES), isSaid));
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
+{
+    const fuzz::Confinement confinement;
+    static fuzz::ToolStore store;
+    [[maybe_unused]] static const bool blPrepared = (prepare(), true);
+    const std::string_view strInput = fuzz::viewOf(pData, cbData);
+    const size_t cbLines = std::min(strInput.find('\0'), strInput.size());
+    const Texts strArguments = argumentsOf(strInput.substr(0, cbLines));
+    const int nStatus =
+        run(strArguments, std::string(strInput.substr(std::min(cbLines + 1, strInput.size()))));
+    fuzz::takeResult();
+    const std::string strComplaint = fuzz::takeComplaints();
+    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE <= nStatus && nStatus <= tool::EXIT_STATUS_FINDINGS);
+    checkComplaint(strArguments, nStatus, strComplaint);
+    if (store.isChanged()) {
+        FUZZ_REQUIRE(mayChange(strArguments, nStatus));
+        for (Json::Value& jToken : store.tokens()) {
+            FUZZ_REQUIRE(0 == VEMO_ACCESS_TOKEN::checkJsonType(jToken));
+        }
+        store.restore();
+    }
+    return 0;
+}
