@@ -398,7 +398,7 @@ int AccessTokenDbApi::tokenSave(Json::Value& jParam, bool blCreate)
 {
     std::string strSqlPrefix = blCreate ? "INSERT INTO token (" : "REPLACE INTO token (";
 
-    VEMO_ATOKEN_DEBUG("tokenSave, blCreate=%d, jParam=%s", VEMO_ATOKEN_HERE, blCreate ? 1 : 0,
+    VEMO_ATOKEN_DEBUG("tokenSave, blCreate=%d, jParam=%s", VEMO_ATOKEN_HERE, blCreate,
                       toString(jParam).c_str());
 #define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
     const Json::Value* p_##name = findMember(jParam, #name);                                                 \

@@ -348,7 +348,6 @@ TEST_F(Connection, CreateTableReportsItsFailure)
 
 TEST_F(Connection, LogsASchemaThatCannotBeBuilt)
 {
-    SKIP_WITHOUT_INTERPOSITION();
     standIns().sqlExpandCreateTable = [](std::string&) {
         errno = ENOMEM;
         return -1;

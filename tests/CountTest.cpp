@@ -173,6 +173,18 @@ TEST_F(Degrade, LowersTheCountOfARecordThatCannotBeSaved)
               takeLines());
 }
 
+TEST_F(Degrade, SavesTheLoweredCount)
+{
+    insertToken("2");
+    Json::Value jToken = json(recordText(2));
+
+    EXPECT_EQ(0, api().tokenCountDegrade(jToken));
+
+    EXPECT_EQ("1", countOf("t"));
+    EXPECT_EQ(json(recordText(1)), jToken);
+    EXPECT_EQ(Texts{}, takeLines());
+}
+
 TEST_F(Degrade, LeavesUnlimitedRecordsAlone)
 {
     for (const char* szRecord : {R"({"count":-1})", R"({"count":-9223372036854775808,"tid":7})"}) {

@@ -298,6 +298,17 @@ TEST_F(FilterMatch, RefusesWhatIsNoField)
     EXPECT_EQ("held", m_strOut);
 }
 
+TEST_F(FilterMatch, FailsWhenMemoryRunsOut)
+{
+    m_strOut = "held";
+    seam().fail("sqlite3_mprintf", ENOMEM);
+
+    EXPECT_EQ(-1, match("tid", "a"));
+
+    EXPECT_EQ("held", m_strOut);
+    EXPECT_EQ((Texts{failed(STORE, MATCH_TEXT_FAILED, ENOMEM)}), takeLines());
+}
+
 TEST_F(FilterList, RefusesWhatIsNoFieldOrNoList)
 {
     const std::string NO_NAME = "!szField || !szField[0]";
@@ -370,10 +381,13 @@ TEST_F(FilterInSystemLog, TellsTheErrorInFrontWhenThereIsOne)
     for (const int nErrno : {0, ENOMEM}) {
         seam().counts.clear();
         seam().fail("sqlite3_mprintf", nErrno);
+        m_nErrno = nErrno;
 
         EXPECT_EQ(-1, where(R"({"tid":"a"})"));
+        EXPECT_EQ(-1, where(R"({"tid":{}})"));
 
-        EXPECT_EQ(inSystemLog({failed(STORE, MATCH_TEXT_FAILED, nErrno), failed(STORE, MATCH_FAILED, nErrno)},
+        EXPECT_EQ(inSystemLog({failed(STORE, MATCH_TEXT_FAILED, nErrno), failed(STORE, MATCH_FAILED, nErrno),
+                               fail(STORE, "err input type, jTokenParam=(null)", nErrno)},
                               nErrno),
                   takeLines(Destination::Syslog));
     }

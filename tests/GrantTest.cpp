@@ -2,6 +2,7 @@
 
 #include "AccessTokenUtil.h"
 #include "OneGrant.h"
+#include "StandIns.h"
 #include "Statements.h"
 
 namespace {
@@ -346,6 +347,34 @@ TEST_F(GrantOfPart, NamesWhatIsMissing)
 
         EXPECT_EQ(part.lines, takeLines());
         EXPECT_EQ(UNTOUCHED, m_jToken);
+    }
+}
+
+class GrantInSystemLog : public StoreTest {
+protected:
+    GrantInSystemLog() : StoreTest(Destination::Syslog) {}
+};
+
+TEST_F(GrantInSystemLog, TellsErrnoInFrontOfEachLineWhenThereIsOne)
+{
+    // The lookup finds a token, and at the next grant none.
+    int nFound = 0;
+    standIns().tokenGetOne = [&](const char*, std::string&, Json::Value& jToken) {
+        jToken = json(recordText(-1));
+        return nFound = 1 - nFound;
+    };
+    AccessTokenApi api;
+    VEMO_ACCESS_TOKEN::debugInfo(true);
+    std::string strTid = "t";
+    Json::Value jToken;
+    for (const int nErrno : {0, EACCES}) {
+        errno = nErrno;
+        EXPECT_EQ(0, api.tokenGrant(strTid, "Api", "get", jToken));
+        EXPECT_EQ(-1, api.tokenGrant(strTid, "Api", "get", jToken));
+        EXPECT_EQ(inSystemLog({FOUND.strText, ordinary(SERVICE, "token grant success!!"),
+                               refused("t", "Api", "get").strText},
+                              nErrno),
+                  takeLines(Destination::Syslog));
     }
 }
 

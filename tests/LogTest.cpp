@@ -2,10 +2,12 @@
 
 #include <climits>
 #include <cstring>
+#include <new>
 #include <ostream>
 
 #include "AccessTokenApi.h"
 #include "AccessTokenUtil.h"
+#include "StandIns.h"
 #include "Statements.h"
 #include "StoreTest.h"
 #include "internal/AccessTokenDbApi.h"
@@ -21,6 +23,7 @@ using VEMO_ACCESS_TOKEN::logToStdoutGet;
 namespace {
 
 bool g_blOpenlog = false;
+int g_nErrnoOfAllocations = 0; // which they leave behind though they succeed; 0: none
 
 } // namespace
 
@@ -28,6 +31,18 @@ bool g_blOpenlog = false;
 extern "C" void openlog(const char*, int, int)
 {
     g_blOpenlog = true;
+}
+
+// Every allocation of this process goes through here, those of the C++ libraries too. The memory is
+// the next operator's, so its operator delete stays in use.
+void* operator new(std::size_t cbSize)
+{
+    static auto* const pNew = next<void*(std::size_t)>("_Znwm");
+    void* pMemory = pNew(cbSize);
+    if (0 != g_nErrnoOfAllocations) {
+        errno = g_nErrnoOfAllocations;
+    }
+    return pMemory;
 }
 
 namespace {
@@ -187,6 +202,21 @@ TEST_P(LineForm, HoldsTextOfCallersAsItIs)
     EXPECT_EQ((Texts{line("util.cpp:#", "webapi=%m %n\n%s not in allow list, jToken={\"webapi_allow\":{}}\n"),
                      line("util.cpp:#", "jToken={\"webapi_allow\":{}}\n")}),
               takeLines(destination()));
+}
+
+TEST_P(LineForm, TellsErrnoAlthoughItsArgumentsChangeIt)
+{
+    Json::Value jToken = json(R"({"count":"5"})");
+    VEMO_ACCESS_TOKEN::tokenType(); // made now, so that the line's arguments are the only allocations
+    g_nErrnoOfAllocations = EAGAIN;
+    errno = GetParam().nErrno;
+
+    const int nResult = checkJsonType(jToken);
+
+    g_nErrnoOfAllocations = 0;
+    EXPECT_EQ(-1, nResult);
+    expectLine("util.cpp:#", "(util.cpp:#)(" + errorText() +
+                                 ")type failed, jmList[i]=count, jTokenParam={\"count\":\"5\"}\n\n");
 }
 
 TEST_F(Unswitched, LinesMoveToStdoutFromTheMomentOfTheSwitch)

@@ -197,7 +197,6 @@ TEST_F(Query, PassesOnTheFailuresOfTheFilter)
 
 TEST_F(Query, FailsWithoutItsColumns)
 {
-    SKIP_WITHOUT_INTERPOSITION();
     fill();
     standIns().sqlExpandMemberName = [](std::string&) { return -1; };
     m_db.m_strSql = "earlier";

@@ -81,6 +81,18 @@ TEST_F(SaveRoundTrip, KeepsSizeAndDepth)
     expectSame(jLarge);
 }
 
+// Conditions compare texts, so a value must always become the same one.
+TEST_F(SaveRoundTrip, StoresNoComments)
+{
+    Json::Value jToken = record();
+    jToken["extra"] = json("[1]");
+    jToken["extra"][0].setComment(std::string("// a comment"), Json::commentBefore);
+
+    EXPECT_EQ(0, m_db.tokenUpdate(jToken));
+
+    EXPECT_EQ(Texts{"[1]"}, query("SELECT extra FROM token"));
+}
+
 TEST_F(SaveRoundTrip, KeepsDoublesToTheBit)
 {
     typedef std::numeric_limits<double> Limits;

@@ -1,6 +1,7 @@
 // Rows of the database as records, as the decoder makes them.
 
 #include <climits>
+#include <cstring>
 #include <new>
 
 #include "Decoding.h"
@@ -8,8 +9,10 @@
 
 namespace {
 
-int g_nAllocationThatFails = 0; // counted from now, 1 is the next; 0: none
-bool g_blObjectsAreArrays = false;
+int g_nAllocationThatFails = 0;  // counted from now, 1 is the next; 0: none
+bool g_blJsoncppTellsIt = false; // by an exception of its own, as it does where it calls malloc
+Json::ValueType g_typeOfObjects = Json::objectValue;
+int g_nLies = 0; // how many calls are told so, from now on
 
 } // namespace
 
@@ -20,6 +23,9 @@ void* operator new(std::size_t cbSize)
     static auto* const pNew = next<void*(std::size_t)>("_Znwm");
     if (0 < g_nAllocationThatFails && 0 == --g_nAllocationThatFails) {
         errno = ENOMEM;
+        if (g_blJsoncppTellsIt) {
+            throw Json::RuntimeError("no memory");
+        }
         throw std::bad_alloc();
     }
     return pNew(cbSize);
@@ -30,7 +36,11 @@ __attribute__((visibility("default"))) Json::ValueType Json::Value::type() const
 {
     static auto* const pType = next<Json::ValueType(const Json::Value*)>("_ZNK4Json5Value4typeEv");
     const Json::ValueType type = pType(this);
-    return g_blObjectsAreArrays && Json::objectValue == type ? Json::arrayValue : type;
+    if (Json::objectValue == type && 0 < g_nLies) {
+        --g_nLies;
+        return g_typeOfObjects;
+    }
+    return type;
 }
 
 namespace {
@@ -164,6 +174,14 @@ TEST_F(RowDecoding, ParsesJsonOfAnyKind)
     }
 }
 
+TEST_F(RowDecoding, LeavesCommentsBehind)
+{
+    const Json::Value jExtra = member("extra", "// a comment\n{\"a\":1}");
+
+    EXPECT_EQ(json(R"({"a":1})"), jExtra);
+    EXPECT_FALSE(jExtra.hasComment(Json::commentBefore));
+}
+
 TEST_F(RowDecoding, KeepsWhatBadJsonLeft)
 {
     const struct {
@@ -270,6 +288,41 @@ TEST_F(RowDecoding, TurnsEachFailedAllocationIntoFailure)
     EXPECT_EQ(json(strExtra), m_jArray[0]["extra"]);
 }
 
+// The reader takes a long number for none when the allocation in it fails, and is asked again.
+TEST_F(RowDecoding, YieldsTheWholeRecordOrNoneWhenAnAllocationFails)
+{
+    const std::string strExtra =
+        R"({"a":[1,{"b":0.12345678901234567,"c":")" + std::string(100, 'x') + "\"}]}";
+    const Row row = {{"extra"}, {strExtra.c_str()}};
+    EXPECT_EQ(0, decode(row)); // makes the reader, which is kept
+    for (const char* szError : {"std::bad_alloc", "no memory"}) {
+        SCOPED_TRACE(szError);
+        int nWhole = 0;
+        int nNone = 0;
+        bool blFailed = true;
+        while (blFailed) {
+            m_jArray = Json::Value();
+            errno = 0;
+            g_blJsoncppTellsIt = 0 == strcmp(szError, "no memory");
+            g_nAllocationThatFails = nWhole + nNone + 1;
+            const int nResult = decode(row);
+            blFailed = 0 == g_nAllocationThatFails;
+            g_nAllocationThatFails = 0;
+            if (0 == nResult) {
+                ++nWhole;
+                ASSERT_EQ(json(strExtra), m_jArray[0]["extra"]);
+            } else {
+                ++nNone;
+                ASSERT_TRUE(m_jArray.empty());
+                ASSERT_EQ((Texts{fail(STORE, std::string("decode row failed, error=") + szError, ENOMEM)}),
+                          takeLines());
+            }
+        }
+        EXPECT_LT(1, nWhole); // one of them without a failure
+        EXPECT_LT(3, nNone);
+    }
+}
+
 TEST_F(RowDecoding, RefusesColumnThatIsNoField)
 {
     for (const char* szName : {"nonsense", "", "TID", "tid ", "count(*)", "token.tid", "sort_by"}) {
@@ -317,11 +370,21 @@ TEST_F(RowDecoding, RefusesOutputThatIsNoArray)
     }
 }
 
-TEST_F(RowDecoding, RefusesRecordThatIsNoObject)
+// The check asks up to twice.
+TEST_F(RowDecoding, RefusesRecordThatIsNeitherObjectNorNull)
 {
-    g_blObjectsAreArrays = true;
+    g_typeOfObjects = Json::arrayValue;
+    g_nLies = 2;
     expectRefused({{"tid"}, {"a"}}, columnLines(failed(STORE, NO_OBJECT)));
-    g_blObjectsAreArrays = false;
+}
+
+TEST_F(RowDecoding, TakesRecordThatIsNull)
+{
+    g_typeOfObjects = Json::nullValue;
+    g_nLies = 2;
+    EXPECT_EQ(0, decode({{"tid"}, {"a"}}));
+    EXPECT_EQ(json(R"([{"tid":"a"}])"), m_jArray);
+    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(RowDecoding, AppendsEmptyRecordWithoutColumns)
@@ -347,7 +410,8 @@ TEST_F(RowDecoding, AppendsEachRowAsFreshRecord)
 TEST_F(RowDecoding, LaterColumnReplacesEarlierOfSameName)
 {
     EXPECT_EQ(0, decode({{"count", "extra", "count", "extra"}, {"1", R"({"a":[1]})", "2", "{"}}));
-    EXPECT_EQ(json(R"([{"count":2,"extra":{}}])"), m_jArray);
+    EXPECT_EQ(0, decode({{"extra", "extra"}, {"{}", ""}}));
+    EXPECT_EQ(json(R"([{"count":2,"extra":{}},{"extra":null}])"), m_jArray);
 }
 
 TEST_F(RowDecoding, StopsAtFirstBadColumn)
@@ -372,10 +436,15 @@ protected:
 
 TEST_F(RowDecodingSystemLog, TellsErrnoInFrontOfEachLine)
 {
+    addField("odd", "no array");
+    const std::string strError = "decode row failed, error=" + errorOf("no array");
     for (const int nErrno : {0, EACCES}) {
         errno = nErrno;
         EXPECT_EQ(-1, decode({{"nonsense"}, {"1"}}));
-        EXPECT_EQ(inSystemLog(columnLines(failed(STORE, NO_FIELD, nErrno), nErrno), nErrno),
+        EXPECT_EQ(-1, decode({{"odd"}, {"1"}}));
+        EXPECT_EQ(inSystemLog(columnLines(failed(STORE, NO_FIELD, nErrno), nErrno) +
+                                  Texts{fail(STORE, strError, nErrno)},
+                              nErrno),
                   takeLines(Destination::Syslog));
     }
 }

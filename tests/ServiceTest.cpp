@@ -258,13 +258,17 @@ protected:
     ServiceSystemLog() : StoreTest(Destination::Syslog) {}
 };
 
-TEST_F(ServiceSystemLog, GetsTheConstructorsLine)
+TEST_F(ServiceSystemLog, GetsTheLinesOfAServiceWithoutStore)
 {
+    VEMO_ACCESS_TOKEN::debugInfo(true);
     for (int nErrno : {0, ENOMEM}) {
         seam().counts.clear();
         seam().fail("operator new", nErrno);
         AccessTokenApi api;
-        EXPECT_EQ(inSystemLog({ordinary(SERVICE, "new AccessTokenDbApi failed")}, nErrno),
+        EXPECT_EQ(-1, api.cleanExpireToken(false));
+        EXPECT_EQ(inSystemLog({ordinary(SERVICE, "new AccessTokenDbApi failed"),
+                               fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)", nErrno)},
+                              nErrno),
                   takeLines(Destination::Syslog));
     }
 }

@@ -257,4 +257,25 @@ TEST_F(Validation, WholeRecordIsLoggedHoweverLong)
               takeLines());
 }
 
+class ValidationInSystemLog : public SeamTest {
+protected:
+    ValidationInSystemLog() : SeamTest(Destination::Syslog) {}
+};
+
+TEST_F(ValidationInSystemLog, TellsErrnoInFrontOfEachLineWhenThereIsOne)
+{
+    tokenType()["count"][0] = "double";
+    Json::Value jUnknown = json(R"({"count":5})");
+    Json::Value jWrong = json(R"({"tid":1})");
+    for (const int nErrno : {0, EACCES}) {
+        errno = nErrno;
+        EXPECT_EQ(-1, checkJsonType(jUnknown));
+        EXPECT_EQ(-1, checkJsonType(jWrong));
+        EXPECT_EQ(inSystemLog({fail(UTIL, "type not found!!, key=count", nErrno),
+                               fail(UTIL, typeFailed("tid", R"({"tid":1})"), nErrno)},
+                              nErrno),
+                  takeLines(Destination::Syslog));
+    }
+}
+
 } // namespace

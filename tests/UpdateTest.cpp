@@ -355,6 +355,7 @@ protected:
     UpdateSystemLog() : StoreTest(Destination::Syslog) {}
 };
 
+// Of each field: that it is overwritten, and that the check misses it.
 TEST_F(UpdateSystemLog, TellsErrnoInFrontOfEachLineWhenThereIsOne)
 {
     // The lookup pretends to find something and leaves the record as it is.
@@ -363,17 +364,27 @@ TEST_F(UpdateSystemLog, TellsErrnoInFrontOfEachLineWhenThereIsOne)
     AccessTokenApi api;
     takeLines();
     std::string strTid = "one";
-    Json::Value jParam = json(R"({"count":5})");
-    for (int nErrno : {0, EACCES}) {
-        errno = nErrno;
-        EXPECT_EQ(-1, api.tokenUpdateByTid(strTid, jParam));
-        EXPECT_EQ(inSystemLog({ordinary(fieldList(10), "overwrite token[count]"),
-                               ordinary(fieldList(2), "lost data member=tid"),
-                               failed(SERVICE, "0 > fillDefaultValue(jToken, true)", nErrno),
-                               ordinary(SERVICE, R"(tokenSaveByOverwrite failed, jToken={"count":5})"),
-                               failed(SERVICE, "0 > tokenSaveByOverwrite(jToken)", nErrno)},
-                              nErrno),
-                  takeLines(Destination::Syslog));
+    for (const Field& missing : FIELDS) {
+        Json::Value jParam;
+        Texts overwritten;
+        for (const Field& field : FIELDS) {
+            if (&field != &missing) {
+                jParam[field.szName] = json(field.szValue);
+                overwritten.push_back(
+                    ordinary(fieldList(field.nLine), std::string("overwrite token[") + field.szName + "]"));
+            }
+        }
+        for (int nErrno : {0, EACCES}) {
+            errno = nErrno;
+            EXPECT_EQ(-1, api.tokenUpdateByTid(strTid, jParam));
+            const Texts lines =
+                overwritten +
+                Texts{ordinary(fieldList(missing.nLine), std::string("lost data member=") + missing.szName),
+                      failed(SERVICE, "0 > fillDefaultValue(jToken, true)", nErrno),
+                      ordinary(SERVICE, "tokenSaveByOverwrite failed, jToken=" + text(jParam)),
+                      failed(SERVICE, "0 > tokenSaveByOverwrite(jToken)", nErrno)};
+            EXPECT_EQ(inSystemLog(lines, nErrno), takeLines(Destination::Syslog));
+        }
     }
 }
 

@@ -38,6 +38,12 @@ extern "C" void logSyslog(int nPriority, const char* szFormat, ...) __asm__("sys
 // the attribute, since ISO C++ knows no "%m".)
 int checkFormat(const char* szFormat, ...) __attribute__((format(printf, 1, 2)));
 
+// The format of a line in the system log, which shows errno in front of the message when there is one.
+inline const char* syslogFormat(const char* szWithErrno, const char* szWithoutErrno)
+{
+    return 0 != errno ? szWithErrno : szWithoutErrno;
+}
+
 // Writes the line of VEMO_ATOKEN_FAILED.
 void logFailed(const char* szCondition, const char* szFile, int nLine) __attribute__((cold));
 
@@ -52,16 +58,16 @@ inline const char* textOrNull(const char* szText)
 #define VEMO_ATOKEN_HERE __FILE_NAME__, __LINE__
 #define VEMO_ATOKEN_HERE_IN_LIST __FILE__, __LINE__
 
-// Standard output never shows errno in front of the message, the system log does when there is one.
+// Standard output never shows errno in front of the message.
 #define VEMO_ATOKEN_WRITE_LINE(message, ...)                                                                 \
     do {                                                                                                     \
         const VEMO_ACCESS_TOKEN::ErrnoKeeper keeperOfLine;                                                   \
         if (VEMO_ACCESS_TOKEN::logToStdoutGet()) {                                                           \
             VEMO_ACCESS_TOKEN::logPrintf("%s:%d " message "\n", __VA_ARGS__);                                \
-        } else if (0 != errno) {                                                                             \
-            VEMO_ACCESS_TOKEN::logSyslog(LOG_ERR, "%s:%d (%m)" message "\n", __VA_ARGS__);                   \
         } else {                                                                                             \
-            VEMO_ACCESS_TOKEN::logSyslog(LOG_ERR, "%s:%d " message "\n", __VA_ARGS__);                       \
+            VEMO_ACCESS_TOKEN::logSyslog(                                                                    \
+                LOG_ERR, VEMO_ACCESS_TOKEN::syslogFormat("%s:%d (%m)" message "\n", "%s:%d " message "\n"),  \
+                __VA_ARGS__);                                                                                \
         }                                                                                                    \
     } while (0)
 

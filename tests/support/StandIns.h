@@ -5,7 +5,6 @@
 #define TESTS_STAND_INS_H
 
 #include <dlfcn.h>
-#include <gtest/gtest.h>
 #include <json/json.h>
 
 #include <functional>
@@ -24,15 +23,6 @@ struct StandIns {
 };
 
 StandIns& standIns();
-
-// Begins a test of a call within one source file of the library. clang takes the callee to be what it
-// sees there, whatever stands in front of it.
-#ifdef __clang__
-#define SKIP_WITHOUT_INTERPOSITION()                                                                         \
-    GTEST_SKIP() << "this compiler lets the library call its own functions directly"
-#else
-#define SKIP_WITHOUT_INTERPOSITION() static_cast<void>(0)
-#endif
 
 // The definition of a function that would be found if ours were not here, by its mangled name.
 template <typename Function>
