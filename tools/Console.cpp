@@ -14,6 +14,7 @@
 
 #include "AccessTokenUtil.h"
 #include "Failure.h"
+#include "Store.h"
 
 namespace {
 
@@ -27,6 +28,18 @@ locale_t utf8()
     return locale;
 }
 
+// The largest character that can be told: of ASCII where the machine has no UTF-8 locale, or no memory for
+// it.
+wchar_t largestCharacter()
+{
+    return utf8() ? 0x10ffff : 0x7f;
+}
+
+bool isPrintable(wchar_t cWide)
+{
+    return utf8() ? 0 != iswprint_l(static_cast<wint_t>(cWide), utf8()) : ' ' <= cWide && cWide <= '~';
+}
+
 // The text with \xNN for each byte of what is no UTF-8 or what does not pass.
 template <typename Passes>
 std::string escaped(const std::string& strText, Passes passes)
@@ -38,7 +51,7 @@ std::string escaped(const std::string& strText, Passes passes)
         mbstate_t state = {};
         const size_t cbRead = mbrtowc(&cWide, &strText[i], strText.size() - i, &state);
         // What is too large is an error's number, or none that UTF-8 goes to.
-        const bool blValid = cbRead <= strText.size() - i && cWide <= 0x10ffff;
+        const bool blValid = cbRead <= strText.size() - i && cWide <= largestCharacter();
         const size_t cbCharacter = blValid && cbRead ? cbRead : 1;
         if (blValid && passes(cWide)) {
             strOut.append(strText, i, cbCharacter);
@@ -68,6 +81,7 @@ void completeStreams()
     if (STDERR_FILENO < nStream) {
         close(nStream);
     }
+    std::cin.exceptions(std::ios_base::badbit); // it would hide that memory ran out, and cut lines short
 }
 
 FILE* resultStream()
@@ -108,6 +122,12 @@ void complain(const std::string& strSentence)
     fprintf(stderr, "vemo-access-token: %s\n", printable(strSentence).c_str());
 }
 
+void complainOfMemory()
+{
+    fputs("vemo-access-token: out of memory", stderr);
+    fputs(Store::hasChanged() ? "; the change was made\n" : "\n", stderr);
+}
+
 void flushResult()
 {
     if (0 != fflush(g_pResult) || ferror(g_pResult)) {
@@ -117,8 +137,7 @@ void flushResult()
 
 std::string printable(const std::string& strText)
 {
-    return escaped(strText,
-                   [](wchar_t cWide) { return 0 != iswprint_l(static_cast<wint_t>(cWide), utf8()); });
+    return escaped(strText, isPrintable);
 }
 
 std::string validUtf8(const std::string& strText)

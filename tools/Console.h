@@ -32,6 +32,9 @@ void print(const std::string& strText);
 // Writes a line "vemo-access-token: ..." to standard error.
 void complain(const std::string& strSentence);
 
+// Writes the one about memory, and takes none for that.
+void complainOfMemory();
+
 // Writes out what is still buffered. Fails when the result could not be written.
 void flushResult();
 

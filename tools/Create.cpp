@@ -61,12 +61,17 @@ Json::Value recordOf(const Options& options)
     return jToken;
 }
 
-// Deletes a token whose id nobody got to know.
-void takeBack(const std::string& strTid)
+// Deletes a token whose id nobody got to know. Returns what to say of that.
+std::string takeBack(const std::string& strTid)
 {
-    tool::Store store(tool::Store::Access::Write);
-    store.removeTid(strTid);
-    store.commit();
+    try {
+        tool::Store store(tool::Store::Access::Write);
+        store.removeTid(strTid);
+        store.commit();
+        return "the token was taken back";
+    } catch (const tool::Failure& failure) {
+        return std::string("the change was made, and cannot be taken back: ") + failure.fact();
+    }
 }
 
 int create(const Options& options)
@@ -76,6 +81,7 @@ int create(const Options& options)
     }
     const Json::Value jToken = recordOf(options);
     const std::string strTid = jToken["tid"].asString();
+    const std::string strLine = strTid + "\n"; // now, when a lack of memory does no harm yet
     tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
     store.purge();
     if (store.find(strTid)) {
@@ -85,11 +91,10 @@ int create(const Options& options)
     store.commit();
     signal(SIGPIPE, SIG_IGN); // for write() to fail, where nobody reads
     try {
-        tool::print(strTid + "\n");
+        tool::print(strLine);
         tool::flushResult();
     } catch (const tool::Failure& failure) {
-        takeBack(strTid);
-        throw tool::Failure(failure.status(), std::string(failure.what()) + "; the token was taken back");
+        throw tool::Failure(failure.status(), failure.fact(), takeBack(strTid));
     }
     return tool::EXIT_STATUS_DONE;
 }

@@ -110,10 +110,20 @@ std::vector<Line> readLines(std::istream& stream, const std::string& strFile)
             throw badLine(strFile, nLine, bad.what());
         }
     }
-    if (stream.bad() || ferror(stdin)) {
-        failOnReading(strFile);
-    }
     return lines;
+}
+
+std::vector<Line> readStream(std::istream& stream, const std::string& strFile)
+{
+    try {
+        stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts a line short
+        std::vector<Line> lines = readLines(stream, strFile);
+        if (!ferror(stdin)) {
+            return lines;
+        }
+    } catch (const std::ios_base::failure&) {
+    }
+    failOnReading(strFile);
 }
 
 std::string nameOf(const std::string& strFile)
@@ -124,13 +134,13 @@ std::string nameOf(const std::string& strFile)
 std::vector<Line> readFile(const std::string& strFile)
 {
     if (strFile == "-") {
-        return readLines(std::cin, nameOf(strFile));
+        return readStream(std::cin, nameOf(strFile));
     }
     std::ifstream stream(strFile, std::ios::binary);
     if (!stream.is_open()) {
         failOnReading(strFile);
     }
-    return readLines(stream, strFile);
+    return readStream(stream, strFile);
 }
 
 void importFile(const std::string& strFile)

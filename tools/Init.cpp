@@ -19,6 +19,9 @@ int init()
         store.makeTable();
         blTable = true;
     }
+    if (blDirectory || blFile) {
+        tool::Store::noteChange();
+    }
     if (blDirectory) {
         tool::print("made the directory " + tool::databaseDirectory() + "\n");
     }

@@ -3,6 +3,7 @@
 #include <json/reader.h>
 #include <json/writer.h>
 
+#include <cstring>
 #include <memory>
 #include <sstream>
 
@@ -39,13 +40,17 @@ std::string write(const Json::Value& jValue, const char* szIndentation)
     // are not valid UTF-8.
     builder["useSpecialFloats"] = true;
     builder["emitUTF8"] = true;
-    return withoutControls(Json::writeString(builder, jValue));
+    std::ostringstream stream;
+    stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
+    std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter())->write(jValue, &stream);
+    return withoutControls(stream.str());
 }
 
 // The first error of the reader's report, each of which stands behind a "*" and on several lines.
 std::string firstError(const std::string& strReport)
 {
     std::istringstream words(strReport);
+    words.exceptions(std::ios_base::badbit);
     std::string strError;
     for (std::string strWord; words >> strWord && (strWord != "*" || strError.empty());) {
         strError += strWord == "*" ? "" : (strError.empty() ? "" : " ") + strWord;
@@ -68,11 +73,18 @@ Json::Value parseObject(const std::string& strText, int nNestedMax)
     const std::unique_ptr<Json::CharReader> pReader(builder.newCharReader());
     Json::Value jValue;
     std::string strReport;
+    const auto parse = [&] {
+        return pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, &strReport);
+    };
     try {
-        if (!pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, &strReport)) {
+        // A text is bad when it is so twice: the reader takes a number for none when memory runs out.
+        if (!parse() && !parse()) {
             throw BadValue("is no JSON: " + firstError(strReport));
         }
-    } catch (const Json::Exception&) {
+    } catch (const Json::RuntimeError& error) {
+        if (!strstr(error.what(), "stackLimit")) {
+            throw; // memory ran out
+        }
         throw BadValue("is nested too deeply for JSON");
     }
     if (!jValue.isObject()) {

@@ -6,26 +6,32 @@
 #include <cstdarg>
 #include <cstdlib>
 #include <cstring>
-#include <exception>
 #include <memory>
-#include <sstream>
+#include <new>
 
 #include "Failure.h"
 #include "Place.h"
 
 namespace {
 
-int appendRow(void* pRows, int nColumns, char** rgValue, char**)
+// What a query gives, and whether there was memory for it.
+struct Result {
+    tool::Rows& rows;
+    bool blMemory = true;
+};
+
+int appendRow(void* pResult, int nColumns, char** rgValue, char**)
 {
+    Result& result = *static_cast<Result*>(pResult);
     try {
-        auto& rows = *static_cast<tool::Rows*>(pRows);
-        rows.emplace_back();
+        result.rows.emplace_back();
         for (int i = 0; i < nColumns; ++i) {
-            rows.back().push_back(rgValue[i] ? std::optional<std::string>(rgValue[i]) : std::nullopt);
+            result.rows.back().push_back(rgValue[i] ? std::optional<std::string>(rgValue[i]) : std::nullopt);
         }
         return 0;
-    } catch (const std::exception&) {
-        return -1; // the caller is a C function
+    } catch (const std::bad_alloc&) {
+        result.blMemory = false; // the caller is a C function
+        return -1;
     }
 }
 
@@ -95,11 +101,13 @@ std::vector<std::string> fieldNames()
 {
     std::string strList;
     AccessTokenDbApi().SqlExpandMemberName(strList);
-    std::istringstream list(strList);
     std::vector<std::string> strNames;
-    for (std::string strName; std::getline(list, strName, ',');) {
-        strNames.push_back(strName);
+    size_t nStart = 0;
+    for (size_t nEnd = strList.find(','); nEnd != std::string::npos; nEnd = strList.find(',', nStart)) {
+        strNames.push_back(strList.substr(nStart, nEnd - nStart));
+        nStart = nEnd + 1;
     }
+    strNames.push_back(strList.substr(nStart));
     return strNames;
 }
 
@@ -149,8 +157,25 @@ void Store::fail(const std::string& strErr)
         throw LockedFailure(EXIT_STATUS_STORE, strPath + "stayed locked by another process for 5 seconds",
                             blNothing ? "nothing was changed" : "");
     }
+    // No statement failed but there was no memory for its text, or for a row.
+    if (strErr.empty() || (contains(strErr, "query aborted") && !holdsNull())) {
+        throw std::bad_alloc();
+    }
+    // SQLite shortens the file when the change is made already, and can fail of that.
+    const bool blPerhaps = m_blCommitting && contains(strErr, "disk I/O error");
     const auto [strFact, strHint] = explained(strErr);
-    throw Failure(EXIT_STATUS_STORE, strPath + strFact, strHint);
+    throw Failure(EXIT_STATUS_STORE, strPath + strFact,
+                  blPerhaps ? "the change may have been made" : strHint);
+}
+
+// Whether there is a token that cannot be read.
+bool Store::holdsNull()
+{
+    std::string strAny = "0";
+    for (const std::string& strName : fieldNames()) {
+        strAny += " OR " + strName + " IS NULL";
+    }
+    return 0 != number("SELECT count(*) FROM token WHERE " + strAny);
 }
 
 void Store::require(int nResult)
@@ -163,7 +188,9 @@ void Store::require(int nResult)
 void Store::commit()
 {
     const bool blChanged = 0 != number("SELECT total_changes()");
+    m_blCommitting = blChanged;
     query("COMMIT");
+    m_blCommitting = false;
     if (blChanged) {
         noteChange();
     }
@@ -287,13 +314,21 @@ void Store::makeTable()
 Rows Store::query(const std::string& strSql)
 {
     Rows rows;
-    require(m_db.runSqlEx(strSql, appendRow, &rows));
+    const std::string strErr = queryAsFarAsItGoes(strSql, rows);
+    if (!strErr.empty()) {
+        fail(strErr);
+    }
     return rows;
 }
 
 std::string Store::queryAsFarAsItGoes(const std::string& strSql, Rows& rows)
 {
-    return 0 > m_db.runSqlEx(strSql, appendRow, &rows) ? m_db.m_strErr : "";
+    Result result = {rows};
+    const int nResult = m_db.runSqlEx(strSql, appendRow, &result);
+    if (!result.blMemory) {
+        throw std::bad_alloc();
+    }
+    return 0 > nResult ? m_db.m_strErr : "";
 }
 
 std::string Store::text(const std::string& strSql)

@@ -115,9 +115,11 @@ public:
 private:
     [[noreturn]] void fail(const std::string& strErr);
     void require(int nResult);
+    bool holdsNull();
     std::string equation(std::string strName, Json::Value jValue);
 
     const Access m_access;
+    bool m_blCommitting = false;
     AccessTokenDbApi m_db;
 };
 

@@ -65,7 +65,9 @@ void Table::add(const std::vector<std::string>& strCells, const char* szColour)
 
 void Table::print() const
 {
+    errno = 0;
     const int nResult = scols_print_table(m_pTable.get());
+    require(ENOMEM != errno); // it leaves cells empty then, and does not tell
     if (0 != nResult) {
         throw Failure(EXIT_STATUS_STORE, std::string("cannot print the table: ") + strerror(-nResult));
     }

@@ -102,7 +102,7 @@ void execute(Store& store, const Options& options)
             throw tool::Failure(tool::EXIT_STATUS_STORE,
                                 "the journal cannot be made \"" + strJournal + "\" here");
         }
-        if (!strResult.empty()) {
+        if (!strResult.empty() || strStatement == "COMMIT") {
             Store::noteChange();
         }
         progress.step();

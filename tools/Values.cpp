@@ -247,8 +247,13 @@ Json::Value parseExtra(const std::string& strText)
     }
     std::ifstream file(strFile, std::ios::binary);
     std::string strContent;
-    std::getline(file, strContent, '\0');
-    if (!file.is_open() || file.bad()) {
+    try {
+        file.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
+        std::getline(file, strContent, '\0');
+    } catch (const std::ios_base::failure&) {
+        throw BadValue(strFile + ": " + strerror(errno));
+    }
+    if (!file.is_open()) {
         throw BadValue(strFile + ": " + strerror(errno));
     }
     if (!file.eof()) {

@@ -1,7 +1,11 @@
 // vemo-access-token: what the administrator of a machine does with its access tokens. It works through
 // the library alone and never opens the database on its own.
 
+#include <json/value.h>
+#include <unistd.h>
+
 #include <clocale>
+#include <cstdlib>
 #include <exception>
 #include <new>
 
@@ -30,10 +34,25 @@ void addAll(tool::Commands& commands)
     tool::addTune(commands);
 }
 
+// What no handler catches, since it passes a function that must not throw, as the parser of the command
+// line has some; or since the handler itself got no memory.
+void endWithoutMemory()
+{
+    try {
+        std::rethrow_exception(std::current_exception());
+    } catch (const std::bad_alloc&) {
+        tool::complainOfMemory();
+        _exit(tool::EXIT_STATUS_STORE);
+    } catch (...) {
+        abort();
+    }
+}
+
 } // namespace
 
 int main(int nArguments, char** rgArguments)
 {
+    std::set_terminate(endWithoutMemory);
     try {
         tool::completeStreams();
         setlocale(LC_CTYPE, ""); // how wide characters are
@@ -44,7 +63,9 @@ int main(int nArguments, char** rgArguments)
         tool::complain(failure.what());
         return failure.status();
     } catch (const std::bad_alloc&) {
-        tool::complain("out of memory");
+        tool::complainOfMemory();
+    } catch (const Json::RuntimeError&) { // how jsoncpp tells the same
+        tool::complainOfMemory();
     } catch (const std::exception& exception) {
         tool::complain(exception.what());
     }

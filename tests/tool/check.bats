@@ -3,24 +3,8 @@
 
 load common
 
-ZEROS=$(printf '%0119d' 0)
-
-# row NAME [COLUMN = VALUE, ...]: a token whose id is the name, of 8 characters, and zeros; behind the
-# tool's back
-row()
-{
-    [ -e "$DB" ] || tool init >/dev/null
-    sql "INSERT INTO token VALUES ('$1$ZEROS', '', 0, 9999999999, 1, 1000000000, 'VPN',
-                                   '{\"Api\":{\"method\":[\"get\",\"list\"]},\"Bare\":{\"method\":[]}}', '{}');
-         ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
-}
-
-# state: what there is of the private directory, to the byte.
-state()
-{
-    find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
-    sha256sum "$DB"
-}
+ROW="'', 0, 9999999999, 1, 1000000000, 'VPN',
+     '{\"Api\":{\"method\":[\"get\",\"list\"]},\"Bare\":{\"method\":[]}}', '{}'"
 
 # checks: each line "ARGUMENTS|RESULT" of standard input is what check answers for a call; all of them
 # change nothing.

@@ -3,11 +3,17 @@
 #   tool ARGUMENTS...       the tool, as the administrator calls it
 #   sql STATEMENTS          on the database, behind the tool's back
 #   a_token [OPTIONS...]    creates a token and prints its id
+#   row NAME [COLUMN = VALUE, ...]  a token whose id is the name, of 8 characters, and $ZEROS; behind the tool's
+#                           back. Its fields are those of ROW, which a file can set otherwise.
+#   state                   what there is of the private directory, to the byte
 #   run_tool ARGUMENTS...   runs it: $status, $output (standard output), $stderr
 
 bats_require_minimum_version 1.5.0
 
 TOOL=${VEMO_TEST_TOOL:?names the tool: built with the redirection linked in}
+
+ZEROS=$(printf '%0119d' 0)
+ROW="'', 0, 9999999999, 1, 1000000000, 'VPN', '{\"Api\":{\"method\":[\"get\"]}}', '{}'"
 
 setup()
 {
@@ -38,6 +44,33 @@ a_token()
 {
     [ -e "$DB" ] || tool init >/dev/null
     tool create --uid 0 --function VPN "$@"
+}
+
+row()
+{
+    [ -e "$DB" ] || tool init >/dev/null
+    sql "INSERT INTO token VALUES ('$1$ZEROS', $ROW);
+         ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
+}
+
+state()
+{
+    [ ! -e "$VEMO_REDIRECT_DIR" ] || find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
+    [ ! -f "$DB" ] || sha256sum "$DB"
+}
+
+# refuses [ARGUMENTS]...: each line "ARGUMENTS|SENTENCE" of standard input, behind those, is a call that fails
+# with status 2 and that sentence. All of them change nothing.
+refuses()
+{
+    local arguments sentence before
+    before=$(state)
+    while IFS='|' read -r arguments sentence; do
+        echo "$arguments"
+        eval "run_tool $* $arguments" </dev/null
+        expect 2 "" "vemo-access-token: $sentence"
+    done
+    [ "$(state)" = "$before" ]
 }
 
 # expect STATUS OUTPUT [STDERR]: the result of run_tool, exactly

@@ -3,27 +3,6 @@
 
 load common
 
-# What there is of the private directory, to the byte.
-state()
-{
-    [ ! -e "$VEMO_REDIRECT_DIR" ] || find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
-    [ ! -f "$DB" ] || sha256sum "$DB"
-}
-
-# refuses: each line "ARGUMENTS|SENTENCE" of standard input is a call that fails with status 2 and that
-# sentence. All of them change nothing.
-refuses()
-{
-    local arguments sentence before
-    before=$(state)
-    while IFS='|' read -r arguments sentence; do
-        echo "$arguments"
-        eval "run_tool $arguments" </dev/null
-        expect 2 "" "vemo-access-token: $sentence"
-    done
-    [ "$(state)" = "$before" ]
-}
-
 # column COLUMN TID: of the token of that id
 column()
 {

@@ -3,17 +3,8 @@
 
 load common
 
-ZEROS=$(printf '%0119d' 0)
-
-# row NAME [COLUMN = VALUE, ...]: a token whose id is the name, of 8 characters, and zeros; behind the
-# tool's back
-row()
-{
-    [ -e "$DB" ] || tool init >/dev/null
-    sql "INSERT INTO token VALUES ('$1$ZEROS', 'session-1', 0, 9999999999, 5, 1000000000, 'VPN',
-                                   '{\"Api\":{\"method\":[\"get\",\"list\"]},\"Bare\":{\"method\":[]}}', '{\"n\":[0.5,\"ü\"]}');
-         ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
-}
+ROW="'session-1', 0, 9999999999, 5, 1000000000, 'VPN',
+     '{\"Api\":{\"method\":[\"get\",\"list\"]},\"Bare\":{\"method\":[]}}', '{\"n\":[0.5,\"ü\"]}'"
 
 # rows: what there is, but for the order that a saved token loses
 rows()

@@ -3,25 +3,6 @@
 
 load common
 
-ZEROS=$(printf '%0119d' 0)
-
-# row NAME [COLUMN = VALUE, ...]: a token whose id is the name, of 8 characters, and zeros; behind the
-# tool's back
-row()
-{
-    [ -e "$DB" ] || tool init >/dev/null
-    sql "INSERT INTO token VALUES ('$1$ZEROS', '', 0, 9999999999, 1, 1000000000, 'VPN', '{\"Api\":{\"method\":[\"get\"]}}',
-                                   '{}');
-         ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
-}
-
-# state: what there is of the private directory, to the byte.
-state()
-{
-    [ ! -e "$VEMO_REDIRECT_DIR" ] || find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
-    [ ! -f "$DB" ] || sha256sum "$DB"
-}
-
 # lists "NAME NAME..." ARGUMENTS...: these tokens, in this order
 lists()
 {
@@ -335,10 +316,7 @@ END
 }
 
 @test "list refuses options that it cannot use" {
-    while IFS='|' read -r arguments sentence; do
-        eval "run_tool list $arguments"
-        expect 2 "" "vemo-access-token: $sentence"
-    done <<'END'
+    refuses list <<'END'
 more|The following argument was not expected: more
 --unknown|The following argument was not expected: --unknown
 --uid 0 --user root|--uid excludes --user

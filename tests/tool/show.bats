@@ -3,25 +3,6 @@
 
 load common
 
-ZEROS=$(printf '%0119d' 0)
-
-# row NAME [COLUMN = VALUE, ...]: a token whose id is the name, of 8 characters, and zeros; behind the
-# tool's back
-row()
-{
-    [ -e "$DB" ] || tool init >/dev/null
-    sql "INSERT INTO token VALUES ('$1$ZEROS', '', 0, 9999999999, 1, 1000000000, 'VPN', '{\"Api\":{\"method\":[\"get\"]}}',
-                                   '{}');
-         ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
-}
-
-# state: what there is of the private directory, to the byte.
-state()
-{
-    find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
-    sha256sum "$DB"
-}
-
 # shows_at NUMBER ARGUMENTS...: this way of giving an id finds the token of that number.
 shows_at()
 {
@@ -226,10 +207,7 @@ END
 
 @test "show refuses arguments that it cannot use" {
     tool init
-    while IFS='|' read -r arguments sentence; do
-        eval "run_tool show $arguments" </dev/null
-        expect 2 "" "vemo-access-token: $sentence"
-    done <<'END'
+    refuses show <<'END'
 |TID is required
 ''|TID: the id is empty
 token---0 token---1|The following argument was not expected: token---1

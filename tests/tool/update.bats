@@ -3,35 +3,11 @@
 
 load common
 
-ZEROS=$(printf '%0119d' 0)
-
-# row NAME [COLUMN = VALUE, ...]: a token whose id is the name, of 8 characters, and zeros; behind the
-# tool's back
-row()
-{
-    [ -e "$DB" ] || tool init >/dev/null
-    sql "INSERT INTO token VALUES ('$1$ZEROS', 'session-1', 0, 9999999999, 5, 1000000000, 'VPN',
-                                   '{\"Api\":{\"method\":[\"get\"]}}', '{\"n\":[1,\"ü\"]}');
-         ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
-}
+ROW="'session-1', 0, 9999999999, 5, 1000000000, 'VPN', '{\"Api\":{\"method\":[\"get\"]}}', '{\"n\":[1,\"ü\"]}'"
 
 rows()
 {
     sql "SELECT * FROM token ORDER BY tid"
-}
-
-# refuses: each line "ARGUMENTS|SENTENCE" of standard input is a call of update that fails with status 2
-# and that sentence. All of them change nothing.
-refuses()
-{
-    local arguments sentence before
-    before=$(rows)
-    while IFS='|' read -r arguments sentence; do
-        echo "$arguments"
-        eval "run_tool update $arguments" </dev/null
-        expect 2 "" "vemo-access-token: $sentence"
-    done
-    [ "$(rows)" = "$before" ]
 }
 
 @test "each option changes its field, and no other" {
@@ -199,7 +175,7 @@ END
 
 @test "what a token does not open cannot be taken from it, and then nothing changes" {
     row token---
-    refuses <<'END'
+    refuses update <<'END'
 token--- --remove-allow Other|--remove-allow: the token does not list "Other"
 token--- --remove-allow api|--remove-allow: the token does not list "api"
 token--- --remove-allow Other:get|--remove-allow: the token does not list "Other"
@@ -305,7 +281,7 @@ END
     row token---
     row second-1
     row second-2 "tid = 'second-1x'"
-    refuses <<END
+    refuses update <<END
 --uses 2|TID is required
 token---|say what to change; "update --help" lists the fields
 '' --uses 2|TID: the id is empty

@@ -1,0 +1,44 @@
+// A run of the tool in a process of its own, in which the system fails or kills it where a test wants that.
+
+#ifndef TESTS_TOOL_TOOL_RUN_H
+#define TESTS_TOOL_TOOL_RUN_H
+
+#include <cstdint>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+// What happens to the calls nFirst to nLast of those that it can happen to.
+struct Fault {
+    enum class Kind {
+        Error,    // a system call on a file fails
+        FullDisk, // a system call that takes room on the disk fails
+        Signal,   // the process gets a signal in front of a system call on a file
+        Memory,   // an allocation of the command fails
+        Parsing,  // an allocation fails, before the command begins too
+    };
+    Kind kind = Kind::Error;
+    int64_t nFirst = 0;
+    int64_t nLast = -1;
+    int nSignal = 0;
+
+    bool isOfMemory() const { return Kind::Memory == kind || Kind::Parsing == kind; }
+};
+
+struct Ending {
+    int nSignal = 0; // that killed it
+    int nStatus = 0;
+    std::string strOutput;
+    std::string strError;
+    int64_t nCalls = 0; // that the fault could happen to
+};
+
+// Thrown where the kernel does not let one process answer the system calls of another.
+class NoAnswers : public std::runtime_error {
+    using std::runtime_error::runtime_error;
+};
+
+// Runs the tool. Nothing waits for the disk.
+Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault);
+
+#endif
