@@ -61,8 +61,8 @@ std::string contentsOf(const std::filesystem::path& path)
 
 } // namespace
 
-// What SQLite flushes to the disk need not get there: nothing here outlives the machine. Weak, for a test that
-// counts on the syncs.
+// What SQLite flushes to the disk need not get there: nothing here outlives the machine. Weak, for a test
+// that counts on the syncs.
 extern "C" __attribute__((weak)) int fsync(int)
 {
     return 0;

@@ -1,0 +1,232 @@
+// What CallLock promises: to threads, to forked children, across signals and when a holder is killed.
+
+#include <gtest/gtest.h>
+#include <pthread.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <csignal>
+#include <cstdlib>
+#include <optional>
+#include <random>
+#include <stdexcept>
+#include <thread>
+#include <vector>
+
+#include "AccessTokenUtil.h"
+#include "CallLock.h"
+#include "Figures.h"
+#include "ProcessState.h"
+#include "StormCalls.h"
+#include "StormProcesses.h"
+#include "internal/AccessTokenDbApi.h"
+
+namespace {
+
+// Whether somebody holds the lock just now.
+bool isHeld(const std::string& strFile)
+{
+    const int nFile = open(strFile.c_str(), O_RDWR | O_CLOEXEC);
+    const bool blHeld = 0 != flock(nFile, LOCK_EX | LOCK_NB);
+    close(nFile);
+    return blHeld;
+}
+
+struct Pipe {
+    Pipe() { EXPECT_EQ(0, pipe2(rgnEnd, O_CLOEXEC)); }
+    ~Pipe()
+    {
+        close(rgnEnd[0]);
+        close(rgnEnd[1]);
+    }
+    Pipe(const Pipe&) = delete;
+    Pipe& operator=(const Pipe&) = delete;
+    int rgnEnd[2] = {-1, -1};
+};
+
+// Whether another process meets SQLite's locks on the database. It asks the kernel: in a child, SQLite would
+// go by what it remembers of its parent's.
+bool isLockedBySqlite(const std::string& strDatabase)
+{
+    const off_t FIRST_LOCK_BYTE = 0x40000000;
+    const off_t LOCK_BYTES = 512;
+    return endsWell(startProcess([&] {
+        struct flock lock = {};
+        lock.l_type = F_WRLCK;
+        lock.l_start = FIRST_LOCK_BYTE;
+        lock.l_len = LOCK_BYTES;
+        const int nFile = open(strDatabase.c_str(), O_RDWR | O_CLOEXEC);
+        if (0 != fcntl(nFile, F_GETLK, &lock) || F_UNLCK == lock.l_type) {
+            throw std::runtime_error("not locked");
+        }
+    }));
+}
+
+class SerialisingLock : public ::testing::Test {
+protected:
+    const StormCalls m_calls{Calls::Serialised};
+    const std::string m_strFile = m_calls.lockFile();
+};
+
+} // namespace
+
+TEST_F(SerialisingLock, GrantsToThreadsExactly)
+{
+    const int nUses = static_cast<int>(scaled(50));
+    const unsigned int nThreads = 4;
+    m_calls.prepare({{"shared", nUses}});
+    VEMO_ACCESS_TOKEN::tokenType(); // filled without a lock, so ahead of the threads
+
+    std::atomic<int> nGranted(0);
+    std::vector<std::thread> threads;
+    for (unsigned int nThread = 0; nThread < nThreads; ++nThread) {
+        threads.emplace_back([&] {
+            for (int i = 0; i < nUses; ++i) {
+                nGranted += 0 == m_calls.grant("shared");
+            }
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    EXPECT_EQ(nUses, nGranted);
+    EXPECT_EQ(Tokens(), m_calls.tokens());
+}
+
+// Whatever a killed process was doing, the others' calls succeed: the kernel frees its lock, and the next
+// call undoes what it left half done.
+TEST_F(SerialisingLock, GoesOnWhenAHolderIsKilled)
+{
+    const int nKills = static_cast<int>(scaled(50));
+    std::mt19937_64 random(seed());
+    m_calls.prepare({{"shared", 1000000}});
+    for (int nKill = 0; nKill < nKills; ++nKill) {
+        const pid_t pid = startProcess([&] {
+            for (;;) {
+                m_calls.grant("shared");
+            }
+        });
+        for (uint64_t nLeft = random() % 8; 0 < nLeft; --nLeft) {
+            EXPECT_EQ(0, m_calls.grant("shared"));
+        }
+        EXPECT_EQ(0, kill(pid, SIGKILL));
+        EXPECT_FALSE(endsWell(pid));
+        EXPECT_EQ(0, m_calls.grant("shared"));
+    }
+    EXPECT_EQ(1U, m_calls.tokens().size());
+    figure("Killed holders", std::to_string(nKills) + " kills, no call of others failed");
+}
+
+// Programs that the holder started do not keep it.
+TEST_F(SerialisingLock, IsFreedByTheKernelWithItsHolder)
+{
+    Pipe toCat;
+    Pipe fromCat;
+    const pid_t pid = startProcess([&] {
+        const CallLock lock(m_strFile.c_str());
+        if (0 == fork()) {
+            dup2(toCat.rgnEnd[0], STDIN_FILENO);
+            dup2(fromCat.rgnEnd[1], STDOUT_FILENO);
+            execlp("cat", "cat", nullptr);
+            _exit(1);
+        }
+        pause();
+    });
+    char cEcho = 'x';
+    EXPECT_EQ(1, write(toCat.rgnEnd[1], &cEcho, 1));
+    EXPECT_EQ(1, read(fromCat.rgnEnd[0], &cEcho, 1)); // so it runs now
+    EXPECT_TRUE(isHeld(m_strFile));
+    kill(pid, SIGKILL);
+    EXPECT_FALSE(endsWell(pid));
+    EXPECT_FALSE(isHeld(m_strFile));
+}
+
+// A child that is forked meanwhile has the descriptor too; it neither frees the lock nor keeps it.
+TEST_F(SerialisingLock, IsItsMakersAlone)
+{
+    std::optional<CallLock> lock(std::in_place, m_strFile.c_str());
+    EXPECT_TRUE(endsWell(startProcess([] {})));
+    EXPECT_TRUE(isHeld(m_strFile));
+
+    const pid_t pid = startProcess([] { pause(); });
+    lock.reset();
+    EXPECT_FALSE(isHeld(m_strFile));
+    kill(pid, SIGKILL);
+    EXPECT_FALSE(endsWell(pid));
+}
+
+// The waiter is interrupted again and again, and waits on.
+TEST_F(SerialisingLock, WaitsOnWhenASignalInterrupts)
+{
+    static std::atomic<int> nSignals;
+    struct sigaction action = {};
+    action.sa_handler = [](int) { ++nSignals; }; // without SA_RESTART
+    ASSERT_EQ(0, sigaction(SIGUSR1, &action, nullptr));
+
+    std::optional<CallLock> lock(std::in_place, m_strFile.c_str());
+    std::atomic<bool> blHas(false);
+    std::thread waiter([&] {
+        const CallLock second(m_strFile.c_str());
+        blHas = true;
+    });
+    while (100 > nSignals && !blHas) {
+        ASSERT_EQ(0, pthread_kill(waiter.native_handle(), SIGUSR1));
+        std::this_thread::yield();
+    }
+    EXPECT_FALSE(blHas);
+    lock.reset();
+    waiter.join();
+    EXPECT_TRUE(blHas);
+}
+
+TEST_F(SerialisingLock, MakesAPrivateFileAndFollowsNoLink)
+{
+    struct stat status = {};
+    const ProcessState before = ProcessState::now();
+    {
+        const CallLock lock(m_strFile.c_str());
+    }
+    ASSERT_EQ(0, stat(m_strFile.c_str(), &status));
+    EXPECT_EQ(0U, status.st_mode & 077);
+    EXPECT_EQ("", before.differenceTo(ProcessState::now()));
+    const std::string strLink = m_strFile + ".link";
+    ASSERT_EQ(0, symlink(m_strFile.c_str(), strLink.c_str()));
+    EXPECT_THROW(CallLock(strLink.c_str()), std::system_error);
+    EXPECT_THROW(CallLock((m_strFile + ".missing/lock").c_str()), std::system_error);
+}
+
+// Why the file is never the database: to close a descriptor of a file drops the locks that SQLite has on it
+// for any connection of the process.
+TEST_F(SerialisingLock, OnTheDatabaseTakesItsLocksAway)
+{
+    m_calls.prepare({});
+    AccessTokenDbApi db;
+    ASSERT_EQ(0, db.initDb());
+    ASSERT_EQ(0, db.runSqlEx("BEGIN IMMEDIATE", nullptr, nullptr));
+    EXPECT_TRUE(isLockedBySqlite(m_calls.database()));
+    {
+        const CallLock lock(m_calls.database().c_str());
+    }
+    EXPECT_FALSE(isLockedBySqlite(m_calls.database()));
+}
+
+// The administrator's tool takes part when it runs below flock(1) with the same file.
+TEST_F(SerialisingLock, KeepsTheToolBelowFlockWaiting)
+{
+    const char* szTool = getenv("VEMO_TEST_TOOL");
+    if (!szTool) {
+        GTEST_SKIP() << "VEMO_TEST_TOOL does not name the tool";
+    }
+    const int STATUS_HELD = 75;
+    const std::string strCommand = m_strFile + " " + szTool + " create --uid 0 --function tool >/dev/null";
+    m_calls.prepare({});
+    {
+        const CallLock lock(m_strFile.c_str());
+        const int nStatus = system(("flock -n -E 75 " + strCommand).c_str());
+        EXPECT_EQ(STATUS_HELD, WEXITSTATUS(nStatus));
+        EXPECT_EQ(Tokens(), m_calls.tokens());
+    }
+    EXPECT_EQ(0, system(("flock " + strCommand).c_str()));
+    EXPECT_EQ((Tokens{{"new", 1}}), m_calls.tokens());
+}

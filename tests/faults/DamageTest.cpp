@@ -1,0 +1,135 @@
+// Each byte of a database is damaged, and the database is cut off behind each: the calls go on to give an
+// answer.
+
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <fstream>
+#include <functional>
+
+#include "FaultyVfs.h"
+#include "Figures.h"
+#include "ProcessState.h"
+#include "SmallStore.h"
+
+namespace {
+
+const unsigned int HANG_SEC = 60;
+const uid_t UID_CALLER = 1234;
+
+// Nothing has to reach the disk here.
+int withoutSync(const FileCall& call, const std::function<int()>& real)
+{
+    const std::string strName = call.szName;
+    return "xSync" == strName     ? SQLITE_OK
+           : "xDelete" == strName ? (unlink(call.strPath.c_str()), SQLITE_OK)
+                                  : real();
+}
+
+class DamagedByte : public ::testing::Test {
+protected:
+    DamagedByte()
+    {
+        m_processBefore.uidEffective = UID_CALLER;
+        static_cast<void>(seteuid(UID_CALLER));
+        for (const std::string& strCall : CALLS) {
+            m_soundAnswers.push_back(call(strCall));
+        }
+    }
+
+    ~DamagedByte() override { alarm(0); }
+
+    // Has the first calls use a database one after the other. They may fail or do what they can, but for what
+    // the process is trusted with.
+    void use(const std::string& strContents, size_t nFirst = CALLS.size())
+    {
+        alarm(HANG_SEC); // ends a test that hangs
+        m_store.setFiles({{DATABASE, strContents}});
+        for (size_t i = 0; i < nFirst; ++i) {
+            judge(CALLS[i], call(CALLS[i]), m_soundAnswers[i]);
+        }
+        EXPECT_EQ(0, sqlite3_memory_used());
+        ++m_nDatabases;
+    }
+
+    void judge(const std::string& strCall, const Answer& answer, const Answer& sound)
+    {
+        EXPECT_LE(-1, answer.nResult) << strCall;
+        if ("grant" == strCall || "creation" == strCall) {
+            EXPECT_GE(0, answer.nResult) << strCall;
+        }
+        if ("grant" != strCall) { // which does not tell why it refuses
+            EXPECT_NE("-1: ", answer.strText) << strCall;
+            EXPECT_FALSE(answer.blThrown) << strCall << answer.strText;
+        }
+        ++m_nCalls;
+        m_nThrown += answer.blThrown ? 1 : 0;
+        m_nFailed += !answer.blThrown && 0 > answer.nResult ? 1 : 0;
+        m_nAsSound += answer.strText == sound.strText && answer.strListed == sound.strListed ? 1 : 0;
+    }
+
+    // Called at the end: by then, what calls leave behind would have piled up.
+    void print(const std::string& strWhat) const
+    {
+        EXPECT_EQ("", m_processBefore.differenceTo(ProcessState::now()));
+        EXPECT_EQ(1U, m_store.files().size());
+        figure("damage", strWhat + ": " + std::to_string(m_nDatabases) + " databases, " +
+                             std::to_string(m_nCalls) + " calls: " + share(m_nAsSound, m_nCalls) +
+                             " as if nothing were, " + share(m_nFailed, m_nCalls) + " fail, " +
+                             share(m_nThrown, m_nCalls) + " throw, " +
+                             share(m_nCalls - m_nAsSound - m_nFailed - m_nThrown, m_nCalls) +
+                             " succeed with another answer");
+    }
+
+    const TokenStore m_store;
+    const std::string m_strSound = makeSmallStore(m_store);
+    ProcessState m_processBefore = ProcessState::now();
+    const FaultyVfs m_vfs{&withoutSync};
+
+private:
+    std::vector<Answer> m_soundAnswers;
+    int64_t m_nDatabases = 0;
+    int64_t m_nCalls = 0;
+    int64_t m_nAsSound = 0;
+    int64_t m_nFailed = 0;
+    int64_t m_nThrown = 0;
+};
+
+} // namespace
+
+TEST_F(DamagedByte, InvertedHarmsNobody)
+{
+    for (size_t i = 0; i < m_strSound.size(); ++i) {
+        SCOPED_TRACE(i);
+        std::string strDamaged = m_strSound;
+        strDamaged[i] = static_cast<char>(~strDamaged[i]);
+        use(strDamaged);
+    }
+    print("each byte inverted");
+}
+
+// Decoding rows is the library's own work, all else SQLite's. On ordinary days it is the bit that turns a
+// zero into NULL; longer runs flip the others too.
+TEST_F(DamagedByte, WithOneBitFlippedIsReadWithoutHarm)
+{
+    for (int64_t nBit = 3; nBit < 3 + std::min<int64_t>(8, scaled(1)); ++nBit) {
+        for (size_t i = 0; i < m_strSound.size(); ++i) {
+            SCOPED_TRACE(std::to_string(i) + ", bit " + std::to_string(nBit % 8));
+            std::string strDamaged = m_strSound;
+            strDamaged[i] = static_cast<char>(strDamaged[i] ^ (1 << nBit % 8));
+            use(strDamaged, 1);
+        }
+    }
+    print("a bit of each byte flipped");
+}
+
+TEST_F(DamagedByte, MissingWithAllBehindItHarmsNobody)
+{
+    for (size_t cb = 0; cb < m_strSound.size(); ++cb) {
+        SCOPED_TRACE(cb);
+        use(m_strSound.substr(0, cb));
+    }
+    print("each truncation");
+}

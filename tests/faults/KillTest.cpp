@@ -1,0 +1,203 @@
+// Processes are killed in the midst of an operation, and leave the store as a crash does.
+
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstring>
+#include <map>
+#include <random>
+
+#include "FaultyVfs.h"
+#include "Figures.h"
+#include "InMemory.h"
+#include "Oracle.h"
+#include "internal/AccessTokenDbApi.h"
+
+namespace {
+
+const Operation& CREATION = operations()[1];
+
+typedef std::function<int()> Call;
+
+// How often a first creation left what.
+struct Leftovers {
+    int64_t nMissing = 0;
+    int64_t nNoTable = 0;
+    int64_t nNoToken = 0;
+    int64_t nDone = 0;
+
+    void count(const std::string& strState)
+    {
+        int64_t& nCount = STATE_MISSING == strState    ? nMissing
+                          : STATE_NO_TABLE == strState ? nNoTable
+                          : strState.empty()           ? nNoToken
+                                                       : nDone;
+        ++nCount;
+    }
+
+    std::string text() const
+    {
+        const int64_t nAll = nMissing + nNoTable + nNoToken + nDone;
+        return "first creation left no file " + share(nMissing, nAll) + ", a file without the table " +
+               share(nNoTable, nAll) + ", no token " + share(nNoToken, nAll) + ", all " + share(nDone, nAll);
+    }
+};
+
+class Kill : public ::testing::Test {
+protected:
+    // Whether a process was killed in the midst of the call.
+    bool isKilledIn(const Call& run)
+    {
+        const pid_t nChild = fork();
+        if (0 == nChild) {
+            alarm(60); // nobody waits for a call that hangs
+            run();
+            _exit(0);
+        }
+        int nStatus = 0;
+        EXPECT_EQ(nChild, waitpid(nChild, &nStatus, 0));
+        const bool blKilled = WIFSIGNALED(nStatus) && SIGKILL == WTERMSIG(nStatus);
+        EXPECT_TRUE(blKilled || (WIFEXITED(nStatus) && 0 == WEXITSTATUS(nStatus))) << nStatus;
+        return blKilled;
+    }
+
+    // The life of a process that is not killed: the shortest of some, because others use the machine too.
+    int64_t nanosecondsOf(const Operation& operation)
+    {
+        int64_t nShortest = INT64_MAX;
+        for (int i = 0; i < 10; ++i) {
+            prepareStore(m_store, operation);
+            const auto start = std::chrono::steady_clock::now();
+            isKilledIn(operation.run);
+            const auto life = std::chrono::steady_clock::now() - start;
+            nShortest = std::min<int64_t>(nShortest, std::chrono::nanoseconds(life).count());
+        }
+        return nShortest;
+    }
+
+    // A program that reads, and the library itself, each as the first to find what was left.
+    void judge(const Operation& operation, const Oracle& oracle)
+    {
+        const Files files = m_store.files();
+        const std::string strState = m_store.state();
+        EXPECT_TRUE(oracle.allows(strState)) << strState;
+        m_store.setFiles(files);
+        if (STATE_NO_TABLE == strState) {
+            EXPECT_EQ(-1, CREATION.run());
+            EXPECT_EQ(0, AccessTokenDbApi().createTable());
+        }
+        EXPECT_EQ(0, CREATION.run());
+        EXPECT_NE(std::string::npos, m_store.state().find("new||0|new|2|new|VPN"));
+        if (operation.blCreatesStore) {
+            m_leftovers.count(strState);
+        }
+    }
+
+    // Kills each operation equally often.
+    void killAll(const std::string& strName, int64_t nKills,
+                 const std::function<Call(const Operation&)>& drawFatal)
+    {
+        int64_t nKilled = 0;
+        int64_t nEnded = 0;
+        for (const Operation& operation : operations()) {
+            SCOPED_TRACE(operation.szName);
+            const Oracle oracle(m_store, operation);
+            const int64_t nEnough = nKilled + nKills / static_cast<int64_t>(operations().size());
+            while (nKilled < nEnough && !HasFailure()) {
+                const Call runFatally = drawFatal(operation);
+                prepareStore(m_store, operation);
+                if (!isKilledIn(runFatally)) {
+                    ++nEnded;
+                    continue;
+                }
+                ++nKilled;
+                judge(operation, oracle);
+            }
+        }
+        figure("kill, " + strName, std::to_string(nKilled) + " processes killed, " + std::to_string(nEnded) +
+                                       " ended before; " + m_leftovers.text());
+    }
+
+    InMemory m_inMemory;
+    TokenStore m_store;
+    Leftovers m_leftovers;
+    std::mt19937_64 m_random{seed()};
+};
+
+int64_t countCalls(const Operation& operation)
+{
+    int64_t nCalls = 0;
+    const FaultyVfs vfs([&](const FileCall&, const Call& real) {
+        ++nCalls;
+        return real();
+    });
+    operation.run();
+    return nCalls;
+}
+
+// Dies in the call of that number: ahead of it, behind it, or, if it writes, half-way.
+int runUntil(const Operation& operation, int64_t nFatal, uint64_t nWhere)
+{
+    int64_t nCalls = 0;
+    const FaultyVfs vfs([&](const FileCall& call, const Call& real) {
+        if (++nCalls < nFatal) {
+            return real();
+        }
+        if (1 == nWhere) {
+            real();
+        } else if (2 == nWhere && 0 == strcmp("xWrite", call.szName)) {
+            call.write(call.cb / 2);
+        }
+        return raise(SIGKILL);
+    });
+    return operation.run();
+}
+
+// The kernel kills the process when that time is over.
+int runFor(const Operation& operation, int64_t nNanoseconds)
+{
+    sigevent event = {};
+    event.sigev_notify = SIGEV_SIGNAL;
+    event.sigev_signo = SIGKILL;
+    timer_t timer;
+    itimerspec when = {};
+    when.it_value.tv_sec = nNanoseconds / 1000000000;
+    when.it_value.tv_nsec = nNanoseconds % 1000000000;
+    if (0 != timer_create(CLOCK_MONOTONIC, &event, &timer) || 0 != timer_settime(timer, 0, &when, nullptr)) {
+        _exit(1);
+    }
+    return operation.run();
+}
+
+} // namespace
+
+TEST_F(Kill, AtACallLeavesAStateThatTheCallerKnows)
+{
+    std::map<const char*, int64_t> calls;
+    for (const Operation& operation : operations()) {
+        prepareStore(m_store, operation);
+        calls[operation.szName] = countCalls(operation);
+    }
+    killAll("at a call", scaled(1500), [&](const Operation& operation) {
+        const int64_t nFatal = 1 + static_cast<int64_t>(m_random() >> 1) % calls[operation.szName];
+        const uint64_t nWhere = m_random() % 3;
+        return [&operation, nFatal, nWhere] { return runUntil(operation, nFatal, nWhere); };
+    });
+}
+
+TEST_F(Kill, AtAMomentLeavesAStateThatTheCallerKnows)
+{
+    std::map<const char*, int64_t> nanoseconds;
+    for (const Operation& operation : operations()) {
+        nanoseconds[operation.szName] = nanosecondsOf(operation);
+    }
+    killAll("at a moment", scaled(1500), [&](const Operation& operation) {
+        const int64_t nTime = 1 + static_cast<int64_t>(m_random() >> 1) % nanoseconds[operation.szName];
+        return [&operation, nTime] { return runFor(operation, nTime); };
+    });
+}

@@ -1,0 +1,210 @@
+// The power fails at every moment of an operation, and the disk keeps of what was not synced what it likes.
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <algorithm>
+
+#include "Figures.h"
+#include "InMemory.h"
+#include "Oracle.h"
+#include "PowerJudge.h"
+
+namespace {
+
+typedef std::vector<std::function<int()>> Calls;
+
+const Operation& FIRST_CREATION = operations()[0];
+const Operation& CREATION = operations()[1];
+const Operation& LISTING = operations()[9];
+const Operation& DELETION_OF_ALL = operations()[11];
+
+PowerDisk diskAfter(const Recording& recording)
+{
+    PowerDisk disk(recording.files, Order::Kept);
+    for (const DiskCall& call : recording.calls) {
+        disk.take(call);
+    }
+    return disk;
+}
+
+class PowerCut : public ::testing::Test {
+protected:
+    Files filesBefore(const Operation& operation)
+    {
+        prepareStore(m_store, operation);
+        return m_store.files();
+    }
+
+    Recording recordOn(const Files& files, const Calls& calls)
+    {
+        const Recording recording = record(m_store, files, calls);
+        // The model is of use only where it says what programs saw.
+        EXPECT_TRUE(m_store.files() == diskAfter(recording).files());
+        return recording;
+    }
+
+    Recording recordOperation(const Operation& operation)
+    {
+        return recordOn(filesBefore(operation), {operation.run});
+    }
+
+    // All that find a store, one after another.
+    Recording recordOneAfterAnother(const Files& files)
+    {
+        Calls calls;
+        for (const Operation& operation : operations()) {
+            if (!operation.blCreatesStore) {
+                calls.push_back(operation.run);
+            }
+        }
+        return recordOn(files, calls);
+    }
+
+    // The call, and what its caller can do for the change to be kept.
+    std::function<int()> thenSync(const Operation& operation)
+    {
+        return [this, &operation] {
+            const int nResult = operation.run();
+            const int nDirectory = open(m_store.directory().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+            fsync(nDirectory);
+            close(nDirectory);
+            return nResult;
+        };
+    }
+
+    // Disks whose power was cut when a change was written and not synced: there is a journal to recover from.
+    std::vector<Files> drawInterrupted(const Recording& recording)
+    {
+        std::vector<Files> interrupted;
+        PowerDisk disk(recording.files, Order::Kept);
+        for (const DiskCall& call : recording.calls) {
+            if (DiskCall::Kind::Sync == call.kind && !isJournal(call.strName)) {
+                interrupted.push_back(m_judge.draw(disk));
+            }
+            disk.take(call);
+        }
+        return interrupted;
+    }
+
+    PowerTally judgeAll(const std::vector<Recording>& recordings, Order order, int64_t nDraws)
+    {
+        PowerTally sum;
+        for (const Recording& recording : recordings) {
+            sum += m_judge.judge(recording, order, nDraws);
+        }
+        EXPECT_EQ(0, sum.nWrong) << sum.strFirstWrong;
+        return sum;
+    }
+
+    void report(const std::string& strName, const PowerTally& tally)
+    {
+        figure("power cut, " + strName,
+               std::to_string(tally.nImages) + " images, " + std::to_string(m_judge.different()) +
+                   " different; third states " + std::to_string(tally.nWrong) + ", damaged tokens " +
+                   std::to_string(tally.nDamaged) + "; changes undone although acknowledged " +
+                   std::to_string(tally.nUndone) + " of " + std::to_string(tally.nExposed) + " (" +
+                   share(tally.nUndone, tally.nExposed) + ") before the directory is synced, 0 after");
+    }
+
+    InMemory m_inMemory;
+    TokenStore m_store;
+    PowerJudge m_judge{m_store};
+};
+
+} // namespace
+
+TEST_F(PowerCut, LeavesTheStateBeforeOrAfterACommit)
+{
+    std::vector<Recording> recordings;
+    for (const Operation& operation : operations()) {
+        SCOPED_TRACE(operation.szName);
+        const Oracle oracle(m_store, operation);
+        recordings.push_back(recordOperation(operation));
+        for (const std::string& strState : m_judge.steps(recordings.back())) {
+            EXPECT_TRUE(oracle.allows(strState)) << strState;
+        }
+    }
+    const PowerTally tally = judgeAll(recordings, Order::Kept, scaled(4));
+    EXPECT_EQ(0, tally.nDamaged);
+    report("one call", tally);
+}
+
+TEST_F(PowerCut, UndoesNoAcknowledgedChangeButTheLast)
+{
+    const std::vector<Recording> recordings = {
+        recordOn({}, {FIRST_CREATION.run, CREATION.run, DELETION_OF_ALL.run}),
+        recordOneAfterAnother(filesBefore(CREATION))};
+    const PowerTally tally = judgeAll(recordings, Order::Kept, scaled(4));
+    EXPECT_EQ(0, tally.nDamaged);
+    EXPECT_LT(0, tally.nUndone);
+    report("one call after another", tally);
+}
+
+// A first call that changes nothing else makes the table, and that is then the last change.
+TEST_F(PowerCut, CanTakeBackTheTable)
+{
+    const PowerDisk disk = diskAfter(recordOn({}, {LISTING.run}));
+    EXPECT_EQ("", m_judge.stateOf(disk.files()));
+    EXPECT_EQ(STATE_NO_TABLE, m_judge.stateOf(disk.afterPowerCut(&onlySynced)));
+}
+
+TEST_F(PowerCut, CanMeetTheRecoveryFromAnother)
+{
+    std::vector<Recording> recordings;
+    for (const Operation& operation : operations()) {
+        for (const Files& files : drawInterrupted(recordOperation(operation))) {
+            recordings.push_back(recordOn(files, {[] {
+                                              CREATION.run(); // there may be no table yet
+                                              return 0;
+                                          }}));
+        }
+    }
+    const PowerTally tally = judgeAll(recordings, Order::Kept, scaled(2));
+    EXPECT_EQ(0, tally.nDamaged);
+    report("during the recovery", tally);
+}
+
+TEST_F(PowerCut, UndoesNothingOnceTheCallerHasSyncedTheDirectory)
+{
+    std::vector<Recording> recordings;
+    for (const Operation& operation : operations()) {
+        recordings.push_back(recordOn(filesBefore(operation), {thenSync(operation)}));
+    }
+    const PowerTally tally = judgeAll(recordings, Order::Kept, scaled(1));
+    EXPECT_EQ(0, tally.nExposed);
+    report("directory synced after the call", tally);
+}
+
+// SQLite truncates a database that has shrunk after it has unlinked the journal, and journals nothing of what
+// it cuts off. A disk that keeps the truncation and loses the unlink has a journal that cannot bring that
+// back.
+TEST_F(PowerCut, DamagesATokenWhereTheDiskLosesTheOrder)
+{
+    const PowerTally tally = judgeAll({recordOneAfterAnother(filesBefore(CREATION))}, Order::Lost, scaled(1));
+    EXPECT_LT(0, tally.nDamaged);
+    report("order of unlink and truncation lost", tally);
+}
+
+TEST_F(PowerCut, DamagesNoTokenWhereTheDatabaseDoesNotShrink)
+{
+    m_store.setFiles(filesBefore(CREATION));
+    m_store.run("PRAGMA auto_vacuum = NONE; VACUUM;");
+    const PowerTally tally = judgeAll({recordOneAfterAnother(m_store.files())}, Order::Lost, scaled(1));
+    EXPECT_EQ(0, tally.nDamaged);
+    report("order lost, without auto_vacuum", tally);
+}
+
+// What the judge would find if SQLite left out a sync.
+TEST_F(PowerCut, WouldDamageAStoreThatIsNotSynced)
+{
+    for (const DiskCall::Kind kind : {DiskCall::Kind::Sync, DiskCall::Kind::SyncDirectory}) {
+        Recording recording = recordOperation(DELETION_OF_ALL);
+        std::vector<DiskCall>& calls = recording.calls;
+        calls.erase(std::remove_if(calls.begin(), calls.end(),
+                                   [&](const DiskCall& call) { return call.kind == kind; }),
+                    calls.end());
+        EXPECT_LT(0, m_judge.judge(recording, Order::Kept, 1).nWrong);
+    }
+}

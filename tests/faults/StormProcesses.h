@@ -1,0 +1,49 @@
+// Many processes at once, and what they report.
+
+#ifndef TESTS_STORM_PROCESSES_H
+#define TESTS_STORM_PROCESSES_H
+
+#include <sys/mman.h>
+#include <sys/types.h>
+
+#include <cstddef>
+#include <functional>
+#include <new>
+#include <type_traits>
+
+// Zeroed memory that processes share with those that they fork.
+template <typename Element>
+class SharedArray {
+public:
+    explicit SharedArray(size_t nElements)
+        : m_cb(nElements * sizeof(Element)),
+          m_pMemory(mmap(nullptr, m_cb, PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0))
+    {
+        static_assert(std::is_trivially_destructible_v<Element>);
+        if (MAP_FAILED == m_pMemory) {
+            throw std::bad_alloc();
+        }
+    }
+    ~SharedArray() { munmap(m_pMemory, m_cb); }
+    SharedArray(const SharedArray&) = delete;
+    SharedArray& operator=(const SharedArray&) = delete;
+
+    Element& operator[](size_t nElement) { return static_cast<Element*>(m_pMemory)[nElement]; }
+
+private:
+    const size_t m_cb;
+    void* const m_pMemory;
+};
+
+// Forks a process that runs body and ends; with status 0, unless body throws. It is killed when its parent
+// ends.
+pid_t startProcess(const std::function<void()>& body);
+
+// Waits for a process; whether it ended with status 0.
+bool endsWell(pid_t pid);
+
+// Runs body(0), body(1) and so on in processes of their own, which all begin when the last is there.
+// Returns how many of them did not end well.
+int runProcesses(int nProcesses, const std::function<void(int)>& body);
+
+#endif
