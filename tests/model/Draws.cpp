@@ -1,0 +1,343 @@
+#include "Draws.h"
+
+#include "ModelFilter.h"
+#include "World.h"
+
+namespace {
+
+const size_t TID_MIN = 127;
+
+std::string id(std::string strText)
+{
+    strText.resize(TID_MIN, 'x');
+    return strText;
+}
+
+std::string withNul(const std::string& strHead, const std::string& strTail)
+{
+    return strHead + '\0' + strTail;
+}
+
+Json::Value parsed(const char* szText)
+{
+    Json::Value jValue;
+    Json::Reader().parse(szText, jValue);
+    return jValue;
+}
+
+// Ids long enough and not, two of which read the same up to a NUL, and one that two others make in a list.
+const std::string g_rgTid[] = {
+    id("a"),
+    id("b"),
+    id("c"),
+    id("d"),
+    id("e"),
+    id("it's"),
+    id("\xff\xfe\xc3"),
+    id("'; DROP TABLE token; --"),
+    id("a") + "'" + id("b"),
+    std::string(6000, 'l'),
+    withNul(id("a"), "tail"),
+    withNul("short", id("")),
+    withNul("", id("")),
+    "short",
+    std::string(TID_MIN - 1, 'x'),
+    "",
+};
+
+const std::string g_rgSession[] = {
+    "", "s1", "s2", "s1's2", withNul("", "hidden"), withNul("s1", "tail"), "\xc3(", "' or '1'='1", "1"};
+
+const std::string g_rgPurpose[] = {
+    "VPN", "VPN", "Mail", "VPN'Mail", "it's", "\xf0\x9f\x94\x91", withNul("", "x"), ""};
+
+const std::string g_rgWebapi[] = {"Example.Api",
+                                  "Example.Api",
+                                  "Example.Api",
+                                  "Example.Api",
+                                  "Example.Api",
+                                  "Example.File",
+                                  "a\"b\\c\n",
+                                  "\xff",
+                                  withNul("Example.Api", "x"),
+                                  ""};
+
+const std::string g_rgMethod[] = {"get", "get", "get", "get", "get", "list", "Get", "5", "it's", ""};
+
+const char* const g_rgExtra[] = {"{}", R"({"note":"it's"})", R"({"a":{"b":[1,-2,3.5,true,null,"x"]},"":0})",
+                                 R"({"n":18446744073709551615,"m":-9223372036854775808,"d":0.1})",
+                                 "{\"t\":\"\\u0000\\u0001\\n\\t\\\"\\\\/\xff\xc3\xa9\"}"};
+
+// Texts for number fields, whose place in a statement they take without quotes.
+const char* const g_rgNumberText[] = {"7",    "-1", "count", "uid",       TEXT_OR_TRUE,
+                                      "null", "'",  "",      "no_column", "1 1"};
+
+const char* const g_rgName[] = {"tid",   "tid",   "bind_sid", "function", "function", "uid",
+                                "count", "extra", "limit",    "sort_by",  "no_field", ""};
+
+const Json::Value g_jAnything =
+    parsed(R"([null, "5", "", true, 5, 5.0, 2.5, 18446744073709551615, [], {}, ["get"]])");
+
+const Json::Value g_jCount = parsed("[-1, -1, 0, 1, 2, 2, 3, 9223372036854775807, -9223372036854775808]");
+
+// As options of creations.
+const Json::Value g_jLifetime =
+    parsed(R"([-1, 0, 1, 60, 3600, 3600, 3600, 2.5, true, null, "60", 2147483647, 2147483648])");
+
+// For lists in number fields.
+const Json::Value g_jListed = parsed(R"([0, 1, 2, -1, -2, 5, 2.5, true, false, "1", null])");
+
+// As limits and offsets; the last two have more than 32 bits.
+const Json::Value g_jPosition =
+    parsed(R"([0, 1, 2, 3, 4, 5, 6, 6, 7, 7, 8, 8, 9, 100, -1, 7.5, true, "5", 4294967296, 4294967303])");
+
+} // namespace
+
+time_t Draws::step()
+{
+    return oneIn(3000) ? 100000 : oneIn(100) ? 500 : oneIn(4) ? static_cast<time_t>(below(4)) : 0;
+}
+
+std::string Draws::tid()
+{
+    return m_rows.empty() || oneIn(4) ? newTid() : row().columns[0];
+}
+
+std::string Draws::newTid()
+{
+    return oneOf(g_rgTid);
+}
+
+Json::Value Draws::uid()
+{
+    const unsigned int rgUid[] = {UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77, 4294967294, 4294967295};
+    return oneOf(rgUid);
+}
+
+std::string Draws::session()
+{
+    return oneOf(g_rgSession);
+}
+
+std::string Draws::purpose()
+{
+    return oneOf(g_rgPurpose);
+}
+
+// Mostly what the token allows, as few others would.
+Json::Value Draws::grant()
+{
+    Json::Value jGrant;
+    jGrant["tid"] = tid();
+    jGrant["webapi"] = oneIn(30) ? Json::Value() : Json::Value(oneOf(g_rgWebapi));
+    jGrant["method"] = oneIn(10) ? Json::Value() : Json::Value(oneOf(g_rgMethod));
+    if (!m_rows.empty() && !oneIn(3)) {
+        const Row& granted = row();
+        const Json::Value& jAllow = granted.jRecord["webapi_allow"];
+        jGrant["tid"] = granted.columns[0];
+        if (jAllow.isObject() && !jAllow.empty()) {
+            jGrant["webapi"] = oneOf(jAllow.getMemberNames());
+        }
+    }
+    return jGrant;
+}
+
+Json::Value Draws::name()
+{
+    return oneIn(20) ? Json::Value() : Json::Value(oneOf(g_rgName));
+}
+
+Json::Value Draws::anything()
+{
+    return oneOf(g_jAnything);
+}
+
+Json::Value Draws::allow()
+{
+    Json::Value jAllow(Json::objectValue);
+    for (size_t i = oneIn(8) ? 0 : 1 + below(3); 0 < i; --i) {
+        Json::Value& jEntry = jAllow[oneOf(g_rgWebapi)];
+        if (oneIn(8)) {
+            jEntry = anything();
+            continue;
+        }
+        Json::Value jMethods(Json::arrayValue);
+        for (size_t j = 1 + below(3); 0 < j; --j) {
+            jMethods.append(oneIn(8) ? anything() : Json::Value(oneOf(g_rgMethod)));
+        }
+        jEntry = Json::Value(Json::objectValue);
+        jEntry["method"] = jMethods;
+    }
+    return jAllow;
+}
+
+Json::Value Draws::extra()
+{
+    return parsed(oneOf(g_rgExtra));
+}
+
+Json::Value Draws::deadline()
+{
+    const Json::Int64 nNow = worldClock();
+    const Json::Int64 rgDeadline[] = {-1,          nNow - 1,       nNow,           nNow + 1,       nNow + 3,
+                                      nNow + 5000, nNow + 1000000, nNow + 1000000, nNow + 1000000, INT64_MAX};
+    return oneOf(rgDeadline);
+}
+
+Json::Value Draws::option()
+{
+    if (oneIn(20)) {
+        return anything();
+    }
+    Json::Value jOption(Json::objectValue);
+    for (const Field& other : FIELDS) {
+        if (!oneIn(3)) {
+            jOption[other.szName] = field(other);
+        }
+    }
+    jOption.removeMember("deadline");
+    if (oneIn(3)) {
+        jOption["deadline"] = oneOf(g_jLifetime);
+    }
+    if (oneIn(8)) {
+        jOption["no_field"] = anything();
+    }
+    return jOption;
+}
+
+Json::Value Draws::field(const Field& field)
+{
+    if (oneIn(50)) {
+        return anything();
+    }
+    switch (fieldNumber(field.szName)) {
+    case 0: return newTid();
+    case 1: return session();
+    case 2: return oneIn(4) ? Json::Value(Json::Int64(1) << 32) : uid();
+    case 3: return deadline();
+    case 4: return oneOf(g_jCount);
+    case 5: return static_cast<Json::Int64>(worldClock());
+    case 6: return purpose();
+    case 7: return allow();
+    default: return extra();
+    }
+}
+
+Json::Value Draws::param()
+{
+    if (oneIn(30)) {
+        return anything();
+    }
+    Json::Value jParam(Json::objectValue);
+    for (size_t i = below(4); 0 < i; --i) {
+        const Field& changed = FIELDS[oneIn(4) ? below(FIELDS.size()) : 1 + below(FIELDS.size() - 1)];
+        jParam[changed.szName] = field(changed);
+    }
+    return jParam;
+}
+
+Json::Value Draws::record()
+{
+    if (oneIn(20)) {
+        return anything();
+    }
+    Json::Value jRecord(Json::objectValue);
+    const bool blFresh = m_rows.empty() || oneIn(3);
+    if (!blFresh) {
+        jRecord = row().jRecord;
+    }
+    for (const Field& changed : FIELDS) {
+        if (blFresh || oneIn(10)) {
+            jRecord[changed.szName] = field(changed);
+        }
+    }
+    if (oneIn(15)) {
+        jRecord.removeMember(FIELDS[below(FIELDS.size())].szName);
+    }
+    return jRecord;
+}
+
+// What a filter compares with a field: mostly what some row holds there.
+Json::Value Draws::scalar(const Field& compared)
+{
+    Json::Value jValue = field(compared);
+    if (!m_rows.empty() && !oneIn(3)) {
+        jValue = row().jRecord[compared.szName];
+    }
+    if (Kind::Number == compared.kind && oneIn(8)) {
+        jValue = oneOf(g_rgNumberText);
+    }
+    return jValue;
+}
+
+Json::Value Draws::condition(const Field& compared)
+{
+    const bool blList = oneIn(3) || (Kind::Json == compared.kind && !oneIn(10));
+    if (!blList) {
+        return scalar(compared);
+    }
+    Json::Value jList(Json::arrayValue);
+    if (!oneIn(3)) {
+        jList.append(scalar(compared));
+        return jList;
+    }
+    const char* const rgText[] = {"VPN", "Mail", "s1", "s2"};
+    for (size_t i = below(4); 0 < i; --i) {
+        jList.append(Kind::Number == compared.kind       ? oneOf(g_jListed)
+                     : Kind::Json == compared.kind       ? extra()
+                     : 0 == fieldNumber(compared.szName) ? Json::Value(g_rgTid[below(3)])
+                                                         : Json::Value(oneOf(rgText)));
+    }
+    return jList;
+}
+
+Json::Value Draws::filter()
+{
+    if (oneIn(25)) {
+        return anything();
+    }
+    Json::Value jFilter(Json::objectValue);
+    for (size_t i = oneIn(3) ? below(4) : 1; 0 < i; --i) {
+        const Field& compared = FIELDS[below(FIELDS.size())];
+        jFilter[compared.szName] = condition(compared);
+    }
+    if (oneIn(6)) {
+        const std::string rgUnknown[] = {"no_field", "Tid", "", withNul("tid", "x")};
+        jFilter[oneOf(rgUnknown)] = anything();
+    }
+    if (oneIn(4)) {
+        addPaging(jFilter);
+    }
+    return jFilter;
+}
+
+void Draws::addPaging(Json::Value& jFilter)
+{
+    if (oneIn(2)) {
+        jFilter["sort_by"] = oneIn(8) ? anything() : Json::Value(oneOf(g_rgName));
+    }
+    if (oneIn(2)) {
+        const char* const rgDirection[] = {"desc", "desc", "DESC", "asc", ""};
+        jFilter["sort_direction"] = oneIn(8) ? anything() : Json::Value(oneOf(rgDirection));
+    }
+    if (oneIn(2)) {
+        jFilter["limit"] = oneOf(g_jPosition);
+    }
+    if (oneIn(3)) {
+        jFilter["offset"] = oneOf(g_jPosition);
+    }
+}
+
+Json::Value Draws::texts()
+{
+    Json::Value jTexts(Json::arrayValue);
+    for (size_t i = oneIn(3) ? below(4) : 1; 0 < i; --i) {
+        jTexts.append(oneIn(3) ? oneIn(2) ? session() : purpose() : oneIn(2) ? g_rgTid[below(3)] : tid());
+    }
+    return jTexts;
+}
+
+Json::Value Draws::out()
+{
+    return oneIn(12) ? anything() : Json::Value(Json::arrayValue);
+}

@@ -1,0 +1,166 @@
+#include "ModelFilter.h"
+
+#include <algorithm>
+#include <cctype>
+#include <cstdint>
+#include <cstdlib>
+#include <optional>
+
+namespace {
+
+bool never(const Row&)
+{
+    return false;
+}
+
+Condition textIs(size_t nField, const std::string& strText)
+{
+    return [=](const Row& row) { return row.columns[nField] == strText; };
+}
+
+Json::Int64 number(const Row& row, size_t nField)
+{
+    return row.jRecord[FIELDS[nField].szName].asInt64();
+}
+
+// A long double holds each integer of 64 bits exactly, and none equals a number beyond them.
+Condition numberIs(size_t nField, long double number64)
+{
+    return [=](const Row& row) { return static_cast<long double>(number(row, nField)) == number64; };
+}
+
+// "12", "2.5" or "true" at the head of a text, which is taken off it.
+std::optional<long double> takeNumber(std::string& strText)
+{
+    long double number64 = 0;
+    size_t cch = 0;
+    if (0 == strText.compare(0, 4, "true")) {
+        number64 = 1;
+        cch = 4;
+    } else if (0 == strText.compare(0, 5, "false")) {
+        cch = 5;
+    } else if (!strText.empty() && isdigit(static_cast<unsigned char>(strText[0]))) {
+        number64 = std::stold(strText, &cch);
+    } else {
+        return std::nullopt;
+    }
+    strText.erase(0, cch);
+    return number64;
+}
+
+// Numbers that stand side by side without a separator run together, but for negative ones, whose sign
+// then subtracts: 1 and 2 are 12, 3 and -2 are 1. Nothing when it is no valid SQL.
+std::optional<long double> valueOf(std::string strText)
+{
+    long double sum = 0;
+    do {
+        const bool blMinus = 0 == strText.compare(0, 1, "-");
+        strText.erase(0, blMinus ? 1 : 0);
+        const std::optional<long double> next = takeNumber(strText);
+        if (!next) {
+            return std::nullopt;
+        }
+        sum += blMinus ? -*next : *next;
+    } while (0 == strText.compare(0, 1, "-"));
+    return strText.empty() ? std::optional<long double>(sum) : std::nullopt;
+}
+
+std::string textOf(Kind kind, const Json::Value& jValue)
+{
+    return Kind::Json == kind ? jsonText(jValue) : untilNul(jValue.asString());
+}
+
+// No separator stands between the elements. Those of text fields are quoted, and two quotes in a row are
+// one that belongs to the text.
+std::string listText(Kind kind, const Json::Value& jList)
+{
+    std::string strText;
+    for (Json::ArrayIndex i = 0; i < jList.size(); ++i) {
+        strText += (0 < i && Kind::Number != kind ? "'" : "") + textOf(kind, jList[i]);
+    }
+    return strText;
+}
+
+// The keyword from the position on that the number tells, of which 32 bits count.
+std::string tail(const std::string& strKeyword, Json::Int64 nNumber)
+{
+    return strKeyword.substr(std::min<size_t>(static_cast<uint32_t>(nNumber), strKeyword.size()));
+}
+
+} // namespace
+
+Where::Where(const Json::Value& jFilter)
+{
+    for (const std::string& strName : jFilter.getMemberNames()) {
+        const size_t nField = fieldNumber(strName);
+        if (FIELDS.size() == nField) {
+            continue;
+        }
+        blEmpty = false;
+        if (jFilter[strName].isObject()) {
+            blRefused = true;
+            return;
+        }
+        add(nField, jFilter[strName]);
+    }
+}
+
+bool Where::matches(const Row& row) const
+{
+    return std::any_of(m_alternatives.begin(), m_alternatives.end(), [&](const auto& conditions) {
+        return std::all_of(conditions.begin(), conditions.end(),
+                           [&](const Condition& condition) { return condition(row); });
+    });
+}
+
+void Where::add(size_t nField, const Json::Value& jValue)
+{
+    const Kind kind = FIELDS[nField].kind;
+    const bool blList = jValue.isArray();
+    const std::string strText = blList ? listText(kind, jValue) : textOf(kind, jValue);
+    if (blList && jValue.empty()) {
+        blBroken = true;
+    } else if (Kind::Number == kind) {
+        addNumber(nField, strText, blList);
+    } else {
+        addCondition(textIs(nField, strText));
+    }
+}
+
+// The text goes into the statement as it is, so it may be more than a number.
+void Where::addNumber(size_t nField, const std::string& strText, bool blList)
+{
+    const size_t nOther = fieldNumber(strText);
+    if (strText == TEXT_OR_TRUE) {
+        addCondition(numberIs(nField, blList ? 1 : 0));
+        if (!blList) {
+            m_alternatives.emplace_back();
+        }
+    } else if (nOther < FIELDS.size()) {
+        addCondition([=](const Row& row) { return number(row, nField) == number(row, nOther); });
+    } else if ("null" == strText || "'" == strText || (blList && strText.empty())) {
+        addCondition(&never); // a quote is doubled, and becomes an empty text
+    } else if (const std::optional<long double> value = valueOf(strText)) {
+        addCondition(numberIs(nField, *value));
+    } else {
+        blBroken = true;
+    }
+}
+
+bool isSpoiledByPaging(const Json::Value& jFilter, bool blWithoutFields)
+{
+    bool blSorted = false;
+    std::string strTail;
+    if (jFilter.isMember("sort_by")) {
+        static_cast<void>(jFilter["sort_by"].asCString()); // which throws unless it is a string
+        static_cast<void>(jFilter["sort_direction"].asString());
+        blSorted = true;
+    }
+    if (jFilter.isMember("limit")) {
+        strTail = tail(" LIMIT ", jFilter["limit"].asInt64());
+        strTail += jFilter.isMember("offset") ? tail(" OFFSET ", jFilter["offset"].asInt64()) : "";
+    }
+    // What is left of the keywords is no SQL, and anything behind "WHERE" is none either.
+    return std::string::npos != strTail.find_first_not_of(' ') ||
+           (blWithoutFields && (blSorted || !strTail.empty()));
+}

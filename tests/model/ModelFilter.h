@@ -1,0 +1,36 @@
+// What filters select, oddities included.
+
+#ifndef TESTS_MODEL_FILTER_H
+#define TESTS_MODEL_FILTER_H
+
+#include <functional>
+
+#include "ModelRow.h"
+
+typedef std::function<bool(const Row&)> Condition;
+
+// The filter's members that name fields.
+struct Where {
+    explicit Where(const Json::Value& jFilter);
+    bool matches(const Row& row) const;
+
+    bool blRefused = false; // a field was given an object
+    bool blBroken = false;  // no valid SQL
+    bool blEmpty = true;    // no field was named
+
+private:
+    void add(size_t nField, const Json::Value& jValue);
+    void addNumber(size_t nField, const std::string& strText, bool blList);
+    void addCondition(const Condition& condition) { m_alternatives.back().push_back(condition); }
+
+    std::vector<std::vector<Condition>> m_alternatives = {{}}; // one of which must hold in all its conditions
+};
+
+// Whether the filter's ordering and paging make a query invalid; they have no other effect.
+bool isSpoiledByPaging(const Json::Value& jFilter, bool blWithoutFields);
+
+// A text for a number field that says more than a number: it ends the conditions so far, and adds the
+// alternative that always holds, to which the conditions that follow belong.
+const char* const TEXT_OR_TRUE = "0 or 1=1";
+
+#endif

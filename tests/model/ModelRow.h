@@ -1,0 +1,38 @@
+// A token of the model's table, and the fields that it is made of.
+
+#ifndef TESTS_MODEL_ROW_H
+#define TESTS_MODEL_ROW_H
+
+#include <json/json.h>
+
+#include <string>
+#include <vector>
+
+enum class Kind { Text, Json, Number };
+
+struct Field {
+    const char* szName;
+    Kind kind;
+};
+
+// In the order of the columns.
+extern const std::vector<Field> FIELDS;
+
+// The number of the field in FIELDS, or FIELDS.size().
+size_t fieldNumber(const std::string& strName);
+
+struct Row {
+    std::vector<std::string> columns; // as the table holds them; numbers as decimal text
+    Json::Value jRecord;              // as the library hands it out
+};
+
+// The row that a complete record becomes. Throws Json::LogicError when a member cannot be converted.
+Row rowOf(const Json::Value& jRecord);
+
+// What SQL sees of a text that is handed over as a C string.
+std::string untilNul(const std::string& strText);
+
+// The JSON text that the table holds, and that filters compare: compact, strings byte for byte.
+std::string jsonText(const Json::Value& jValue);
+
+#endif

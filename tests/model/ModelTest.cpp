@@ -1,0 +1,187 @@
+// Random operations on the library and on a plain model of it in memory: results, outputs and table agree.
+
+#include <gtest/gtest.h>
+
+#include <deque>
+#include <numeric>
+#include <sstream>
+
+#include "Figures.h"
+#include "Operations.h"
+#include "Table.h"
+#include "TokenStore.h"
+#include "World.h"
+
+namespace {
+
+#ifdef __SANITIZE_ADDRESS__
+const int64_t OPERATIONS = 5000; // slow, and for the sanitizers' eyes only
+#else
+const int64_t OPERATIONS = 100000;
+#endif
+
+const size_t REPORTED = 12;    // operations that a failure shows
+const size_t TEXT_SHOWN = 500; // of each
+
+struct Outcome {
+    int nResult = 0;
+    std::string strThrown; // instead of a result
+    Json::Value jCall;     // the arguments as they are afterwards
+
+    bool operator==(const Outcome& other) const
+    {
+        return strThrown == other.strThrown && nResult == other.nResult && jCall == other.jCall;
+    }
+};
+
+// For a reader's eyes: short, and with what cannot be printed in hexadecimal.
+std::string shown(const Json::Value& jCall)
+{
+    const std::string strText = jsonText(jCall);
+    std::string strShown;
+    for (const char c : strText.substr(0, TEXT_SHOWN)) {
+        char szByte[8];
+        snprintf(szByte, sizeof(szByte), isprint(static_cast<unsigned char>(c)) ? "%c" : "\\x%02x",
+                 static_cast<unsigned char>(c));
+        strShown += szByte;
+    }
+    return strShown + (TEXT_SHOWN < strText.size() ? "..." : "");
+}
+
+std::ostream& operator<<(std::ostream& stream, const Outcome& outcome)
+{
+    return stream << (outcome.strThrown.empty() ? std::to_string(outcome.nResult) : outcome.strThrown) << ", "
+                  << shown(outcome.jCall);
+}
+
+template <typename System>
+Outcome run(const std::function<int(System&, Json::Value&)>& operation, System& system,
+            const Json::Value& jCall)
+{
+    Outcome outcome;
+    outcome.jCall = jCall;
+    try {
+        outcome.nResult = operation(system, outcome.jCall);
+    } catch (const Json::LogicError&) {
+        outcome.strThrown = "Json::LogicError"; // its text is no part of the interface
+    } catch (const std::exception& exception) {
+        outcome.strThrown = exception.what();
+    }
+    return outcome;
+}
+
+struct Tally {
+    int64_t nSucceeded = 0;
+    int64_t nRefused = 0;
+    int64_t nThrown = 0;
+
+    void count(const Outcome& outcome)
+    {
+        ++(!outcome.strThrown.empty() ? nThrown : 0 > outcome.nResult ? nRefused : nSucceeded);
+    }
+};
+
+class ModelCheck : public ::testing::Test {
+protected:
+    // Draws an operation and runs it on both; a fatal failure when they do not agree.
+    void runOne()
+    {
+        worldClock() += m_draws.step();
+        const size_t nOperation = drawOperation();
+        const Operation& operation = operations()[nOperation];
+        const Json::Value jCall = operation.draw(m_draws);
+        remember(operation, jCall);
+
+        const Outcome library = run(operation.runOnLibrary, m_library, jCall);
+        m_model.service.setGenerated(library.jCall.get("tid", "").asString());
+        const Outcome model = run(operation.runOnModel, m_model, jCall);
+        ASSERT_EQ(model, library) << "expected is the model's\n" << history();
+        ASSERT_EQ("", m_table.differenceFrom(m_model.store.rows())) << history();
+        m_tallies[nOperation].count(library);
+        m_nRows += static_cast<int64_t>(m_model.store.rows().size());
+    }
+
+    size_t drawOperation()
+    {
+        size_t nDraw = m_draws.below(m_nWeights);
+        size_t i = 0;
+        while (operations()[i].nWeight <= nDraw) {
+            nDraw -= operations()[i++].nWeight;
+        }
+        return i;
+    }
+
+    void remember(const Operation& operation, const Json::Value& jCall)
+    {
+        ++m_nNumber;
+        m_history.push_back({operation.szName, worldClock(), jCall});
+        if (REPORTED < m_history.size()) {
+            m_history.pop_front();
+        }
+    }
+
+    // The last operations, and how to have them again.
+    std::string history() const
+    {
+        std::string strText = "seed " + std::to_string(seed()) + ", operation " + std::to_string(m_nNumber) +
+                              ", the last of these:\n";
+        for (const Call& call : m_history) {
+            strText.append("  at ").append(std::to_string(call.time)).append(" ").append(call.szName);
+            strText.append(" ").append(shown(call.jArguments)).append("\n");
+        }
+        return strText;
+    }
+
+    void print(int64_t nOperations) const
+    {
+        Tally all;
+        for (const Tally& tally : m_tallies) {
+            all.nSucceeded += tally.nSucceeded;
+            all.nRefused += tally.nRefused;
+            all.nThrown += tally.nThrown;
+        }
+        std::ostringstream text;
+        text << nOperations << " operations, " << all.nSucceeded << " of them succeeded, " << all.nRefused
+             << " were refused, " << all.nThrown << " threw; " << m_nRows / nOperations
+             << " tokens on average";
+        figure("model check", text.str());
+    }
+
+    const TokenStore m_files;
+    Library m_library;
+    const Table m_table{m_files.path()};
+    Model m_model;
+    Draws m_draws{seed(), m_model.store.rows()};
+    std::vector<Tally> m_tallies = std::vector<Tally>(operations().size());
+
+private:
+    struct Call {
+        const char* szName;
+        time_t time;
+        Json::Value jArguments;
+    };
+
+    const size_t m_nWeights =
+        std::accumulate(operations().begin(), operations().end(), size_t(0),
+                        [](size_t nSum, const Operation& operation) { return nSum + operation.nWeight; });
+    int64_t m_nNumber = 0;
+    int64_t m_nRows = 0;
+    std::deque<Call> m_history;
+};
+
+} // namespace
+
+TEST_F(ModelCheck, LibraryDoesWhatTheModelDoes)
+{
+    const int64_t nOperations = scaled(OPERATIONS);
+    for (int64_t i = 0; i < nOperations && !HasFatalFailure(); ++i) {
+        runOne();
+    }
+    if (HasFatalFailure()) {
+        return;
+    }
+    for (size_t i = 0; i < m_tallies.size(); ++i) {
+        EXPECT_LT(0, m_tallies[i].nSucceeded) << operations()[i].szName << " never succeeded";
+    }
+    print(nOperations);
+}
