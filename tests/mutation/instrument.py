@@ -1,0 +1,356 @@
+#!/usr/bin/python3
+"""Writes a copy of the library's sources that holds all mutants at once, and the list of these.
+
+usage: instrument.py PROJECT OUTPUT
+OUTPUT gets the sources, and mutants.txt: the names of the mutants, which tell what each changes and where, in the
+order of their numbers from 0.
+
+Mutants, each of them one change:
+  condition     of if, for, ?: and the check macros, operands of && and ||, and comparisons elsewhere: forced true,
+                forced false. A false operand of && makes the whole false, and so is no mutant of its own; the same
+                goes for a true one of ||.
+  statement     left out: expressions, return, break, continue, goto, logs, loops over ranges, and variables that
+                act by their life alone. What would leave a function without a result returns {} instead. Leaving
+                out an if, a loop with a condition or a check is the same as its condition false.
+  constant      one higher, one lower; an index 0 only higher. Named constants change where they are used. true and
+                false change places. An enumerator becomes its neighbour, which is one mutant.
+Not mutated: what the compiler evaluates (constexpr variables, template arguments, array sizes, static tables),
+initialisers of members, variables that others refer to, steps of loops, bodies of lambdas, texts and null pointers;
+nor is a function's last return left out that returns a literal or a reference, or whose type is deduced.
+Where the field list is expanded into statements, all fields of the list change together.
+"""
+
+import pathlib
+import re
+import sys
+
+from clang.cindex import CursorKind as Kind
+from clang.cindex import Index, TranslationUnit, TypeKind
+
+FIELD_LIST = re.compile(
+    r"#define VEMO_ATOKEN_DATA_MEMBER\(name, type, column, value\)(?P<body>(?:.*\\\n)*.*)\n"
+    r'(?P<rest>#include "internal/vemo-access-token-data-member"\n#undef VEMO_ATOKEN_DATA_MEMBER\n)')
+BODIES = (Kind.FUNCTION_DECL, Kind.CXX_METHOD, Kind.CONSTRUCTOR, Kind.DESTRUCTOR, Kind.FUNCTION_TEMPLATE)
+LEAVING = (Kind.BREAK_STMT, Kind.CONTINUE_STMT, Kind.GOTO_STMT, Kind.CXX_FOR_RANGE_STMT)
+LITERALS = (Kind.INTEGER_LITERAL, Kind.CXX_BOOL_LITERAL_EXPR, Kind.CXX_NULL_PTR_LITERAL_EXPR)
+COMPARISONS = ("==", "!=", "<", ">", "<=", ">=")
+
+
+def one_line(text):
+    return " ".join(text.replace("\\\n", " ").split())
+
+
+def blank(text):
+    return re.sub(r"[^\n]", " ", text)
+
+
+def parsers_view(text):
+    """The source with each expansion of the field list into statements written out, for one field without a
+    name. All else stays in its place."""
+
+    def write_out(match):
+        body = match["body"]
+        if not body.rstrip().endswith((";", "}")):
+            return match[0]
+        head = blank(match[0][: match.start("body") - match.start()])
+        body = body.replace("\\\n", " \n").replace("##", "__").replace("#name", '"nam"')
+        return head + body + "\n" + blank(match["rest"])
+
+    return FIELD_LIST.sub(write_out, text)
+
+
+def inside(cursor):
+    """The expression without the parser's implicit steps around it."""
+    children = list(cursor.get_children())
+    while cursor.kind == Kind.UNEXPOSED_EXPR and len(children) == 1:
+        cursor = children[0]
+        children = list(cursor.get_children())
+    return cursor
+
+
+def place(cursor):
+    return (cursor.extent.start.offset, cursor.extent.end.offset)
+
+
+class Source:
+    def __init__(self, path, mutants):
+        self.name = path.name
+        self.text = path.read_text(encoding="ascii")
+        self.mutants = mutants
+        self.edits = []  # (start, end, text before, text after), outer ones first
+        self.done = set()  # the conditions, by their place
+        self.unused = None  # the place of the expression whose value is
+
+    def parse(self, project, arguments):
+        view = parsers_view(self.text)
+        path = str(project / "src" / self.name)
+        unit = Index.create().parse(path, arguments, [(path, view)], TranslationUnit.PARSE_NONE)
+        errors = [str(diagnostic) for diagnostic in unit.diagnostics if diagnostic.severity >= 3]
+        if errors:
+            sys.exit("\n".join(errors))
+        self.find_functions(unit.cursor, path)
+
+    def find_functions(self, cursor, path):
+        for child in cursor.get_children():
+            if child.location.file and child.location.file.name != path:
+                continue
+            if child.kind in BODIES:
+                self.function(child)
+            else:
+                self.find_functions(child, path)
+
+    def function(self, cursor):
+        body = [child for child in cursor.get_children() if child.kind == Kind.COMPOUND_STMT]
+        if not body:
+            return
+        names = [cursor.spelling]
+        parent = cursor.semantic_parent
+        while parent.kind in (Kind.CLASS_DECL, Kind.STRUCT_DECL, Kind.CLASS_TEMPLATE):
+            names.insert(0, parent.spelling)
+            parent = parent.semantic_parent
+        self.where = "::".join(names)
+        self.cursor = cursor
+        self.branch = ""
+        self.result = cursor.result_type
+        self.statements(body[0], last=True)
+
+    # Mutants
+
+    def slice(self, cursor):
+        return self.text[cursor.extent.start.offset : cursor.extent.end.offset]
+
+    def add(self, cursor, *changes):
+        """Numbers the mutants of one place; returns the first number."""
+        text = one_line(self.slice(cursor))
+        parts = [text] + [part for part in (self.context, self.branch) if part not in ("", text)]
+        parts = [part if len(part) <= 80 else part[:77] + "..." for part in parts]
+        first = len(self.mutants)
+        for change in changes:
+            name = f"{self.name} {self.where}: {change}: " + " | ".join(parts)
+            same = sum(other.split(" | #")[0] == name for other in self.mutants)
+            self.mutants.append(f"{name} | #{same + 1}" if same else name)
+        return first
+
+    def wrap(self, cursor, before, after):
+        self.edits.append((*place(cursor), before, after))
+
+    # Statements
+
+    def statements(self, block, last):
+        """last: behind the block, the function ends."""
+        children = list(block.get_children())
+        for i, child in enumerate(children):
+            while child.kind == Kind.LABEL_STMT:
+                child = next(child.get_children())
+            self.statement(child, last and i + 1 == len(children))
+
+    def statement(self, cursor, last):
+        self.context = ""
+        if cursor.kind == Kind.COMPOUND_STMT:
+            self.statements(cursor, last)
+        elif cursor.kind == Kind.IF_STMT:
+            condition, *branches = cursor.get_children()
+            self.expression_of_statement(condition, condition=True)
+            outer = self.branch
+            for word, branch in zip(("if", "else of"), branches):
+                self.branch = f"{word} ({one_line(self.slice(condition))})"
+                self.statement(branch, last)
+            self.branch = outer
+        elif cursor.kind == Kind.FOR_STMT:
+            *head, body = cursor.get_children()
+            if head:
+                start, condition, step = head
+                self.expression_of_statement(start)
+                self.expression_of_statement(condition, condition=True)
+                self.expression_of_statement(step)
+            self.statement(body, False)
+        elif cursor.kind == Kind.CXX_FOR_RANGE_STMT:
+            self.removable(cursor)
+            self.statement(list(cursor.get_children())[-1], False)
+        elif cursor.kind in (Kind.CXX_TRY_STMT, Kind.CXX_CATCH_STMT):
+            for child in cursor.get_children():
+                if child.kind in (Kind.COMPOUND_STMT, Kind.CXX_CATCH_STMT):
+                    self.statement(child, last)
+        elif cursor.kind == Kind.RETURN_STMT:
+            self.return_statement(cursor, last)
+        elif cursor.kind == Kind.DECL_STMT:
+            self.declaration(cursor)
+        elif cursor.kind in LEAVING:
+            self.removable(cursor)
+        elif cursor.kind.is_expression():
+            if not inside(cursor).spelling.startswith("VEMO_ATOKEN_CHECK_"):
+                self.removable(cursor)
+            self.unused = place(inside(cursor))  # nobody looks at its value
+            self.done.add(self.unused)
+            self.expression_of_statement(cursor)
+        else:
+            sys.exit(f"{self.name}:{cursor.location.line}: a statement of kind {cursor.kind.name}")
+
+    def removable(self, cursor):
+        number = self.add(cursor, "statement removed")
+        self.wrap(cursor, f"if (mutant_present({number})) ", "")
+
+    def return_statement(self, cursor, last):
+        value = [inside(child) for child in cursor.get_children()]
+        if not last:
+            self.removable(cursor)
+        elif value and not self.is_constant(value[0]) and self.has_empty_result():
+            number = self.add(cursor, "result emptied")
+            self.wrap(cursor, f"if (!mutant_present({number})) return {{}}; ", "")
+        for child in value:
+            self.expression_of_statement(child, context=self.slice(cursor))
+
+    def is_constant(self, cursor):
+        if cursor.kind == Kind.UNARY_OPERATOR:
+            cursor = inside(next(cursor.get_children()))
+        return cursor.kind in LITERALS or self.is_enumerator(cursor)
+
+    def has_empty_result(self):
+        return self.result.kind not in (TypeKind.LVALUEREFERENCE, TypeKind.AUTO, TypeKind.VOID)
+
+    def declaration(self, cursor):
+        for variable in cursor.get_children():
+            if variable.kind != Kind.VAR_DECL:
+                continue
+            if variable.type.get_canonical().kind == TypeKind.RECORD and self.is_guard(variable):
+                self.guard(variable)
+            for child in variable.get_children():
+                is_size = child.kind == Kind.INTEGER_LITERAL and variable.type.kind == TypeKind.CONSTANTARRAY
+                if not is_size:
+                    self.expression_of_statement(child, context=self.slice(cursor))
+
+    def is_guard(self, variable):
+        uses = [1 for child in self.cursor.walk_preorder()
+                if child.kind == Kind.DECL_REF_EXPR and child.referenced == variable]
+        return not uses
+
+    def guard(self, variable):
+        number = self.add(variable, "statement removed")
+        start = variable.extent.start.offset
+        if self.text.startswith("const ", start):
+            start += len("const ")
+        end = variable.location.offset - 1
+        self.edits.append((start, end, f"mutant_guard<{number}, ", ">"))
+
+    # Expressions
+
+    def expression_of_statement(self, cursor, condition=False, context=None):
+        self.context = one_line(context or self.slice(cursor))
+        self.expression(cursor, condition)
+
+    def expression(self, cursor, condition=False):
+        cursor = inside(cursor)
+        children = list(cursor.get_children())
+        operator = self.operator(cursor, children)
+        if cursor.kind == Kind.CALL_EXPR and cursor.spelling.startswith("VEMO_ATOKEN_CHECK_"):
+            self.check(cursor, children)
+            return
+        if cursor.kind == Kind.LAMBDA_EXPR:
+            return
+        if condition or operator in COMPARISONS + ("&&", "||"):
+            self.condition(cursor)
+        self.constant(cursor)
+        for i, child in enumerate(children):
+            if operator in ("&&", "||"):
+                self.operand(child, operator, i == 0, place(cursor) == self.unused)
+            self.expression(child, cursor.kind == Kind.CONDITIONAL_OPERATOR and i == 0)
+
+    def operator(self, cursor, children):
+        """The operator between two operands, also where it is overloaded."""
+        if cursor.kind == Kind.CALL_EXPR and cursor.spelling.startswith("operator"):
+            return cursor.spelling.removeprefix("operator")
+        if cursor.kind != Kind.BINARY_OPERATOR:
+            return None
+        left, right = children
+        return self.text[left.extent.end.offset : right.extent.start.offset].replace("\\\n", " ").strip("() \n")
+
+    def condition(self, cursor):
+        if place(cursor) in self.done:
+            return
+        self.done.add(place(cursor))
+        number = self.add(cursor, "condition true", "condition false")
+        self.wrap(cursor, f"mutant_condition({number}, static_cast<bool>(", "))")
+
+    def operand(self, cursor, operator, is_first, is_of_unused):
+        cursor = inside(cursor)
+        if is_of_unused:
+            if is_first:
+                self.condition(cursor)  # it decides on the second
+            return
+        self.done.add(place(cursor))
+        forced = "true" if operator == "&&" else "false"
+        number = self.add(cursor, "operand " + forced)
+        self.wrap(cursor, f"mutant_{forced}({number}, static_cast<bool>(", "))")
+
+    def check(self, cursor, children):
+        callee, condition, *others = children
+        if not cursor.spelling.endswith("_AS"):
+            text = one_line(self.slice(condition)).replace("\\", "\\\\").replace('"', '\\"')
+            self.wrap(callee, "", "_AS")
+            self.wrap(condition, "", f', "{text}"')
+        self.condition(condition)
+        for child in [condition] + others:
+            self.expression(child)
+
+    def constant(self, cursor):
+        kind = cursor.kind
+        if kind == Kind.CXX_BOOL_LITERAL_EXPR:
+            number = self.add(cursor, "constant flipped")
+            self.wrap(cursor, f"mutant_flag({number}, ", ")")
+        elif self.is_enumerator(cursor):
+            number = self.add(cursor, "constant changed")
+            self.wrap(cursor, f"mutant_enumerator({number}, ", ")")
+        elif kind == Kind.INTEGER_LITERAL or self.is_named_constant(cursor):
+            if self.text[cursor.extent.start.offset - 1] == "[" and self.slice(cursor) in ("0", "0U"):
+                number = self.add(cursor, "constant +1")
+                self.wrap(cursor, f"mutant_up({number}, ", ")")
+            else:
+                number = self.add(cursor, "constant +1", "constant -1")
+                self.wrap(cursor, f"mutant_constant({number}, ", ")")
+
+    def is_enumerator(self, cursor):
+        return (cursor.kind == Kind.DECL_REF_EXPR and cursor.referenced is not None
+                and cursor.referenced.kind == Kind.ENUM_CONSTANT_DECL)
+
+    def is_named_constant(self, cursor):
+        """A constant of the file or the class."""
+        if cursor.kind not in (Kind.DECL_REF_EXPR, Kind.MEMBER_REF_EXPR):
+            return False
+        variable = cursor.referenced
+        if variable is None or variable.kind != Kind.VAR_DECL or not variable.type.is_const_qualified():
+            return False
+        is_number = variable.type.get_canonical().kind in (TypeKind.INT, TypeKind.UINT, TypeKind.LONG, TypeKind.ULONG)
+        return is_number and variable.semantic_parent.kind not in BODIES
+
+    # The mutated text
+
+    def write(self, directory):
+        inserts = {}
+        for order, (start, end, before, after) in enumerate(self.edits):
+            inserts.setdefault(start, []).append(((1, -end, order), before))
+            inserts.setdefault(end, []).append(((0, -start, -order), after))
+        text, position = "", 0
+        for offset in sorted(inserts):
+            text += self.text[position:offset] + "".join(part for _, part in sorted(inserts[offset]))
+            position = offset
+        path = directory / self.name
+        text += self.text[position:]
+        if not path.exists() or path.read_text(encoding="ascii") != text:
+            path.write_text(text, encoding="ascii")
+
+
+def main():
+    project, output = (pathlib.Path(argument).resolve() for argument in sys.argv[1:])
+    arguments = ["-std=c++17", f"-I{project}/include", f"-I{project}/platform", "-I/usr/include/jsoncpp",
+                 "-include", f"{project}/tests/mutation/view.h"]
+    output.mkdir(parents=True, exist_ok=True)
+    mutants = []
+    for path in sorted((project / "src").glob("*.cpp")):
+        source = Source(path, mutants)
+        source.parse(project, arguments)
+        source.write(output)
+    (output / "mutants.txt").write_text("\n".join(mutants) + "\n", encoding="ascii")
+    print(f"{len(mutants)} mutants")
+
+
+main()

@@ -1,0 +1,93 @@
+// Included ahead of each mutated source file: what the mutated places call. One mutant at most is active, the
+// one whose number stands in the environment variable VEMO_MUTANT. Each place also notes, where
+// VEMO_MUTANTS_REACHED names a file, which of its mutants would have made a difference there: the byte of
+// that number becomes 1.
+//
+// What the compiler evaluates stays as it is.
+
+#ifndef TESTS_MUTATION_MUTANTS_H
+#define TESTS_MUTATION_MUTANTS_H
+
+#include <optional>
+#include <utility>
+
+namespace mutants {
+
+extern int g_nActive;
+extern unsigned char* g_pReached;
+
+inline bool isActive(int nMutant)
+{
+    if (g_pReached) {
+        g_pReached[nMutant] = 1;
+    }
+    return g_nActive == nMutant;
+}
+
+} // namespace mutants
+
+// A statement: is it still there?
+constexpr bool mutant_present(int nMutant)
+{
+    return __builtin_is_constant_evaluated() || !mutants::isActive(nMutant);
+}
+
+// A condition that one mutant makes true, or false, or one the one and the next the other.
+constexpr bool mutant_true(int nMutant, bool blCondition)
+{
+    return blCondition || !mutant_present(nMutant);
+}
+
+constexpr bool mutant_false(int nMutant, bool blCondition)
+{
+    return blCondition && mutant_present(nMutant);
+}
+
+constexpr bool mutant_condition(int nMutant, bool blCondition)
+{
+    return blCondition ? mutant_present(nMutant + 1) : !mutant_present(nMutant);
+}
+
+// A number one higher; or one higher, and one lower in the next mutant.
+template <typename Number>
+constexpr Number mutant_up(int nMutant, Number nValue)
+{
+    return mutant_present(nMutant) ? nValue : static_cast<Number>(nValue + 1);
+}
+
+template <typename Number>
+constexpr Number mutant_constant(int nMutant, Number nValue)
+{
+    return mutant_present(nMutant + 1) ? mutant_up(nMutant, nValue) : static_cast<Number>(nValue - 1);
+}
+
+constexpr bool mutant_flag(int nMutant, bool blValue)
+{
+    return blValue == mutant_present(nMutant);
+}
+
+// The enumerator below, and of the first the one above.
+template <typename Enum>
+constexpr Enum mutant_enumerator(int nMutant, Enum value)
+{
+    const int nValue = static_cast<int>(value);
+    return mutant_present(nMutant) ? value : static_cast<Enum>(nValue ? nValue - 1 : 1);
+}
+
+// A variable that acts by its life alone.
+template <int N_MUTANT, typename Guard>
+class mutant_guard {
+public:
+    template <typename... Arguments>
+    explicit mutant_guard(Arguments&&... arguments)
+    {
+        if (mutant_present(N_MUTANT)) {
+            m_guard.emplace(std::forward<Arguments>(arguments)...);
+        }
+    }
+
+private:
+    std::optional<Guard> m_guard;
+};
+
+#endif

@@ -1,0 +1,148 @@
+#!/usr/bin/python3
+"""Runs the tests against each mutant, and compares what survives with the list of those that may.
+
+usage: run.py BUILD MUTANTS SURVIVORS [-j N] [-k PATTERN]
+BUILD is the build of the mutated sources, MUTANTS the list that instrument.py wrote. SURVIVORS explains the mutants
+that no test can tell from the original, or none is meant to: lines with the names of mutants, and behind each group
+of them an indented reason. -k leaves all mutants alone whose names do not contain PATTERN.
+
+A mutant is killed when a test fails, crashes, or takes ten times as long as it should and ten seconds more.
+"""
+
+import argparse
+import concurrent.futures
+import json
+import os
+import pathlib
+import resource
+import signal
+import subprocess
+import sys
+import tempfile
+import time
+
+DEMAND = 95  # of 100 mutants are killed
+QUICK = 1  # seconds that a test may take which is tried on explained mutants too
+LONGEST = 60  # seconds that a test may take at all
+MEMORY = 4 << 30  # bytes that a test may take, so that a loop without an end does not take all
+
+
+class Test:
+    def __init__(self, entry):
+        properties = {each["name"]: each["value"] for each in entry.get("properties", [])}
+        self.name = entry["name"]
+        self.command = entry["command"]
+        self.directory = properties["WORKING_DIRECTORY"]
+        self.settings = dict(each.split("=", 1) for each in properties.get("ENVIRONMENT", []))
+        # What needs the machine for itself cannot run beside others.
+        self.is_usable = "RESOURCE_LOCK" not in properties
+        self.seconds = 0.0
+        self.reached = b""
+
+    def passes(self, limit, **settings):
+        """In a directory of its own for what it may leave behind when it is killed."""
+        with tempfile.TemporaryDirectory(ignore_cleanup_errors=True) as place:
+            os.chmod(place, 0o755)  # some tests become another user
+            environment = {**os.environ, **self.settings, **settings, "TMPDIR": place}
+            process = subprocess.Popen(self.command, cwd=self.directory, env=environment, start_new_session=True,
+                                       stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
+                                       stderr=subprocess.DEVNULL)
+            try:
+                return process.wait(limit) == 0
+            except subprocess.TimeoutExpired:
+                os.killpg(process.pid, signal.SIGKILL)
+                process.wait()
+                return False
+
+    def profile(self, n_mutants):
+        """Notes the time it takes, and the mutants that make a difference where it passes."""
+        with tempfile.NamedTemporaryFile() as file:
+            file.truncate(n_mutants)
+            start = time.monotonic()
+            self.is_usable = self.passes(LONGEST, VEMO_MUTANTS_REACHED=file.name)
+            self.seconds = time.monotonic() - start
+            self.reached = file.read()
+
+    def kills(self, mutant):
+        return not self.passes(10 * self.seconds + 10, VEMO_MUTANT=str(mutant))
+
+
+def googletests(build):
+    listing = subprocess.run(["ctest", "--show-only=json-v1"], cwd=build, check=True, stdout=subprocess.PIPE)
+    for entry in json.loads(listing.stdout)["tests"]:
+        if any(argument.startswith("--gtest_filter=") for argument in entry.get("command", [])):
+            yield Test(entry)
+
+
+def profile(build, n_mutants, pool):
+    tests = list(googletests(build))
+    usable = [test for test in tests if test.is_usable]
+    list(pool.map(lambda test: test.profile(n_mutants), usable))
+    for test in tests:
+        if not test.is_usable:
+            print(f"not used, since it fails here, takes too long or needs the machine for itself: {test.name}")
+    usable = [test for test in usable if test.is_usable]
+    print(f"{len(usable)} tests, {sum(test.seconds for test in usable):.0f} s")
+    return sorted(usable, key=lambda test: test.seconds)
+
+
+def killer(mutant, name, tests, explained):
+    """The test that kills the mutant, or None. Those that take long are not spent on what is explained."""
+    for test in tests:
+        if test.reached[mutant] and (test.seconds < QUICK or name not in explained) and test.kills(mutant):
+            return test.name
+    if name not in explained:
+        print(f"survives: {name}", flush=True)
+    return None
+
+
+def read_survivors(path):
+    """The explained mutants. A reason explains the names above it, up to the reason before."""
+    explained, waiting = set(), []
+    for line in path.read_text(encoding="ascii").splitlines():
+        if line.startswith(" "):
+            explained.update(waiting)
+            waiting = []
+        elif line and not line.startswith("#"):
+            waiting.append(line)
+    for name in waiting:
+        print(f"without a reason: {name}")
+    return explained
+
+
+def report(killers, explained):
+    """killers: the test that killed a mutant, or None, by the mutant's name."""
+    survivors = {name for name, test in killers.items() if not test}
+    for name in sorted(explained - survivors):
+        print(f"explained, but {'killed' if name in killers else 'no mutant'}: {name}")
+    n_killed = len(killers) - len(survivors)
+    n_unexplained = len(survivors - explained)
+    share = 100 * n_killed / len(killers)
+    print(f"mutants: {len(killers)}, killed {n_killed} ({share:.1f} %), survivors {len(survivors)}, "
+          + (f"{n_unexplained} not explained" if n_unexplained else "all explained"))
+    return share >= DEMAND and survivors <= explained
+
+
+def main():
+    parser = argparse.ArgumentParser()
+    parser.add_argument("build")
+    parser.add_argument("mutants", type=pathlib.Path)
+    parser.add_argument("survivors", type=pathlib.Path)
+    parser.add_argument("-j", type=int, default=2)
+    parser.add_argument("-k", default="")
+    arguments = parser.parse_args()
+
+    resource.setrlimit(resource.RLIMIT_AS, (MEMORY, MEMORY))
+    resource.setrlimit(resource.RLIMIT_CORE, (0, 0))
+    names = arguments.mutants.read_text(encoding="ascii").splitlines()
+    chosen = [(mutant, name) for mutant, name in enumerate(names) if arguments.k in name]
+    if not chosen:
+        sys.exit("no such mutant")
+    explained = {name for name in read_survivors(arguments.survivors) if arguments.k in name}
+    with concurrent.futures.ThreadPoolExecutor(arguments.j) as pool:
+        tests = profile(arguments.build, len(names), pool)
+        killers = dict(pool.map(lambda each: (each[1], killer(*each, tests, explained)), chosen))
+    sys.exit(0 if report(killers, explained) else 1)
+
+
+main()

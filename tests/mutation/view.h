@@ -1,0 +1,48 @@
+// What the parser sees instead of the macros, so that it can tell where each argument of one stands:
+// functions and variables of the same names. Nothing of it is compiled or run.
+
+#include <json/value.h>
+#include <sqlite3.h>
+#include <unistd.h>
+
+#include "AccessTokenDefine.h"
+#include "AccessTokenUtil.h"
+#include "internal/ErrnoKeeper.h"
+
+#define VEMO_ACCESS_TOKEN_LOG_H // keeps the macros themselves out
+
+namespace VEMO_ACCESS_TOKEN {
+const char* textOrNull(const char* szText);
+}
+
+template <typename... Arguments>
+void VEMO_ATOKEN_LOG(Arguments&&...);
+template <typename... Arguments>
+void VEMO_ATOKEN_DEBUG(Arguments&&...);
+template <typename... Arguments>
+void VEMO_ATOKEN_FAIL(Arguments&&...);
+template <typename... Arguments>
+void VEMO_ATOKEN_FAILED(Arguments&&...);
+template <typename... Arguments>
+void VEMO_ATOKEN_WRITE_LINE(Arguments&&...);
+void VEMO_ATOKEN_CHECK_RETURN(bool blCondition, int nResult);
+void VEMO_ATOKEN_CHECK_RETURN_AS(bool blCondition, const char* szCondition, int nResult);
+void VEMO_ATOKEN_CHECK_GOTO(bool blCondition, int nLabel);
+void VEMO_ATOKEN_CHECK_GOTO_AS(bool blCondition, const char* szCondition, int nLabel);
+
+extern int VEMO_ATOKEN_HERE, VEMO_ATOKEN_HERE_IN_LIST;
+extern int Error, Failed, Refused; // the labels, as arguments
+
+#undef UID_ERR
+#undef VEMO_ATOKEN_LENGTH_MIN
+#undef SQLITE_OK
+#undef F_OK
+const unsigned int UID_ERR = 4294967295U;
+const int VEMO_ATOKEN_LENGTH_MIN = 127, SQLITE_OK = 0, F_OK = 0;
+
+// The parameters of the field list's macro, and what one of its expansions declares.
+extern const char* type;
+extern int value;
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) extern const Json::Value* p_##name;
+#include "internal/vemo-access-token-data-member"
+#undef VEMO_ATOKEN_DATA_MEMBER
