@@ -92,12 +92,7 @@ TEST_P(IoFault, LeavesAStateThatTheCallerKnows)
             ++nInjected;
             EXPECT_EQ("", strWrong) << "call " << nFirst << " to " << nLast;
         };
-        judge(0, -1);
-        const int64_t nCalls = injection.nCalls;
-        for (int64_t nCall = 1; nCall <= nCalls; ++nCall) {
-            judge(nCall, nCall);
-            judge(nCall, INT64_MAX);
-        }
+        failEach(judge, [&] { return injection.nCalls; });
     }
     figure("I/O faults",
            std::string(GetParam().szName) + ": " + std::to_string(nInjected) + " runs of 12 operations");

@@ -105,3 +105,16 @@ std::string Oracle::judge(const std::function<void()>& arm, const std::function<
     }
     return strWrong.empty() ? "" : strWrong + "log: " + std::string(Log::text()).substr(0, 2000);
 }
+
+int64_t failEach(const std::function<void(int64_t nFirst, int64_t nLast)>& judge,
+                 const std::function<int64_t()>& calls)
+{
+    judge(0, -1);
+    const int64_t nCalls = calls();
+    for (int64_t nCall = 1; nCall <= nCalls; ++nCall) {
+        judge(nCall, nCall);
+        judge(nCall, INT64_MAX);
+    }
+    judge(0, -1);
+    return nCalls;
+}

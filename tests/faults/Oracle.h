@@ -5,6 +5,7 @@
 
 #include <sys/types.h>
 
+#include <cstdint>
 #include <functional>
 #include <string>
 
@@ -50,5 +51,11 @@ private:
     std::string m_strAfterWithoutPurge;
     int m_nResult;
 };
+
+// Judges an operation undisturbed, then with each of the calls failing that it made, that one alone and all
+// from that one on, and undisturbed again. Returns how many calls there were, which is what calls tells after
+// a run.
+int64_t failEach(const std::function<void(int64_t nFirst, int64_t nLast)>& judge,
+                 const std::function<int64_t()>& calls);
 
 #endif
