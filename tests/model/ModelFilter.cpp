@@ -65,6 +65,13 @@ std::optional<long double> valueOf(std::string strText)
     return strText.empty() ? std::optional<long double>(sum) : std::nullopt;
 }
 
+bool isName(const std::string& strText)
+{
+    const auto isPart = [](unsigned char c) { return '_' == c || 0 != isalnum(c); };
+    return !strText.empty() && 0 == isdigit(static_cast<unsigned char>(strText[0])) &&
+           std::all_of(strText.begin(), strText.end(), isPart);
+}
+
 std::string textOf(Kind kind, const Json::Value& jValue)
 {
     return Kind::Json == kind ? jsonText(jValue) : untilNul(jValue.asString());
@@ -103,12 +110,15 @@ Where::Where(const Json::Value& jFilter)
         }
         add(nField, jFilter[strName]);
     }
+    for (const Alternative& alternative : m_alternatives) {
+        blBroken = blBroken || (alternative.blUnknownName && !alternative.blNever);
+    }
 }
 
 bool Where::matches(const Row& row) const
 {
-    return std::any_of(m_alternatives.begin(), m_alternatives.end(), [&](const auto& conditions) {
-        return std::all_of(conditions.begin(), conditions.end(),
+    return std::any_of(m_alternatives.begin(), m_alternatives.end(), [&](const Alternative& alternative) {
+        return std::all_of(alternative.conditions.begin(), alternative.conditions.end(),
                            [&](const Condition& condition) { return condition(row); });
     });
 }
@@ -138,10 +148,16 @@ void Where::addNumber(size_t nField, const std::string& strText, bool blList)
         }
     } else if (nOther < FIELDS.size()) {
         addCondition([=](const Row& row) { return number(row, nField) == number(row, nOther); });
-    } else if ("null" == strText || "'" == strText || (blList && strText.empty())) {
+    } else if ("null" == strText || "'" == strText) {
         addCondition(&never); // a quote is doubled, and becomes an empty text
+    } else if (blList && strText.empty()) {
+        addCondition(&never);
+        m_alternatives.back().blNever = true;
     } else if (const std::optional<long double> value = valueOf(strText)) {
         addCondition(numberIs(nField, *value));
+    } else if (isName(strText)) {
+        addCondition(&never);
+        m_alternatives.back().blUnknownName = true;
     } else {
         blBroken = true;
     }

@@ -21,9 +21,15 @@ struct Where {
 private:
     void add(size_t nField, const Json::Value& jValue);
     void addNumber(size_t nField, const std::string& strText, bool blList);
-    void addCondition(const Condition& condition) { m_alternatives.back().push_back(condition); }
+    void addCondition(const Condition& condition) { m_alternatives.back().conditions.push_back(condition); }
 
-    std::vector<std::vector<Condition>> m_alternatives = {{}}; // one of which must hold in all its conditions
+    // Holds when all its conditions do.
+    struct Alternative {
+        std::vector<Condition> conditions;
+        bool blUnknownName = false; // of a column
+        bool blNever = false;       // SQLite sees so from the first, and does not look for columns then
+    };
+    std::vector<Alternative> m_alternatives = {{}}; // one of which must hold
 };
 
 // Whether the filter's ordering and paging make a query invalid; they have no other effect.
