@@ -105,10 +105,11 @@ int fileCheckReservedLock(sqlite3_file* pFile, int* pnReserved)
     });
 }
 
-// Its results are hints and requests that a VFS may not know: not a call on the file.
 int fileControl(sqlite3_file* pFile, int nOperation, void* pArgument)
 {
-    return fileOf(pFile).real()->pMethods->xFileControl(fileOf(pFile).real(), nOperation, pArgument);
+    return told(callOn(pFile, "xFileControl", nOperation), [&] {
+        return fileOf(pFile).real()->pMethods->xFileControl(fileOf(pFile).real(), nOperation, pArgument);
+    });
 }
 
 int fileSectorSize(sqlite3_file* pFile)

@@ -9,8 +9,8 @@
 #include <functional>
 #include <string>
 
-// One call. For xOpen, nArgument holds the flags; for xSync and xLock their second argument; for xDelete
-// whether to sync the directory; for xTruncate the new size.
+// One call. For xOpen, nArgument holds the flags; for xSync, xLock and xFileControl their second argument;
+// for xDelete whether to sync the directory; for xTruncate the new size.
 struct FileCall {
     const char* szName; // "xOpen", "xWrite", ...
     std::string strPath;
