@@ -1,6 +1,7 @@
 #include "Commands.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 
 #include "AccessTokenDefine.h"
 #include "Console.h"
@@ -65,9 +66,14 @@ std::string mismatchText(const std::string& strSentence)
            (blMissing ? ": needs a value" : ": can be given once only");
 }
 
-// A sentence about the arguments; one that is long may be an id in the wrong place, and is shortened.
-std::string withoutIds(std::string strSentence, const std::vector<std::string>& strArguments)
+// A sentence about the arguments; one that is long may be an id in the wrong place, and is shortened. Those
+// that stand in others come after them.
+std::string withoutIds(std::string strSentence, std::vector<std::string> strArguments)
 {
+    std::sort(strArguments.begin(), strArguments.end(),
+              [](const std::string& strOne, const std::string& strOther) {
+                  return strOne.size() > strOther.size();
+              });
     for (const std::string& strArgument : strArguments) {
         const size_t nPosition = strSentence.find(strArgument);
         if (strArgument.size() >= VEMO_ATOKEN_LENGTH_MIN && nPosition != std::string::npos) {

@@ -366,6 +366,16 @@ TABLE
     [ "${lines[0]}" = "warning: a deadline of 0 or less in 1 token (${id:0:8})" ]
 }
 
+@test "of ids in a wrong place, none appears when one stands in another" {
+    local id arguments
+    id=$(a_token)
+    for arguments in "$id ${id}x" "${id}x $id"; do
+        # shellcheck disable=SC2086
+        run_tool generate $arguments
+        expect 2 "" "vemo-access-token: The following arguments were not expected: ${id:0:8}... ${id:0:8}..."
+    done
+}
+
 # Superfluous arguments are named, but this one may be an id that got there by mistake.
 @test "no id appears on standard error when it stands in a wrong place" {
     local id
