@@ -45,6 +45,12 @@ struct Row {
     Needs needs = Needs::Nothing;
 };
 
+// For the messages of GoogleTest.
+void PrintTo(const Row& row, std::ostream* pStream)
+{
+    *pStream << row.szName;
+}
+
 const std::string DONE = "done";
 const std::string DONE_FIRST = "done, mode 0700";
 

@@ -21,6 +21,12 @@ struct Case {
     std::string strDeletion;
 };
 
+// For the messages of GoogleTest.
+void PrintTo(const Case& testCase, std::ostream* pStream)
+{
+    *pStream << testCase.szName;
+}
+
 Damage sql(const std::string& strSql)
 {
     return [=](const TokenStore& store) { store.run(strSql); };

@@ -68,6 +68,12 @@ struct Case {
     Fault fault;
 };
 
+// For the messages of GoogleTest.
+void PrintTo(const Case& testCase, std::ostream* pStream)
+{
+    *pStream << testCase.szName;
+}
+
 class IoFault : public ::testing::TestWithParam<Case> {};
 
 } // namespace
