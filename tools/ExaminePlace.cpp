@@ -26,7 +26,7 @@ void requireCall(int nResult, const std::string& strPath)
     if (0 != nResult) {
         throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno));
     }
-    Store::noteChange();
+    Store::settleChange();
 }
 
 std::string octal(mode_t mode)

@@ -20,7 +20,7 @@ int init()
         blTable = true;
     }
     if (blDirectory || blFile) {
-        tool::Store::noteChange();
+        tool::Store::settleChange();
     }
     if (blDirectory) {
         tool::print("made the directory " + tool::databaseDirectory() + "\n");

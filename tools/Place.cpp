@@ -14,9 +14,9 @@ namespace {
 const mode_t PRIVATE_MODE = 0700;
 const mode_t PARENT_MODE = 0755;
 
-[[noreturn]] void failOn(const std::string& strPath)
+[[noreturn]] void failOn(const std::string& strPath, const std::string& strHint = "")
 {
-    throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno));
+    throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno), strHint);
 }
 
 void makeParents(const std::string& strPath)
@@ -110,6 +110,21 @@ bool makeDirectory()
         failOn(strDirectory);
     }
     return true;
+}
+
+void syncDirectory()
+{
+    const std::string strDirectory = databaseDirectory();
+    const int nDirectory = open(strDirectory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    const bool blSynced = 0 <= nDirectory && 0 == fsync(nDirectory);
+    const int nError = errno;
+    if (0 <= nDirectory) {
+        close(nDirectory);
+    }
+    if (!blSynced) {
+        errno = nError;
+        failOn(strDirectory, "the change was made, but a power cut can undo it");
+    }
 }
 
 void requireRoot()

@@ -26,6 +26,9 @@ void requireDatabase(bool blCreate);
 // made.
 bool makeDirectory();
 
+// Waits until the disk has the directory as it is now, after a change. Fails, and says what that means.
+void syncDirectory();
+
 // What commands that need root say to others; fails for them.
 void requireRoot();
 

@@ -139,9 +139,10 @@ Store::Store(Access access, Missing missing) : m_access(access)
     }
 }
 
-void Store::noteChange()
+void Store::settleChange()
 {
     g_blChanged = true;
+    syncDirectory();
 }
 
 bool Store::hasChanged()
@@ -192,7 +193,7 @@ void Store::commit()
     query("COMMIT");
     m_blCommitting = false;
     if (blChanged) {
-        noteChange();
+        settleChange();
     }
 }
 
@@ -308,7 +309,7 @@ bool Store::hasTable()
 void Store::makeTable()
 {
     require(m_db.createTable());
-    noteChange();
+    settleChange();
 }
 
 Rows Store::query(const std::string& strSql)

@@ -56,7 +56,7 @@ public:
 
     explicit Store(Access access, Missing missing = Missing::Fail);
 
-    // Waits, for 5 s at most, until the change can be written.
+    // Waits, for 5 s at most, until the change can be written. It outlasts a power cut.
     void commit();
 
     // The tokens whose fields equal the filter's.
@@ -105,9 +105,10 @@ public:
     std::string text(const std::string& strSql);
     uint64_t number(const std::string& strSql);
 
-    // To be told of changes that stay, made by another way than commit(): failures say whether there
-    // are any.
-    static void noteChange();
+    // To be called after a change that stays, made by another way than commit(). Failures tell from then on
+    // that there is one, and once this returns no power cut undoes it: the end of the journal, which is what
+    // makes a change, is on the disk only when the directory is.
+    static void settleChange();
 
     // Whether this process has made changes that stay.
     static bool hasChanged();

@@ -103,7 +103,7 @@ void execute(Store& store, const Options& options)
                                 "the journal cannot be made \"" + strJournal + "\" here");
         }
         if (!strResult.empty() || strStatement == "COMMIT") {
-            Store::noteChange();
+            Store::settleChange();
         }
         progress.step();
     }

@@ -19,6 +19,12 @@ public:
     Scene(const Scene&) = delete;
     Scene& operator=(const Scene&) = delete;
 
+    // Of the store, and of the files beside it.
+    const std::string& storeDirectory() const { return m_store.directory(); }
+    const std::string& files() const { return m_strFiles; }
+
+    const Ending& undisturbed() const { return m_undisturbed; }
+
     // How many calls a fault of this kind can happen to.
     int64_t calls(Fault::Kind kind) const;
 

@@ -7,12 +7,14 @@
 #include <sqlite3.h>
 #include <sys/mman.h>
 #include <sys/socket.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 
 #include "Heap.h"
 #include "SystemCalls.h"
@@ -60,6 +62,7 @@ private:
     int64_t* const m_pn;
 };
 
+bool g_blTool = false;             // whether this process is the tool
 const Fault* g_pWaiting = nullptr; // for the command to begin
 
 void failMemory(const Fault& fault)
@@ -82,6 +85,7 @@ void failMemory(const Fault& fault)
     if (fault.isOfMemory()) {
         getpwuid(0); // glibc does not bear a lack of memory when it does that first
     }
+    g_blTool = true;
     sqlite3_shutdown(); // for it to begin from nothing
     if (!letOtherAnswer(nSocket)) {
         _exit(EXIT_FAILURE);
@@ -103,6 +107,9 @@ public:
     int answer(const struct seccomp_data& call)
     {
         const int nUndisturbed = isSync(call) ? PRETEND : CARRY_OUT;
+        if (isSync(call)) {
+            m_strSyncedLast = fileOf(call.args[0]);
+        }
         if (!isMet(call)) {
             return nUndisturbed;
         }
@@ -117,6 +124,7 @@ public:
         return Fault::Kind::Error == m_fault.kind ? EIO : ENOSPC;
     }
     int64_t calls() const { return m_nCalls; }
+    std::string syncedLast() const { return m_strSyncedLast; }
 
 private:
     // Sentences must come through.
@@ -125,13 +133,35 @@ private:
         return !m_fault.isOfMemory() && !isWriteToStandardError(call) &&
                (Fault::Kind::FullDisk != m_fault.kind || takesRoomOnDisk(call));
     }
+    std::string fileOf(uint64_t nDescriptor) const
+    {
+        return std::filesystem::read_symlink("/proc/" + std::to_string(m_pid) + "/fd/" +
+                                             std::to_string(nDescriptor));
+    }
 
     const Fault m_fault;
     const pid_t m_pid;
     int64_t m_nCalls = 0;
+    std::string m_strSyncedLast;
 };
 
+int syncIfTool(long nCall, int nFile)
+{
+    return g_blTool ? static_cast<int>(syscall(nCall, nFile)) : 0;
+}
+
 } // namespace
+
+// The test waits for no disk, but the syncs of the tool must come to be answered.
+extern "C" int fsync(int nFile)
+{
+    return syncIfTool(__NR_fsync, nFile);
+}
+
+extern "C" int fdatasync(int nFile)
+{
+    return syncIfTool(__NR_fdatasync, nFile);
+}
 
 // Each command begins by asking who runs it. Stands in front of the redirection's.
 extern "C" uid_t geteuid() noexcept
@@ -175,6 +205,7 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
     ending.nStatus = WIFEXITED(nStatus) ? WEXITSTATUS(nStatus) : 0;
     ending.strOutput = output.text();
     ending.strError = error.text();
+    ending.strSyncedLast = injection.syncedLast();
     ending.nCalls = fault.isOfMemory() ? *nAllocations : injection.calls();
     return ending;
 }

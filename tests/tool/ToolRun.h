@@ -31,6 +31,7 @@ struct Ending {
     std::string strOutput;
     std::string strError;
     int64_t nCalls = 0; // that the fault could happen to
+    std::string strSyncedLast;
 };
 
 // Thrown where the kernel does not let one process answer the system calls of another.
