@@ -218,7 +218,7 @@ StoppedHolder::~StoppedHolder()
 
 SmallFileSystem::SmallFileSystem(const TokenStore& store) : m_store(store)
 {
-    provide(0 == unshare(CLONE_NEWNS) && 0 == mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) &&
+    provide(0 == unshare(CLONE_NEWNS) && 0 == mount(nullptr, "/", "", MS_REC | MS_PRIVATE, nullptr) &&
                 0 == mount("tmpfs", store.directory().c_str(), "tmpfs", 0, "size=256k,mode=0700"),
             "mount a file system that nobody else sees");
 }
@@ -248,10 +248,10 @@ FullFileSystem::~FullFileSystem()
 
 ReadOnlyFileSystem::ReadOnlyFileSystem(const TokenStore& store) : m_store(store)
 {
-    EXPECT_EQ(0, mount(nullptr, store.directory().c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr));
+    EXPECT_EQ(0, mount(nullptr, store.directory().c_str(), "", MS_REMOUNT | MS_RDONLY, nullptr));
 }
 
 ReadOnlyFileSystem::~ReadOnlyFileSystem()
 {
-    EXPECT_EQ(0, mount(nullptr, m_store.directory().c_str(), nullptr, MS_REMOUNT, nullptr));
+    EXPECT_EQ(0, mount(nullptr, m_store.directory().c_str(), "", MS_REMOUNT, nullptr));
 }
