@@ -15,6 +15,7 @@ import pty
 import signal
 import sys
 import termios
+import time
 
 import pexpect
 
@@ -28,6 +29,16 @@ def initial_modes():
     os.close(own)
     os.close(other)
     return modes
+
+
+def wait_until_it_sleeps(pid):
+    """What shows a text and then reads takes a Ctrl-C that comes in between for none until the next key."""
+    deadline = time.monotonic() + TIMEOUT
+    while time.monotonic() < deadline:
+        with open(f"/proc/{pid}/stat", encoding="ascii", errors="replace") as status:
+            if status.read().rpartition(")")[2].split()[0] not in "RD":
+                return
+        time.sleep(0.001)
 
 
 def main():
@@ -51,6 +62,7 @@ def main():
                 child.expect_exact(os.fsencode(text))
                 shown += child.before + child.after
                 modes.write("typed: " + ("shown" if child.getecho() else "hidden") + "\n")
+                wait_until_it_sleeps(child.pid)
                 child.send(os.fsencode(reply))
             child.expect_exact(pexpect.EOF)
         except (pexpect.EOF, pexpect.TIMEOUT) as failure:
