@@ -19,7 +19,7 @@ public:
     Scene(const Scene&) = delete;
     Scene& operator=(const Scene&) = delete;
 
-    // Of the store, and of the files beside it.
+    // The directories of the store and of the files beside it.
     const std::string& storeDirectory() const { return m_store.directory(); }
     const std::string& files() const { return m_strFiles; }
 
