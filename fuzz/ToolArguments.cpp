@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cctype>
 #include <map>
+#include <regex>
 #include <set>
 #include <string>
 #include <vector>
@@ -104,10 +105,11 @@ bool isId(const std::string& strText)
 // Import says this of a file, when it has imported it, and can fail at the next one.
 std::string withoutNotes(std::string strComplaint)
 {
-    const std::string strEnd = " of them expired: the next call of a program purges those\n";
-    for (size_t nEnd = strComplaint.find(strEnd); nEnd < strComplaint.find('\n');
-         nEnd = strComplaint.find(strEnd)) {
-        strComplaint.erase(0, nEnd + strEnd.size());
+    static const std::regex note(
+        "vemo-access-token: [0-9]+ of them expired: the next call of a program purges those\n");
+    for (std::smatch match;
+         std::regex_search(strComplaint, match, note, std::regex_constants::match_continuous);) {
+        strComplaint = match.suffix();
     }
     return strComplaint;
 }
