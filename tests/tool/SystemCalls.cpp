@@ -141,6 +141,11 @@ bool answerCalls(int nSocket, const Answer& answer)
     return true;
 }
 
+bool drawsRandomNumbers(const struct seccomp_data& call)
+{
+    return __NR_getrandom == call.nr;
+}
+
 bool isSync(const struct seccomp_data& call)
 {
     return isOneOf(call, {__NR_fsync, __NR_fdatasync});

@@ -20,6 +20,7 @@ bool letOtherAnswer(int nSocket);
 // In that other process: answers until the first one has ended. Returns whether that one let it.
 bool answerCalls(int nSocket, const Answer& answer);
 
+bool drawsRandomNumbers(const struct seccomp_data& call);
 bool isSync(const struct seccomp_data& call);
 bool isWriteToStandardError(const struct seccomp_data& call);
 bool takesRoomOnDisk(const struct seccomp_data& call);
