@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <cctype>
 #include <map>
-#include <regex>
 #include <set>
 #include <string>
 #include <vector>
@@ -105,13 +104,16 @@ bool isId(const std::string& strText)
 // Import says this of a file, when it has imported it, and can fail at the next one.
 std::string withoutNotes(std::string strComplaint)
 {
-    static const std::regex note(
-        "vemo-access-token: [0-9]+ of them expired: the next call of a program purges those\n");
-    for (std::smatch match;
-         std::regex_search(strComplaint, match, note, std::regex_constants::match_continuous);) {
-        strComplaint = match.suffix();
+    const std::string strStart = "vemo-access-token: ";
+    const std::string strEnd = " of them expired: the next call of a program purges those\n";
+    for (;;) {
+        const size_t nNumber = strComplaint.find_first_not_of("0123456789", strStart.size());
+        if (0 != strComplaint.compare(0, strStart.size(), strStart) || nNumber == strStart.size() ||
+            nNumber == std::string::npos || 0 != strComplaint.compare(nNumber, strEnd.size(), strEnd)) {
+            return strComplaint;
+        }
+        strComplaint.erase(0, nNumber + strEnd.size());
     }
-    return strComplaint;
 }
 
 // A failure is said in one sentence, without an id that was given as an argument.

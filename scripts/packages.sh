@@ -27,7 +27,7 @@ install_packages()
 
 # shellcheck disable=SC2034 # for those who source this
 {
-    BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libcli11-dev libsmartcols-dev
+    BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libsmartcols-dev
         libbsd-dev)
     TEST_PACKAGES=(libgtest-dev valgrind bats sqlite3 tzdata python3-pexpect mandoc bash-completion zsh fish doxygen)
     CLANG_PACKAGES=(clang libclang-rt-14-dev)

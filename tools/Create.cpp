@@ -106,7 +106,7 @@ namespace tool {
 void addCreate(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command =
+    Command& command =
         commands.add("create", "create a token, of one use and for a day unless told otherwise; print its id",
                      [pOptions] { return create(*pOptions); });
     addUser(command, pOptions->nUid);

@@ -123,7 +123,7 @@ namespace tool {
 void addDoctor(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command = commands.add(
+    Command& command = commands.add(
         "doctor", "say what is wrong with the store, what it means and what helps",
         [pOptions] { return doctor(*pOptions); }, Commands::Needs::Nothing);
     command.flag("--repair", pOptions->blRepair,

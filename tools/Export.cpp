@@ -49,8 +49,8 @@ namespace tool {
 void addExport(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command = commands.add("export", "write all tokens, whole ids included, as JSON lines",
-                                   [pOptions] { return exportTokens(*pOptions); });
+    Command& command = commands.add("export", "write all tokens, whole ids included, as JSON lines",
+                                    [pOptions] { return exportTokens(*pOptions); });
     command.optionalArgument("FILE", notEmptyInto(pOptions->strFile),
                              "the file, of mode 0600; without it, standard output");
 }

@@ -128,8 +128,9 @@ namespace tool {
 void addCheck(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command = commands.add("check", "tell whether a grant would succeed, and why not; spends nothing",
-                                   [pOptions] { return check(*pOptions); });
+    Command& command =
+        commands.add("check", "tell whether a grant would succeed, and why not; spends nothing",
+                     [pOptions] { return check(*pOptions); });
     addCall(command, *pOptions);
     addForm(command, pOptions->layout);
 }
@@ -137,8 +138,8 @@ void addCheck(Commands& commands)
 void addGrant(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command = commands.add("grant", "grant a call, which spends one use of the token",
-                                   [pOptions] { return grant(*pOptions); });
+    Command& command = commands.add("grant", "grant a call, which spends one use of the token",
+                                    [pOptions] { return grant(*pOptions); });
     addCall(command, *pOptions);
     command.flag("--print-user", pOptions->blPrintUser, "print the owner's name");
 }

@@ -182,7 +182,7 @@ namespace tool {
 void addImport(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command =
+    Command& command =
         commands.add("import", "create the tokens of files that export wrote; all of a file or none",
                      [pOptions] { return importTokens(*pOptions); });
     const auto add = [pOptions](const std::string& strFile) {

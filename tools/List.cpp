@@ -121,7 +121,7 @@ namespace tool {
 void addList(Commands& commands)
 {
     auto pOptions = std::make_shared<ListOptions>();
-    Command command =
+    Command& command =
         commands.add("list", "list tokens; purges nothing", [pOptions] { return list(*pOptions); });
     addSelection(command, pOptions->selection);
     command.flag("--expired", pOptions->blExpired, "those whose deadline has passed");
@@ -139,8 +139,8 @@ void addList(Commands& commands)
 void addShow(Commands& commands)
 {
     auto pOptions = std::make_shared<ShowOptions>();
-    Command command = commands.add("show", "show one token in full, its id too; spends and purges nothing",
-                                   [pOptions] { return show(*pOptions); });
+    Command& command = commands.add("show", "show one token in full, its id too; spends and purges nothing",
+                                    [pOptions] { return show(*pOptions); });
     addTid(command, pOptions->strTid);
     addTokenOptions(command, pOptions->layout);
 }

@@ -133,7 +133,7 @@ namespace tool {
 void addRevoke(Commands& commands)
 {
     auto pOptions = std::make_shared<RevokeOptions>();
-    Command command = commands.add("revoke", "delete tokens", [pOptions] { return revoke(*pOptions); });
+    Command& command = commands.add("revoke", "delete tokens", [pOptions] { return revoke(*pOptions); });
     const auto add = [pOptions](const std::string& strTid) { pOptions->strTids.push_back(strTid); };
     command.remainingArguments("TID", add, "ids; \"-\" reads them from standard input, one on each line");
     addSelection(command, pOptions->selection);
@@ -145,7 +145,7 @@ void addRevoke(Commands& commands)
 void addPurge(Commands& commands)
 {
     auto pOptions = std::make_shared<PurgeOptions>();
-    Command command =
+    Command& command =
         commands.add("purge", "delete the expired tokens", [pOptions] { return purge(*pOptions); });
     command.flag("--dry-run", pOptions->blDryRun, "only tell how many");
 }

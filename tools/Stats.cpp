@@ -198,8 +198,8 @@ namespace tool {
 void addStats(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command = commands.add("stats", "count the tokens, by purpose and by owner",
-                                   [pOptions] { return stats(*pOptions); });
+    Command& command = commands.add("stats", "count the tokens, by purpose and by owner",
+                                    [pOptions] { return stats(*pOptions); });
     command.flag("--prometheus", pOptions->blPrometheus,
                  "as metrics for the textfile collector of Prometheus' node exporter");
     addFormOptions(command, pOptions->layout);

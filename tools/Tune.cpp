@@ -149,8 +149,8 @@ namespace tool {
 void addTune(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command = commands.add("tune", "add indexes for a large store; says before and after, measured",
-                                   [pOptions] { return tune(*pOptions); });
+    Command& command = commands.add("tune", "add indexes for a large store; says before and after, measured",
+                                    [pOptions] { return tune(*pOptions); });
     command.flag("--wal", pOptions->blWal,
                  "the write-ahead journal too, for programs that hold their connection");
     command.flag("--undo", pOptions->blUndo, "remove the indexes and the write-ahead journal");

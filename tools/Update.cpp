@@ -175,7 +175,7 @@ namespace tool {
 void addUpdate(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command command =
+    Command& command =
         commands.add("update", "change fields of a token", [pOptions] { return update(*pOptions); });
     addTid(command, pOptions->strTid);
     addUses(command, pOptions->nCount);

@@ -34,8 +34,7 @@ void addAll(tool::Commands& commands)
     tool::addTune(commands);
 }
 
-// What no handler catches, since it passes a function that must not throw, as the parser of the command
-// line has some; or since the handler itself got no memory.
+// What no handler catches, since the handler itself got no memory.
 void endWithoutMemory()
 {
     try {

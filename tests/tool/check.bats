@@ -153,9 +153,9 @@ second-1 '' get||API: must not be empty
 '' Api||TID: the id is empty
 second Api||TID: "second" is too short: give the id or its first 8 characters, or more
 second-1 Api||TID: several tokens begin with "second-1"; give more of the id
-second-1 Api get put||The following argument was not expected: put
+second-1 Api get put||unexpected argument "put"
 second-1 Api -o xml||--output: "xml" is no form: table, json or jsonl
-second-1 Api --utc||The following argument was not expected: --utc
+second-1 Api --utc||unknown option "--utc"
 - Api||TID: there is no id on standard input
 - Api|\n|TID: there is no id on standard input
 - Api|a\nb\n|TID: there is more than one id on standard input

@@ -58,9 +58,9 @@ create --uid 0 --function VPN --uses 9223372036854775808|--uses: "92233720368547
 create --uid 0 --function VPN --uses 2 --unlimited|--uses excludes --unlimited
 create --uid 0 --function|--function: needs a value
 create --uid 0 --uid 1 --function VPN|--uid: can be given once only
-create --uid 0 --function VPN --count|The following argument was not expected: --count
-create --uid 0 --function VPN more|The following argument was not expected: more
-generate more|The following argument was not expected: more
+create --uid 0 --function VPN --count|unknown option "--count"
+create --uid 0 --function VPN more|unexpected argument "more"
+generate more|unexpected argument "more"
 END
 }
 

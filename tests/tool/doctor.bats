@@ -588,8 +588,8 @@ sys.stdout.buffer.write(child.before.replace(b"\r\n", b"\n"))'
         expect 2 "" "vemo-access-token: $sentence"
     done <<'TABLE'
 -o xml|--output: "xml" is no form: table, json or jsonl
---fix|The following argument was not expected: --fix
-aaaaaaaa|The following argument was not expected: aaaaaaaa
+--fix|unknown option "--fix"
+aaaaaaaa|unexpected argument "aaaaaaaa"
 TABLE
 }
 

@@ -206,8 +206,8 @@ token---|4" ]
 token---$ZEROS||API is required
 token---$ZEROS ''||API: must not be empty
 '' Api||TID: the id is empty
-token---$ZEROS Api get put||The following argument was not expected: put
-token---$ZEROS Api --field||The following argument was not expected: --field
+token---$ZEROS Api get put||unexpected argument "put"
+token---$ZEROS Api --field||unknown option "--field"
 - Api||TID: there is no id on standard input
 - Api|\n\n|TID: there is no id on standard input
 - Api|token---$ZEROS\ntoken---$ZEROS\n|TID: there is more than one id on standard input

@@ -97,7 +97,7 @@ made the table of tokens"
 
 @test "bad arguments of init end in a sentence that names them" {
     run_tool init now
-    expect 2 "" "vemo-access-token: The following argument was not expected: now"
+    expect 2 "" "vemo-access-token: unexpected argument \"now\""
     [ ! -e "$VEMO_REDIRECT_DIR" ]
 }
 

@@ -317,8 +317,8 @@ END
 
 @test "list refuses options that it cannot use" {
     refuses list <<'END'
-more|The following argument was not expected: more
---unknown|The following argument was not expected: --unknown
+more|unexpected argument "more"
+--unknown|unknown option "--unknown"
 --uid 0 --user root|--uid excludes --user
 --uid root|--uid: "root" is no number from 0 to 4294967294
 --uid '0 or 1=1'|--uid: "0 or 1=1" is no number from 0 to 4294967294

@@ -71,10 +71,12 @@ expect_left()
 @test "bad arguments of purge end in a sentence that names them" {
     deadline=1 a_row expired
     local argument
-    for argument in 12345678 --yes --all; do
+    for argument in --yes --all; do
         run_tool purge "$argument"
-        expect 2 "" "vemo-access-token: The following argument was not expected: $argument"
+        expect 2 "" "vemo-access-token: unknown option \"$argument\""
     done
+    run_tool purge 12345678
+    expect 2 "" "vemo-access-token: unexpected argument \"12345678\""
     expect_left expired
 }
 

@@ -287,7 +287,7 @@ TABLE
 --uid "0 or 1=1"|--uid: "0 or 1=1" is no number from 0 to 4294967294
 --user no-such-user|--user: there is no user "no-such-user"
 --user root --uid 0|--uid excludes --user
---nonsense|The following argument was not expected: --nonsense
+--nonsense|unknown option "--nonsense"
 TABLE
     expect_left aaaaaaaa bbbbbbbb cccccccc dddddddd eeeeeeee ffffffff
 }

@@ -210,8 +210,8 @@ END
     refuses show <<'END'
 |TID is required
 ''|TID: the id is empty
-token---0 token---1|The following argument was not expected: token---1
-token---0 --show-ids|The following argument was not expected: --show-ids
+token---0 token---1|unexpected argument "token---1"
+token---0 --show-ids|unknown option "--show-ids"
 token---0 -o yaml|--output: "yaml" is no form: table, json or jsonl
 token---0 --field TID|--field: "TID" is no field of a token
 token---0 --epoch --utc|--utc excludes --epoch

@@ -196,7 +196,7 @@ free pages of 4096 bytes       0"
     done <<'TABLE'
 -o xml|--output: "xml" is no form: table, json or jsonl
 --prometheus -o json|--prometheus excludes --output
-VPN|The following argument was not expected: VPN
+VPN|unexpected argument "VPN"
 TABLE
 }
 

@@ -184,9 +184,9 @@ awkward_rows()
 @test "export takes one file, and no form" {
     a_row A
     run_tool export "$DIR/a" "$DIR/b"
-    expect 2 "" "vemo-access-token: The following argument was not expected: $DIR/b"
+    expect 2 "" "vemo-access-token: unexpected argument \"$DIR/b\""
     run_tool export -o json
-    expect 2 "" "vemo-access-token: The following argument was not expected: -o"
+    expect 2 "" "vemo-access-token: unknown option \"-o\""
     [ ! -e "$DIR/a" ]
 }
 
@@ -443,7 +443,7 @@ TABLE
     run_tool import
     expect 2 "" "vemo-access-token: FILE is required"
     run_tool import --force directory
-    expect 2 "" "vemo-access-token: The following argument was not expected: --force"
+    expect 2 "" "vemo-access-token: unknown option \"--force\""
     cmp "$DB" "$DIR/before"
 }
 

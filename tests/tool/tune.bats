@@ -198,8 +198,8 @@ sys.stdout.buffer.write(child.before.replace(b"\r\n", b"\n"))'
     done <<'TABLE'
 --wal --undo|--wal excludes --undo
 --undo --wal --dry-run|--wal excludes --undo
-deadline|The following argument was not expected: deadline
--o|The following argument was not expected: -o
+deadline|unexpected argument "deadline"
+-o|unknown option "-o"
 TABLE
     cmp "$DB" "$DIR/before"
 }

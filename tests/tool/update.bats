@@ -287,7 +287,7 @@ token---|say what to change; "update --help" lists the fields
 '' --uses 2|TID: the id is empty
 token-- --uses 2|TID: "token--" is too short: give the id or its first 8 characters, or more
 second-1 --uses 2|TID: several tokens begin with "second-1"; give more of the id
-token--- second-1 --uses 2|The following argument was not expected: second-1
+token--- second-1 --uses 2|unexpected argument "second-1"
 token--- --uses 0|--uses: "0" is no number from 1 to 9223372036854775807
 token--- --uses -1|--uses: "-1" is no number from 1 to 9223372036854775807
 token--- --uses 2 --unlimited|--uses excludes --unlimited
@@ -305,7 +305,7 @@ token--- --extra []|--extra: is no JSON object
 token--- --extra '{'|--extra: is no JSON: Column 2 Missing '}' or object member name
 token--- --extra @$DIR|--extra: $DIR: Is a directory
 token--- --extra @$DIR/missing|--extra: $DIR/missing: No such file or directory
-token--- --count|The following argument was not expected: --count
+token--- --count|unknown option "--count"
 END
 }
 

@@ -62,7 +62,7 @@ tokens()
     [ "$status" -eq 0 ]
     [ "$stderr" = "" ]
     [ "$(sed -n '/^Commands:/,/^$/s/^  \([a-z]*\)  .*/\1/p' <<<"$output" | xargs)" = "$COMMANDS" ]
-    [[ $output == *"Usage: vemo-access-token "* ]]
+    [[ $output == "Usage: vemo-access-token [OPTIONS] COMMAND"* ]]
     [[ $output == *"Exit status: 0 done or granted, 1 refused (grant, check), 2 usage, 3 no such token,
 4 store or permission failure, 5 doctor has findings."* ]]
     local help=$output
@@ -76,7 +76,7 @@ tokens()
         run_tool "$command" --help
         [ "$status" -eq 0 ]
         [ "$stderr" = "" ]
-        [[ $output == *"Usage: vemo-access-token $command "* ]]
+        [[ $output == "Usage: vemo-access-token $command [OPTIONS]"* ]]
         local got
         got=$(grep -oE '^  (-[a-z],)?--[a-z-]+' <<<"$output" | tr -d ' ' | sort)
         [ "$got" = "$(tr ' ' '\n' <<<"-h,--help --version -v,--verbose${flags:+ $flags}" | sort)" ] || {
@@ -122,29 +122,39 @@ TABLE
         expect 2 "" "vemo-access-token: $sentence"
     done <<'TABLE'
 |say what to do; "vemo-access-token --help" lists the commands
-bogus|The following argument was not expected: bogus
+bogus|unknown command "bogus"
 list --count=5|--count: takes no value
 list --expired=false|--expired: takes no value
 list --verbose=1|--verbose: takes no value
 create --unlimited=no|--unlimited: takes no value
---bogus|The following argument was not expected: --bogus
-list bogus|The following argument was not expected: bogus
-list --bogus|The following argument was not expected: --bogus
-list list|The following argument was not expected: list
-purge -x|The following argument was not expected: -x
-generate more|The following argument was not expected: more
+--bogus|unknown option "--bogus"
+-x|unknown option "-x"
+--|unknown option "--"
+list bogus|unexpected argument "bogus"
+list --bogus|unknown option "--bogus"
+list --bogus=x|unknown option "--bogus"
+list --funct TAG|unknown option "--funct"
+list --verb|unknown option "--verb"
+list list|unexpected argument "list"
+list --help --bogus|unknown option "--bogus"
+purge -x|unknown option "-x"
+purge -vx|unknown option "-x"
+show -o|--output: needs a value
+generate more|unexpected argument "more"
+generate -- more|unexpected argument "more"
+generate -|unexpected argument "-"
 show|TID is required
 check|TID is required
 check TID|API is required
-check TID API METHOD more|The following argument was not expected: more
+check TID API METHOD more|unexpected argument "more"
 grant|TID is required
 grant TID|API is required
-grant TID API METHOD more|The following argument was not expected: more
+grant TID API METHOD more|unexpected argument "more"
 update|TID is required
 update TID|say what to change; "update --help" lists the fields
 revoke|say which tokens: by TID, by --uid, --user, --function and --bind-sid, or --all
 import|FILE is required
-export FILE more|The following argument was not expected: more
+export FILE more|unexpected argument "more"
 create|--function is required
 create --function|--function: needs a value
 create --function TAG|--uid or --user is required
@@ -161,6 +171,51 @@ update TID --allow A --remove-allow B|--allow excludes --remove-allow
 stats --prometheus -o json|--prometheus excludes --output
 tune --wal --undo|--wal excludes --undo
 TABLE
+}
+
+@test "arguments may stand before, between and behind options, also where POSIX is asked for" {
+    local id arguments
+    id=$(a_token --allow Api:get)
+    for arguments in "$id Api get -o json" "-o json $id Api get" "$id -ojson Api get" "$id Api --output=json get" \
+        "-vo json -- $id Api get"; do
+        # shellcheck disable=SC2086
+        POSIXLY_CORRECT=1 run_tool check $arguments
+        expect 0 '{"allowed":true,"reason":""}'
+    done
+}
+
+# Brackets, quotes, equals signs and the like mean nothing here: neither lists nor escapes.
+@test "arguments reach the commands byte for byte" {
+    local text id
+    tool init
+    for text in '[a,b]' '[]' '"x"' "'x'" '{a}' 'a=b' '=' '-' '--' '--all' '-v' '%%' '\\n' ' ' $'a\nb' $'\x9b' '!#:+'; do
+        run_tool create --uid 0 --function "$text" --bind-sid="$text" --allow "Api" --extra "{\"x\": 1}"
+        [ "$status" -eq 0 ]
+        id=$output
+        [ "$(sql "SELECT function || char(9) || bind_sid FROM token WHERE tid = '$id'")" = "$text"$'\t'"$text" ]
+        run_tool grant "$id" -- "$text"
+        expect 1 "" "vemo-access-token: refused: API not listed"
+        run_tool revoke --yes --function "$text" --bind-sid="$text"
+        expect 0 "1 token revoked"
+    done
+    tool create --uid 0 --function VPN --bind-sid=
+    [ "$(tool list --field bind_sid)" = "" ]
+}
+
+@test "names and ids in brackets are names and ids" {
+    local one other
+    one=$(a_token)
+    other=$(a_token)
+    run_tool revoke "[${one:0:8},${other:0:8},$ZEROS]"
+    expect 0 "0 tokens revoked"
+    [ "$(tokens)" -eq 2 ]
+    cd "$DIR"
+    tool export x
+    run_tool import "[x]"
+    expect 2 "" "vemo-access-token: [x]: No such file or directory"
+    run_tool import -- --a=
+    expect 2 "" "vemo-access-token: --a=: No such file or directory"
+    [ "$(tokens)" -eq 2 ]
 }
 
 @test "who is not root is told so before anything is tried" {
@@ -366,14 +421,11 @@ TABLE
     [ "${lines[0]}" = "warning: a deadline of 0 or less in 1 token (${id:0:8})" ]
 }
 
-@test "of ids in a wrong place, none appears when one stands in another" {
-    local id arguments
+@test "of an argument that holds two ids, none appears when one of them is an argument too" {
+    local id
     id=$(a_token)
-    for arguments in "$id ${id}x" "${id}x $id"; do
-        # shellcheck disable=SC2086
-        run_tool generate $arguments
-        expect 2 "" "vemo-access-token: The following arguments were not expected: ${id:0:8}... ${id:0:8}..."
-    done
+    run_tool show "$id" "$id$(a_token)"
+    expect 2 "" "vemo-access-token: unexpected argument \"${id:0:8}...\""
 }
 
 # Superfluous arguments are named, but this one may be an id that got there by mistake.

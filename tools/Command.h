@@ -1,0 +1,107 @@
+// One command of the tool: its options and arguments, how they are read, and its help.
+
+#ifndef TOOLS_COMMAND_H
+#define TOOLS_COMMAND_H
+
+#include <functional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "Failure.h"
+
+struct option; // of <getopt.h>
+
+namespace tool {
+
+// Names of options are "--name" or "-n,--name", those of arguments "NAME". What an option or argument
+// stores to must outlive the command.
+class Command {
+public:
+    // What it does when all arguments have been read; returns the exit status.
+    typedef std::function<int()> Run;
+
+    Command(std::string strName, std::string strDescription, Run run);
+
+    void flag(const std::string& strName, bool& blFlag, const std::string& strDescription);
+    void flag(const std::string& strName, std::function<void()> set, const std::string& strDescription);
+
+    // Takes the text of each occurrence; a BadValue becomes a usage failure that names the option.
+    typedef std::function<void(const std::string&)> Take;
+    void option(const std::string& strName, const std::string& strType, Take take,
+                const std::string& strDescription);
+    void repeatedOption(const std::string& strName, const std::string& strType, Take take,
+                        const std::string& strDescription);
+
+    // The next argument, or all that are left.
+    void argument(const std::string& strName, Take take, const std::string& strDescription);
+    void optionalArgument(const std::string& strName, Take take, const std::string& strDescription);
+    void remainingArguments(const std::string& strName, Take take, const std::string& strDescription);
+
+    // Of those that have been added, by "--name" or "NAME".
+    void require(const std::string& strName);
+    void exclude(const std::string& strName, const std::string& strOther);
+
+    const std::string& name() const { return m_strName; }
+    const std::string& description() const { return m_strDescription; }
+    std::string help() const;
+
+    // Reads a command line that begins with the command's name, byte for byte. Throws Failure.
+    void read(int nArguments, char** rgArguments);
+
+    // Whether an option was read.
+    bool has(const std::string& strName) const;
+
+    // Hands each text that was read to its Take. Throws Failure.
+    void take();
+
+    int run() const { return m_run(); }
+
+private:
+    // An option, or an argument.
+    struct Parameter {
+        std::string strName; // "--name" or "NAME"
+        char cShort;         // or 0
+        std::string strType;
+        std::string strDescription;
+        Take take;
+        bool blTakesText;
+        bool blRepeated;
+        bool blRequired = false;
+        std::vector<std::string> strExcluded = {};
+        std::vector<std::string> strTexts = {}; // as read
+    };
+
+    Parameter* find(const std::string& strName); // nullptr: there is none
+    void addOption(const std::string& strNames, Parameter parameter);
+    void addText(Parameter& parameter, const char* szText);
+    void addArgument(const char* szText);
+    void addFound(int nFound);
+    std::string shortOptions() const;
+    std::vector<struct option> longOptions() const;
+    Parameter& optionOf(int nFound);
+    void check() const;
+
+    const std::string m_strName;
+    const std::string m_strDescription;
+    const Run m_run;
+    std::vector<Parameter> m_options;
+    std::vector<Parameter> m_arguments;
+};
+
+// Adds an option whose text parse() reads into target.
+template <typename Target, typename Parse>
+void addParsed(Command& command, const std::string& strName, const std::string& strType, Target& target,
+               Parse parse, const std::string& strDescription)
+{
+    command.option(
+        strName, strType, [&target, parse](const std::string& strText) { target = parse(strText); },
+        strDescription);
+}
+
+// Two columns of a help text: names, and what they are.
+std::string helpLine(const std::string& strName, const std::string& strDescription);
+
+} // namespace tool
+
+#endif
