@@ -1,16 +1,38 @@
 # shellcheck shell=bash
-# Sourced by the other scripts: installs what is missing of the Debian packages named to it.
+# Sourced by the other scripts: installs what is missing of the Debian packages that they need. They say what they
+# need, and for what, with need; install_needed tells what is missing and installs it. On a terminal it asks first.
 
-install_packages()
+missing=()  # packages
+purposes=() # lines "PURPOSE: PACKAGE..." of those
+
+# need PURPOSE PACKAGE...
+need()
 {
-    local package missing=() sudo=()
+    local purpose=$1 package new=()
+    shift
     for package in "$@"; do
         # A package can be installed for several architectures: one line for each.
-        if ! dpkg-query -W -f '${db:Status-Status}\n' "$package" 2>/dev/null | grep -qx installed; then
-            missing+=("$package")
+        if [[ " ${missing[*]} " != *" $package "* ]] &&
+            ! dpkg-query -W -f '${db:Status-Status}\n' "$package" 2>/dev/null | grep -qx installed; then
+            new+=("$package")
         fi
     done
-    [ ${#missing[@]} -eq 0 ] && return
+    [ ${#new[@]} -eq 0 ] || purposes+=("$purpose: ${new[*]}")
+    missing+=("${new[@]}")
+}
+
+# size_of PACKAGE...: what apt would fetch and write, with all that they depend on
+size_of()
+{
+    { LC_ALL=C apt-get install --no-install-recommends --assume-no -o Debug::NoLocking=1 "$@" || true; } |
+        sed -nE 's,^Need to get ([^/]* [kMG]?B).* of archives.*,\1 to fetch,p
+            s/^After this operation, (.*) of additional disk space.*/\1 on the disk/p' | paste -sd , | sed 's/,/, /'
+}
+
+install_needed()
+{
+    [ ${#missing[@]} -gt 0 ] || return 0
+    local purpose answer=y sudo=()
     if [ "$(id -u)" -ne 0 ]; then
         if ! command -v sudo >/dev/null; then
             echo "$0: packages are missing and there is no sudo. As root, run:" >&2
@@ -19,17 +41,29 @@ install_packages()
         fi
         sudo=(sudo)
     fi
-    echo "Installing ${missing[*]}"
     "${sudo[@]}" apt-get update -q=2
+    echo "Packages are missing:"
+    for purpose in "${purposes[@]}"; do
+        # shellcheck disable=SC2086 # several packages
+        echo "  $purpose ($(size_of ${purpose#*: }))"
+    done
+    echo "Together: $(size_of "${missing[@]}")."
+    if [ -t 0 ]; then
+        read -r -p "Install them? [Y/n] " answer
+        if [[ ${answer:-y} != [Yy]* ]]; then
+            echo "$0: nothing was installed." >&2
+            exit 1
+        fi
+    fi
     "${sudo[@]}" env DEBIAN_FRONTEND=noninteractive \
         apt-get install -q=2 --no-install-recommends -o Dpkg::Use-Pty=0 "${missing[@]}" >/dev/null
 }
 
 # shellcheck disable=SC2034 # for those who source this
 {
-    BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libsmartcols-dev
-        libbsd-dev)
-    TEST_PACKAGES=(libgtest-dev valgrind bats sqlite3 tzdata python3-pexpect mandoc bash-completion zsh fish doxygen)
+    BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libsmartcols-dev libbsd-dev)
+    UNIT_TEST_PACKAGES=(libgtest-dev)
+    TEST_PACKAGES=(valgrind bats sqlite3 tzdata python3-pexpect mandoc bash-completion zsh fish doxygen)
     CLANG_PACKAGES=(clang libclang-rt-14-dev)
     BENCH_PACKAGES=(libbenchmark-dev)
     PEER_PACKAGES=(libhiredis-dev libpq-dev) # to build what measures Redis and PostgreSQL

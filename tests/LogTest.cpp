@@ -23,7 +23,6 @@ using VEMO_ACCESS_TOKEN::logToStdoutGet;
 namespace {
 
 bool g_blOpenlog = false;
-int g_nErrnoOfAllocations = 0; // which they leave behind though they succeed; 0: none
 
 } // namespace
 
@@ -31,18 +30,6 @@ int g_nErrnoOfAllocations = 0; // which they leave behind though they succeed; 0
 extern "C" void openlog(const char*, int, int)
 {
     g_blOpenlog = true;
-}
-
-// Every allocation of this process goes through here, those of the C++ libraries too. The memory is
-// the next operator's, so its operator delete stays in use.
-void* operator new(std::size_t cbSize)
-{
-    static auto* const pNew = next<void*(std::size_t)>("_Znwm");
-    void* pMemory = pNew(cbSize);
-    if (0 != g_nErrnoOfAllocations) {
-        errno = g_nErrnoOfAllocations;
-    }
-    return pMemory;
 }
 
 namespace {
@@ -207,13 +194,13 @@ TEST_P(LineForm, HoldsTextOfCallersAsItIs)
 TEST_P(LineForm, TellsErrnoAlthoughItsArgumentsChangeIt)
 {
     Json::Value jToken = json(R"({"count":"5"})");
-    VEMO_ACCESS_TOKEN::tokenType(); // made now, so that the line's arguments are the only allocations
-    g_nErrnoOfAllocations = EAGAIN;
+    VEMO_ACCESS_TOKEN::tokenType();         // made now, so that the line's arguments are the only allocations
+    g_pAllocation = [] { errno = EAGAIN; }; // and succeeds
     errno = GetParam().nErrno;
 
     const int nResult = checkJsonType(jToken);
 
-    g_nErrnoOfAllocations = 0;
+    g_pAllocation = nullptr;
     EXPECT_EQ(-1, nResult);
     expectLine("util.cpp:#", "(util.cpp:#)(" + errorText() +
                                  ")type failed, jmList[i]=count, jTokenParam={\"count\":\"5\"}\n\n");

@@ -14,13 +14,8 @@ bool g_blJsoncppTellsIt = false; // by an exception of its own, as it does where
 Json::ValueType g_typeOfObjects = Json::objectValue;
 int g_nLies = 0; // how many calls are told so, from now on
 
-} // namespace
-
-// Every allocation of this process goes through here, those of the C++ libraries too. The memory is
-// the next operator's, so its operator delete stays in use.
-void* operator new(std::size_t cbSize)
+void allocate()
 {
-    static auto* const pNew = next<void*(std::size_t)>("_Znwm");
     if (0 < g_nAllocationThatFails && 0 == --g_nAllocationThatFails) {
         errno = ENOMEM;
         if (g_blJsoncppTellsIt) {
@@ -28,8 +23,9 @@ void* operator new(std::size_t cbSize)
         }
         throw std::bad_alloc();
     }
-    return pNew(cbSize);
 }
+
+} // namespace
 
 // A fresh record is always an object; the check that it is one can only be reached by a lie.
 __attribute__((visibility("default"))) Json::ValueType Json::Value::type() const
@@ -273,6 +269,7 @@ TEST_F(RowDecoding, TurnsEachFailedAllocationIntoFailure)
     while (0 > nResult) {
         SCOPED_TRACE(++nFailures);
         errno = 0;
+        g_pAllocation = allocate;
         g_nAllocationThatFails = nFailures + 1;
         EXPECT_NO_THROW(nResult = decode(row));
         g_nAllocationThatFails = 0;
@@ -304,6 +301,7 @@ TEST_F(RowDecoding, YieldsTheWholeRecordOrNoneWhenAnAllocationFails)
             m_jArray = Json::Value();
             errno = 0;
             g_blJsoncppTellsIt = 0 == strcmp(szError, "no memory");
+            g_pAllocation = allocate;
             g_nAllocationThatFails = nWhole + nNone + 1;
             const int nResult = decode(row);
             blFailed = 0 == g_nAllocationThatFails;

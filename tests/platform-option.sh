@@ -14,7 +14,7 @@ for name in plibc vemouser vemorandom; do
     "$compiler" -std=c++17 -shared -fPIC "$source/platform/$name.cpp" -o "$dir/lib/lib$name.so"
 done
 cmake -S "$source" -B "$dir/build" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" -DBUILD_TESTING=OFF \
-    -DVEMO_ATOKEN_TOOL=OFF -DVEMO_ATOKEN_PLATFORM="$dir" >/dev/null
+    -DCMAKE_BUILD_TYPE=None -DVEMO_ATOKEN_TOOL=OFF -DVEMO_ATOKEN_PLATFORM="$dir" >/dev/null
 cmake --build "$dir/build" -- --quiet
 
 undefined=$(nm -D --undefined-only -C "$dir/build/src/libvemoaccesstoken.so")

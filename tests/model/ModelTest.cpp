@@ -14,12 +14,6 @@
 
 namespace {
 
-#ifdef __SANITIZE_ADDRESS__
-const int64_t OPERATIONS = 5000; // slow, and for the sanitizers' eyes only
-#else
-const int64_t OPERATIONS = 100000;
-#endif
-
 const size_t REPORTED = 12;    // operations that a failure shows
 const size_t TEXT_SHOWN = 500; // of each
 
@@ -173,7 +167,7 @@ private:
 
 TEST_F(ModelCheck, LibraryDoesWhatTheModelDoes)
 {
-    const int64_t nOperations = scaled(OPERATIONS);
+    const int64_t nOperations = scaled(VEMO_TEST_OPERATIONS);
     for (int64_t i = 0; i < nOperations && !HasFatalFailure(); ++i) {
         runOne();
     }

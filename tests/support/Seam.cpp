@@ -12,6 +12,7 @@
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <new>
 
@@ -369,6 +370,31 @@ char* sqlite3_mprintf(const char* szFormat, ...)
 }
 
 } // extern "C"
+
+void (*g_pAllocation)() = nullptr;
+
+// Each allocation of the process comes here, those of the C++ libraries too.
+void* operator new(std::size_t cbSize)
+{
+    if (nullptr != g_pAllocation) {
+        g_pAllocation();
+    }
+    void* const pMemory = malloc(0 == cbSize ? 1 : cbSize);
+    if (nullptr == pMemory) {
+        throw std::bad_alloc();
+    }
+    return pMemory;
+}
+
+void operator delete(void* pMemory) noexcept
+{
+    free(pMemory);
+}
+
+void operator delete(void* pMemory, std::size_t) noexcept
+{
+    free(pMemory);
+}
 
 void* operator new(std::size_t cbSize, const std::nothrow_t&) noexcept
 {

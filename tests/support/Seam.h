@@ -77,4 +77,8 @@ struct Seam {
 
 Seam& seam();
 
+// When set, called ahead of each allocation by operator new, whoever asks for it. It may throw, and errno
+// stays as it leaves it.
+extern void (*g_pAllocation)();
+
 #endif

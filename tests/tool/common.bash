@@ -6,7 +6,7 @@
 #   row NAME [COLUMN = VALUE, ...]  a token whose id is the name, of 8 characters, and $ZEROS; behind the tool's
 #                           back. Its fields are those of ROW, which a file can set otherwise.
 #   state                   what there is of the private directory, to the byte
-#   run_tool ARGUMENTS...   runs it: $status, $output (standard output), $stderr
+#   run_tool ARGUMENTS...   runs it: $status, $output (standard output), $lines (of it, but for empty ones), $stderr
 
 bats_require_minimum_version 1.5.0
 
@@ -30,9 +30,19 @@ tool()
     "$TOOL" "$@"
 }
 
+# What "run --separate-stderr" does, in a third of the time.
 run_tool()
 {
-    run --separate-stderr "$TOOL" "$@"
+    local streams=$BATS_TEST_TMPDIR.streams
+    status=0
+    "$TOOL" "$@" >"$streams" 2>"$streams.errors" || status=$?
+    output=$(<"$streams")
+    stderr=$(<"$streams.errors")
+    local IFS=$'\n'
+    set -f
+    # shellcheck disable=SC2034,SC2206 # for the tests, which want the lines
+    lines=($output)
+    set +f
 }
 
 sql()
