@@ -127,11 +127,18 @@ done
 echo 'extern "C" void syslog(int, const char*, ...) {}' >log.cc
 "$compiler" -c log.cc -o log.o
 
+# The headers that most programs begin with, parsed once.
+cp -r "$source/include" headers
+compile=("$compiler" -std=c++17 -Wall -Wextra -Werror -Iheaders -isystem "$json")
+for header in vemo-access-token.h AccessTokenUtil.h; do
+    "${compile[@]}" -x c++-header "headers/$header" -o "headers/$header.gch"
+done
+
 # try PROGRAM.cpp: builds it, and runs it if the page says what it prints
 try()
 {
     local program=${1%.cpp}
-    "$compiler" -std=c++17 -Wall -Wextra -Werror "-I$source/include" -isystem "$json" "$1" log.o -o "$program" \
+    "${compile[@]}" "$1" log.o -o "$program" \
         -Wl,--no-as-needed "$build/examples/libredirect.so" "-Wl,-rpath,$build/examples" \
         "-L$build/src" "-Wl,-rpath,$build/src" -lvemoaccesstoken -ljsoncpp || return
     [ -e "$program.out" ] || return 0

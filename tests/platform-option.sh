@@ -15,7 +15,7 @@ for name in plibc vemouser vemorandom; do
 done
 cmake -S "$source" -B "$dir/build" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" -DBUILD_TESTING=OFF \
     -DCMAKE_BUILD_TYPE=None -DVEMO_ATOKEN_TOOL=OFF -DVEMO_ATOKEN_PLATFORM="$dir" >/dev/null
-cmake --build "$dir/build" -- --quiet
+cmake --build "$dir/build" --target token-life-redirected -- --quiet
 
 undefined=$(nm -D --undefined-only -C "$dir/build/src/libvemoaccesstoken.so")
 for name in PLIBCFileTouch VEMOUserGetByUID VEMOUserFree 'VEMO::RANDOM::VEMORandomBase::random'; do
