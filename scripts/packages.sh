@@ -24,9 +24,10 @@ need()
 # size_of PACKAGE...: what apt would fetch and write, with all that they depend on
 size_of()
 {
-    { LC_ALL=C apt-get install --no-install-recommends --assume-no -o Debug::NoLocking=1 "$@" || true; } |
-        sed -nE 's,^Need to get ([^/]* [kMG]?B).* of archives.*,\1 to fetch,p
-            s/^After this operation, (.*) of additional disk space.*/\1 on the disk/p' | paste -sd , | sed 's/,/, /'
+    apt-get install --simulate --no-install-recommends "$@" | awk '/^Inst / { print $2 }' |
+        xargs apt-cache show --no-all-versions |
+        awk '/^Size:/ { bytes += $2 } /^Installed-Size:/ { kilobytes += $2 }
+            END { printf "%.1f MB to fetch, %.1f MB on the disk\n", bytes / 1e6, kilobytes / 1e3 }'
 }
 
 install_needed()
@@ -41,7 +42,7 @@ install_needed()
         fi
         sudo=(sudo)
     fi
-    "${sudo[@]}" apt-get update -q=2
+    "${sudo[@]}" apt-get update -q=2 # or it knows of none
     echo "Packages are missing:"
     for purpose in "${purposes[@]}"; do
         # shellcheck disable=SC2086 # several packages
