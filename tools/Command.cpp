@@ -4,6 +4,8 @@
 
 #include <algorithm>
 
+#include "Masking.h"
+
 namespace {
 
 const size_t NAME_WIDTH = 28;
@@ -102,12 +104,12 @@ void Command::exclude(const std::string& strName, const std::string& strOther)
     find(strOther)->strExcluded.push_back(strName);
 }
 
-void Command::addText(Parameter& parameter, const char* szText)
+void Command::addOptionText(Parameter& option, const char* szText)
 {
-    if (!parameter.blRepeated && !parameter.strTexts.empty()) {
-        throw usageFailure(parameter.strName + ": can be given once only");
+    if (!option.blRepeated && !option.strTexts.empty()) {
+        throw usageFailure(option.strName + ": can be given once only");
     }
-    parameter.strTexts.emplace_back(szText);
+    option.strTexts.emplace_back(szText);
 }
 
 void Command::addArgument(const char* szText)
@@ -115,9 +117,9 @@ void Command::addArgument(const char* szText)
     const auto isOpen = [](const Parameter& each) { return each.blRepeated || each.strTexts.empty(); };
     const auto pNext = std::find_if(m_arguments.begin(), m_arguments.end(), isOpen);
     if (m_arguments.end() == pNext) {
-        throw usageFailure("unexpected argument \"" + std::string(szText) + "\"");
+        throw usageFailure("unexpected argument " + quoted(szText));
     }
-    addText(*pNext, szText);
+    pNext->strTexts.emplace_back(szText);
 }
 
 // What getopt_long() knows of the options.
@@ -163,7 +165,7 @@ void Command::addFound(int nFound)
         throw usageFailure(FIRST_OPTION <= optopt
                                ? optionOf(optopt).strName + ": takes no value"
                                : std::string("unknown option \"-") + static_cast<char>(optopt) + "\"");
-    default: return addText(optionOf(nFound), nullptr == optarg ? "" : optarg);
+    default: return addOptionText(optionOf(nFound), nullptr == optarg ? "" : optarg);
     }
 }
 
@@ -172,16 +174,16 @@ void Command::read(int nArguments, char** rgArguments)
     const std::string strShort = shortOptions();
     const std::vector<struct option> rgLong = longOptions();
     opterr = 0; // the sentences are those of this file
-    optind = 0; // from the beginning
+    optind = 0; // unlike 1 it makes getopt_long() forget what it has read before
     int nNext = 1;
     for (; nNext < nArguments; nNext = optind) {
         // Whole names only: what is short for one option today may be short for two tomorrow.
         const std::string strName = longNameOf(rgArguments[nNext]);
         if (!strName.empty() && nullptr == find(strName)) {
-            throw usageFailure("unknown option \"" + strName + "\"");
+            throw usageFailure("unknown option " + quoted(strName));
         }
         const int nFound = getopt_long(nArguments, rgArguments, strShort.c_str(), rgLong.data(), nullptr);
-        if (-1 == nFound) { // it was "--"
+        if (-1 == nFound) { // the one argument that it does not tell: "--"
             ++nNext;
             break;
         }

@@ -46,13 +46,14 @@ public:
     const std::string& description() const { return m_strDescription; }
     std::string help() const;
 
-    // Reads a command line that begins with the command's name, byte for byte. Throws Failure.
+    // Notes the texts of a command line that begins with the command's name, byte for byte. Throws Failure
+    // where it cannot be read; what is missing or excluded is for take().
     void read(int nArguments, char** rgArguments);
 
     // Whether an option was read.
     bool has(const std::string& strName) const;
 
-    // Hands each text that was read to its Take. Throws Failure.
+    // Checks what is required and excluded, and hands each text to its Take. Throws Failure.
     void take();
 
     int run() const { return m_run(); }
@@ -66,7 +67,7 @@ private:
         std::string strDescription;
         Take take;
         bool blTakesText;
-        bool blRepeated;
+        bool blRepeated; // may be given more than once, as flags may
         bool blRequired = false;
         std::vector<std::string> strExcluded = {};
         std::vector<std::string> strTexts = {}; // as read
@@ -74,7 +75,7 @@ private:
 
     Parameter* find(const std::string& strName); // nullptr: there is none
     void addOption(const std::string& strNames, Parameter parameter);
-    void addText(Parameter& parameter, const char* szText);
+    void addOptionText(Parameter& option, const char* szText);
     void addArgument(const char* szText);
     void addFound(int nFound);
     std::string shortOptions() const;

@@ -1,9 +1,7 @@
 #include "Commands.h"
 
-#include <algorithm>
-
-#include "AccessTokenDefine.h"
 #include "Console.h"
+#include "Masking.h"
 #include "Place.h"
 #include "Store.h"
 
@@ -13,23 +11,6 @@ const char* const VERSION_TEXT = "vemo-access-token " VEMO_ATOKEN_VERSION "\n";
 
 const char* const HELP = "print this help and exit";
 const char* const VERSION = "print the version and exit";
-
-// A sentence about the arguments; one that is long may be an id in the wrong place, and is shortened. Those
-// that stand in others come after them.
-std::string withoutIds(std::string strSentence, std::vector<std::string> strArguments)
-{
-    std::sort(strArguments.begin(), strArguments.end(),
-              [](const std::string& strOne, const std::string& strOther) {
-                  return strOne.size() > strOther.size();
-              });
-    for (const std::string& strArgument : strArguments) {
-        const size_t nPosition = strSentence.find(strArgument);
-        if (strArgument.size() >= VEMO_ATOKEN_LENGTH_MIN && nPosition != std::string::npos) {
-            strSentence.replace(nPosition, strArgument.size(), tool::shortened(strArgument));
-        }
-    }
-    return strSentence;
-}
 
 int printText(const std::string& strText)
 {
@@ -51,10 +32,10 @@ Command& Commands::add(const std::string& strName, const std::string& strDescrip
     };
     Command& command =
         m_commands.emplace_back(strName, strDescription, Needs::Root == needs ? runAsRoot : run);
-    // Whoever asks for these two gets them, whatever else is missing.
-    const auto later = [] {};
-    command.flag("-h,--help", later, HELP);
-    command.flag("--version", later, VERSION);
+    // run() looks for these two, ahead of what is missing or excluded.
+    const auto nothing = [] {};
+    command.flag("-h,--help", nothing, HELP);
+    command.flag("--version", nothing, VERSION);
     command.flag("-v,--verbose", m_blVerbose, "show the library's log lines on standard error");
     return command;
 }
@@ -81,40 +62,35 @@ Command& Commands::find(const std::string& strName)
             return command;
         }
     }
-    const char* const szWhat = '-' == strName[0] ? "unknown option" : "unknown command";
-    throw Failure(EXIT_STATUS_USAGE, std::string(szWhat) + " \"" + strName + "\"");
+    const char* const szWhat = '-' == strName[0] ? "unknown option " : "unknown command ";
+    throw Failure(EXIT_STATUS_USAGE, szWhat + quoted(strName));
 }
 
 int Commands::run(int nArguments, char** rgArguments)
 {
-    const std::vector<std::string> strArguments(rgArguments + 1, rgArguments + nArguments);
-    if (strArguments.empty()) {
+    if (nArguments < 2) {
         throw Failure(EXIT_STATUS_USAGE, "say what to do; \"vemo-access-token --help\" lists the commands");
     }
-    if ("-h" == strArguments[0] || "--help" == strArguments[0]) {
+    const std::string strFirst = rgArguments[1];
+    if ("-h" == strFirst || "--help" == strFirst) {
         return printText(help());
     }
-    if ("--version" == strArguments[0]) {
+    if ("--version" == strFirst) {
         return printText(VERSION_TEXT);
     }
-    Command* pCommand = nullptr;
-    try {
-        pCommand = &find(strArguments[0]);
-        pCommand->read(nArguments - 1, rgArguments + 1);
-        if (pCommand->has("--help")) {
-            return printText(pCommand->help());
-        }
-        if (pCommand->has("--version")) {
-            return printText(VERSION_TEXT);
-        }
-        pCommand->take();
-    } catch (const Failure& failure) {
-        throw Failure(failure.status(), withoutIds(failure.what(), strArguments));
+    Command& command = find(strFirst);
+    command.read(nArguments - 1, rgArguments + 1);
+    if (command.has("--help")) {
+        return printText(command.help());
     }
+    if (command.has("--version")) {
+        return printText(VERSION_TEXT);
+    }
+    command.take();
     if (m_blVerbose) {
         showLogLines();
     }
-    const int nStatus = pCommand->run();
+    const int nStatus = command.run();
     try {
         flushResult();
     } catch (const Failure& failure) {

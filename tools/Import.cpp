@@ -58,7 +58,7 @@ void checkRecord(const Json::Value& jToken)
     }
     for (const std::string& strName : jToken.getMemberNames()) {
         if (!VEMO_ACCESS_TOKEN::tokenType().isMember(strName)) {
-            throw tool::BadValue("\"" + strName + "\" is no field of a token");
+            throw tool::BadValue(tool::quoted(strName) + " is no field of a token");
         }
     }
     if (jToken["tid"].asString().size() < VEMO_ATOKEN_LENGTH_MIN) {
@@ -128,7 +128,7 @@ std::vector<Line> readStream(std::istream& stream, const std::string& strFile)
 
 std::string nameOf(const std::string& strFile)
 {
-    return strFile == "-" ? "standard input" : strFile;
+    return strFile == "-" ? "standard input" : tool::shownPath(strFile);
 }
 
 std::vector<Line> readFile(const std::string& strFile)
@@ -138,9 +138,9 @@ std::vector<Line> readFile(const std::string& strFile)
     }
     std::ifstream stream(strFile, std::ios::binary);
     if (!stream.is_open()) {
-        failOnReading(strFile);
+        failOnReading(nameOf(strFile));
     }
-    return readStream(stream, strFile);
+    return readStream(stream, nameOf(strFile));
 }
 
 void importFile(const std::string& strFile)

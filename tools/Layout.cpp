@@ -27,7 +27,7 @@ Layout::Form parseForm(const std::string& strText)
     if (strText == "jsonl") {
         return Layout::Form::JsonLines;
     }
-    throw tool::BadValue("\"" + strText + "\" is no form: table, json or jsonl");
+    throw tool::BadValue(tool::quoted(strText) + " is no form: table, json or jsonl");
 }
 
 std::string timeIn(const Json::Value& jTime, const Layout& layout)
@@ -134,7 +134,7 @@ std::string parseField(const std::string& strText)
 {
     const std::vector<std::string> strNames = fieldNames();
     if (strNames.end() == std::find(strNames.begin(), strNames.end(), strText)) {
-        throw BadValue("\"" + strText + "\" is no field of a token");
+        throw BadValue(quoted(strText) + " is no field of a token");
     }
     return strText;
 }

@@ -10,6 +10,7 @@
 #include <cstring>
 
 #include "Failure.h"
+#include "Masking.h"
 #include "Place.h"
 
 namespace {
@@ -130,7 +131,7 @@ void NewFile::complete()
 
 void NewFile::fail() const
 {
-    throw Failure(EXIT_STATUS_STORE, m_strName + ": " + strerror(errno));
+    throw Failure(EXIT_STATUS_STORE, shownPath(m_strName) + ": " + strerror(errno));
 }
 
 } // namespace tool

@@ -79,24 +79,6 @@ std::string sqlText(const char* szFormat, ...)
     return szText.get();
 }
 
-std::string masked(const std::string& strTid)
-{
-    size_t nCharacters = 0;
-    for (size_t i = 0; i < strTid.size(); ++i) {
-        const bool blContinued = (static_cast<unsigned char>(strTid[i]) & 0xc0) == 0x80; // UTF-8
-        if (!blContinued && ++nCharacters > PREFIX_MIN) {
-            return strTid.substr(0, i);
-        }
-    }
-    return strTid;
-}
-
-std::string shortened(const std::string& strTid)
-{
-    const std::string strMasked = masked(strTid);
-    return strMasked + (strMasked.size() < strTid.size() ? "..." : "");
-}
-
 std::vector<std::string> fieldNames()
 {
     std::string strList;

@@ -17,18 +17,10 @@
 #include <string>
 #include <vector>
 
+#include "Masking.h"
 #include "internal/AccessTokenDbApi.h"
 
 namespace tool {
-
-// What an argument may name a token by, at least.
-const size_t PREFIX_MIN = 8;
-
-// An id's first characters: enough to tell tokens apart, but not to use one.
-std::string masked(const std::string& strTid);
-
-// The same with "..." where more follows.
-std::string shortened(const std::string& strTid);
 
 // A row's columns as texts; nothing where it is NULL.
 typedef std::vector<std::vector<std::optional<std::string>>> Rows;

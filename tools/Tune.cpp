@@ -16,7 +16,7 @@ namespace {
 using tool::Store;
 typedef tool::Table::Kind Kind;
 
-const std::vector<std::string> INDEXED = {"deadline", "bind_sid", "function"};
+const char* const INDEXED[] = {"deadline", "bind_sid", "function"};
 const int MEASUREMENTS = 5;
 
 struct Options {
@@ -57,7 +57,7 @@ std::vector<std::pair<std::string, std::string>> measured(Store& store, bool blW
         {"look for a session's tokens", timeOf(store, "SELECT tid FROM token WHERE bind_sid = '\x01'")},
         {"look for a purpose's tokens", timeOf(store, "SELECT tid FROM token WHERE function = '\x01'")},
         {"journal", store.text("PRAGMA journal_mode")}};
-    for (const std::string& strField : INDEXED) {
+    for (const std::string strField : INDEXED) {
         lines.emplace_back("index token_" + strField, hasIndex(store, strField) ? "yes" : "no");
     }
     if (blWrite) {
@@ -83,7 +83,7 @@ std::vector<std::string> statements(const Options& options)
         strStatements.push_back(std::string("PRAGMA journal_mode = ") + (options.blUndo ? "delete" : "wal"));
     }
     strStatements.push_back("BEGIN IMMEDIATE");
-    for (const std::string& strField : INDEXED) {
+    for (const std::string strField : INDEXED) {
         strStatements.push_back(indexStatement(strField, options.blUndo));
     }
     strStatements.push_back("COMMIT");

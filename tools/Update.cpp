@@ -33,7 +33,7 @@ int64_t parseDeadline(const std::string& strText)
 {
     const int64_t nDeadline = tool::parseTime(strText);
     if (nDeadline < time(nullptr)) {
-        throw tool::BadValue("\"" + strText + "\" has passed; to take the token back, revoke it");
+        throw tool::BadValue(tool::quoted(strText) + " has passed; to take the token back, revoke it");
     }
     return nDeadline;
 }
@@ -80,8 +80,8 @@ void removeMethod(Json::Value& jMethods, const std::string& strApi, const std::s
         }
     }
     if (jKept.size() == jMethods.size()) {
-        throw tool::Failure(tool::EXIT_STATUS_USAGE,
-                            "--remove-allow: the token does not list \"" + strApi + ":" + strMethod + "\"");
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, "--remove-allow: the token does not list " +
+                                                         tool::quoted(strApi + ":" + strMethod));
     }
     jMethods = jKept;
 }
@@ -91,7 +91,7 @@ void removeAllowed(Json::Value& jAllow, const std::vector<tool::Allowance>& allo
     for (const tool::Allowance& allowance : allowances) {
         if (!jAllow.isMember(allowance.strApi)) {
             throw tool::Failure(tool::EXIT_STATUS_USAGE,
-                                "--remove-allow: the token does not list \"" + allowance.strApi + "\"");
+                                "--remove-allow: the token does not list " + tool::quoted(allowance.strApi));
         }
         if (allowance.strMethods.empty()) {
             jAllow.removeMember(allowance.strApi);

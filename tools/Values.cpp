@@ -14,6 +14,7 @@
 #include "AccessTokenDefine.h"
 #include "Failure.h"
 #include "Json.h"
+#include "Masking.h"
 
 namespace {
 
@@ -67,7 +68,7 @@ std::optional<std::pair<std::string, uid_t>> user(Lookup lookup)
 
 [[noreturn]] void failOnDuration(const std::string& strText)
 {
-    throw tool::BadValue("\"" + strText + "\" is no duration such as 90s, 15m, 8h, 2d12h or 1w");
+    throw tool::BadValue(tool::quoted(strText) + " is no duration such as 90s, 15m, 8h, 2d12h or 1w");
 }
 
 } // namespace
@@ -80,7 +81,7 @@ int64_t parseNumber(const std::string& strText, int64_t nMin, int64_t nMax)
     const char* szEnd = strText.data() + strText.size();
     const auto [szRead, error] = std::from_chars(strText.data(), szEnd, nNumber);
     if (std::errc() != error || szRead != szEnd || nNumber < nMin || nNumber > nMax) {
-        throw BadValue("\"" + strText + "\" is no number from " + std::to_string(nMin) + " to " +
+        throw BadValue(quoted(strText) + " is no number from " + std::to_string(nMin) + " to " +
                        std::to_string(nMax));
     }
     return nNumber;
@@ -96,7 +97,7 @@ unsigned int parseUser(const std::string& strName)
     const auto found =
         user([&strName](auto... arguments) { return getpwnam_r(strName.c_str(), arguments...); });
     if (!found) {
-        throw BadValue("there is no user \"" + strName + "\"");
+        throw BadValue("there is no user " + quoted(strName));
     }
     return found->second;
 }
@@ -170,8 +171,8 @@ int64_t parseTime(const std::string& strText)
         }
     }
     throw BadValue(
-        "\"" + strText +
-        "\" is no time such as 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @1798761599");
+        quoted(strText) +
+        " is no time such as 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @1798761599");
 }
 
 std::string countText(uint64_t nCount, const std::string& strWhat)
@@ -205,13 +206,13 @@ Allowance parseAllowance(const std::string& strText)
     const size_t nColon = strText.find(':');
     Allowance allowance{strText.substr(0, nColon), {}};
     if (allowance.strApi.empty()) {
-        throw BadValue("\"" + strText + "\" names no API: write API or API:METHOD,METHOD");
+        throw BadValue(quoted(strText) + " names no API: write API or API:METHOD,METHOD");
     }
     for (size_t nStart = nColon; nStart != std::string::npos;) {
         const size_t nEnd = strText.find(',', nStart + 1);
         const std::string strMethod = strText.substr(nStart + 1, nEnd - nStart - 1);
         if (strMethod.empty()) {
-            throw BadValue("\"" + strText + "\" has an empty method: write API or API:METHOD,METHOD");
+            throw BadValue(quoted(strText) + " has an empty method: write API or API:METHOD,METHOD");
         }
         allowance.strMethods.push_back(strMethod);
         nStart = nEnd;
@@ -251,10 +252,10 @@ Json::Value parseExtra(const std::string& strText)
         file.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
         std::getline(file, strContent, '\0');
     } catch (const std::ios_base::failure&) {
-        throw BadValue(strFile + ": " + strerror(errno));
+        throw BadValue(shownPath(strFile) + ": " + strerror(errno));
     }
     if (!file.is_open()) {
-        throw BadValue(strFile + ": " + strerror(errno));
+        throw BadValue(shownPath(strFile) + ": " + strerror(errno));
     }
     if (!file.eof()) {
         throw BadValue(strFile + " holds a NUL byte");

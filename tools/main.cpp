@@ -34,9 +34,13 @@ void addAll(tool::Commands& commands)
     tool::addTune(commands);
 }
 
-// What no handler catches, since the handler itself got no memory.
+// What no handler catches: there was no memory for the handler, or for the exception itself.
 void endWithoutMemory()
 {
+    if (!std::current_exception()) {
+        tool::complainOfMemory();
+        _exit(tool::EXIT_STATUS_STORE);
+    }
     try {
         std::rethrow_exception(std::current_exception());
     } catch (const std::bad_alloc&) {

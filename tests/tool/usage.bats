@@ -202,6 +202,24 @@ TABLE
     [ "$(tool list --field bind_sid)" = "" ]
 }
 
+# At each limit the program ends in the loader, as that says; for want of memory, as the tool says; or as ever.
+@test "memory that is short from the start is told, and ends in no crash" {
+    local limit statuses=" "
+    ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
+    [[ $(ldd "$TOOL" 2>&1) != *"not a dynamic executable"* ]] || skip "valgrind takes more memory"
+    for limit in $(seq 5000 16 12000); do
+        status=0
+        stderr=$( (ulimit -v "$limit" && exec "$TOOL" generate more) 2>&1) || status=$?
+        [[ $statuses == *" $status "* ]] || statuses+="$status "
+        [ "$status" -ne 4 ] || [ "$stderr" = "vemo-access-token: out of memory" ]
+        [ "$status" -ne 2 ] || [ "$stderr" = 'vemo-access-token: unexpected argument "more"' ]
+    done
+    [[ $statuses =~ ^\ (1\ |127\ )+(4\ 2|2\ 4|2|4)\ $ ]] || {
+        echo "statuses:$statuses"
+        return 1
+    }
+}
+
 @test "names and ids in brackets are names and ids" {
     local one other
     one=$(a_token)
@@ -457,9 +475,31 @@ list --sort $id
 list --limit $id
 list --user $id
 list -o $id
+list --user=$id
+list --uid=$id
+list --field=$id
+list --limit=$id
+list --expiring=$id
+list --sort=$id
+list --sort $id:desc
+list -o$id
+list -vo$id
+list --$id=x
+--$id
 create --uid 0 --function TAG --ttl $id
 create --uid $id --function TAG
+create --uid 0 --function TAG --ttl=$id
+create --uid 0 --function TAG --allow=:$id
+create --uid 0 --function TAG --allow=A:,$id
+create --uid 0 --function TAG --extra @$id
+create --uid 0 --function TAG --extra=@/$id/x
+update TID --deadline=$id
+update TID --deadline @$id
+import $id
+import $DIR/$id
 TABLE
+    run_tool export "$DIR/$id/x"
+    expect 4 "" "vemo-access-token: $DIR/${id:0:8}.../x: No such file or directory"
 }
 
 @test "no id appears on standard error when a long beginning fits several tokens" {
