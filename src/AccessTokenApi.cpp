@@ -59,11 +59,11 @@ int AccessTokenApi::tokenCreateByTid(unsigned int& uid, std::string& strFunction
 {
     Json::Value jParam = jTokenOption;
 
-    VEMO_ATOKEN_CHECK_GOTO(jTokenOption.type() != Json::objectValue && jTokenOption.type() != Json::nullValue,
-                           Error);
     VEMO_ATOKEN_CHECK_GOTO(uid == UID_ERR, Error);
     VEMO_ATOKEN_CHECK_GOTO(strFunction.empty(), Error);
     VEMO_ATOKEN_CHECK_GOTO(strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN, Error);
+    VEMO_ATOKEN_CHECK_GOTO(jTokenOption.type() != Json::objectValue && jTokenOption.type() != Json::nullValue,
+                           Error);
 
     jParam["tid"] = strTidIn;
     jParam["uid"] = uid;

@@ -208,6 +208,22 @@ TEST_F(Creation, CountBeyond64BitsThrowsAndLeavesNothing)
     EXPECT_EQ((Texts{"9223372036854775807"}), query("SELECT count FROM token"));
 }
 
+TEST_F(Creation, LooksAtUidFunctionAndIdBeforeTheOption)
+{
+    m_jOption = json("[]");
+    m_uid = UID_ERR;
+    m_strFunction = "";
+    m_strTid = "short";
+    EXPECT_EQ(-1, createByTid());
+    EXPECT_EQ((Texts{failed(SERVICE, "uid == UID_ERR"), summary()}), takeLines());
+    m_uid = 1026;
+    EXPECT_EQ(-1, createByTid());
+    EXPECT_EQ((Texts{failed(SERVICE, "strFunction.empty()"), summary()}), takeLines());
+    m_strFunction = "VPN";
+    EXPECT_EQ(-1, createByTid());
+    EXPECT_EQ((Texts{failed(SERVICE, "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN"), summary()}), takeLines());
+}
+
 TEST_F(Creation, RefusesOptionThatIsNoObject)
 {
     for (const char* szOption : {"[]", "[{}]", R"("")", R"("text")", "5", "-5", "1.5", "true", "false"}) {
