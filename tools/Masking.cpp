@@ -2,6 +2,16 @@
 
 #include "AccessTokenDefine.h"
 
+namespace {
+
+// The text, unless it is as long as an id.
+std::string unlessId(const std::string& strText)
+{
+    return strText.size() < VEMO_ATOKEN_LENGTH_MIN ? strText : tool::shortened(strText);
+}
+
+} // namespace
+
 namespace tool {
 
 std::string masked(const std::string& strTid)
@@ -20,11 +30,6 @@ std::string shortened(const std::string& strTid)
 {
     const std::string strMasked = masked(strTid);
     return strMasked + (strMasked.size() < strTid.size() ? "..." : "");
-}
-
-std::string unlessId(const std::string& strText)
-{
-    return strText.size() < VEMO_ATOKEN_LENGTH_MIN ? strText : shortened(strText);
 }
 
 std::string quoted(const std::string& strText)

@@ -17,11 +17,8 @@ std::string masked(const std::string& strTid);
 // The same with "..." where more follows.
 std::string shortened(const std::string& strTid);
 
-// For sentences that repeat an argument or a part of one. What is as long as an id may be one in a wrong
-// place, and is shortened.
-std::string unlessId(const std::string& strText);
-
-// The same in quotation marks.
+// In quotation marks, for sentences that repeat an argument or a part of one. What is as long as an id may be
+// one in a wrong place, and is shortened.
 std::string quoted(const std::string& strText);
 
 // The same for the name of a file: each part of the path is shortened that is so long.

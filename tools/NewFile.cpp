@@ -99,7 +99,8 @@ NewFile::NewFile(const std::string& strName) : m_strName(strName), m_temporary(s
     const auto status = statusOf(strName);
     if (status && !S_ISREG(status->st_mode)) {
         throw Failure(EXIT_STATUS_USAGE,
-                      strName + " is no regular file; to write to a pipe, write to standard output");
+                      shownPath(strName) +
+                          " is no regular file; to write to a pipe, write to standard output");
     }
     const int nFile = m_temporary.make();
     m_pStream = 0 > nFile ? nullptr : fdopen(nFile, "w");

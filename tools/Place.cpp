@@ -8,6 +8,7 @@
 
 #include "AccessTokenDefine.h"
 #include "Failure.h"
+#include "Masking.h"
 
 namespace {
 
@@ -16,7 +17,7 @@ const mode_t PARENT_MODE = 0755;
 
 [[noreturn]] void failOn(const std::string& strPath, const std::string& strHint = "")
 {
-    throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno), strHint);
+    throw tool::Failure(tool::EXIT_STATUS_STORE, tool::shownPath(strPath) + ": " + strerror(errno), strHint);
 }
 
 void makeParents(const std::string& strPath)

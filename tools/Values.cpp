@@ -258,7 +258,7 @@ Json::Value parseExtra(const std::string& strText)
         throw BadValue(shownPath(strFile) + ": " + strerror(errno));
     }
     if (!file.eof()) {
-        throw BadValue(strFile + " holds a NUL byte");
+        throw BadValue(shownPath(strFile) + " holds a NUL byte");
     }
     return parseObject(strContent);
 }

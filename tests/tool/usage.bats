@@ -450,6 +450,7 @@ TABLE
 @test "no id appears on standard error when it stands in a wrong place" {
     local id
     id=$(a_token)
+    printf '\0' >"$DIR/$id"
     while read -r arguments; do
         # shellcheck disable=SC2086
         run_tool $arguments
@@ -493,13 +494,19 @@ create --uid 0 --function TAG --allow=:$id
 create --uid 0 --function TAG --allow=A:,$id
 create --uid 0 --function TAG --extra @$id
 create --uid 0 --function TAG --extra=@/$id/x
+create --uid 0 --function TAG --extra @$DIR/$id
 update TID --deadline=$id
 update TID --deadline @$id
 import $id
 import $DIR/$id
 TABLE
     run_tool export "$DIR/$id/x"
-    expect 4 "" "vemo-access-token: $DIR/${id:0:8}.../x: No such file or directory"
+    expect 4 "" "vemo-access-token: $DIR/${id:0:8}.../x: Not a directory"
+    run_tool export "$DIR/x/$id"
+    expect 4 "" "vemo-access-token: $DIR/x/${id:0:8}...: No such file or directory"
+    mkdir -p "$DIR/x/$id"
+    run_tool export "$DIR/x/$id"
+    expect 2 "" "vemo-access-token: $DIR/x/${id:0:8}... is no regular file; to write to a pipe, write to standard output"
 }
 
 @test "no id appears on standard error when a long beginning fits several tokens" {
