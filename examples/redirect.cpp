@@ -1,9 +1,9 @@
 // Lets a program that uses the token library run without root and without the real database: preload
 // this shared object (or link it ahead of the library) and name a directory of your own in
-// VEMO_REDIRECT_DIR. It takes the place of the private directory that holds the database. The
-// effective uid that the process sees and sets is a number kept here, 0 at first, and what belongs to
-// the real user there belongs to root for the process. Without the variable, everything goes through
-// unchanged.
+// VEMO_REDIRECT_DIR. It takes the place of the private directory that holds the database, and a file beside
+// it, whose name ends in ".lock", that of the lock of all programs. The effective uid that the process sees
+// and sets is a number kept here, 0 at first, and what belongs to the real user there belongs to root for the
+// process. Without the variable, everything goes through unchanged.
 
 #include <dlfcn.h>
 #include <fcntl.h>
@@ -19,6 +19,7 @@
 #include <cstring>
 
 #include "AccessTokenDefine.h"
+#include "CallLock.h"
 
 #define REDIRECT_EXPORT __attribute__((visibility("default")))
 
@@ -31,18 +32,32 @@ const char* directory()
     return getenv("VEMO_REDIRECT_DIR");
 }
 
-// A path, led elsewhere if it is the private directory or lies in it. Takes nothing from the heap, like the
-// calls that it serves.
+// Whether a path is another one or lies below it.
+bool isWithin(const char* szPath, const char* szOther, size_t cchOther)
+{
+    return 0 == strncmp(szPath, szOther, cchOther) && (szPath[cchOther] == '\0' || szPath[cchOther] == '/');
+}
+
+size_t privateLength()
+{
+    const char* szDatabase = VEMO_ATOKEN_DB_PATH;
+    return static_cast<size_t>(strrchr(szDatabase, '/') - szDatabase);
+}
+
+// A path, led elsewhere if it is the private directory, lies in it, or is the lock. Takes nothing from the
+// heap, like the calls that it serves.
 class Redirected {
 public:
     explicit Redirected(const char* szPath) : m_szPath(szPath)
     {
-        const char* szDatabase = VEMO_ATOKEN_DB_PATH;
-        const size_t cchPrivate = static_cast<size_t>(strrchr(szDatabase, '/') - szDatabase);
-        const bool blPrivate = 0 == strncmp(szPath, szDatabase, cchPrivate) &&
-                               (szPath[cchPrivate] == '\0' || szPath[cchPrivate] == '/');
-        if (blPrivate && directory()) {
-            snprintf(m_szOwn, sizeof(m_szOwn), "%s%s", directory(), &szPath[cchPrivate]);
+        if (!directory()) {
+            return;
+        }
+        if (isWithin(szPath, VEMO_ATOKEN_DB_PATH, privateLength())) {
+            snprintf(m_szOwn, sizeof(m_szOwn), "%s%s", directory(), &szPath[privateLength()]);
+            m_szPath = m_szOwn;
+        } else if (0 == strcmp(szPath, CallLock::FILE_OF_ALL)) {
+            snprintf(m_szOwn, sizeof(m_szOwn), "%s.lock", directory());
             m_szPath = m_szOwn;
         }
     }
@@ -53,6 +68,55 @@ public:
 private:
     const char* m_szPath;
     char m_szOwn[PATH_MAX];
+};
+
+// The directory above the private one that a walk has reached last: this machine need not have it, so "/" is
+// open in its place.
+int g_nAbove = -1;
+char g_szAbove[sizeof(VEMO_ATOKEN_DB_PATH)];
+
+// A descriptor that was just opened. If it has the number of that directory, that one has been closed.
+int notAbove(int nFile)
+{
+    if (nFile == g_nAbove) {
+        g_nAbove = -1;
+    }
+    return nFile;
+}
+
+// The path of a name in an open directory; the name itself where that is no matter.
+class Joined {
+public:
+    Joined(int nDirectory, const char* szName) : m_szPath(szName)
+    {
+        if (!directory() || AT_FDCWD == nDirectory || szName[0] == '/') {
+            return;
+        }
+        char szLink[32];
+        char szDirectory[PATH_MAX];
+        snprintf(szLink, sizeof(szLink), "/proc/self/fd/%d", nDirectory);
+        const ssize_t cchDirectory = readlink(szLink, szDirectory, sizeof(szDirectory) - 1);
+        szDirectory[cchDirectory < 0 ? 0 : cchDirectory] = '\0';
+        const bool blBelowAbove = nDirectory == g_nAbove;
+        const char* szAbove = blBelowAbove ? g_szAbove : szDirectory;
+        snprintf(m_szJoined, sizeof(m_szJoined), "%s/%s", strcmp(szAbove, "/") ? szAbove : "", szName);
+        if (isPrivate() || isAbove() || blBelowAbove) {
+            m_szPath = m_szJoined;
+        }
+    }
+    Joined(const Joined&) = delete;
+    Joined& operator=(const Joined&) = delete;
+    const char* path() const { return m_szPath; }
+    bool isAbove() const
+    {
+        return m_szJoined[0] && isWithin(VEMO_ATOKEN_DB_PATH, m_szJoined, strlen(m_szJoined)) && !isPrivate();
+    }
+
+private:
+    bool isPrivate() const { return isWithin(m_szJoined, VEMO_ATOKEN_DB_PATH, privateLength()); }
+
+    const char* m_szPath;
+    char m_szJoined[2 * PATH_MAX] = "";
 };
 
 // What a path's status says when the real user is taken for root.
@@ -125,7 +189,44 @@ REDIRECT_EXPORT int open(const char* szPath, int nFlags, ...)
     va_start(args, nFlags);
     const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
     va_end(args);
-    return NEXT(open)(Redirected(szPath).path(), nFlags, mode);
+    return notAbove(NEXT(open)(Redirected(szPath).path(), nFlags, mode));
+}
+
+REDIRECT_EXPORT int openat(int nDirectory, const char* szName, int nFlags, ...)
+{
+    va_list args;
+    va_start(args, nFlags);
+    const mode_t mode = (nFlags & (O_CREAT | O_TMPFILE)) ? va_arg(args, mode_t) : 0;
+    va_end(args);
+    const Joined joined(nDirectory, szName);
+    if (!joined.isAbove()) {
+        return notAbove(NEXT(openat)(nDirectory, Redirected(joined.path()).path(), nFlags, mode));
+    }
+    g_nAbove = NEXT(open)("/", nFlags);
+    snprintf(g_szAbove, sizeof(g_szAbove), "%s", joined.path());
+    return g_nAbove;
+}
+
+REDIRECT_EXPORT int mkdirat(int nDirectory, const char* szName, mode_t mode) noexcept
+{
+    return NEXT(mkdirat)(nDirectory, Redirected(Joined(nDirectory, szName).path()).path(), mode);
+}
+
+REDIRECT_EXPORT int fstatat(int nDirectory, const char* szName, struct stat* pStatus, int nFlags) noexcept
+{
+    const Joined joined(nDirectory, szName);
+    return redirectedStatus(NEXT(fstatat)(nDirectory, Redirected(joined.path()).path(), pStatus, nFlags),
+                            pStatus);
+}
+
+REDIRECT_EXPORT int fstat(int nFile, struct stat* pStatus) noexcept
+{
+    return redirectedStatus(NEXT(fstat)(nFile, pStatus), pStatus);
+}
+
+REDIRECT_EXPORT int fchown(int nFile, uid_t uid, gid_t gid) noexcept
+{
+    return NEXT(fchown)(nFile, directory() && 0 == uid ? getuid() : uid, gid);
 }
 
 REDIRECT_EXPORT int sqlite3_open(const char* szPath, sqlite3** ppDb)

@@ -129,7 +129,7 @@ echo 'extern "C" void syslog(int, const char*, ...) {}' >log.cc
 
 # The headers that most programs begin with, parsed once.
 cp -r "$source/include" headers
-compile=("$compiler" -std=c++17 -Wall -Wextra -Werror -Iheaders -isystem "$json")
+compile=("$compiler" -std=c++17 -Wall -Wextra -Werror -Iheaders "-I$source/examples" -isystem "$json")
 for header in vemo-access-token.h AccessTokenUtil.h; do
     "${compile[@]}" -x c++-header "headers/$header" -o "headers/$header.gch"
 done

@@ -1,18 +1,24 @@
 // What can be wrong with the directory and the file.
 
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstring>
+#include <filesystem>
 
 #include "AccessTokenDefine.h"
+#include "Descriptor.h"
 #include "Examination.h"
 #include "Failure.h"
+#include "Masking.h"
+#include "NewFile.h"
 #include "Place.h"
 #include "Store.h"
 
 namespace {
 
+using tool::Descriptor;
 using tool::Finding;
 using tool::Findings;
 using tool::Store;
@@ -21,14 +27,6 @@ const mode_t PRIVATE_MODE = 0700;
 const mode_t OTHERS_MODE = 0077;
 const mode_t OTHERS_WRITE_MODE = 0022;
 
-void requireCall(int nResult, const std::string& strPath)
-{
-    if (0 != nResult) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno));
-    }
-    Store::settleChange();
-}
-
 std::string octal(mode_t mode)
 {
     char szMode[8];
@@ -36,65 +34,143 @@ std::string octal(mode_t mode)
     return szMode;
 }
 
-// Owner and mode of what should be root's alone.
-void examinePrivacy(const std::string& strPath, const struct stat& status, Findings& findings)
+bool isPrivate(const struct stat& status)
+{
+    return 0 == status.st_uid && !(status.st_mode & OTHERS_MODE);
+}
+
+// Whether others than root can put something else in the place of what stands in a directory.
+bool canOthersWrite(const struct stat& status)
+{
+    return 0 != status.st_uid || (status.st_mode & OTHERS_WRITE_MODE);
+}
+
+// The private directory, if it is reached through directories alone in which only root can replace anything.
+Descriptor openTrustedDirectory()
+{
+    tool::Walk walk(tool::databaseDirectory());
+    while (!walk.isDone()) {
+        if (!walk.step()) {
+            throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(walk.path(), walk.path()).what());
+        }
+        if (!walk.isDone() && canOthersWrite(tool::statusOf(walk.directory()))) {
+            throw tool::Failure(tool::EXIT_STATUS_STORE, "others than root can change " + walk.path());
+        }
+    }
+    Descriptor directory(openat(walk.directory().get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!directory.isOpen()) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, walk.path() + ": " + strerror(errno));
+    }
+    return directory;
+}
+
+// A file of that directory, which must be root's alone by now: nobody can have put a link in its place.
+Descriptor openTrustedFile()
+{
+    const Descriptor directory = openTrustedDirectory();
+    if (!isPrivate(tool::statusOf(directory))) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, tool::databaseDirectory() + " is not root's alone");
+    }
+    Descriptor file = tool::openRegular(directory, tool::databaseName());
+    if (!file.isOpen()) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE,
+                            tool::badPath(VEMO_ATOKEN_DB_PATH, VEMO_ATOKEN_DB_PATH).what());
+    }
+    if (1 != tool::statusOf(file).st_nlink) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, VEMO_ATOKEN_DB_PATH " has several hard links");
+    }
+    return file;
+}
+
+void requireCall(int nResult, const std::string& strPath)
+{
+    if (0 != nResult) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, tool::shownPath(strPath) + ": " + strerror(errno));
+    }
+}
+
+// Makes what open() gives root's alone.
+template <typename Open>
+void makePrivate(const std::string& strPath, const Open& open)
+{
+    const Descriptor file = open();
+    requireCall(fchown(file.get(), 0, static_cast<gid_t>(-1)), strPath);
+    requireCall(fchmod(file.get(), PRIVATE_MODE), strPath);
+    Store::settleChange();
+}
+
+// Owner and mode of what should be root's alone. The repair is for both.
+void examinePrivacy(const std::string& strPath, const struct stat& status,
+                    const std::function<void()>& repair, Findings& findings)
 {
     if (0 != status.st_uid) {
-        findings.push_back(
-            {Finding::Severity::Error, strPath + " belongs to uid " + std::to_string(status.st_uid),
-             "its owner can read and change every token", "chown root " + strPath,
-             [strPath] { requireCall(chown(strPath.c_str(), 0, static_cast<gid_t>(-1)), strPath); }});
+        findings.push_back({Finding::Severity::Error,
+                            strPath + " belongs to uid " + std::to_string(status.st_uid),
+                            "its owner can read and change every token, and may have done so",
+                            "chown root " + strPath + ", and look at the tokens", repair});
     }
     const mode_t mode = status.st_mode & 07777;
     if (mode & OTHERS_MODE) {
         findings.push_back({Finding::Severity::Error, strPath + " has mode " + octal(mode),
                             "others than root can use it, and ids are credentials", "chmod 0700 " + strPath,
-                            [strPath] { requireCall(chmod(strPath.c_str(), PRIVATE_MODE), strPath); }});
+                            repair});
     }
 }
 
-// Whoever can write to a directory above can put another in the place of the private one.
-void examineParents(Findings& findings)
+// What cannot be opened as a directory. Returns whether the database can be looked at all the same.
+bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings)
 {
-    std::string strPath = tool::databaseDirectory();
-    for (size_t nEnd = strPath.rfind('/'); nEnd != 0; nEnd = strPath.rfind('/')) {
-        strPath.resize(nEnd);
-        const auto status = tool::statusOf(strPath);
-        if (status && (0 != status->st_uid || (status->st_mode & OTHERS_WRITE_MODE))) {
-            findings.push_back({Finding::Severity::Warning,
-                                strPath + " belongs to uid " + std::to_string(status->st_uid) +
-                                    " and has mode " + octal(status->st_mode),
-                                "others than root can replace the private directory below it",
-                                "chown root " + strPath + " && chmod go-w " + strPath,
-                                {}});
-        }
+    const std::function<void()> none;
+    switch (errno) {
+    case ENOENT:
+        findings.push_back({Finding::Severity::Error, "there is no directory " + tool::databaseDirectory(),
+                            "no token can be created, and every call fails", "vemo-access-token init",
+                            [] { tool::makeDirectory(); }});
+        return false;
+    case ELOOP:
+        findings.push_back({Finding::Severity::Error, strPath + " is a symbolic link",
+                            "the tokens stand elsewhere, or nowhere",
+                            "find out who made it; move the " +
+                                std::string(blLast ? "database" : "directory") +
+                                " to a directory of that name",
+                            none});
+        return true;
+    case ENOTDIR:
+        findings.push_back({Finding::Severity::Error, strPath + " is no directory",
+                            "the tokens stand elsewhere, or nowhere",
+                            "find out who made it; move the database to a directory of that name", none});
+        return false;
+    default: throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno));
     }
 }
 
 // Returns whether the directory is one.
 bool examineDirectory(Findings& findings)
 {
-    const std::string strPath = tool::databaseDirectory();
-    const auto status = tool::statusOf(strPath);
-    if (!status) {
-        findings.push_back({Finding::Severity::Error, "there is no directory " + strPath,
-                            "no token can be created, and every call fails", "vemo-access-token init",
-                            [] { tool::makeDirectory(); }});
-        return false;
+    tool::Walk walk(tool::databaseDirectory());
+    bool blTrusted = true; // so far
+    while (!walk.isDone()) {
+        if (!walk.step()) {
+            return examineObstacle(walk.path(), walk.isDone(), findings);
+        }
+        const struct stat status = tool::statusOf(walk.directory());
+        if (walk.isDone()) {
+            // What stands in it is looked at when it is root's.
+            const auto repair = [] { makePrivate(tool::databaseDirectory(), openTrustedDirectory); };
+            examinePrivacy(walk.path(), status, blTrusted ? repair : std::function<void()>(), findings);
+        } else if (canOthersWrite(status)) {
+            blTrusted = false;
+            findings.push_back({Finding::Severity::Warning,
+                                walk.path() + " belongs to uid " + std::to_string(status.st_uid) +
+                                    " and has mode " + octal(status.st_mode),
+                                "others than root can replace the private directory below it",
+                                "chown root " + walk.path() + " && chmod go-w " + walk.path(),
+                                {}});
+        }
     }
-    if (!S_ISDIR(status->st_mode)) {
+    if (0 != access(walk.path().c_str(), W_OK)) {
         findings.push_back({Finding::Severity::Error,
-                            strPath + (S_ISLNK(status->st_mode) ? " is a symbolic link" : " is no directory"),
-                            "the tokens stand elsewhere, or nowhere",
-                            "find out who made it; move the database to a directory of that name",
-                            {}});
-        return S_ISLNK(status->st_mode);
-    }
-    examinePrivacy(strPath, *status, findings);
-    examineParents(findings);
-    if (0 != access(strPath.c_str(), W_OK)) {
-        findings.push_back({Finding::Severity::Error,
-                            strPath + " cannot be written to: " + strerror(errno),
+                            walk.path() + " cannot be written to: " + strerror(errno),
                             "no token can be created, changed or granted",
                             "make the file system writable, or the directory",
                             {}});
@@ -111,7 +187,7 @@ bool examineFile(Findings& findings)
         findings.push_back({Finding::Severity::Error, "there is no database " + strPath,
                             "there are no tokens; the first call that needs it makes it",
                             "vemo-access-token init",
-                            [] { Store(Store::Access::Plain, Store::Missing::Make).makeTable(); }});
+                            [] { Store(Store::Access::Locked, Store::Missing::Make).makeTable(); }});
         return false;
     }
     if (!S_ISREG(status->st_mode)) {
@@ -131,7 +207,12 @@ bool examineFile(Findings& findings)
              "find -samefile tells the other names; remove those",
              {}});
     }
-    examinePrivacy(strPath, *status, findings);
+    // Only in a directory that is root's alone is it certain that this is the database: that one is repaired
+    // first.
+    const auto directoryStatus = tool::statusOf(tool::databaseDirectory());
+    const bool blRepairable = 1 == status->st_nlink && directoryStatus && isPrivate(*directoryStatus);
+    const auto repair = [] { makePrivate(VEMO_ATOKEN_DB_PATH, openTrustedFile); };
+    examinePrivacy(strPath, *status, blRepairable ? repair : std::function<void()>(), findings);
     return true;
 }
 
@@ -141,7 +222,7 @@ bool examineForeignJournal(Findings& findings)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH "-wal";
     const size_t READ_VERSION = 19; // where the database says what its readers must know: 2 is this journal
-    const std::string strHeader = tool::firstBytes(VEMO_ATOKEN_DB_PATH, READ_VERSION + 1);
+    const std::string strHeader = tool::firstBytes("", READ_VERSION + 1);
     if (strHeader.size() <= READ_VERSION || strHeader[READ_VERSION] != 1 || !tool::statusOf(strPath)) {
         return true;
     }
@@ -153,13 +234,72 @@ bool examineForeignJournal(Findings& findings)
     return false;
 }
 
+// Returns whether the journals are root's. Whoever opens the database can take what stands in them for its
+// own.
+bool examineJournals(Findings& findings)
+{
+    bool blTrusted = true;
+    for (const std::string strSuffix : tool::JOURNAL_SUFFIXES) {
+        const std::string strPath = VEMO_ATOKEN_DB_PATH + strSuffix;
+        const auto status = tool::statusOf(strPath);
+        if (status && 0 != status->st_uid) {
+            blTrusted = false;
+            findings.push_back({Finding::Severity::Error,
+                                strPath + " belongs to uid " + std::to_string(status->st_uid),
+                                "the next program to open the database may take its contents for changes",
+                                "find out who made it; remove it while no program runs",
+                                {}});
+        }
+    }
+    return blTrusted;
+}
+
+// What an export leaves behind that was cut off by a power cut.
+void examineRemains(Findings& findings)
+{
+    std::error_code error;
+    for (const auto& entry : std::filesystem::directory_iterator(tool::databaseDirectory(), error)) {
+        const std::string strName = entry.path().filename();
+        if (entry.path().extension() == tool::UNFINISHED_SUFFIX) {
+            findings.push_back(
+                {Finding::Severity::Warning,
+                 tool::databaseDirectory() + "/" + tool::shownPath(strName) + " was left behind",
+                 "an export was cut off; the file can hold whole ids", "remove it", [strName] {
+                     const Descriptor directory = openTrustedDirectory();
+                     requireCall(unlinkat(directory.get(), strName.c_str(), 0), strName);
+                     Store::settleChange();
+                 }});
+        }
+    }
+}
+
+// Whoever can open the file of the lock can stop all programs that take it.
+void examineLock(Findings& findings)
+{
+    const std::string strPath = CallLock::FILE_OF_ALL;
+    const auto status = tool::statusOf(strPath);
+    if (status && (!S_ISREG(status->st_mode) || !isPrivate(*status))) {
+        findings.push_back({Finding::Severity::Error,
+                            strPath + " is not root's alone: it belongs to uid " +
+                                std::to_string(status->st_uid) + " and has mode " + octal(status->st_mode),
+                            "others can hold the lock for ever; programs that take it refuse this file",
+                            "remove it while no program that uses tokens runs",
+                            {}});
+    }
+}
+
 } // namespace
 
 namespace tool {
 
 bool examinePlace(Findings& findings)
 {
-    return examineDirectory(findings) && examineFile(findings) && examineForeignJournal(findings);
+    examineLock(findings);
+    if (!examineDirectory(findings)) {
+        return false;
+    }
+    examineRemains(findings);
+    return examineFile(findings) && examineJournals(findings) && examineForeignJournal(findings);
 }
 
 } // namespace tool

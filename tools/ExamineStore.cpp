@@ -25,7 +25,7 @@ const size_t NAMED_MAX = 5; // tokens that a finding names
 // beginning wiped.
 bool isJournalFull()
 {
-    const std::string strStart = tool::firstBytes(VEMO_ATOKEN_DB_PATH "-journal", 1);
+    const std::string strStart = tool::firstBytes("-journal", 1);
     return !strStart.empty() && strStart[0] != '\0';
 }
 
@@ -69,7 +69,7 @@ bool examineTable(Store& store, Findings& findings)
     if (!store.hasTable()) {
         findings.push_back({Finding::Severity::Error, "the database has no table of tokens",
                             "every call fails: the table is made together with the file, and never later",
-                            "vemo-access-token init", [] { Store(Store::Access::Plain).makeTable(); }});
+                            "vemo-access-token init", [] { Store(Store::Access::Locked).makeTable(); }});
         return false;
     }
     std::string strMissing;

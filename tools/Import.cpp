@@ -3,7 +3,6 @@
 #include <cerrno>
 #include <cstring>
 #include <ctime>
-#include <fstream>
 #include <iostream>
 #include <map>
 #include <memory>
@@ -13,6 +12,7 @@
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
+#include "InputFile.h"
 #include "Json.h"
 #include "Store.h"
 #include "Values.h"
@@ -136,11 +136,12 @@ std::vector<Line> readFile(const std::string& strFile)
     if (strFile == "-") {
         return readStream(std::cin, nameOf(strFile));
     }
-    std::ifstream stream(strFile, std::ios::binary);
-    if (!stream.is_open()) {
-        failOnReading(nameOf(strFile));
+    try {
+        tool::InputFile file(strFile);
+        return readStream(file, nameOf(strFile));
+    } catch (const tool::BadValue& bad) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, bad.what());
     }
-    return readStream(stream, nameOf(strFile));
 }
 
 void importFile(const std::string& strFile)

@@ -12,12 +12,12 @@ namespace {
 int init()
 {
     const bool blDirectory = tool::makeDirectory();
-    const bool blFile = !tool::statusOf(VEMO_ATOKEN_DB_PATH);
-    tool::Store store(tool::Store::Access::Plain, tool::Store::Missing::Make);
-    bool blTable = blFile; // made with it
-    if (!store.hasTable()) {
-        store.makeTable();
-        blTable = true;
+    bool blFile = false;
+    bool blTable = false;
+    {
+        tool::Store store(tool::Store::Access::Locked, tool::Store::Missing::Make);
+        blFile = store.hasMadeFile();
+        blTable = store.makeTable() || blFile; // the library makes it with a file that it finds missing
     }
     if (blDirectory || blFile) {
         tool::Store::settleChange();

@@ -1,36 +1,41 @@
 #include "NewFile.h"
 
+#include <fcntl.h>
 #include <signal.h>
-#include <sys/stat.h>
+#include <sys/file.h>
 #include <unistd.h>
 
 #include <atomic>
 #include <cerrno>
-#include <cstdlib>
 #include <cstring>
 
+#include "AccessTokenDefine.h"
+#include "CallLock.h"
 #include "Failure.h"
 #include "Masking.h"
 #include "Place.h"
 
 namespace {
 
+const mode_t FILE_MODE = S_IRUSR | S_IWUSR;
 const int ENDING_SIGNALS[] = {SIGHUP, SIGINT, SIGQUIT, SIGTERM, SIGXFSZ};
 
-std::atomic<const char*> g_szTemporary = nullptr; // that a signal removes
+// What a signal removes: a name in a directory.
+int g_nDirectory = -1;
+std::atomic<const char*> g_szUnfinished = nullptr;
 
-void removeTemporary()
+void removeUnfinished()
 {
-    const char* szTemporary = g_szTemporary.exchange(nullptr);
-    if (szTemporary) {
-        unlink(szTemporary);
+    const char* szUnfinished = g_szUnfinished.exchange(nullptr);
+    if (szUnfinished) {
+        unlinkat(g_nDirectory, szUnfinished, 0);
     }
 }
 
 // Handles a signal once; its second coming does what it does by default.
 void removeAndEnd(int nSignal)
 {
-    removeTemporary();
+    removeUnfinished();
     raise(nSignal);
 }
 
@@ -64,56 +69,107 @@ private:
     sigset_t m_before;
 };
 
+tool::FilePlace placeOf(const std::string& strPath)
+{
+    try {
+        return tool::FilePlace(strPath);
+    } catch (const tool::BadValue& bad) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, bad.what());
+    }
+}
+
+bool isSame(const struct stat& status, const std::string& strPath)
+{
+    struct stat other = {};
+    return 0 == stat(strPath.c_str(), &other) && other.st_dev == status.st_dev &&
+           other.st_ino == status.st_ino;
+}
+
+// Whether a name belongs to the database: it, its journals and the lock, whatever the way to them is called.
+bool isOfDatabase(const tool::FilePlace& place, const struct stat* pStatus)
+{
+    const std::string strDatabase = tool::databaseName();
+    bool blSame = isSame(tool::statusOf(place.directory), tool::databaseDirectory()) &&
+                  0 == place.strName.compare(0, strDatabase.size(), strDatabase);
+    if (pStatus) {
+        blSame = blSame || isSame(*pStatus, VEMO_ATOKEN_DB_PATH) || isSame(*pStatus, CallLock::FILE_OF_ALL);
+        for (const char* szSuffix : tool::JOURNAL_SUFFIXES) {
+            blSame = blSame || isSame(*pStatus, std::string(VEMO_ATOKEN_DB_PATH) + szSuffix);
+        }
+    }
+    return blSame;
+}
+
 } // namespace
 
 namespace tool {
 
-NewFile::TemporaryName::~TemporaryName()
+NewFile::NewFile(const std::string& strPath)
+    : m_strPath(strPath), m_place(placeOf(strPath)), m_strUnfinished(m_place.strName + UNFINISHED_SUFFIX)
 {
-    removeTemporary();
-}
-
-int NewFile::TemporaryName::make()
-{
-    handleSignals();
-    const SignalPause pause;
-    const int nFile = mkstemp(m_strPath.data());
-    if (0 <= nFile) {
-        g_szTemporary = m_strPath.c_str();
+    requirePlace();
+    const UmaskOff umaskOff;
+    Descriptor file(openat(m_place.directory.get(), ".", O_WRONLY | O_TMPFILE | O_CLOEXEC, FILE_MODE));
+    if (!file.isOpen() && (EOPNOTSUPP == errno || EISDIR == errno)) {
+        file = makeNamed();
     }
-    return nFile;
-}
-
-bool NewFile::TemporaryName::become(const std::string& strName)
-{
-    const SignalPause pause;
-    if (0 != rename(m_strPath.c_str(), strName.c_str())) {
-        return false;
-    }
-    g_szTemporary = nullptr;
-    return true;
-}
-
-NewFile::NewFile(const std::string& strName) : m_strName(strName), m_temporary(strName)
-{
-    const auto status = statusOf(strName);
-    if (status && !S_ISREG(status->st_mode)) {
-        throw Failure(EXIT_STATUS_USAGE,
-                      shownPath(strName) +
-                          " is no regular file; to write to a pipe, write to standard output");
-    }
-    const int nFile = m_temporary.make();
-    m_pStream = 0 > nFile ? nullptr : fdopen(nFile, "w");
-    // The umask may have taken bits away.
-    if (!m_pStream || 0 != fchmod(nFile, S_IRUSR | S_IWUSR)) {
+    m_pStream = file.isOpen() ? fdopen(file.get(), "w") : nullptr;
+    if (!m_pStream) {
         fail();
     }
+    file.release();
 }
 
 NewFile::~NewFile()
 {
+    removeUnfinished();
     if (m_pStream) {
         fclose(m_pStream);
+    }
+}
+
+// Fails where no file may be put.
+void NewFile::requirePlace() const
+{
+    struct stat status = {};
+    const bool blThere =
+        0 == fstatat(m_place.directory.get(), m_place.strName.c_str(), &status, AT_SYMLINK_NOFOLLOW);
+    if (!blThere && ENOENT != errno) {
+        fail();
+    }
+    if (isOfDatabase(m_place, blThere ? &status : nullptr)) {
+        throw Failure(EXIT_STATUS_USAGE,
+                      shownPath(m_strPath) + " belongs to the database; choose another name");
+    }
+    if (blThere && !S_ISREG(status.st_mode)) {
+        throw Failure(EXIT_STATUS_USAGE,
+                      shownPath(m_strPath) +
+                          " is no regular file; to write to a pipe, write to standard output");
+    }
+}
+
+// The lock on it tells that it is being written.
+Descriptor NewFile::makeNamed()
+{
+    removeRemains();
+    handleSignals();
+    const SignalPause pause;
+    Descriptor file(openat(m_place.directory.get(), m_strUnfinished.c_str(),
+                           O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, FILE_MODE));
+    if (file.isOpen()) {
+        flock(file.get(), LOCK_EX | LOCK_NB);
+        g_nDirectory = m_place.directory.get();
+        g_szUnfinished = m_strUnfinished.c_str();
+    }
+    return file;
+}
+
+// Removes what an export of this name has left behind that was cut off, but not what one is writing.
+void NewFile::removeRemains()
+{
+    const Descriptor remains = openRegular(m_place.directory, m_strUnfinished);
+    if (remains.isOpen() && 0 == flock(remains.get(), LOCK_EX | LOCK_NB)) {
+        unlinkat(m_place.directory.get(), m_strUnfinished.c_str(), 0);
     }
 }
 
@@ -124,15 +180,54 @@ void NewFile::write(const std::string& strText)
 
 void NewFile::complete()
 {
-    if (0 != fflush(m_pStream) || ferror(m_pStream) || 0 != fsync(fileno(m_pStream)) ||
-        !m_temporary.become(m_strName)) {
+    const bool blWritten = 0 == fflush(m_pStream) && !ferror(m_pStream) && 0 == fsync(fileno(m_pStream));
+    if (!blWritten || !giveName()) {
         fail();
     }
+    const Descriptor directory(openat(m_place.directory.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!directory.isOpen() || 0 != fsync(directory.get())) {
+        throw Failure(EXIT_STATUS_STORE, shownPath(m_strPath) + ": " + strerror(errno),
+                      "the file is there, but a power cut can undo that");
+    }
+}
+
+// A name that is taken already is replaced in one step, for which the file needs another one.
+bool NewFile::giveName()
+{
+    const int nDirectory = m_place.directory.get();
+    const SignalPause pause;
+    if (!g_szUnfinished) {
+        if (link(m_place.strName)) {
+            return true;
+        }
+        if (EEXIST != errno) {
+            return false;
+        }
+        removeRemains();
+        if (!link(m_strUnfinished)) {
+            return false;
+        }
+        g_nDirectory = nDirectory;
+        g_szUnfinished = m_strUnfinished.c_str();
+    }
+    if (0 != renameat(nDirectory, m_strUnfinished.c_str(), nDirectory, m_place.strName.c_str())) {
+        return false;
+    }
+    g_szUnfinished = nullptr;
+    return true;
+}
+
+// Gives a name to a file that has none.
+bool NewFile::link(const std::string& strName)
+{
+    const std::string strFile = "/proc/self/fd/" + std::to_string(fileno(m_pStream));
+    return 0 ==
+           linkat(AT_FDCWD, strFile.c_str(), m_place.directory.get(), strName.c_str(), AT_SYMLINK_FOLLOW);
 }
 
 void NewFile::fail() const
 {
-    throw Failure(EXIT_STATUS_STORE, shownPath(m_strName) + ": " + strerror(errno));
+    throw Failure(EXIT_STATUS_STORE, shownPath(m_strPath) + ": " + strerror(errno));
 }
 
 } // namespace tool

@@ -6,37 +6,40 @@
 #include <cstdio>
 #include <string>
 
+#include "Descriptor.h"
+
 namespace tool {
 
-// All members throw Failure. Only its owner can read the file. A process has one at a time: until it is
-// complete, it is removed with the object, or by a signal that ends the process and can be caught.
+// What stands behind a file's name until it is complete, where it must have one.
+const char* const UNFINISHED_SUFFIX = ".part";
+
+// All members throw Failure. Only its owner can read the file. Until it is complete it has no name, and
+// whatever ends the process ends it, too. On file systems that do not know files without a name it has
+// another one; a signal that can be caught removes that, and so does the next file of this name. A process
+// has one at a time.
 class NewFile {
 public:
-    explicit NewFile(const std::string& strName);
+    explicit NewFile(const std::string& strPath);
     ~NewFile();
     NewFile(const NewFile&) = delete;
     NewFile& operator=(const NewFile&) = delete;
 
     void write(const std::string& strText);
+
+    // Once it returns, a power cut leaves the file.
     void complete();
 
 private:
     [[noreturn]] void fail() const;
+    void requirePlace() const;
+    Descriptor makeNamed();
+    void removeRemains();
+    bool giveName();
+    bool link(const std::string& strName);
 
-    // Its name until it is complete.
-    class TemporaryName {
-    public:
-        explicit TemporaryName(const std::string& strName) : m_strPath(strName + ".XXXXXX") {}
-        ~TemporaryName();
-        int make(); // opens the file
-        bool become(const std::string& strName);
-
-    private:
-        std::string m_strPath;
-    };
-
-    const std::string m_strName;
-    TemporaryName m_temporary;
+    const std::string m_strPath;
+    const FilePlace m_place;
+    const std::string m_strUnfinished; // its name until it is complete
     FILE* m_pStream = nullptr;
 };
 

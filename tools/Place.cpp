@@ -7,6 +7,7 @@
 #include <cstring>
 
 #include "AccessTokenDefine.h"
+#include "Descriptor.h"
 #include "Failure.h"
 #include "Masking.h"
 
@@ -20,19 +21,18 @@ const mode_t PARENT_MODE = 0755;
     throw tool::Failure(tool::EXIT_STATUS_STORE, tool::shownPath(strPath) + ": " + strerror(errno), strHint);
 }
 
-void makeParents(const std::string& strPath)
+// The private directory, which must not be reached through a symbolic link. Makes what is missing of it;
+// blMade tells whether that was the directory itself.
+tool::Descriptor makePrivateDirectory(bool& blMade)
 {
-    for (size_t nEnd = strPath.find('/', 1); nEnd != std::string::npos; nEnd = strPath.find('/', nEnd + 1)) {
-        const std::string strParent = strPath.substr(0, nEnd);
-        if (0 == mkdir(strParent.c_str(), PARENT_MODE)) {
-            // The umask may have taken bits away that are needed.
-            if (0 != chmod(strParent.c_str(), PARENT_MODE)) {
-                failOn(strParent);
-            }
-        } else if (EEXIST != errno) {
-            failOn(strParent);
+    tool::Walk walk(tool::databaseDirectory());
+    while (!walk.isDone()) {
+        if (!walk.step() &&
+            (ENOENT != errno || !walk.make(walk.isDone() ? PRIVATE_MODE : PARENT_MODE, blMade))) {
+            throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(walk.path(), walk.path()).what());
         }
     }
+    return std::move(walk.directory());
 }
 
 } // namespace
@@ -43,6 +43,11 @@ std::string databaseDirectory()
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH;
     return strPath.substr(0, strPath.rfind('/'));
+}
+
+std::string databaseName()
+{
+    return VEMO_ATOKEN_DB_PATH + databaseDirectory().size() + 1;
 }
 
 std::optional<struct stat> statusOf(const std::string& strPath)
@@ -57,14 +62,12 @@ std::optional<struct stat> statusOf(const std::string& strPath)
     return std::nullopt;
 }
 
-std::string firstBytes(const std::string& strPath, size_t cbWanted)
+std::string firstBytes(const std::string& strSuffix, size_t cbWanted)
 {
     std::string strBytes(cbWanted, '\0');
-    const int nFile = open(strPath.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK);
-    const ssize_t cbRead = 0 > nFile ? 0 : read(nFile, strBytes.data(), cbWanted);
-    if (0 <= nFile) {
-        close(nFile);
-    }
+    const Descriptor directory(open(databaseDirectory().c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    const Descriptor file = openRegular(directory, databaseName() + strSuffix);
+    const ssize_t cbRead = file.isOpen() ? read(file.get(), strBytes.data(), cbWanted) : 0;
     strBytes.resize(cbRead > 0 ? static_cast<size_t>(cbRead) : 0);
     return strBytes;
 }
@@ -98,33 +101,30 @@ void requireDatabase(bool blCreate)
 
 bool makeDirectory()
 {
-    const std::string strDirectory = databaseDirectory();
-    if (statusOf(strDirectory)) {
-        return false;
-    }
-    int nMade = mkdir(strDirectory.c_str(), PRIVATE_MODE);
-    if (0 != nMade && ENOENT == errno) {
-        makeParents(strDirectory);
-        nMade = mkdir(strDirectory.c_str(), PRIVATE_MODE);
-    }
-    if (0 != nMade || 0 != chmod(strDirectory.c_str(), PRIVATE_MODE)) {
-        failOn(strDirectory);
-    }
-    return true;
+    bool blMade = false;
+    makePrivateDirectory(blMade);
+    return blMade;
 }
 
-void syncDirectory()
+bool makeFile()
+{
+    bool blDirectory = false;
+    const Descriptor directory = makePrivateDirectory(blDirectory);
+    const UmaskOff umaskOff;
+    const Descriptor file(openat(directory.get(), databaseName().c_str(),
+                                 O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, PRIVATE_MODE));
+    if (!file.isOpen() && EEXIST != errno) {
+        failOn(VEMO_ATOKEN_DB_PATH);
+    }
+    return file.isOpen();
+}
+
+void syncDirectory(const std::string& strMeaning)
 {
     const std::string strDirectory = databaseDirectory();
-    const int nDirectory = open(strDirectory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    const bool blSynced = 0 <= nDirectory && 0 == fsync(nDirectory);
-    const int nError = errno;
-    if (0 <= nDirectory) {
-        close(nDirectory);
-    }
-    if (!blSynced) {
-        errno = nError;
-        failOn(strDirectory, "the change was made, but a power cut can undo it");
+    const Descriptor directory(open(strDirectory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!directory.isOpen() || 0 != fsync(directory.get())) {
+        failOn(strDirectory, strMeaning);
     }
 }
 

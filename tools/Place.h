@@ -10,14 +10,20 @@
 
 namespace tool {
 
-// The private directory that holds the database.
+// The private directory that holds the database, and the name of that in it.
 std::string databaseDirectory();
+std::string databaseName();
+
+// What stands behind that in the names of its journals.
+const char* const JOURNAL_SUFFIXES[] = {"-journal", "-wal", "-shm"};
 
 // What lstat tells of a path; nothing when there is no such file. Throws Failure.
 std::optional<struct stat> statusOf(const std::string& strPath);
 
-// The first bytes of a file, as many as there are; none where it cannot be read.
-std::string firstBytes(const std::string& strPath, size_t cbWanted);
+// The first bytes of the database, or of the journal with this suffix, as many as there are; none where it
+// cannot be read or is no regular file. Those of the database not while this process has it open: its locks
+// would be lost.
+std::string firstBytes(const std::string& strSuffix, size_t cbWanted);
 
 // Fails, with the reason, unless the database can be opened, or made if blCreate.
 void requireDatabase(bool blCreate);
@@ -26,8 +32,11 @@ void requireDatabase(bool blCreate);
 // made.
 bool makeDirectory();
 
-// Waits until the disk has the directory as it is now, after a change. Fails, and says what that means.
-void syncDirectory();
+// Makes the file of the database, empty, where it is missing. Returns whether it was made.
+bool makeFile();
+
+// Waits until the disk has the directory as it is now. Fails, and says what that means.
+void syncDirectory(const std::string& strMeaning);
 
 // What commands that need root say to others; fails for them.
 void requireRoot();

@@ -2,9 +2,12 @@
 
 #include <unistd.h>
 
+#include <algorithm>
+#include <functional>
 #include <memory>
 #include <set>
 
+#include "Aftermath.h"
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
@@ -41,24 +44,74 @@ std::vector<std::string> readAll(const std::vector<std::string>& strArguments)
     return strTids;
 }
 
-int revokeNamed(const RevokeOptions& options)
+// Deletes the tokens again that find() finds in the store, for as long as calls can write them back.
+template <typename Find>
+void revokeAgain(Find find)
 {
-    const std::vector<std::string> strNamed = readAll(options.strTids);
-    tool::Store store(options.blDryRun ? tool::Store::Access::Read : tool::Store::Access::Write);
-    std::set<std::string> strTids; // two arguments can name the same token
-    for (const std::string& strName : strNamed) {
+    const auto restore = [&find]() -> uint64_t {
+        const std::vector<std::string> strTids = find(tool::Store(tool::Store::Access::Glance));
+        if (strTids.empty()) {
+            return 0;
+        }
+        tool::Store store(tool::Store::Access::Write);
+        uint64_t nRevoked = 0;
+        for (const std::string& strTid : strTids) {
+            nRevoked += store.removeTid(strTid);
+        }
+        store.commit();
+        return nRevoked;
+    };
+    tool::outlastCalls(restore, "a token came back", "revoked");
+}
+
+// The ids of the tokens that the names stand for; two can name the same.
+std::set<std::string> tidsOf(tool::Store& store, const std::vector<std::string>& strNames)
+{
+    std::set<std::string> strTids;
+    for (const std::string& strName : strNames) {
         const auto jToken = store.findByPrefix(strName);
         if (jToken) {
             strTids.insert((*jToken)["tid"].asString());
         }
     }
-    if (!options.blDryRun) {
-        for (const std::string& strTid : strTids) {
-            store.removeTid(strTid);
-        }
-        store.commit();
+    return strTids;
+}
+
+size_t countNamed(const std::vector<std::string>& strNames)
+{
+    tool::Store store(tool::Store::Access::Read);
+    return tidsOf(store, strNames).size();
+}
+
+std::set<std::string> removeNamed(const std::vector<std::string>& strNames)
+{
+    tool::Store store(tool::Store::Access::Write);
+    const std::set<std::string> strTids = tidsOf(store, strNames);
+    for (const std::string& strTid : strTids) {
+        store.removeTid(strTid);
     }
-    report(strTids.size(), "revoked", options.blDryRun);
+    store.commit();
+    return strTids;
+}
+
+int revokeNamed(const RevokeOptions& options)
+{
+    const std::vector<std::string> strNames = readAll(options.strTids);
+    if (options.blDryRun) {
+        report(countNamed(strNames), "revoked", true);
+        return tool::EXIT_STATUS_DONE;
+    }
+    const std::set<std::string> strTids = removeNamed(strNames);
+    revokeAgain([&strTids](tool::Store&& store) {
+        std::vector<std::string> strBack;
+        for (const std::string& strTid : strTids) {
+            if (store.find(strTid)) {
+                strBack.push_back(strTid);
+            }
+        }
+        return strBack;
+    });
+    report(strTids.size(), "revoked", false);
     return tool::EXIT_STATUS_DONE;
 }
 
@@ -79,6 +132,27 @@ bool isWanted(const Json::Value& jFilter)
     return 0 == nTokens || tool::confirm("Revoke " + tool::countText(nTokens, "token") + "?");
 }
 
+// Hashes of the ids of tokens: a million ids themselves would take much memory. That a new token has the hash
+// of one of them has a chance of one in 10^13 then.
+typedef std::vector<size_t> Hashes;
+
+size_t hashOf(const std::string& strTid)
+{
+    return std::hash<std::string>()(strTid);
+}
+
+// Returns those of the tokens that it has deleted, in ascending order.
+Hashes removeMany(const Json::Value& jFilter)
+{
+    tool::Store store(tool::Store::Access::Write);
+    Hashes hashes;
+    store.eachTid(jFilter, [&hashes](const std::string& strTid) { hashes.push_back(hashOf(strTid)); });
+    store.remove(jFilter);
+    store.commit();
+    std::sort(hashes.begin(), hashes.end());
+    return hashes;
+}
+
 int revokeMany(const RevokeOptions& options)
 {
     const Json::Value jFilter = options.selection.filter();
@@ -90,10 +164,17 @@ int revokeMany(const RevokeOptions& options)
         report(0, "revoked", false);
         return tool::EXIT_STATUS_DONE;
     }
-    tool::Store store(tool::Store::Access::Write);
-    const uint64_t nRevoked = store.remove(jFilter);
-    store.commit();
-    report(nRevoked, "revoked", false);
+    const Hashes revoked = removeMany(jFilter);
+    revokeAgain([&](tool::Store&& store) {
+        std::vector<std::string> strBack;
+        store.eachTid(jFilter, [&](const std::string& strTid) {
+            if (std::binary_search(revoked.begin(), revoked.end(), hashOf(strTid))) {
+                strBack.push_back(strTid);
+            }
+        });
+        return strBack;
+    });
+    report(revoked.size(), "revoked", false);
     return tool::EXIT_STATUS_DONE;
 }
 
@@ -112,17 +193,23 @@ int revoke(const RevokeOptions& options)
     return options.strTids.empty() ? revokeMany(options) : revokeNamed(options);
 }
 
+uint64_t expired()
+{
+    tool::Store store(tool::Store::Access::Read);
+    return store.number(std::string("SELECT count(*) FROM token WHERE ") + tool::SQL_EXPIRED);
+}
+
+uint64_t removeExpired()
+{
+    tool::Store store(tool::Store::Access::Write);
+    const uint64_t nTokens = store.purge();
+    store.commit();
+    return nTokens;
+}
+
 int purge(const PurgeOptions& options)
 {
-    tool::Store store(options.blDryRun ? tool::Store::Access::Read : tool::Store::Access::Write);
-    uint64_t nTokens = 0;
-    if (options.blDryRun) {
-        nTokens = store.number(std::string("SELECT count(*) FROM token WHERE ") + tool::SQL_EXPIRED);
-    } else {
-        nTokens = store.purge();
-        store.commit();
-    }
-    report(nTokens, "purged", options.blDryRun);
+    report(options.blDryRun ? expired() : removeExpired(), "purged", options.blDryRun);
     return tool::EXIT_STATUS_DONE;
 }
 

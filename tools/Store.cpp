@@ -8,26 +8,25 @@
 #include <cstring>
 #include <memory>
 #include <new>
+#include <system_error>
 
 #include "Failure.h"
 #include "Place.h"
+#include "Processes.h"
 
 namespace {
 
-// What a query gives, and whether there was memory for it.
+// Who takes the rows of a query, and whether there was memory for that.
 struct Result {
-    tool::Rows& rows;
+    const std::function<void(int, char**)> take;
     bool blMemory = true;
 };
 
-int appendRow(void* pResult, int nColumns, char** rgValue, char**)
+int takeRow(void* pResult, int nColumns, char** rgValue, char**)
 {
     Result& result = *static_cast<Result*>(pResult);
     try {
-        result.rows.emplace_back();
-        for (int i = 0; i < nColumns; ++i) {
-            result.rows.back().push_back(rgValue[i] ? std::optional<std::string>(rgValue[i]) : std::nullopt);
-        }
+        result.take(nColumns, rgValue);
         return 0;
     } catch (const std::bad_alloc&) {
         result.blMemory = false; // the caller is a C function
@@ -59,6 +58,27 @@ std::pair<std::string, std::string> explained(const std::string& strErr)
 }
 
 bool g_blChanged = false; // what stays when the process fails now
+
+// As long as the library waits for the database.
+const std::chrono::seconds LOCK_WAIT(5);
+
+[[noreturn]] void failOnLock(int nError)
+{
+    const std::string strFile = CallLock::FILE_OF_ALL;
+    switch (nError) {
+    case ETIMEDOUT:
+        throw tool::LockedFailure(tool::EXIT_STATUS_STORE,
+                                  strFile + " stayed locked by " + tool::lockHolders(strFile) +
+                                      " for 5 seconds",
+                                  g_blChanged ? "" : "nothing was changed");
+    case EPERM:
+    case ELOOP:
+        throw tool::Failure(tool::EXIT_STATUS_STORE,
+                            strFile + " is not root's alone, and others could hold the lock for ever",
+                            "remove it while no program that uses tokens runs");
+    default: throw tool::Failure(tool::EXIT_STATUS_STORE, strFile + ": " + strerror(nError));
+    }
+}
 
 } // namespace
 
@@ -96,16 +116,23 @@ std::vector<std::string> fieldNames()
 Store::Store(Access access, Missing missing) : m_access(access)
 {
     requireDatabase(Missing::Make == missing);
+    if (Access::Locked == access || Access::Write == access) {
+        lock();
+    }
+    if (Missing::Make == missing && !statusOf(VEMO_ATOKEN_DB_PATH)) {
+        m_blMadeFile = makeFile();
+    }
     errno = 0;
     if (0 > m_db.initDb()) {
         const std::string strReason = errno ? std::string(": ") + strerror(errno) : "";
         throw Failure(EXIT_STATUS_STORE, std::string(VEMO_ATOKEN_DB_PATH) + " cannot be opened" + strReason);
     }
     switch (access) {
-    case Access::Plain: break;
+    case Access::Locked: break;
+    case Access::Glance: beginReading(); break;
     case Access::Read:
-        query("BEGIN");
-        query("SELECT count(*) FROM sqlite_schema"); // takes the lock
+        beginReading();
+        syncDirectory("a power cut can undo what others changed last");
         break;
     case Access::Write:
         // A database without anything is one that another program is just making, or was kept from making:
@@ -121,10 +148,25 @@ Store::Store(Access access, Missing missing) : m_access(access)
     }
 }
 
+void Store::beginReading()
+{
+    query("BEGIN");
+    query("SELECT count(*) FROM sqlite_schema"); // takes the lock
+}
+
+void Store::lock()
+{
+    try {
+        m_lock.emplace(CallLock::FILE_OF_ALL, LOCK_WAIT);
+    } catch (const std::system_error& error) {
+        failOnLock(error.code().value());
+    }
+}
+
 void Store::settleChange()
 {
     g_blChanged = true;
-    syncDirectory();
+    syncDirectory("the change was made, but a power cut can undo it");
 }
 
 bool Store::hasChanged()
@@ -136,7 +178,7 @@ void Store::fail(const std::string& strErr)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH " ";
     if (contains(strErr, "database is locked")) {
-        const bool blNothing = Access::Read != m_access && !g_blChanged;
+        const bool blNothing = Access::Glance != m_access && Access::Read != m_access && !g_blChanged;
         throw LockedFailure(EXIT_STATUS_STORE, strPath + "stayed locked by another process for 5 seconds",
                             blNothing ? "nothing was changed" : "");
     }
@@ -176,7 +218,10 @@ void Store::commit()
     m_blCommitting = false;
     if (blChanged) {
         settleChange();
+    } else {
+        syncDirectory("a power cut can undo what others changed last");
     }
+    m_lock.reset();
 }
 
 Json::Value Store::tokens(const Json::Value& jFilter)
@@ -270,11 +315,11 @@ uint64_t Store::remove(const Json::Value& jFilter)
     return static_cast<uint64_t>(nRemoved);
 }
 
-void Store::removeTid(const std::string& strTid)
+uint64_t Store::removeTid(const std::string& strTid)
 {
     Json::Value jFilter;
     jFilter["tid"] = strTid;
-    remove(jFilter);
+    return remove(jFilter);
 }
 
 uint64_t Store::purge()
@@ -288,10 +333,22 @@ bool Store::hasTable()
     return 0 != number("SELECT count(*) FROM sqlite_schema WHERE type = 'table' AND name = 'token'");
 }
 
-void Store::makeTable()
+bool Store::makeTable()
 {
-    require(m_db.createTable());
-    settleChange();
+    if (hasTable()) {
+        return false;
+    }
+    query("PRAGMA auto_vacuum = FULL"); // as the library has it; within a transaction it does nothing
+    query("BEGIN IMMEDIATE");
+    const bool blMade = !hasTable();
+    if (blMade) {
+        require(m_db.createTable());
+    }
+    query("COMMIT");
+    if (blMade) {
+        settleChange();
+    }
+    return blMade;
 }
 
 Rows Store::query(const std::string& strSql)
@@ -306,8 +363,31 @@ Rows Store::query(const std::string& strSql)
 
 std::string Store::queryAsFarAsItGoes(const std::string& strSql, Rows& rows)
 {
-    Result result = {rows};
-    const int nResult = m_db.runSqlEx(strSql, appendRow, &result);
+    return runEach(strSql, [&rows](int nColumns, char** rgValue) {
+        rows.emplace_back();
+        for (int i = 0; i < nColumns; ++i) {
+            rows.back().push_back(rgValue[i] ? std::optional<std::string>(rgValue[i]) : std::nullopt);
+        }
+    });
+}
+
+void Store::eachTid(const Json::Value& jFilter, const std::function<void(const std::string&)>& take)
+{
+    Json::Value jFilterCopy = jFilter;
+    std::string strWhere;
+    require(m_db.SqlWhereFromJson(jFilterCopy, strWhere, true));
+    const std::string strErr =
+        runEach("SELECT tid FROM token" + (strWhere.empty() ? "" : " WHERE" + strWhere),
+                [&take](int, char** rgValue) { take(rgValue[0] ? rgValue[0] : ""); });
+    if (!strErr.empty()) {
+        fail(strErr);
+    }
+}
+
+std::string Store::runEach(const std::string& strSql, const std::function<void(int, char**)>& take)
+{
+    Result result = {take};
+    const int nResult = m_db.runSqlEx(strSql, takeRow, &result);
     if (!result.blMemory) {
         throw std::bad_alloc();
     }

@@ -12,11 +12,13 @@
 #include <json/value.h>
 
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <set>
 #include <string>
 #include <vector>
 
+#include "CallLock.h"
 #include "Masking.h"
 #include "internal/AccessTokenDbApi.h"
 
@@ -38,9 +40,10 @@ extern const char* const SQL_EXPIRED;
 class Store {
 public:
     enum class Access {
-        Plain, // no transaction
-        Read,  // nothing changes meanwhile
-        Write, // nobody else writes meanwhile
+        Glance, // nothing changes meanwhile
+        Read,   // the same, and what is seen outlasts a power cut
+        Locked, // no transaction, but the lock that programs take for a call
+        Write,  // nobody else writes meanwhile; with that lock
     };
 
     // What to do where there is no database.
@@ -48,7 +51,11 @@ public:
 
     explicit Store(Access access, Missing missing = Missing::Fail);
 
-    // Waits, for 5 s at most, until the change can be written. It outlasts a power cut.
+    // Whether the file was missing, and was made.
+    bool hasMadeFile() const { return m_blMadeFile; }
+
+    // Waits, for 5 s at most, until the change can be written. It outlasts a power cut. Others can change
+    // tokens from then on.
     void commit();
 
     // The tokens whose fields equal the filter's.
@@ -72,20 +79,23 @@ public:
     // they could not be read.
     void update(const std::string& strTid, const Json::Value& jChange);
 
-    // How many tokens there are whose fields equal the filter's.
+    // How many tokens there are whose fields equal the filter's; and their ids, one after the other.
     uint64_t count(const Json::Value& jFilter);
+    void eachTid(const Json::Value& jFilter, const std::function<void(const std::string&)>& take);
 
     // Deletes the tokens whose fields equal the filter's, all of them for an empty one. Returns how
     // many there were.
     uint64_t remove(const Json::Value& jFilter);
-    void removeTid(const std::string& strTid);
+    uint64_t removeTid(const std::string& strTid);
 
     // Deletes the expired tokens, as the library does. Returns how many there were.
     uint64_t purge();
 
-    // Whether there is a table of tokens; makes it. To be made without a transaction.
+    // Whether there is a table of tokens.
     bool hasTable();
-    void makeTable();
+
+    // Makes the table where it is missing, and returns whether it was. Without a transaction.
+    bool makeTable();
 
     // Any other statement.
     Rows query(const std::string& strSql);
@@ -106,12 +116,17 @@ public:
     static bool hasChanged();
 
 private:
+    void beginReading();
+    void lock();
     [[noreturn]] void fail(const std::string& strErr);
     void require(int nResult);
+    std::string runEach(const std::string& strSql, const std::function<void(int, char**)>& take);
     bool holdsNull();
     std::string equation(std::string strName, Json::Value jValue);
 
     const Access m_access;
+    std::optional<CallLock> m_lock;
+    bool m_blMadeFile = false;
     bool m_blCommitting = false;
     AccessTokenDbApi m_db;
 };

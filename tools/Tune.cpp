@@ -129,7 +129,7 @@ int tune(const Options& options)
     if (options.blDryRun) {
         return tell(options);
     }
-    Store store(Store::Access::Plain);
+    Store store(Store::Access::Locked);
     const auto before = measured(store, true);
     execute(store, options);
     const auto after = measured(store, true);

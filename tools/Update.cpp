@@ -4,6 +4,7 @@
 #include <ctime>
 #include <memory>
 
+#include "Aftermath.h"
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
@@ -144,23 +145,82 @@ Json::Value changeOf(const Json::Value& jToken, const Options& options)
     return jChange;
 }
 
+// Whether one number of uses is more than another. Negative ones are without a limit.
+bool isMore(int64_t nCount, int64_t nOther)
+{
+    return nOther >= 0 && (nCount < 0 || nCount > nOther);
+}
+
+// Whether a record is one from before the change: a call that had read it has written it back, with a use
+// less. It cannot be told from one whose uses were raised here, and spent since.
+bool isUndone(const Json::Value& jNow, const Json::Value& jBefore, const Json::Value& jChange)
+{
+    for (const std::string& strName : jChange.getMemberNames()) {
+        const Json::Value& jSet = jChange[strName];
+        if (strName != "count" ? jNow[strName] != jSet && jNow[strName] == jBefore[strName]
+                               : isMore(jNow[strName].asInt64(), jSet.asInt64())) {
+            return true;
+        }
+    }
+    return false;
+}
+
+// Makes the change of a token again, for as long as calls can write it back as it was.
+void updateAgain(const Json::Value& jBefore, const Json::Value& jChange)
+{
+    const std::string strTid = jBefore["tid"].asString();
+    std::optional<Json::Value> jNow;
+    const auto isNeeded = [&](auto&& store) {
+        jNow = store.find(strTid);
+        return jNow && isUndone(*jNow, jBefore, jChange);
+    };
+    const auto restore = [&]() -> uint64_t {
+        if (!isNeeded(tool::Store(tool::Store::Access::Glance))) {
+            return 0;
+        }
+        tool::Store store(tool::Store::Access::Write);
+        const bool blNeeded = isNeeded(store);
+        if (blNeeded) {
+            store.update(strTid, jChange);
+        }
+        store.commit();
+        return blNeeded;
+    };
+    tool::outlastCalls(restore, "the token was written back as it had been", "updated");
+    if (!jNow) {
+        tool::complain("the token is gone: a call has spent its last use meanwhile, or deleted it");
+    } else if (jChange.isMember("count") && (*jNow)["count"] != jChange["count"]) {
+        tool::complain(tool::countText((*jNow)["count"].asUInt64(), "use") +
+                       " left: calls have spent some meanwhile, or written back an old number");
+    }
+}
+
+// Returns the token as it was.
+Json::Value updateToken(const std::string& strTid, const Options& options, Json::Value& jChange)
+{
+    tool::Store store(tool::Store::Access::Write);
+    const std::optional<Json::Value> jToken = store.findByPrefix(strTid);
+    if (!jToken) {
+        store.commit();
+        throw tool::noSuchToken();
+    }
+    jChange = changeOf(*jToken, options);
+    store.update((*jToken)["tid"].asString(), jChange);
+    store.commit();
+    return *jToken;
+}
+
 int update(const Options& options)
 {
     if (options.empty()) {
         throw tool::Failure(tool::EXIT_STATUS_USAGE,
                             "say what to change; \"update --help\" lists the fields");
     }
-    const std::string strTid = tool::readTid("TID", options.strTid);
-    tool::Store store(tool::Store::Access::Write);
-    const std::optional<Json::Value> jToken = store.findByPrefix(strTid);
-    if (!jToken) {
-        throw tool::noSuchToken();
-    }
-    const Json::Value jChange = changeOf(*jToken, options);
-    store.update((*jToken)["tid"].asString(), jChange);
-    store.commit();
+    Json::Value jChange;
+    const Json::Value jToken = updateToken(tool::readTid("TID", options.strTid), options, jChange);
+    updateAgain(jToken, jChange);
     tool::print("1 token updated\n");
-    if (jChange.get("deadline", (*jToken)["deadline"]).asInt64() < time(nullptr)) {
+    if (jChange.get("deadline", jToken["deadline"]).asInt64() < time(nullptr)) {
         tool::complain(
             "the token has expired; the next call of a program purges it, unless --ttl or --deadline "
             "give it time");

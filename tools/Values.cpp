@@ -8,11 +8,11 @@
 #include <charconv>
 #include <cstring>
 #include <ctime>
-#include <fstream>
 #include <map>
 
 #include "AccessTokenDefine.h"
 #include "Failure.h"
+#include "InputFile.h"
 #include "Json.h"
 #include "Masking.h"
 
@@ -246,15 +246,11 @@ Json::Value parseExtra(const std::string& strText)
     if (strFile.empty()) {
         throw BadValue("\"@\" names no file");
     }
-    std::ifstream file(strFile, std::ios::binary);
+    InputFile file(strFile);
     std::string strContent;
     try {
-        file.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
         std::getline(file, strContent, '\0');
     } catch (const std::ios_base::failure&) {
-        throw BadValue(shownPath(strFile) + ": " + strerror(errno));
-    }
-    if (!file.is_open()) {
         throw BadValue(shownPath(strFile) + ": " + strerror(errno));
     }
     if (!file.eof()) {

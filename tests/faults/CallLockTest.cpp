@@ -205,28 +205,52 @@ TEST_F(SerialisingLock, OnTheDatabaseTakesItsLocksAway)
     ASSERT_EQ(0, db.initDb());
     ASSERT_EQ(0, db.runSqlEx("BEGIN IMMEDIATE", nullptr, nullptr));
     EXPECT_TRUE(isLockedBySqlite(m_calls.database()));
+    ASSERT_EQ(0, chmod(m_calls.database().c_str(), 0600)); // the lock refuses what is open to others
     {
         const CallLock lock(m_calls.database().c_str());
     }
     EXPECT_FALSE(isLockedBySqlite(m_calls.database()));
 }
 
-// The administrator's tool takes part when it runs below flock(1) with the same file.
-TEST_F(SerialisingLock, KeepsTheToolBelowFlockWaiting)
+// What others could open, they could hold for ever.
+TEST_F(SerialisingLock, RefusesAFileThatIsNotItsOwnersAlone)
 {
-    const char* szTool = getenv("VEMO_TEST_TOOL");
-    if (!szTool) {
-        GTEST_SKIP() << "VEMO_TEST_TOOL does not name the tool";
+    const auto refusal = [this] {
+        try {
+            const CallLock lock(m_strFile.c_str());
+            return 0;
+        } catch (const std::system_error& error) {
+            return error.code().value();
+        }
+    };
+    EXPECT_EQ(0, refusal());
+    for (const mode_t mode : {0644, 0620, 0604, 0601}) {
+        ASSERT_EQ(0, chmod(m_strFile.c_str(), mode));
+        EXPECT_EQ(EPERM, refusal());
     }
-    const int STATUS_HELD = 75;
-    const std::string strCommand = m_strFile + " " + szTool + " create --uid 0 --function tool >/dev/null";
-    m_calls.prepare({});
-    {
-        const CallLock lock(m_strFile.c_str());
-        const int nStatus = system(("flock -n -E 75 " + strCommand).c_str());
-        EXPECT_EQ(STATUS_HELD, WEXITSTATUS(nStatus));
-        EXPECT_EQ(Tokens(), m_calls.tokens());
+    ASSERT_EQ(0, chmod(m_strFile.c_str(), 0700));
+    EXPECT_EQ(0, refusal());
+    if (0 == getuid() && 0 == chown(m_strFile.c_str(), 1, 1)) {
+        EXPECT_EQ(EPERM, refusal());
     }
-    EXPECT_EQ(0, system(("flock " + strCommand).c_str()));
-    EXPECT_EQ((Tokens{{"new", 1}}), m_calls.tokens());
+    ASSERT_EQ(0, unlink(m_strFile.c_str()));
+    ASSERT_EQ(0, mkfifo(m_strFile.c_str(), 0600));
+    EXPECT_EQ(EPERM, refusal());
+}
+
+TEST_F(SerialisingLock, WaitsNoLongerThanIsAsked)
+{
+    const auto wait = [this](std::chrono::milliseconds time) {
+        try {
+            const CallLock second(m_strFile.c_str(), time);
+            return 0;
+        } catch (const std::system_error& error) {
+            return error.code().value();
+        }
+    };
+    std::optional<CallLock> lock(std::in_place, m_strFile.c_str());
+    EXPECT_EQ(ETIMEDOUT, wait(std::chrono::milliseconds(0)));
+    EXPECT_EQ(ETIMEDOUT, wait(std::chrono::milliseconds(30)));
+    lock.reset();
+    EXPECT_EQ(0, wait(std::chrono::milliseconds(0)));
 }

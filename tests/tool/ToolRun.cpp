@@ -1,5 +1,6 @@
 #include "ToolRun.h"
 
+#include <dirent.h>
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <pwd.h>
@@ -14,6 +15,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <filesystem>
 
 #include "Heap.h"
@@ -163,6 +165,13 @@ extern "C" int fsync(int nFile)
 extern "C" int fdatasync(int nFile)
 {
     return syncIfTool(__NR_fdatasync, nFile);
+}
+
+// The processes of the machine are others in each run.
+extern "C" DIR* opendir(const char* szPath)
+{
+    static const auto next = reinterpret_cast<decltype(&::opendir)>(dlsym(RTLD_NEXT, "opendir"));
+    return g_blTool && 0 == strcmp(szPath, "/proc/") ? nullptr : next(szPath);
 }
 
 // Each command begins by asking who runs it. Stands in front of the redirection's.

@@ -296,7 +296,7 @@ TABLE
     mv "$VEMO_REDIRECT_DIR" "$DIR/away"
     echo "no directory" >"$VEMO_REDIRECT_DIR"
     all_fail "$REAL_DB: Not a directory" "$(some_commands)"
-    all_fail "$REAL_DB: Not a directory" init
+    all_fail "${REAL_DB%/*}: Not a directory" init
     run_shortly doctor
     [ "$status" -eq 5 ]
     [ "${lines[0]}" = "error: ${REAL_DB%/*} is no directory" ]

@@ -149,12 +149,12 @@ no findings"
 @test "owners other than root are replaced" {
     [ "$(id -u)" -eq 0 ] || skip "only root can give files away"
     a_row aaaaaaaa
-    local meaning="its owner can read and change every token"
+    local meaning="its owner can read and change every token, and may have done so"
     chown 4000000000 "$DB"
-    expect_finding error "$REAL_DB belongs to uid 4000000000" "$meaning" "chown root $REAL_DB"
+    expect_finding error "$REAL_DB belongs to uid 4000000000" "$meaning" "chown root $REAL_DB, and look at the tokens"
     expect_repair "$REAL_DB belongs to uid 4000000000" "$meaning"
     chown 4000000000:1 "$VEMO_REDIRECT_DIR"
-    expect_finding error "$DIRECTORY belongs to uid 4000000000" "$meaning" "chown root $DIRECTORY"
+    expect_finding error "$DIRECTORY belongs to uid 4000000000" "$meaning" "chown root $DIRECTORY, and look at the tokens"
     expect_repair "$DIRECTORY belongs to uid 4000000000" "$meaning"
     [ "$(stat -c '%u %g' "$VEMO_REDIRECT_DIR")" = "0 1" ]
 }

@@ -66,6 +66,7 @@ old
 file
 filler
 session
+session.lock
 4" "vemo-access-token: disk/file: No space left on device
 vemo-access-token: cannot write the result: No space left on device"
 }

@@ -74,7 +74,7 @@ made the table of tokens"
 @test "init says what stands in its way, and leaves that" {
     echo text >"$VEMO_REDIRECT_DIR"
     run_tool init
-    expect 4 "" "vemo-access-token: $REAL_DB: Not a directory"
+    expect 4 "" "vemo-access-token: ${REAL_DB%/*}: Not a directory"
     [ "$(cat "$VEMO_REDIRECT_DIR")" = text ]
     rm "$VEMO_REDIRECT_DIR"
 

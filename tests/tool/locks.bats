@@ -222,7 +222,9 @@ TABLE
     local arguments i=0 pids=()
     while IFS='|' read -r _ _ arguments; do
         {
-            [[ $arguments != second\ * ]] || export VEMO_REDIRECT_DIR=$DIR/second
+            # By names of their own, so that none waits for another, but each for the database.
+            ln -s "$([[ $arguments == second\ * ]] && echo second || echo session)" "$DIR/store$i"
+            [ "$arguments" = init ] || export VEMO_REDIRECT_DIR=$DIR/store$i
             # shellcheck disable=SC2086
             "$TOOL" ${arguments#second } >"$DIR/out$i" 2>"$DIR/err$i" || echo $? >"$DIR/status$i"
         } 3>&- &
@@ -341,4 +343,121 @@ TABLE
     done
     [ "$(sort "$DIR"/out[1-4] | uniq -c | xargs)" = "3 0 tokens revoked 1 1 token revoked" ]
     [ "$(sort "$DIR"/out[5-8])" = "$(sql "SELECT tid FROM token" | sort)" ]
+}
+
+# calling: a program that has read the tokens, opens no transaction and takes no lock. It does what
+# stream 7 says, and ends with it.
+calling()
+{
+    lock ".timeout 5000
+CREATE TEMP TABLE read AS SELECT * FROM token;"
+}
+
+# until_sql NUMBER STATEMENT: waits until it gives that
+until_sql()
+{
+    until [ "$(sqlite3 -cmd ".timeout 5000" "$DB" "$2")" = "$1" ]; do :; done
+}
+
+@test "what a call writes back is revoked again" {
+    local id
+    id=$(a_token)
+    a_token >/dev/null
+    local arguments
+    for arguments in "revoke $id" "revoke --uid 0 --yes"; do
+        sql "DELETE FROM token WHERE tid <> '$id'"
+        calling
+        # shellcheck disable=SC2086 # several arguments
+        "$TOOL" $arguments >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
+        until_sql 0 "SELECT count(*) FROM token"
+        echo "INSERT INTO token SELECT * FROM read;" >&7
+        unlock
+        wait $!
+        [ "$(cat "$DIR/out")" = "1 token revoked" ]
+        diff "$DIR/err" - <<< "vemo-access-token: a token came back 1 time, by calls that do not take the lock, and was revoked again"
+        [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
+        tool create --uid 0 --function VPN --tid "$id" >/dev/null
+    done
+}
+
+@test "what a call writes back is updated again" {
+    local id change
+    for change in "--remove-allow Api:put|webapi_allow = '{\"Api\":{\"method\":[\"get\"]}}'" "--uses 2|count = 2" \
+        "--bind-sid new|bind_sid = 'new'"; do
+        id=$(a_token --allow Api:get,put --uses 9)
+        calling
+        # shellcheck disable=SC2086
+        "$TOOL" update "$id" ${change%%|*} >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
+        until_sql 1 "SELECT count(*) FROM token WHERE ${change#*|}"
+        echo "UPDATE read SET count = count - 1; REPLACE INTO token SELECT * FROM read;" >&7
+        unlock
+        wait $!
+        [ "$(cat "$DIR/out")" = "1 token updated" ]
+        diff "$DIR/err" - <<< "vemo-access-token: the token was written back as it had been 1 time, by calls that do not take the lock, and was updated again"
+        [ "$(sql "SELECT count(*) FROM token WHERE ${change#*|}")" -eq 1 ]
+        sql "DELETE FROM token"
+    done
+}
+
+@test "programs that may still write back are named, and so is who holds the lock" {
+    local first second i pids=()
+    first=$(a_token --uses 5)
+    second=$(a_token --uses 5)
+    tool export "$DIR/other" 2>/dev/null
+    install -m 0600 /dev/null "$DIR/links.lock"
+    flock "$DIR/links.lock" sleep 60 3>&- &
+    local locker=$!
+    calling
+    "$TOOL" revoke "$first" >"$DIR/out1" 2>"$DIR/err1" 3>&- 7>&- 8<&- &
+    pids+=($!)
+    "$TOOL" update "$second" --uses 3 >"$DIR/out2" 2>"$DIR/err2" 3>&- 7>&- 8<&- &
+    pids+=($!)
+    ln -s session "$DIR/links"
+    i=3
+    while read -r arguments; do
+        # shellcheck disable=SC2086
+        VEMO_REDIRECT_DIR=$DIR/links "$TOOL" $arguments >"$DIR/out$i" 2>&1 3>&- 7>&- 8<&- &
+        pids+=($!)
+        i=$((i + 1))
+    done <<TABLE
+create --uid 0 --function VPN
+grant $second Api
+update $second --uses 2
+revoke $second
+purge
+import $DIR/other
+tune
+TABLE
+    until_sql 3 "SELECT group_concat(count) FROM token"
+    for i in "${pids[@]}"; do
+        wait "$i" || true
+    done
+    pkill -P "$locker"
+    kill "$locker" 2>/dev/null || true
+    wait "$locker" || true
+    local open
+    open="vemo-access-token: sqlite3 (process $HOLDER) had the database open all the time: what it read before can still be written back; look again when it has ended"
+    unlock
+    [ "$(cat "$DIR/out1" "$DIR/err1")" = "1 token revoked
+$open" ]
+    [ "$(cat "$DIR/out2" "$DIR/err2")" = "1 token updated
+$open" ]
+    for ((i = 3; i < 10; ++i)); do
+        diff "$DIR/out$i" - <<<"vemo-access-token: /run/vemo-access-token.lock stayed locked by flock (process $locker) for 5 seconds; nothing was changed"
+    done
+    [ "$(sql "SELECT tid || count FROM token")" = "${second}3" ]
+}
+
+@test "a lock that others could hold is refused, and found" {
+    a_token >/dev/null
+    chmod 0644 "$VEMO_REDIRECT_DIR.lock"
+    run_tool purge
+    expect 4 "" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
+    run_tool doctor
+    expect 5 "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0644
+    meaning: others can hold the lock for ever; programs that take it refuse this file
+    remedy: remove it while no program that uses tokens runs"
+    rm "$VEMO_REDIRECT_DIR.lock"
+    run_tool purge
+    expect 0 "0 tokens purged"
 }

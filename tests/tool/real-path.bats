@@ -103,17 +103,17 @@ made the table of tokens"
     inside chmod 0755 "$SESSION"
     inside chmod 0640 "$REAL_DB"
     local private="others than root can use it, and ids are credentials"
-    local owned="its owner can read and change every token"
+    local owned="its owner can read and change every token, and may have done so"
     run_inside doctor
     expect 5 "error: $SESSION belongs to uid 65534
     meaning: $owned
-    remedy: chown root $SESSION
+    remedy: chown root $SESSION, and look at the tokens
 error: $SESSION has mode 0755
     meaning: $private
     remedy: chmod 0700 $SESSION
 error: $REAL_DB belongs to uid 65534
     meaning: $owned
-    remedy: chown root $REAL_DB
+    remedy: chown root $REAL_DB, and look at the tokens
 error: $REAL_DB has mode 0640
     meaning: $private
     remedy: chmod 0700 $REAL_DB"
@@ -137,14 +137,45 @@ no findings"
     inside chown 65534 /usr/vemo/etc
     inside chmod 0775 /usr/vemo/etc/private
     run_inside doctor --repair
-    expect 5 "warning: /usr/vemo/etc/private belongs to uid 0 and has mode 0775
+    expect 5 "warning: /usr/vemo/etc belongs to uid 65534 and has mode 0755
     meaning: others than root can replace the private directory below it
-    remedy: chown root /usr/vemo/etc/private && chmod go-w /usr/vemo/etc/private
-warning: /usr/vemo/etc belongs to uid 65534 and has mode 0755
+    remedy: chown root /usr/vemo/etc && chmod go-w /usr/vemo/etc
+warning: /usr/vemo/etc/private belongs to uid 0 and has mode 0775
     meaning: others than root can replace the private directory below it
-    remedy: chown root /usr/vemo/etc && chmod go-w /usr/vemo/etc"
+    remedy: chown root /usr/vemo/etc/private && chmod go-w /usr/vemo/etc/private"
     [ "$(inside stat -c '%u %a' /usr/vemo/etc /usr/vemo/etc/private)" = "65534 755
 0 775" ]
+}
+
+@test "a repair gives root nothing but the database, whatever others put in its place" {
+    run_inside init
+    inside sh -c 'echo secret >/usr/vemo/secret; chown 1:1 /usr/vemo/secret; chmod 0604 /usr/vemo/secret'
+    # Below a directory of theirs, the private one can be another's.
+    inside chown 65534 /usr/vemo/etc/private "$SESSION"
+    run_inside doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$(inside stat -c %u "$SESSION")" -eq 65534 ]
+    inside chown 0 /usr/vemo/etc/private
+
+    # The database can have become another name of any file: before it is looked at, or right after that.
+    inside sh -c "rm $REAL_DB; ln /usr/vemo/secret $REAL_DB"
+    run_inside doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$(inside stat -c '%u %a' /usr/vemo/secret)" = "1 604" ]
+    inside rm "$REAL_DB"
+    run_inside init
+    local round swap='import ctypes, sys
+rename = ctypes.CDLL(None).renameat2
+while 0 == rename(-100, sys.argv[1].encode(), -100, sys.argv[2].encode(), 2): # exchanges the two
+    pass'
+    for round in {1..10}; do
+        inside sh -c "ln -sf /usr/vemo/secret $SESSION/link; chown 65534 $SESSION $REAL_DB"
+        inside setpriv --reuid 65534 --clear-groups python3 -c "$swap" "$REAL_DB" "$SESSION/link" 3>&- &
+        run_inside doctor --repair
+        wait $! || true
+        [ "$(inside stat -c '%u %a' /usr/vemo/secret)" = "1 604" ]
+        inside sh -c "[ ! -L $REAL_DB ] || mv -T $SESSION/link $REAL_DB"
+    done
 }
 
 @test "another effective uid than 0 is not enough, even for root" {

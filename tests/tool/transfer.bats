@@ -155,12 +155,43 @@ awkward_rows()
         run_tool export "$file"
         expect 2 "" "vemo-access-token: $file is no regular file; to write to a pipe, write to standard output"
     done
+    mkdir there
+    ln -s there here
+    run_tool export here/file
+    expect 4 "" "vemo-access-token: here is a symbolic link; name the place that it leads to"
+    [ -z "$(ls -A there)" ]
     run_tool export nowhere/file
     expect 4 "" "vemo-access-token: nowhere/file: No such file or directory"
     run_tool export "$DB/file"
     expect 4 "" "vemo-access-token: $DB/file: Not a directory"
     [ "$(ls -A out)" = "" ]
     [ ! -e nowhere ]
+}
+
+@test "an export never takes the place of the database, of what belongs to it, or of the lock" {
+    a_row A
+    ln "$DB" "$DIR/linked"
+    touch "$DB-wal"
+    cp "$DB" "$DIR/before"
+    local file
+    for file in "$REAL_DB" "$DB" "$DB-journal" "$DB-wal" "$DB-shm" "$DIR/linked" "$VEMO_REDIRECT_DIR.lock"; do
+        run_tool export "$file"
+        expect 2 "" "vemo-access-token: $file belongs to the database; choose another name"
+    done
+    cmp "$DB" "$DIR/before"
+    [ "$(ls "$VEMO_REDIRECT_DIR")" = "${DB##*/}
+${DB##*/}-wal" ]
+}
+
+@test "what others linked into a directory of theirs is not imported" {
+    mkdir -m 0777 "$DIR/theirs"
+    a_line A >"$DIR/secret"
+    tool init
+    ln "$DIR/secret" "$DIR/theirs/file"
+    run_tool import "$DIR/theirs/file"
+    expect 2 "" "vemo-access-token: $DIR/theirs/file has other names besides, and others can change its directory; copy it to a place of yours"
+    run_tool import "$DIR/secret"
+    expect 0 "1 token imported"
 }
 
 @test "an empty name is no file" {
@@ -430,15 +461,20 @@ TABLE
     ln -s loop loop
     mkdir directory
     local file reason
+    mkfifo fifo
+    ln -s directory link
+    : >directory/file
     while IFS='|' read -r file reason; do
         run_tool import "$file"
-        expect 2 "" "vemo-access-token: $file: $reason"
-    done <<'TABLE'
-nowhere|No such file or directory
-nowhere/file|No such file or directory
-directory|Is a directory
-loop|Too many levels of symbolic links
-/proc/self/mem|Input/output error
+        expect 2 "" "vemo-access-token: $reason"
+    done <<TABLE
+nowhere|nowhere: No such file or directory
+nowhere/file|nowhere/file: No such file or directory
+directory|directory: Is a directory
+fifo|fifo is no regular file
+loop|loop is a symbolic link; name the place that it leads to
+link/file|link is a symbolic link; name the place that it leads to
+/proc/$$/mem|/proc/$$/mem: Input/output error
 TABLE
     run_tool import
     expect 2 "" "vemo-access-token: FILE is required"

@@ -1,0 +1,169 @@
+#include "Descriptor.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+#include "Masking.h"
+
+namespace {
+
+const int DIRECTORY_FLAGS = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
+const mode_t OTHERS_WRITE_MODE = 0022;
+
+// ENOTDIR is what the kernel says of a symbolic link, too.
+int errorOf(const tool::Descriptor& directory, const std::string& strName)
+{
+    const int nError = errno;
+    struct stat status = {};
+    const bool blLink = ENOTDIR == nError &&
+                        0 == fstatat(directory.get(), strName.c_str(), &status, AT_SYMLINK_NOFOLLOW) &&
+                        S_ISLNK(status.st_mode);
+    return blLink ? ELOOP : nError;
+}
+
+bool canOthersWrite(const struct stat& directory)
+{
+    return (0 != directory.st_uid && geteuid() != directory.st_uid) ||
+           (directory.st_mode & OTHERS_WRITE_MODE);
+}
+
+} // namespace
+
+namespace tool {
+
+Descriptor::~Descriptor()
+{
+    if (isOpen()) {
+        close(m_nFile);
+    }
+}
+
+Descriptor& Descriptor::operator=(Descriptor&& other) noexcept
+{
+    if (this != &other) {
+        if (isOpen()) {
+            close(m_nFile);
+        }
+        m_nFile = other.release();
+    }
+    return *this;
+}
+
+int Descriptor::release()
+{
+    const int nFile = m_nFile;
+    m_nFile = -1;
+    return nFile;
+}
+
+Walk::Walk(const std::string& strPath)
+    : m_strWhole(strPath),
+      m_strPath(strPath.substr(0, 1) == "/" ? "/" : "."),
+      m_directory(open(m_strPath.c_str(), DIRECTORY_FLAGS))
+{
+    m_nError = errno;
+    m_nNext = m_strWhole.find_first_not_of('/');
+}
+
+bool Walk::step()
+{
+    if (!m_directory.isOpen()) {
+        errno = m_nError;
+        return false;
+    }
+    const size_t nEnd = m_strWhole.find('/', m_nNext);
+    m_strName = m_strWhole.substr(m_nNext, nEnd - m_nNext);
+    m_strPath = m_strWhole.substr(0, nEnd);
+    m_nNext = m_strWhole.find_first_not_of('/', nEnd);
+    return openNamed();
+}
+
+bool Walk::make(mode_t mode, bool& blMade)
+{
+    const UmaskOff umaskOff;
+    blMade = 0 == mkdirat(m_directory.get(), m_strName.c_str(), mode);
+    return (blMade || EEXIST == errno) && openNamed();
+}
+
+bool Walk::openNamed()
+{
+    Descriptor next(openat(m_directory.get(), m_strName.c_str(), DIRECTORY_FLAGS));
+    if (!next.isOpen()) {
+        errno = errorOf(m_directory, m_strName);
+        return false;
+    }
+    m_directory = std::move(next);
+    return true;
+}
+
+BadValue badPath(const std::string& strPath, const std::string& strReached)
+{
+    switch (errno) {
+    case ELOOP:
+        return BadValue(shownPath(strReached) + " is a symbolic link; name the place that it leads to");
+    case EINVAL: return BadValue(shownPath(strPath) + " is no regular file");
+    default: return BadValue(shownPath(strPath) + ": " + strerror(errno));
+    }
+}
+
+FilePlace::FilePlace(const std::string& strPath)
+{
+    const size_t nSlash = strPath.rfind('/');
+    const size_t nName = std::string::npos == nSlash ? 0 : nSlash + 1;
+    Walk walk(strPath.substr(0, nName));
+    while (!walk.isDone()) {
+        if (!walk.step()) {
+            throw badPath(strPath, walk.path());
+        }
+    }
+    directory = std::move(walk.directory());
+    strName = strPath.substr(nName);
+}
+
+Descriptor openRegular(const Descriptor& directory, const std::string& strName)
+{
+    const auto isRegular = [](const struct stat& status) { return S_ISREG(status.st_mode); };
+    struct stat status = {};
+    if (0 != fstatat(directory.get(), strName.c_str(), &status, AT_SYMLINK_NOFOLLOW)) {
+        return Descriptor();
+    }
+    if (!isRegular(status)) {
+        errno = S_ISLNK(status.st_mode) ? ELOOP : S_ISDIR(status.st_mode) ? EISDIR : EINVAL;
+        return Descriptor();
+    }
+    // It can have become another thing since.
+    Descriptor file(openat(directory.get(), strName.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+    if (file.isOpen() && !isRegular(statusOf(file))) {
+        errno = EINVAL;
+        return Descriptor();
+    }
+    return file;
+}
+
+Descriptor openToRead(const std::string& strPath)
+{
+    const FilePlace place(strPath);
+    Descriptor file = openRegular(place.directory, place.strName);
+    if (!file.isOpen()) {
+        throw badPath(strPath, strPath);
+    }
+    if (statusOf(file).st_nlink > 1 && canOthersWrite(statusOf(place.directory))) {
+        throw BadValue(shownPath(strPath) + " has other names besides, and others can change its directory; "
+                                            "copy it to a place of yours");
+    }
+    return file;
+}
+
+struct stat statusOf(const Descriptor& file)
+{
+    struct stat status = {};
+    if (0 != fstat(file.get(), &status)) {
+        throw Failure(EXIT_STATUS_STORE, std::string("fstat: ") + strerror(errno));
+    }
+    return status;
+}
+
+} // namespace tool

@@ -1,0 +1,104 @@
+// Files and directories by descriptors: what was looked at is what is worked on, whatever others rename or
+// link meanwhile.
+
+#ifndef TOOLS_DESCRIPTOR_H
+#define TOOLS_DESCRIPTOR_H
+
+#include <sys/stat.h>
+
+#include <string>
+
+#include "Failure.h"
+
+namespace tool {
+
+// Closes what it has opened.
+class Descriptor {
+public:
+    explicit Descriptor(int nFile = -1) : m_nFile(nFile) {}
+    ~Descriptor();
+    Descriptor(Descriptor&& other) noexcept : m_nFile(other.release()) {}
+    Descriptor& operator=(Descriptor&& other) noexcept;
+
+    bool isOpen() const { return 0 <= m_nFile; }
+    int get() const { return m_nFile; }
+    int release(); // hands it on
+
+private:
+    int m_nFile;
+};
+
+// While it lives, files and directories get the mode that they are made with.
+class UmaskOff {
+public:
+    UmaskOff() : m_before(umask(0)) {}
+    ~UmaskOff() { umask(m_before); }
+    UmaskOff(const UmaskOff&) = delete;
+    UmaskOff& operator=(const UmaskOff&) = delete;
+
+private:
+    const mode_t m_before;
+};
+
+// A way down a path, from "/" or the current directory. Each directory is opened in the one above it, and
+// none through a symbolic link.
+class Walk {
+public:
+    explicit Walk(const std::string& strPath);
+
+    // Whether all directories of the path are open.
+    bool isDone() const { return m_directory.isOpen() && std::string::npos == m_nNext; }
+
+    // Opens the next one. Returns false, with errno set, where that is not possible: ENOENT there is none,
+    // ELOOP it is a symbolic link, ENOTDIR it is something else.
+    bool step();
+
+    // Makes the one that a step found missing, with this mode whatever the umask, and opens it. Returns
+    // false, with errno set, where that is not possible. blMade tells whether it was not another process that
+    // made it.
+    bool make(mode_t mode, bool& blMade);
+
+    // The last one that was opened or, when a step failed, that was not.
+    const std::string& path() const { return m_strPath; }
+
+    // The last one that was opened, to be worked in and looked at, no more.
+    Descriptor& directory() { return m_directory; }
+
+private:
+    bool openNamed();
+
+    const std::string m_strWhole;
+    size_t m_nNext = 0; // where the next name begins; npos behind the last
+    std::string m_strPath;
+    std::string m_strName; // of the directory that path() ends with
+    Descriptor m_directory;
+    int m_nError = 0; // why that could not be opened
+};
+
+// What is said of a path when errno tells why it, or the directory of it that a walk reached, cannot be
+// opened.
+BadValue badPath(const std::string& strPath, const std::string& strReached);
+
+// The place of a file: its directory, to be worked in, and its name there. Throws BadValue, which names the
+// path.
+struct FilePlace {
+    explicit FilePlace(const std::string& strPath);
+
+    Descriptor directory;
+    std::string strName;
+};
+
+// Opens a file of a directory for reading, without waiting, if it is a regular one. Returns none, with errno
+// set, where it is not: EINVAL for what is no regular file. Nothing else is opened.
+Descriptor openRegular(const Descriptor& directory, const std::string& strName);
+
+// The same by its path, for data of the caller's. Throws BadValue, which names the path; also of a file with
+// several names in a directory of others, who can have put another's secret there.
+Descriptor openToRead(const std::string& strPath);
+
+// What fstat tells. Throws Failure.
+struct stat statusOf(const Descriptor& file);
+
+} // namespace tool
+
+#endif

@@ -1,0 +1,135 @@
+#include "Processes.h"
+
+#include <dirent.h>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+#include <unistd.h>
+
+#include <climits>
+#include <cstring>
+#include <fstream>
+#include <memory>
+#include <set>
+#include <sstream>
+
+#include "AccessTokenDefine.h"
+#include "Place.h"
+
+namespace {
+
+const char* const PROC = "/proc/";
+
+std::string processText(const std::string& strPid)
+{
+    std::string strName;
+    std::getline(std::ifstream(PROC + strPid + "/comm"), strName);
+    return (strName.empty() ? "a program" : strName) + " (process " + strPid + ")";
+}
+
+std::string processesText(const std::set<std::string>& strPids)
+{
+    std::string strText;
+    for (const std::string& strPid : strPids) {
+        strText += (strText.empty() ? "" : ", ") + processText(strPid);
+    }
+    return strText;
+}
+
+// A file as /proc/locks names it: the numbers of its device, and its own.
+std::string lockName(const struct stat& status)
+{
+    char szName[64];
+    snprintf(szName, sizeof(szName), "%02x:%02x:%ju", major(status.st_dev), minor(status.st_dev),
+             uintmax_t{status.st_ino});
+    return szName;
+}
+
+bool isNumber(const std::string& strText)
+{
+    return strText.find_first_not_of("0123456789") == std::string::npos;
+}
+
+// The names in a directory; none where it cannot be read, because its process has ended, say.
+std::vector<std::string> namesIn(const std::string& strDirectory)
+{
+    std::vector<std::string> strNames;
+    const std::unique_ptr<DIR, int (*)(DIR*)> pDirectory(opendir(strDirectory.c_str()), closedir);
+    for (const struct dirent* pEntry = nullptr; pDirectory && (pEntry = readdir(pDirectory.get()));) {
+        strNames.emplace_back(pEntry->d_name);
+    }
+    return strNames;
+}
+
+// What a symbolic link holds; "" where it cannot be read.
+std::string linkOf(const std::string& strPath)
+{
+    char szLink[PATH_MAX];
+    const ssize_t cchLink = readlink(strPath.c_str(), szLink, sizeof(szLink));
+    return std::string(szLink, cchLink > 0 ? static_cast<size_t>(cchLink) : 0);
+}
+
+bool endsWith(const std::string& strText, const std::string& strEnd)
+{
+    return strText.size() >= strEnd.size() &&
+           0 == strText.compare(strText.size() - strEnd.size(), strEnd.size(), strEnd);
+}
+
+} // namespace
+
+namespace tool {
+
+std::string lockHolders(const std::string& strFile)
+{
+    std::set<std::string> strPids;
+    struct stat status = {};
+    std::ifstream locks(std::string(PROC) + "locks");
+    const bool blFound = 0 == stat(strFile.c_str(), &status);
+    for (std::string strLine; blFound && std::getline(locks, strLine);) {
+        std::istringstream words(strLine);
+        std::string strNumber, strKind, strStrength, strType, strPid, strName;
+        words >> strNumber >> strKind >> strStrength >> strType >> strPid >> strName; // who waits has "->"
+        if (strKind == "FLOCK" && strName == lockName(status) && isNumber(strPid) && strPid != "0") {
+            strPids.insert(strPid);
+        }
+    }
+    return strPids.empty() ? "another process" : processesText(strPids);
+}
+
+std::vector<std::string> databaseDescriptors()
+{
+    std::vector<std::string> strDescriptors;
+    for (const std::string& strPid : namesIn(PROC)) {
+        if (!isNumber(strPid) || strPid == std::to_string(getpid())) {
+            continue;
+        }
+        const std::string strDirectory = PROC + strPid + "/fd/";
+        for (const std::string& strDescriptor : namesIn(strDirectory)) {
+            if (isOfDatabase(strDirectory + strDescriptor)) {
+                strDescriptors.push_back(strDirectory + strDescriptor);
+            }
+        }
+    }
+    return strDescriptors;
+}
+
+bool isOfDatabase(const std::string& strDescriptor)
+{
+    // By its name first: to look at what stands on a network can take for ever.
+    struct stat status = {};
+    struct stat database = {};
+    return endsWith(linkOf(strDescriptor), "/" + databaseName()) &&
+           0 == stat(VEMO_ATOKEN_DB_PATH, &database) && 0 == stat(strDescriptor.c_str(), &status) &&
+           status.st_dev == database.st_dev && status.st_ino == database.st_ino;
+}
+
+std::string ownersText(const std::vector<std::string>& strDescriptors)
+{
+    std::set<std::string> strPids;
+    for (const std::string& strDescriptor : strDescriptors) {
+        const size_t nPid = strlen(PROC);
+        strPids.insert(strDescriptor.substr(nPid, strDescriptor.find('/', nPid) - nPid));
+    }
+    return processesText(strPids);
+}
+
+} // namespace tool
