@@ -9,13 +9,6 @@
 
 namespace {
 
-// Some user databases answer so for "no such uid", instead of success without an entry. The other
-// answers that the manual allows for it (EBADF, EPERM) are more often real failures.
-bool isNotFound(int nError)
-{
-    return ENOENT == nError || ESRCH == nError;
-}
-
 int fail(int nError)
 {
     errno = nError;
@@ -38,11 +31,8 @@ int VEMOUserGetByUID(uid_t uid, VEMOUser** ppUser)
         }
         nError = getpwuid_r(uid, &entry, rgBuffer.get(), cbBuffer, &pEntry);
     }
-    if (0 != nError && !isNotFound(nError)) {
-        return fail(nError);
-    }
     if (!pEntry) {
-        return 0;
+        return fail(0 == nError ? ENOENT : nError);
     }
 
     // The name stands behind its record, in one piece of memory.

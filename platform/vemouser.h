@@ -9,9 +9,9 @@ struct VEMOUser {
     char* szName;
 };
 
-// Looks up the user of a uid. *ppUser must be null; it receives a new record, to be released with
-// VEMOUserFree, or stays null when there is no such user.
-// Returns 0 in both cases, or -1 with errno set when the user database could not be read.
+// Looks up the user of a uid. *ppUser receives a new record, to be released with VEMOUserFree.
+// Returns 0; or -1 with errno set, and *ppUser as it was. errno is the error of getpwuid_r; where that
+// tells no error, and finds no user either, it is ENOENT.
 // Threads: may run in several threads at once.
 int VEMOUserGetByUID(uid_t uid, VEMOUser** ppUser);
 

@@ -60,7 +60,7 @@ int VemoAccessTokenGrant(std::string& strTid, const char* szWebapiName, const ch
     const int nLookup = VEMOUserGetByUID(static_cast<uid_t>(jToken["uid"].asInt64()), &pUser);
     const std::unique_ptr<VEMOUser, UserDeleter> pOwner(pUser);
     VEMO_ATOKEN_CHECK_RETURN_AS(0 > nLookup, "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)", -1);
-    VEMO_ATOKEN_CHECK_RETURN(!pUser, -1);
+    VEMO_ATOKEN_CHECK_RETURN(!pUser, -1); // a platform may answer so for an unknown user
     // clang-format off
     VEMO_ATOKEN_CHECK_RETURN((int)cbUser <= snprintf(szUser,cbUser, "%s", pUser->szName), -1);
     // clang-format on

@@ -11,6 +11,8 @@
 
 namespace {
 
+const char* const LOOKUP_FAILED = "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)";
+
 // The user database: one user, of any uid.
 void setUser(const std::string& strName)
 {
@@ -164,27 +166,20 @@ TEST_F(GrantWithName, LeavesTheNameAloneWhenRefused)
 // The use is spent by then, and nothing gives it back.
 TEST_F(GrantWithName, FailsForUsersThatCannotBeFound)
 {
-    const std::string strFailed = "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)";
-    const struct {
-        int nResult; // of getpwuid_r, which finds no entry
-        std::string strLine;
-    } answers[] = {{0, failed(WRAPPER, "!pUser")},
-                   {ENOENT, failed(WRAPPER, "!pUser")},
-                   {ESRCH, failed(WRAPPER, "!pUser")},
-                   {EIO, failed(WRAPPER, strFailed, EIO)},
-                   {EMFILE, failed(WRAPPER, strFailed, EMFILE)}};
-    for (const auto& answer : answers) {
-        SCOPED_TRACE(answer.nResult);
+    // What getpwuid_r returns, which finds no entry, and the errno that is logged.
+    const std::pair<int, int> answers[] = {{0, ENOENT}, {ESRCH, ESRCH}, {EIO, EIO}};
+    for (const auto& [nResult, nErrno] : answers) {
+        SCOPED_TRACE(nResult);
         query("UPDATE token SET count = 2");
-        seam().getUser = [&answer](uid_t, struct passwd*, char*, size_t, struct passwd** ppEntry) {
+        seam().getUser = [n = nResult](uid_t, struct passwd*, char*, size_t, struct passwd** ppEntry) {
             *ppEntry = nullptr;
-            return answer.nResult;
+            return n;
         };
         errno = 0;
 
         EXPECT_EQ(-1, grant());
 
-        EXPECT_EQ((Texts{answer.strLine}), takeLines());
+        EXPECT_EQ((Texts{failed(WRAPPER, LOOKUP_FAILED, nErrno)}), takeLines());
         EXPECT_EQ(m_strUntouched, m_szUser);
         EXPECT_EQ("1", countOf("t"));
     }
@@ -196,8 +191,7 @@ TEST_F(GrantWithName, FailsWithoutMemoryForTheUser)
 
     EXPECT_EQ(-1, grant());
 
-    EXPECT_EQ((Texts{failed(WRAPPER, "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)", ENOMEM)}),
-              takeLines());
+    EXPECT_EQ((Texts{failed(WRAPPER, LOOKUP_FAILED, ENOMEM)}), takeLines());
     EXPECT_EQ(m_strUntouched, m_szUser);
 }
 

@@ -23,3 +23,10 @@ for name in PLIBCFileTouch VEMOUserGetByUID VEMOUserFree 'VEMO::RANDOM::VEMORand
 done
 mkdir "$dir/database"
 VEMO_REDIRECT_DIR=$dir/database "$dir/build/examples/token-life-redirected" | tail -n 2
+
+# A platform may also tell of a user whom it does not know by leaving the pointer alone.
+"$compiler" -shared -fPIC -include "$dir/include/vemouser.h" -x c++ - -o "$dir/silent.so" \
+    <<<'int VEMOUserGetByUID(uid_t, VEMOUser**) { return 0; }'
+VEMO_REDIRECT_DIR=$dir/database LD_PRELOAD=$dir/silent.so \
+    "$dir/build/examples/token-life-redirected" >"$dir/life" || true # not what its step shows
+grep -A2 -F 'VemoAccessTokenGrant(' "$dir/life" | grep -F 'Failed [!pUser]'
