@@ -85,6 +85,16 @@ void spend(tool::Store& store, const Json::Value& jToken)
     }
 }
 
+// The owner's name, when the use has been spent.
+std::string owner(const Json::Value& jToken)
+{
+    try {
+        return tool::userName(jToken["uid"].asInt64());
+    } catch (const tool::Failure& failure) {
+        throw tool::Failure(failure.status(), "granted, but " + failure.fact());
+    }
+}
+
 int grant(const Options& options)
 {
     const std::string strTid = tool::readTid("TID", options.strTid);
@@ -104,12 +114,7 @@ int grant(const Options& options)
         tool::print("granted\n");
         return tool::EXIT_STATUS_DONE;
     }
-    const auto strName = tool::userName((*jToken)["uid"].asInt64());
-    if (!strName) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE,
-                            "granted, but there is no user of the number " + (*jToken)["uid"].asString());
-    }
-    tool::print(*strName + "\n");
+    tool::print(owner(*jToken) + "\n");
     return tool::EXIT_STATUS_DONE;
 }
 

@@ -42,7 +42,7 @@ std::string usesText(const Json::Value& jCount)
 
 std::string userText(const Json::Value& jUid)
 {
-    return tool::userName(jUid.asInt64()).value_or(jUid.asString());
+    return tool::userNameIfKnown(jUid.asInt64()).value_or(jUid.asString());
 }
 
 // "Example.File:get,list Example.User"; an entry that cannot be read as such, as JSON.
@@ -109,7 +109,7 @@ void printSheet(const Json::Value& jToken, const Layout& layout)
     for (const std::string& strField : tool::fieldNames()) {
         const Json::Value& jValue = jToken[strField];
         if (strField == "uid") {
-            const auto strName = tool::userName(jValue.asInt64());
+            const auto strName = tool::userNameIfKnown(jValue.asInt64());
             table.add({strField, jValue.asString() + (strName ? " (" + *strName + ")" : "")});
         } else if (strField == "deadline") {
             table.add(

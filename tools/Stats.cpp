@@ -78,7 +78,7 @@ std::string numberText(const UserGroup& group)
 
 std::string nameOf(const UserGroup& group)
 {
-    return group.nUid ? tool::userName(*group.nUid).value_or("") : "";
+    return group.nUid ? tool::userNameIfKnown(*group.nUid).value_or("") : "";
 }
 
 void printTables(const Statistics& statistics, bool blHeader)

@@ -50,20 +50,37 @@ std::string count(int64_t nSeconds)
     return std::to_string(nSeconds / DAY) + " d";
 }
 
-// The user record that a look-up with a buffer finds.
+// Some user databases answer so for "no such user", instead of success without an entry. The other answers
+// that the manual allows for it (EBADF, EPERM) are more often real failures.
+bool isNotFound(int nError)
+{
+    return 0 == nError || ENOENT == nError || ESRCH == nError;
+}
+
+struct User {
+    std::string strName;
+    uid_t uid;
+};
+
+// The user whom a look-up with a buffer finds. Throws Failure when the user database fails.
 template <typename Lookup>
-std::optional<std::pair<std::string, uid_t>> user(Lookup lookup)
+std::optional<User> lookUp(const std::string& strWho, Lookup lookup)
 {
     std::vector<char> buffer(1024);
     struct passwd entry = {};
     struct passwd* pFound = nullptr;
-    while (ERANGE == lookup(&entry, buffer.data(), buffer.size(), &pFound)) {
+    int nError = ERANGE;
+    while (ERANGE == (nError = lookup(&entry, buffer.data(), buffer.size(), &pFound))) {
         buffer.resize(2 * buffer.size());
     }
-    if (!pFound) {
-        return std::nullopt;
+    if (pFound) {
+        return User{entry.pw_name, entry.pw_uid};
     }
-    return std::make_pair(std::string(entry.pw_name), entry.pw_uid);
+    if (!isNotFound(nError)) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE,
+                            "the " + strWho + " could not be looked up: " + strerror(nError));
+    }
+    return std::nullopt;
 }
 
 [[noreturn]] void failOnDuration(const std::string& strText)
@@ -94,25 +111,39 @@ unsigned int parseUid(const std::string& strText)
 
 unsigned int parseUser(const std::string& strName)
 {
+    const std::string strWho = "user " + quoted(strName);
     const auto found =
-        user([&strName](auto... arguments) { return getpwnam_r(strName.c_str(), arguments...); });
+        lookUp(strWho, [&strName](auto... arguments) { return getpwnam_r(strName.c_str(), arguments...); });
     if (!found) {
-        throw BadValue("there is no user " + quoted(strName));
+        throw BadValue("there is no " + strWho);
     }
-    return found->second;
+    return found->uid;
 }
 
-std::optional<std::string> userName(Json::Int64 nUid)
+std::string userName(Json::Int64 nUid)
 {
-    if (nUid < 0 || nUid >= Json::Int64{UID_ERR}) {
-        return std::nullopt; // not to be narrowed to another's number
+    const std::string strWho = "user of the number " + std::to_string(nUid);
+    std::optional<User> found;
+    if (nUid >= 0 && nUid < Json::Int64{UID_ERR}) { // or it would be narrowed to another's number
+        found = lookUp(
+            strWho, [nUid](auto... arguments) { return getpwuid_r(static_cast<uid_t>(nUid), arguments...); });
     }
+    if (!found) {
+        throw Failure(EXIT_STATUS_STORE, "there is no " + strWho);
+    }
+    return found->strName;
+}
+
+std::optional<std::string> userNameIfKnown(Json::Int64 nUid)
+{
     static std::map<Json::Int64, std::optional<std::string>> known; // a look-up can go over the network
     const auto [pKnown, blNew] = known.try_emplace(nUid);
     if (blNew) {
-        const auto found =
-            user([nUid](auto... arguments) { return getpwuid_r(static_cast<uid_t>(nUid), arguments...); });
-        pKnown->second = found ? std::optional<std::string>(found->first) : std::nullopt;
+        try {
+            pKnown->second = userName(nUid);
+        } catch (const Failure&) {
+            // it has a number
+        }
     }
     return pKnown->second;
 }

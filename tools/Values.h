@@ -15,12 +15,14 @@ namespace tool {
 // A number from nMin to nMax, in decimal.
 int64_t parseNumber(const std::string& strText, int64_t nMin, int64_t nMax);
 
-// A user's number, and that of a user of this machine.
+// A user's number, and that of a user of this machine. Throws Failure where the user database fails.
 unsigned int parseUid(const std::string& strText);
 unsigned int parseUser(const std::string& strName);
 
-// The name of a user, if this machine knows one.
-std::optional<std::string> userName(Json::Int64 nUid);
+// The name of a user. Throws Failure, which tells a user whom this machine does not know from a user database
+// that fails. The second is for lists, which do without the name in either case.
+std::string userName(Json::Int64 nUid);
+std::optional<std::string> userNameIfKnown(Json::Int64 nUid);
 
 // Seconds in a text such as "90m", "1d12h" or "45" (seconds); from a second to a thousand years.
 int64_t parseDuration(const std::string& strText);

@@ -1,6 +1,9 @@
-// For tests of what the tool says: with "file" or "directory" in VEMO_TEST_SYNC, none of these can be synced.
+// For tests of what the tool says when the system fails: with "file" or "directory" in VEMO_TEST_SYNC, none
+// of these can be synced; with an errno in VEMO_TEST_LOOKUP, each look-up of a user ends with it and finds
+// nobody.
 
 #include <dlfcn.h>
+#include <pwd.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -12,6 +15,12 @@
 
 namespace {
 
+template <typename... Arguments>
+int next(const char* szFunction, Arguments... arguments)
+{
+    return reinterpret_cast<int (*)(Arguments...)>(dlsym(RTLD_NEXT, szFunction))(arguments...);
+}
+
 int sync(const char* szFunction, int nFile)
 {
     const char* szKind = getenv("VEMO_TEST_SYNC");
@@ -21,7 +30,19 @@ int sync(const char* szFunction, int nFile)
         errno = EIO;
         return -1;
     }
-    return reinterpret_cast<decltype(&::fsync)>(dlsym(RTLD_NEXT, szFunction))(nFile);
+    return next(szFunction, nFile);
+}
+
+template <typename Key>
+int lookUp(const char* szFunction, Key key, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+           struct passwd** ppEntry)
+{
+    const char* szError = getenv("VEMO_TEST_LOOKUP");
+    if (szError) {
+        *ppEntry = nullptr;
+        return atoi(szError);
+    }
+    return next(szFunction, key, pEntry, szBuffer, cbBuffer, ppEntry);
 }
 
 } // namespace
@@ -34,4 +55,16 @@ SCRIPTED int fsync(int nFile)
 SCRIPTED int fdatasync(int nFile)
 {
     return sync("fdatasync", nFile);
+}
+
+SCRIPTED int getpwnam_r(const char* szName, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+                        struct passwd** ppEntry)
+{
+    return lookUp("getpwnam_r", szName, pEntry, szBuffer, cbBuffer, ppEntry);
+}
+
+SCRIPTED int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+                        struct passwd** ppEntry)
+{
+    return lookUp("getpwuid_r", uid, pEntry, szBuffer, cbBuffer, ppEntry);
 }

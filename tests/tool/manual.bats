@@ -114,7 +114,9 @@ there is no database ...|rm "$DB"; tool list
 ... is damaged|truncate -s 8192 "$DB"; tool list
 ... is no token database, or a damaged one|printf '%04096d' 0 >"$DB"; tool list
 several tokens begin with ...|sql "INSERT INTO token SELECT tid || 'x', $ROW FROM token"; tool show token---
-granted, but there is no user of the number ...|sql "UPDATE token SET uid = -1"; tool grant "token---$ZEROS" Api --print-user
+the user ... could not be looked up: ...|VEMO_TEST_LOOKUP=5 tool list --user root
+granted, but there is no user of the number ...|VEMO_TEST_LOOKUP=0 tool grant "token---$ZEROS" Api --print-user
+granted, but the user of the number ... could not be looked up: ...|VEMO_TEST_LOOKUP=5 tool grant "token---$ZEROS" Api --print-user
 cannot write the result: ...|tool list >/dev/full
 ... the change may have been made|VEMO_TEST_SYNC=file tool revoke token---
 ... the change was made, but a power cut can undo it|VEMO_TEST_SYNC=directory tool revoke token---
