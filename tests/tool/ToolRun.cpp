@@ -87,6 +87,9 @@ void failMemory(const Fault& fault)
     if (fault.isOfMemory()) {
         getpwuid(0); // glibc does not bear a lack of memory when it does that first
     }
+    if (0 != fault.nSignal) {
+        signal(fault.nSignal, SIG_DFL); // which jobs in the background inherit as ignored
+    }
     g_blTool = true;
     sqlite3_shutdown(); // for it to begin from nothing
     if (!letOtherAnswer(nSocket)) {
