@@ -18,7 +18,6 @@
 
 namespace {
 
-const int RESULT_DESCRIPTOR = 1 << 20; // no open file's
 const uid_t ANNA = 1000;
 
 bool g_blConfined = false;
@@ -27,6 +26,7 @@ int g_nExtraFile = -1;
 int g_nTokensFile = -1;
 FILE* g_pResult = nullptr;
 FILE* g_pComplaints = nullptr;
+FILE* g_pStdout = nullptr;
 FILE* g_pStderr = nullptr;
 std::string g_strResult;
 std::string g_strComplaints;
@@ -99,12 +99,15 @@ const char* const TOKENS_FILE = "tokens.jsonl";
 Confinement::Confinement()
 {
     g_blConfined = true;
+    g_pStdout = stdout;
     g_pStderr = stderr;
+    stdout = g_pResult ? g_pResult : stdout;
     stderr = g_pComplaints ? g_pComplaints : stderr;
 }
 
 Confinement::~Confinement()
 {
+    stdout = g_pStdout;
     stderr = g_pStderr;
     g_blConfined = false;
 }
@@ -133,6 +136,7 @@ void captureStreams()
     g_pResult = capturing(g_strResult);
     g_pComplaints = capturing(g_strComplaints);
     setvbuf(g_pComplaints, nullptr, _IONBF, 0);
+    stdout = g_pResult;
     stderr = g_pComplaints;
 }
 
@@ -245,21 +249,6 @@ CONFINED FILE* fopen64(const char* szPath, const char* szMode)
                       : 0 == strcmp(szPath, fuzz::TOKENS_FILE) ? g_nTokensFile
                                                                : refused(ENOENT);
     return 0 > nFile ? nullptr : NEXT(fopen64)(("/proc/self/fd/" + std::to_string(nFile)).c_str(), "r");
-}
-
-CONFINED int dup(int nFile) noexcept
-{
-    return g_blConfined ? RESULT_DESCRIPTOR : NEXT(dup)(nFile);
-}
-
-CONFINED int dup2(int nFile, int nTarget) noexcept
-{
-    return g_blConfined ? nTarget : NEXT(dup2)(nFile, nTarget);
-}
-
-CONFINED FILE* fdopen(int nFile, const char* szMode) noexcept
-{
-    return RESULT_DESCRIPTOR == nFile ? g_pResult : NEXT(fdopen)(nFile, szMode);
 }
 
 CONFINED int isatty(int nFile) noexcept

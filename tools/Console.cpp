@@ -2,15 +2,14 @@
 
 #include <bsd/readpassphrase.h>
 #include <fcntl.h>
-#include <locale.h>
 #include <unistd.h>
-#include <wctype.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <cwchar>
 #include <iostream>
+#include <sstream>
 
 #include "AccessTokenUtil.h"
 #include "Failure.h"
@@ -22,50 +21,51 @@ FILE* g_pResult = stdout;
 
 const int BAR_WIDTH = 40;
 
-locale_t utf8()
+// What the stream's reader can show: only of a terminal anything is known.
+tool::Charset charsetOf(FILE* pStream)
 {
-    static const locale_t locale = newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr);
-    return locale;
+    return tool::isTerminal(pStream) ? tool::localeCharset() : tool::Charset::Utf8;
 }
 
-// The largest character that can be told: of ASCII where the machine has no UTF-8 locale, or no memory for
-// it.
-wchar_t largestCharacter()
+bool isAscii(const std::string& strText)
 {
-    return utf8() ? 0x10ffff : 0x7f;
+    return std::all_of(strText.begin(), strText.end(),
+                       [](char c) { return 0 <= static_cast<signed char>(c); });
 }
 
-bool isPrintable(wchar_t cWide)
+void writeResult(const std::string& strText)
 {
-    return utf8() ? 0 != iswprint_l(static_cast<wint_t>(cWide), utf8()) : ' ' <= cWide && cWide <= '~';
+    fwrite(strText.data(), 1, strText.size(), g_pResult);
 }
 
-// The text with \xNN for each byte of what is no UTF-8 or what does not pass.
-template <typename Passes>
-std::string escaped(const std::string& strText, Passes passes)
+// The write function of the stream of log lines, which can hold what tokens do.
+ssize_t writeLog(void*, const char* szText, size_t cbText)
 {
-    const locale_t before = uselocale(utf8());
-    std::string strOut;
-    for (size_t i = 0; i < strText.size();) {
-        wchar_t cWide = 0;
-        mbstate_t state = {};
-        const size_t cbRead = mbrtowc(&cWide, &strText[i], strText.size() - i, &state);
-        // What is too large is an error's number, or none that UTF-8 goes to.
-        const bool blValid = cbRead <= strText.size() - i && cWide <= largestCharacter();
-        const size_t cbCharacter = blValid && cbRead ? cbRead : 1;
-        if (blValid && passes(cWide)) {
-            strOut.append(strText, i, cbCharacter);
-        } else {
-            for (size_t j = i; j < i + cbCharacter; ++j) {
-                char szEscape[5];
-                snprintf(szEscape, sizeof(szEscape), "\\x%02x", static_cast<unsigned char>(strText[j]));
-                strOut += szEscape;
-            }
-        }
-        i += cbCharacter;
+    if (!tool::isTerminal(stderr)) {
+        return static_cast<ssize_t>(fwrite(szText, 1, cbText, stderr));
     }
-    uselocale(before);
-    return strOut;
+    try {
+        std::istringstream lines(std::string(szText, cbText));
+        for (std::string strLine; std::getline(lines, strLine);) {
+            fputs(tool::printable(strLine, tool::localeCharset()).c_str(), stderr);
+            fputs(lines.eof() ? "" : "\n", stderr);
+        }
+    } catch (const std::bad_alloc&) {
+        return -1; // the caller is a C function
+    }
+    return static_cast<ssize_t>(cbText);
+}
+
+FILE* openLog()
+{
+    cookie_io_functions_t functions = {};
+    functions.write = writeLog;
+    FILE* const pLog = fopencookie(nullptr, "w", functions);
+    if (!pLog) {
+        throw std::bad_alloc();
+    }
+    setvbuf(pLog, nullptr, _IOLBF, BUFSIZ);
+    return pLog;
 }
 
 } // namespace
@@ -91,19 +91,20 @@ FILE* resultStream()
 
 void showLogLines()
 {
-    const int nResult = dup(STDOUT_FILENO);
-    g_pResult = 0 > nResult ? nullptr : fdopen(nResult, "w");
-    if (!g_pResult || 0 > dup2(STDERR_FILENO, STDOUT_FILENO)) {
+    static FILE* const pLog = openLog();
+    if (pLog != stdout) {
         g_pResult = stdout;
-        throw Failure(EXIT_STATUS_STORE, std::string("cannot write the result: ") + strerror(errno));
+        stdout = pLog;
     }
-    setvbuf(stdout, nullptr, _IOLBF, BUFSIZ);
     VEMO_ACCESS_TOKEN::logToStdout(true);
 }
 
 bool isTerminal(FILE* pStream)
 {
-    return isatty(fileno(pStream));
+    const int nError = errno; // a failure to write is told in the end, by flushResult()
+    const bool blTerminal = isatty(fileno(pStream));
+    errno = nError;
+    return blTerminal;
 }
 
 bool isColoured(FILE* pStream)
@@ -114,12 +115,16 @@ bool isColoured(FILE* pStream)
 
 void print(const std::string& strText)
 {
-    fwrite(strText.data(), 1, strText.size(), g_pResult);
+    if (!isTerminal(g_pResult) || isAscii(strText)) {
+        writeResult(strText);
+    } else {
+        writeResult(showableJson(strText, localeCharset()));
+    }
 }
 
 void complain(const std::string& strSentence)
 {
-    fprintf(stderr, "vemo-access-token: %s\n", printable(strSentence).c_str());
+    fprintf(stderr, "vemo-access-token: %s\n", printable(strSentence, charsetOf(stderr)).c_str());
 }
 
 void complainOfMemory()
@@ -135,19 +140,14 @@ void flushResult()
     }
 }
 
-std::string printable(const std::string& strText)
+std::string resultLine(const std::string& strText)
 {
-    return escaped(strText, isPrintable);
-}
-
-std::string validUtf8(const std::string& strText)
-{
-    return escaped(strText, [](wchar_t) { return true; });
+    return (isTerminal(g_pResult) ? printable(strText, localeCharset()) : strText) + "\n";
 }
 
 void printLine(const std::string& strText)
 {
-    print((isTerminal(g_pResult) ? printable(strText) : strText) + "\n");
+    writeResult(resultLine(strText));
 }
 
 std::vector<std::string> readSecrets(const std::string& strPrompt)
@@ -170,7 +170,7 @@ std::vector<std::string> readSecrets(const std::string& strPrompt)
 
 bool confirm(const std::string& strQuestion)
 {
-    fprintf(stderr, "%s [y/N] ", printable(strQuestion).c_str());
+    fprintf(stderr, "%s [y/N] ", printable(strQuestion, charsetOf(stderr)).c_str());
     std::string strAnswer;
     if (!std::getline(std::cin, strAnswer)) {
         fputc('\n', stderr); // that an answer would have ended with

@@ -8,6 +8,8 @@
 #include <string>
 #include <vector>
 
+#include "Visible.h"
+
 namespace tool {
 
 // Gives the process all three streams, so that no file that is opened later takes the place of one that
@@ -17,8 +19,8 @@ void completeStreams();
 // Where results go: the standard output that the process was started with.
 FILE* resultStream();
 
-// Lets the library write its log lines, on standard error: results keep standard output to
-// themselves. To be called before the first result.
+// Lets the library write its log lines, on standard error; to a terminal, printable. To be called before
+// the first result.
 void showLogLines();
 
 bool isTerminal(FILE* pStream);
@@ -26,7 +28,8 @@ bool isTerminal(FILE* pStream);
 // Whether what goes to a stream may be coloured: a terminal, and no NO_COLOR in the environment.
 bool isColoured(FILE* pStream);
 
-// Writes to the result.
+// Writes to the result what holds nothing that cannot be seen, or is JSON. What a terminal cannot show of it
+// is escaped as in JSON; it takes no memory to write ASCII.
 void print(const std::string& strText);
 
 // Writes a line "vemo-access-token: ..." to standard error.
@@ -38,13 +41,8 @@ void complainOfMemory();
 // Writes out what is still buffered. Fails when the result could not be written.
 void flushResult();
 
-// Text for a terminal: control characters, which could command it, and what is no UTF-8 become \xNN.
-std::string printable(const std::string& strText);
-
-// The same without the control characters.
-std::string validUtf8(const std::string& strText);
-
-// Writes a line to the result; to a terminal, printable.
+// A line of the result: to a terminal, printable.
+std::string resultLine(const std::string& strText);
 void printLine(const std::string& strText);
 
 // The lines of standard input; on a terminal one line, asked for and not shown.

@@ -81,7 +81,7 @@ int create(const Options& options)
     }
     const Json::Value jToken = recordOf(options);
     const std::string strTid = jToken["tid"].asString();
-    const std::string strLine = strTid + "\n"; // now, when a lack of memory does no harm yet
+    const std::string strLine = tool::resultLine(strTid); // now, when a lack of memory does no harm yet
     tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
     store.purge();
     if (store.find(strTid)) {

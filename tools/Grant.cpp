@@ -114,7 +114,7 @@ int grant(const Options& options)
         tool::print("granted\n");
         return tool::EXIT_STATUS_DONE;
     }
-    tool::print(owner(*jToken) + "\n");
+    tool::printLine(owner(*jToken));
     return tool::EXIT_STATUS_DONE;
 }
 

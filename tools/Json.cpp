@@ -8,28 +8,9 @@
 #include <sstream>
 
 #include "Failure.h"
+#include "Visible.h"
 
 namespace {
-
-// JSON may hold some control characters as they are, but a terminal would obey them.
-std::string withoutControls(const std::string& strJson)
-{
-    std::string strOut;
-    for (size_t i = 0; i < strJson.size(); ++i) {
-        const unsigned char nByte = static_cast<unsigned char>(strJson[i]);
-        const unsigned char nNext = i + 1 < strJson.size() ? static_cast<unsigned char>(strJson[i + 1]) : 0;
-        const bool blC1 = nByte == 0xc2 && nNext >= 0x80 && nNext < 0xa0; // U+0080 to U+009F
-        if (nByte == 0x7f || blC1) {
-            char szEscape[7];
-            snprintf(szEscape, sizeof(szEscape), "\\u%04x", blC1 ? nNext : nByte);
-            strOut += szEscape;
-            i += blC1 ? 1 : 0;
-        } else {
-            strOut += strJson[i];
-        }
-    }
-    return strOut;
-}
 
 std::string write(const Json::Value& jValue, const char* szIndentation)
 {
@@ -43,7 +24,7 @@ std::string write(const Json::Value& jValue, const char* szIndentation)
     std::ostringstream stream;
     stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
     std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter())->write(jValue, &stream);
-    return withoutControls(stream.str());
+    return tool::visibleJson(stream.str());
 }
 
 // The first error of the reader's report, each of which stands behind a "*" and on several lines.

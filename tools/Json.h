@@ -15,7 +15,7 @@ const int NESTED_MAX = 1000;
 // Reads one JSON object, strictly. Throws BadValue.
 Json::Value parseObject(const std::string& strText, int nNestedMax = NESTED_MAX);
 
-// On one line.
+// On one line. As all JSON that is written, it escapes what cannot be seen.
 std::string compactJson(const Json::Value& jValue);
 
 // For people, with line breaks and indentation.

@@ -41,6 +41,7 @@ Table::Table(const std::vector<Column>& columns, bool blHeader) : m_pTable(scols
     scols_table_enable_noheadings(pTable, !blHeader);
     scols_table_enable_colors(pTable, isColoured(resultStream()));
     scols_table_set_column_separator(pTable, "  ");
+    scols_table_enable_noencoding(pTable, true); // cells are printable
     // libsmartcols would look at standard output, which need not be where the result goes. Only a
     // terminal has a width to keep to.
     scols_table_set_termforce(pTable, blTerminal ? SCOLS_TERMFORCE_ALWAYS : SCOLS_TERMFORCE_NEVER);
@@ -58,7 +59,7 @@ void Table::add(const std::vector<std::string>& strCells, const char* szColour)
     struct libscols_line* pLine = scols_table_new_line(m_pTable.get(), nullptr);
     require(nullptr != pLine);
     for (size_t i = 0; i < strCells.size(); ++i) {
-        require(0 == scols_line_set_data(pLine, i, strCells[i].c_str()));
+        require(0 == scols_line_set_data(pLine, i, printable(strCells[i], localeCharset()).c_str()));
     }
     require(!szColour || 0 == scols_line_set_color(pLine, szColour));
 }

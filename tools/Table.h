@@ -25,8 +25,8 @@ public:
 
     Table(const std::vector<Column>& columns, bool blHeader);
 
-    // Adds a line, in a colour of libsmartcols ("red", ...) or nullptr. Colours show where the result
-    // is a coloured terminal.
+    // Adds a line, its texts made printable, in a colour of libsmartcols ("red", ...) or nullptr. Colours
+    // show where the result is a coloured terminal.
     void add(const std::vector<std::string>& strCells, const char* szColour = nullptr);
 
     // Writes the table to the result.

@@ -275,56 +275,85 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
     grep -qE "^look for a session's tokens +[0-9.]+ ms +[0-9.]+ ms" <<<"$output"
 }
 
-@test "what a token holds cannot command the terminal" {
-    local evil
-    evil=$'x\e[31my\a\x7f\xc2\x9b2Jz'
-    tool init
-    local id
-    id=$(tool create --uid 0 --function "$evil" --bind-sid "$evil" --allow "$evil:$evil" --extra '{"x": "\u001b[31m\u007f\u009b"}')
-    local arguments
-    while read -r arguments; do
-        # shellcheck disable=SC2086
-        NO_COLOR=1 on_terminal --columns 200 -- $arguments
-        [ "$status" -eq 0 ]
-        [[ $output != *[$'\e\a\x7f']* && $output != *$'\xc2\x9b'* ]] || {
-            echo "$arguments: $(cat -v <<<"$output")"
-            return 1
-        }
-    done <<TABLE
+# Bytes that are no UTF-8, control characters, and characters that order the text anew or cannot be seen; of the
+# last, of the first bytes of Û, too, a terminal with a character set of 8 bits takes one for ESC [.
+EVIL=$'x\e[31my\a\x7f\xc2\x9b2Jz\x9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\U000e0041\ufe0fÛ'
+
+# in_all_forms [LOCALE]: prints on a terminal what the tool says of tokens that hold $EVIL, in each form
+in_all_forms()
+{
+    export EVIL ID EVIL_ID=${EVIL:6}$ZEROS NO_COLOR=1
+    cat >"$DIR/commands" <<'TABLE'
 list
 list -o json
 list -o jsonl
 list --field function
 list --field webapi_allow
-show $id
-show $id -o json
-show $id --field bind_sid
-show $id --field extra
+list --field tid --show-ids
+show $ID
+show $ID -o json
+show $ID --field bind_sid
+show $ID --field extra
 stats
 stats -o json
+stats --prometheus
+export
+create --uid 0 --function x --tid "$EVIL_ID"
+doctor
+doctor -o json
+list --user "$EVIL"
+list --"$EVIL"
+list --sort "$EVIL"
+"$EVIL"
+import "$EVIL"
+export "$EVIL/x"
+list --verbose --function "$EVIL" # which lacks its table now
 TABLE
-    # Elsewhere a value comes out as it is.
-    run_tool show "$id" --field function
-    expect 0 "$evil"
-    # Nor can an argument.
-    NO_COLOR=1 on_terminal -- list --user "$evil"
-    [ "$status" -eq 2 ]
-    [[ $output != *[$'\e\a\x7f']* && $output != *$'\xc2\x9b'* ]]
+    # shellcheck disable=SC2016
+    LC_ALL=$1 sh_on_terminal --columns 200 -- '
+        while read -r arguments; do
+            case $arguments in *--verbose*) sqlite3 "$2" "DROP TABLE token" ;; esac
+            echo "$arguments"
+            eval "\"\$0\" $arguments"
+        done <"$1"' "$DIR/commands" "$DB"
 }
 
-@test "metrics and exports cannot command the terminal" {
+@test "what tokens and arguments hold cannot command the terminal" {
     tool init
-    tool create --uid 0 --function $'x\e[31my\x7f\xc2\x9b2Jz' >/dev/null
+    ID=$(tool create --uid 0 --function "$EVIL" --bind-sid "$EVIL" --allow "$EVIL:$EVIL" \
+        --extra '{"x": "\u001b[31m\u007f\u009b\u202e\udb40\udc41"}')
+    row doomed-- "tid = '${EVIL:6}', deadline = 0"
+    local locale
+    for locale in C C.UTF-8; do
+        cp "$DB" "$DIR/copy"
+        in_all_forms "$locale"
+        cp "$DIR/copy" "$DB"
+        "$BATS_TEST_DIRNAME/visible.py" check <<<"$output"
+        # As text and as JSON.
+        [[ $output == *'x\x1b[31my\x07\x7f\xc2\x9b2Jz\x9b31m\xe2\x80\xaeabc'* ]]
+        [[ $output == *'x\u001b[31my\u0007\u007f\u009b2Jz\udc9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\udb40\udc41\ufe0f'* ]]
+        [[ $output == *"run sql failed"* ]]
+        [ "$locale" = C.UTF-8 ] || [ "$(LC_ALL=C tr -d '\n -~' <<<"$output")" = "" ]
+    done
+    [[ $output == *Û* ]]
+    # Elsewhere a value comes out as it is.
+    run_tool show "$ID" --field function
+    expect 0 "$EVIL"
+}
+
+@test "what is read by people stays readable on the terminal" {
+    local name=$'Zoe\u0308 Ünal, สมชาย, नमस्ते, שלום, مرحبا, 日本'
+    tool init
+    tool create --uid 0 --function "$name" >/dev/null
     local arguments
-    for arguments in "stats --prometheus" export; do
+    for arguments in list "list -o json" "list --field function" "stats --prometheus" export; do
         # shellcheck disable=SC2086
         on_terminal --columns 200 -- $arguments
         [ "$status" -eq 0 ]
-        [[ $output != *[$'\e\x7f']* && $output != *$'\xc2\x9b'* ]] || {
-            echo "$arguments: $(cat -v <<<"$output")"
-            return 1
-        }
+        [[ $output == *"$name"* ]]
     done
+    on_terminal -- list --user "$name"
+    expect 2 "vemo-access-token: --user: there is no user \"$name\""
 }
 
 # bar TITLE: a full one ends on the first line of $output, and it grew from an empty one
