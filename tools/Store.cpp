@@ -127,6 +127,7 @@ Store::Store(Access access, Missing missing) : m_access(access)
         const std::string strReason = errno ? std::string(": ") + strerror(errno) : "";
         throw Failure(EXIT_STATUS_STORE, std::string(VEMO_ATOKEN_DB_PATH) + " cannot be opened" + strReason);
     }
+    query("PRAGMA temp_store = MEMORY"); // what is sorted holds purposes and sessions, and stays private
     switch (access) {
     case Access::Locked: break;
     case Access::Glance: beginReading(); break;

@@ -392,6 +392,24 @@ TABLE
     [ "$output" = 0 ]
 }
 
+# SQLite's temporary files would hold purposes and sessions, on a file system that may not even be root's alone.
+@test "what is sorted does not get into temporary files" {
+    tool init
+    sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 8000)
+         INSERT INTO token SELECT printf('%08d', i) || '$ZEROS', printf('%0300d', i), i, 9999999999 - i, 1, 1,
+                                  printf('%0300d', i), '{}', '{}' FROM n"
+    mkdir "$DIR/tmp"
+    local arguments made
+    for arguments in stats "list --sort function --limit 1" "tune --dry-run" "tune" doctor "revoke --all --yes"; do
+        # shellcheck disable=SC2086
+        made=$(TMPDIR=$DIR/tmp "$BATS_TEST_DIRNAME/made_in.py" "$DIR/tmp" "$TOOL" $arguments 2>/dev/null)
+        [ "$made" = "" ] || {
+            echo "$arguments: $made"
+            return 1
+        }
+    done
+}
+
 @test "no id appears on standard error, nor where ids are masked" {
     local id other
     id=$(a_token --allow Api:get --unlimited)
