@@ -8,6 +8,7 @@
 #include <sstream>
 
 #include "Failure.h"
+#include "Masking.h"
 #include "Visible.h"
 
 namespace {
@@ -60,7 +61,7 @@ Json::Value parseObject(const std::string& strText, int nNestedMax)
     try {
         // A text is bad when it is so twice: the reader takes a number for none when memory runs out.
         if (!parse() && !parse()) {
-            throw BadValue("is no JSON: " + firstError(strReport));
+            throw BadValue("is no JSON: " + shownReason(firstError(strReport)));
         }
     } catch (const Json::RuntimeError& error) {
         if (!strstr(error.what(), "stackLimit")) {

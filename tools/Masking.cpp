@@ -4,10 +4,33 @@
 
 namespace {
 
+const size_t CHARACTER_MAX = 4; // bytes of one in UTF-8
+
+bool isLikeId(const std::string& strText)
+{
+    return strText.size() >= VEMO_ATOKEN_LENGTH_MIN;
+}
+
 // The text, unless it is as long as an id.
 std::string unlessId(const std::string& strText)
 {
-    return strText.size() < VEMO_ATOKEN_LENGTH_MIN ? strText : tool::shortened(strText);
+    return isLikeId(strText) ? tool::shortened(strText) : strText;
+}
+
+// The path with what show() makes of each of its parts.
+template <typename Show>
+std::string withParts(const std::string& strPath, Show show)
+{
+    std::string strShown;
+    for (size_t nStart = 0;;) {
+        const size_t nEnd = strPath.find('/', nStart);
+        strShown += show(strPath.substr(nStart, nEnd - nStart));
+        if (std::string::npos == nEnd) {
+            return strShown;
+        }
+        strShown += '/';
+        nStart = nEnd + 1;
+    }
 }
 
 } // namespace
@@ -19,7 +42,8 @@ std::string masked(const std::string& strTid)
     size_t nCharacters = 0;
     for (size_t i = 0; i < strTid.size(); ++i) {
         const bool blContinued = (static_cast<unsigned char>(strTid[i]) & 0xc0) == 0x80; // UTF-8
-        if (!blContinued && ++nCharacters > PREFIX_MIN) {
+        const bool blCharacter = !blContinued && ++nCharacters > PREFIX_MIN;
+        if (blCharacter || i == PREFIX_MIN * CHARACTER_MAX) { // bytes that continue nothing are none
             return strTid.substr(0, i);
         }
     }
@@ -39,16 +63,20 @@ std::string quoted(const std::string& strText)
 
 std::string shownPath(const std::string& strPath)
 {
-    std::string strShown;
-    for (size_t nStart = 0;;) {
-        const size_t nEnd = strPath.find('/', nStart);
-        strShown += unlessId(strPath.substr(nStart, nEnd - nStart));
-        if (std::string::npos == nEnd) {
-            return strShown;
-        }
-        strShown += '/';
-        nStart = nEnd + 1;
+    const std::string strShown = withParts(strPath, unlessId);
+    // An id can hold slashes itself, as Base64 does.
+    return isLikeId(strShown) ? unlessId(withParts(strPath, shortened)) : strShown;
+}
+
+std::string shownReason(const std::string& strReason)
+{
+    const size_t nStart = strReason.find_first_of("'\"(") + 1;
+    const size_t nEnd = strReason.find_last_of("'\")");
+    if (0 == nStart || std::string::npos == nEnd || nEnd < nStart) {
+        return unlessId(strReason);
     }
+    return unlessId(strReason.substr(0, nStart)) + unlessId(strReason.substr(nStart, nEnd - nStart)) +
+           unlessId(strReason.substr(nEnd));
 }
 
 } // namespace tool

@@ -21,8 +21,12 @@ std::string shortened(const std::string& strTid);
 // one in a wrong place, and is shortened.
 std::string quoted(const std::string& strText);
 
-// The same for the name of a file: each part of the path is shortened that is so long.
+// The same for the name of a file: each part of the path is shortened that is so long; all are, where the
+// whole still is.
 std::string shownPath(const std::string& strPath);
+
+// What a library says of what it was given, with what it quotes of that shortened in the same way.
+std::string shownReason(const std::string& strReason);
 
 } // namespace tool
 

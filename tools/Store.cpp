@@ -189,7 +189,7 @@ void Store::fail(const std::string& strErr)
     }
     // SQLite shortens the file when the change is made already, and can fail of that.
     const bool blPerhaps = m_blCommitting && contains(strErr, "disk I/O error");
-    const auto [strFact, strHint] = explained(strErr);
+    const auto [strFact, strHint] = explained(shownReason(strErr));
     throw Failure(EXIT_STATUS_STORE, strPath + strFact,
                   blPerhaps ? "the change may have been made" : strHint);
 }

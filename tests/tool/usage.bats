@@ -464,11 +464,15 @@ TABLE
     expect 2 "" "vemo-access-token: unexpected argument \"${id:0:8}...\""
 }
 
-# Superfluous arguments are named, but this one may be an id that got there by mistake.
-@test "no id appears on standard error when it stands in a wrong place" {
-    local id
-    id=$(a_token)
+# in_wrong_places ID: calls that fail with a sentence, which must not hold the id
+in_wrong_places()
+{
+    local id=$1 arguments
+    mkdir -p "$(dirname "$DIR/$id")"
     printf '\0' >"$DIR/$id"
+    echo "{\"$id\":1,\"$id\":2}" >"$DIR/repeated"
+    tool export 2>/dev/null | sed "s|^{|{\"$id\":1,|" >"$DIR/unknown"
+    tool export 2>/dev/null | sed "s|\"uid\":0|\"uid\":${id//[^0-9]/}e|" >"$DIR/number"
     while read -r arguments; do
         # shellcheck disable=SC2086
         run_tool $arguments
@@ -513,11 +517,34 @@ create --uid 0 --function TAG --allow=A:,$id
 create --uid 0 --function TAG --extra @$id
 create --uid 0 --function TAG --extra=@/$id/x
 create --uid 0 --function TAG --extra @$DIR/$id
+create --uid 0 --function TAG --uses $id
+create --uid 0 --function TAG --extra {"$id":1,"$id":2}
+create --uid 0 --function TAG --extra ["$id"]
+create --uid 0 --function TAG --extra {"a":$id}
 update TID --deadline=$id
 update TID --deadline @$id
+update token--- --remove-allow $id
+update token--- --remove-allow Api:$id
+check token--- Api -o $id
+generate $id
+-$id
 import $id
+import ./$id
 import $DIR/$id
+import $DIR/repeated
+import $DIR/unknown
+import $DIR/number
 TABLE
+}
+
+# Superfluous arguments are named, but this one may be an id that got there by mistake. One of somebody's own can
+# hold slashes, as Base64 does.
+@test "no id appears on standard error when it stands in a wrong place" {
+    local id
+    row token---
+    in_wrong_places "$(printf 'Own+id-%08d/' {1..8})=="
+    id=$(a_token)
+    in_wrong_places "$id"
     run_tool export "$DIR/$id/x"
     expect 4 "" "vemo-access-token: $DIR/${id:0:8}.../x: Not a directory"
     run_tool export "$DIR/x/$id"
@@ -525,6 +552,25 @@ TABLE
     mkdir -p "$DIR/x/$id"
     run_tool export "$DIR/x/$id"
     expect 2 "" "vemo-access-token: $DIR/x/${id:0:8}... is no regular file; to write to a pipe, write to standard output"
+}
+
+@test "no id appears on standard error when SQLite's reason holds it" {
+    local id
+    id=$(a_token)
+    sql "CREATE TRIGGER refuse BEFORE INSERT ON token BEGIN SELECT RAISE(ABORT, 'no (not $id)'); END"
+    run_tool create --uid 0 --function VPN
+    expect 4 "" "vemo-access-token: $REAL_DB failed: no (not ${id:0:4}...)"
+    sql "DROP TRIGGER refuse; CREATE TRIGGER refuse BEFORE INSERT ON token BEGIN SELECT RAISE(ABORT, '$id'); END"
+    run_tool create --uid 0 --function VPN
+    expect 4 "" "vemo-access-token: $REAL_DB failed: ${id:0:8}..."
+}
+
+@test "an id that is no text is masked, too" {
+    row token---
+    sql "UPDATE token SET tid = CAST(x'61' || x'$(printf '9b%.0s' {1..140})' AS TEXT)"
+    [ "$(tool list --field tid | wc -c)" -eq 33 ] # 8 characters of 4 bytes at most, and the end of the line
+    run_tool list --sort "$(tool list --field tid --show-ids)"
+    [ "$stderr" = "vemo-access-token: --sort: \"a$(printf '\\x9b%.0s' {1..31})...\" is no field of a token" ]
 }
 
 @test "no id appears on standard error when a long beginning fits several tokens" {
