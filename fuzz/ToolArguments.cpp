@@ -14,11 +14,12 @@
 #include "Console.h"
 #include "Failure.h"
 #include "Library.h"
+#include "PlainReading.h"
 #include "ToolStore.h"
 
 namespace {
 
-typedef std::vector<std::string> Texts;
+using fuzz::Texts;
 
 // What the tool may say of the store and the system here, where nothing fails but what is asked in vain.
 const char* const STORE_FAILURES[] = {"the journal cannot be made", "granted, but there is no user",
@@ -48,18 +49,25 @@ std::string commandOf(const Texts& strArguments)
     return strArguments.size() > 1 && COMMANDS.count(strArguments[1]) ? strArguments[1] : "";
 }
 
-// The exit status. What main() would take for a failure of the system ends the fuzzing.
-int run(Texts strArguments, const std::string& strInput)
+// Each text of the command line reaches the option or argument that it is for, byte for byte; or the command
+// fails.
+void checkReading(const tool::Command& command, const Texts& strArguments, int nStatus)
 {
-    const fuzz::Input input(strInput);
+    fuzz::Reading reading;
+    const Texts strBehindName(strArguments.begin() + 2, strArguments.end());
+    if (fuzz::readPlainly(command, strBehindName, reading)) {
+        FUZZ_REQUIRE(reading == fuzz::readingOf(command));
+    } else {
+        FUZZ_REQUIRE(tool::EXIT_STATUS_USAGE == nStatus);
+    }
+}
+
+int runCommand(tool::Commands& commands, Texts strArguments)
+{
     std::vector<char*> rgArguments;
     for (std::string& strArgument : strArguments) {
         rgArguments.push_back(strArgument.data());
     }
-    // To make all commands would take most of the time.
-    const std::string strCommand = commandOf(strArguments);
-    tool::Commands commands;
-    COMMANDS.at(strCommand.empty() ? "generate" : strCommand)(commands);
     try {
         return commands.run(static_cast<int>(rgArguments.size()), rgArguments.data());
     } catch (const tool::Failure& failure) {
@@ -68,8 +76,35 @@ int run(Texts strArguments, const std::string& strInput)
     }
 }
 
+// The exit status. What main() would take for a failure of the system ends the fuzzing.
+int run(const Texts& strArguments, const std::string& strInput)
+{
+    const fuzz::Input input(strInput);
+    // To make all commands would take most of the time.
+    const std::string strCommand = commandOf(strArguments);
+    tool::Commands commands;
+    COMMANDS.at(strCommand.empty() ? "generate" : strCommand)(commands);
+    const int nStatus = runCommand(commands, strArguments);
+    if (!strCommand.empty()) {
+        checkReading(commands.all().front(), strArguments, nStatus);
+    }
+    return nStatus;
+}
+
+// No command of the tool is left out.
+void checkCommands()
+{
+    tool::Commands commands;
+    tool::addAll(commands);
+    FUZZ_REQUIRE(commands.all().size() == COMMANDS.size());
+    for (const tool::Command& command : commands.all()) {
+        FUZZ_REQUIRE(COMMANDS.count(command.name()));
+    }
+}
+
 void prepare()
 {
+    checkCommands();
     fuzz::setFileTexts(
         R"({"a":[1]})",
         R"({"tid":")" + fuzz::tid("FromAFile") +

@@ -28,6 +28,21 @@ public:
 
     // Takes the text of each occurrence; a BadValue becomes a usage failure that names the option.
     typedef std::function<void(const std::string&)> Take;
+
+    // An option, or an argument.
+    struct Parameter {
+        std::string strName; // "--name" or "NAME"
+        char cShort;         // or 0
+        std::string strType;
+        std::string strDescription;
+        Take take;
+        bool blTakesText;
+        bool blRepeated; // may be given more than once, as flags may
+        bool blRequired = false;
+        std::vector<std::string> strExcluded = {};
+        std::vector<std::string> strTexts = {}; // as read
+    };
+
     void option(const std::string& strName, const std::string& strType, Take take,
                 const std::string& strDescription);
     void repeatedOption(const std::string& strName, const std::string& strType, Take take,
@@ -44,6 +59,8 @@ public:
 
     const std::string& name() const { return m_strName; }
     const std::string& description() const { return m_strDescription; }
+    const std::vector<Parameter>& options() const { return m_options; }
+    const std::vector<Parameter>& arguments() const { return m_arguments; }
     std::string help() const;
 
     // Notes the texts of a command line that begins with the command's name, byte for byte. Throws Failure
@@ -59,20 +76,6 @@ public:
     int run() const { return m_run(); }
 
 private:
-    // An option, or an argument.
-    struct Parameter {
-        std::string strName; // "--name" or "NAME"
-        char cShort;         // or 0
-        std::string strType;
-        std::string strDescription;
-        Take take;
-        bool blTakesText;
-        bool blRepeated; // may be given more than once, as flags may
-        bool blRequired = false;
-        std::vector<std::string> strExcluded = {};
-        std::vector<std::string> strTexts = {}; // as read
-    };
-
     Parameter* find(const std::string& strName); // nullptr: there is none
     void addOption(const std::string& strNames, Parameter parameter);
     void addOptionText(Parameter& option, const char* szText);

@@ -99,4 +99,23 @@ int Commands::run(int nArguments, char** rgArguments)
     return nStatus;
 }
 
+void addAll(Commands& commands)
+{
+    addCreate(commands);
+    addGenerate(commands);
+    addList(commands);
+    addShow(commands);
+    addCheck(commands);
+    addGrant(commands);
+    addUpdate(commands);
+    addRevoke(commands);
+    addPurge(commands);
+    addStats(commands);
+    addExport(commands);
+    addImport(commands);
+    addInit(commands);
+    addDoctor(commands);
+    addTune(commands);
+}
+
 } // namespace tool

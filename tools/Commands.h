@@ -18,6 +18,8 @@ public:
     Command& add(const std::string& strName, const std::string& strDescription, const Command::Run& run,
                  Needs needs = Needs::Root);
 
+    const std::deque<Command>& all() const { return m_commands; }
+
     // Reads the arguments and runs the command. Throws Failure.
     int run(int nArguments, char** rgArguments);
 
@@ -44,6 +46,9 @@ void addImport(Commands& commands);
 void addInit(Commands& commands);
 void addDoctor(Commands& commands);
 void addTune(Commands& commands);
+
+// All of these, in the order that the help text has.
+void addAll(Commands& commands);
 
 } // namespace tool
 

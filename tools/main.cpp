@@ -15,25 +15,6 @@
 
 namespace {
 
-void addAll(tool::Commands& commands)
-{
-    tool::addCreate(commands);
-    tool::addGenerate(commands);
-    tool::addList(commands);
-    tool::addShow(commands);
-    tool::addCheck(commands);
-    tool::addGrant(commands);
-    tool::addUpdate(commands);
-    tool::addRevoke(commands);
-    tool::addPurge(commands);
-    tool::addStats(commands);
-    tool::addExport(commands);
-    tool::addImport(commands);
-    tool::addInit(commands);
-    tool::addDoctor(commands);
-    tool::addTune(commands);
-}
-
 // What no handler catches: there was no memory for the handler, or for the exception itself.
 void endWithoutMemory()
 {
@@ -60,7 +41,7 @@ int main(int nArguments, char** rgArguments)
         tool::completeStreams();
         setlocale(LC_CTYPE, ""); // how wide characters are
         tool::Commands commands;
-        addAll(commands);
+        tool::addAll(commands);
         return commands.run(nArguments, rgArguments);
     } catch (const tool::Failure& failure) {
         tool::complain(failure.what());
