@@ -136,18 +136,34 @@ bool isId(const std::string& strText)
     return strText.size() >= VEMO_ATOKEN_LENGTH_MIN && std::all_of(strText.begin(), strText.end(), isalnum);
 }
 
-// Import says this of a file, when it has imported it, and can fail at the next one.
-std::string withoutNotes(std::string strComplaint)
+bool endsWith(const std::string& strText, const std::string& strEnd)
+{
+    return strText.size() >= strEnd.size() &&
+           0 == strText.compare(strText.size() - strEnd.size(), strEnd.size(), strEnd);
+}
+
+// Import says these of a file, when it has imported it, and can fail at the next one.
+bool isNote(const std::string& strLine)
 {
     const std::string strStart = "vemo-access-token: ";
-    const std::string strEnd = " of them expired: the next call of a program purges those\n";
+    if (0 != strLine.compare(0, strStart.size(), strStart)) {
+        return false;
+    }
+    const size_t nNumberEnd = strLine.find_first_not_of("0123456789", strStart.size());
+    const bool blNumber = nNumberEnd != strStart.size() && nNumberEnd != std::string::npos;
+    return endsWith(strLine, "; the whole lines were imported\n") ||
+           (blNumber &&
+            strLine.substr(nNumberEnd) == " of them expired: the next call of a program purges those\n");
+}
+
+std::string withoutNotes(std::string strComplaint)
+{
     for (;;) {
-        const size_t nNumber = strComplaint.find_first_not_of("0123456789", strStart.size());
-        if (0 != strComplaint.compare(0, strStart.size(), strStart) || nNumber == strStart.size() ||
-            nNumber == std::string::npos || 0 != strComplaint.compare(nNumber, strEnd.size(), strEnd)) {
+        const std::string strLine = strComplaint.substr(0, strComplaint.find('\n') + 1);
+        if (!isNote(strLine)) {
             return strComplaint;
         }
-        strComplaint.erase(0, nNumber + strEnd.size());
+        strComplaint.erase(0, strLine.size());
     }
 }
 

@@ -1,24 +1,30 @@
-// The text of a file that is imported. All of it comes in or none; and what came in can be exported and
-// imported again.
+// The text of a file that is imported. All of it comes in or none; what came in can be exported and imported
+// again; and what comes in without --partial is what came in with it.
 
 #include <string>
+#include <vector>
 
 #include "Commands.h"
 #include "Console.h"
+#include "ExportEnd.h"
+#include "Json.h"
 #include "Library.h"
 #include "ToolStore.h"
 
 namespace {
 
-// Runs "vemo-access-token COMMAND ARGUMENT" and returns its exit status.
-int run(void (&addCommand)(tool::Commands&), const char* szCommand, const char* szArgument)
+// Runs the tool with these arguments and returns its exit status.
+int run(void (&addCommand)(tool::Commands&), std::vector<std::string> strArguments)
 {
-    std::string strWords[] = {"vemo-access-token", szCommand, szArgument};
-    char* rgWords[] = {strWords[0].data(), strWords[1].data(), strWords[2].data()};
+    strArguments.insert(strArguments.begin(), "vemo-access-token");
+    std::vector<char*> words;
+    for (std::string& strArgument : strArguments) {
+        words.push_back(strArgument.data());
+    }
     tool::Commands commands;
     addCommand(commands);
     try {
-        return commands.run(3, rgWords);
+        return commands.run(static_cast<int>(words.size()), words.data());
     } catch (const tool::Failure& failure) {
         return failure.status();
     }
@@ -27,13 +33,19 @@ int run(void (&addCommand)(tool::Commands&), const char* szCommand, const char* 
 int importText(const std::string& strText)
 {
     const fuzz::Input input(strText);
-    return run(tool::addImport, "import", "-");
+    return run(tool::addImport, {"import", "-"});
+}
+
+int importPartially(const std::string& strText)
+{
+    const fuzz::Input input(strText);
+    return run(tool::addImport, {"import", "--partial", "-"});
 }
 
 std::string exportText()
 {
     fuzz::takeResult();
-    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == run(tool::addExport, "export", "-"));
+    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == run(tool::addExport, {"export", "-"}));
     return fuzz::takeResult();
 }
 
@@ -43,13 +55,29 @@ void prepare()
     tool::showLogLines();
 }
 
+bool isObject(const std::string& strLine)
+{
+    try {
+        tool::parseObject(strLine, tool::NESTED_MAX + 1);
+        return true;
+    } catch (const tool::BadValue&) {
+        return false;
+    }
+}
+
 // The tokens of a text that was imported.
 Json::Value tokensOf(std::string_view strText)
 {
     Json::Value jTokens(Json::arrayValue);
     while (!strText.empty()) {
+        const bool blCutOff = strText.back() != '\n';
         const std::string strLine = fuzz::takeLine(strText);
-        if (strLine.find_first_not_of(" \t\r") != std::string::npos) {
+        if (strLine.find_first_not_of(" \t\r") == std::string::npos) {
+            continue;
+        }
+        if (!isObject(strLine)) {
+            FUZZ_REQUIRE(blCutOff && strText.empty());
+        } else if (!tool::ExportEnd::is(fuzz::json(strLine))) {
             jTokens.append(fuzz::json(strLine));
         }
     }
@@ -59,7 +87,7 @@ Json::Value tokensOf(std::string_view strText)
 void checkImported(fuzz::ToolStore& store, std::string_view strText)
 {
     store.clear();
-    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == importText(std::string(strText)));
+    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == importPartially(std::string(strText)));
     const Json::Value jStored = store.tokens();
     FUZZ_REQUIRE(fuzz::text(jStored) == fuzz::text(tokensOf(strText)));
     const std::string strExported = exportText();
@@ -67,6 +95,9 @@ void checkImported(fuzz::ToolStore& store, std::string_view strText)
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == importText(strExported));
     FUZZ_REQUIRE(fuzz::text(store.tokens()) == fuzz::text(jStored));
     FUZZ_REQUIRE(strExported == exportText());
+    store.clear();
+    const bool blWhole = tool::EXIT_STATUS_DONE == importText(std::string(strText));
+    FUZZ_REQUIRE(fuzz::text(store.tokens()) == (blWhole ? fuzz::text(jStored) : "[]"));
 }
 
 } // namespace
@@ -77,9 +108,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
     static fuzz::ToolStore store;
     [[maybe_unused]] static const bool blPrepared = (prepare(), true);
     const std::string_view strText = fuzz::viewOf(pData, cbData);
-    const int nStatus = importText(std::string(strText));
+    const int nStatus = importPartially(std::string(strText));
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == nStatus || tool::EXIT_STATUS_USAGE == nStatus);
     if (tool::EXIT_STATUS_USAGE == nStatus) {
+        FUZZ_REQUIRE(tool::EXIT_STATUS_USAGE == importText(std::string(strText)));
         FUZZ_REQUIRE(!store.isChanged());
         return 0;
     }

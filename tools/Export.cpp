@@ -1,10 +1,11 @@
-// export: writes all tokens as JSON lines, for backups and for moving to another machine.
+// export: writes all tokens as JSON lines and an end, for backups and for moving to another machine.
 
 #include <memory>
 
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
+#include "ExportEnd.h"
 #include "Json.h"
 #include "NewFile.h"
 #include "Store.h"
@@ -20,10 +21,14 @@ template <typename Write>
 void writeLines(const Json::Value& jTokens, bool blProgress, Write write)
 {
     tool::Progress progress("Exporting", jTokens.size(), blProgress);
+    tool::ExportEnd end;
     for (const Json::Value& jToken : jTokens) {
-        write(tool::compactJson(jToken) + "\n");
+        const std::string strLine = tool::compactJson(jToken) + "\n";
+        end.add(strLine);
+        write(strLine);
         progress.step();
     }
+    write(tool::compactJson(end.json(jTokens.size())) + "\n");
 }
 
 int exportTokens(const Options& options)

@@ -12,6 +12,7 @@
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
+#include "ExportEnd.h"
 #include "InputFile.h"
 #include "Json.h"
 #include "Store.h"
@@ -20,6 +21,7 @@
 namespace {
 
 struct Options {
+    bool blPartial = false;
     std::vector<std::string> strFiles;
 };
 
@@ -27,6 +29,12 @@ struct Options {
 struct Line {
     size_t nNumber;
     Json::Value jToken;
+};
+
+// The tokens of a file, and why it is no whole export; "" when it is one.
+struct Contents {
+    std::vector<Line> lines;
+    std::string strFlaw = "the export has no end";
 };
 
 [[noreturn]] void failOnReading(const std::string& strFile)
@@ -73,53 +81,88 @@ void checkRecord(const Json::Value& jToken)
     }
 }
 
-// The sentence about a bad line.
+// The sentence about a file that is not imported.
+tool::Failure badFile(const std::string& strFile, const std::string& strReason, const std::string& strHint)
+{
+    return tool::Failure(tool::EXIT_STATUS_USAGE,
+                         strFile + ": " + strReason + "; nothing of this file was imported", strHint);
+}
+
+std::string lineText(size_t nLine, const std::string& strText)
+{
+    return "line " + std::to_string(nLine) + " " + strText;
+}
+
 tool::Failure badLine(const std::string& strFile, size_t nLine, const std::string& strReason)
 {
-    return tool::Failure(tool::EXIT_STATUS_USAGE, strFile + ": line " + std::to_string(nLine) + " " +
-                                                      strReason + "; nothing of this file was imported");
+    return badFile(strFile, lineText(nLine, strReason), "");
 }
 
-Json::Value recordOf(const std::string& strText)
+Json::Value objectOf(const std::string& strText)
 {
-    if (strText.find('\0') != std::string::npos) {
-        throw tool::BadValue("holds a NUL byte");
+    return tool::parseObject(strText, tool::NESTED_MAX + 1); // objects in a record
+}
+
+// Whether a last line, without a line feed, is the beginning of one.
+bool isCutOff(const std::string& strText)
+{
+    try {
+        objectOf(strText);
+        return false;
+    } catch (const tool::BadValue&) {
+        return strText[0] == '{';
     }
-    Json::Value jToken = tool::parseObject(strText, tool::NESTED_MAX + 1); // objects in a record
-    checkRecord(jToken);
-    return jToken;
 }
 
-std::vector<Line> readLines(std::istream& stream, const std::string& strFile)
+Contents readLines(std::istream& stream, const std::string& strFile)
 {
-    std::vector<Line> lines;
+    Contents contents;
     std::map<std::string, size_t> lineOf;
+    tool::ExportEnd end;
+    bool blEnded = false;
     std::string strText;
     for (size_t nLine = 1; std::getline(stream, strText); ++nLine) {
-        if (strText.find_first_not_of(" \t\r") == std::string::npos) {
-            continue;
-        }
         try {
-            const Json::Value jToken = recordOf(strText);
-            const auto [pFirst, blNew] = lineOf.emplace(jToken["tid"].asString(), nLine);
-            if (!blNew) {
-                throw tool::BadValue("has the id of line " + std::to_string(pFirst->second));
+            if (blEnded) {
+                throw tool::BadValue("stands behind the end of the export");
             }
-            lines.push_back({nLine, jToken});
+            if (strText.find('\0') != std::string::npos) {
+                throw tool::BadValue("holds a NUL byte");
+            }
+            if (stream.eof() && isCutOff(strText)) {
+                contents.strFlaw += ", and " + lineText(nLine, "is cut off");
+                break;
+            }
+            if (strText.find_first_not_of(" \t\r") != std::string::npos) {
+                const Json::Value jLine = objectOf(strText);
+                if (tool::ExportEnd::is(jLine)) {
+                    const std::string strFlaw = end.flawOf(jLine, contents.lines.size());
+                    contents.strFlaw = strFlaw.empty() ? "" : lineText(nLine, strFlaw);
+                    blEnded = true;
+                    continue;
+                }
+                checkRecord(jLine);
+                const auto [pFirst, blNew] = lineOf.emplace(jLine["tid"].asString(), nLine);
+                if (!blNew) {
+                    throw tool::BadValue("has the id of line " + std::to_string(pFirst->second));
+                }
+                contents.lines.push_back({nLine, jLine});
+            }
+            end.add(strText + "\n");
         } catch (const tool::BadValue& bad) {
             throw badLine(strFile, nLine, bad.what());
         }
     }
-    return lines;
+    return contents;
 }
 
-std::vector<Line> readStream(std::istream& stream, const std::string& strFile)
+Contents readStream(std::istream& stream, const std::string& strFile)
 {
     try {
         stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts a line short
-        std::vector<Line> lines = readLines(stream, strFile);
+        Contents contents = readLines(stream, strFile);
         if (!ferror(stdin)) {
-            return lines;
+            return contents;
         }
     } catch (const std::ios_base::failure&) {
     }
@@ -131,7 +174,7 @@ std::string nameOf(const std::string& strFile)
     return strFile == "-" ? "standard input" : tool::shownPath(strFile);
 }
 
-std::vector<Line> readFile(const std::string& strFile)
+Contents readFile(const std::string& strFile)
 {
     if (strFile == "-") {
         return readStream(std::cin, nameOf(strFile));
@@ -144,9 +187,13 @@ std::vector<Line> readFile(const std::string& strFile)
     }
 }
 
-void importFile(const std::string& strFile)
+void importFile(const std::string& strFile, bool blPartial)
 {
-    const std::vector<Line> lines = readFile(strFile);
+    const Contents contents = readFile(strFile);
+    const std::vector<Line>& lines = contents.lines;
+    if (!contents.strFlaw.empty() && !blPartial) {
+        throw badFile(nameOf(strFile), contents.strFlaw, "--partial imports what is there");
+    }
     tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
     size_t nExpired = 0;
     {
@@ -162,6 +209,9 @@ void importFile(const std::string& strFile)
     }
     store.commit();
     tool::print(tool::countText(lines.size(), "token") + " imported\n");
+    if (!contents.strFlaw.empty()) {
+        tool::complain(nameOf(strFile) + ": " + contents.strFlaw + "; the whole lines were imported");
+    }
     if (nExpired) {
         tool::complain(std::to_string(nExpired) +
                        " of them expired: the next call of a program purges those");
@@ -171,7 +221,7 @@ void importFile(const std::string& strFile)
 int importTokens(const Options& options)
 {
     for (const std::string& strFile : options.strFiles) {
-        importFile(strFile);
+        importFile(strFile, options.blPartial);
     }
     return tool::EXIT_STATUS_DONE;
 }
@@ -186,6 +236,8 @@ void addImport(Commands& commands)
     Command& command =
         commands.add("import", "create the tokens of files that export wrote; all of a file or none",
                      [pOptions] { return importTokens(*pOptions); });
+    command.flag("--partial", pOptions->blPartial,
+                 "import what is there of an export that is not whole or was changed");
     const auto add = [pOptions](const std::string& strFile) {
         if (strFile.empty()) {
             throw BadValue("must not be empty");

@@ -1,5 +1,6 @@
 #include "Scene.h"
 
+#include <sha2.h>
 #include <signal.h>
 
 #include <algorithm>
@@ -61,6 +62,15 @@ std::string line(const std::string& strName)
     return R"({"bind_sid":"","count":2,"create_time":1,"deadline":4102444800,"extra":{"n":[1.5,"x"]},)"
            R"("function":"VPN","tid":")" +
            strTid + R"(","uid":0,"webapi_allow":{"Example.Api":{"method":["get"]}}})" + "\n";
+}
+
+// An export of two tokens.
+std::string exported()
+{
+    const std::string strLines = line("four") + line("five");
+    char szDigest[SHA256_DIGEST_STRING_LENGTH];
+    SHA256Data(reinterpret_cast<const uint8_t*>(strLines.data()), strLines.size(), szDigest);
+    return strLines + R"({"end":{"sha256":")" + szDigest + R"(","tokens":2}})" + "\n";
 }
 
 // What the tool said, without what differs from run to run: fresh ids, times, and the name of a user, which
@@ -130,7 +140,7 @@ void Scene::prepare() const
 {
     fs::remove_all(m_strFiles);
     fs::create_directory(m_strFiles);
-    std::ofstream(m_strFiles + "/IN") << line("four") << line("five");
+    std::ofstream(m_strFiles + "/IN") << exported();
     std::ofstream(m_strFiles + "/OUT") << OLD_FILE;
     fs::create_directory(m_store.directory());
     prepareStore(m_store, m_blStore ? operations().back() : operations().front());

@@ -6,6 +6,7 @@
 #   row NAME [COLUMN = VALUE, ...]  a token whose id is the name, of 8 characters, and $ZEROS; behind the tool's
 #                           back. Its fields are those of ROW, which a file can set otherwise.
 #   state                   what there is of the private directory, to the byte
+#   whole                   the lines of standard input as a whole export: with the end behind them
 #   run_tool ARGUMENTS...   runs it: $status, $output (standard output), $lines (of it, but for empty ones), $stderr
 
 bats_require_minimum_version 1.5.0
@@ -61,6 +62,16 @@ row()
     [ -e "$DB" ] || tool init >/dev/null
     sql "INSERT INTO token VALUES ('$1$ZEROS', $ROW);
          ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
+}
+
+whole()
+{
+    local lines
+    lines=$(mktemp "$BATS_TEST_TMPDIR.XXXXXX")
+    cat >"$lines"
+    cat "$lines"
+    printf '{"end":{"sha256":"%s","tokens":%d}}\n' "$(sha256sum <"$lines" | cut -c 1-64)" \
+        "$(grep -c '[^[:space:]]' "$lines")"
 }
 
 state()

@@ -64,8 +64,7 @@ run_waiting()
 a_store()
 {
     ID=$(a_token --allow Api:get --uses 5 --ttl 90m) # for half an hour, it will show "in 1 h"
-    tool export "$DIR/other" 2>/dev/null
-    sed -i 's/"tid":"......../"tid":"________/' "$DIR/other"
+    tool export 2>/dev/null | sed '$d; s/"tid":"......../"tid":"________/' | whole >"$DIR/other"
     sql "INSERT INTO token SELECT 'old' || tid, 'old', uid, strftime('%s', 'now') - 5400, count, create_time, function,
          webapi_allow, extra FROM token"
 }

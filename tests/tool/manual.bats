@@ -126,6 +126,12 @@ TABLE
     section DIAGNOSTICS | sed -n 's/^\.It "\(.*\)"$/\1/p' | sed 's/\.\.\., /...\n/; s/, \.\.\. /\n... /' | diff "$DIR/sentences" -
 }
 
+# What there is on this machine.
+all()
+{
+    sql "SELECT * FROM token ORDER BY tid"
+}
+
 # Prints each literal block of the examples as a file of its own, in order.
 example_blocks()
 {
@@ -167,9 +173,10 @@ run_block()
     [ -z "$command" ] || run_example "$command" "$shown"
 }
 
-@test "the examples of the page do what it says, one after the other" {
-    local block i
-    mkdir "$DIR/bin" "$DIR/blocks" "$DIR/metrics"
+# tool_on_path: the tool, by its name, on this machine and on that of "ssh root@new"
+tool_on_path()
+{
+    mkdir "$DIR/bin"
     ln -s "$TOOL" "$DIR/bin/vemo-access-token"
     PATH=$DIR/bin:$PATH
     ssh()
@@ -177,6 +184,12 @@ run_block()
         [ "$1" = root@new ]
         VEMO_REDIRECT_DIR=$DIR/new "${@:2}"
     }
+}
+
+@test "the examples of the page do what it says, one after the other" {
+    local block i
+    mkdir "$DIR/blocks" "$DIR/metrics"
+    tool_on_path
     tool init
     tool create --uid 0 --function VPN --tid "21IRmWbM$(tool generate)"
     for i in 1 2 3; do
@@ -209,4 +222,35 @@ run_block()
     [ "$(VEMO_REDIRECT_DIR=$DIR/new tool list --no-header --field function)" = nightly-backup ]
     [ "$(tool list --count)" -eq 0 ]
     [ "$(stat -c %a "$DIR/backup-token" "$DIR/tokens.jsonl" | sort -u)" = 600 ]
+}
+
+@test "the move to another machine deletes nothing unless all has arrived" {
+    mkdir "$DIR/blocks"
+    tool_on_path
+    a_token >/dev/null
+    a_token >/dev/null
+    example_blocks "$DIR/blocks"
+    grep -lF root@new "$DIR"/blocks/* >"$DIR/move"
+    [ "$(wc -l <"$DIR/move")" -eq 1 ]
+    sed -n 's/^# //p; s/^    //p' "$(cat "$DIR/move")" >"$DIR/commands"
+    [ "$(tail -n 1 "$DIR/commands" | grep -c 'revoke --all --yes')" -eq 1 ]
+    before=$(all)
+
+    # What the new machine is asked, and what becomes of it.
+    local fault
+    while read -r fault; do
+        echo "$fault"
+        rm -rf "$DIR/new"
+        bash -c "
+            ssh() ( VEMO_REDIRECT_DIR=$DIR/new; shift; $fault; \"\$@\" )
+            . $DIR/commands" || true
+        [ "$(all)" = "$before" ]
+    done <<'TABLE'
+[ $2 != init ] || return 255
+[ $2 != import ] || return 255
+[ $2 != export ] || return 255
+[ $2 != import ] || set -- sh -c 'head -n 1 | vemo-access-token import -'
+[ $2 != export ] || set -- vemo-access-token purge
+return 255
+TABLE
 }

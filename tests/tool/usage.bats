@@ -95,7 +95,7 @@ revoke|--uid --user --function --bind-sid --all --dry-run --yes
 purge|--dry-run
 stats|--prometheus -o,--output --no-header
 export|
-import|
+import|--partial
 init|
 doctor|--repair -o,--output
 tune|--wal --undo --dry-run --no-header
@@ -203,6 +203,8 @@ TABLE
 }
 
 # At each limit the program ends in the loader, as that says; for want of memory, as the tool says; or as ever.
+# The loader itself crashes where it has no memory for a table of its own, and does so when it only lists the
+# libraries.
 @test "memory that is short from the start is told, and ends in no crash" {
     local limit statuses=" "
     ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
@@ -210,6 +212,12 @@ TABLE
     for limit in $(seq 5000 16 12000); do
         status=0
         stderr=$( (ulimit -v "$limit" && exec "$TOOL" generate more) 2>&1) || status=$?
+        if [ "$status" -eq 139 ]; then
+            status=0
+            (ulimit -v "$limit" && LD_TRACE_LOADED_OBJECTS=1 exec "$TOOL") >/dev/null 2>&1 || status=$?
+            [ "$status" -eq 139 ]
+            continue
+        fi
         [[ $statuses == *" $status "* ]] || statuses+="$status "
         [ "$status" -ne 4 ] || [ "$stderr" = "vemo-access-token: out of memory" ]
         [ "$status" -ne 2 ] || [ "$stderr" = 'vemo-access-token: unexpected argument "more"' ]

@@ -36,7 +36,8 @@ _vemo_access_token()
         stats) options="--prometheus $table_form" ;;
         doctor) options="--repair $form" ;;
         tune) options='--wal --undo --dry-run --no-header' ;;
-        generate | export | import | init) options= ;;
+        import) options='--partial' ;;
+        generate | export | init) options= ;;
         '')
             local commands='create generate list show check grant update revoke purge stats export
                 import init doctor tune'

@@ -96,6 +96,8 @@ __vemo_access_token_option 'revoke purge' dry-run 'Only tell how many'
 
 __vemo_access_token_option stats prometheus "As metrics for Prometheus' node exporter"
 
+__vemo_access_token_option import partial 'What is there of an export that is not whole'
+
 __vemo_access_token_option doctor repair 'Repair what can be'
 
 __vemo_access_token_option tune wal 'The write-ahead journal too'
