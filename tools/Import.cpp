@@ -7,7 +7,6 @@
 #include <map>
 #include <memory>
 
-#include "AccessTokenDefine.h"
 #include "AccessTokenUtil.h"
 #include "Arguments.h"
 #include "Commands.h"
@@ -42,25 +41,24 @@ struct Contents {
     throw tool::Failure(tool::EXIT_STATUS_USAGE, strFile + ": " + strerror(errno));
 }
 
-// Throws BadValue unless a record is one that the library would have created.
+// Throws BadValue unless a record is one that the store can hold: what programs save there is not always what
+// they could create.
 void checkRecord(const Json::Value& jToken)
 {
-    const std::vector<std::string> strNames = tool::fieldNames();
-    for (const std::string& strName : strNames) {
+    for (const std::string& strName : tool::fieldNames()) {
         if (!jToken.isMember(strName)) {
             throw tool::BadValue("has no \"" + strName + "\"");
         }
         const Json::Value& jDefault = VEMO_ACCESS_TOKEN::tokenType()[strName][1];
         const Json::Value& jValue = jToken[strName];
-        const bool blNumber = jDefault.isIntegral();
         const bool blWhole = jValue.isInt64() && Json::realValue != jValue.type();
-        if (blNumber ? !blWhole : jDefault.type() != jValue.type()) {
-            throw tool::BadValue("\"" + strName + "\" is no " +
-                                 (blNumber              ? "whole number"
-                                  : jDefault.isString() ? "string"
-                                                        : "object"));
+        if (jDefault.isIntegral() && !blWhole) {
+            throw tool::BadValue("\"" + strName + "\" is no whole number");
         }
-        if (jValue.isString() && jValue.asString().find('\0') != std::string::npos) {
+        if (jDefault.isString() && !jValue.isString()) {
+            throw tool::BadValue("\"" + strName + "\" is no string");
+        }
+        if (jDefault.isString() && jValue.asString().find('\0') != std::string::npos) {
             throw tool::BadValue("\"" + strName + "\" holds a NUL character");
         }
     }
@@ -68,16 +66,6 @@ void checkRecord(const Json::Value& jToken)
         if (!VEMO_ACCESS_TOKEN::tokenType().isMember(strName)) {
             throw tool::BadValue(tool::quoted(strName) + " is no field of a token");
         }
-    }
-    if (jToken["tid"].asString().size() < VEMO_ATOKEN_LENGTH_MIN) {
-        throw tool::BadValue("\"tid\" is shorter than " + std::to_string(VEMO_ATOKEN_LENGTH_MIN) +
-                             " characters");
-    }
-    if (jToken["function"].asString().empty()) {
-        throw tool::BadValue("\"function\" is empty");
-    }
-    if (jToken["uid"].asInt64() < 0 || jToken["uid"].asInt64() >= Json::Int64{UID_ERR}) {
-        throw tool::BadValue("\"uid\" is no user's number");
     }
 }
 
@@ -199,7 +187,9 @@ void importFile(const std::string& strFile, bool blPartial)
     {
         tool::Progress progress("Importing", lines.size());
         for (const Line& line : lines) {
-            if (store.find(line.jToken["tid"].asString())) {
+            Json::Value jFilter;
+            jFilter["tid"] = line.jToken["tid"];
+            if (!store.tokens(jFilter).empty()) {
                 throw badLine(nameOf(strFile), line.nNumber, "has the id of a token that is there already");
             }
             store.create(line.jToken);

@@ -42,6 +42,25 @@ std::string firstError(const std::string& strReport)
                                                                        : strError;
 }
 
+enum class Reading { Whole, Bad, TooDeep };
+
+Reading read(Json::CharReader& reader, const std::string& strText, Json::Value& jValue,
+             std::string& strReport)
+{
+    const auto parse = [&] {
+        return reader.parse(strText.data(), strText.data() + strText.size(), &jValue, &strReport);
+    };
+    try {
+        // A text is bad when it is so twice: the reader takes a number for none when memory runs out.
+        return parse() || parse() ? Reading::Whole : Reading::Bad;
+    } catch (const Json::RuntimeError& error) {
+        if (!strstr(error.what(), "stackLimit")) {
+            throw; // memory ran out
+        }
+        return Reading::TooDeep;
+    }
+}
+
 } // namespace
 
 namespace tool {
@@ -55,24 +74,33 @@ Json::Value parseObject(const std::string& strText, int nNestedMax)
     const std::unique_ptr<Json::CharReader> pReader(builder.newCharReader());
     Json::Value jValue;
     std::string strReport;
-    const auto parse = [&] {
-        return pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, &strReport);
-    };
-    try {
-        // A text is bad when it is so twice: the reader takes a number for none when memory runs out.
-        if (!parse() && !parse()) {
-            throw BadValue("is no JSON: " + shownReason(firstError(strReport)));
-        }
-    } catch (const Json::RuntimeError& error) {
-        if (!strstr(error.what(), "stackLimit")) {
-            throw; // memory ran out
-        }
-        throw BadValue("is nested too deeply for JSON");
+    switch (read(*pReader, strText, jValue, strReport)) {
+    case Reading::Whole: break;
+    case Reading::Bad: throw BadValue("is no JSON: " + shownReason(firstError(strReport)));
+    case Reading::TooDeep: throw BadValue("is nested too deeply for JSON");
     }
     if (!jValue.isObject()) {
         throw BadValue("is no JSON object");
     }
     return jValue;
+}
+
+std::string flawOfStored(const std::string& strText)
+{
+    static const std::unique_ptr<Json::CharReader> pReader = [] {
+        Json::CharReaderBuilder builder; // as lenient as the library
+        builder["allowSpecialFloats"] = true;
+        builder["stackLimit"] = NESTED_MAX;
+        return std::unique_ptr<Json::CharReader>(builder.newCharReader());
+    }();
+    Json::Value jValue;
+    std::string strReport;
+    switch (read(*pReader, strText, jValue, strReport)) {
+    case Reading::Whole: break;
+    case Reading::Bad: return "is no JSON";
+    case Reading::TooDeep: return "is nested too deeply";
+    }
+    return "";
 }
 
 std::string compactJson(const Json::Value& jValue)

@@ -15,6 +15,9 @@ const int NESTED_MAX = 1000;
 // Reads one JSON object, strictly. Throws BadValue.
 Json::Value parseObject(const std::string& strText, int nNestedMax = NESTED_MAX);
 
+// Why the library does not read all of a text that a token holds, as the rest of a sentence; "" when it does.
+std::string flawOfStored(const std::string& strText);
+
 // On one line. As all JSON that is written, it escapes what cannot be seen.
 std::string compactJson(const Json::Value& jValue);
 
