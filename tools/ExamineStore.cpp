@@ -164,11 +164,20 @@ void examineTexts(Store& store, Findings& findings)
     const auto isText = [](const Json::Value& jDefault) { return jDefault.isString(); };
     const std::string strWhere = anyField(isText, "typeof(?) NOT IN ('text', 'null')");
     if (isAny(store, strWhere)) {
+        std::string strTexts;
+        for (const std::string& strName : tool::fieldNames()) {
+            if (isText(VEMO_ACCESS_TOKEN::tokenType()[strName][1])) {
+                strTexts += (strTexts.empty() ? "" : ", ") + strName + " = CAST(" + strName + " AS TEXT)";
+            }
+        }
         findings.push_back({Finding::Severity::Error,
                             "bytes where there should be a text in " + tokensOf(store, strWhere),
                             "no look-up by that field finds such a token",
-                            "export all, revoke all and import: that makes texts of them",
-                            {}});
+                            "make texts of them: vemo-access-token doctor --repair", [strWhere, strTexts] {
+                                Store repaired(Store::Access::Write);
+                                repaired.query("UPDATE token SET " + strTexts + " WHERE " + strWhere);
+                                repaired.commit();
+                            }});
     }
 }
 

@@ -366,16 +366,32 @@ error: $REAL_DB: Too many levels of symbolic links
     [[ ${lines[0]} != *6aaaaaaa* ]]
 }
 
-@test "bytes in place of a text, which no look-up finds, are a finding" {
-    local column
+@test "texts are made of bytes in place of a text, which no look-up finds" {
+    local what="bytes where there should be a text in 1 token (aaaaaaaa)" column
+    local meaning="no look-up by that field finds such a token"
     for column in tid bind_sid function; do
         a_row aaaaaaaa
-        sql "UPDATE token SET $column = CAST($column || 'x' AS BLOB)"
-        run_tool doctor
-        [ "$status" -eq 5 ]
-        [[ ${lines[0]} == "error: "*"1 token (aaaaaaaa)" ]]
+        a_row bbbbbbbb
+        sql "UPDATE token SET $column = $column || 'x' WHERE tid LIKE 'a%'"
+        sql "SELECT * FROM token" >"$DIR/texts"
+        sql "UPDATE token SET $column = CAST($column AS BLOB) WHERE tid LIKE 'a%'"
+        expect_finding error "$what" "$meaning" "make texts of them: vemo-access-token doctor --repair"
+        expect_repair "$what" "$meaning"
+        sql "SELECT * FROM token" | diff "$DIR/texts" -
+        [ "$(sql "SELECT DISTINCT typeof($column) FROM token")" = text ]
         sql "DELETE FROM token"
     done
+}
+
+@test "bytes are left as they are where the text is another token's id" {
+    a_row aaaaaaaa
+    sql "INSERT INTO token SELECT CAST(tid AS BLOB), 's', uid, deadline, count, create_time, function, webapi_allow, extra
+         FROM token"
+    sql ".dump" >"$DIR/before"
+    run_tool doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$stderr" = "vemo-access-token: cannot repair: $REAL_DB failed: UNIQUE constraint failed: token.tid" ]
+    sql ".dump" | diff "$DIR/before" -
 }
 
 @test "deadlines that the purge will take are left to the administrator" {
