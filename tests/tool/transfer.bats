@@ -310,14 +310,16 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
 # --- import
 
 @test "tokens come back from an export as they were, whatever they hold" {
+    local seed=${VEMO_TEST_SEED-1} count=$((500 * ${VEMO_TEST_FACTOR-1}))
+    echo "seed $seed"
     awkward_rows
-    local rows
-    rows=$(all_rows)
+    /usr/bin/python3 "$BATS_TEST_DIRNAME/odd_rows.py" "$DB" "$seed" "$count"
+    all_rows >"$DIR/rows"
+    [ "$(wc -l <"$DIR/rows")" -eq $((7 + count)) ]
     tool export "$DIR/file"
     sql "DELETE FROM token"
-    run_tool import "$DIR/file"
-    expect 0 "7 tokens imported" "vemo-access-token: 1 of them expired: the next call of a program purges those"
-    [ "$(all_rows)" = "$rows" ]
+    tool import "$DIR/file"
+    all_rows | cmp "$DIR/rows" -
     tool export "$DIR/again"
     cmp "$DIR/file" "$DIR/again"
 }
