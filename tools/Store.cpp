@@ -329,9 +329,21 @@ uint64_t Store::purge()
     return number("SELECT changes()");
 }
 
+std::string Store::tableKind()
+{
+    return text("SELECT iif(sql LIKE 'CREATE VIRTUAL %', 'virtual table', type) FROM sqlite_schema "
+                "WHERE type IN ('table', 'view') AND name = 'token' COLLATE NOCASE");
+}
+
 bool Store::hasTable()
 {
-    return 0 != number("SELECT count(*) FROM sqlite_schema WHERE type = 'table' AND name = 'token'");
+    const std::string strKind = tableKind();
+    if (!strKind.empty() && strKind != "table") {
+        throw Failure(EXIT_STATUS_STORE,
+                      VEMO_ATOKEN_DB_PATH " has a " + strKind + " in the place of the table of tokens",
+                      "\"vemo-access-token doctor\" tells what helps");
+    }
+    return !strKind.empty();
 }
 
 bool Store::makeTable()

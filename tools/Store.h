@@ -91,7 +91,11 @@ public:
     // Deletes the expired tokens, as the library does. Returns how many there were.
     uint64_t purge();
 
-    // Whether there is a table of tokens.
+    // What there is under the name of the table of tokens: "table", "view" or "virtual table"; "" for
+    // nothing.
+    std::string tableKind();
+
+    // Whether there is a table of tokens, and fails where something else is in its place.
     bool hasTable();
 
     // Makes the table where it is missing, and returns whether it was. Without a transaction.

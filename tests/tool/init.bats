@@ -95,6 +95,23 @@ made the table of tokens"
     cmp "$DB" "$DIR/text"
 }
 
+@test "init says what has the name of the table, and makes none beside it" {
+    local statement sentence
+    while IFS='|' read -r statement sentence; do
+        rm -rf "$VEMO_REDIRECT_DIR"
+        tool init
+        sql "DROP TABLE token; $statement"
+        sql .schema >"$DIR/before"
+        run_tool init
+        expect 4 "" "vemo-access-token: $REAL_DB $sentence"
+        [ "$(sql .schema)" = "$(cat "$DIR/before")" ]
+    done <<'TABLE'
+CREATE TABLE other (tid); CREATE VIEW token AS SELECT * FROM other|has a view in the place of the table of tokens; "vemo-access-token doctor" tells what helps
+CREATE VIRTUAL TABLE Token USING fts4(tid)|has a virtual table in the place of the table of tokens; "vemo-access-token doctor" tells what helps
+CREATE TABLE other (tid); CREATE INDEX token ON other (tid)|failed: there is already an index named token
+TABLE
+}
+
 @test "bad arguments of init end in a sentence that names them" {
     run_tool init now
     expect 2 "" "vemo-access-token: unexpected argument \"now\""
