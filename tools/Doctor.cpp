@@ -1,5 +1,6 @@
 // doctor: says what is wrong, what that means and what helps.
 
+#include <algorithm>
 #include <memory>
 
 #include "Commands.h"
@@ -74,6 +75,13 @@ void report(const tool::Findings& repaired, const tool::Findings& left, const to
     }
 }
 
+bool contains(const tool::Findings& findings, const Finding& wanted)
+{
+    return std::any_of(findings.begin(), findings.end(),
+                       [&wanted](const Finding& each) { return each.strWhat == wanted.strWhat; });
+}
+
+// Returns whether the repair was carried out.
 bool repair(const Finding& finding)
 {
     try {
@@ -85,33 +93,39 @@ bool repair(const Finding& finding)
     }
 }
 
-// Repairs what can be repaired, and what comes to light by that, until one fails. Returns what was.
-tool::Findings repairAll()
+// Repairs what can be repaired, and looks again. Returns whether that helped: no repair failed, and what was
+// repaired is not found any more.
+bool repairOnce(tool::Findings& repaired, tool::Findings& left)
 {
-    tool::Findings repaired;
-    bool blMore = true;
-    bool blFailed = false;
-    for (int i = 0; blMore && !blFailed && i < ROUNDS_MAX; ++i) {
-        blMore = false;
-        for (const Finding& finding : tool::examine()) {
-            if (!finding.repair) {
-                continue;
-            }
-            if (repair(finding)) {
-                repaired.push_back(finding);
-                blMore = true;
-            } else {
-                blFailed = true;
-            }
+    tool::Findings tried;
+    bool blHelped = true;
+    for (const Finding& finding : left) {
+        if (finding.repair && repair(finding)) {
+            tried.push_back(finding);
+        } else if (finding.repair) {
+            blHelped = false;
         }
     }
-    return repaired;
+    left = tool::examine();
+    for (const Finding& finding : tried) {
+        if (contains(left, finding)) {
+            tool::complain("the repair did not help: " + finding.strWhat);
+            blHelped = false;
+        } else {
+            repaired.push_back(finding);
+        }
+    }
+    return blHelped && !tried.empty();
 }
 
 int doctor(const Options& options)
 {
-    const tool::Findings repaired = options.blRepair ? repairAll() : tool::Findings();
-    const tool::Findings left = tool::examine();
+    tool::Findings repaired;
+    tool::Findings left = tool::examine();
+    if (options.blRepair) {
+        for (int i = 0; i < ROUNDS_MAX && repairOnce(repaired, left); ++i) {
+        }
+    }
     report(repaired, left, options.layout);
     return left.empty() ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_FINDINGS;
 }

@@ -228,6 +228,17 @@ error: $DIRECTORY cannot be written to: Read-only file system
     remedy: make the file system writable, or the directory" "vemo-access-token: cannot repair: $DIRECTORY: Read-only file system"
 }
 
+@test "a repair that does not help is told, and not called one" {
+    a_row aaaaaaaa
+    echo 'int chmod() { return 0; } int fchmod() { return 0; } int fchmodat() { return 0; }' |
+        cc -shared -fPIC -w -fno-builtin -x c -o "$DIR/no-chmod.so" - || skip "no C compiler"
+    chmod 0750 "$DB"
+    LD_PRELOAD=$DIR/no-chmod.so run_tool doctor --repair
+    expect 5 "error: $REAL_DB has mode 0750
+    meaning: others than root can use it, and ids are credentials
+    remedy: chmod 0700 $REAL_DB" "vemo-access-token: the repair did not help: $REAL_DB has mode 0750"
+}
+
 @test "a place that cannot be looked at is a finding" {
     ln -s session "$VEMO_REDIRECT_DIR"
     run_tool doctor
