@@ -24,9 +24,14 @@ typedef std::vector<Finding> Findings;
 // Everything that is wrong now. What cannot be looked at because of one finding is left out.
 Findings examine();
 
-// Its two parts, which add to the findings. The first returns whether the database can be opened.
+// Its parts, which add to the findings. The first returns whether the database can be opened.
 bool examinePlace(Findings& findings);
 void examineStore(Findings& findings);
+
+// Parts of the place: whether a directory or a file can be written to, and the rest of what keeps programs
+// from writing.
+void examineWritability(const std::string& strPath, Findings& findings);
+void examineFileSystem(Findings& findings);
 
 } // namespace tool
 

@@ -65,19 +65,19 @@ Descriptor openTrustedDirectory()
 }
 
 // A file of that directory, which must be root's alone by now: nobody can have put a link in its place.
-Descriptor openTrustedFile()
+Descriptor openTrustedFile(const std::string& strSuffix)
 {
     const Descriptor directory = openTrustedDirectory();
     if (!isPrivate(tool::statusOf(directory))) {
         throw tool::Failure(tool::EXIT_STATUS_STORE, tool::databaseDirectory() + " is not root's alone");
     }
-    Descriptor file = tool::openRegular(directory, tool::databaseName());
+    Descriptor file = tool::openRegular(directory, tool::databaseName() + strSuffix);
+    const std::string strPath = VEMO_ATOKEN_DB_PATH + strSuffix;
     if (!file.isOpen()) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE,
-                            tool::badPath(VEMO_ATOKEN_DB_PATH, VEMO_ATOKEN_DB_PATH).what());
+        throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(strPath, strPath).what());
     }
     if (1 != tool::statusOf(file).st_nlink) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, VEMO_ATOKEN_DB_PATH " has several hard links");
+        throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + " has several hard links");
     }
     return file;
 }
@@ -97,6 +97,19 @@ void makePrivate(const std::string& strPath, const Open& open)
     requireCall(fchown(file.get(), 0, static_cast<gid_t>(-1)), strPath);
     requireCall(fchmod(file.get(), PRIVATE_MODE), strPath);
     Store::settleChange();
+}
+
+// The repair of owner and mode of the database, or of a journal with this suffix. Only in a directory that is
+// root's alone is it certain that this is the one: that is repaired first.
+std::function<void()> repairOf(const std::string& strSuffix, const struct stat& status)
+{
+    const auto directory = tool::statusOf(tool::databaseDirectory());
+    if (1 != status.st_nlink || !directory || !isPrivate(*directory)) {
+        return {};
+    }
+    return [strSuffix] {
+        makePrivate(VEMO_ATOKEN_DB_PATH + strSuffix, [&strSuffix] { return openTrustedFile(strSuffix); });
+    };
 }
 
 // Owner and mode of what should be root's alone. The repair is for both.
@@ -168,26 +181,56 @@ bool examineDirectory(Findings& findings)
                                 {}});
         }
     }
-    if (0 != access(walk.path().c_str(), W_OK)) {
-        findings.push_back({Finding::Severity::Error,
-                            walk.path() + " cannot be written to: " + strerror(errno),
-                            "no token can be created, changed or granted",
-                            "make the file system writable, or the directory",
-                            {}});
-    }
+    tool::examineWritability(walk.path(), findings);
     return true;
 }
 
-// Returns whether the file can be opened.
-bool examineFile(Findings& findings)
+// Returns whether the database can be opened: whoever opens it opens what has these names, too.
+bool examineBeside(Findings& findings)
+{
+    bool blHarmless = true;
+    for (const std::string strSuffix : tool::JOURNAL_SUFFIXES) {
+        const std::string strPath = VEMO_ATOKEN_DB_PATH + strSuffix;
+        const auto status = tool::statusOf(strPath);
+        if (!status) {
+            continue;
+        }
+        const std::string strRemedy = "find out who made it; remove it while no program runs";
+        if (!S_ISREG(status->st_mode)) {
+            findings.push_back(
+                {Finding::Severity::Error,
+                 strPath + (S_ISLNK(status->st_mode) ? " is a symbolic link" : " is no regular file"),
+                 "the database takes it for a journal of its own: calls can fail, or never end", strRemedy,
+                 {}});
+            blHarmless = false;
+        } else if (0 != status->st_uid) {
+            findings.push_back({Finding::Severity::Error,
+                                strPath + " belongs to uid " + std::to_string(status->st_uid),
+                                "the next program to open the database may take its contents for changes",
+                                strRemedy,
+                                {}});
+            blHarmless = false;
+        } else {
+            examinePrivacy(strPath, *status, repairOf(strSuffix, *status), findings);
+        }
+    }
+    return blHarmless;
+}
+
+// Returns whether the file can be opened. A missing one can be made if blMake.
+bool examineFile(bool blMake, Findings& findings)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH;
     const auto status = tool::statusOf(strPath);
     if (!status) {
-        findings.push_back({Finding::Severity::Error, "there is no database " + strPath,
+        findings.push_back({Finding::Severity::Error,
+                            "there is no database " + strPath,
                             "there are no tokens; the first call that needs it makes it",
                             "vemo-access-token init",
-                            [] { Store(Store::Access::Locked, Store::Missing::Make).makeTable(); }});
+                            {}});
+        if (blMake) {
+            findings.back().repair = [] { Store(Store::Access::Locked, Store::Missing::Make).makeTable(); };
+        }
         return false;
     }
     if (!S_ISREG(status->st_mode)) {
@@ -197,7 +240,7 @@ bool examineFile(Findings& findings)
              "programs work on another file than this one, or on none",
              "find out who made it; move the database to this name",
              {}});
-        return S_ISLNK(status->st_mode);
+        return false;
     }
     if (1 != status->st_nlink) {
         findings.push_back(
@@ -207,12 +250,7 @@ bool examineFile(Findings& findings)
              "find -samefile tells the other names; remove those",
              {}});
     }
-    // Only in a directory that is root's alone is it certain that this is the database: that one is repaired
-    // first.
-    const auto directoryStatus = tool::statusOf(tool::databaseDirectory());
-    const bool blRepairable = 1 == status->st_nlink && directoryStatus && isPrivate(*directoryStatus);
-    const auto repair = [] { makePrivate(VEMO_ATOKEN_DB_PATH, openTrustedFile); };
-    examinePrivacy(strPath, *status, blRepairable ? repair : std::function<void()>(), findings);
+    examinePrivacy(strPath, *status, repairOf("", *status), findings);
     return true;
 }
 
@@ -232,26 +270,6 @@ bool examineForeignJournal(Findings& findings)
                         "if the database is complete, remove it while no program runs",
                         {}});
     return false;
-}
-
-// Returns whether the journals are root's. Whoever opens the database can take what stands in them for its
-// own.
-bool examineJournals(Findings& findings)
-{
-    bool blTrusted = true;
-    for (const std::string strSuffix : tool::JOURNAL_SUFFIXES) {
-        const std::string strPath = VEMO_ATOKEN_DB_PATH + strSuffix;
-        const auto status = tool::statusOf(strPath);
-        if (status && 0 != status->st_uid) {
-            blTrusted = false;
-            findings.push_back({Finding::Severity::Error,
-                                strPath + " belongs to uid " + std::to_string(status->st_uid),
-                                "the next program to open the database may take its contents for changes",
-                                "find out who made it; remove it while no program runs",
-                                {}});
-        }
-    }
-    return blTrusted;
 }
 
 // What an export leaves behind that was cut off by a power cut.
@@ -299,7 +317,10 @@ bool examinePlace(Findings& findings)
         return false;
     }
     examineRemains(findings);
-    return examineFile(findings) && examineJournals(findings) && examineForeignJournal(findings);
+    const bool blJournals = examineBeside(findings);
+    const bool blFile = examineFile(blJournals, findings);
+    examineFileSystem(findings);
+    return blJournals && blFile && examineForeignJournal(findings);
 }
 
 } // namespace tool

@@ -322,7 +322,7 @@ TABLE
         run_shortly $arguments
         expect 4 "" "vemo-access-token: $REAL_DB cannot be opened: Permission denied"
     done < <(commands; echo init)
-    doctor_looks "$REAL_DB cannot be opened: Permission denied"
+    doctor_looks "$REAL_DB cannot be written to: Permission denied"
     chmod 0500 "$DB"
     all_fail "$REAL_DB failed: attempt to write a readonly database" "grant $ID Api get
 update $ID --uses 2

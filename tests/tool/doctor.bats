@@ -48,6 +48,21 @@ expect_no_repair()
     expect 5 "$found"
 }
 
+# expect_sound: doctor finds nothing any more
+expect_sound()
+{
+    run_tool doctor
+    expect 0 "no findings"
+}
+
+# never_hang: from now on the tool has some seconds for each command
+never_hang()
+{
+    printf '#!/bin/sh\nexec timeout 20 "%s" "$@"\n' "$TOOL" >"$DIR/shortly"
+    chmod +x "$DIR/shortly"
+    TOOL=$DIR/shortly
+}
+
 # in_namespace COMMANDS ARGUMENTS...: runs them as root of a namespace, where a layer in memory lies over /usr
 in_namespace()
 {
@@ -201,6 +216,72 @@ no findings"
         "find out who made it; move the database to this name"
 }
 
+@test "what stands in the place of a journal and is none is left to the administrator, and not opened" {
+    a_row aaaaaaaa
+    never_hang
+    local suffix make kind
+    for suffix in journal wal shm; do
+        while IFS='|' read -r make kind; do
+            $make "$DB-$suffix"
+            expect_no_repair error "$REAL_DB-$suffix is $kind" \
+                "the database takes it for a journal of its own: calls can fail, or never end" \
+                "find out who made it; remove it while no program runs"
+            rm -d "$DB-$suffix"
+        done <<'TABLE'
+mkfifo|no regular file
+mkdir|no regular file
+ln -s nowhere|a symbolic link
+TABLE
+    done
+    # Nor is a missing database made then.
+    mv "$DB" "$DIR/away"
+    mkfifo "$DB-journal"
+    run_tool doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$stderr" = "" ]
+    [ "${lines[0]}" = "error: $REAL_DB-journal is no regular file" ]
+    [ "${lines[3]}" = "error: there is no database $REAL_DB" ]
+    rm "$DB-journal"
+    mv "$DIR/away" "$DB"
+    expect_sound
+}
+
+@test "journals are as private as the database" {
+    a_row aaaaaaaa
+    sql "PRAGMA journal_mode = PERSIST; UPDATE token SET count = 2"
+    chmod 0640 "$DB-journal"
+    expect_repair "$REAL_DB-journal has mode 0640" "others than root can use it, and ids are credentials"
+    [ "$(stat -c %a "$DB-journal")" = 700 ]
+}
+
+@test "attributes that forbid changes are left to the administrator" {
+    a_row aaaaaaaa
+    chattr +a "$DB" 2>/dev/null || skip "no right to set attributes, or a file system without them"
+    local meaning="no token can be created, changed or granted" wrong=""
+    expect_finding error "$REAL_DB is append-only" "$meaning" "chattr -a $REAL_DB" || wrong=1
+    chattr -a "$DB"
+    chattr +i "$DB" "$VEMO_REDIRECT_DIR"
+    run_tool doctor --repair
+    chattr -i "$DB" "$VEMO_REDIRECT_DIR"
+    expect 5 "error: $DIRECTORY is immutable
+    meaning: $meaning
+    remedy: chattr -i $DIRECTORY
+error: $REAL_DB is immutable
+    meaning: $meaning
+    remedy: chattr -i $REAL_DB"
+    [ ! "$wrong" ]
+    run_tool doctor
+    expect 0 "no findings"
+}
+
+@test "a file that cannot be written to is left to the administrator" {
+    in_namespace '"$1" init >/dev/null && mount --bind "$2" "$2" && mount -o remount,bind,ro "$2" && "$1" doctor --repair' \
+        "$TOOL" "$REAL_DB"
+    expect 5 "error: $REAL_DB cannot be written to: Read-only file system
+    meaning: no token can be created, changed or granted
+    remedy: make the file system writable, or the file"
+}
+
 @test "hard links are left to the administrator" {
     a_row aaaaaaaa
     ln "$DB" "$DIR/second"
@@ -245,7 +326,7 @@ error: $DIRECTORY cannot be written to: Read-only file system
     expect 5 "error: $DIRECTORY is a symbolic link
     meaning: the tokens stand elsewhere, or nowhere
     remedy: find out who made it; move the database to a directory of that name
-error: $REAL_DB: Too many levels of symbolic links
+error: $REAL_DB-journal: Too many levels of symbolic links
     meaning: programs fail in the same way
     remedy: mend the cause, or move the file away and import a backup"
 }
@@ -502,7 +583,7 @@ SQL
 
 @test "an old journal that is empty, or that its program has ended, holds no half change" {
     a_row aaaaaaaa
-    : >"$DB-journal"
+    install -m 0700 /dev/null "$DB-journal"
     touch -d "1 hour ago" "$DB-journal"
     run_tool doctor
     expect 0 "no findings"
@@ -533,7 +614,7 @@ SQL
 
 @test "a write-ahead journal beside a database that has none is left to the administrator" {
     a_row aaaaaaaa
-    echo journal >"$DB-wal"
+    install -m 0700 /dev/stdin "$DB-wal" <<<journal
     expect_no_repair warning "$REAL_DB-wal does not belong to the database" \
         "the database was copied or replaced without it, and may lack changes" \
         "if the database is complete, remove it while no program runs"

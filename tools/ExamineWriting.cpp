@@ -1,0 +1,123 @@
+// What keeps programs from writing: to the directory, the database and its journals.
+
+#include <fcntl.h>
+#include <sys/statvfs.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+#include "AccessTokenDefine.h"
+#include "Examination.h"
+#include "Failure.h"
+#include "Place.h"
+
+namespace {
+
+using tool::Finding;
+using tool::Findings;
+
+const uint64_t ROOM_MIN = 65536; // bytes: the journal of a small change, and the pages that it adds
+
+const char* const UNCHANGEABLE = "no token can be created, changed or granted";
+
+void require(int nResult, const std::string& strPath)
+{
+    if (0 > nResult) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno));
+    }
+}
+
+// A name's file, whatever it is: nothing is read of it, so nothing waits for another end.
+class Handle {
+public:
+    explicit Handle(const std::string& strPath)
+        : m_nFile(open(strPath.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC))
+    {
+        require(m_nFile, strPath);
+    }
+    ~Handle() { close(m_nFile); }
+    Handle(const Handle&) = delete;
+    Handle& operator=(const Handle&) = delete;
+    int get() const { return m_nFile; }
+
+private:
+    const int m_nFile;
+};
+
+// What chattr(1) has set.
+uint64_t attributesOf(const std::string& strPath)
+{
+    const Handle handle(strPath);
+    struct statx status = {};
+    require(statx(handle.get(), "", AT_EMPTY_PATH, STATX_TYPE, &status), strPath);
+    return status.stx_attributes;
+}
+
+bool isReadOnlyFileSystem()
+{
+    return 0 != access(tool::databaseDirectory().c_str(), W_OK) && EROFS == errno;
+}
+
+void examineRoom(Findings& findings)
+{
+    const std::string strPath = tool::databaseDirectory();
+    const Handle handle(strPath);
+    struct statvfs status = {};
+    require(fstatvfs(handle.get(), &status), strPath);
+    // Programs run as root, whom the file system gives its reserve too. Some have no number of files to run
+    // out of.
+    const bool blRoom = uint64_t{status.f_bfree} * status.f_frsize >= ROOM_MIN;
+    const bool blFiles = 0 == status.f_files || 0 != status.f_ffree;
+    if (!blRoom || !blFiles) {
+        findings.push_back(
+            {Finding::Severity::Error,
+             "the file system of " + strPath + " has no room for " + (blRoom ? "another file" : "a change"),
+             UNCHANGEABLE,
+             "remove what is not needed there: \"df " + std::string(blRoom ? "-i " : "") + strPath +
+                 "\" tells how full it is",
+             {}});
+    }
+}
+
+} // namespace
+
+namespace tool {
+
+void examineWritability(const std::string& strPath, Findings& findings)
+{
+    const uint64_t nAttributes = attributesOf(strPath);
+    if (nAttributes & STATX_ATTR_IMMUTABLE) {
+        findings.push_back(
+            {Finding::Severity::Error, strPath + " is immutable", UNCHANGEABLE, "chattr -i " + strPath, {}});
+    }
+    if (nAttributes & STATX_ATTR_APPEND) {
+        findings.push_back({Finding::Severity::Error,
+                            strPath + " is append-only",
+                            UNCHANGEABLE,
+                            "chattr -a " + strPath,
+                            {}});
+    }
+    if (0 == (nAttributes & STATX_ATTR_IMMUTABLE) && 0 != access(strPath.c_str(), W_OK)) {
+        findings.push_back({Finding::Severity::Error,
+                            strPath + " cannot be written to: " + strerror(errno),
+                            UNCHANGEABLE,
+                            std::string("make the file system writable, or the ") +
+                                (strPath == databaseDirectory() ? "directory" : "file"),
+                            {}});
+    }
+}
+
+void examineFileSystem(Findings& findings)
+{
+    if (isReadOnlyFileSystem()) {
+        return; // a finding about the directory
+    }
+    const auto status = statusOf(VEMO_ATOKEN_DB_PATH);
+    if (status && S_ISREG(status->st_mode)) {
+        examineWritability(VEMO_ATOKEN_DB_PATH, findings);
+    }
+    examineRoom(findings);
+}
+
+} // namespace tool
