@@ -6,6 +6,12 @@
 
 namespace tool {
 
+const char* const REMEDY_REPLACE =
+    "stop the programs, move the directory away, run \"vemo-access-token init\" and import a backup";
+const char* const REMEDY_SAVE_AND_REPLACE =
+    "stop the programs, save the tokens with \"vemo-access-token export\", move the directory away, run "
+    "\"vemo-access-token init\" and import them";
+
 Findings examine()
 {
     Findings findings;
@@ -31,7 +37,7 @@ Findings examine()
         findings.push_back({Finding::Severity::Error,
                             failure.fact(),
                             "programs fail in the same way",
-                            "mend the cause, or move the file away and import a backup",
+                            std::string("mend the cause; or ") + REMEDY_REPLACE,
                             {}});
     }
     return findings;

@@ -21,6 +21,10 @@ struct Finding {
 
 typedef std::vector<Finding> Findings;
 
+// What helps where a database cannot stay. Its journals belong to it, so it goes with its directory.
+extern const char* const REMEDY_REPLACE;
+extern const char* const REMEDY_SAVE_AND_REPLACE;
+
 // Everything that is wrong now. What cannot be looked at because of one finding is left out.
 Findings examine();
 

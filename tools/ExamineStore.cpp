@@ -56,9 +56,9 @@ bool examineIntegrity(Store& store, Findings& findings)
     findings.push_back({Finding::Severity::Error,
                         "the database is damaged: " + strReport,
                         "tokens may be lost or wrong",
-                        "save the tokens with \"vemo-access-token export\" if it can still read them; stop "
-                        "the programs, move the file "
-                        "away, and import that or a backup",
+                        std::string(tool::REMEDY_SAVE_AND_REPLACE) +
+                            "; where export fails, import a backup or what sqlite3 can still read: see "
+                            "vemo-access-token(8)",
                         {}});
     return false;
 }
@@ -82,7 +82,7 @@ bool examineTable(Store& store, Findings& findings)
         findings.push_back({Finding::Severity::Error,
                             "the table of tokens lacks columns: " + strMissing,
                             "every call that reads or writes a token fails",
-                            "stop the programs, move the file away, and import a backup",
+                            tool::REMEDY_REPLACE,
                             {}});
     }
     return strMissing.empty();

@@ -215,6 +215,28 @@ create --uid 0 --function TAG"
     cmp "$DB" "$DIR/before"
 }
 
+# As the manual page tells it.
+@test "what can be read of a damaged database can be saved" {
+    a_store
+    sql "WITH RECURSIVE n(i) AS (SELECT 10 UNION ALL SELECT i + 1 FROM n WHERE i < 99)
+         INSERT INTO token SELECT i || substr(tid, 1, 127), bind_sid, uid, deadline, count, create_time,
+         function || char(10), webapi_allow, extra FROM token, n WHERE tid = '$ID'"
+    spoil "$(sql "SELECT max(pageno) FROM dbstat WHERE name = 'token' AND pagetype = 'leaf'")" /dev/zero
+    run_shortly export
+    [ "$status" -eq 4 ]
+    mv "$VEMO_REDIRECT_DIR" "$VEMO_REDIRECT_DIR.old"
+    tool init
+    {
+        sqlite3 "$VEMO_REDIRECT_DIR.old/vemo-access-token.db" .dump 2>/dev/null | grep -E "^(BEGIN|INSERT INTO token )"
+        echo "COMMIT;"
+    } | sqlite3 "$DB"
+    run_shortly doctor
+    expect 0 "no findings"
+    run_shortly list --count
+    [ "$output" -gt 80 ]
+    [ "$output" -lt 100 ]
+}
+
 @test "an empty file has no table, and init makes it" {
     a_store
     : >"$DB"

@@ -5,6 +5,9 @@ load common
 
 DIRECTORY=/usr/vemo/etc/private/session
 
+REPLACE='stop the programs, move the directory away, run "vemo-access-token init" and import a backup'
+SAVE_AND_REPLACE='stop the programs, save the tokens with "vemo-access-token export", move the directory away, run "vemo-access-token init" and import them'
+
 # [deadline=SQL] [count=SQL] [extra=SQL] ... a_row TID: a token, written behind the tool's back
 a_row()
 {
@@ -328,7 +331,7 @@ error: $DIRECTORY cannot be written to: Read-only file system
     remedy: find out who made it; move the database to a directory of that name
 error: $REAL_DB-journal: Too many levels of symbolic links
     meaning: programs fail in the same way
-    remedy: mend the cause, or move the file away and import a backup"
+    remedy: mend the cause; or $REPLACE"
 }
 
 @test "a file that is no database is a finding, and left" {
@@ -337,7 +340,7 @@ error: $REAL_DB-journal: Too many levels of symbolic links
     chmod 0600 "$DB"
     cp "$DB" "$DIR/text"
     expect_no_repair error "$REAL_DB is no token database, or a damaged one (file is not a database)" \
-        "programs fail in the same way" "mend the cause, or move the file away and import a backup"
+        "programs fail in the same way" "mend the cause; or $REPLACE"
     cmp "$DB" "$DIR/text"
 }
 
@@ -346,7 +349,7 @@ error: $REAL_DB-journal: Too many levels of symbolic links
     sql "CREATE INDEX i ON token (deadline); PRAGMA writable_schema = ON;
          UPDATE sqlite_schema SET sql = 'CREATE INDEX i ON token (uid)' WHERE name = 'i'"
     expect_no_repair error "the database is damaged: row 1 missing from index i" "tokens may be lost or wrong" \
-        'save the tokens with "vemo-access-token export" if it can still read them; stop the programs, move the file away, and import that or a backup'
+        "$SAVE_AND_REPLACE; where export fails, import a backup or what sqlite3 can still read: see vemo-access-token(8)"
     run_tool export
     [ "$status" -eq 0 ]
 }
@@ -375,7 +378,7 @@ error: $REAL_DB-journal: Too many levels of symbolic links
     a_row aaaaaaaa
     sql "ALTER TABLE token DROP COLUMN extra; ALTER TABLE token RENAME uid TO owner"
     expect_no_repair error "the table of tokens lacks columns: uid, extra" \
-        "every call that reads or writes a token fails" "stop the programs, move the file away, and import a backup"
+        "every call that reads or writes a token fails" "$REPLACE"
 }
 
 @test "tokens with a NULL are deleted" {
