@@ -3,6 +3,14 @@
 #include <unistd.h>
 
 #include "Failure.h"
+#include "Masking.h"
+#include "Values.h"
+
+namespace {
+
+const uint64_t NAMED_MAX = 5; // tokens that a finding names
+
+} // namespace
 
 namespace tool {
 
@@ -11,6 +19,18 @@ const char* const REMEDY_REPLACE =
 const char* const REMEDY_SAVE_AND_REPLACE =
     "stop the programs, save the tokens with \"vemo-access-token export\", move the directory away, run "
     "\"vemo-access-token init\" and import them";
+
+void TokenNames::add(const std::optional<std::string>& strTid)
+{
+    if (m_nTokens++ < NAMED_MAX) {
+        m_strNames += (m_strNames.empty() ? "" : ", ") + masked(strTid.value_or("NULL"));
+    }
+}
+
+std::string TokenNames::text() const
+{
+    return countText(m_nTokens, "token") + " (" + m_strNames + (NAMED_MAX < m_nTokens ? ", ..." : "") + ")";
+}
 
 Findings examine()
 {

@@ -3,7 +3,9 @@
 #ifndef TOOLS_EXAMINATION_H
 #define TOOLS_EXAMINATION_H
 
+#include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -25,6 +27,18 @@ typedef std::vector<Finding> Findings;
 extern const char* const REMEDY_REPLACE;
 extern const char* const REMEDY_SAVE_AND_REPLACE;
 
+// The tokens that a finding is about: how many, and the names of the first.
+class TokenNames {
+public:
+    void add(const std::optional<std::string>& strTid);
+    uint64_t count() const { return m_nTokens; }
+    std::string text() const; // "7 tokens (Ab12Cd34, ...)"
+
+private:
+    uint64_t m_nTokens = 0;
+    std::string m_strNames;
+};
+
 // Everything that is wrong now. What cannot be looked at because of one finding is left out.
 Findings examine();
 
@@ -36,6 +50,11 @@ void examineStore(Findings& findings);
 // from writing.
 void examineWritability(const std::string& strPath, Findings& findings);
 void examineFileSystem(Findings& findings);
+
+// Parts of the store: the table and what belongs to it, and the tokens. The first returns whether the tokens
+// can be read; the second repairs only those of a sound table.
+bool examineSchema(Findings& findings);
+void examineTokens(bool blTableSound, Findings& findings);
 
 } // namespace tool
 

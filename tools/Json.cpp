@@ -1,10 +1,9 @@
 #include "Json.h"
 
-#include <json/reader.h>
 #include <json/writer.h>
 
+#include <algorithm>
 #include <cstring>
-#include <memory>
 #include <sstream>
 
 #include "Failure.h"
@@ -28,6 +27,15 @@ std::string write(const Json::Value& jValue, const char* szIndentation)
     return tool::visibleJson(stream.str());
 }
 
+std::unique_ptr<Json::CharReader> makeReader(int nNestedMax)
+{
+    Json::CharReaderBuilder builder;
+    Json::CharReaderBuilder::strictMode(&builder.settings_);
+    builder["allowSpecialFloats"] = true; // as compactJson writes them
+    builder["stackLimit"] = nNestedMax;
+    return std::unique_ptr<Json::CharReader>(builder.newCharReader());
+}
+
 // The first error of the reader's report, each of which stands behind a "*" and on several lines.
 std::string firstError(const std::string& strReport)
 {
@@ -44,7 +52,7 @@ std::string firstError(const std::string& strReport)
 
 enum class Reading { Whole, Bad, TooDeep };
 
-Reading read(Json::CharReader& reader, const std::string& strText, Json::Value& jValue,
+Reading readBy(Json::CharReader& reader, const std::string& strText, Json::Value& jValue,
              std::string& strReport)
 {
     const auto parse = [&] {
@@ -67,14 +75,16 @@ namespace tool {
 
 Json::Value parseObject(const std::string& strText, int nNestedMax)
 {
-    Json::CharReaderBuilder builder;
-    Json::CharReaderBuilder::strictMode(&builder.settings_);
-    builder["allowSpecialFloats"] = true; // as compactJson writes them
-    builder["stackLimit"] = nNestedMax;
-    const std::unique_ptr<Json::CharReader> pReader(builder.newCharReader());
+    return ObjectReader(nNestedMax).read(strText);
+}
+
+ObjectReader::ObjectReader(int nNestedMax) : m_pReader(makeReader(nNestedMax)) {}
+
+Json::Value ObjectReader::read(const std::string& strText) const
+{
     Json::Value jValue;
     std::string strReport;
-    switch (read(*pReader, strText, jValue, strReport)) {
+    switch (readBy(*m_pReader, strText, jValue, strReport)) {
     case Reading::Whole: break;
     case Reading::Bad: throw BadValue("is no JSON: " + shownReason(firstError(strReport)));
     case Reading::TooDeep: throw BadValue("is nested too deeply for JSON");
@@ -95,12 +105,33 @@ std::string flawOfStored(const std::string& strText)
     }();
     Json::Value jValue;
     std::string strReport;
-    switch (read(*pReader, strText, jValue, strReport)) {
+    switch (readBy(*pReader, strText, jValue, strReport)) {
     case Reading::Whole: break;
     case Reading::Bad: return "is no JSON";
     case Reading::TooDeep: return "is nested too deeply";
     }
     return "";
+}
+
+int nestingOf(const std::string& strText)
+{
+    int nLevel = 0;
+    int nDeepest = 0;
+    bool blString = false;
+    for (size_t i = 0; i < strText.size(); ++i) {
+        const char c = strText[i];
+        if (blString) {
+            blString = c != '"';
+            i += c == '\\' ? 1 : 0;
+        } else if (c == '"') {
+            blString = true;
+        } else if (c == '{' || c == '[') {
+            nDeepest = std::max(nDeepest, ++nLevel);
+        } else if (c == '}' || c == ']') {
+            --nLevel;
+        }
+    }
+    return nDeepest;
 }
 
 std::string compactJson(const Json::Value& jValue)

@@ -6,6 +6,7 @@
 #include <cstdarg>
 #include <cstdlib>
 #include <cstring>
+#include <exception>
 #include <memory>
 #include <new>
 #include <system_error>
@@ -16,20 +17,24 @@
 
 namespace {
 
-// Who takes the rows of a query, and whether there was memory for that.
-struct Result {
-    const std::function<void(int, char**)> take;
-    bool blMemory = true;
+// Who takes a query's rows, and what stopped that.
+struct Taker {
+    const std::function<void(tool::Row)>& take;
+    std::exception_ptr pStopped;
 };
 
-int takeRow(void* pResult, int nColumns, char** rgValue, char**)
+int giveRow(void* pTaker, int nColumns, char** rgValue, char**)
 {
-    Result& result = *static_cast<Result*>(pResult);
+    Taker& taker = *static_cast<Taker*>(pTaker);
     try {
-        result.take(nColumns, rgValue);
+        tool::Row row;
+        for (int i = 0; i < nColumns; ++i) {
+            row.push_back(rgValue[i] ? std::optional<std::string>(rgValue[i]) : std::nullopt);
+        }
+        taker.take(std::move(row));
         return 0;
-    } catch (const std::bad_alloc&) {
-        result.blMemory = false; // the caller is a C function
+    } catch (...) {
+        taker.pStopped = std::current_exception(); // the caller is a C function
         return -1;
     }
 }
@@ -367,21 +372,21 @@ bool Store::makeTable()
 Rows Store::query(const std::string& strSql)
 {
     Rows rows;
-    const std::string strErr = queryAsFarAsItGoes(strSql, rows);
+    eachRow(strSql, [&rows](Row row) { rows.push_back(std::move(row)); });
+    return rows;
+}
+
+void Store::eachRow(const std::string& strSql, const std::function<void(Row)>& take)
+{
+    const std::string strErr = run(strSql, take);
     if (!strErr.empty()) {
         fail(strErr);
     }
-    return rows;
 }
 
 std::string Store::queryAsFarAsItGoes(const std::string& strSql, Rows& rows)
 {
-    return runEach(strSql, [&rows](int nColumns, char** rgValue) {
-        rows.emplace_back();
-        for (int i = 0; i < nColumns; ++i) {
-            rows.back().push_back(rgValue[i] ? std::optional<std::string>(rgValue[i]) : std::nullopt);
-        }
-    });
+    return run(strSql, [&rows](Row row) { rows.push_back(std::move(row)); });
 }
 
 void Store::eachTid(const Json::Value& jFilter, const std::function<void(const std::string&)>& take)
@@ -389,20 +394,17 @@ void Store::eachTid(const Json::Value& jFilter, const std::function<void(const s
     Json::Value jFilterCopy = jFilter;
     std::string strWhere;
     require(m_db.SqlWhereFromJson(jFilterCopy, strWhere, true));
-    const std::string strErr =
-        runEach("SELECT tid FROM token" + (strWhere.empty() ? "" : " WHERE" + strWhere),
-                [&take](int, char** rgValue) { take(rgValue[0] ? rgValue[0] : ""); });
-    if (!strErr.empty()) {
-        fail(strErr);
-    }
+    eachRow("SELECT tid FROM token" + (strWhere.empty() ? "" : " WHERE" + strWhere),
+            [&take](const Row& row) { take(row[0].value_or("")); });
 }
 
-std::string Store::runEach(const std::string& strSql, const std::function<void(int, char**)>& take)
+// Returns why the statement failed, or "".
+std::string Store::run(const std::string& strSql, const std::function<void(Row)>& take)
 {
-    Result result = {take};
-    const int nResult = m_db.runSqlEx(strSql, takeRow, &result);
-    if (!result.blMemory) {
-        throw std::bad_alloc();
+    Taker taker = {take, nullptr};
+    const int nResult = m_db.runSqlEx(strSql, giveRow, &taker);
+    if (taker.pStopped) {
+        std::rethrow_exception(taker.pStopped);
     }
     return 0 > nResult ? m_db.m_strErr : "";
 }

@@ -25,7 +25,8 @@
 namespace tool {
 
 // A row's columns as texts; nothing where it is NULL.
-typedef std::vector<std::vector<std::optional<std::string>>> Rows;
+typedef std::vector<std::optional<std::string>> Row;
+typedef std::vector<Row> Rows;
 
 // The SQL that sqlite3_mprintf makes of a format: %Q quotes and escapes a text.
 std::string sqlText(const char* szFormat, ...);
@@ -104,6 +105,9 @@ public:
     // Any other statement.
     Rows query(const std::string& strSql);
 
+    // The same for one that gives many rows: takes them one by one.
+    void eachRow(const std::string& strSql, const std::function<void(Row)>& take);
+
     // The same for a statement that can give rows before it fails; returns why it did, or "".
     std::string queryAsFarAsItGoes(const std::string& strSql, Rows& rows);
 
@@ -123,8 +127,8 @@ private:
     void beginReading();
     void lock();
     [[noreturn]] void fail(const std::string& strErr);
+    std::string run(const std::string& strSql, const std::function<void(Row)>& take);
     void require(int nResult);
-    std::string runEach(const std::string& strSql, const std::function<void(int, char**)>& take);
     bool holdsNull();
     std::string equation(std::string strName, Json::Value jValue);
 

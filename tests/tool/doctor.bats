@@ -8,18 +8,19 @@ DIRECTORY=/usr/vemo/etc/private/session
 REPLACE='stop the programs, move the directory away, run "vemo-access-token init" and import a backup'
 SAVE_AND_REPLACE='stop the programs, save the tokens with "vemo-access-token export", move the directory away, run "vemo-access-token init" and import them'
 
-# [deadline=SQL] [count=SQL] [extra=SQL] ... a_row TID: a token, written behind the tool's back
+# [deadline=SQL] [count=SQL] [extra=SQL] ... a_row NAME: a token, written behind the tool's back; its id is the
+# name with zeroes behind it
 a_row()
 {
     [ -e "$DB" ] || tool init >/dev/null
-    sql "INSERT INTO token VALUES ('$1', '', ${uid-0}, ${deadline-9999999999}, ${count-1}, ${create_time-0},
-         'VPN', ${webapi_allow-"'{}'"}, ${extra-"'{}'"})"
+    sql "INSERT INTO token VALUES (substr('$1$ZEROS$ZEROS', 1, 127), '', ${uid-0}, ${deadline-9999999999},
+         ${count-1}, ${create_time-0}, 'VPN', ${webapi_allow-"'{}'"}, ${extra-"'{}'"})"
 }
 
-# expect_left TID...: the tokens that are there still, in order
+# expect_left NAME...: the tokens that are there still, in order
 expect_left()
 {
-    [ "$(sql "SELECT tid FROM token ORDER BY tid" | xargs)" = "$*" ]
+    [ "$(sql "SELECT rtrim(tid, '0') FROM token ORDER BY tid" | xargs)" = "$*" ]
 }
 
 # expect_finding SEVERITY WHAT MEANING REMEDY: doctor finds that, and nothing else
@@ -80,8 +81,7 @@ in_namespace()
 }
 
 @test "a sound store gives no findings, and stays as it is" {
-    local tid
-    tid=$(a_token --allow Example.File:get --extra '{"a":Infinity}')
+    a_token --allow Example.File:get --extra '{"a":Infinity}'
     deadline="strftime('%s', 'now') - 3000" a_row expired-just-now
     count=-1 a_row unlimited
     cp "$DB" "$DIR/before"
@@ -94,7 +94,6 @@ in_namespace()
     run_tool doctor -o jsonl
     expect 0 ""
     cmp "$DB" "$DIR/before"
-    expect_left $(printf '%s\n' "$tid" expired-just-now unlimited | LC_ALL=C sort)
 }
 
 @test "not being root is a finding, and the only one" {
@@ -374,6 +373,147 @@ error: $REAL_DB-journal: Too many levels of symbolic links
     done
 }
 
+# replace_database BACKUP, save_and_replace: what the remedy of that name tells; the backup holds two tokens
+replace_database()
+{
+    mv "$VEMO_REDIRECT_DIR" "$DIR/away"
+    run_tool init
+    [ "$status" -eq 0 ]
+    run_tool import "$1"
+    expect 0 "2 tokens imported"
+    rm -r "$DIR/away"
+}
+
+save_and_replace()
+{
+    tool export "$DIR/saved" 2>/dev/null
+    replace_database "$DIR/saved"
+}
+
+# remake OLD NEW: another table of tokens in the place of the library's, with one for the other in its statement
+remake()
+{
+    local made
+    made=$(sql "SELECT sql FROM sqlite_schema WHERE name = 'token'")
+    sql "ALTER TABLE token RENAME TO library; ${made/"$1"/"$2"};
+         INSERT INTO token (tid, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra)
+         SELECT * FROM library; DROP TABLE library"
+}
+
+@test "a table that is not the library's is left to the administrator, and can be replaced" {
+    a_row aaaaaaaa
+    a_row bbbbbbbb
+    local old new differences
+    while IFS='|' read -r old new differences; do
+        echo "$new"
+        remake "$old" "$new"
+        expect_no_repair error "the table of tokens is not the one that the library makes: it $differences" \
+            "calls can fail, spend no use, report what did not happen, or take one token for another" "$SAVE_AND_REPLACE"
+        save_and_replace
+    done <<'TABLE'
+tid TEXT primary key NOT NULL|tid TEXT|has "tid TEXT", and lacks "tid TEXT primary key NOT NULL"
+tid TEXT|tid TEXT COLLATE NOCASE|has "tid TEXT COLLATE NOCASE primary key NOT NULL", and lacks "tid TEXT primary key NOT NULL"
+primary key|primary key ON CONFLICT IGNORE|has "tid TEXT primary key ON CONFLICT IGNORE NOT NULL", and lacks "tid TEXT primary key NOT NULL"
+uid INTEGER|uid NUMERIC CHECK (uid IN (0, 1))|has "uid NUMERIC CHECK (uid IN (0, 1))", and lacks "uid INTEGER"
+extra TEXT|extra TEXT, note TEXT NOT NULL DEFAULT 'a'|has "note TEXT NOT NULL DEFAULT 'a'"
+extra TEXT|extra TEXT, upper TEXT AS (upper(tid)), UNIQUE (function, tid)|has "UNIQUE (function, tid)", "upper TEXT AS (upper(tid))"
+extra TEXT)|extra TEXT) WITHOUT ROWID|has "WITHOUT ROWID"
+extra TEXT)|extra TEXT) STRICT|has "STRICT"
+TABLE
+    expect_sound
+    sql .dump >"$DIR/dump"
+    install -m 0700 /dev/null "$DB"
+    sqlite3 -cmd "PRAGMA encoding = 'UTF-16le'" "$DB" <"$DIR/dump"
+    expect_no_repair error "the database is in UTF-16le, and not in UTF-8" \
+        "bytes that are no UTF-8 are not kept: such an id is never found again" "$SAVE_AND_REPLACE"
+    save_and_replace
+    expect_sound
+}
+
+@test "the library's table in other words is none of another kind" {
+    a_row aaaaaaaa
+    remake "tid TEXT primary key NOT NULL,bind_sid TEXT," "bind_sid	text , tid TEXT
+        PRIMARY KEY not null, "
+    sql "ALTER TABLE token RENAME TO other; ALTER TABLE other RENAME TO TOKEN"
+    expect_sound
+    run_tool init
+    expect 0 "all was there already"
+}
+
+@test "tokens of the same id are found where the table allows them" {
+    a_row aaaaaaaa
+    remake "primary key NOT NULL" ""
+    sql "INSERT INTO token SELECT * FROM token"
+    a_row bbbbbbbb
+    a_row cccccccc
+    run_tool doctor --repair
+    [ "$status" -eq 5 ]
+    [[ ${lines[0]} == "error: the table of tokens is not the one "* ]]
+    [ "${lines[3]}" = "error: several tokens of the same id: 1 token (aaaaaaaa)" ]
+    [ "${lines[4]}" = "    meaning: a grant reads one of them and saves another: their uses never end" ]
+    [ "${lines[5]}" = "    remedy: revoke them by their whole ids" ]
+    [ "${#lines[@]}" -eq 6 ]
+    tool revoke "aaaaaaaa$ZEROS"
+    save_and_replace
+    expect_sound
+}
+
+@test "a view or a virtual table in the place of the table is left to the administrator, and can be replaced" {
+    a_row aaaaaaaa
+    a_row bbbbbbbb
+    tool export "$DIR/backup"
+    local meaning="programs read what it makes up, and their changes fail or go elsewhere"
+    sql "ALTER TABLE token RENAME TO other; CREATE VIEW Token AS SELECT * FROM other"
+    expect_no_repair error "a view stands in the place of the table of tokens" "$meaning" "$REPLACE"
+    replace_database "$DIR/backup"
+    expect_sound
+    sql "DROP TABLE token; CREATE VIRTUAL TABLE token USING fts4(tid, bind_sid, uid, deadline, count, create_time,
+         function, webapi_allow, extra)"
+    expect_no_repair error "a virtual table stands in the place of the table of tokens" "$meaning" "$REPLACE"
+}
+
+@test "triggers and indexes that take part in changes are left to the administrator, and can be dropped" {
+    a_row aaaaaaaa
+    local kind trigger index meaning statement names dropped remedy
+    trigger="a trigger on the table of tokens|it runs in every change that it is for: calls can report what did not happen, change other tokens, fail, or never end"
+    index="an index on the table of tokens that does not only find them|changes can fail, and a grant can delete other tokens: those that a unique index takes for the same"
+    while IFS='|' read -r kind statement names dropped; do
+        echo "$statement"
+        sql "$statement"
+        IFS='|' read -r kind meaning <<<"${!kind}"
+        remedy="sqlite3 $REAL_DB '$dropped'"
+        expect_no_repair error "$kind: $names" "$meaning" "sqlite3 $REAL_DB '.schema token' shows what it does; $remedy"
+        eval "${remedy//"$REAL_DB"/"$DB"}"
+        expect_sound
+    done <<'TABLE'
+trigger|CREATE TRIGGER t AFTER INSERT ON token BEGIN DELETE FROM token; END|"t"|DROP TRIGGER "t";
+trigger|CREATE TRIGGER b UPDATE ON token BEGIN SELECT 1; END; CREATE TRIGGER a DELETE ON TOKEN BEGIN SELECT 1; END|"a", "b"|DROP TRIGGER "a"; DROP TRIGGER "b";
+trigger|CREATE TRIGGER "it's ""$(false)""" UPDATE ON token BEGIN SELECT 1; END|"it's "$(false)""|DROP TRIGGER "it'\''s ""$(false)""";
+index|CREATE UNIQUE INDEX i ON token (function, tid)|"i"|DROP INDEX "i";
+index|CREATE INDEX i ON token (uid) WHERE count = 1|"i"|DROP INDEX "i";
+index|CREATE INDEX i ON token (uid, json(extra))|"i"|DROP INDEX "i";
+TABLE
+    sql "CREATE TABLE own (a UNIQUE); CREATE TRIGGER of_own UPDATE ON own BEGIN DELETE FROM token; END;
+         CREATE INDEX plain ON token (function, uid DESC)"
+    expect_sound
+}
+
+@test "tokens are not repaired while a trigger would take part" {
+    a_row aaaaaaaa
+    extra=NULL a_row bbbbbbbb
+    sql "CREATE TRIGGER t BEFORE DELETE ON token BEGIN
+         SELECT max(i) FROM (WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n) SELECT i FROM n); END"
+    never_hang
+    run_tool doctor --repair
+    [ "$status" -eq 5 ]
+    [ "${lines[0]}" = 'error: a trigger on the table of tokens: "t"' ]
+    [ "${lines[3]}" = "error: a NULL in 1 token (bbbbbbbb)" ]
+    [ "${lines[5]}" = "    remedy: when the table is mended: delete them: vemo-access-token doctor --repair" ]
+    sql "DROP TRIGGER t"
+    run_tool doctor --repair
+    [ "$status" -eq 0 ]
+}
+
 @test "a table that lacks columns is left to the administrator" {
     a_row aaaaaaaa
     sql "ALTER TABLE token DROP COLUMN extra; ALTER TABLE token RENAME uid TO owner"
@@ -394,7 +534,7 @@ error: $REAL_DB-journal: Too many levels of symbolic links
     local column
     for column in bind_sid deadline count create_time extra; do
         a_row cccccccc
-        sql "UPDATE token SET $column = NULL WHERE tid = 'cccccccc'"
+        sql "UPDATE token SET $column = NULL WHERE tid LIKE 'cccccccc%'"
         expect_repair "a NULL in 1 token (cccccccc)" "$meaning"
         expect_left kept
     done
@@ -428,15 +568,90 @@ error: $REAL_DB-journal: Too many levels of symbolic links
     expect 0 "no findings"
 }
 
+@test "fields that the library does not write are left to the administrator, and tokens with them can go" {
+    a_row kept
+    local value severity what meaning remedy command
+    while IFS='|' read -r value severity what meaning remedy command; do
+        echo "$value"
+        a_row aaaaaaaa
+        sql "UPDATE token SET $value WHERE tid LIKE 'aaaaaaaa%'"
+        expect_no_repair "$severity" "$what" "$meaning" "$remedy"
+        eval "$command"
+        expect_sound
+        sql "DELETE FROM token WHERE tid LIKE 'aaaaaaaa%'"
+    done <<TABLE
+uid = 4294967296|error|a uid that is no user's in 1 token (aaaaaaaa)|programs take the lower 32 bits of it for the owner: 4294967296 is root's|revoke them|tool revoke aaaaaaaa
+uid = 4294967295|error|a uid that is no user's in 1 token (aaaaaaaa)|programs take the lower 32 bits of it for the owner: 4294967296 is root's|revoke them|tool revoke aaaaaaaa
+uid = -1|error|a uid that is no user's in 1 token (aaaaaaaa)|programs take the lower 32 bits of it for the owner: 4294967296 is root's|revoke them|tool revoke aaaaaaaa
+tid = substr(tid, 1, 126)|warning|an id of fewer than 127 bytes in 1 token (aaaaaaaa)|it was not made by the library, and may be guessed|revoke them, and create others|tool revoke aaaaaaaa
+bind_sid = CAST(x'6100' AS TEXT)|error|a NUL byte in a text of 1 token (aaaaaaaa)|programs see what stands before it, and no look-up by that field finds such a token|revoke them|tool revoke aaaaaaaa
+function = ''|warning|an empty purpose in 1 token (aaaaaaaa)|no call deletes such a token by its purpose|revoke them, and create others|tool revoke aaaaaaaa
+webapi_allow = '{"A":{"method":["get",["put"]]}}'|error|lists of methods that hold an array or an object in 1 token (aaaaaaaa)|the library throws an exception where it should grant or refuse, which ends a program that does not catch it|revoke them, or update --allow|tool update aaaaaaaa --allow A:get,put
+webapi_allow = '{"A":{"method":[{}]}}'|error|lists of methods that hold an array or an object in 1 token (aaaaaaaa)|the library throws an exception where it should grant or refuse, which ends a program that does not catch it|revoke them, or update --allow|tool update aaaaaaaa --allow A
+webapi_allow = '{"A":{"method":[]},"B":7}'|warning|an API without a list of methods in 1 token (aaaaaaaa)|it is open to calls that name no method, and to no others|revoke them, or update --allow|tool update aaaaaaaa --allow A
+webapi_allow = '{"B":{"method":{"get":1}}}'|warning|an API without a list of methods in 1 token (aaaaaaaa)|it is open to calls that name no method, and to no others|revoke them, or update --allow|tool revoke aaaaaaaa
+TABLE
+}
+
+@test "an id that no call can name is left to the administrator, and its token can be deleted" {
+    a_row kept
+    local condition="typeof(tid) = 'text' AND (tid = '' OR instr(tid, char(0)))" value
+    local remedy="sqlite3 $REAL_DB \"DELETE FROM token WHERE $condition\""
+    for value in "''" "char(0)" "'aaaaaaaa' || char(0) || '$ZEROS'"; do
+        a_row aaaaaaaa
+        sql "UPDATE token SET tid = $value WHERE tid LIKE 'aaaaaaaa%'"
+        run_tool doctor --repair
+        [ "$status" -eq 5 ]
+        [[ ${lines[0]} == "error: an id that is empty or holds a NUL byte in 1 token ("* ]]
+        [ "${lines[1]}" = "    meaning: no call can name such a token: it is listed, but cannot be granted or revoked" ]
+        [ "${lines[2]}" = "    remedy: $remedy" ]
+        eval "${remedy//"$REAL_DB"/"$DB"}"
+        expect_left kept
+        expect_sound
+    done
+}
+
+@test "JSON so deep that reading it takes a large stack is left to the administrator" {
+    local deep
+    deep=$(printf '{"a":%.0s' {1..100})7$(printf '}%.0s' {1..100})
+    extra="'$deep'" a_row as-deep-as-may-be
+    extra="'{\"a\":\"$(printf '[%.0s' {1..200})\\\\\\\"{\"}'" a_row brackets-in-a-text
+    expect_sound
+    extra="'{\"b\":$deep}'" a_row aaaaaaaa
+    webapi_allow="'{\"A\":{\"method\":[],\"x\":$deep}}'" a_row bbbbbbbb
+    expect_no_repair warning "JSON of more than 100 levels in 2 tokens (aaaaaaaa, bbbbbbbb)" \
+        "a program that reads such a token in a thread of a small stack crashes: 64 KiB have room for that many levels, 128 KiB for twice as many" \
+        "revoke them, or update --allow and --extra"
+    tool update aaaaaaaa --extra '{}'
+    tool update bbbbbbbb --allow A
+    expect_sound
+}
+
 @test "what is no JSON object is left to the administrator" {
     a_row kept
-    extra="'{\"a\":Infinity} // JSON for the library'" a_row kept-too
+    extra="'{\"a\":Infinity}'" a_row kept-too # JSON for the library
     webapi_allow="'[]'" a_row aaaaaaaa-long
     extra="'text'" a_row bbbbbbbb
     extra="''" a_row cccccccc
     webapi_allow="7" a_row dddddddd
-    expect_no_repair error "no JSON object where there should be one in 4 tokens (aaaaaaaa, bbbbbbbb, cccccccc, dddddddd)" \
-        "such a token opens nothing, or cannot be saved with a use less" "revoke them, or update --allow and --extra"
+    extra="'{\"a\":1} {}'" a_row eeeeeeee
+    extra="'{\"a\":1} // a comment'" a_row ffffffff
+    webapi_allow="'{\"A\":{\"method\":[\"g'" a_row gggggggg
+    extra="'{\"a\":\"\ud800\"}'" a_row hhhhhhhh # JSON for SQLite
+    local names="aaaaaaaa, bbbbbbbb, cccccccc, dddddddd, eeeeeeee, ..."
+    expect_no_repair error "no JSON object where there should be one in 8 tokens ($names)" \
+        "such a token opens nothing, or only what stands before the fault, or cannot be saved with a use less" \
+        "revoke them, or update --allow and --extra"
+    local name
+    for name in aaaaaaaa dddddddd gggggggg; do
+        tool update "$name" --allow Api:get
+    done
+    for name in bbbbbbbb cccccccc eeeeeeee ffffffff; do
+        tool update "$name" --extra '{}'
+    done
+    tool revoke hhhhhhhh
+    run_tool doctor
+    expect 0 "no findings"
 }
 
 @test "a NULL in place of an object, or beside one that is none, is one finding" {
@@ -457,7 +672,7 @@ error: $REAL_DB-journal: Too many levels of symbolic links
     done
     run_tool doctor
     [ "$status" -eq 5 ]
-    [[ ${lines[0]} == "error: no JSON object where there should be one in "*"5aaaaaaa, ..."* ]]
+    [[ ${lines[0]} == "error: no JSON object where there should be one in "*"5aaaaaaa, ...)" ]]
     [[ ${lines[0]} != *6aaaaaaa* ]]
 }
 
@@ -670,7 +885,7 @@ $never"
 @test "control characters of a finding are made visible" {
     deadline=1 a_row $'a\e[31mb'
     run_tool doctor
-    [ "${lines[0]}" = 'warning: expired for more than an hour: 1 token (a\x1b[31mb)' ]
+    [ "${lines[0]}" = 'warning: expired for more than an hour: 1 token (a\x1b[31mb0)' ]
 }
 
 @test "doctor colours its findings on a terminal, but not with NO_COLOR" {

@@ -1,0 +1,259 @@
+// What can be wrong with the table of tokens, and with what else the database holds that changes what
+// programs do.
+
+#include <algorithm>
+#include <cctype>
+#include <map>
+
+#include "AccessTokenDefine.h"
+#include "Examination.h"
+#include "Masking.h"
+#include "Store.h"
+
+namespace {
+
+using tool::Finding;
+using tool::Findings;
+using tool::Store;
+
+const char* const TRIGGERS = "SELECT name FROM sqlite_schema WHERE type = 'trigger' "
+                             "AND tbl_name = 'token' COLLATE NOCASE ORDER BY 1";
+
+// Those that somebody made, and that are more than a list of columns.
+const char* const ODD_INDEXES =
+    "SELECT name FROM pragma_index_list('token') AS list WHERE origin = 'c' AND (\"unique\" OR partial "
+    "OR EXISTS (SELECT 1 FROM pragma_index_info(list.name) WHERE cid < 0)) ORDER BY 1";
+
+std::string joined(const std::vector<std::string>& strParts)
+{
+    std::string strJoined;
+    for (const std::string& strPart : strParts) {
+        strJoined += (strJoined.empty() ? "" : ", ") + strPart;
+    }
+    return strJoined;
+}
+
+// A shell's command that runs statements on the database.
+std::string sqliteCommand(const std::string& strSql)
+{
+    std::string strQuoted;
+    for (const char c : strSql) {
+        strQuoted += c == '\'' ? "'\\''" : std::string(1, c);
+    }
+    return "sqlite3 " VEMO_ATOKEN_DB_PATH " '" + strQuoted + "'";
+}
+
+// With one space wherever there is any, and none around.
+std::string compressed(const std::string& strText)
+{
+    std::string strCompressed;
+    for (const char c : strText) {
+        const bool blSpace = isspace(static_cast<unsigned char>(c));
+        if (!blSpace) {
+            strCompressed += c;
+        } else if (!strCompressed.empty() && strCompressed.back() != ' ') {
+            strCompressed += ' ';
+        }
+    }
+    strCompressed.resize(strCompressed.find_last_not_of(' ') + 1);
+    return strCompressed;
+}
+
+std::string lowered(std::string strText)
+{
+    std::transform(strText.begin(), strText.end(), strText.begin(),
+                   [](unsigned char c) { return static_cast<char>(tolower(c)); });
+    return strText;
+}
+
+// The columns and constraints of a CREATE TABLE statement, and what stands behind them, each under its text
+// in small letters. Their order means nothing to programs. Quotes and comments are not looked at: the
+// library's statement has none, so a statement that has some differs from it however it is taken apart.
+std::map<std::string, std::string> definitions(const std::string& strSql)
+{
+    std::map<std::string, std::string> strDefinitions;
+    std::string strPart;
+    const auto end = [&] {
+        const std::string strDefinition = compressed(strPart);
+        if (!strDefinition.empty()) {
+            strDefinitions.emplace(lowered(strDefinition), strDefinition);
+        }
+        strPart.clear();
+    };
+    int nDepth = 1;
+    for (size_t i = strSql.find('(') + 1; i < strSql.size() && strSql[i] != ';'; ++i) {
+        nDepth += strSql[i] == '(' ? 1 : strSql[i] == ')' ? -1 : 0;
+        if ((1 == nDepth && strSql[i] == ',') || (0 == nDepth && strSql[i] == ')')) {
+            end();
+        } else {
+            strPart += strSql[i];
+        }
+    }
+    end();
+    return strDefinitions;
+}
+
+// The definitions of the first that the second has not, as a list of quotations.
+std::string lacking(const std::map<std::string, std::string>& strDefinitions,
+                    const std::map<std::string, std::string>& strOthers)
+{
+    std::vector<std::string> strQuoted;
+    for (const auto& [strKey, strDefinition] : strDefinitions) {
+        if (!strOthers.count(strKey)) {
+            strQuoted.push_back(tool::quoted(strDefinition));
+        }
+    }
+    return joined(strQuoted);
+}
+
+// Ids are unique in the library's table, so only in another there can be two of the same.
+void examineDuplicates(Store& store, Findings& findings)
+{
+    tool::TokenNames names;
+    store.eachRow("SELECT tid FROM token GROUP BY tid HAVING count(*) > 1",
+                  [&](const tool::Row& row) { names.add(row[0]); });
+    if (names.count()) {
+        findings.push_back({Finding::Severity::Error,
+                            "several tokens of the same id: " + names.text(),
+                            "a grant reads one of them and saves another: their uses never end",
+                            "revoke them by their whole ids",
+                            {}});
+    }
+}
+
+void examineColumns(Store& store, Findings& findings)
+{
+    std::string strOwn;
+    AccessTokenDbApi().SqlExpandCreateTable(strOwn);
+    const auto strMade = definitions(strOwn);
+    const auto strFound = definitions(
+        store.text("SELECT sql FROM sqlite_schema WHERE type = 'table' AND name = 'token' COLLATE NOCASE"));
+    const std::string strMore = lacking(strFound, strMade);
+    const std::string strLess = lacking(strMade, strFound);
+    if (strMore.empty() && strLess.empty()) {
+        return;
+    }
+    findings.push_back(
+        {Finding::Severity::Error,
+         "the table of tokens is not the one that the library makes: it " +
+             (strMore.empty() ? "" : "has " + strMore) +
+             (strMore.empty() || strLess.empty() ? "" : ", and ") +
+             (strLess.empty() ? "" : "lacks " + strLess),
+         "calls can fail, spend no use, report what did not happen, or take one token for another",
+         tool::REMEDY_SAVE_AND_REPLACE,
+         {}});
+    examineDuplicates(store, findings);
+}
+
+// Finds what a query names, of a kind that can be dropped.
+void examineObjects(Store& store, const std::string& strQuery, const std::string& strKind,
+                    const std::string& strWhat, const std::string& strMeaning, Findings& findings)
+{
+    std::vector<std::string> strNames;
+    std::string strDrops;
+    for (const auto& row : store.query(strQuery)) {
+        const std::string strName = row[0].value_or("");
+        strNames.push_back(tool::quoted(strName));
+        strDrops += (strDrops.empty() ? "" : " ") +
+                    tool::sqlText("DROP %s \"%w\";", strKind.c_str(), strName.c_str());
+    }
+    if (!strNames.empty()) {
+        findings.push_back(
+            {Finding::Severity::Error,
+             strWhat + ": " + joined(strNames),
+             strMeaning,
+             sqliteCommand(".schema token") + " shows what it does; " + sqliteCommand(strDrops),
+             {}});
+    }
+}
+
+void examineTriggers(Store& store, Findings& findings)
+{
+    examineObjects(
+        store, TRIGGERS, "TRIGGER", "a trigger on the table of tokens",
+        "it runs in every change that it is for: calls can report what did not happen, change other "
+        "tokens, fail, or never end",
+        findings);
+}
+
+void examineOddIndexes(Store& store, Findings& findings)
+{
+    examineObjects(
+        store, ODD_INDEXES, "INDEX", "an index on the table of tokens that does not only find them",
+        "changes can fail, and a grant can delete other tokens: those that a unique index takes for "
+        "the same",
+        findings);
+}
+
+void examineEncoding(Store& store, Findings& findings)
+{
+    const std::string strEncoding = store.text("PRAGMA encoding");
+    if (strEncoding != "UTF-8") {
+        findings.push_back({Finding::Severity::Error,
+                            "the database is in " + strEncoding + ", and not in UTF-8",
+                            "bytes that are no UTF-8 are not kept: such an id is never found again",
+                            tool::REMEDY_SAVE_AND_REPLACE,
+                            {}});
+    }
+}
+
+// Returns whether there is a table that can be read.
+bool examineKind(Store& store, Findings& findings)
+{
+    const std::string strKind = store.tableKind();
+    if (strKind.empty()) {
+        findings.push_back({Finding::Severity::Error, "the database has no table of tokens",
+                            "every call fails: the table is made together with the file, and never later",
+                            "vemo-access-token init", [] { Store(Store::Access::Locked).makeTable(); }});
+    } else if (strKind != "table") {
+        findings.push_back({Finding::Severity::Error,
+                            "a " + strKind + " stands in the place of the table of tokens",
+                            "programs read what it makes up, and their changes fail or go elsewhere",
+                            tool::REMEDY_REPLACE,
+                            {}});
+    }
+    return strKind == "table";
+}
+
+// Returns whether the fields can be read.
+bool examineMissing(Store& store, Findings& findings)
+{
+    std::vector<std::string> strMissing;
+    for (const std::string& strName : tool::fieldNames()) {
+        if (0 == store.number(tool::sqlText("SELECT count(*) FROM pragma_table_xinfo('token') "
+                                            "WHERE name = %Q COLLATE NOCASE",
+                                            strName.c_str()))) {
+            strMissing.push_back(strName);
+        }
+    }
+    if (!strMissing.empty()) {
+        findings.push_back({Finding::Severity::Error,
+                            "the table of tokens lacks columns: " + joined(strMissing),
+                            "every call that reads or writes a token fails",
+                            tool::REMEDY_REPLACE,
+                            {}});
+    }
+    return strMissing.empty();
+}
+
+} // namespace
+
+namespace tool {
+
+bool examineSchema(Findings& findings)
+{
+    Store store(Store::Access::Read);
+    if (!examineKind(store, findings)) {
+        return false;
+    }
+    examineTriggers(store, findings);
+    examineOddIndexes(store, findings);
+    if (!examineMissing(store, findings)) {
+        return false;
+    }
+    examineColumns(store, findings);
+    examineEncoding(store, findings);
+    return true;
+}
+
+} // namespace tool

@@ -1,0 +1,323 @@
+// What can be wrong with the tokens.
+
+#include <algorithm>
+
+#include "AccessTokenDefine.h"
+#include "AccessTokenUtil.h"
+#include "Examination.h"
+#include "Failure.h"
+#include "Json.h"
+#include "Store.h"
+
+namespace {
+
+using tool::Finding;
+using tool::Findings;
+using tool::Store;
+using tool::TokenNames;
+
+const int64_t BACKLOG_AGE_MAX = 3600; // seconds; every call purges
+const uint64_t TOKENS_WITHOUT_INDEX = 10000;
+const int NESTING_MAX = 100; // that a stack of 64 KiB has room for
+
+// A finding about those tokens that a condition in SQL holds for.
+struct Check {
+    std::string strWhere;
+    Finding::Severity severity;
+    std::string strWhat; // in front of the tokens
+    std::string strMeaning;
+    std::string strRemedy;
+    std::string strRepair; // the statement that repairs it; empty where an administrator must decide
+};
+
+bool isAny(const Json::Value&)
+{
+    return true;
+}
+
+bool isNumber(const Json::Value& jDefault)
+{
+    return jDefault.isIntegral();
+}
+
+bool isText(const Json::Value& jDefault)
+{
+    return jDefault.isString();
+}
+
+// A condition that holds for a row where the test holds for any field whose default is of a kind. The
+// test is SQL with a "?" for the field.
+std::string anyField(bool (*isOfKind)(const Json::Value&), const std::string& strTest)
+{
+    std::string strWhere;
+    for (const std::string& strName : tool::fieldNames()) {
+        if (isOfKind(VEMO_ACCESS_TOKEN::tokenType()[strName][1])) {
+            strWhere += strWhere.empty() ? "" : " OR ";
+            for (const char c : strTest) {
+                strWhere += c == '?' ? strName : std::string(1, c);
+            }
+        }
+    }
+    return "(" + strWhere + ")";
+}
+
+std::string anyNull()
+{
+    return anyField(isAny, "? IS NULL");
+}
+
+Check nulls()
+{
+    return {anyNull(),
+            Finding::Severity::Error,
+            "a NULL in ",
+            "such a token cannot be read or granted, and every listing that meets it fails",
+            "delete them: vemo-access-token doctor --repair",
+            "DELETE FROM token WHERE " + anyNull()};
+}
+
+Check numbers()
+{
+    return {anyField(isNumber, "typeof(?) NOT IN ('integer', 'null')"),
+            Finding::Severity::Error,
+            "no whole number where there should be one in ",
+            "it is read as another number, 0 for a word: deadline or uses are not what they seem",
+            "revoke them, or update what is wrong",
+            ""};
+}
+
+Check texts()
+{
+    const std::string strWhere = anyField(isText, "typeof(?) NOT IN ('text', 'null')");
+    std::string strTexts;
+    for (const std::string& strName : tool::fieldNames()) {
+        if (isText(VEMO_ACCESS_TOKEN::tokenType()[strName][1])) {
+            strTexts += (strTexts.empty() ? "" : ", ") + strName + " = CAST(" + strName + " AS TEXT)";
+        }
+    }
+    return {strWhere,
+            Finding::Severity::Error,
+            "bytes where there should be a text in ",
+            "no look-up by that field finds such a token",
+            "make texts of them: vemo-access-token doctor --repair",
+            "UPDATE token SET " + strTexts + " WHERE " + strWhere};
+}
+
+Check users()
+{
+    return {"typeof(uid) = 'integer' AND (uid < 0 OR uid >= " + std::to_string(UID_ERR) + ")",
+            Finding::Severity::Error,
+            "a uid that is no user's in ",
+            "programs take the lower 32 bits of it for the owner: 4294967296 is root's",
+            "revoke them",
+            ""};
+}
+
+Check unnamed()
+{
+    const std::string strWhere = "typeof(tid) = 'text' AND (tid = '' OR instr(tid, char(0)))";
+    return {strWhere,
+            Finding::Severity::Error,
+            "an id that is empty or holds a NUL byte in ",
+            "no call can name such a token: it is listed, but cannot be granted or revoked",
+            "sqlite3 " VEMO_ATOKEN_DB_PATH " \"DELETE FROM token WHERE " + strWhere + "\"",
+            ""};
+}
+
+Check shortened()
+{
+    const std::string strLength = std::to_string(VEMO_ATOKEN_LENGTH_MIN);
+    return {"length(CAST(tid AS BLOB)) BETWEEN 1 AND " + std::to_string(VEMO_ATOKEN_LENGTH_MIN - 1),
+            Finding::Severity::Warning,
+            "an id of fewer than " + strLength + " bytes in ",
+            "it was not made by the library, and may be guessed",
+            "revoke them, and create others",
+            ""};
+}
+
+Check cutTexts()
+{
+    return {anyField([](const Json::Value& jDefault) { return !isNumber(jDefault); }, "instr(?, char(0))") +
+                " AND NOT instr(tid, char(0))",
+            Finding::Severity::Error,
+            "a NUL byte in a text of ",
+            "programs see what stands before it, and no look-up by that field finds such a token",
+            "revoke them",
+            ""};
+}
+
+Check purposes()
+{
+    return {"function = ''",
+            Finding::Severity::Warning,
+            "an empty purpose in ",
+            "no call deletes such a token by its purpose",
+            "revoke them, and create others",
+            ""};
+}
+
+Check deadlines()
+{
+    return {"deadline <= 0",
+            Finding::Severity::Warning,
+            "a deadline of 0 or less in ",
+            "there is no value for \"never\": the next purge deletes them",
+            "update --ttl gives them time",
+            ""};
+}
+
+Check backlog()
+{
+    return {"deadline > 0 AND deadline < strftime('%s', 'now') - " + std::to_string(BACKLOG_AGE_MAX),
+            Finding::Severity::Warning,
+            "expired for more than an hour: ",
+            "no program has called since, or its purges fail",
+            "vemo-access-token purge",
+            std::string("DELETE FROM token WHERE deadline > 0 AND ") + tool::SQL_EXPIRED};
+}
+
+void execute(const std::string& strSql)
+{
+    Store store(Store::Access::Write);
+    store.query(strSql);
+    store.commit();
+}
+
+// Whatever is wrong with the table takes part in a repair, so it goes first.
+void report(const Check& check, const TokenNames& names, bool blTableSound, Findings& findings)
+{
+    Finding finding = {check.severity, check.strWhat + names.text(), check.strMeaning, check.strRemedy, {}};
+    if (!check.strRepair.empty() && blTableSound) {
+        finding.repair = [strSql = check.strRepair] { execute(strSql); };
+    } else if (!check.strRepair.empty()) {
+        finding.strRemedy = "when the table is mended: " + finding.strRemedy;
+    }
+    findings.push_back(finding);
+}
+
+// All in one pass over the table, and another for each finding.
+void examineRows(Store& store, bool blTableSound, Findings& findings)
+{
+    const std::vector<Check> checks = {nulls(),     numbers(),  texts(),    users(),     unnamed(),
+                                       shortened(), cutTexts(), purposes(), deadlines(), backlog()};
+    std::string strSql;
+    for (const Check& check : checks) {
+        strSql += (strSql.empty() ? "SELECT max(" : ", max(") + check.strWhere + ")";
+    }
+    const tool::Row isThere = store.query(strSql + " FROM token")[0];
+    for (size_t i = 0; i < checks.size(); ++i) {
+        if (isThere[i] == "1") {
+            TokenNames names;
+            store.eachRow("SELECT tid FROM token WHERE " + checks[i].strWhere,
+                          [&names](const tool::Row& row) { names.add(row[0]); });
+            report(checks[i], names, blTableSound, findings);
+        }
+    }
+}
+
+// What the objects of tokens can be, and should not.
+struct Objects {
+    TokenNames broken;
+    TokenNames odd;
+    TokenNames throwing;
+    TokenNames deep;
+};
+
+// Whether an API's entry is one that opens calls that name a method.
+bool isEntry(const Json::Value& jEntry)
+{
+    return jEntry.isObject() && jEntry["method"].isArray();
+}
+
+// Whether a method of the list cannot be read as a text.
+bool holdsNoMethod(const Json::Value& jEntry)
+{
+    const auto isNone = [](const Json::Value& jMethod) { return jMethod.isArray() || jMethod.isObject(); };
+    return isEntry(jEntry) && std::any_of(jEntry["method"].begin(), jEntry["method"].end(), isNone);
+}
+
+void judge(const tool::ObjectReader& reader, const tool::Row& row, Objects& objects)
+{
+    const std::string& strAllow = *row[1];
+    const std::string& strExtra = *row[2];
+    if (std::max(tool::nestingOf(strAllow), tool::nestingOf(strExtra)) > NESTING_MAX) {
+        objects.deep.add(row[0]);
+    }
+    try {
+        const Json::Value jAllow = reader.read(strAllow);
+        reader.read(strExtra);
+        if (!std::all_of(jAllow.begin(), jAllow.end(), isEntry)) {
+            objects.odd.add(row[0]);
+        }
+        if (std::any_of(jAllow.begin(), jAllow.end(), holdsNoMethod)) {
+            objects.throwing.add(row[0]);
+        }
+    } catch (const tool::BadValue&) {
+        objects.broken.add(row[0]);
+    }
+}
+
+void examineObjects(Store& store, Findings& findings)
+{
+    const tool::ObjectReader reader;
+    Objects objects;
+    store.eachRow("SELECT tid, webapi_allow, extra FROM token WHERE (webapi_allow <> '{}' OR extra <> '{}') "
+                  "AND NOT " +
+                      anyNull(),
+                  [&](const tool::Row& row) { judge(reader, row, objects); });
+    const auto add = [&](const TokenNames& names, Finding::Severity severity, const std::string& strWhat,
+                         const std::string& strMeaning, const std::string& strRemedy) {
+        if (names.count()) {
+            findings.push_back({severity, strWhat + names.text(), strMeaning, strRemedy, {}});
+        }
+    };
+    add(objects.broken, Finding::Severity::Error, "no JSON object where there should be one in ",
+        "such a token opens nothing, or only what stands before the fault, or cannot be saved with a use "
+        "less",
+        "revoke them, or update --allow and --extra");
+    add(objects.throwing, Finding::Severity::Error, "lists of methods that hold an array or an object in ",
+        "the library throws an exception where it should grant or refuse, which ends a program that does not "
+        "catch it",
+        "revoke them, or update --allow");
+    add(objects.odd, Finding::Severity::Warning, "an API without a list of methods in ",
+        "it is open to calls that name no method, and to no others", "revoke them, or update --allow");
+    add(objects.deep, Finding::Severity::Warning,
+        "JSON of more than " + std::to_string(NESTING_MAX) + " levels in ",
+        "a program that reads such a token in a thread of a small stack crashes: 64 KiB have room for that "
+        "many "
+        "levels, 128 KiB for twice as many",
+        "revoke them, or update --allow and --extra");
+}
+
+void examineSpeed(Store& store, Findings& findings)
+{
+    const uint64_t nTokens = store.number("SELECT count(*) FROM token");
+    const std::string strIndexed =
+        "SELECT count(*) FROM pragma_index_list('token') AS list, "
+        "pragma_index_info(list.name) AS info WHERE info.seqno = 0 AND info.name = 'deadline'";
+    if (nTokens > TOKENS_WITHOUT_INDEX && 0 == store.number(strIndexed)) {
+        findings.push_back({Finding::Severity::Warning,
+                            std::to_string(nTokens) + " tokens, and no index on their deadline",
+                            "every call reads the whole table for expired tokens",
+                            "vemo-access-token tune",
+                            {}});
+    }
+}
+
+} // namespace
+
+namespace tool {
+
+void examineTokens(bool blTableSound, Findings& findings)
+{
+    {
+        Store store(Store::Access::Read);
+        examineRows(store, blTableSound, findings);
+        examineSpeed(store, findings);
+    }
+    // In a transaction of its own: at a million tokens each takes seconds, and programs wait for 5.
+    Store store(Store::Access::Read);
+    examineObjects(store, findings);
+}
+
+} // namespace tool
