@@ -38,18 +38,17 @@ public:
         }
     }
 
-    // The same, but waits so long at most, and then throws ETIMEDOUT.
+    // The same, but waits so long at most, and then throws ETIMEDOUT. Signals shorten the wait.
     CallLock(const char* szFile, std::chrono::milliseconds wait) : m_nFile(openFile(szFile))
     {
-        const auto end = std::chrono::steady_clock::now() + wait;
-        while (0 != flock(m_nFile, LOCK_EX | LOCK_NB)) {
-            if (EWOULDBLOCK == errno && std::chrono::steady_clock::now() >= end) {
+        for (auto left = wait; 0 != flock(m_nFile, LOCK_EX | LOCK_NB); left -= TRY_AGAIN_AFTER) {
+            if (EWOULDBLOCK == errno && left.count() <= 0) {
                 errno = ETIMEDOUT;
             }
             if (EWOULDBLOCK != errno && EINTR != errno) {
                 closeAndThrow(m_nFile, szFile);
             }
-            usleep(TRY_AGAIN_AFTER);
+            usleep(static_cast<useconds_t>(std::chrono::microseconds(TRY_AGAIN_AFTER).count()));
         }
     }
 
@@ -64,7 +63,7 @@ public:
     CallLock& operator=(const CallLock&) = delete;
 
 private:
-    static constexpr useconds_t TRY_AGAIN_AFTER = 10000;
+    static constexpr std::chrono::milliseconds TRY_AGAIN_AFTER{10};
 
     static int openFile(const char* szFile)
     {

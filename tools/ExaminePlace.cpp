@@ -200,7 +200,8 @@ bool examineBeside(Findings& findings)
             findings.push_back(
                 {Finding::Severity::Error,
                  strPath + (S_ISLNK(status->st_mode) ? " is a symbolic link" : " is no regular file"),
-                 "the database takes it for a journal of its own: calls can fail, or never end", strRemedy,
+                 "the database takes it for a journal of its own: calls can fail, or never end",
+                 strRemedy,
                  {}});
             blHarmless = false;
         } else if (0 != status->st_uid) {

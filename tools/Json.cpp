@@ -53,7 +53,7 @@ std::string firstError(const std::string& strReport)
 enum class Reading { Whole, Bad, TooDeep };
 
 Reading readBy(Json::CharReader& reader, const std::string& strText, Json::Value& jValue,
-             std::string& strReport)
+               std::string& strReport)
 {
     const auto parse = [&] {
         return reader.parse(strText.data(), strText.data() + strText.size(), &jValue, &strReport);

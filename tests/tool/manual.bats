@@ -110,9 +110,15 @@ there is no directory ...|rm -r "$VEMO_REDIRECT_DIR"; tool list
 there is no database ...|rm "$DB"; tool list
 ... has no table of tokens|sql "DROP TABLE token"; tool list
 ... stayed locked by another process for 5 seconds|locked list
+... stayed locked by ... for 5 seconds|VEMO_TEST_HASTE=1 flock "$VEMO_REDIRECT_DIR.lock" "$TOOL" purge
+... is not root's alone, and others could hold the lock for ever|chmod 0644 "$VEMO_REDIRECT_DIR.lock"; tool purge; rm "$VEMO_REDIRECT_DIR.lock"
+... is a symbolic link; name the place that it leads to|ln -s here "$DIR/link"; tool export "$DIR/link/file"
+... belongs to the database; choose another name|tool export "$DB"
+... has a ... in the place of the table of tokens|sql "DROP TABLE token; CREATE VIEW token AS SELECT 1"; tool init
 ... holds a token that cannot be read|sql "UPDATE token SET extra = NULL"; tool list
 ... is damaged|truncate -s 8192 "$DB"; tool list
 ... is no token database, or a damaged one|printf '%04096d' 0 >"$DB"; tool list
+token ... cannot be exported: ...|sql "UPDATE token SET extra = ''"; tool export
 several tokens begin with ...|sql "INSERT INTO token SELECT tid || 'x', $ROW FROM token"; tool show token---
 the user ... could not be looked up: ...|VEMO_TEST_LOOKUP=5 tool list --user root
 granted, but there is no user of the number ...|VEMO_TEST_LOOKUP=0 tool grant "token---$ZEROS" Api --print-user
@@ -120,7 +126,7 @@ granted, but the user of the number ... could not be looked up: ...|VEMO_TEST_LO
 cannot write the result: ...|tool list >/dev/full
 ... the change may have been made|VEMO_TEST_SYNC=file tool revoke token---
 ... the change was made, but a power cut can undo it|VEMO_TEST_SYNC=directory tool revoke token---
-out of memory|(ulimit -v 100000; tool create --uid 0 --function VPN --extra @<(yes))
+out of memory|head -c 60000000 /dev/zero | tr '\0' x >"$DIR/large"; (ulimit -v 100000; tool create --uid 0 --function VPN --extra "@$DIR/large")
 TABLE
     # One line of the page can hold two of them.
     section DIAGNOSTICS | sed -n 's/^\.It "\(.*\)"$/\1/p' | sed 's/\.\.\., /...\n/; s/, \.\.\. /\n... /' | diff "$DIR/sentences" -

@@ -191,7 +191,7 @@ ${DB##*/}-wal" ]
 
 @test "what others linked into a directory of theirs is not imported" {
     mkdir -m 0777 "$DIR/theirs"
-    a_line A >"$DIR/secret"
+    a_line A | whole >"$DIR/secret"
     tool init
     ln "$DIR/secret" "$DIR/theirs/file"
     run_tool import "$DIR/theirs/file"
