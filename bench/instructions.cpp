@@ -173,12 +173,12 @@ void tellEnvironment()
 #else
     const char szCompiler[] = "g++ " __VERSION__;
 #endif
-#if defined(__OPTIMIZE__) && defined(__SSP_STRONG__) && 2 == _FORTIFY_SOURCE
-    const char szBuild[] = "optimised and hardened";
+#ifdef __CET__
+    const char szHardened[] = ", hardened";
 #else
-    const char szBuild[] = "other than the release preset's";
+    const char szHardened[] = "";
 #endif
-    printf("compiler: %s\nbuild: %s\n", szCompiler, szBuild);
+    printf("compiler: %s\nbuild: %s%s\n", szCompiler, VEMO_ATOKEN_FLAGS, szHardened);
     printf("SQLite: %s\njsoncpp: %s\n", sqlite3_libversion(), JSONCPP_VERSION_STRING);
     printf("C library: glibc %s\n", gnu_get_libc_version());
 }
