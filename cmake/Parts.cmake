@@ -1,0 +1,77 @@
+# The parts of the project that need more than the library does. Each is ON, OFF or AUTO. Where something is missing,
+# it is an error if the part is ON; if it is AUTO, the part is left out.
+
+if(PROJECT_IS_TOP_LEVEL)
+  set(default AUTO)
+else()
+  set(default OFF)
+endif()
+set(values "ON, OFF, or AUTO: where all that it needs is installed")
+set(VEMO_ATOKEN_TOOL ${default} CACHE STRING "Build the administrator's tool: ${values}")
+set(BUILD_TESTING ${default} CACHE STRING "Build the tests: ${values}")
+set(VEMO_ATOKEN_BENCH OFF CACHE STRING "Build the benchmarks: ${values}")
+
+# vemo_part_needs(PART TITLE [FOUND PACKAGE]...)
+# PART is the variable that is ON, OFF or AUTO; FOUND is true where what that package of Debian brings is there.
+function(vemo_part_needs part title)
+  while(ARGN)
+    list(POP_FRONT ARGN found package)
+    if(NOT ${found})
+      list(APPEND missing ${package})
+    endif()
+  endwhile()
+  if(NOT missing)
+    return()
+  endif()
+  list(JOIN missing ", " missing)
+  if(NOT ${part} STREQUAL "AUTO")
+    # The blank keeps CMake from breaking the line.
+    message(FATAL_ERROR " Missing packages for ${title}: ${missing}")
+  endif()
+  message(STATUS "Left out: ${title}. Missing packages: ${missing}")
+  set(${part} OFF PARENT_SCOPE)
+endfunction()
+
+if(VEMO_ATOKEN_TOOL)
+  find_package(PkgConfig QUIET)
+  if(PKG_CONFIG_FOUND)
+    pkg_check_modules(smartcols QUIET IMPORTED_TARGET smartcols)
+    pkg_check_modules(libbsd QUIET IMPORTED_TARGET libbsd)
+    pkg_check_modules(libmd QUIET IMPORTED_TARGET libmd)
+  endif()
+  vemo_part_needs(VEMO_ATOKEN_TOOL "the tool" PKG_CONFIG_FOUND pkg-config smartcols_FOUND libsmartcols-dev
+                                              libbsd_FOUND libbsd-dev libmd_FOUND libmd-dev)
+endif()
+
+# The tests follow calls into the stand-ins; the platform's own libraries are not ours to test.
+if(VEMO_ATOKEN_PLATFORM)
+  set(BUILD_TESTING OFF)
+endif()
+if(BUILD_TESTING)
+  find_package(GTest QUIET)
+  vemo_part_needs(BUILD_TESTING "the tests" GTest_FOUND libgtest-dev)
+endif()
+
+# Some of the tests need more, and are parts of their own.
+if(BUILD_TESTING AND VEMO_ATOKEN_TOOL)
+  set(tool_tests ${BUILD_TESTING})
+  find_program(BATS bats)
+  find_program(SQLITE3 sqlite3)
+  find_path(TZDATA Europe/Berlin PATHS /usr/share/zoneinfo NO_DEFAULT_PATH)
+  execute_process(COMMAND /usr/bin/python3 -c "import pexpect" RESULT_VARIABLE result ERROR_QUIET)
+  if(result EQUAL 0)
+    set(PEXPECT TRUE)
+  endif()
+  vemo_part_needs(tool_tests "the tests of the tool" BATS bats SQLITE3 sqlite3 TZDATA tzdata PEXPECT python3-pexpect)
+endif()
+# They measure the build that ships.
+if(BUILD_TESTING AND CMAKE_BUILD_TYPE STREQUAL "Release")
+  set(valgrind_tests ${BUILD_TESTING})
+  find_program(VALGRIND valgrind)
+  vemo_part_needs(valgrind_tests "the tests with valgrind" VALGRIND valgrind)
+endif()
+
+if(VEMO_ATOKEN_BENCH)
+  find_package(benchmark QUIET)
+  vemo_part_needs(VEMO_ATOKEN_BENCH "the benchmarks" benchmark_FOUND libbenchmark-dev)
+endif()

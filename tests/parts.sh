@@ -1,0 +1,37 @@
+#!/bin/bash
+# A part of the build for which something is missing is left out, and is an error when it was asked for.
+# usage: parts.sh SOURCE-DIRECTORY COMPILER
+set -euo pipefail
+source=$1
+compiler=$2
+dir=$(mktemp -d)
+trap 'rm -rf "$dir"' EXIT
+
+configure()
+{
+    cmake -S "$source" -B "$dir/build" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" --no-warn-unused-cli "$@"
+}
+
+echo "Left out:"
+configure -DCMAKE_DISABLE_FIND_PACKAGE_{PkgConfig,GTest,benchmark,Doxygen}=ON >"$dir/log"
+sed -n 's/^-- Left out: //p' "$dir/log" | tee "$dir/left-out"
+diff "$dir/left-out" - <<END
+the tool. Missing packages: pkg-config, libsmartcols-dev, libbsd-dev, libmd-dev
+the tests. Missing packages: libgtest-dev
+the API reference. Missing packages: doxygen
+END
+
+echo "Asked for:"
+for part in VEMO_ATOKEN_TOOL BUILD_TESTING VEMO_ATOKEN_BENCH; do
+    if configure -D$part=ON >"$dir/log" 2>&1; then
+        echo "$part: no error"
+        exit 1
+    fi
+    sed -n 's/^ *\(Missing packages for \)/\1/p' "$dir/log"
+    configure -D$part=OFF >"$dir/log"
+done | tee "$dir/errors"
+diff "$dir/errors" - <<END
+Missing packages for the tool: pkg-config, libsmartcols-dev, libbsd-dev, libmd-dev
+Missing packages for the tests: libgtest-dev
+Missing packages for the benchmarks: libbenchmark-dev
+END
