@@ -18,10 +18,11 @@ void require(bool blDone)
     }
 }
 
-int flagsOf(tool::Table::Kind kind)
+// Only a terminal has a width to keep to.
+int flagsOf(tool::Table::Kind kind, bool blTerminal)
 {
     switch (kind) {
-    case tool::Table::Kind::Long: return SCOLS_FL_WRAP;
+    case tool::Table::Kind::Long: return blTerminal ? SCOLS_FL_WRAP : 0;
     case tool::Table::Kind::Right: return SCOLS_FL_RIGHT;
     case tool::Table::Kind::Short: break;
     }
@@ -42,15 +43,16 @@ Table::Table(const std::vector<Column>& columns, bool blHeader) : m_pTable(scols
     scols_table_enable_colors(pTable, isColoured(resultStream()));
     scols_table_set_column_separator(pTable, "  ");
     scols_table_enable_noencoding(pTable, true); // cells are printable
-    // libsmartcols would look at standard output, which need not be where the result goes. Only a
-    // terminal has a width to keep to.
+    // libsmartcols would look at standard output, which need not be where the result goes.
     scols_table_set_termforce(pTable, blTerminal ? SCOLS_TERMFORCE_ALWAYS : SCOLS_TERMFORCE_NEVER);
     struct winsize size = {};
     if (blTerminal && 0 == ioctl(fileno(resultStream()), TIOCGWINSZ, &size) && size.ws_col) {
         scols_table_set_termwidth(pTable, size.ws_col);
     }
     for (const Column& column : columns) {
-        require(nullptr != scols_table_new_column(pTable, column.szTitle, 0, flagsOf(column.kind)));
+        // Some versions of libsmartcols make room for titles that they do not print.
+        const char* szTitle = blHeader ? column.szTitle : nullptr;
+        require(nullptr != scols_table_new_column(pTable, szTitle, 0, flagsOf(column.kind, blTerminal)));
     }
 }
 

@@ -106,8 +106,8 @@ END
     row earliest "deadline = -9223372036854775808"
     run --separate-stderr bash -c '"$0" list --no-header | sed -E "s/[0-9]{5} d/NNNNN d/"' "$TOOL"
     expect 0 "\
-earliest  root  VPN          1  @-9223372036854775808  expired                        Api:get
-latest--  root  VPN          1  @9223372036854775807   in 1067519911NNNNN d           Api:get"
+earliest  root  VPN  1  @-9223372036854775808  expired                 Api:get
+latest--  root  VPN  1  @9223372036854775807   in 1067519911NNNNN d    Api:get"
 }
 
 @test "-o json and jsonl give whole records, ids masked" {
@@ -358,8 +358,8 @@ END
     shown='a'\''b"c\d\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff'
     run_tool list --no-header
     [ "$status" -eq 0 ]
-    [[ $output == *"  root  $shown     1  "*"  in 24 h  $shown  $shown:$shown" ||
-        $output == *"  root  $shown     1  "*"  in 23 h  $shown  $shown:$shown" ]]
+    [[ $output == *"  root  $shown  1  "*"  in 24 h  $shown  $shown:$shown" ||
+        $output == *"  root  $shown  1  "*"  in 23 h  $shown  $shown:$shown" ]]
 }
 
 @test "an allowance that cannot be read as such is shown as JSON" {

@@ -63,18 +63,18 @@ Web            1
 @test "stats --no-header leaves the titles out" {
     some_tokens
     run_tool stats --no-header
-    expect 0 "tokens                         4
-expired                        2
-unlimited uses                 2
-file size in bytes         16384
-free pages of 4096 bytes       0
+    expect 0 "tokens                        4
+expired                       2
+unlimited uses                2
+file size in bytes        16384
+free pages of 4096 bytes      0
 
-VPN            2
-Mail           1
-Web            1
+VPN   2
+Mail  1
+Web   1
 
-         0  root       3
-4000000000             1"
+         0  root  3
+4000000000        1"
 }
 
 @test "stats -o json and jsonl tell the same" {
@@ -133,7 +133,7 @@ vemo_access_token_user_tokens{uid="4000000000",user=""} 1'
     run_tool stats -o jsonl
     [[ $output == *'"functions":[{"function":"a\"b\\c\nd\té\\n","tokens":4}]'* ]]
     LC_ALL=C.UTF-8 run_tool stats --no-header
-    [ "${lines[5]}" = 'a"b\c\x0ad\x09é\n       4' ]
+    [ "${lines[5]}" = 'a"b\c\x0ad\x09é\n  4' ]
 }
 
 # Of one bad sample, the collector refuses the whole file.
