@@ -50,7 +50,7 @@ if [ "$mode" != --update ]; then
         exit 1
     fi
     difference=$(diff <(sed -n 's/^#   //p' "$baseline" | comparable) <(comparable <"$dir/environment")) ||
-        skip "the baseline (<) was not taken in this environment (>):"$'\n'"$difference"
+        skip "the baseline is of another compiler or other libraries"$'\n'"< the baseline's, > these"$'\n'"$difference"
 fi
 
 env -i LD_BIND_NOW=1 GLIBC_TUNABLES=$tunables VEMO_BENCH_MEMORY="$dir" \

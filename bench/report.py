@@ -122,7 +122,8 @@ def machine(results):
     ]
     if results["peers"].cells:
         redis = re.search(r"v=(\S+)", output_of(["redis-server", "--version"]))
-        postgresql = re.search(r"[\d.]+", output_of(["/usr/lib/postgresql/15/bin/postgres", "--version"]))
+        directory = output_of(["pg_config", "--bindir"]).strip()
+        postgresql = re.search(r"[\d.]+", output_of([f"{directory}/postgres", "--version"]))
         lines.append(f"Redis {redis.group(1)}, PostgreSQL {postgresql.group()}")
     return "".join(f"- {line}\n" for line in lines)
 

@@ -3,6 +3,8 @@
 # what it calls that callers may interpose.
 # usage: exports.sh LIBRARY EXPORTED-SYMBOLS.TXT
 set -euo pipefail
+# shellcheck source=scripts/releases.sh
+. "$(dirname "$0")/../scripts/releases.sh"
 library=$1
 list=$2
 status=0
@@ -14,8 +16,9 @@ if [ "$soname" != libvemoaccesstoken.so.6 ]; then
 fi
 
 # Json::Value crosses the interface: another jsoncpp would be another interface.
-if ! objdump -p "$library" | grep -q 'NEEDED *libjsoncpp.so.25$'; then
-    echo "the library needs another jsoncpp than callers have been compiled with"
+jsoncpp=$(objdump -p "$library" | awk '$1 == "NEEDED" && /jsoncpp/ { print $2 }')
+if [ "$jsoncpp" != "${JSONCPP[$RELEASE]-$jsoncpp}" ]; then
+    echo "the library needs $jsoncpp, and not ${JSONCPP[$RELEASE]} as programs of Debian $RELEASE do"
     status=1
 fi
 

@@ -106,12 +106,12 @@ std::string outcomeOf(const TokenStore& store, const Operation& operation, const
     return endOf(store, operation) + strDetails;
 }
 
-const Operation& operationNamed(const std::string& strName)
+const Operation& operationNamed(const char* szName)
 {
     for (const Operation& operation : operations()) {
-        if (strName == operation.szName) {
+        if (std::string(szName) == operation.szName) {
             return operation;
         }
     }
-    throw std::logic_error("no operation " + strName);
+    throw std::logic_error(std::string("no operation ") + szName);
 }

@@ -26,6 +26,6 @@ std::string outcomeOf(const TokenStore& store, const Operation& operation, const
 std::string firstLine(const std::string& strLog);
 
 // One of the operations, by its name.
-const Operation& operationNamed(const std::string& strName);
+const Operation& operationNamed(const char* szName);
 
 #endif
