@@ -111,7 +111,6 @@ void prepare()
             R"(","bind_sid":"","uid":0,"deadline":4102444800,"count":1,"create_time":1,"function":"f",)"
             R"("webapi_allow":{},"extra":{}})");
     fuzz::captureStreams();
-    tool::showLogLines();
 }
 
 bool has(const Texts& strArguments, const std::string& strArgument)

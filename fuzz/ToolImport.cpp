@@ -52,7 +52,6 @@ std::string exportText()
 void prepare()
 {
     fuzz::captureStreams();
-    tool::showLogLines();
 }
 
 bool isObject(const std::string& strLine)

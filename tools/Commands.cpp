@@ -1,6 +1,7 @@
 #include "Commands.h"
 
 #include "Console.h"
+#include "LogLines.h"
 #include "Masking.h"
 #include "Place.h"
 #include "Store.h"
@@ -87,9 +88,7 @@ int Commands::run(int nArguments, char** rgArguments)
         return printText(VERSION_TEXT);
     }
     command.take();
-    if (m_blVerbose) {
-        showLogLines();
-    }
+    const LogLines logLines(m_blVerbose);
     const int nStatus = command.run();
     try {
         flushResult();

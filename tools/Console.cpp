@@ -9,17 +9,13 @@
 #include <cstdlib>
 #include <cstring>
 #include <iostream>
-#include <sstream>
 
-#include "AccessTokenUtil.h"
 #include "Failure.h"
 #include "Store.h"
 
 namespace {
 
 FILE* g_pResult = stdout;
-
-const int BAR_WIDTH = 40;
 
 // What the stream's reader can show: only of a terminal anything is known.
 tool::Charset charsetOf(FILE* pStream)
@@ -36,36 +32,6 @@ bool isAscii(const std::string& strText)
 void writeResult(const std::string& strText)
 {
     fwrite(strText.data(), 1, strText.size(), g_pResult);
-}
-
-// The write function of the stream of log lines, which can hold what tokens do.
-ssize_t writeLog(void*, const char* szText, size_t cbText)
-{
-    if (!tool::isTerminal(stderr)) {
-        return static_cast<ssize_t>(fwrite(szText, 1, cbText, stderr));
-    }
-    try {
-        std::istringstream lines(std::string(szText, cbText));
-        for (std::string strLine; std::getline(lines, strLine);) {
-            fputs(tool::printable(strLine, tool::localeCharset()).c_str(), stderr);
-            fputs(lines.eof() ? "" : "\n", stderr);
-        }
-    } catch (const std::bad_alloc&) {
-        return -1; // the caller is a C function
-    }
-    return static_cast<ssize_t>(cbText);
-}
-
-FILE* openLog()
-{
-    cookie_io_functions_t functions = {};
-    functions.write = writeLog;
-    FILE* const pLog = fopencookie(nullptr, "w", functions);
-    if (!pLog) {
-        throw std::bad_alloc();
-    }
-    setvbuf(pLog, nullptr, _IOLBF, BUFSIZ);
-    return pLog;
 }
 
 } // namespace
@@ -89,14 +55,12 @@ FILE* resultStream()
     return g_pResult;
 }
 
-void showLogLines()
+void divertStdout(FILE* pStream)
 {
-    static FILE* const pLog = openLog();
-    if (pLog != stdout) {
+    if (pStream != stdout) {
         g_pResult = stdout;
-        stdout = pLog;
+        stdout = pStream;
     }
-    VEMO_ACCESS_TOKEN::logToStdout(true);
 }
 
 bool isTerminal(FILE* pStream)
@@ -120,6 +84,11 @@ void print(const std::string& strText)
     } else {
         writeResult(showableJson(strText, localeCharset()));
     }
+}
+
+std::string errorLine(const std::string& strText)
+{
+    return isTerminal(stderr) ? printable(strText, localeCharset()) : strText;
 }
 
 void complain(const std::string& strSentence)
@@ -176,41 +145,6 @@ bool confirm(const std::string& strQuestion)
         fputc('\n', stderr); // that an answer would have ended with
     }
     return 0 == strcasecmp(strAnswer.c_str(), "y") || 0 == strcasecmp(strAnswer.c_str(), "yes");
-}
-
-Progress::Progress(const std::string& strTitle, size_t nTotal, bool blWanted)
-    : m_strTitle(strTitle), m_nTotal(nTotal), m_blShown(blWanted && isTerminal(stderr))
-{
-    draw();
-}
-
-Progress::~Progress()
-{
-    if (m_blShown) {
-        fputc('\n', stderr);
-    }
-}
-
-void Progress::step()
-{
-    ++m_nDone;
-    const size_t nStride = m_nTotal / 100 + 1;
-    if (0 == m_nDone % nStride || m_nDone == m_nTotal) {
-        draw();
-    }
-}
-
-void Progress::draw() const
-{
-    if (!m_blShown) {
-        return;
-    }
-    const int nPercent = m_nTotal ? static_cast<int>(100 * m_nDone / m_nTotal) : 100;
-    const int nFilled = BAR_WIDTH * nPercent / 100;
-    fprintf(stderr, "\r%s [%s%s] %3d %%", m_strTitle.c_str(),
-            std::string(static_cast<size_t>(nFilled), '#').c_str(),
-            std::string(static_cast<size_t>(BAR_WIDTH - nFilled), ' ').c_str(), nPercent);
-    fflush(stderr);
 }
 
 } // namespace tool

@@ -19,9 +19,8 @@ void completeStreams();
 // Where results go: the standard output that the process was started with.
 FILE* resultStream();
 
-// Lets the library write its log lines, on standard error; to a terminal, printable. To be called before
-// the first result.
-void showLogLines();
+// Lets what others print to stdout go to another stream. Results go where they did.
+void divertStdout(FILE* pStream);
 
 bool isTerminal(FILE* pStream);
 
@@ -31,6 +30,9 @@ bool isColoured(FILE* pStream);
 // Writes to the result what holds nothing that cannot be seen, or is JSON. What a terminal cannot show of it
 // is escaped as in JSON; it takes no memory to write ASCII.
 void print(const std::string& strText);
+
+// What standard error shows of a text: to a terminal, printable.
+std::string errorLine(const std::string& strText);
 
 // Writes a line "vemo-access-token: ..." to standard error.
 void complain(const std::string& strSentence);
@@ -50,24 +52,6 @@ std::vector<std::string> readSecrets(const std::string& strPrompt);
 
 // Asks on the terminal. Fails where standard input or standard error is none.
 bool confirm(const std::string& strQuestion);
-
-// A progress bar on standard error, where that is a terminal.
-class Progress {
-public:
-    Progress(const std::string& strTitle, size_t nTotal, bool blWanted = true);
-    ~Progress();
-    Progress(const Progress&) = delete;
-    Progress& operator=(const Progress&) = delete;
-    void step();
-
-private:
-    void draw() const;
-
-    const std::string m_strTitle;
-    const size_t m_nTotal;
-    size_t m_nDone = 0;
-    const bool m_blShown;
-};
 
 } // namespace tool
 

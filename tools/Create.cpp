@@ -9,6 +9,7 @@
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
+#include "Signals.h"
 #include "Store.h"
 
 namespace {
@@ -61,17 +62,50 @@ Json::Value recordOf(const Options& options)
     return jToken;
 }
 
-// Deletes a token whose id nobody got to know. Returns what to say of that.
+// Deletes a token whose id nobody got to know. Returns what to say of that; "" when there was none.
 std::string takeBack(const std::string& strTid)
 {
+    const std::string strChange = tool::Store::hasChanged() ? "was made" : "may have been made";
     try {
         tool::Store store(tool::Store::Access::Write);
-        store.removeTid(strTid);
+        const bool blThere = 0 != store.removeTid(strTid);
         store.commit();
-        return "the token was taken back";
+        return blThere ? "the token was taken back" : "";
     } catch (const tool::Failure& failure) {
-        return std::string("the change was made, and cannot be taken back: ") + failure.fact();
+        return "the change " + strChange + ", and cannot be taken back: " + failure.fact();
     }
+}
+
+volatile sig_atomic_t g_nSignal = 0; // that came since the token was created
+
+void noteSignal(int nSignal)
+{
+    g_nSignal = nSignal;
+}
+
+// Writes the token, but for the end of the transaction.
+std::unique_ptr<tool::Store> prepare(const Json::Value& jToken)
+{
+    auto pStore = std::make_unique<tool::Store>(tool::Store::Access::Write, tool::Store::Missing::Make);
+    pStore->purge();
+    if (pStore->find(jToken["tid"].asString())) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, "--tid: there is a token with this id already");
+    }
+    pStore->create(jToken);
+    return pStore;
+}
+
+// Commits, and prints the id of a token that is there now.
+void complete(std::unique_ptr<tool::Store> pStore, const std::string& strLine)
+{
+    pStore->commit();
+    pStore.reset();
+    if (g_nSignal) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, "interrupted");
+    }
+    signal(SIGPIPE, SIG_IGN); // for write() to fail, where nobody reads
+    tool::print(strLine);
+    tool::flushResult(); // a signal ends the wait for who reads it
 }
 
 int create(const Options& options)
@@ -82,19 +116,21 @@ int create(const Options& options)
     const Json::Value jToken = recordOf(options);
     const std::string strTid = jToken["tid"].asString();
     const std::string strLine = tool::resultLine(strTid); // now, when a lack of memory does no harm yet
-    tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
-    store.purge();
-    if (store.find(strTid)) {
-        throw tool::Failure(tool::EXIT_STATUS_USAGE, "--tid: there is a token with this id already");
-    }
-    store.create(jToken);
-    store.commit();
-    signal(SIGPIPE, SIG_IGN); // for write() to fail, where nobody reads
+    auto pStore = prepare(jToken);
+    tool::handleEndingSignals(noteSignal);
     try {
-        tool::print(strLine);
-        tool::flushResult();
+        complete(std::move(pStore), strLine);
+    } catch (const tool::LockedFailure&) {
+        throw; // there is no token
     } catch (const tool::Failure& failure) {
-        throw tool::Failure(failure.status(), failure.fact(), takeBack(strTid));
+        const std::string strDone = takeBack(strTid);
+        if (!g_nSignal) {
+            throw tool::Failure(failure.status(), failure.fact(), strDone);
+        }
+        tool::complain(strDone.empty() ? "interrupted" : "interrupted; " + strDone);
+    }
+    if (g_nSignal) {
+        raise(g_nSignal);
     }
     return tool::EXIT_STATUS_DONE;
 }

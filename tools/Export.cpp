@@ -12,6 +12,7 @@
 #include "Json.h"
 #include "Masking.h"
 #include "NewFile.h"
+#include "Progress.h"
 #include "Store.h"
 #include "Values.h"
 

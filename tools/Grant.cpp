@@ -55,11 +55,16 @@ std::string refusal(tool::Store& store, const std::optional<Json::Value>& jFound
     return blSaved && 0 > VEMO_ACCESS_TOKEN::checkJsonType(jToken) ? "malformed token" : "";
 }
 
+std::string refusalNow(const std::string& strTid, const Options& options)
+{
+    tool::Store store(tool::Store::Access::Read);
+    return refusal(store, store.findByPrefix(strTid), options);
+}
+
 int check(const Options& options)
 {
     const std::string strTid = tool::readTid("TID", options.strTid);
-    tool::Store store(tool::Store::Access::Read);
-    const std::string strReason = refusal(store, store.findByPrefix(strTid), options);
+    const std::string strReason = refusalNow(strTid, options);
     if (tool::Layout::Form::Table == options.layout.form) {
         tool::print(strReason.empty() ? "allowed\n" : "refused: " + strReason + "\n");
     } else {

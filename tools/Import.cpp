@@ -14,6 +14,7 @@
 #include "ExportEnd.h"
 #include "InputFile.h"
 #include "Json.h"
+#include "Progress.h"
 #include "Store.h"
 #include "Values.h"
 
@@ -175,6 +176,26 @@ Contents readFile(const std::string& strFile)
     }
 }
 
+// Returns how many of them have expired.
+size_t createTokens(const std::vector<Line>& lines, const std::string& strFile)
+{
+    tool::Progress progress("Importing", lines.size());
+    tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
+    size_t nExpired = 0;
+    for (const Line& line : lines) {
+        Json::Value jFilter;
+        jFilter["tid"] = line.jToken["tid"];
+        if (!store.tokens(jFilter).empty()) {
+            throw badLine(nameOf(strFile), line.nNumber, "has the id of a token that is there already");
+        }
+        store.create(line.jToken);
+        nExpired += line.jToken["deadline"].asInt64() < time(nullptr);
+        progress.step();
+    }
+    store.commit();
+    return nExpired;
+}
+
 void importFile(const std::string& strFile, bool blPartial)
 {
     const Contents contents = readFile(strFile);
@@ -182,22 +203,7 @@ void importFile(const std::string& strFile, bool blPartial)
     if (!contents.strFlaw.empty() && !blPartial) {
         throw badFile(nameOf(strFile), contents.strFlaw, "--partial imports what is there");
     }
-    tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
-    size_t nExpired = 0;
-    {
-        tool::Progress progress("Importing", lines.size());
-        for (const Line& line : lines) {
-            Json::Value jFilter;
-            jFilter["tid"] = line.jToken["tid"];
-            if (!store.tokens(jFilter).empty()) {
-                throw badLine(nameOf(strFile), line.nNumber, "has the id of a token that is there already");
-            }
-            store.create(line.jToken);
-            nExpired += line.jToken["deadline"].asInt64() < time(nullptr);
-            progress.step();
-        }
-    }
-    store.commit();
+    const size_t nExpired = createTokens(lines, strFile);
     tool::print(tool::countText(lines.size(), "token") + " imported\n");
     if (!contents.strFlaw.empty()) {
         tool::complain(nameOf(strFile) + ": " + contents.strFlaw + "; the whole lines were imported");

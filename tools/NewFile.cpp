@@ -1,7 +1,6 @@
 #include "NewFile.h"
 
 #include <fcntl.h>
-#include <signal.h>
 #include <sys/file.h>
 #include <unistd.h>
 
@@ -14,11 +13,11 @@
 #include "Failure.h"
 #include "Masking.h"
 #include "Place.h"
+#include "Signals.h"
 
 namespace {
 
 const mode_t FILE_MODE = S_IRUSR | S_IWUSR;
-const int ENDING_SIGNALS[] = {SIGHUP, SIGINT, SIGQUIT, SIGTERM, SIGXFSZ};
 
 // What a signal removes: a name in a directory.
 int g_nDirectory = -1;
@@ -38,36 +37,6 @@ void removeAndEnd(int nSignal)
     removeUnfinished();
     raise(nSignal);
 }
-
-// Those that are ignored stay so.
-void handleSignals()
-{
-    for (const int nSignal : ENDING_SIGNALS) {
-        struct sigaction action = {};
-        if (0 == sigaction(nSignal, nullptr, &action) && SIG_DFL == action.sa_handler) {
-            action.sa_handler = removeAndEnd;
-            action.sa_flags = static_cast<int>(SA_RESETHAND);
-            sigaction(nSignal, &action, nullptr);
-        }
-    }
-}
-
-// Holds signals up while a file comes or goes.
-class SignalPause {
-public:
-    SignalPause()
-    {
-        sigset_t all;
-        sigfillset(&all);
-        sigprocmask(SIG_BLOCK, &all, &m_before);
-    }
-    ~SignalPause() { sigprocmask(SIG_SETMASK, &m_before, nullptr); }
-    SignalPause(const SignalPause&) = delete;
-    SignalPause& operator=(const SignalPause&) = delete;
-
-private:
-    sigset_t m_before;
-};
 
 tool::FilePlace placeOf(const std::string& strPath)
 {
@@ -152,7 +121,7 @@ void NewFile::requirePlace() const
 Descriptor NewFile::makeNamed()
 {
     removeRemains();
-    handleSignals();
+    handleEndingSignals(removeAndEnd);
     const SignalPause pause;
     Descriptor file(openat(m_place.directory.get(), m_strUnfinished.c_str(),
                            O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, FILE_MODE));

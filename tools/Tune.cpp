@@ -8,6 +8,7 @@
 #include "Console.h"
 #include "Failure.h"
 #include "Layout.h"
+#include "Progress.h"
 #include "Store.h"
 #include "Table.h"
 
@@ -48,10 +49,12 @@ bool hasIndex(Store& store, const std::string& strField)
                              strField + "'");
 }
 
+typedef std::vector<std::pair<std::string, std::string>> Figures;
+
 // What a store does, and how fast; with the same words before and after.
-std::vector<std::pair<std::string, std::string>> measured(Store& store, bool blWrite)
+Figures measured(Store& store, bool blWrite)
 {
-    std::vector<std::pair<std::string, std::string>> lines = {
+    Figures lines = {
         {"look for expired tokens, as every call does",
          timeOf(store, std::string("SELECT tid FROM token WHERE ") + tool::SQL_EXPIRED)},
         {"look for a session's tokens", timeOf(store, "SELECT tid FROM token WHERE bind_sid = '\x01'")},
@@ -90,11 +93,10 @@ std::vector<std::string> statements(const Options& options)
     return strStatements;
 }
 
-void execute(Store& store, const Options& options)
+void execute(Store& store, const Options& options, tool::Progress& progress)
 {
     const std::string strJournal = options.blUndo ? "delete" : "wal";
     const std::vector<std::string> strStatements = statements(options);
-    tool::Progress progress("Tuning", strStatements.size());
     for (const std::string& strStatement : strStatements) {
         const std::string strResult = store.text(strStatement);
         // Of all statements only that of the journal gives a row. It can do nothing without an error.
@@ -109,12 +111,17 @@ void execute(Store& store, const Options& options)
     }
 }
 
+Figures look()
+{
+    Store store(Store::Access::Read);
+    return measured(store, false);
+}
+
 // What is, and what would be done.
 int tell(const Options& options)
 {
-    Store store(Store::Access::Read);
     tool::Table table({{"WHAT", Kind::Short}, {"NOW", Kind::Short}}, !options.blNoHeader);
-    for (const auto& [strWhat, strNow] : measured(store, false)) {
+    for (const auto& [strWhat, strNow] : look()) {
         table.add({strWhat, strNow});
     }
     table.print();
@@ -124,15 +131,22 @@ int tell(const Options& options)
     return tool::EXIT_STATUS_DONE;
 }
 
+// Returns what was before and what is after.
+std::pair<Figures, Figures> change(const Options& options)
+{
+    tool::Progress progress("Tuning", statements(options).size());
+    Store store(Store::Access::Locked);
+    const Figures before = measured(store, true);
+    execute(store, options, progress);
+    return {before, measured(store, true)};
+}
+
 int tune(const Options& options)
 {
     if (options.blDryRun) {
         return tell(options);
     }
-    Store store(Store::Access::Locked);
-    const auto before = measured(store, true);
-    execute(store, options);
-    const auto after = measured(store, true);
+    const auto [before, after] = change(options);
     tool::Table table({{"WHAT", Kind::Short}, {"BEFORE", Kind::Short}, {"AFTER", Kind::Short}},
                       !options.blNoHeader);
     for (size_t i = 0; i < before.size(); ++i) {

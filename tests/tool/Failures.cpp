@@ -1,15 +1,23 @@
 // For tests of what the tool says when the system fails: with "file" or "directory" in VEMO_TEST_SYNC, none
 // of these can be synced; with an errno in VEMO_TEST_LOOKUP, each look-up of a user ends with it and finds
-// nobody.
+// nobody. For each log line, the file that VEMO_TEST_SYSLOG names gets "held" or "free": what the lock is
+// then.
 
 #include <dlfcn.h>
+#include <fcntl.h>
 #include <pwd.h>
+#include <sys/file.h>
 #include <sys/stat.h>
+#include <syslog.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdarg>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
+
+#include "CallLock.h"
 
 #define SCRIPTED extern "C" __attribute__((visibility("default")))
 
@@ -45,7 +53,37 @@ int lookUp(const char* szFunction, Key key, struct passwd* pEntry, char* szBuffe
     return next(szFunction, key, pEntry, szBuffer, cbBuffer, ppEntry);
 }
 
+void writeLine(int nPriority, const char* szFormat, va_list args)
+{
+    FILE* const pFile = getenv("VEMO_TEST_SYSLOG") ? fopen(getenv("VEMO_TEST_SYSLOG"), "a") : nullptr;
+    if (!pFile) {
+        vsyslog(nPriority, szFormat, args);
+        return;
+    }
+    const int nLock = open(CallLock::FILE_OF_ALL, O_RDWR | O_CLOEXEC);
+    fputs(0 == flock(nLock, LOCK_EX | LOCK_NB) ? "free\n" : "held\n", pFile);
+    close(nLock);
+    fclose(pFile);
+}
+
 } // namespace
+
+// The library writes its lines by the one, the tool by the other where it is hardened.
+SCRIPTED void syslog(int nPriority, const char* szFormat, ...)
+{
+    va_list args;
+    va_start(args, szFormat);
+    writeLine(nPriority, szFormat, args);
+    va_end(args);
+}
+
+SCRIPTED void __syslog_chk(int nPriority, int, const char* szFormat, ...)
+{
+    va_list args;
+    va_start(args, szFormat);
+    writeLine(nPriority, szFormat, args);
+    va_end(args);
+}
 
 SCRIPTED int fsync(int nFile)
 {

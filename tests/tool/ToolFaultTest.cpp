@@ -142,11 +142,13 @@ TEST_P(ToolFault, OfMemoryIsTold)
     print("allocations");
 }
 
-// Those that can be caught make a difference where a file must go.
+// Those that can be caught make a difference where a file must go, or an id must be told.
 TEST_P(ToolChange, BySignalLeavesAllOrNothing)
 {
-    const bool blExports = GetParam().strArguments[0] == "export";
-    const auto signals = blExports ? std::vector<int>{SIGKILL, SIGINT, SIGTERM} : std::vector<int>{SIGKILL};
+    const std::string& strCommand = GetParam().strArguments[0];
+    const auto signals = strCommand == "export" || strCommand == "create"
+                             ? std::vector<int>{SIGKILL, SIGINT, SIGTERM}
+                             : std::vector<int>{SIGKILL};
     m_nCalls = m_pScene->calls(Fault::Kind::Signal);
     for (int64_t nCall = 1; nCall <= m_nCalls; nCall += strideOf(1)) {
         for (const int nSignal : signals) {

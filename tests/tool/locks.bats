@@ -460,3 +460,13 @@ $open" ]
     run_tool purge
     expect 0 "0 tokens purged"
 }
+
+@test "log lines are written when nobody waits for the lock any more" {
+    row token---
+    sql "CREATE TRIGGER stop BEFORE DELETE ON token BEGIN SELECT RAISE(ABORT, 'stopped'); END"
+    VEMO_TEST_SYSLOG=$DIR/log run_tool revoke token---
+    [ "$status" -eq 4 ]
+    [ "$(sort -u "$DIR/log")" = free ]
+    run_tool revoke -v token---
+    [ "$(grep -c "run sql failed" <<<"$stderr")" -ge 1 ]
+}

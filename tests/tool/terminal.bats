@@ -426,3 +426,28 @@ bar()
     expect 0 "$(tool export 2>/dev/null)
 vemo-access-token: 2 tokens exported"
 }
+
+@test "a terminal that was stopped holds up nobody but the tool itself" {
+    tool init
+    local i
+    for ((i = 0; i < 300; ++i)); do
+        printf '{"tid":"%0127d","bind_sid":"","uid":0,"deadline":9999999999,"count":1,"create_time":1,"function":"f","webapi_allow":{},"extra":{}}\n' "$i"
+    done | whole >"$DIR/file"
+    local arguments
+    for arguments in "import $DIR/file" tune; do
+        # It is stopped as soon as the bar shows, and let go when another program has worked.
+        # shellcheck disable=SC2086 # several arguments
+        /usr/bin/python3 - "$TOOL" $arguments >"$DIR/id" <<'END'
+import os, pty, subprocess, sys, termios
+own, other = pty.openpty()
+tool = subprocess.Popen(sys.argv[1:], stderr=other, stdout=subprocess.DEVNULL)
+os.read(own, 1)
+termios.tcflow(other, termios.TCOOFF)
+subprocess.run([sys.argv[1], "create", "--uid", "0", "--function", "f"], check=True, timeout=20)
+termios.tcflow(other, termios.TCOON)
+sys.exit(tool.wait(timeout=20))
+END
+        tool show - --field uid <"$DIR/id"
+    done
+    [ "$(tool list --count)" -eq 302 ]
+}

@@ -1,0 +1,28 @@
+// The signals that end a process unless it handles them.
+
+#ifndef TOOLS_SIGNALS_H
+#define TOOLS_SIGNALS_H
+
+#include <signal.h>
+
+namespace tool {
+
+// Has them handled, each once: its second coming does what it does by default. Those that are ignored stay
+// so.
+void handleEndingSignals(void (*handle)(int));
+
+// Holds all signals up while it lives.
+class SignalPause {
+public:
+    SignalPause();
+    ~SignalPause();
+    SignalPause(const SignalPause&) = delete;
+    SignalPause& operator=(const SignalPause&) = delete;
+
+private:
+    sigset_t m_before;
+};
+
+} // namespace tool
+
+#endif
