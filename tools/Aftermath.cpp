@@ -13,7 +13,15 @@ namespace {
 
 // A statement waits for a lock 500 times 10 ms at most; a second is for what stands around that.
 const std::chrono::seconds CALL_MAX(6);
-const std::chrono::milliseconds LOOK_AGAIN_AFTER(2);
+const std::chrono::milliseconds LOOK_AGAIN_AFTER(10);
+const std::chrono::microseconds LOOK_FOR_CLOSED_AFTER(100);
+
+// One that was closed and opened again between two looks seems to be the old one.
+void forgetClosed(std::vector<std::string>& strOpen)
+{
+    const auto isClosed = [](const std::string& strDescriptor) { return !tool::isOfDatabase(strDescriptor); };
+    strOpen.erase(std::remove_if(strOpen.begin(), strOpen.end(), isClosed), strOpen.end());
+}
 
 // Returns who has had the database open all the time.
 std::vector<std::string> outlast(const std::function<uint64_t()>& restore, uint64_t& nUndone)
@@ -33,13 +41,13 @@ std::vector<std::string> outlast(const std::function<uint64_t()>& restore, uint6
             break;
         } else {
             // It takes turns with the other programs, whom a look at many tokens keeps from committing.
-            std::this_thread::sleep_for(std::max<Clock::duration>(LOOK_AGAIN_AFTER, Clock::now() - start));
+            const auto pause = std::max<Clock::duration>(LOOK_AGAIN_AFTER, Clock::now() - start);
+            for (const auto next = Clock::now() + pause; !strOpen.empty() && Clock::now() < next;) {
+                forgetClosed(strOpen);
+                std::this_thread::sleep_for(LOOK_FOR_CLOSED_AFTER);
+            }
         }
-        // A descriptor that was closed and opened again between two looks seems to be the old one.
-        const auto isClosed = [](const std::string& strDescriptor) {
-            return !tool::isOfDatabase(strDescriptor);
-        };
-        strOpen.erase(std::remove_if(strOpen.begin(), strOpen.end(), isClosed), strOpen.end());
+        forgetClosed(strOpen);
     }
     return strOpen;
 }
@@ -62,6 +70,10 @@ void outlastCalls(const std::function<uint64_t()>& restore, const std::string& s
     if (nUndone) {
         complain(strUndone + " " + countText(nUndone, "time") +
                  ", by calls that do not take the lock, and was " + strDone + " again");
+    }
+    if (!canSeeProcesses()) {
+        complain("/proc does not tell who has the database open: what was read before can still be written "
+                 "back");
     }
     if (!strOpen.empty()) {
         complain(ownersText(strOpen) +

@@ -130,7 +130,7 @@ void examinePrivacy(const std::string& strPath, const struct stat& status,
     }
 }
 
-// What cannot be opened as a directory. Returns whether the database can be looked at all the same.
+// What cannot be opened as a directory. Returns whether there may be files all the same.
 bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings)
 {
     const std::function<void()> none;
@@ -157,13 +157,14 @@ bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings
     }
 }
 
-// Returns whether the directory is one.
-bool examineDirectory(Findings& findings)
+// Returns whether there may be files. blTrusted tells whether only root can put anything in their place.
+bool examineDirectory(bool& blTrusted, Findings& findings)
 {
     tool::Walk walk(tool::databaseDirectory());
-    bool blTrusted = true; // so far
+    blTrusted = true; // so far
     while (!walk.isDone()) {
         if (!walk.step()) {
+            blTrusted = false;
             return examineObstacle(walk.path(), walk.isDone(), findings);
         }
         const struct stat status = tool::statusOf(walk.directory());
@@ -171,6 +172,7 @@ bool examineDirectory(Findings& findings)
             // What stands in it is looked at when it is root's.
             const auto repair = [] { makePrivate(tool::databaseDirectory(), openTrustedDirectory); };
             examinePrivacy(walk.path(), status, blTrusted ? repair : std::function<void()>(), findings);
+            blTrusted = blTrusted && !canOthersWrite(status);
         } else if (canOthersWrite(status)) {
             blTrusted = false;
             findings.push_back({Finding::Severity::Warning,
@@ -183,6 +185,14 @@ bool examineDirectory(Findings& findings)
     }
     tool::examineWritability(walk.path(), findings);
     return true;
+}
+
+// Whether a journal names another one, of a change to several databases at once, in its end. Whoever opens
+// the database opens and deletes what is named there. No program that uses tokens makes such a change.
+bool isOfSeveral(const std::string& strSuffix)
+{
+    const std::string strMark = "\xd9\xd5\x05\xf9\x20\xa1\x63\xd7";
+    return tool::lastBytes(strSuffix, strMark.size()) == strMark;
 }
 
 // Returns whether the database can be opened: whoever opens it opens what has these names, too.
@@ -208,6 +218,14 @@ bool examineBeside(Findings& findings)
             findings.push_back({Finding::Severity::Error,
                                 strPath + " belongs to uid " + std::to_string(status->st_uid),
                                 "the next program to open the database may take its contents for changes",
+                                strRemedy,
+                                {}});
+            blHarmless = false;
+        } else if (1 != status->st_nlink || isOfSeveral(strSuffix)) {
+            findings.push_back({Finding::Severity::Error,
+                                strPath + (1 != status->st_nlink ? " has several hard links"
+                                                                 : " is one of several that belong together"),
+                                "the next program to open the database changes other files, too",
                                 strRemedy,
                                 {}});
             blHarmless = false;
@@ -255,6 +273,24 @@ bool examineFile(bool blMake, Findings& findings)
     return true;
 }
 
+// Returns whether this SQLite can work on the database.
+bool examineVersion(Findings& findings)
+{
+    const size_t WRITE_VERSION = 18; // where the database says what its writers must know: 2 at most
+    const std::string strHeader = tool::firstBytes("", WRITE_VERSION + 1);
+    if (strHeader.size() <= WRITE_VERSION || 0 != strHeader.compare(0, 6, "SQLite") ||
+        2 >= static_cast<unsigned char>(strHeader[WRITE_VERSION])) {
+        return true;
+    }
+    findings.push_back(
+        {Finding::Severity::Error,
+         "the database says that only a later SQLite can write to it",
+         "no token can be created, changed or granted",
+         std::string("save the tokens with \"vemo-access-token export\"; ") + tool::REMEDY_REPLACE,
+         {}});
+    return true;
+}
+
 // Returns whether the database can be opened without harm. Whoever opens it takes the changes in a
 // write-ahead journal for its own.
 bool examineForeignJournal(Findings& findings)
@@ -273,19 +309,28 @@ bool examineForeignJournal(Findings& findings)
     return false;
 }
 
+// Whether a file is what an export has left behind, and none is writing it.
+bool isLeftBehind(const std::string& strName)
+{
+    const std::string strEnd = tool::UNFINISHED_SUFFIX;
+    const Descriptor directory(open(tool::databaseDirectory().c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    return strName.size() > strEnd.size() &&
+           0 == strName.compare(strName.size() - strEnd.size(), strEnd.size(), strEnd) &&
+           tool::lockRemains(directory, strName).isOpen();
+}
+
 // What an export leaves behind that was cut off by a power cut.
 void examineRemains(Findings& findings)
 {
     std::error_code error;
     for (const auto& entry : std::filesystem::directory_iterator(tool::databaseDirectory(), error)) {
         const std::string strName = entry.path().filename();
-        if (entry.path().extension() == tool::UNFINISHED_SUFFIX) {
+        if (isLeftBehind(strName)) {
             findings.push_back(
                 {Finding::Severity::Warning,
                  tool::databaseDirectory() + "/" + tool::shownPath(strName) + " was left behind",
                  "an export was cut off; the file can hold whole ids", "remove it", [strName] {
-                     const Descriptor directory = openTrustedDirectory();
-                     requireCall(unlinkat(directory.get(), strName.c_str(), 0), strName);
+                     requireCall(tool::removeRemains(openTrustedDirectory(), strName) ? 0 : -1, strName);
                      Store::settleChange();
                  }});
         }
@@ -314,14 +359,16 @@ namespace tool {
 bool examinePlace(Findings& findings)
 {
     examineLock(findings);
-    if (!examineDirectory(findings)) {
+    bool blTrusted = false;
+    if (!examineDirectory(blTrusted, findings)) {
         return false;
     }
     examineRemains(findings);
     const bool blJournals = examineBeside(findings);
     const bool blFile = examineFile(blJournals, findings);
     examineFileSystem(findings);
-    return blJournals && blFile && examineForeignJournal(findings);
+    // Others could put a journal there in the moment in which the database is opened.
+    return blTrusted && blJournals && blFile && examineVersion(findings) && examineForeignJournal(findings);
 }
 
 } // namespace tool

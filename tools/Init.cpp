@@ -12,6 +12,10 @@ namespace {
 int init()
 {
     const bool blDirectory = tool::makeDirectory();
+    if (blDirectory) {
+        tool::Store::settleChange();
+        tool::print("made the directory " + tool::databaseDirectory() + "\n");
+    }
     bool blFile = false;
     bool blTable = false;
     {
@@ -19,16 +23,14 @@ int init()
         blFile = store.hasMadeFile();
         blTable = store.makeTable() || blFile; // the library makes it with a file that it finds missing
     }
-    if (blDirectory || blFile) {
-        tool::Store::settleChange();
-    }
-    if (blDirectory) {
-        tool::print("made the directory " + tool::databaseDirectory() + "\n");
-    }
     if (blFile) {
         tool::print("made the file " VEMO_ATOKEN_DB_PATH "\n");
     }
-    tool::print(blTable ? "made the table of tokens\n" : "all was there already\n");
+    if (blTable) {
+        tool::print("made the table of tokens\n");
+    } else if (!blDirectory) {
+        tool::print("all was there already\n");
+    }
     return tool::EXIT_STATUS_DONE;
 }
 

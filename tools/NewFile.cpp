@@ -47,11 +47,28 @@ tool::FilePlace placeOf(const std::string& strPath)
     }
 }
 
+// Whether a name in a directory is that of an open file.
+bool isNamed(const tool::Descriptor& file, const tool::Descriptor& directory, const std::string& strName)
+{
+    const struct stat status = tool::statusOf(file);
+    struct stat named = {};
+    return 0 == fstatat(directory.get(), strName.c_str(), &named, AT_SYMLINK_NOFOLLOW) &&
+           named.st_dev == status.st_dev && named.st_ino == status.st_ino;
+}
+
 bool isSame(const struct stat& status, const std::string& strPath)
 {
     struct stat other = {};
     return 0 == stat(strPath.c_str(), &other) && other.st_dev == status.st_dev &&
            other.st_ino == status.st_ino;
+}
+
+// Whether a place is that of a path, whatever the way to it is called.
+bool isPlaceOf(const tool::FilePlace& place, const std::string& strPath)
+{
+    const size_t nSlash = strPath.rfind('/');
+    return place.strName == strPath.substr(nSlash + 1) &&
+           isSame(tool::statusOf(place.directory), strPath.substr(0, nSlash));
 }
 
 // Whether a name belongs to the database: it, its journals and the lock, whatever the way to them is called.
@@ -60,6 +77,7 @@ bool isOfDatabase(const tool::FilePlace& place, const struct stat* pStatus)
     const std::string strDatabase = tool::databaseName();
     bool blSame = isSame(tool::statusOf(place.directory), tool::databaseDirectory()) &&
                   0 == place.strName.compare(0, strDatabase.size(), strDatabase);
+    blSame = blSame || isPlaceOf(place, CallLock::FILE_OF_ALL);
     if (pStatus) {
         blSame = blSame || isSame(*pStatus, VEMO_ATOKEN_DB_PATH) || isSame(*pStatus, CallLock::FILE_OF_ALL);
         for (const char* szSuffix : tool::JOURNAL_SUFFIXES) {
@@ -72,6 +90,28 @@ bool isOfDatabase(const tool::FilePlace& place, const struct stat* pStatus)
 } // namespace
 
 namespace tool {
+
+Descriptor lockRemains(const Descriptor& directory, const std::string& strName)
+{
+    Descriptor remains = openRegular(directory, strName);
+    if (!remains.isOpen()) {
+        return remains;
+    }
+    const struct stat status = statusOf(remains);
+    const bool blOurs = geteuid() == status.st_uid && FILE_MODE == (status.st_mode & 07777);
+    // While somebody waited for the lock, the name can have gone to another file.
+    if (!blOurs || 0 != flock(remains.get(), LOCK_EX | LOCK_NB) || !isNamed(remains, directory, strName)) {
+        errno = EEXIST;
+        return Descriptor();
+    }
+    return remains;
+}
+
+bool removeRemains(const Descriptor& directory, const std::string& strName)
+{
+    const Descriptor remains = lockRemains(directory, strName);
+    return remains.isOpen() ? 0 == unlinkat(directory.get(), strName.c_str(), 0) : ENOENT == errno;
+}
 
 NewFile::NewFile(const std::string& strPath)
     : m_strPath(strPath), m_place(placeOf(strPath)), m_strUnfinished(m_place.strName + UNFINISHED_SUFFIX)
@@ -117,29 +157,25 @@ void NewFile::requirePlace() const
     }
 }
 
-// The lock on it tells that it is being written.
+// The lock on it tells that it is being written. Until it has that, another export can take it for remains.
 Descriptor NewFile::makeNamed()
 {
-    removeRemains();
+    if (!removeRemains(m_place.directory, m_strUnfinished)) {
+        return Descriptor();
+    }
     handleEndingSignals(removeAndEnd);
     const SignalPause pause;
     Descriptor file(openat(m_place.directory.get(), m_strUnfinished.c_str(),
                            O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, FILE_MODE));
     if (file.isOpen()) {
-        flock(file.get(), LOCK_EX | LOCK_NB);
+        if (0 != flock(file.get(), LOCK_EX | LOCK_NB) || !isNamed(file, m_place.directory, m_strUnfinished)) {
+            errno = EEXIST;
+            return Descriptor();
+        }
         g_nDirectory = m_place.directory.get();
         g_szUnfinished = m_strUnfinished.c_str();
     }
     return file;
-}
-
-// Removes what an export of this name has left behind that was cut off, but not what one is writing.
-void NewFile::removeRemains()
-{
-    const Descriptor remains = openRegular(m_place.directory, m_strUnfinished);
-    if (remains.isOpen() && 0 == flock(remains.get(), LOCK_EX | LOCK_NB)) {
-        unlinkat(m_place.directory.get(), m_strUnfinished.c_str(), 0);
-    }
 }
 
 void NewFile::write(const std::string& strText)
@@ -169,11 +205,8 @@ bool NewFile::giveName()
         if (link(m_place.strName)) {
             return true;
         }
-        if (EEXIST != errno) {
-            return false;
-        }
-        removeRemains();
-        if (!link(m_strUnfinished)) {
+        if (EEXIST != errno || 0 != flock(fileno(m_pStream), LOCK_EX | LOCK_NB) ||
+            !removeRemains(m_place.directory, m_strUnfinished) || !link(m_strUnfinished)) {
             return false;
         }
         g_nDirectory = nDirectory;
@@ -196,6 +229,11 @@ bool NewFile::link(const std::string& strName)
 
 void NewFile::fail() const
 {
+    if (EEXIST == errno) {
+        throw Failure(EXIT_STATUS_STORE, shownPath(m_strPath + UNFINISHED_SUFFIX) +
+                                             " is in the way: another export is writing it, "
+                                             "or it is none's");
+    }
     throw Failure(EXIT_STATUS_STORE, shownPath(m_strPath) + ": " + strerror(errno));
 }
 

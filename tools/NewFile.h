@@ -13,6 +13,13 @@ namespace tool {
 // What stands behind a file's name until it is complete, where it must have one.
 const char* const UNFINISHED_SUFFIX = ".part";
 
+// What an export of such a name has left behind, open and locked; none, with errno set, where there is none
+// or one is writing it, or where it is something else: EEXIST. Keep it open while it is removed.
+Descriptor lockRemains(const Descriptor& directory, const std::string& strName);
+
+// Removes it. Returns false, with errno set, where it cannot.
+bool removeRemains(const Descriptor& directory, const std::string& strName);
+
 // All members throw Failure. Only its owner can read the file. Until it is complete it has no name, and
 // whatever ends the process ends it, too. On file systems that do not know files without a name it has
 // another one; a signal that can be caught removes that, and so does the next file of this name. A process
@@ -33,7 +40,6 @@ private:
     [[noreturn]] void fail() const;
     void requirePlace() const;
     Descriptor makeNamed();
-    void removeRemains();
     bool giveName();
     bool link(const std::string& strName);
 

@@ -35,6 +35,22 @@ tool::Descriptor makePrivateDirectory(bool& blMade)
     return std::move(walk.directory());
 }
 
+// The database, or the journal with this suffix, if it is a regular file.
+tool::Descriptor openBeside(const std::string& strSuffix)
+{
+    const tool::Descriptor directory(
+        open(tool::databaseDirectory().c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+    return tool::openRegular(directory, tool::databaseName() + strSuffix);
+}
+
+std::string bytesAt(const tool::Descriptor& file, off_t nOffset, size_t cbWanted)
+{
+    std::string strBytes(cbWanted, '\0');
+    const ssize_t cbRead = pread(file.get(), strBytes.data(), cbWanted, nOffset);
+    strBytes.resize(cbRead > 0 ? static_cast<size_t>(cbRead) : 0);
+    return strBytes;
+}
+
 } // namespace
 
 namespace tool {
@@ -47,7 +63,7 @@ std::string databaseDirectory()
 
 std::string databaseName()
 {
-    return VEMO_ATOKEN_DB_PATH + databaseDirectory().size() + 1;
+    return std::string(VEMO_ATOKEN_DB_PATH).substr(databaseDirectory().size() + 1);
 }
 
 std::optional<struct stat> statusOf(const std::string& strPath)
@@ -64,12 +80,17 @@ std::optional<struct stat> statusOf(const std::string& strPath)
 
 std::string firstBytes(const std::string& strSuffix, size_t cbWanted)
 {
-    std::string strBytes(cbWanted, '\0');
-    const Descriptor directory(open(databaseDirectory().c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    const Descriptor file = openRegular(directory, databaseName() + strSuffix);
-    const ssize_t cbRead = file.isOpen() ? read(file.get(), strBytes.data(), cbWanted) : 0;
-    strBytes.resize(cbRead > 0 ? static_cast<size_t>(cbRead) : 0);
-    return strBytes;
+    const Descriptor file = openBeside(strSuffix);
+    return file.isOpen() ? bytesAt(file, 0, cbWanted) : "";
+}
+
+std::string lastBytes(const std::string& strSuffix, size_t cbWanted)
+{
+    const Descriptor file = openBeside(strSuffix);
+    const off_t cbFile = file.isOpen() ? statusOf(file).st_size : 0;
+    return cbFile < static_cast<off_t>(cbWanted)
+               ? ""
+               : bytesAt(file, cbFile - static_cast<off_t>(cbWanted), cbWanted);
 }
 
 void requireDatabase(bool blCreate)

@@ -1,10 +1,13 @@
 #include "Processes.h"
 
 #include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <cerrno>
 #include <climits>
 #include <cstring>
 #include <fstream>
@@ -13,7 +16,7 @@
 #include <sstream>
 
 #include "AccessTokenDefine.h"
-#include "Place.h"
+#include "Descriptor.h"
 
 namespace {
 
@@ -74,6 +77,14 @@ bool endsWith(const std::string& strText, const std::string& strEnd)
            0 == strText.compare(strText.size() - strEnd.size(), strEnd.size(), strEnd);
 }
 
+// The last part of the database's own path: what stands in its place can be a link.
+std::string realName()
+{
+    const tool::Descriptor database(open(VEMO_ATOKEN_DB_PATH, O_PATH | O_CLOEXEC));
+    const std::string strPath = linkOf(std::string(PROC) + "self/fd/" + std::to_string(database.get()));
+    return strPath.substr(std::min(strPath.rfind('/'), strPath.size()));
+}
+
 } // namespace
 
 namespace tool {
@@ -95,6 +106,11 @@ std::string lockHolders(const std::string& strFile)
     return strPids.empty() ? "another process" : processesText(strPids);
 }
 
+bool canSeeProcesses()
+{
+    return 0 == access((std::string(PROC) + "self").c_str(), F_OK) || ENOENT != errno;
+}
+
 std::vector<std::string> databaseDescriptors()
 {
     std::vector<std::string> strDescriptors;
@@ -102,10 +118,14 @@ std::vector<std::string> databaseDescriptors()
         if (!isNumber(strPid) || strPid == std::to_string(getpid())) {
             continue;
         }
-        const std::string strDirectory = PROC + strPid + "/fd/";
-        for (const std::string& strDescriptor : namesIn(strDirectory)) {
-            if (isOfDatabase(strDirectory + strDescriptor)) {
-                strDescriptors.push_back(strDirectory + strDescriptor);
+        // Each thread can have descriptors of its own, and the first one can have ended.
+        const std::string strTasks = PROC + strPid + "/task/";
+        for (const std::string& strTask : namesIn(strTasks)) {
+            const std::string strDirectory = strTasks + strTask + "/fd/";
+            for (const std::string& strDescriptor : namesIn(strDirectory)) {
+                if (isOfDatabase(strDirectory + strDescriptor)) {
+                    strDescriptors.push_back(strDirectory + strDescriptor);
+                }
             }
         }
     }
@@ -115,11 +135,12 @@ std::vector<std::string> databaseDescriptors()
 bool isOfDatabase(const std::string& strDescriptor)
 {
     // By its name first: to look at what stands on a network can take for ever.
+    static const std::string strName = realName();
     struct stat status = {};
     struct stat database = {};
-    return endsWith(linkOf(strDescriptor), "/" + databaseName()) &&
-           0 == stat(VEMO_ATOKEN_DB_PATH, &database) && 0 == stat(strDescriptor.c_str(), &status) &&
-           status.st_dev == database.st_dev && status.st_ino == database.st_ino;
+    return endsWith(linkOf(strDescriptor), strName) && 0 == stat(VEMO_ATOKEN_DB_PATH, &database) &&
+           0 == stat(strDescriptor.c_str(), &status) && status.st_dev == database.st_dev &&
+           status.st_ino == database.st_ino;
 }
 
 std::string ownersText(const std::vector<std::string>& strDescriptors)

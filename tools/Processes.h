@@ -11,6 +11,9 @@ namespace tool {
 // Who holds a lock of flock(2) on a file: "vpnd (process 4711)"; "another process" where nobody is known.
 std::string lockHolders(const std::string& strFile);
 
+// Whether /proc tells of processes.
+bool canSeeProcesses();
+
 // The descriptors that other processes have of the database, as paths in /proc; and whether one still is
 // that.
 std::vector<std::string> databaseDescriptors();

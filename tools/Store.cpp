@@ -126,6 +126,7 @@ Store::Store(Access access, Missing missing) : m_access(access)
     }
     if (Missing::Make == missing && !statusOf(VEMO_ATOKEN_DB_PATH)) {
         m_blMadeFile = makeFile();
+        settleChange();
     }
     errno = 0;
     if (0 > m_db.initDb()) {
@@ -355,6 +356,14 @@ bool Store::makeTable()
 {
     if (hasTable()) {
         return false;
+    }
+    // What the link leads to may be another's.
+    const auto status = statusOf(VEMO_ATOKEN_DB_PATH);
+    if (status && S_ISLNK(status->st_mode)) {
+        throw Failure(EXIT_STATUS_STORE,
+                      VEMO_ATOKEN_DB_PATH " is a symbolic link, and what it leads to has no "
+                                          "table of tokens",
+                      "find out who made it");
     }
     query("PRAGMA auto_vacuum = FULL"); // as the library has it; within a transaction it does nothing
     query("BEGIN IMMEDIATE");

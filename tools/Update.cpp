@@ -157,8 +157,12 @@ bool isUndone(const Json::Value& jNow, const Json::Value& jBefore, const Json::V
 {
     for (const std::string& strName : jChange.getMemberNames()) {
         const Json::Value& jSet = jChange[strName];
-        if (strName != "count" ? jNow[strName] != jSet && jNow[strName] == jBefore[strName]
-                               : isMore(jNow[strName].asInt64(), jSet.asInt64())) {
+        const int64_t nNow = jNow["count"].asInt64();
+        // No grant takes a limit away, or brings one.
+        const bool blUndone = strName != "count"
+                                  ? jNow[strName] != jSet && jNow[strName] == jBefore[strName]
+                                  : isMore(nNow, jSet.asInt64()) || (nNow >= 0) != (jSet.asInt64() >= 0);
+        if (blUndone) {
             return true;
         }
     }

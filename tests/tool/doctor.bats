@@ -182,13 +182,6 @@ no findings"
     ln -s elsewhere "$VEMO_REDIRECT_DIR"
     expect_no_repair error "$DIRECTORY is a symbolic link" "the tokens stand elsewhere, or nowhere" \
         "find out who made it; move the database to a directory of that name"
-    # What stands behind it is looked at, too.
-    sql "UPDATE token SET deadline = 0"
-    run_tool doctor
-    [ "$status" -eq 5 ]
-    [ "${lines[0]}" = "error: $DIRECTORY is a symbolic link" ]
-    [ "${lines[3]}" = "warning: a deadline of 0 or less in 1 token (aaaaaaaa)" ]
-    [ "${#lines[@]}" -eq 6 ]
 }
 
 @test "another thing in place of the directory is left to the administrator" {
@@ -925,4 +918,43 @@ TABLE
     a_row aaaaaaaa
     run --separate-stderr bash -c '"$0" doctor >/dev/full' "$TOOL"
     expect 4 "" "vemo-access-token: cannot write the result: No space left on device"
+}
+
+@test "what others may have put there is not opened" {
+    a_row aaaaaaaa
+    sql "UPDATE token SET deadline = 0"
+    chmod 0720 "$VEMO_REDIRECT_DIR"
+    expect_finding error "$DIRECTORY has mode 0720" "others than root can use it, and ids are credentials" "chmod 0700 $DIRECTORY"
+    chmod 0700 "$VEMO_REDIRECT_DIR"
+    # The end of a journal that names another file.
+    (umask 077 && printf 'x\331\325\005\371\040\241\143\327' >"$DB-journal")
+    expect_no_repair error "$REAL_DB-journal is one of several that belong together" \
+        "the next program to open the database changes other files, too" \
+        "find out who made it; remove it while no program runs"
+    rm "$DB-journal"
+    run_tool doctor
+    [ "${lines[0]}" = "warning: a deadline of 0 or less in 1 token (aaaaaaaa)" ]
+}
+
+@test "what only looks sound is found" {
+    a_row aaaaaaaa
+    cp "$DB" "$DIR/sound"
+    printf '\003' | dd of="$DB" bs=1 seek=18 conv=notrunc 2>/dev/null
+    run_tool doctor
+    [ "${lines[0]}" = "error: the database says that only a later SQLite can write to it" ]
+    cp "$DIR/sound" "$DB"
+    local made
+    made=$(sql "SELECT sql FROM sqlite_schema WHERE name = 'token'")
+    sql "DROP TABLE token; CREATE TABLE token /*(*/ (${made#*(}"
+    run_tool doctor
+    [[ ${lines[0]} == "error: the table of tokens is not the one that the library makes: it has a comment, and lacks "* ]]
+}
+
+@test "what an export into the private directory left behind is removed, but not while it is written" {
+    a_row aaaaaaaa
+    install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
+    run flock "$VEMO_REDIRECT_DIR/backup.part" "$TOOL" doctor
+    [ "$output" = "no findings" ]
+    expect_repair "$DIRECTORY/backup.part was left behind" "an export was cut off; the file can hold whole ids"
+    [ ! -e "$VEMO_REDIRECT_DIR/backup.part" ]
 }

@@ -88,6 +88,21 @@ made the table of tokens"
     expect 4 "" "vemo-access-token: $REAL_DB is a symbolic link to a file that is not there"
     rm "$DB"
 
+    sqlite3 "$DIR/other" "CREATE TABLE other (a)"
+    cp "$DIR/other" "$DIR/untouched"
+    ln -s "$DIR/other" "$DB"
+    for arguments in init "create --uid 0 --function f"; do
+        # shellcheck disable=SC2086 # several arguments
+        run_tool $arguments
+        [ "$status" -eq 4 ]
+        cmp "$DIR/other" "$DIR/untouched"
+    done
+    : >"$DIR/other"
+    run_tool init
+    expect 4 "" "vemo-access-token: $REAL_DB is a symbolic link, and what it leads to has no table of tokens; find out who made it"
+    [ ! -s "$DIR/other" ]
+    rm "$DB"
+
     echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
     cp "$DB" "$DIR/text"
     run_tool init
@@ -138,4 +153,10 @@ made the table of tokens
 700
 all was there already
 no findings"
+}
+
+@test "init tells what it made although the rest fails" {
+    install -m 0644 /dev/null "$VEMO_REDIRECT_DIR.lock"
+    run_tool init
+    expect 4 "made the directory ${REAL_DB%/*}" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
 }

@@ -382,7 +382,7 @@ until_sql()
 @test "what a call writes back is updated again" {
     local id change
     for change in "--remove-allow Api:put|webapi_allow = '{\"Api\":{\"method\":[\"get\"]}}'" "--uses 2|count = 2" \
-        "--bind-sid new|bind_sid = 'new'"; do
+        "--bind-sid new|bind_sid = 'new'" "--unlimited|count = -1"; do
         id=$(a_token --allow Api:get,put --uses 9)
         calling
         # shellcheck disable=SC2086

@@ -200,6 +200,21 @@ ${DB##*/}-wal" ]
     expect 0 "1 token imported"
 }
 
+@test "an export leaves alone what is not its own beside it, and removes what one has left behind" {
+    a_row A
+    touch "$DIR/file"
+    install -m 0644 /dev/null "$DIR/file.part"
+    run_tool export "$DIR/file"
+    expect 4 "" "vemo-access-token: $DIR/file.part is in the way: another export is writing it, or it is none's"
+    chmod 0600 "$DIR/file.part"
+    flock "$DIR/file.part" "$TOOL" export "$DIR/file" && return 1
+    [ ! -s "$DIR/file" ]
+    run_tool export "$DIR/file"
+    [ "$status" -eq 0 ]
+    [ -s "$DIR/file" ]
+    [ ! -e "$DIR/file.part" ]
+}
+
 @test "an empty name is no file" {
     a_row A
     local command
