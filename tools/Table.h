@@ -3,9 +3,7 @@
 #ifndef TOOLS_TABLE_H
 #define TOOLS_TABLE_H
 
-#include <libsmartcols/libsmartcols.h>
-
-#include <memory>
+#include <cstddef>
 #include <string>
 #include <vector>
 
@@ -33,10 +31,16 @@ public:
     void print() const;
 
 private:
-    struct Deleter {
-        void operator()(struct libscols_table* pTable) const { scols_unref_table(pTable); }
+    struct Line {
+        std::vector<std::string> strCells;
+        const char* szColour;
     };
-    std::unique_ptr<struct libscols_table, Deleter> m_pTable;
+
+    std::vector<size_t> widthsWithin(size_t nTerminal) const;
+
+    const std::vector<Column> m_columns;
+    const bool m_blHeader;
+    std::vector<Line> m_lines;
 };
 
 } // namespace tool

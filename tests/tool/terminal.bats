@@ -232,7 +232,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
 @test "long values go on in the next line, and lose nothing" {
     local id function session allow
     function=$(printf 'function-%.0s' {1..10})
-    session=$(printf 'session-%.0s' {1..8})
+    session=$(printf 'session-\a%.0s' {1..8})
     allow=Example.$(printf 'Long%.0s' {1..20}):get,list,$(printf 'put%.0s' {1..20})
     tool init
     id=$(tool create --uid 0 --function "$function" --bind-sid "$session" --allow "$allow" --allow Api)
@@ -241,6 +241,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
     [ "${#lines[@]}" -gt 10 ]
     [ "$(below TID)" = "$id" ]
     [ "$(below FUNCTION)" = "$function" ]
+    session=${session//$'\a'/\\x07}
     [ "$(below SESSION)" = "$session" ]
     [ "$(below ALLOWS)" = "Api$allow" ]
     on_terminal --columns 60 -- show "$id"
