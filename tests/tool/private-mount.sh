@@ -5,10 +5,7 @@
 set -eu
 
 if [ "${1-}" != --inside ]; then
-    unshare --mount --propagation private true 2>/dev/null || {
-        echo "no mount namespaces here" >&2
-        exit 77
-    }
+    unshare --mount --propagation private true || exit 77
     exec unshare --mount --propagation private "$0" --inside "$@"
 fi
 shift

@@ -35,12 +35,12 @@ teardown()
 # inside COMMAND...: in that namespace
 inside()
 {
-    nsenter --mount="/proc/$HOLDER/ns/mnt" -- "$@"
+    nsenter --target "$HOLDER" --mount --root -- "$@"
 }
 
 run_inside()
 {
-    run --separate-stderr nsenter --mount="/proc/$HOLDER/ns/mnt" -- "$PLAIN" "$@"
+    run --separate-stderr nsenter --target "$HOLDER" --mount --root -- "$PLAIN" "$@"
 }
 
 # owners_and_modes: of the database and the directories above
@@ -87,7 +87,7 @@ made the table of tokens"
 @test "what init makes is private at any umask" {
     local mask
     for mask in 000 077; do
-        run --separate-stderr nsenter --mount="/proc/$HOLDER/ns/mnt" -- sh -c "umask $mask; exec \"\$@\"" - "$PLAIN" init
+        run --separate-stderr nsenter --target "$HOLDER" --mount --root -- sh -c "umask $mask; exec \"\$@\"" - "$PLAIN" init
         [ "$status" -eq 0 ]
         [ "$(owners_and_modes | tail -n 2)" = "$(tail -n 2 <<<"$SOUND")" ]
         [ "$(owners_and_modes | head -n 2 | grep -cE ' 0:0 7(55|00) ')" -eq 2 ]
@@ -188,10 +188,10 @@ while 0 == rename(-100, sys.argv[1].encode(), -100, sys.argv[2].encode(), 2): # 
     fi
     for arguments in init "create --uid 0 --function VPN" list purge; do
         # shellcheck disable=SC2086 # several arguments
-        run --separate-stderr nsenter --mount="/proc/$HOLDER/ns/mnt" -- setpriv "$as" "$PLAIN" $arguments
+        run --separate-stderr nsenter --target "$HOLDER" --mount --root -- setpriv "$as" "$PLAIN" $arguments
         expect 4 "" "vemo-access-token: only root may do this: the token database belongs to root, and the effective uid is 65534"
     done
-    run --separate-stderr nsenter --mount="/proc/$HOLDER/ns/mnt" -- setpriv "$as" "$PLAIN" doctor
+    run --separate-stderr nsenter --target "$HOLDER" --mount --root -- setpriv "$as" "$PLAIN" doctor
     expect 5 "error: not run as root: the effective uid is 65534
     meaning: the database belongs to root and cannot be looked at
     remedy: run doctor as root"
