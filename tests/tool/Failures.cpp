@@ -1,11 +1,13 @@
 // For tests of what the tool says when the system fails: with "file" or "directory" in VEMO_TEST_SYNC, none
 // of these can be synced; with an errno in VEMO_TEST_LOOKUP, each look-up of a user ends with it and finds
-// nobody. For each log line, the file that VEMO_TEST_SYSLOG names gets "held" or "free": what the lock is
-// then.
+// nobody; with a name in VEMO_TEST_VFS, SQLite works on files in the way of that name. And of what nobody
+// sees: texts that are wiped from memory go into the file that VEMO_TEST_WIPED names.
+// For each log line, the file that VEMO_TEST_SYSLOG names gets "held" or "free": what the lock is then.
 
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <pwd.h>
+#include <sqlite3.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <syslog.h>
@@ -66,6 +68,26 @@ void writeLine(int nPriority, const char* szFormat, va_list args)
     fclose(pFile);
 }
 
+void wipe(void* pMemory, size_t cbMemory)
+{
+    const char* szFile = getenv("VEMO_TEST_WIPED");
+    const int nFile =
+        szFile ? open(szFile, O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, S_IRUSR | S_IWUSR) : -1;
+    if (0 <= nFile) {
+        dprintf(nFile, "%zu %s\n", cbMemory, static_cast<const char*>(pMemory));
+        close(nFile);
+    }
+    memset(pMemory, 0, cbMemory);
+}
+
+__attribute__((constructor)) void chooseVfs()
+{
+    const char* szVfs = getenv("VEMO_TEST_VFS");
+    if (szVfs) {
+        sqlite3_vfs_register(sqlite3_vfs_find(szVfs), 1);
+    }
+}
+
 } // namespace
 
 // The library writes its lines by the one, the tool by the other where it is hardened.
@@ -83,6 +105,17 @@ SCRIPTED void __syslog_chk(int nPriority, int, const char* szFormat, ...)
     va_start(args, szFormat);
     writeLine(nPriority, szFormat, args);
     va_end(args);
+}
+
+SCRIPTED void explicit_bzero(void* pMemory, size_t cbMemory)
+{
+    wipe(pMemory, cbMemory);
+}
+
+// How a hardened build calls it.
+SCRIPTED void __explicit_bzero_chk(void* pMemory, size_t cbMemory, size_t)
+{
+    wipe(pMemory, cbMemory);
 }
 
 SCRIPTED int fsync(int nFile)

@@ -24,6 +24,7 @@ struct Command {
     bool blStore = true;   // finds one
     int64_t nStride = 1;   // more for one that does the same over and over
     bool blChanges = true; // the store, or a file
+    bool blNoName = true;  // the file system has files without a name
 };
 
 // For the messages of GoogleTest.
@@ -49,6 +50,7 @@ const Command COMMANDS[] = {
     {"stats", {"stats"}, true, 1, READS},
     {"export", {"export"}, true, 1, READS},
     {"export_file", {"export", "OUT"}},
+    {"export_named_file", {"export", "OUT"}, true, 1, true, false},
     {"import", {"import", "IN"}},
     {"doctor", {"doctor"}, true, 2, READS},
     {"doctor_repair", {"doctor", "--repair"}, true, 6},
@@ -80,6 +82,9 @@ class ToolFault : public ::testing::TestWithParam<Command> {
 protected:
     void SetUp() override
     {
+        if (!GetParam().blNoName) {
+            setenv("VEMO_TEST_NO_TMPFILE", "", 1);
+        }
         try {
             m_pScene = std::make_unique<Scene>(GetParam().strArguments, GetParam().blStore);
         } catch (const NoAnswers& exception) {

@@ -13,6 +13,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -168,6 +169,21 @@ extern "C" int fsync(int nFile)
 extern "C" int fdatasync(int nFile)
 {
     return syncIfTool(__NR_fdatasync, nFile);
+}
+
+// As on a file system that has no files without a name, with VEMO_TEST_NO_TMPFILE.
+extern "C" int openat(int nDirectory, const char* szPath, int nFlags, ...)
+{
+    if (g_blTool && O_TMPFILE == (nFlags & O_TMPFILE) && getenv("VEMO_TEST_NO_TMPFILE")) {
+        errno = EOPNOTSUPP;
+        return -1;
+    }
+    va_list arguments;
+    va_start(arguments, nFlags);
+    const mode_t nMode = va_arg(arguments, mode_t);
+    va_end(arguments);
+    static const auto next = reinterpret_cast<decltype(&::openat)>(dlsym(RTLD_NEXT, "openat"));
+    return next(nDirectory, szPath, nFlags, nMode);
 }
 
 // The processes of the machine are others in each run.

@@ -62,9 +62,11 @@ below()
     id=$(a_token --allow Api --unlimited)
     while IFS='|' read -r arguments shown; do
         # shellcheck disable=SC2086 # several arguments
-        on_terminal --answer "Token id: " "$id"$'\r' -- $arguments
+        VEMO_TEST_WIPED=$DIR/wiped on_terminal --answer "Token id: " "$id"$'\r' -- $arguments
         expect 0 "Token id: 
 $shown"
+        [ "$(cat "$DIR/wiped")" = "4096 $id" ] # the whole buffer that it was read into
+        rm "$DIR/wiped"
         [ "$(cat "$DIR/modes")" = "typed: hidden
 modes: as before" ]
     done <<'TABLE'

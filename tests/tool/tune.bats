@@ -88,6 +88,29 @@ expect_tokens()
     expect 0 "1 token revoked"
 }
 
+@test "where there can be no write-ahead journal, tune says so and makes no indexes" {
+    a_store
+    VEMO_TEST_VFS=unix-dotfile run_tool tune --wal # which has no memory that processes share
+    expect 4 "" 'vemo-access-token: the journal cannot be made "wal" here'
+    [ "$(indexes)" = "" ]
+    [ "$(sql "PRAGMA journal_mode")" = delete ]
+    expect_tokens
+}
+
+@test "what tune has changed when it fails is told" {
+    local arguments journal made
+    while IFS='|' read -r arguments journal made; do
+        a_store
+        VEMO_TEST_SYNC=directory run_tool tune $arguments
+        expect 4 "" "vemo-access-token: ${REAL_DB%/*}: Input/output error; the change was made, but a power cut can undo it"
+        [ "$(sql "PRAGMA journal_mode") $(indexes | wc -l)" = "$journal $made" ]
+        rm -r "$VEMO_REDIRECT_DIR"
+    done <<'TABLE'
+|delete|3
+--wal|wal|0
+TABLE
+}
+
 @test "tune --undo takes back what tune did, and nothing else" {
     a_store
     sql "CREATE INDEX own ON token (uid)"

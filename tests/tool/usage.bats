@@ -382,22 +382,39 @@ TABLE
     expect 141 ""
 }
 
-@test "streams that are closed at the start do not turn into the database" {
-    local id
+@test "streams that are closed at the start do not turn into the database or the lock" {
+    local id closed listing listed complaint
     id=$(a_token)
     cp "$DB" "$DIR/before"
-    run bash -c '"$@" <&- 2>&-' - "$TOOL" show unknown-token
-    [ "$status" -eq 3 ]
-    [ "$output" = "" ]
-    run bash -c '"$@" <&- >&- 2>&-' - "$TOOL" list
-    [ "$status" -eq 4 ]
+    mkfifo "$DIR/waits"
+    while IFS='|' read -r closed listing listed complaint; do
+        run bash -c '"$@" '"$closed" - "$TOOL" list --field uid
+        [ "$status" -eq "$listing" ]
+        [ "$output" = "$listed" ]
+        run bash -c '"$@" '"$closed" - "$TOOL" show unknown-token
+        [ "$status" -eq 3 ]
+        [ "$output" = "$complaint" ]
+        cmp "$DB" "$DIR/before"
+        [ ! -s "$VEMO_REDIRECT_DIR.lock" ]
+        # While it waits for the lock, all three are there, and nothing more than them.
+        VEMO_TEST_WAITS=$DIR/waits flock "$VEMO_REDIRECT_DIR.lock" bash -c 'exec 8<>"$VEMO_TEST_WAITS"
+            { exec '"$closed"' 3>&- 8>&-; exec "$@"; } &
+            read -r -u 8
+            find /proc/$!/fd/[0-9] -lname /dev/null -printf "%f " >"$VEMO_TEST_WAITS.streams"
+            kill $!' - "$TOOL" purge </dev/null >/dev/null 2>/dev/null 3>&-
+        [ "$(<"$DIR/waits.streams")" = "0 1 2 " ]
+    done <<'TABLE'
+<&-|0|0|vemo-access-token: there is no such token
+>&-|4|vemo-access-token: cannot write the result: Bad file descriptor|vemo-access-token: there is no such token
+2>&-|0|0|
+<&- >&-|4|vemo-access-token: cannot write the result: Bad file descriptor|vemo-access-token: there is no such token
+<&- 2>&-|0|0|
+>&- 2>&-|4||
+<&- >&- 2>&-|4||
+TABLE
     run bash -c '"$@" <&- >&-' - "$TOOL" revoke -
     [ "$status" -eq 2 ]
     [ "$output" = "vemo-access-token: TID: there is no id on standard input" ]
-    cmp "$DB" "$DIR/before"
-    run bash -c '"$@" 2>&-' - "$TOOL" list --field uid
-    [ "$status" -eq 0 ]
-    [ "$output" = 0 ]
 }
 
 # SQLite's temporary files would hold purposes and sessions, on a file system that may not even be root's alone.
