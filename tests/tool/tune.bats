@@ -195,17 +195,24 @@ TABLE
     [[ $(sql "EXPLAIN QUERY PLAN DELETE FROM token where deadline < strftime('%s', 'now');") == *"USING "*"INDEX token_deadline (deadline<?)"* ]]
 }
 
-@test "tune shows a bar on a terminal, and only there" {
+# The words of the table are as where there is room.
+@test "tune shows a bar on a terminal, however narrow, and only there" {
     a_store
     local on_terminal='
 import pexpect, sys
-child = pexpect.spawn(sys.argv[1], sys.argv[2:], timeout=30, dimensions=(24, 200))
+child = pexpect.spawn(sys.argv[1], sys.argv[2:], timeout=30, dimensions=(24, 20))
 child.expect(pexpect.EOF)
 child.wait()
 child.ptyproc.delayafterclose = 0.001
 sys.stdout.buffer.write(child.before.replace(b"\r\n", b"\n"))'
     run /usr/bin/python3 -c "$on_terminal" "$TOOL" tune
     [[ $output == $'\rTuning ['*$'\rTuning '"$FULL_BAR"$'\nWHAT '* ]]
+    output=WHAT${output#*$'\nWHAT'}
+    expect_change no yes delete delete
+    run /usr/bin/python3 -c "$on_terminal" "$TOOL" tune --dry-run
+    [ "$(without_times | head -n 3)" = "WHAT|NOW
+look for expired tokens, as every call does|T
+look for a session's tokens|T" ]
     run /usr/bin/python3 -c "$on_terminal" bash -c '"$0" tune 2>"$1" >/dev/null' "$TOOL" "$DIR/stderr"
     [ "$output" = "" ]
     [ ! -s "$DIR/stderr" ]
