@@ -1,9 +1,9 @@
 #!/usr/bin/python3
-"""Writes a copy of the library's sources that holds all mutants at once, and the list of these.
+"""Writes a copy of the sources that holds all mutants at once, and the list of these.
 
 usage: instrument.py PROJECT OUTPUT
-OUTPUT gets the sources, and mutants.txt: the names of the mutants, which tell what each changes and where, in the
-order of their numbers from 0.
+OUTPUT gets the sources in their directories, and mutants.txt: the names of the mutants, which tell what each changes
+and where, in the order of their numbers from 0.
 
 Mutants, each of them one change:
   condition     of if, for, ?: and the check macros, operands of && and ||, and comparisons elsewhere: forced true,
@@ -12,16 +12,20 @@ Mutants, each of them one change:
   statement     left out: expressions, return, break, continue, goto, logs, loops over ranges, and variables that
                 act by their life alone. What would leave a function without a result returns {} instead. Leaving
                 out an if, a loop with a condition or a check is the same as its condition false.
+  flag          left out, of flags that are joined by |.
   constant      one higher, one lower; an index 0 only higher. Named constants change where they are used. true and
                 false change places. An enumerator becomes its neighbour, which is one mutant.
 Not mutated: what the compiler evaluates (constexpr variables, template arguments, array sizes, static tables),
-initialisers of members, variables that others refer to, steps of loops, bodies of lambdas, texts and null pointers;
-nor is a function's last return left out that returns a literal or a reference, or whose type is deduced.
+initialisers of members, variables that others refer to, steps of loops, cases of a switch, texts and null pointers;
+nor is a function's last return left out that returns a literal, a reference or what has no empty value, or whose
+type is deduced.
 Where the field list is expanded into statements, all fields of the list change together.
 """
 
+import collections
 import pathlib
 import re
+import subprocess
 import sys
 
 from clang.cindex import CursorKind as Kind
@@ -30,10 +34,14 @@ from clang.cindex import Index, TranslationUnit, TypeKind
 FIELD_LIST = re.compile(
     r"#define VEMO_ATOKEN_DATA_MEMBER\(name, type, column, value\)(?P<body>(?:.*\\\n)*.*)\n"
     r'(?P<rest>#include "internal/vemo-access-token-data-member"\n#undef VEMO_ATOKEN_DATA_MEMBER\n)')
+SOURCES = ("src/*.cpp", "platform/*.cpp", "tools/*.cpp", "examples/CallLock.h")
 BODIES = (Kind.FUNCTION_DECL, Kind.CXX_METHOD, Kind.CONSTRUCTOR, Kind.DESTRUCTOR, Kind.FUNCTION_TEMPLATE)
 LEAVING = (Kind.BREAK_STMT, Kind.CONTINUE_STMT, Kind.GOTO_STMT, Kind.CXX_FOR_RANGE_STMT)
+LABELS = (Kind.LABEL_STMT, Kind.CASE_STMT, Kind.DEFAULT_STMT)
 LITERALS = (Kind.INTEGER_LITERAL, Kind.CXX_BOOL_LITERAL_EXPR, Kind.CXX_NULL_PTR_LITERAL_EXPR)
 COMPARISONS = ("==", "!=", "<", ">", "<=", ">=")
+NUMBER = re.compile(r"\d[\w.']*")
+CONSTANT = re.compile(r"[A-Z][A-Z0-9_]*")  # as macros of constants are named, and our own ones
 
 
 def one_line(text):
@@ -68,23 +76,47 @@ def inside(cursor):
     return cursor
 
 
+def has_default(kind):
+    """Whether a value of the type can be made of nothing."""
+    parts = list(kind.get_canonical().get_declaration().get_children())
+    constructors = [part for part in parts if part.kind == Kind.CONSTRUCTOR]
+    if constructors:
+        return any(each.is_default_constructor() for each in constructors)
+    return all(has_default(part.type) for part in parts if part.kind == Kind.CXX_BASE_SPECIFIER)
+
+
 def place(cursor):
     return (cursor.extent.start.offset, cursor.extent.end.offset)
 
 
+class Mutants:
+    """The names of all mutants."""
+
+    def __init__(self):
+        self.names = []
+        self.same = collections.Counter()
+
+    def add(self, name):
+        """Returns the number of the new mutant."""
+        self.same[name] += 1
+        same = self.same[name]
+        self.names.append(f"{name} | #{same}" if same > 1 else name)
+        return len(self.names) - 1
+
+
 class Source:
-    def __init__(self, path, mutants):
-        self.name = path.name
+    def __init__(self, path, project, mutants):
+        self.path = path
+        self.name = str(path.relative_to(project))
         self.text = path.read_text(encoding="ascii")
         self.mutants = mutants
         self.edits = []  # (start, end, text before, text after), outer ones first
-        self.done = set()  # the conditions, by their place
+        self.done = set()  # the conditions and the macros, by their place
         self.unused = None  # the place of the expression whose value is
 
-    def parse(self, project, arguments):
-        view = parsers_view(self.text)
-        path = str(project / "src" / self.name)
-        unit = Index.create().parse(path, arguments, [(path, view)], TranslationUnit.PARSE_NONE)
+    def parse(self, arguments):
+        path = str(self.path)
+        unit = Index.create().parse(path, arguments, [(path, parsers_view(self.text))], TranslationUnit.PARSE_NONE)
         errors = [str(diagnostic) for diagnostic in unit.diagnostics if diagnostic.severity >= 3]
         if errors:
             sys.exit("\n".join(errors))
@@ -124,12 +156,9 @@ class Source:
         text = one_line(self.slice(cursor))
         parts = [text] + [part for part in (self.context, self.branch) if part not in ("", text)]
         parts = [part if len(part) <= 80 else part[:77] + "..." for part in parts]
-        first = len(self.mutants)
-        for change in changes:
-            name = f"{self.name} {self.where}: {change}: " + " | ".join(parts)
-            same = sum(other.split(" | #")[0] == name for other in self.mutants)
-            self.mutants.append(f"{name} | #{same + 1}" if same else name)
-        return first
+        numbers = [self.mutants.add(f"{self.name} {self.where}: {change}: " + " | ".join(parts))
+                   for change in changes]
+        return numbers[0]
 
     def wrap(self, cursor, before, after):
         self.edits.append((*place(cursor), before, after))
@@ -140,9 +169,12 @@ class Source:
         """last: behind the block, the function ends."""
         children = list(block.get_children())
         for i, child in enumerate(children):
-            while child.kind == Kind.LABEL_STMT:
-                child = next(child.get_children())
-            self.statement(child, last and i + 1 == len(children))
+            self.statement(self.labelled(child), last and i + 1 == len(children))
+
+    def labelled(self, cursor):
+        while cursor.kind in LABELS:
+            *_, cursor = cursor.get_children()
+        return cursor
 
     def statement(self, cursor, last):
         self.context = ""
@@ -158,12 +190,20 @@ class Source:
             self.branch = outer
         elif cursor.kind == Kind.FOR_STMT:
             *head, body = cursor.get_children()
-            if head:
-                start, condition, step = head
-                self.expression_of_statement(start)
-                self.expression_of_statement(condition, condition=True)
-                self.expression_of_statement(step)
+            for part in head:
+                before = self.text[cursor.extent.start.offset : part.extent.start.offset]
+                self.expression_of_statement(part, condition=before.count(";") == 1)
             self.statement(body, False)
+        elif cursor.kind in (Kind.WHILE_STMT, Kind.DO_STMT):
+            children = list(cursor.get_children())
+            condition, body = children if cursor.kind == Kind.WHILE_STMT else reversed(children)
+            self.expression_of_statement(condition, condition=True)
+            self.statement(body, False)
+        elif cursor.kind == Kind.SWITCH_STMT:
+            value, body = cursor.get_children()
+            self.expression_of_statement(value)
+            for child in body.get_children():  # where it ends the function, so does each return of it
+                self.statement(self.labelled(child), last)
         elif cursor.kind == Kind.CXX_FOR_RANGE_STMT:
             self.removable(cursor)
             self.statement(list(cursor.get_children())[-1], False)
@@ -179,24 +219,35 @@ class Source:
             self.removable(cursor)
         elif cursor.kind.is_expression():
             if not inside(cursor).spelling.startswith("VEMO_ATOKEN_CHECK_"):
-                self.removable(cursor)
+                self.expression_removable(cursor, last)
             self.unused = place(inside(cursor))  # nobody looks at its value
             self.done.add(self.unused)
             self.expression_of_statement(cursor)
-        else:
+        elif cursor.kind != Kind.NULL_STMT:
             sys.exit(f"{self.name}:{cursor.location.line}: a statement of kind {cursor.kind.name}")
 
     def removable(self, cursor):
         number = self.add(cursor, "statement removed")
         self.wrap(cursor, f"if (mutant_present({number})) ", "")
 
+    def expression_removable(self, cursor, last):
+        """What ends a function with a result, or another one without a condition, does not return."""
+        if last and self.has_result():
+            if self.has_empty_result():
+                self.empty_result("statement removed", cursor)
+        elif not last or self.branch or inside(cursor).kind != Kind.CXX_THROW_EXPR:
+            self.removable(cursor)
+
+    def empty_result(self, change, cursor):
+        number = self.add(cursor, change)
+        self.wrap(cursor, f"if (!mutant_present({number})) return {{}}; ", "")
+
     def return_statement(self, cursor, last):
         value = [inside(child) for child in cursor.get_children()]
         if not last:
             self.removable(cursor)
         elif value and not self.is_constant(value[0]) and self.has_empty_result():
-            number = self.add(cursor, "result emptied")
-            self.wrap(cursor, f"if (!mutant_present({number})) return {{}}; ", "")
+            self.empty_result("result emptied", cursor)
         for child in value:
             self.expression_of_statement(child, context=self.slice(cursor))
 
@@ -205,8 +256,13 @@ class Source:
             cursor = inside(next(cursor.get_children()))
         return cursor.kind in LITERALS or self.is_enumerator(cursor)
 
+    def has_result(self):
+        return self.result is not None and self.result.kind != TypeKind.VOID
+
     def has_empty_result(self):
-        return self.result.kind not in (TypeKind.LVALUEREFERENCE, TypeKind.AUTO, TypeKind.VOID)
+        if not self.has_result() or self.result.kind in (TypeKind.LVALUEREFERENCE, TypeKind.AUTO):
+            return False
+        return has_default(self.result)
 
     def declaration(self, cursor):
         for variable in cursor.get_children():
@@ -215,8 +271,7 @@ class Source:
             if variable.type.get_canonical().kind == TypeKind.RECORD and self.is_guard(variable):
                 self.guard(variable)
             for child in variable.get_children():
-                is_size = child.kind == Kind.INTEGER_LITERAL and variable.type.kind == TypeKind.CONSTANTARRAY
-                if not is_size:
+                if not self.text.startswith("]", child.extent.end.offset):  # the size of an array
                     self.expression_of_statement(child, context=self.slice(cursor))
 
     def is_guard(self, variable):
@@ -246,14 +301,27 @@ class Source:
             self.check(cursor, children)
             return
         if cursor.kind == Kind.LAMBDA_EXPR:
+            self.body_of_lambda(children[-1])
             return
         if condition or operator in COMPARISONS + ("&&", "||"):
             self.condition(cursor)
         self.constant(cursor)
         for i, child in enumerate(children):
+            if operator == "|" and CONSTANT.fullmatch(self.slice(child)):
+                if self.slice(child) == "O_RDONLY":
+                    continue  # no flag at all
+                number = self.add(child, "flag removed")
+                self.wrap(child, f"mutant_flag({number}, ", ")")
+                continue
             if operator in ("&&", "||"):
                 self.operand(child, operator, i == 0, place(cursor) == self.unused)
             self.expression(child, cursor.kind == Kind.CONDITIONAL_OPERATOR and i == 0)
+
+    def body_of_lambda(self, body):
+        outside = self.context, self.branch, self.result, self.unused
+        self.branch, self.result = "", None  # its result has the type that it has
+        self.statements(body, last=True)
+        self.context, self.branch, self.result, self.unused = outside
 
     def operator(self, cursor, children):
         """The operator between two operands, also where it is overloaded."""
@@ -296,17 +364,26 @@ class Source:
         kind = cursor.kind
         if kind == Kind.CXX_BOOL_LITERAL_EXPR:
             number = self.add(cursor, "constant flipped")
-            self.wrap(cursor, f"mutant_flag({number}, ", ")")
+            self.wrap(cursor, f"mutant_bool({number}, ", ")")
         elif self.is_enumerator(cursor):
             number = self.add(cursor, "constant changed")
             self.wrap(cursor, f"mutant_enumerator({number}, ", ")")
-        elif kind == Kind.INTEGER_LITERAL or self.is_named_constant(cursor):
+        elif kind == Kind.INTEGER_LITERAL and self.is_number(cursor) or self.is_named_constant(cursor):
             if self.text[cursor.extent.start.offset - 1] == "[" and self.slice(cursor) in ("0", "0U"):
                 number = self.add(cursor, "constant +1")
                 self.wrap(cursor, f"mutant_up({number}, ", ")")
             else:
                 number = self.add(cursor, "constant +1", "constant -1")
                 self.wrap(cursor, f"mutant_constant({number}, ", ")")
+
+    def is_number(self, cursor):
+        """Or a macro that stands for one, however many make it up."""
+        text = self.slice(cursor)
+        if NUMBER.fullmatch(text):
+            return True
+        is_new = CONSTANT.fullmatch(text) and place(cursor) not in self.done
+        self.done.add(place(cursor))
+        return is_new
 
     def is_enumerator(self, cursor):
         return (cursor.kind == Kind.DECL_REF_EXPR and cursor.referenced is not None
@@ -324,16 +401,15 @@ class Source:
 
     # The mutated text
 
-    def write(self, directory):
+    def write(self, path):
         inserts = {}
         for order, (start, end, before, after) in enumerate(self.edits):
             inserts.setdefault(start, []).append(((1, -end, order), before))
             inserts.setdefault(end, []).append(((0, -start, -order), after))
-        text, position = "", 0
+        text, position = '#include "mutants.h"\n#line 1\n', 0
         for offset in sorted(inserts):
             text += self.text[position:offset] + "".join(part for _, part in sorted(inserts[offset]))
             position = offset
-        path = directory / self.name
         text += self.text[position:]
         if not path.exists() or path.read_text(encoding="ascii") != text:
             path.write_text(text, encoding="ascii")
@@ -341,16 +417,18 @@ class Source:
 
 def main():
     project, output = (pathlib.Path(argument).resolve() for argument in sys.argv[1:])
-    arguments = ["-std=c++17", f"-I{project}/include", f"-I{project}/platform", "-I/usr/include/jsoncpp",
-                 "-include", f"{project}/tests/mutation/view.h"]
-    output.mkdir(parents=True, exist_ok=True)
-    mutants = []
-    for path in sorted((project / "src").glob("*.cpp")):
-        source = Source(path, mutants)
-        source.parse(project, arguments)
-        source.write(output)
-    (output / "mutants.txt").write_text("\n".join(mutants) + "\n", encoding="ascii")
-    print(f"{len(mutants)} mutants")
+    libraries = subprocess.run(["pkg-config", "--cflags", "jsoncpp", "smartcols"], check=True, stdout=subprocess.PIPE)
+    arguments = ["-xc++", "-std=c++17", f"-I{project}/include", f"-I{project}/platform", f"-I{project}/examples",
+                 '-DVEMO_ATOKEN_VERSION=""', *libraries.stdout.decode().split()]
+    view = ["-include", f"{project}/tests/mutation/view.h"]
+    mutants = Mutants()
+    for pattern in SOURCES:
+        for path in sorted(project.glob(pattern)):
+            source = Source(path, project, mutants)
+            source.parse(arguments + (view if pattern.startswith("src") else []))
+            source.write(output / source.name)
+    (output / "mutants.txt").write_text("\n".join(mutants.names) + "\n", encoding="ascii")
+    print(f"{len(mutants.names)} mutants")
 
 
 main()

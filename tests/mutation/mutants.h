@@ -61,9 +61,16 @@ constexpr Number mutant_constant(int nMutant, Number nValue)
     return mutant_present(nMutant + 1) ? mutant_up(nMutant, nValue) : static_cast<Number>(nValue - 1);
 }
 
-constexpr bool mutant_flag(int nMutant, bool blValue)
+constexpr bool mutant_bool(int nMutant, bool blValue)
 {
     return blValue == mutant_present(nMutant);
+}
+
+// One of several flags, which are joined.
+template <typename Flag>
+constexpr Flag mutant_flag(int nMutant, Flag flag)
+{
+    return mutant_present(nMutant) ? flag : Flag();
 }
 
 // The enumerator below, and of the first the one above.
