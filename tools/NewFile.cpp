@@ -47,13 +47,27 @@ tool::FilePlace placeOf(const std::string& strPath)
     }
 }
 
-// Whether a name in a directory is that of an open file.
+// Whether a name in a directory is that of an open file. errno tells why not: EEXIST when it is another's.
 bool isNamed(const tool::Descriptor& file, const tool::Descriptor& directory, const std::string& strName)
 {
     const struct stat status = tool::statusOf(file);
     struct stat named = {};
-    return 0 == fstatat(directory.get(), strName.c_str(), &named, AT_SYMLINK_NOFOLLOW) &&
-           named.st_dev == status.st_dev && named.st_ino == status.st_ino;
+    if (0 != fstatat(directory.get(), strName.c_str(), &named, AT_SYMLINK_NOFOLLOW)) {
+        return false;
+    }
+    const bool blSame = named.st_dev == status.st_dev && named.st_ino == status.st_ino;
+    errno = blSame ? errno : EEXIST;
+    return blSame;
+}
+
+// Whether a file that one export writes, as its lock tells, is free; errno tells why not.
+bool lockUnfinished(int nFile)
+{
+    if (0 == flock(nFile, LOCK_EX | LOCK_NB)) {
+        return true;
+    }
+    errno = EWOULDBLOCK == errno ? EEXIST : errno;
+    return false;
 }
 
 bool isSame(const struct stat& status, const std::string& strPath)
@@ -100,11 +114,10 @@ Descriptor lockRemains(const Descriptor& directory, const std::string& strName)
     const struct stat status = statusOf(remains);
     const bool blOurs = geteuid() == status.st_uid && FILE_MODE == (status.st_mode & 07777);
     // While somebody waited for the lock, the name can have gone to another file.
-    if (!blOurs || 0 != flock(remains.get(), LOCK_EX | LOCK_NB) || !isNamed(remains, directory, strName)) {
-        errno = EEXIST;
-        return Descriptor();
-    }
-    return remains;
+    errno = EEXIST;
+    return blOurs && lockUnfinished(remains.get()) && isNamed(remains, directory, strName)
+               ? std::move(remains)
+               : Descriptor();
 }
 
 bool removeRemains(const Descriptor& directory, const std::string& strName)
@@ -168,8 +181,7 @@ Descriptor NewFile::makeNamed()
     Descriptor file(openat(m_place.directory.get(), m_strUnfinished.c_str(),
                            O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, FILE_MODE));
     if (file.isOpen()) {
-        if (0 != flock(file.get(), LOCK_EX | LOCK_NB) || !isNamed(file, m_place.directory, m_strUnfinished)) {
-            errno = EEXIST;
+        if (!lockUnfinished(file.get()) || !isNamed(file, m_place.directory, m_strUnfinished)) {
             return Descriptor();
         }
         g_nDirectory = m_place.directory.get();
@@ -205,7 +217,7 @@ bool NewFile::giveName()
         if (link(m_place.strName)) {
             return true;
         }
-        if (EEXIST != errno || 0 != flock(fileno(m_pStream), LOCK_EX | LOCK_NB) ||
+        if (EEXIST != errno || !lockUnfinished(fileno(m_pStream)) ||
             !removeRemains(m_place.directory, m_strUnfinished) || !link(m_strUnfinished)) {
             return false;
         }
