@@ -1,5 +1,6 @@
 #include "Confinement.h"
 
+#include <dirent.h>
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <pwd.h>
@@ -14,6 +15,7 @@
 #include <cstring>
 
 #include "AccessTokenDefine.h"
+#include "CallLock.h"
 #include "Require.h"
 
 namespace {
@@ -161,6 +163,18 @@ std::string takeComplaints()
         return pNext;                                                                                        \
     }())
 
+namespace {
+
+// The descriptor of a file that can be read; -1 for any other name.
+int inputFile(const char* szName)
+{
+    return 0 == strcmp(szName, fuzz::EXTRA_FILE)    ? g_nExtraFile
+           : 0 == strcmp(szName, fuzz::TOKENS_FILE) ? g_nTokensFile
+                                                    : refused(ENOENT);
+}
+
+} // namespace
+
 extern "C" {
 
 CONFINED int sqlite3_open(const char*, sqlite3** ppDb)
@@ -201,29 +215,61 @@ CONFINED int chmod(const char* szPath, mode_t mode) noexcept
     return g_blConfined ? 0 : NEXT(chmod)(szPath, mode);
 }
 
-CONFINED int chown(const char* szPath, uid_t uid, gid_t gid) noexcept
+CONFINED int fstat(int nFile, struct stat* pStatus) noexcept
 {
-    return g_blConfined ? 0 : NEXT(chown)(szPath, uid, gid);
+    const int nResult = NEXT(fstat)(nFile, pStatus);
+    if (g_blConfined) { // a file without a name is everybody's
+        pStatus->st_uid = 0;
+        pStatus->st_mode = S_IFREG | S_IRUSR | S_IWUSR;
+        pStatus->st_nlink = 1;
+    }
+    return nResult;
 }
 
-CONFINED int mkdir(const char* szPath, mode_t mode) noexcept
+CONFINED int fstatat(int nDirectory, const char* szName, struct stat* pStatus, int nFlags) noexcept
 {
-    return g_blConfined ? refused(EEXIST) : NEXT(mkdir)(szPath, mode);
+    if (!g_blConfined) {
+        return NEXT(fstatat)(nDirectory, szName, pStatus, nFlags);
+    }
+    const int nFile = inputFile(szName);
+    return 0 > nFile ? -1 : fstat(nFile, pStatus);
 }
 
-CONFINED int rename(const char* szFrom, const char* szTo) noexcept
+CONFINED int mkdirat(int nDirectory, const char* szName, mode_t mode) noexcept
 {
-    return g_blConfined ? 0 : NEXT(rename)(szFrom, szTo);
+    return g_blConfined ? refused(EEXIST) : NEXT(mkdirat)(nDirectory, szName, mode);
 }
 
-CONFINED int unlink(const char* szPath) noexcept
+CONFINED int linkat(int nFrom, const char* szFrom, int nTo, const char* szTo, int nFlags) noexcept
 {
-    return g_blConfined ? 0 : NEXT(unlink)(szPath);
+    return g_blConfined ? 0 : NEXT(linkat)(nFrom, szFrom, nTo, szTo, nFlags);
 }
 
-CONFINED int mkstemp(char* szName)
+CONFINED int unlinkat(int nDirectory, const char* szName, int nFlags) noexcept
 {
-    return g_blConfined ? fileOf("") : NEXT(mkstemp)(szName);
+    return g_blConfined ? 0 : NEXT(unlinkat)(nDirectory, szName, nFlags);
+}
+
+CONFINED DIR* opendir(const char* szPath)
+{
+    return g_blConfined ? nullptr : NEXT(opendir)(szPath);
+}
+
+CONFINED int openat(int nDirectory, const char* szName, int nFlags, ...)
+{
+    va_list args;
+    va_start(args, nFlags);
+    const mode_t mode = (nFlags & (O_CREAT | O_TMPFILE)) ? va_arg(args, mode_t) : 0;
+    va_end(args);
+    if (!g_blConfined) {
+        return NEXT(openat)(nDirectory, szName, nFlags, mode);
+    }
+    if (nFlags & O_DIRECTORY) { // and a file without a name
+        return fileOf("");
+    }
+    const int nFile = inputFile(szName);
+    return 0 > nFile ? nFile
+                     : NEXT(open)(("/proc/self/fd/" + std::to_string(nFile)).c_str(), O_RDONLY | O_CLOEXEC);
 }
 
 CONFINED int open(const char* szPath, int nFlags, ...)
@@ -232,23 +278,16 @@ CONFINED int open(const char* szPath, int nFlags, ...)
     va_start(args, nFlags);
     const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
     va_end(args);
-    if (g_blConfined && (nFlags & O_DIRECTORY)) {
-        return fileOf(""); // that can be synced, too
+    if (g_blConfined && ((nFlags & O_DIRECTORY) || 0 == strcmp(szPath, CallLock::FILE_OF_ALL))) {
+        return fileOf(""); // that can be synced and locked, too
     }
     const bool blHarmless = 0 == strcmp(szPath, "/dev/null") || 0 == strcmp(szPath, "/dev/urandom");
     return g_blConfined && !blHarmless ? refused(ENOENT) : NEXT(open)(szPath, nFlags, mode);
 }
 
-// What file streams open their files with.
 CONFINED FILE* fopen64(const char* szPath, const char* szMode)
 {
-    if (!g_blConfined) {
-        return NEXT(fopen64)(szPath, szMode);
-    }
-    const int nFile = 0 == strcmp(szPath, fuzz::EXTRA_FILE)    ? g_nExtraFile
-                      : 0 == strcmp(szPath, fuzz::TOKENS_FILE) ? g_nTokensFile
-                                                               : refused(ENOENT);
-    return 0 > nFile ? nullptr : NEXT(fopen64)(("/proc/self/fd/" + std::to_string(nFile)).c_str(), "r");
+    return g_blConfined && refused(ENOENT) ? nullptr : NEXT(fopen64)(szPath, szMode);
 }
 
 CONFINED int isatty(int nFile) noexcept
