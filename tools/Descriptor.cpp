@@ -24,12 +24,6 @@ int errorOf(const tool::Descriptor& directory, const std::string& strName)
     return blLink ? ELOOP : nError;
 }
 
-bool canOthersWrite(const struct stat& directory)
-{
-    return (0 != directory.st_uid && geteuid() != directory.st_uid) ||
-           (directory.st_mode & OTHERS_WRITE_MODE);
-}
-
 } // namespace
 
 namespace tool {
@@ -155,6 +149,12 @@ Descriptor openToRead(const std::string& strPath)
                                             "copy it to a place of yours");
     }
     return file;
+}
+
+bool canOthersWrite(const struct stat& directory)
+{
+    return (0 != directory.st_uid && geteuid() != directory.st_uid) ||
+           (directory.st_mode & OTHERS_WRITE_MODE);
 }
 
 struct stat statusOf(const Descriptor& file)

@@ -96,6 +96,9 @@ Descriptor openRegular(const Descriptor& directory, const std::string& strName);
 // several names in a directory of others, who can have put another's secret there.
 Descriptor openToRead(const std::string& strPath);
 
+// Whether others than root and the caller can put something else in the place of what stands in a directory.
+bool canOthersWrite(const struct stat& directory);
+
 // What fstat tells. Throws Failure.
 struct stat statusOf(const Descriptor& file);
 

@@ -25,7 +25,6 @@ using tool::Store;
 
 const mode_t PRIVATE_MODE = 0700;
 const mode_t OTHERS_MODE = 0077;
-const mode_t OTHERS_WRITE_MODE = 0022;
 
 std::string octal(mode_t mode)
 {
@@ -39,12 +38,6 @@ bool isPrivate(const struct stat& status)
     return 0 == status.st_uid && !(status.st_mode & OTHERS_MODE);
 }
 
-// Whether others than root can put something else in the place of what stands in a directory.
-bool canOthersWrite(const struct stat& status)
-{
-    return 0 != status.st_uid || (status.st_mode & OTHERS_WRITE_MODE);
-}
-
 // The private directory, if it is reached through directories alone in which only root can replace anything.
 Descriptor openTrustedDirectory()
 {
@@ -53,7 +46,7 @@ Descriptor openTrustedDirectory()
         if (!walk.step()) {
             throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(walk.path(), walk.path()).what());
         }
-        if (!walk.isDone() && canOthersWrite(tool::statusOf(walk.directory()))) {
+        if (!walk.isDone() && tool::canOthersWrite(tool::statusOf(walk.directory()))) {
             throw tool::Failure(tool::EXIT_STATUS_STORE, "others than root can change " + walk.path());
         }
     }
@@ -172,8 +165,8 @@ bool examineDirectory(bool& blTrusted, Findings& findings)
             // What stands in it is looked at when it is root's.
             const auto repair = [] { makePrivate(tool::databaseDirectory(), openTrustedDirectory); };
             examinePrivacy(walk.path(), status, blTrusted ? repair : std::function<void()>(), findings);
-            blTrusted = blTrusted && !canOthersWrite(status);
-        } else if (canOthersWrite(status)) {
+            blTrusted = blTrusted && !tool::canOthersWrite(status);
+        } else if (tool::canOthersWrite(status)) {
             blTrusted = false;
             findings.push_back({Finding::Severity::Warning,
                                 walk.path() + " belongs to uid " + std::to_string(status.st_uid) +
@@ -273,14 +266,13 @@ bool examineFile(bool blMake, Findings& findings)
     return true;
 }
 
-// Returns whether this SQLite can work on the database.
-bool examineVersion(Findings& findings)
+void examineVersion(Findings& findings)
 {
     const size_t WRITE_VERSION = 18; // where the database says what its writers must know: 2 at most
     const std::string strHeader = tool::firstBytes("", WRITE_VERSION + 1);
     if (strHeader.size() <= WRITE_VERSION || 0 != strHeader.compare(0, 6, "SQLite") ||
         2 >= static_cast<unsigned char>(strHeader[WRITE_VERSION])) {
-        return true;
+        return;
     }
     findings.push_back(
         {Finding::Severity::Error,
@@ -288,7 +280,6 @@ bool examineVersion(Findings& findings)
          "no token can be created, changed or granted",
          std::string("save the tokens with \"vemo-access-token export\"; ") + tool::REMEDY_REPLACE,
          {}});
-    return true;
 }
 
 // Returns whether the database can be opened without harm. Whoever opens it takes the changes in a
@@ -364,11 +355,15 @@ bool examinePlace(Findings& findings)
         return false;
     }
     examineRemains(findings);
-    const bool blJournals = examineBeside(findings);
-    const bool blFile = examineFile(blJournals, findings);
+    // Others could put a journal there in the moment in which the database is opened, or made.
+    const bool blOpens = examineBeside(findings) && blTrusted;
+    const bool blFile = examineFile(blOpens, findings);
     examineFileSystem(findings);
-    // Others could put a journal there in the moment in which the database is opened.
-    return blTrusted && blJournals && blFile && examineVersion(findings) && examineForeignJournal(findings);
+    if (!blOpens || !blFile) {
+        return false;
+    }
+    examineVersion(findings);
+    return examineForeignJournal(findings);
 }
 
 } // namespace tool
