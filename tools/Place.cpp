@@ -140,12 +140,13 @@ bool makeFile()
     return file.isOpen();
 }
 
-void syncDirectory(const std::string& strMeaning)
+void syncDirectory(const char* szMeaning)
 {
-    const std::string strDirectory = databaseDirectory();
-    const Descriptor directory(open(strDirectory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    char szDirectory[] = VEMO_ATOKEN_DB_PATH;
+    *strrchr(szDirectory, '/') = '\0';
+    const Descriptor directory(open(szDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (!directory.isOpen() || 0 != fsync(directory.get())) {
-        failOn(strDirectory, strMeaning);
+        failOn(szDirectory, szMeaning);
     }
 }
 

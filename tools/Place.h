@@ -36,8 +36,9 @@ bool makeDirectory();
 // Makes the file of the database, empty, where it is missing. Returns whether it was made.
 bool makeFile();
 
-// Waits until the disk has the directory as it is now. Fails, and says what that means.
-void syncDirectory(const std::string& strMeaning);
+// Waits until the disk has the directory as it is now. Fails, and says what that means. Takes no memory: a
+// change that has been made must not be lost sight of for want of some.
+void syncDirectory(const char* szMeaning);
 
 // What commands that need root say to others; fails for them.
 void requireRoot();

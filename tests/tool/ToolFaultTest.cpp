@@ -15,6 +15,7 @@
 namespace {
 
 const int64_t STRIDE_OF_MEMORY = 32; // of the many allocations, these every day
+const int64_t LAST_CALLS = 12;       // each of them counts: they come when the change has been made
 
 const std::string TID = "known-three" + std::string(VEMO_ATOKEN_LENGTH_MIN - 11, 'x');
 
@@ -103,14 +104,16 @@ protected:
         EXPECT_EQ("", m_pScene->judge(fault)) << "call " << fault.nFirst << " to " << fault.nLast;
     }
 
-    // Each call fails, or each of a stride: once, and from then on.
+    // Each call fails, or each of a stride and each of the last: once, and from then on.
     void judgeEach(Fault::Kind kind, int64_t nStride)
     {
         const int64_t nCalls = m_pScene->calls(kind);
         const int64_t nStart = 1 + static_cast<int64_t>(seed() % static_cast<uint64_t>(nStride));
-        for (int64_t nCall = nStart; nCall <= nCalls && !HasFailure(); nCall += nStride) {
+        const int64_t nLast = std::max(nStart, nCalls - LAST_CALLS + 1);
+        for (int64_t nCall = nStart; nCall <= nCalls && !HasFailure();) {
             judge({kind, nCall, nCall});
             judge({kind, nCall, INT64_MAX});
+            nCall = nCall < nLast ? std::min(nCall + nStride, nLast) : nCall + 1;
         }
         m_nCalls += nCalls;
     }
