@@ -133,6 +133,9 @@ std::vector<std::string> readSecrets(const std::string& strPrompt)
         for (std::string strLine; std::getline(std::cin, strLine);) {
             strLines.push_back(strLine);
         }
+        if (ferror(stdin)) { // the last line can be cut off, and more of them be missing
+            throw Failure(EXIT_STATUS_USAGE, std::string("standard input: ") + strerror(errno));
+        }
     }
     return strLines;
 }

@@ -184,6 +184,8 @@ END
 
 @test "what is not one id on standard input is refused" {
     row first---
+    run_tool show - <"$DIR"
+    expect 2 "" "vemo-access-token: standard input: Is a directory"
     while IFS='|' read -r input sentence; do
         echo "$input"
         run_tool show - < <(printf "$input")
