@@ -64,6 +64,17 @@ std::pair<std::string, std::string> explained(const std::string& strErr)
 
 bool g_blChanged = false; // what stays when the process fails now
 
+// What sorts behind all texts that begin with a prefix, as SQL. Any bytes may follow that.
+std::string sqlBehind(std::string strPrefix)
+{
+    strPrefix.resize(strPrefix.find_last_not_of('\xff') + 1);
+    if (strPrefix.empty()) {
+        return "x''"; // a blob sorts behind all texts
+    }
+    ++strPrefix.back();
+    return tool::sqlText("%Q", strPrefix.c_str());
+}
+
 // As long as the library waits for the database.
 const std::chrono::seconds LOCK_WAIT(5);
 
@@ -258,10 +269,8 @@ std::optional<Json::Value> Store::findByPrefix(const std::string& strTid)
         throw Failure(EXIT_STATUS_USAGE,
                       "TID: \"" + strTid + "\" is too short: give the id or its first 8 characters, or more");
     }
-    // U+10FFFF sorts after all that may follow.
-    const Rows rows =
-        query(sqlText("SELECT tid FROM token WHERE tid >= %Q AND tid < %Q || char(1114111) LIMIT 2",
-                      strTid.c_str(), strTid.c_str()));
+    const Rows rows = query(sqlText("SELECT tid FROM token WHERE tid >= %Q AND tid < %s LIMIT 2",
+                                    strTid.c_str(), sqlBehind(strTid).c_str()));
     if (rows.size() > 1) {
         throw Failure(EXIT_STATUS_USAGE,
                       "TID: several tokens begin with \"" + shortened(strTid) + "\"; give more of the id");

@@ -149,6 +149,14 @@ END
     shows_at 1 "prefix--$ZEROS"
     shows_at 2 "prefix--${ZEROS}x"
     shows_at 3 prefix-~
+    # Nor does it matter which bytes follow, UTF-8 or not.
+    row another- "tid = CAST(x'616e6f746865722dff' AS TEXT) || tid, create_time = 4"
+    shows_at 4 another-
+    row another-
+    run_tool show another-
+    expect 2 "" 'vemo-access-token: TID: several tokens begin with "another-"; give more of the id'
+    row bytes--- "tid = CAST(x'ffffffffffffffffff' AS TEXT) || tid, create_time = 5"
+    shows_at 5 $'\xff\xff\xff\xff\xff\xff\xff\xff'
 }
 
 @test "a prefix of less than 8 characters is refused, an id as short as that is not" {
