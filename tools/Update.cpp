@@ -191,10 +191,11 @@ void updateAgain(const Json::Value& jBefore, const Json::Value& jChange)
         return blNeeded;
     };
     tool::outlastCalls(restore, "the token was written back as it had been", "updated");
+    const int64_t nLeft = jNow ? (*jNow)["count"].asInt64() : 0;
     if (!jNow) {
         tool::complain("the token is gone: a call has spent its last use meanwhile, or deleted it");
-    } else if (jChange.isMember("count") && (*jNow)["count"] != jChange["count"]) {
-        tool::complain(tool::countText((*jNow)["count"].asUInt64(), "use") +
+    } else if (jChange.isMember("count") && nLeft >= 0 && nLeft != jChange["count"].asInt64()) {
+        tool::complain(tool::countText(static_cast<uint64_t>(nLeft), "use") +
                        " left: calls have spent some meanwhile, or written back an old number");
     }
 }

@@ -399,6 +399,18 @@ until_sql()
     done
 }
 
+@test "unlimited uses that a program writes meanwhile are told from none, whatever its number for them" {
+    local id
+    id=$(a_token --uses 9)
+    calling
+    "$TOOL" update "$id" --unlimited >"$DIR/out" 2>&1 3>&- 7>&- 8<&- &
+    until_sql 1 "SELECT count(*) FROM token WHERE count = -1"
+    echo "UPDATE token SET count = -2;" >&7
+    unlock
+    wait $!
+    [ "$(cat "$DIR/out")" = "1 token updated" ]
+}
+
 @test "programs that may still write back are named, and so is who holds the lock" {
     local first second i pids=()
     first=$(a_token --uses 5)
