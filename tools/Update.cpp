@@ -8,6 +8,7 @@
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
+#include "Json.h"
 #include "Store.h"
 
 namespace {
@@ -151,6 +152,12 @@ bool isMore(int64_t nCount, int64_t nOther)
     return nOther >= 0 && (nCount < 0 || nCount > nOther);
 }
 
+// As texts: a NaN in it is not equal to itself.
+bool isSame(const Json::Value& jLeft, const Json::Value& jRight)
+{
+    return tool::compactJson(jLeft) == tool::compactJson(jRight);
+}
+
 // Whether a record is one from before the change: a call that had read it has written it back, with a use
 // less. It cannot be told from one whose uses were raised here, and spent since.
 bool isUndone(const Json::Value& jNow, const Json::Value& jBefore, const Json::Value& jChange)
@@ -160,7 +167,7 @@ bool isUndone(const Json::Value& jNow, const Json::Value& jBefore, const Json::V
         const int64_t nNow = jNow["count"].asInt64();
         // No grant takes a limit away, or brings one.
         const bool blUndone = strName != "count"
-                                  ? jNow[strName] != jSet && jNow[strName] == jBefore[strName]
+                                  ? !isSame(jNow[strName], jSet) && isSame(jNow[strName], jBefore[strName])
                                   : isMore(nNow, jSet.asInt64()) || (nNow >= 0) != (jSet.asInt64() >= 0);
         if (blUndone) {
             return true;

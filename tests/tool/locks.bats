@@ -383,8 +383,8 @@ until_sql()
 @test "what a call writes back is updated again" {
     local id change
     for change in "--remove-allow Api:put|webapi_allow = '{\"Api\":{\"method\":[\"get\"]}}'" "--uses 2|count = 2" \
-        "--bind-sid new|bind_sid = 'new'" "--unlimited|count = -1"; do
-        id=$(a_token --allow Api:get,put --uses 9)
+        "--bind-sid new|bind_sid = 'new'" "--unlimited|count = -1" "--extra {\"n\":1}|extra = '{\"n\":1}'"; do
+        id=$(a_token --allow Api:get,put --uses 9 --extra '{"n":NaN}') # which programs can save
         calling
         # shellcheck disable=SC2086
         "$TOOL" update "$id" ${change%%|*} >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
