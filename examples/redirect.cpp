@@ -89,7 +89,7 @@ class Joined {
 public:
     Joined(int nDirectory, const char* szName) : m_szPath(szName)
     {
-        if (!directory() || AT_FDCWD == nDirectory || szName[0] == '/') {
+        if (!directory() || AT_FDCWD == nDirectory || szName[0] == '/' || 0 == strcmp(szName, ".")) {
             return;
         }
         char szLink[32];

@@ -79,7 +79,10 @@ bool Walk::make(mode_t mode, bool& blMade)
 {
     const UmaskOff umaskOff;
     blMade = 0 == mkdirat(m_directory.get(), m_strName.c_str(), mode);
-    return (blMade || EEXIST == errno) && openNamed();
+    if (blMade ? !syncNames(m_directory) : EEXIST != errno) {
+        return false;
+    }
+    return openNamed();
 }
 
 bool Walk::openNamed()
@@ -149,6 +152,12 @@ Descriptor openToRead(const std::string& strPath)
                                             "copy it to a place of yours");
     }
     return file;
+}
+
+bool syncNames(const Descriptor& directory)
+{
+    const Descriptor readable(openat(directory.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    return readable.isOpen() && 0 == fsync(readable.get());
 }
 
 bool canOthersWrite(const struct stat& directory)

@@ -55,7 +55,7 @@ public:
 
     // Makes the one that a step found missing, with this mode whatever the umask, and opens it. Returns
     // false, with errno set, where that is not possible. blMade tells whether it was not another process that
-    // made it.
+    // made it; then no power cut undoes that.
     bool make(mode_t mode, bool& blMade);
 
     // The last one that was opened or, when a step failed, that was not.
@@ -95,6 +95,10 @@ Descriptor openRegular(const Descriptor& directory, const std::string& strName);
 // The same by its path, for data of the caller's. Throws BadValue, which names the path; also of a file with
 // several names in a directory of others, who can have put another's secret there.
 Descriptor openToRead(const std::string& strPath);
+
+// Waits until the disk has the names that stand in a directory. Returns false, with errno set, where it
+// cannot.
+bool syncNames(const Descriptor& directory);
 
 // Whether others than root and the caller can put something else in the place of what stands in a directory.
 bool canOthersWrite(const struct stat& directory);

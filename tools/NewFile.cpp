@@ -201,8 +201,7 @@ void NewFile::complete()
     if (!blWritten || !giveName()) {
         fail();
     }
-    const Descriptor directory(openat(m_place.directory.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (!directory.isOpen() || 0 != fsync(directory.get())) {
+    if (!syncNames(m_place.directory)) {
         throw Failure(EXIT_STATUS_STORE, shownPath(m_strPath) + ": " + strerror(errno),
                       "the file is there, but a power cut can undo that");
     }

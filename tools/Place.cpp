@@ -27,9 +27,11 @@ tool::Descriptor makePrivateDirectory(bool& blMade)
 {
     tool::Walk walk(tool::databaseDirectory());
     while (!walk.isDone()) {
+        blMade = false;
         if (!walk.step() &&
             (ENOENT != errno || !walk.make(walk.isDone() ? PRIVATE_MODE : PARENT_MODE, blMade))) {
-            throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(walk.path(), walk.path()).what());
+            throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(walk.path(), walk.path()).what(),
+                                blMade ? "the change was made, but a power cut can undo it" : "");
         }
     }
     return std::move(walk.directory());

@@ -172,7 +172,21 @@ TEST_P(ToolLastChange, IsOnTheDiskWhenItReturns)
 {
     const bool blExports = GetParam().strArguments[0] == "export";
     EXPECT_EQ(blExports ? m_pScene->files() : m_pScene->storeDirectory(),
-              m_pScene->undisturbed().strSyncedLast);
+              m_pScene->undisturbed().strSynced.back());
+}
+
+// The name of the private directory stands in the one above, for which "/" stands here.
+TEST(ToolInit, PutsTheDirectoryOnTheDiskBeforeWhatStandsInIt)
+{
+    try {
+        const Scene scene({"init"}, false);
+        const std::vector<std::string> strSynced = scene.undisturbed().strSynced;
+        ASSERT_LE(2U, strSynced.size());
+        EXPECT_EQ("/", strSynced[0]);
+        EXPECT_EQ(scene.storeDirectory(), strSynced[1]);
+    } catch (const NoAnswers& exception) {
+        GTEST_SKIP() << exception.what();
+    }
 }
 
 const auto NAME = [](const auto& instance) { return instance.param.szName; };

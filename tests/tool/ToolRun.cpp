@@ -114,7 +114,7 @@ public:
     {
         const int nUndisturbed = isSync(call) ? PRETEND : CARRY_OUT;
         if (isSync(call)) {
-            m_strSyncedLast = fileOf(call.args[0]);
+            m_strSynced.push_back(fileOf(call.args[0]));
         }
         if (!isMet(call)) {
             return nUndisturbed;
@@ -130,7 +130,7 @@ public:
         return Fault::Kind::Error == m_fault.kind ? EIO : ENOSPC;
     }
     int64_t calls() const { return m_nCalls; }
-    std::string syncedLast() const { return m_strSyncedLast; }
+    std::vector<std::string> synced() const { return m_strSynced; }
 
 private:
     // Sentences must come through. Random numbers are drawn until they suit, so that a run can have fewer
@@ -150,7 +150,7 @@ private:
     const Fault m_fault;
     const pid_t m_pid;
     int64_t m_nCalls = 0;
-    std::string m_strSyncedLast;
+    std::vector<std::string> m_strSynced;
 };
 
 int syncIfTool(long nCall, int nFile)
@@ -235,7 +235,7 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
     ending.nStatus = WIFEXITED(nStatus) ? WEXITSTATUS(nStatus) : 0;
     ending.strOutput = output.text();
     ending.strError = error.text();
-    ending.strSyncedLast = injection.syncedLast();
+    ending.strSynced = injection.synced();
     ending.nCalls = fault.isOfMemory() ? *nAllocations : injection.calls();
     return ending;
 }

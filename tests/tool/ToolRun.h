@@ -30,8 +30,8 @@ struct Ending {
     int nStatus = 0;
     std::string strOutput;
     std::string strError;
-    int64_t nCalls = 0; // that the fault could happen to
-    std::string strSyncedLast;
+    int64_t nCalls = 0;                 // that the fault could happen to
+    std::vector<std::string> strSynced; // one after the other
 };
 
 // Thrown where the kernel does not let one process answer the system calls of another.
