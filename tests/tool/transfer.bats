@@ -190,6 +190,7 @@ ${DB##*/}-wal" ]
 }
 
 @test "what others linked into a directory of theirs is not imported" {
+    chmod 0755 "$DIR" # whatever the umask
     mkdir -m 0777 "$DIR/theirs"
     a_line A | whole >"$DIR/secret"
     tool init
