@@ -313,9 +313,10 @@ bool isLeftBehind(const std::string& strName)
 // What an export leaves behind that was cut off by a power cut.
 void examineRemains(Findings& findings)
 {
+    typedef std::filesystem::directory_iterator Entry;
     std::error_code error;
-    for (const auto& entry : std::filesystem::directory_iterator(tool::databaseDirectory(), error)) {
-        const std::string strName = entry.path().filename();
+    for (Entry entry(tool::databaseDirectory(), error); entry != Entry(); entry.increment(error)) {
+        const std::string strName = entry->path().filename();
         if (isLeftBehind(strName)) {
             findings.push_back(
                 {Finding::Severity::Warning,
@@ -325,6 +326,9 @@ void examineRemains(Findings& findings)
                      Store::settleChange();
                  }});
         }
+    }
+    if (error && error != std::errc::no_such_file_or_directory) { // behind a link that leads nowhere
+        throw tool::Failure(tool::EXIT_STATUS_STORE, tool::databaseDirectory() + ": " + error.message());
     }
 }
 

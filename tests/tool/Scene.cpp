@@ -193,8 +193,11 @@ std::string Scene::wrongWithFailure(const Ending& ending, const Fault& fault,
     }
     const bool blInput = contains(ending.strError, m_strFiles + "/IN: ");
     const int nStatus = blInput ? 2 : 4;
-    const bool blDoctorsStatus = 5 == ending.nStatus || (0 == ending.nStatus && strState == m_strAfter);
-    if (ending.nStatus != nStatus && !(blDoctor && blDoctorsStatus)) {
+    // What doctor cannot look at is a finding, if it can print that.
+    const bool blMute = fault.isOfMemory() || contains(ending.strError, "cannot write the result");
+    const bool blDoctorsStatus = 5 == ending.nStatus || (0 == ending.nStatus && strState == m_strAfter) ||
+                                 (4 == ending.nStatus && blMute);
+    if (blDoctor ? !blDoctorsStatus : ending.nStatus != nStatus) {
         strWrong += "status " + std::to_string(ending.nStatus) + "; ";
     }
     const std::vector<std::string> strCauses = causes(fault.kind);

@@ -22,13 +22,14 @@ namespace {
 // Not among them: close, whose descriptor is gone whatever it answers, and the calls for locks.
 const int CALLS[] = {
 #ifdef __NR_open // older ones, which not every machine has
-    __NR_open,       __NR_stat,      __NR_lstat,     __NR_access, __NR_mkdir,    __NR_unlink,
-    __NR_rename,     __NR_chmod,     __NR_chown,     __NR_link,
+    __NR_open,     __NR_stat,     __NR_lstat,      __NR_access,    __NR_mkdir,
+    __NR_unlink,   __NR_rename,   __NR_chmod,      __NR_chown,     __NR_link,
 #endif
-    __NR_openat,     __NR_read,      __NR_pread64,   __NR_write,  __NR_writev,   __NR_pwrite64,
-    __NR_fsync,      __NR_fdatasync, __NR_ftruncate, __NR_lseek,  __NR_fstat,    __NR_statx,
-    __NR_newfstatat, __NR_faccessat, __NR_mkdirat,   __NR_linkat, __NR_unlinkat, __NR_renameat2,
-    __NR_renameat,   __NR_fchmod,    __NR_fchmodat,  __NR_fchown, __NR_fchownat, __NR_getrandom};
+    __NR_openat,   __NR_read,     __NR_pread64,    __NR_write,     __NR_writev,
+    __NR_pwrite64, __NR_fsync,    __NR_fdatasync,  __NR_ftruncate, __NR_lseek,
+    __NR_fstat,    __NR_statx,    __NR_newfstatat, __NR_faccessat, __NR_mkdirat,
+    __NR_linkat,   __NR_unlinkat, __NR_renameat2,  __NR_renameat,  __NR_fchmod,
+    __NR_fchmodat, __NR_fchown,   __NR_fchownat,   __NR_getrandom, __NR_getdents64};
 
 // A filter that has the kernel tell these calls, and carry out all others.
 struct Filter {

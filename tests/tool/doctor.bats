@@ -321,7 +321,7 @@ error: $DIRECTORY cannot be written to: Read-only file system
     expect 5 "error: $DIRECTORY is a symbolic link
     meaning: the tokens stand elsewhere, or nowhere
     remedy: find out who made it; move the database to a directory of that name
-error: $REAL_DB-journal: Too many levels of symbolic links
+error: $DIRECTORY: Too many levels of symbolic links
     meaning: programs fail in the same way
     remedy: mend the cause; or $REPLACE"
 }
