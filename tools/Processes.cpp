@@ -17,6 +17,7 @@
 
 #include "AccessTokenDefine.h"
 #include "Descriptor.h"
+#include "Failure.h"
 
 namespace {
 
@@ -52,11 +53,15 @@ bool isNumber(const std::string& strText)
     return strText.find_first_not_of("0123456789") == std::string::npos;
 }
 
-// The names in a directory; none where it cannot be read, because its process has ended, say.
+// The names in a directory; none where it cannot be read, because its process has ended, say. Throws Failure
+// where nothing can be read now.
 std::vector<std::string> namesIn(const std::string& strDirectory)
 {
     std::vector<std::string> strNames;
     const std::unique_ptr<DIR, int (*)(DIR*)> pDirectory(opendir(strDirectory.c_str()), closedir);
+    if (!pDirectory && (ENOMEM == errno || EMFILE == errno || ENFILE == errno)) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE, strDirectory + ": " + strerror(errno));
+    }
     for (const struct dirent* pEntry = nullptr; pDirectory && (pEntry = readdir(pDirectory.get()));) {
         strNames.emplace_back(pEntry->d_name);
     }

@@ -15,7 +15,7 @@ std::string lockHolders(const std::string& strFile);
 bool canSeeProcesses();
 
 // The descriptors that other processes have of the database, as paths in /proc; and whether one still is
-// that.
+// that. The first throws Failure.
 std::vector<std::string> databaseDescriptors();
 bool isOfDatabase(const std::string& strDescriptor);
 

@@ -1,9 +1,11 @@
 // For tests of what the tool says when the system fails: with "file" or "directory" in VEMO_TEST_SYNC, none
 // of these can be synced; with an errno in VEMO_TEST_LOOKUP, each look-up of a user ends with it and finds
-// nobody; with a name in VEMO_TEST_VFS, SQLite works on files in the way of that name. And of what nobody
-// sees: texts that are wiped from memory go into the file that VEMO_TEST_WIPED names.
-// For each log line, the file that VEMO_TEST_SYSLOG names gets "held" or "free": what the lock is then.
+// nobody; with one in VEMO_TEST_PROC, /proc cannot be listed; with a name in VEMO_TEST_VFS, SQLite works on
+// files in the way of that name. And of what nobody sees: texts that are wiped from memory go into the file
+// that VEMO_TEST_WIPED names. For each log line, the file that VEMO_TEST_SYSLOG names gets "held" or "free":
+// what the lock is then.
 
+#include <dirent.h>
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <pwd.h>
@@ -126,6 +128,17 @@ SCRIPTED int fsync(int nFile)
 SCRIPTED int fdatasync(int nFile)
 {
     return sync("fdatasync", nFile);
+}
+
+SCRIPTED DIR* opendir(const char* szPath)
+{
+    static const auto pNext = reinterpret_cast<decltype(&::opendir)>(dlsym(RTLD_NEXT, "opendir"));
+    const char* szError = getenv("VEMO_TEST_PROC");
+    if (szError && 0 == strcmp(szPath, "/proc/")) {
+        errno = atoi(szError);
+        return nullptr;
+    }
+    return pNext(szPath);
 }
 
 SCRIPTED int getpwnam_r(const char* szName, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,

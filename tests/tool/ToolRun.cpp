@@ -190,7 +190,11 @@ extern "C" int openat(int nDirectory, const char* szPath, int nFlags, ...)
 extern "C" DIR* opendir(const char* szPath)
 {
     static const auto next = reinterpret_cast<decltype(&::opendir)>(dlsym(RTLD_NEXT, "opendir"));
-    return g_blTool && 0 == strcmp(szPath, "/proc/") ? nullptr : next(szPath);
+    if (g_blTool && 0 == strcmp(szPath, "/proc/")) {
+        errno = ENOENT;
+        return nullptr;
+    }
+    return next(szPath);
 }
 
 // Each command begins by asking who runs it. Stands in front of the redirection's.

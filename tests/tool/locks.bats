@@ -411,6 +411,14 @@ until_sql()
     [ "$(cat "$DIR/out")" = "1 token updated" ]
 }
 
+@test "where it cannot be told which programs have the database open, the change is no success" {
+    local id
+    id=$(a_token)
+    VEMO_TEST_PROC=24 run_tool revoke "$id" # EMFILE
+    expect 4 "" "vemo-access-token: /proc/: Too many open files; the change was made, but calls that were under way can have undone it"
+    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
+}
+
 @test "programs that may still write back are named, and so is who holds the lock" {
     local first second i pids=()
     first=$(a_token --uses 5)
