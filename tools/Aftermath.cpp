@@ -11,10 +11,13 @@
 
 namespace {
 
+typedef std::chrono::steady_clock Clock;
+
 // A statement waits for a lock 500 times 10 ms at most; a second is for what stands around that.
 const std::chrono::seconds CALL_MAX(6);
 const std::chrono::milliseconds LOOK_AGAIN_AFTER(10);
 const std::chrono::microseconds LOOK_FOR_CLOSED_AFTER(100);
+const int RESTORED_MAX = 20; // then there is always a call that has read what another has just written back
 
 // One that was closed and opened again between two looks seems to be the old one.
 void forgetClosed(std::vector<std::string>& strOpen)
@@ -23,29 +26,69 @@ void forgetClosed(std::vector<std::string>& strOpen)
     strOpen.erase(std::remove_if(strOpen.begin(), strOpen.end(), isClosed), strOpen.end());
 }
 
-// Returns who has had the database open all the time.
-std::vector<std::string> outlast(const std::function<uint64_t()>& restore, uint64_t& nUndone)
+// Waits until all are closed, or for so long.
+void waitForClosed(std::vector<std::string>& strOpen, Clock::duration wait)
 {
-    typedef std::chrono::steady_clock Clock;
+    for (const auto end = Clock::now() + wait; !strOpen.empty() && Clock::now() < end;) {
+        forgetClosed(strOpen);
+        std::this_thread::sleep_for(LOOK_FOR_CLOSED_AFTER);
+    }
+}
+
+uint64_t restore(const tool::Change& change)
+{
+    {
+        tool::Store store(tool::Store::Access::Glance);
+        if (!change.isUndone(store)) {
+            return 0;
+        }
+    }
+    tool::Store store(tool::Store::Access::Write);
+    const uint64_t nUndone = change.makeAgain(store);
+    store.commit();
+    return nUndone;
+}
+
+// The same until nothing is to be done, and then keeps others from writing: a call that is under way gives
+// up, and one that begins reads what is there now.
+uint64_t restoreAndHold(const tool::Change& change, std::vector<std::string>& strOpen)
+{
+    uint64_t nUndone = 0;
+    for (;;) {
+        tool::Store store(tool::Store::Access::Write);
+        const uint64_t nAgain = change.makeAgain(store);
+        if (0 == nAgain) {
+            strOpen = tool::databaseDescriptors();
+            waitForClosed(strOpen, CALL_MAX);
+            return nUndone;
+        }
+        store.commit();
+        nUndone += nAgain;
+    }
+}
+
+// Returns who has had the database open all the time.
+std::vector<std::string> outlast(const tool::Change& change, uint64_t& nUndone)
+{
     std::vector<std::string> strOpen = tool::databaseDescriptors();
     auto end = Clock::now() + CALL_MAX;
-    for (;;) {
+    for (int nRestored = 0;;) {
         const bool blLast = strOpen.empty() || Clock::now() >= end;
         const auto start = Clock::now();
-        const uint64_t nAgain = restore();
+        const uint64_t nAgain = restore(change);
         if (nAgain) {
             nUndone += nAgain;
             strOpen = tool::databaseDescriptors();
             end = Clock::now() + CALL_MAX;
+            if (++nRestored == RESTORED_MAX) {
+                nUndone += restoreAndHold(change, strOpen);
+                end = Clock::now();
+            }
         } else if (blLast) {
             break;
         } else {
             // It takes turns with the other programs, whom a look at many tokens keeps from committing.
-            const auto pause = std::max<Clock::duration>(LOOK_AGAIN_AFTER, Clock::now() - start);
-            for (const auto next = Clock::now() + pause; !strOpen.empty() && Clock::now() < next;) {
-                forgetClosed(strOpen);
-                std::this_thread::sleep_for(LOOK_FOR_CLOSED_AFTER);
-            }
+            waitForClosed(strOpen, std::max<Clock::duration>(LOOK_AGAIN_AFTER, Clock::now() - start));
         }
         forgetClosed(strOpen);
     }
@@ -56,13 +99,12 @@ std::vector<std::string> outlast(const std::function<uint64_t()>& restore, uint6
 
 namespace tool {
 
-void outlastCalls(const std::function<uint64_t()>& restore, const std::string& strUndone,
-                  const std::string& strDone)
+void outlastCalls(const Change& change, const std::string& strUndone, const std::string& strDone)
 {
     uint64_t nUndone = 0;
     std::vector<std::string> strOpen;
     try {
-        strOpen = outlast(restore, nUndone);
+        strOpen = outlast(change, nUndone);
     } catch (const Failure& failure) {
         throw Failure(failure.status(), failure.fact(),
                       "the change was made, but calls that were under way can have undone it");

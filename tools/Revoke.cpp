@@ -48,20 +48,15 @@ std::vector<std::string> readAll(const std::vector<std::string>& strArguments)
 template <typename Find>
 void revokeAgain(Find find)
 {
-    const auto restore = [&find]() -> uint64_t {
-        const std::vector<std::string> strTids = find(tool::Store(tool::Store::Access::Glance));
-        if (strTids.empty()) {
-            return 0;
-        }
-        tool::Store store(tool::Store::Access::Write);
+    const auto isUndone = [&find](tool::Store& store) { return !find(store).empty(); };
+    const auto revoke = [&find](tool::Store& store) {
         uint64_t nRevoked = 0;
-        for (const std::string& strTid : strTids) {
+        for (const std::string& strTid : find(store)) {
             nRevoked += store.removeTid(strTid);
         }
-        store.commit();
         return nRevoked;
     };
-    tool::outlastCalls(restore, "a token came back", "revoked");
+    tool::outlastCalls({isUndone, revoke}, "a token came back", "revoked");
 }
 
 // The ids of the tokens that the names stand for; two can name the same.
@@ -102,7 +97,7 @@ int revokeNamed(const RevokeOptions& options)
         return tool::EXIT_STATUS_DONE;
     }
     const std::set<std::string> strTids = removeNamed(strNames);
-    revokeAgain([&strTids](tool::Store&& store) {
+    revokeAgain([&strTids](tool::Store& store) {
         std::vector<std::string> strBack;
         for (const std::string& strTid : strTids) {
             if (store.find(strTid)) {
@@ -165,7 +160,7 @@ int revokeMany(const RevokeOptions& options)
         return tool::EXIT_STATUS_DONE;
     }
     const Hashes revoked = removeMany(jFilter);
-    revokeAgain([&](tool::Store&& store) {
+    revokeAgain([&](tool::Store& store) {
         std::vector<std::string> strBack;
         store.eachTid(jFilter, [&](const std::string& strTid) {
             if (std::binary_search(revoked.begin(), revoked.end(), hashOf(strTid))) {

@@ -181,23 +181,18 @@ void updateAgain(const Json::Value& jBefore, const Json::Value& jChange)
 {
     const std::string strTid = jBefore["tid"].asString();
     std::optional<Json::Value> jNow;
-    const auto isNeeded = [&](auto&& store) {
+    const auto isNeeded = [&](tool::Store& store) {
         jNow = store.find(strTid);
         return jNow && isUndone(*jNow, jBefore, jChange);
     };
-    const auto restore = [&]() -> uint64_t {
-        if (!isNeeded(tool::Store(tool::Store::Access::Glance))) {
-            return 0;
-        }
-        tool::Store store(tool::Store::Access::Write);
+    const auto update = [&](tool::Store& store) -> uint64_t {
         const bool blNeeded = isNeeded(store);
         if (blNeeded) {
             store.update(strTid, jChange);
         }
-        store.commit();
         return blNeeded;
     };
-    tool::outlastCalls(restore, "the token was written back as it had been", "updated");
+    tool::outlastCalls({isNeeded, update}, "the token was written back as it had been", "updated");
     const int64_t nLeft = jNow ? (*jNow)["count"].asInt64() : 0;
     if (!jNow) {
         tool::complain("the token is gone: a call has spent its last use meanwhile, or deleted it");

@@ -411,6 +411,46 @@ until_sql()
     [ "$(cat "$DIR/out")" = "1 token updated" ]
 }
 
+# Calls that take no lock: while there is one that waits to write the token back, the next one begins, and reads
+# what that writes. They give up after a second, or after 200, and the number of those that wrote is printed.
+overlapping_calls()
+{
+    exec /usr/bin/python3 -c '
+import sqlite3, sys, time
+def connect():
+    return sqlite3.connect(sys.argv[1], isolation_level=None, timeout=1)
+call = connect()
+token = call.execute("SELECT * FROM token").fetchone()
+print("read", flush=True)
+for written in range(200):
+    while call.execute("SELECT 1 FROM token").fetchone():
+        time.sleep(0.001)
+    following = connect()
+    try:
+        call.execute("REPLACE INTO token VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?)", token)
+    except sqlite3.OperationalError:
+        break
+    call.close()
+    call = following
+else:
+    written = 200
+print(written)' "$DB"
+}
+
+@test "a token that calls write back again and again is revoked all the same" {
+    local id written
+    id=$(a_token)
+    overlapping_calls >"$DIR/calls" 3>&- &
+    until [ -s "$DIR/calls" ]; do :; done
+    run_tool revoke "$id"
+    wait $!
+    written=$(tail -n 1 "$DIR/calls")
+    [ "$written" -ge 20 ]
+    [ "$written" -lt 200 ]
+    expect 0 "1 token revoked" "vemo-access-token: a token came back $written times, by calls that do not take the lock, and was revoked again"
+    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
+}
+
 @test "where it cannot be told which programs have the database open, the change is no success" {
     local id
     id=$(a_token)
