@@ -24,6 +24,16 @@ int errorOf(const tool::Descriptor& directory, const std::string& strName)
     return blLink ? ELOOP : nError;
 }
 
+// Whether an open file has the name by which it was opened, and no other. Both by one call: others, who gave
+// it that name, can take it away again, and one is left then, too.
+bool hasThisNameOnly(const tool::Descriptor& file, const tool::FilePlace& place)
+{
+    const struct stat status = tool::statusOf(file);
+    struct stat named = {};
+    return 0 == fstatat(place.directory.get(), place.strName.c_str(), &named, AT_SYMLINK_NOFOLLOW) &&
+           named.st_dev == status.st_dev && named.st_ino == status.st_ino && 1 == named.st_nlink;
+}
+
 } // namespace
 
 namespace tool {
@@ -147,7 +157,7 @@ Descriptor openToRead(const std::string& strPath)
     if (!file.isOpen()) {
         throw badPath(strPath, strPath);
     }
-    if (statusOf(file).st_nlink > 1 && canOthersWrite(statusOf(place.directory))) {
+    if (canOthersWrite(statusOf(place.directory)) && !hasThisNameOnly(file, place)) {
         throw BadValue(shownPath(strPath) + " has other names besides, and others can change its directory; "
                                             "copy it to a place of yours");
     }

@@ -197,6 +197,18 @@ ${DB##*/}-wal" ]
     ln "$DIR/secret" "$DIR/theirs/file"
     run_tool import "$DIR/theirs/file"
     expect 2 "" "vemo-access-token: $DIR/theirs/file has other names besides, and others can change its directory; copy it to a place of yours"
+    # Nor if they take it away again when it has been opened.
+    echo '#include <dlfcn.h>
+          int openat(int directory, const char* name, int flags, int mode)
+          {
+              int (*next)(int, const char*, int, int) = dlsym(RTLD_NEXT, "openat");
+              int file = next(directory, name, flags, mode);
+              if (!strcmp(name, "file")) unlinkat(directory, name, 0);
+              return file;
+          }' | cc -shared -fPIC -w -D_GNU_SOURCE -x c -o "$DIR/unlinks.so" - || skip "no C compiler"
+    LD_PRELOAD=$DIR/unlinks.so run_tool import "$DIR/theirs/file"
+    expect 2 "" "vemo-access-token: $DIR/theirs/file has other names besides, and others can change its directory; copy it to a place of yours"
+    [ ! -e "$DIR/theirs/file" ]
     run_tool import "$DIR/secret"
     expect 0 "1 token imported"
 }
