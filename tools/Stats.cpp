@@ -1,5 +1,6 @@
 // stats: what the store holds, in numbers.
 
+#include <map>
 #include <memory>
 
 #include "Commands.h"
@@ -165,9 +166,13 @@ void printMetrics(const Statistics& statistics)
     printMetric(strPrefix + "database_page_bytes", "Size of a page of the database file.",
                 statistics.nPageBytes);
     printFamily(strPrefix + "function_tokens", "Tokens by the purpose they were made for.");
+    // Purposes that differ can read the same, and over a metric that is there twice the collector fails.
+    std::map<std::string, uint64_t> nTokensOf;
     for (const Group& group : statistics.functions) {
-        tool::printLine(strPrefix + "function_tokens{function=" + label(group.strName) + "} " +
-                        std::to_string(group.nTokens));
+        nTokensOf[label(group.strName)] += group.nTokens;
+    }
+    for (const auto& [strLabel, nTokens] : nTokensOf) {
+        tool::printLine(strPrefix + "function_tokens{function=" + strLabel + "} " + std::to_string(nTokens));
     }
     printFamily(strPrefix + "user_tokens", "Tokens by the user who owns them.");
     for (const UserGroup& group : statistics.users) {

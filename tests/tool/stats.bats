@@ -114,8 +114,8 @@ vemo_access_token_database_free_pages 0
 vemo_access_token_database_page_bytes 4096
 # HELP vemo_access_token_function_tokens Tokens by the purpose they were made for.
 # TYPE vemo_access_token_function_tokens gauge
-vemo_access_token_function_tokens{function="VPN"} 2
 vemo_access_token_function_tokens{function="Mail"} 1
+vemo_access_token_function_tokens{function="VPN"} 2
 vemo_access_token_function_tokens{function="Web"} 1
 # HELP vemo_access_token_user_tokens Tokens by the user who owns them.
 # TYPE vemo_access_token_user_tokens gauge
@@ -134,6 +134,10 @@ vemo_access_token_user_tokens{uid="4000000000",user=""} 1'
     [[ $output == *'"functions":[{"function":"a\"b\\c\nd\té\\n","tokens":4}]'* ]]
     LC_ALL=C.UTF-8 run_tool stats --no-header
     [ "${lines[5]}" = 'a"b\c\x0ad\x09é\n  4' ]
+    # Purposes that differ and read the same are one metric.
+    sql "UPDATE token SET function = iif(count < 0, 'a\xff', CAST(x'61ff' AS TEXT))"
+    run_tool stats --prometheus
+    [ "$(grep function= <<<"$output")" = 'vemo_access_token_function_tokens{function="a\\xff"} 4' ]
 }
 
 # Of one bad sample, the collector refuses the whole file.
