@@ -86,6 +86,7 @@ TokenStore::~TokenStore()
 {
     std::error_code ignored;
     std::filesystem::remove_all(m_strDirectory, ignored);
+    std::filesystem::remove(m_strDirectory + ".lock", ignored); // where the redirection puts it
 }
 
 std::string TokenStore::path() const
