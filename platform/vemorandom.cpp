@@ -30,7 +30,7 @@ int VEMORandomBase::random(int nMin, int nMax)
     const uint64_t nLimit = std::numeric_limits<uint64_t>::max() / nChoices * nChoices;
     uint64_t nDraw = 0;
     do {
-        if (0 > fill(&nDraw, sizeof(nDraw))) {
+        if (!fill(&nDraw, sizeof(nDraw))) {
             return -1;
         }
     } while (nDraw >= nLimit);
@@ -49,7 +49,7 @@ int VEMORandomBase::getString(const std::string& strAlphabet, unsigned int cchLe
     unsigned char rgDraw[256];
     while (strResult.size() < cchLength) {
         const size_t cbDraw = std::min(sizeof(rgDraw), cchLength - strResult.size());
-        if (0 > fill(rgDraw, cbDraw)) {
+        if (!fill(rgDraw, cbDraw)) {
             return -1;
         }
         for (size_t i = 0; i < cbDraw; ++i) {
@@ -62,7 +62,7 @@ int VEMORandomBase::getString(const std::string& strAlphabet, unsigned int cchLe
     return 0;
 }
 
-int VEMORandom::fill(void* pBuffer, size_t cbBuffer)
+bool VEMORandom::fill(void* pBuffer, size_t cbBuffer)
 {
     unsigned char* pNext = static_cast<unsigned char*>(pBuffer);
     while (0 < cbBuffer) {
@@ -71,12 +71,12 @@ int VEMORandom::fill(void* pBuffer, size_t cbBuffer)
             if (EINTR == errno) {
                 continue;
             }
-            return -1;
+            return false;
         }
         pNext += cbGot;
         cbBuffer -= static_cast<size_t>(cbGot);
     }
-    return 0;
+    return true;
 }
 
 } // namespace RANDOM

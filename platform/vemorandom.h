@@ -23,14 +23,14 @@ public:
     int getString(const std::string& strAlphabet, unsigned int cchLength, std::string& strOut);
 
 protected:
-    // Fills a buffer with random bytes. Returns 0, or -1 with errno set.
-    virtual int fill(void* pBuffer, size_t cbBuffer) = 0;
+    // Fills a buffer with random bytes. Returns false, with errno set, when there are none.
+    virtual bool fill(void* pBuffer, size_t cbBuffer) = 0;
 };
 
 // The kernel's random source. Objects share nothing and may be used by one thread each.
 class VEMORandom : public VEMORandomBase {
 protected:
-    int fill(void* pBuffer, size_t cbBuffer) override;
+    bool fill(void* pBuffer, size_t cbBuffer) override;
 };
 
 } // namespace RANDOM

@@ -1,6 +1,7 @@
 // The stand-in for the platform's core library: creating files.
 
 #include <fcntl.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -87,6 +88,15 @@ TEST_F(Touch, ClosesItsDescriptorWhichNoChildInherits)
     EXPECT_EQ(0, PLIBCFileTouch(strPath.c_str()));
 
     EXPECT_EQ((std::vector<int>{FD_CLOEXEC}), g_rgClosedFlags);
+
+    // Nor when that is the first one of all.
+    const int nInput = dup(STDIN_FILENO);
+    close(STDIN_FILENO);
+    g_rgClosedFlags.clear();
+    EXPECT_EQ(0, PLIBCFileTouch(file("first").c_str()));
+    EXPECT_EQ((std::vector<int>{FD_CLOEXEC}), g_rgClosedFlags);
+    dup2(nInput, STDIN_FILENO);
+    close(nInput);
 }
 
 TEST_F(Touch, LeavesAFileAlone)
@@ -150,6 +160,20 @@ TEST_F(Touch, FailsWhereNoFileCanBe)
         EXPECT_EQ(row.second, errno);
     }
     EXPECT_FALSE(std::filesystem::exists(file("missing")));
+}
+
+TEST_F(Touch, FailsWithoutADescriptorThoughTheFileIsThere)
+{
+    write(file("old"), "");
+    struct rlimit before = {};
+    ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
+    const struct rlimit none = {0, before.rlim_max};
+    ASSERT_EQ(0, setrlimit(RLIMIT_NOFILE, &none));
+
+    EXPECT_EQ(-1, PLIBCFileTouch(file("old").c_str()));
+
+    EXPECT_EQ(EMFILE, errno);
+    EXPECT_EQ(0, setrlimit(RLIMIT_NOFILE, &before));
 }
 
 } // namespace

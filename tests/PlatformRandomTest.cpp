@@ -25,15 +25,15 @@ public:
     size_t left() const { return m_strBytes.size(); }
 
 protected:
-    int fill(void* pBuffer, size_t cbBuffer) override
+    bool fill(void* pBuffer, size_t cbBuffer) override
     {
         if (m_strBytes.size() < cbBuffer) {
             errno = EIO;
-            return -1;
+            return false;
         }
         memcpy(pBuffer, m_strBytes.data(), cbBuffer);
         m_strBytes.erase(0, cbBuffer);
-        return 0;
+        return true;
     }
 
 private:
@@ -204,7 +204,7 @@ TEST(RandomString, IsUnchangedWhenItsSourceFails)
 
 // The kernel's random source
 
-// What one call of getrandom does: a positive number of bytes, or an errno when it fails.
+// What one call of getrandom does: a number of bytes, or an errno when it fails.
 struct Read {
     ssize_t cbGot;
     int nErrno;
@@ -241,12 +241,14 @@ TEST_F(KernelRandom, GathersShortReadsAndPassesInterruptions)
         {{1, 0}, {7, 0}},
         {{3, 0}, {-1, EINTR}, {1, 0}, {4, 0}},
         {{-1, EINTR}, {-1, EINTR}, {8, 0}},
+        {{0, 0}, {8, 0}},
         {{1, 0}, {1, 0}, {1, 0}, {1, 0}, {1, 0}, {1, 0}, {1, 0}, {1, 0}},
     };
     for (const std::vector<Read>& reads : rows) {
         SCOPED_TRACE(reads.size());
         script(reads);
         std::string strOut;
+        errno = 0;
         EXPECT_EQ(0, VEMORandom().getString("abcdefgh", 8, strOut));
         EXPECT_EQ("abcdefgh", strOut);
     }

@@ -1,5 +1,8 @@
 // The stand-in for the platform's user database.
 
+#include <sys/mman.h>
+#include <unistd.h>
+
 #include <cstring>
 
 #include "StoreTest.h"
@@ -7,7 +10,14 @@
 
 namespace {
 
-char g_szName[] = "alice";
+// Nothing can be read behind its end.
+char* const g_szName = [] {
+    const size_t cbPage = static_cast<size_t>(sysconf(_SC_PAGESIZE));
+    char* const pPages = static_cast<char*>(
+        mmap(nullptr, 2 * cbPage, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0));
+    mprotect(pPages + cbPage, cbPage, PROT_NONE);
+    return strcpy(pPages + cbPage - sizeof("alice"), "alice");
+}();
 
 int findAlice(uid_t, struct passwd* pEntry, char*, size_t, struct passwd** ppEntry)
 {
