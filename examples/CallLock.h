@@ -84,9 +84,7 @@ private:
     [[noreturn]] static void closeAndThrow(int nFile, const char* szFile)
     {
         const std::system_error error(errno, std::generic_category(), szFile);
-        if (0 <= nFile) {
-            close(nFile);
-        }
+        close(nFile); // or nothing, of -1
         throw error;
     }
 

@@ -1,13 +1,16 @@
 // What CallLock promises: to threads, to forked children, across signals and when a holder is killed.
 
+#include <dlfcn.h>
 #include <gtest/gtest.h>
 #include <pthread.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <atomic>
 #include <csignal>
 #include <cstdlib>
+#include <deque>
 #include <optional>
 #include <random>
 #include <stdexcept>
@@ -21,6 +24,37 @@
 #include "StormCalls.h"
 #include "StormProcesses.h"
 #include "internal/AccessTokenDbApi.h"
+
+namespace {
+
+// What comes of the next calls of flock() and fstat(): an errno, or 0 for what the system says, as it is with
+// those behind.
+std::deque<int> g_rgErrors;
+std::atomic<int> g_nLocks(0); // calls of flock()
+
+bool isAnswered()
+{
+    if (g_rgErrors.empty()) {
+        return false;
+    }
+    errno = g_rgErrors.front();
+    g_rgErrors.pop_front();
+    return 0 != errno;
+}
+
+} // namespace
+
+extern "C" int flock(int nFile, int nOperation) noexcept
+{
+    ++g_nLocks;
+    return isAnswered() ? -1 : static_cast<int>(syscall(SYS_flock, nFile, nOperation));
+}
+
+extern "C" int fstat(int nFile, struct stat* pStatus) noexcept
+{
+    static const auto next = reinterpret_cast<decltype(&::fstat)>(dlsym(RTLD_NEXT, "fstat"));
+    return isAnswered() ? -1 : next(nFile, pStatus);
+}
 
 namespace {
 
@@ -65,6 +99,23 @@ bool isLockedBySqlite(const std::string& strDatabase)
 
 class SerialisingLock : public ::testing::Test {
 protected:
+    // Takes the lock and lets go of it again. Returns the reason why it could not be taken, or 0.
+    template <typename... Wait>
+    int lockOnce(Wait... wait) const
+    {
+        return lockOnce(m_strFile, wait...);
+    }
+    template <typename... Wait>
+    static int lockOnce(const std::string& strFile, Wait... wait)
+    {
+        try {
+            const CallLock lock(strFile.c_str(), wait...);
+            return 0;
+        } catch (const std::system_error& error) {
+            return error.code().value();
+        }
+    }
+
     const StormCalls m_calls{Calls::Serialised};
     const std::string m_strFile = m_calls.lockFile();
 };
@@ -188,12 +239,37 @@ TEST_F(SerialisingLock, MakesAPrivateFileAndFollowsNoLink)
         const CallLock lock(m_strFile.c_str());
     }
     ASSERT_EQ(0, stat(m_strFile.c_str(), &status));
-    EXPECT_EQ(0U, status.st_mode & 077);
+    EXPECT_EQ(0600U, status.st_mode & 07777);
     EXPECT_EQ("", before.differenceTo(ProcessState::now()));
     const std::string strLink = m_strFile + ".link";
     ASSERT_EQ(0, symlink(m_strFile.c_str(), strLink.c_str()));
-    EXPECT_THROW(CallLock(strLink.c_str()), std::system_error);
-    EXPECT_THROW(CallLock((m_strFile + ".missing/lock").c_str()), std::system_error);
+    EXPECT_EQ(ELOOP, lockOnce(strLink));
+    EXPECT_EQ(ENOENT, lockOnce(m_strFile + ".missing/lock"));
+}
+
+TEST_F(SerialisingLock, TellsWhyItCannotBeHadAndLeavesNothingOpen)
+{
+    const struct {
+        std::deque<int> rgErrors; // of fstat(), and then of flock()
+        int nExpected;
+    } rows[] = {{{EIO}, EIO}, {{0, EIO}, EIO}, {{0, EINTR, EINTR}, 0}, {{0, EINTR, ENOLCK}, ENOLCK}};
+    const ProcessState before = ProcessState::now();
+    for (const auto& row : rows) {
+        g_rgErrors = row.rgErrors;
+        EXPECT_EQ(row.nExpected, lockOnce());
+        g_rgErrors = row.rgErrors;
+        EXPECT_EQ(row.nExpected, lockOnce(std::chrono::milliseconds(0)));
+    }
+    EXPECT_EQ("", before.differenceTo(ProcessState::now()));
+}
+
+// Standard input can be closed.
+TEST_F(SerialisingLock, MayHaveTheFirstDescriptor)
+{
+    close(STDIN_FILENO);
+    errno = EBADF;
+    EXPECT_EQ(0, lockOnce());
+    EXPECT_EQ(STDIN_FILENO, open("/dev/null", O_RDONLY));
 }
 
 // Why the file is never the database: to close a descriptor of a file drops the locks that SQLite has on it
@@ -215,42 +291,33 @@ TEST_F(SerialisingLock, OnTheDatabaseTakesItsLocksAway)
 // What others could open, they could hold for ever.
 TEST_F(SerialisingLock, RefusesAFileThatIsNotItsOwnersAlone)
 {
-    const auto refusal = [this] {
-        try {
-            const CallLock lock(m_strFile.c_str());
-            return 0;
-        } catch (const std::system_error& error) {
-            return error.code().value();
-        }
-    };
-    EXPECT_EQ(0, refusal());
+    EXPECT_EQ(0, lockOnce());
     for (const mode_t mode : {0644, 0620, 0604, 0601}) {
         ASSERT_EQ(0, chmod(m_strFile.c_str(), mode));
-        EXPECT_EQ(EPERM, refusal());
+        EXPECT_EQ(EPERM, lockOnce());
     }
     ASSERT_EQ(0, chmod(m_strFile.c_str(), 0700));
-    EXPECT_EQ(0, refusal());
+    EXPECT_EQ(0, lockOnce());
     if (0 == getuid() && 0 == chown(m_strFile.c_str(), 1, 1)) {
-        EXPECT_EQ(EPERM, refusal());
+        EXPECT_EQ(EPERM, lockOnce());
     }
     ASSERT_EQ(0, unlink(m_strFile.c_str()));
     ASSERT_EQ(0, mkfifo(m_strFile.c_str(), 0600));
-    EXPECT_EQ(EPERM, refusal());
+    EXPECT_EQ(EPERM, lockOnce());
 }
 
 TEST_F(SerialisingLock, WaitsNoLongerThanIsAsked)
 {
-    const auto wait = [this](std::chrono::milliseconds time) {
-        try {
-            const CallLock second(m_strFile.c_str(), time);
-            return 0;
-        } catch (const std::system_error& error) {
-            return error.code().value();
-        }
-    };
+    typedef std::chrono::steady_clock Clock;
     std::optional<CallLock> lock(std::in_place, m_strFile.c_str());
-    EXPECT_EQ(ETIMEDOUT, wait(std::chrono::milliseconds(0)));
-    EXPECT_EQ(ETIMEDOUT, wait(std::chrono::milliseconds(30)));
+    for (const auto& [nWait, nTries] : {std::pair(0, 1), {1, 2}, {30, 4}}) {
+        const std::chrono::milliseconds wait(nWait);
+        const auto start = Clock::now();
+        g_nLocks = 0;
+        EXPECT_EQ(ETIMEDOUT, lockOnce(wait));
+        EXPECT_LE(wait, Clock::now() - start);
+        EXPECT_EQ(nTries, g_nLocks);
+    }
     lock.reset();
-    EXPECT_EQ(0, wait(std::chrono::milliseconds(0)));
+    EXPECT_EQ(0, lockOnce(std::chrono::milliseconds(0)));
 }
