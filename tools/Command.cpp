@@ -41,7 +41,9 @@ void Command::addOption(const std::string& strNames, Parameter parameter)
 {
     const size_t nLong = strNames.find("--");
     parameter.strName = strNames.substr(nLong);
-    parameter.cShort = 0 == nLong ? '\0' : strNames[1];
+    if (0 != nLong) {
+        parameter.cShort = strNames[1];
+    }
     m_options.push_back(std::move(parameter));
 }
 
@@ -54,19 +56,19 @@ void Command::flag(const std::string& strName, bool& blFlag, const std::string& 
 void Command::flag(const std::string& strName, std::function<void()> set, const std::string& strDescription)
 {
     const auto take = [set = std::move(set)](const std::string&) { set(); };
-    addOption(strName, {"", 0, "", strDescription, take, false, true});
+    addOption(strName, {"", "", strDescription, take, true});
 }
 
 void Command::option(const std::string& strName, const std::string& strType, Take take,
                      const std::string& strDescription)
 {
-    addOption(strName, {"", 0, strType, strDescription, std::move(take), true, false});
+    addOption(strName, {"", strType, strDescription, std::move(take), false});
 }
 
 void Command::repeatedOption(const std::string& strName, const std::string& strType, Take take,
                              const std::string& strDescription)
 {
-    addOption(strName, {"", 0, strType, strDescription, std::move(take), true, true});
+    addOption(strName, {"", strType, strDescription, std::move(take), true});
 }
 
 void Command::argument(const std::string& strName, Take take, const std::string& strDescription)
@@ -77,12 +79,12 @@ void Command::argument(const std::string& strName, Take take, const std::string&
 
 void Command::optionalArgument(const std::string& strName, Take take, const std::string& strDescription)
 {
-    m_arguments.push_back({strName, 0, "", strDescription, std::move(take), true, false});
+    m_arguments.push_back({strName, "", strDescription, std::move(take), false});
 }
 
 void Command::remainingArguments(const std::string& strName, Take take, const std::string& strDescription)
 {
-    m_arguments.push_back({strName, 0, "", strDescription, std::move(take), true, true});
+    m_arguments.push_back({strName, "", strDescription, std::move(take), true});
 }
 
 Command::Parameter* Command::find(const std::string& strName)
@@ -125,11 +127,11 @@ void Command::addArgument(const char* szText)
 // What getopt_long() knows of the options.
 std::string Command::shortOptions() const
 {
-    std::string strShort = "-:"; // arguments are told in their places, and values that are missing
+    std::string strShort = "-:"; // arguments are told in their places, and what is wrong by us
     for (const Parameter& each : m_options) {
         if (0 != each.cShort) {
             strShort += each.cShort;
-            strShort += each.blTakesText ? ":" : "";
+            strShort += each.strType.empty() ? "" : ":";
         }
     }
     return strShort;
@@ -139,10 +141,10 @@ std::vector<struct option> Command::longOptions() const
 {
     std::vector<struct option> rgLong;
     for (const Parameter& each : m_options) {
-        rgLong.push_back({each.strName.c_str() + 2, each.blTakesText ? required_argument : no_argument,
+        rgLong.push_back({each.strName.c_str() + 2, each.strType.empty() ? no_argument : required_argument,
                           nullptr, FIRST_OPTION + static_cast<int>(rgLong.size())});
     }
-    rgLong.push_back({nullptr, 0, nullptr, 0});
+    rgLong.emplace_back(); // the end
     return rgLong;
 }
 
@@ -173,7 +175,6 @@ void Command::read(int nArguments, char** rgArguments)
 {
     const std::string strShort = shortOptions();
     const std::vector<struct option> rgLong = longOptions();
-    opterr = 0; // the sentences are those of this file
     optind = 0; // unlike 1 it makes getopt_long() forget what it has read before
     int nNext = 1;
     for (; nNext < nArguments; nNext = optind) {
@@ -231,7 +232,7 @@ void Command::take()
 
 std::string helpLine(const std::string& strName, const std::string& strDescription)
 {
-    const size_t nBlanks = strName.size() < NAME_WIDTH ? NAME_WIDTH - strName.size() : 0;
+    const size_t nBlanks = NAME_WIDTH - std::min(NAME_WIDTH, strName.size());
     return "  " + strName +
            (0 == nBlanks ? "\n" + std::string(NAME_WIDTH + 2, ' ') : std::string(nBlanks, ' ')) +
            strDescription + "\n";
@@ -249,12 +250,12 @@ std::string Command::help() const
     std::string strOptions;
     for (const Parameter& each : m_options) {
         std::string strNote = each.blRequired ? ", required" : "";
-        strNote += each.blTakesText && each.blRepeated ? ", repeatable" : "";
+        strNote += !each.strType.empty() && each.blRepeated ? ", repeatable" : "";
         for (const std::string& strOther : each.strExcluded) {
             strNote += ", not with " + strOther;
         }
         const std::string strShort = 0 == each.cShort ? "" : std::string{'-', each.cShort, ','};
-        const std::string strType = each.blTakesText ? " " + each.strType : "";
+        const std::string strType = each.strType.empty() ? "" : " " + each.strType;
         strOptions += helpLine(strShort + each.strName + strType,
                                each.strDescription + (strNote.empty() ? "" : " (" + strNote.substr(2) + ")"));
     }

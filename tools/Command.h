@@ -32,13 +32,12 @@ public:
     // An option, or an argument.
     struct Parameter {
         std::string strName; // "--name" or "NAME"
-        char cShort;         // or 0
-        std::string strType;
+        std::string strType; // of an option; "" for a flag, which takes no text
         std::string strDescription;
         Take take;
-        bool blTakesText;
         bool blRepeated; // may be given more than once, as flags may
         bool blRequired = false;
+        char cShort = '\0'; // none
         std::vector<std::string> strExcluded = {};
         std::vector<std::string> strTexts = {}; // as read
     };

@@ -102,6 +102,40 @@ tune|--wal --undo --dry-run --no-header
 TABLE
 }
 
+@test "--help of a command tells how each argument and option is given" {
+    run_tool update --help
+    expect 0 'Usage: vemo-access-token update [OPTIONS] TID
+change fields of a token
+
+Arguments:
+  TID                         the id; "-" reads it from standard input
+
+Options:
+  -h,--help                   print this help and exit
+  --version                   print the version and exit
+  -v,--verbose                show the library'"'"'s log lines on standard error
+  --uses N                    how many times it can be granted (not with --unlimited)
+  --unlimited                 any number of times (not with --uses)
+  --deadline TIME             expiry: 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @SECONDS (not with --ttl)
+  --ttl DURATION              lifetime from now: 45s, 90m, 8h, 2d12h, 1w, or seconds (not with --deadline)
+  --allow API[:METHOD,...]    what it opens, instead of what it did (repeatable, not with --add-allow, not with --remove-allow)
+  --add-allow API[:METHOD,...]
+                              what it opens besides (repeatable, not with --allow)
+  --remove-allow API[:METHOD,...]
+                              what it no longer opens (repeatable, not with --allow)
+  --bind-sid SID              bind it to this login session; "" to none
+  --extra JSON|@FILE          data of your own, a JSON object or a file of one'
+    run_tool create --help
+    [[ $output == *"
+  --function TAG              its purpose (required)
+"* ]]
+    [[ $(tool check --help) == "Usage: vemo-access-token check [OPTIONS] TID API [METHOD]
+"* ]]
+    [[ $(tool revoke --help) == "Usage: vemo-access-token revoke [OPTIONS] [TID...]
+"* ]]
+    [[ $(tool init --help) != *Arguments* ]]
+}
+
 @test "--version is the same everywhere" {
     run_tool --version
     [ "$status" -eq 0 ]
@@ -126,6 +160,7 @@ bogus|unknown command "bogus"
 list --count=5|--count: takes no value
 list --expired=false|--expired: takes no value
 list --verbose=1|--verbose: takes no value
+list --help=1|--help: takes no value
 create --unlimited=no|--unlimited: takes no value
 --bogus|unknown option "--bogus"
 -x|unknown option "-x"
