@@ -30,8 +30,8 @@ void forgetClosed(std::vector<std::string>& strOpen)
 void waitForClosed(std::vector<std::string>& strOpen, Clock::duration wait)
 {
     for (const auto end = Clock::now() + wait; !strOpen.empty() && Clock::now() < end;) {
-        forgetClosed(strOpen);
         std::this_thread::sleep_for(LOOK_FOR_CLOSED_AFTER);
+        forgetClosed(strOpen);
     }
 }
 
@@ -90,7 +90,6 @@ std::vector<std::string> outlast(const tool::Change& change, uint64_t& nUndone)
             // It takes turns with the other programs, whom a look at many tokens keeps from committing.
             waitForClosed(strOpen, std::max<Clock::duration>(LOOK_AGAIN_AFTER, Clock::now() - start));
         }
-        forgetClosed(strOpen);
     }
     return strOpen;
 }
