@@ -9,6 +9,18 @@
 
 namespace {
 
+struct Made {
+    bool blFile;
+    bool blTable;
+};
+
+Made makeStore()
+{
+    tool::Store store(tool::Store::Access::Locked, tool::Store::Missing::Make);
+    const bool blFile = store.hasMadeFile();
+    return {blFile, store.makeTable() || blFile}; // the library makes it with a file that it finds missing
+}
+
 int init()
 {
     const bool blDirectory = tool::makeDirectory();
@@ -16,17 +28,11 @@ int init()
         tool::Store::settleChange();
         tool::print("made the directory " + tool::databaseDirectory() + "\n");
     }
-    bool blFile = false;
-    bool blTable = false;
-    {
-        tool::Store store(tool::Store::Access::Locked, tool::Store::Missing::Make);
-        blFile = store.hasMadeFile();
-        blTable = store.makeTable() || blFile; // the library makes it with a file that it finds missing
-    }
-    if (blFile) {
+    const Made made = makeStore();
+    if (made.blFile) {
         tool::print("made the file " VEMO_ATOKEN_DB_PATH "\n");
     }
-    if (blTable) {
+    if (made.blTable) {
         tool::print("made the table of tokens\n");
     } else if (!blDirectory) {
         tool::print("all was there already\n");

@@ -159,4 +159,11 @@ no findings"
     install -m 0644 /dev/null "$VEMO_REDIRECT_DIR.lock"
     run_tool init
     expect 4 "made the directory ${REAL_DB%/*}" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
+    rm -r "$VEMO_REDIRECT_DIR"
+    chmod 0600 "$VEMO_REDIRECT_DIR.lock"
+    VEMO_TEST_HASTE=1 run --separate-stderr flock "$VEMO_REDIRECT_DIR.lock" "$TOOL" init
+    [ "$status" -eq 4 ]
+    [ "$output" = "made the directory ${REAL_DB%/*}" ]
+    # shellcheck disable=SC2154 # bats sets it
+    [[ $stderr == *" stayed locked by flock (process "*") for 5 seconds" ]] # and not that nothing was changed
 }
