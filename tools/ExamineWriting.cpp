@@ -8,6 +8,7 @@
 #include <cstring>
 
 #include "AccessTokenDefine.h"
+#include "Descriptor.h"
 #include "Examination.h"
 #include "Failure.h"
 #include "Place.h"
@@ -21,37 +22,26 @@ const uint64_t ROOM_MIN = 65536; // bytes: the journal of a small change, and th
 
 const char* const UNCHANGEABLE = "no token can be created, changed or granted";
 
-void require(int nResult, const std::string& strPath)
+// What look() fills in about a name's file, whatever that is: nothing is read of it, so nothing waits for
+// another end.
+template <typename Status, typename Look>
+Status lookAt(const std::string& strPath, Look look)
 {
-    if (0 > nResult) {
+    const tool::Descriptor file(open(strPath.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC));
+    Status status = {};
+    if (!file.isOpen() || 0 != look(file.get(), &status)) {
         throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno));
     }
+    return status;
 }
-
-// A name's file, whatever it is: nothing is read of it, so nothing waits for another end.
-class Handle {
-public:
-    explicit Handle(const std::string& strPath)
-        : m_nFile(open(strPath.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC))
-    {
-        require(m_nFile, strPath);
-    }
-    ~Handle() { close(m_nFile); }
-    Handle(const Handle&) = delete;
-    Handle& operator=(const Handle&) = delete;
-    int get() const { return m_nFile; }
-
-private:
-    const int m_nFile;
-};
 
 // What chattr(1) has set.
 uint64_t attributesOf(const std::string& strPath)
 {
-    const Handle handle(strPath);
-    struct statx status = {};
-    require(statx(handle.get(), "", AT_EMPTY_PATH, STATX_TYPE, &status), strPath);
-    return status.stx_attributes;
+    const auto look = [](int nFile, struct statx* pStatus) {
+        return statx(nFile, "", AT_EMPTY_PATH, 0, pStatus);
+    };
+    return lookAt<struct statx>(strPath, look).stx_attributes;
 }
 
 bool isReadOnlyFileSystem()
@@ -62,9 +52,7 @@ bool isReadOnlyFileSystem()
 void examineRoom(Findings& findings)
 {
     const std::string strPath = tool::databaseDirectory();
-    const Handle handle(strPath);
-    struct statvfs status = {};
-    require(fstatvfs(handle.get(), &status), strPath);
+    const auto status = lookAt<struct statvfs>(strPath, fstatvfs);
     // Programs run as root, whom the file system gives its reserve too. Some have no number of files to run
     // out of.
     const bool blRoom = uint64_t{status.f_bfree} * status.f_frsize >= ROOM_MIN;
