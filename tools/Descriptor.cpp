@@ -5,6 +5,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <utility>
 
 #include "Masking.h"
 
@@ -17,11 +18,9 @@ const mode_t OTHERS_WRITE_MODE = 0022;
 int errorOf(const tool::Descriptor& directory, const std::string& strName)
 {
     const int nError = errno;
-    struct stat status = {};
-    const bool blLink = ENOTDIR == nError &&
-                        0 == fstatat(directory.get(), strName.c_str(), &status, AT_SYMLINK_NOFOLLOW) &&
-                        S_ISLNK(status.st_mode);
-    return blLink ? ELOOP : nError;
+    struct stat status = {}; // no link, unless it is found to be one
+    fstatat(directory.get(), strName.c_str(), &status, AT_SYMLINK_NOFOLLOW);
+    return S_ISLNK(status.st_mode) ? ELOOP : nError;
 }
 
 // Whether an open file has the name by which it was opened, and no other. Both by one call: others, who gave
@@ -47,12 +46,7 @@ Descriptor::~Descriptor()
 
 Descriptor& Descriptor::operator=(Descriptor&& other) noexcept
 {
-    if (this != &other) {
-        if (isOpen()) {
-            close(m_nFile);
-        }
-        m_nFile = other.release();
-    }
+    std::swap(m_nFile, other.m_nFile); // the other one closes it
     return *this;
 }
 

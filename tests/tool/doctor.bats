@@ -270,11 +270,16 @@ error: $REAL_DB is immutable
 }
 
 @test "a file that cannot be written to is left to the administrator" {
-    in_namespace '"$1" init >/dev/null && mount --bind "$2" "$2" && mount -o remount,bind,ro "$2" && "$1" doctor --repair' \
-        "$TOOL" "$REAL_DB"
-    expect 5 "error: $REAL_DB cannot be written to: Read-only file system
+    in_namespace '"$1" init >/dev/null && chmod 0755 "$3" && chmod 0750 "$2" && mount --bind "$2" "$2" &&
+        mount -o remount,bind,ro "$2" && "$1" doctor --repair' "$TOOL" "$REAL_DB" "$DIRECTORY"
+    expect 5 "repaired: $DIRECTORY has mode 0755
+    meaning: others than root can use it, and ids are credentials
+error: $REAL_DB has mode 0750
+    meaning: others than root can use it, and ids are credentials
+    remedy: chmod 0700 $REAL_DB
+error: $REAL_DB cannot be written to: Read-only file system
     meaning: no token can be created, changed or granted
-    remedy: make the file system writable, or the file"
+    remedy: make the file system writable, or the file" "vemo-access-token: cannot repair: $REAL_DB: Read-only file system"
 }
 
 @test "hard links are left to the administrator" {

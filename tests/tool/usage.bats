@@ -206,6 +206,8 @@ update TID --allow A --remove-allow B|--allow excludes --remove-allow
 stats --prometheus -o json|--prometheus excludes --output
 tune --wal --undo|--wal excludes --undo
 TABLE
+    LC_ALL=C run_tool café # only of a terminal anything is known
+    expect 2 "" 'vemo-access-token: unknown command "café"'
 }
 
 @test "arguments may stand before, between and behind options, also where POSIX is asked for" {
