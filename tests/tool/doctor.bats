@@ -318,6 +318,17 @@ error: $DIRECTORY cannot be written to: Read-only file system
     expect 5 "error: $REAL_DB has mode 0750
     meaning: others than root can use it, and ids are credentials
     remedy: chmod 0700 $REAL_DB" "vemo-access-token: the repair did not help: $REAL_DB has mode 0750"
+    # No database is made where others can still put a journal beside it.
+    rm "$DB"
+    chmod 0770 "$VEMO_REDIRECT_DIR"
+    LD_PRELOAD=$DIR/no-chmod.so run_tool doctor --repair
+    expect 5 "error: $DIRECTORY has mode 0770
+    meaning: others than root can use it, and ids are credentials
+    remedy: chmod 0700 $DIRECTORY
+error: there is no database $REAL_DB
+    meaning: there are no tokens; the first call that needs it makes it
+    remedy: vemo-access-token init" "vemo-access-token: the repair did not help: $DIRECTORY has mode 0770"
+    [ ! -e "$DB" ]
 }
 
 @test "a place that cannot be looked at is a finding" {
