@@ -25,6 +25,8 @@ using tool::Store;
 
 const mode_t PRIVATE_MODE = 0700;
 const mode_t OTHERS_MODE = 0077;
+const size_t WRITE_VERSION = 18; // where the database says what its writers must know: 2 at most
+const size_t READ_VERSION = 19;  // the same of its readers: 2 is the write-ahead journal
 
 std::string octal(mode_t mode)
 {
@@ -50,7 +52,7 @@ Descriptor openTrustedDirectory()
             throw tool::Failure(tool::EXIT_STATUS_STORE, "others than root can change " + walk.path());
         }
     }
-    Descriptor directory(openat(walk.directory().get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    Descriptor directory(openat(walk.directory().get(), ".", O_RDONLY | O_CLOEXEC));
     if (!directory.isOpen()) {
         throw tool::Failure(tool::EXIT_STATUS_STORE, walk.path() + ": " + strerror(errno));
     }
@@ -268,7 +270,6 @@ bool examineFile(bool blMake, Findings& findings)
 
 void examineVersion(Findings& findings)
 {
-    const size_t WRITE_VERSION = 18; // where the database says what its writers must know: 2 at most
     const std::string strHeader = tool::firstBytes("", WRITE_VERSION + 1);
     if (strHeader.size() <= WRITE_VERSION || 0 != strHeader.compare(0, 6, "SQLite") ||
         2 >= static_cast<unsigned char>(strHeader[WRITE_VERSION])) {
@@ -287,7 +288,6 @@ void examineVersion(Findings& findings)
 bool examineForeignJournal(Findings& findings)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH "-wal";
-    const size_t READ_VERSION = 19; // where the database says what its readers must know: 2 is this journal
     const std::string strHeader = tool::firstBytes("", READ_VERSION + 1);
     if (strHeader.size() <= READ_VERSION || strHeader[READ_VERSION] != 1 || !tool::statusOf(strPath)) {
         return true;

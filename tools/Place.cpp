@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 
@@ -45,11 +46,12 @@ tool::Descriptor openBeside(const std::string& strSuffix)
     return tool::openRegular(directory, tool::databaseName() + strSuffix);
 }
 
+// Of a file that is not open there are none.
 std::string bytesAt(const tool::Descriptor& file, off_t nOffset, size_t cbWanted)
 {
     std::string strBytes(cbWanted, '\0');
     const ssize_t cbRead = pread(file.get(), strBytes.data(), cbWanted, nOffset);
-    strBytes.resize(cbRead > 0 ? static_cast<size_t>(cbRead) : 0);
+    strBytes.resize(static_cast<size_t>(std::max<ssize_t>(cbRead, 0)));
     return strBytes;
 }
 
@@ -82,8 +84,7 @@ std::optional<struct stat> statusOf(const std::string& strPath)
 
 std::string firstBytes(const std::string& strSuffix, size_t cbWanted)
 {
-    const Descriptor file = openBeside(strSuffix);
-    return file.isOpen() ? bytesAt(file, 0, cbWanted) : "";
+    return bytesAt(openBeside(strSuffix), 0, cbWanted);
 }
 
 std::string lastBytes(const std::string& strSuffix, size_t cbWanted)

@@ -6,10 +6,9 @@
 #include <sys/sysmacros.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
-#include <climits>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <memory>
 #include <set>
@@ -68,26 +67,18 @@ std::vector<std::string> namesIn(const std::string& strDirectory)
     return strNames;
 }
 
-// What a symbolic link holds; "" where it cannot be read.
-std::string linkOf(const std::string& strPath)
+// The name of the file that a symbolic link leads to; "" where it cannot be read.
+std::string nameBehind(const std::string& strLink)
 {
-    char szLink[PATH_MAX];
-    const ssize_t cchLink = readlink(strPath.c_str(), szLink, sizeof(szLink));
-    return std::string(szLink, cchLink > 0 ? static_cast<size_t>(cchLink) : 0);
+    std::error_code error;
+    return std::filesystem::read_symlink(strLink, error).filename();
 }
 
-bool endsWith(const std::string& strText, const std::string& strEnd)
-{
-    return strText.size() >= strEnd.size() &&
-           0 == strText.compare(strText.size() - strEnd.size(), strEnd.size(), strEnd);
-}
-
-// The last part of the database's own path: what stands in its place can be a link.
+// The database's own name: what stands in its place can be a link.
 std::string realName()
 {
     const tool::Descriptor database(open(VEMO_ATOKEN_DB_PATH, O_PATH | O_CLOEXEC));
-    const std::string strPath = linkOf(std::string(PROC) + "self/fd/" + std::to_string(database.get()));
-    return strPath.substr(std::min(strPath.rfind('/'), strPath.size()));
+    return nameBehind(std::string(PROC) + "self/fd/" + std::to_string(database.get()));
 }
 
 } // namespace
@@ -104,7 +95,7 @@ std::string lockHolders(const std::string& strFile)
         std::istringstream words(strLine);
         std::string strNumber, strKind, strStrength, strType, strPid, strName;
         words >> strNumber >> strKind >> strStrength >> strType >> strPid >> strName; // who waits has "->"
-        if (strKind == "FLOCK" && strName == lockName(status) && isNumber(strPid) && strPid != "0") {
+        if (strName == lockName(status) && isNumber(strPid) && strPid != "0") {
             strPids.insert(strPid);
         }
     }
@@ -143,7 +134,7 @@ bool isOfDatabase(const std::string& strDescriptor)
     static const std::string strName = realName();
     struct stat status = {};
     struct stat database = {};
-    return endsWith(linkOf(strDescriptor), strName) && 0 == stat(VEMO_ATOKEN_DB_PATH, &database) &&
+    return nameBehind(strDescriptor) == strName && 0 == stat(VEMO_ATOKEN_DB_PATH, &database) &&
            0 == stat(strDescriptor.c_str(), &status) && status.st_dev == database.st_dev &&
            status.st_ino == database.st_ino;
 }

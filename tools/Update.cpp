@@ -146,10 +146,11 @@ Json::Value changeOf(const Json::Value& jToken, const Options& options)
     return jChange;
 }
 
-// Whether one number of uses is more than another. Negative ones are without a limit.
-bool isMore(int64_t nCount, int64_t nOther)
+// Whether a number of uses is one from before the one that was set: no grant adds uses, takes a limit away or
+// brings one. Negative ones are without a limit.
+bool isOldCount(int64_t nCount, int64_t nSet)
 {
-    return nOther >= 0 && (nCount < 0 || nCount > nOther);
+    return (nCount < 0) != (nSet < 0) || (nSet >= 0 && nCount > nSet);
 }
 
 // As texts: a NaN in it is not equal to itself.
@@ -164,11 +165,9 @@ bool isUndone(const Json::Value& jNow, const Json::Value& jBefore, const Json::V
 {
     for (const std::string& strName : jChange.getMemberNames()) {
         const Json::Value& jSet = jChange[strName];
-        const int64_t nNow = jNow["count"].asInt64();
-        // No grant takes a limit away, or brings one.
-        const bool blUndone = strName != "count"
-                                  ? !isSame(jNow[strName], jSet) && isSame(jNow[strName], jBefore[strName])
-                                  : isMore(nNow, jSet.asInt64()) || (nNow >= 0) != (jSet.asInt64() >= 0);
+        const Json::Value& jIs = jNow[strName];
+        const bool blUndone = strName == "count" ? isOldCount(jIs.asInt64(), jSet.asInt64())
+                                                 : !isSame(jIs, jSet) && isSame(jIs, jBefore[strName]);
         if (blUndone) {
             return true;
         }

@@ -159,7 +159,7 @@ int64_t parseDuration(const std::string& strText)
     while (szRest != szEnd) {
         int64_t nNumber = 0;
         const auto [szUnit, error] = std::from_chars(szRest, szEnd, nNumber);
-        const int64_t nUnit = szUnit == szEnd ? 0 : secondsOf(*szUnit);
+        const int64_t nUnit = secondsOf(*szUnit); // at the end stands a NUL
         if (std::errc() != error || nNumber < 0 || 0 == nUnit || nNumber > DURATION_MAX / nUnit) {
             failOnDuration(strText);
         }
@@ -177,7 +177,7 @@ int64_t parseDuration(const std::string& strText)
 
 int64_t parseTime(const std::string& strText)
 {
-    if (!strText.empty() && strText[0] == '@') {
+    if (strText[0] == '@') {
         return parseNumber(strText.substr(1), 0, INT64_MAX);
     }
     const bool blUtc = !strText.empty() && strText.back() == 'Z';
@@ -196,8 +196,7 @@ int64_t parseTime(const std::string& strText)
         // midnight has another beginning.
         const bool blDay = 0 == strcmp(szFormat, "%Y-%m-%d");
         if (tmTime.tm_mday == tmAsked.tm_mday &&
-            (blDay || (tmTime.tm_hour == tmAsked.tm_hour && tmTime.tm_min == tmAsked.tm_min &&
-                       tmTime.tm_sec == tmAsked.tm_sec))) {
+            (blDay || (tmTime.tm_hour == tmAsked.tm_hour && tmTime.tm_min == tmAsked.tm_min))) {
             return nTime;
         }
     }
@@ -216,10 +215,10 @@ std::string timeText(Json::Int64 nTime, bool blUtc)
     const time_t nSeconds = static_cast<time_t>(nTime);
     struct tm tmTime = {};
     char szText[64];
-    if (!(blUtc ? gmtime_r(&nSeconds, &tmTime) : localtime_r(&nSeconds, &tmTime)) ||
-        0 == strftime(szText, sizeof(szText), blUtc ? "%Y-%m-%d %H:%M:%SZ" : "%Y-%m-%d %H:%M:%S", &tmTime)) {
+    if (!(blUtc ? gmtime_r(&nSeconds, &tmTime) : localtime_r(&nSeconds, &tmTime))) {
         return "@" + std::to_string(nTime); // beyond the calendar
     }
+    strftime(szText, sizeof(szText), blUtc ? "%Y-%m-%d %H:%M:%SZ" : "%Y-%m-%d %H:%M:%S", &tmTime);
     return szText;
 }
 
@@ -270,7 +269,7 @@ Json::Value allowanceJson(const std::vector<Allowance>& allowances)
 
 Json::Value parseExtra(const std::string& strText)
 {
-    if (strText.empty() || strText[0] != '@') {
+    if (strText[0] != '@') {
         return parseObject(strText);
     }
     const std::string strFile = strText.substr(1);

@@ -72,7 +72,7 @@ wchar_t largestCharacter()
 
 bool isAscii(wchar_t cWide)
 {
-    return 0 <= cWide && cWide < 0x80;
+    return static_cast<unsigned int>(cWide) < 0x80;
 }
 
 bool isVisible(wchar_t cWide)
