@@ -1,9 +1,9 @@
 // For tests of what the tool says when the system fails: with "file" or "directory" in VEMO_TEST_SYNC, none
 // of these can be synced; with an errno in VEMO_TEST_LOOKUP, each look-up of a user ends with it and finds
-// nobody; with one in VEMO_TEST_PROC, /proc cannot be listed; with a name in VEMO_TEST_VFS, SQLite works on
-// files in the way of that name. And of what nobody sees: texts that are wiped from memory go into the file
-// that VEMO_TEST_WIPED names. For each log line, the file that VEMO_TEST_SYSLOG names gets "held" or "free":
-// what the lock is then.
+// nobody, with ERANGE as long as its buffer has less than 4 KiB; with one in VEMO_TEST_PROC, /proc cannot be
+// listed; with a name in VEMO_TEST_VFS, SQLite works on files in the way of that name. And of what nobody sees:
+// texts that are wiped from memory go into the file that VEMO_TEST_WIPED names. For each log line, the file that
+// VEMO_TEST_SYSLOG names gets "held" or "free": what the lock is then.
 
 #include <dirent.h>
 #include <dlfcn.h>
@@ -50,7 +50,7 @@ int lookUp(const char* szFunction, Key key, struct passwd* pEntry, char* szBuffe
            struct passwd** ppEntry)
 {
     const char* szError = getenv("VEMO_TEST_LOOKUP");
-    if (szError) {
+    if (szError && (ERANGE != atoi(szError) || cbBuffer < 4096)) {
         *ppEntry = nullptr;
         return atoi(szError);
     }

@@ -399,10 +399,12 @@ revoke $ID"
     a_token >"$DIR/id"
     sql "UPDATE token SET uid = NULL"
     run_shortly stats -o jsonl
-    [[ $output != *'"user":"root"'* ]] || {
+    [[ $output == *'"users":[{"tokens":1,"uid":null,"user":""}]}' ]] || {
         echo "$output"
         return 1
     }
+    run_shortly stats --no-header
+    [ "${lines[-1]}" = "NULL    1" ]
 }
 
 @test "a word in the place of a number" {

@@ -176,8 +176,8 @@ no findings"
     [ "$(stat -c '%u %g' "$VEMO_REDIRECT_DIR")" = "0 1" ]
 }
 
-@test "a symbolic link in place of the directory is left to the administrator" {
-    a_row aaaaaaaa
+@test "a symbolic link in place of the directory is left to the administrator, and what it leads to is not opened" {
+    deadline=0 a_row aaaaaaaa
     mv "$VEMO_REDIRECT_DIR" "$DIR/elsewhere"
     ln -s elsewhere "$VEMO_REDIRECT_DIR"
     expect_no_repair error "$DIRECTORY is a symbolic link" "the tokens stand elsewhere, or nowhere" \
@@ -289,6 +289,12 @@ error: $REAL_DB cannot be written to: Read-only file system
     expect_no_repair warning "$REAL_DB has 3 hard links" \
         "the tokens can be reached under another name, and a journal of that name is not found" \
         "find -samefile tells the other names; remove those"
+    # What stands under the other names is made private by nobody.
+    chmod 0640 "$DB"
+    run_tool doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$stderr" = "" ]
+    [ "$(stat -c %a "$DB")" = 640 ]
 }
 
 @test "directories above that others can change are left to the administrator" {
@@ -311,7 +317,9 @@ error: $DIRECTORY cannot be written to: Read-only file system
 
 @test "a repair that does not help is told, and not called one" {
     a_row aaaaaaaa
-    echo 'int chmod() { return 0; } int fchmod() { return 0; } int fchmodat() { return 0; }' |
+    echo '#include <errno.h>
+        int chmod() { return 0; } int fchmod() { return 0; } int fchmodat() { return 0; }
+        int unlinkat() { errno = EPERM; return -1; }' |
         cc -shared -fPIC -w -fno-builtin -x c -o "$DIR/no-chmod.so" - || skip "no C compiler"
     chmod 0750 "$DB"
     LD_PRELOAD=$DIR/no-chmod.so run_tool doctor --repair
@@ -329,6 +337,12 @@ error: there is no database $REAL_DB
     meaning: there are no tokens; the first call that needs it makes it
     remedy: vemo-access-token init" "vemo-access-token: the repair did not help: $DIRECTORY has mode 0770"
     [ ! -e "$DB" ]
+    chmod 0700 "$VEMO_REDIRECT_DIR"
+    tool init >/dev/null
+    install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
+    LD_PRELOAD=$DIR/no-chmod.so run_tool doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$stderr" = "vemo-access-token: cannot repair: backup.part: Operation not permitted" ]
 }
 
 @test "a place that cannot be looked at is a finding" {
@@ -947,6 +961,16 @@ TABLE
     expect_no_repair error "$REAL_DB-journal is one of several that belong together" \
         "the next program to open the database changes other files, too" \
         "find out who made it; remove it while no program runs"
+    ln "$DB-journal" "$DIR/second"
+    expect_no_repair error "$REAL_DB-journal has several hard links" \
+        "the next program to open the database changes other files, too" \
+        "find out who made it; remove it while no program runs"
+    if [ "$(id -u)" -eq 0 ]; then
+        chown 4000000000 "$DB-journal"
+        expect_no_repair error "$REAL_DB-journal belongs to uid 4000000000" \
+            "the next program to open the database may take its contents for changes" \
+            "find out who made it; remove it while no program runs"
+    fi
     rm "$DB-journal"
     run_tool doctor
     [ "${lines[0]}" = "warning: a deadline of 0 or less in 1 token (aaaaaaaa)" ]
@@ -971,6 +995,10 @@ TABLE
     install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
     run flock "$VEMO_REDIRECT_DIR/backup.part" "$TOOL" doctor
     [ "$output" = "no findings" ]
+    VEMO_TEST_SYNC=directory run_tool doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$stderr" = "vemo-access-token: cannot repair: $DIRECTORY: Input/output error; the change was made, but a power cut can undo it" ]
+    install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
     expect_repair "$DIRECTORY/backup.part was left behind" "an export was cut off; the file can hold whole ids"
     [ ! -e "$VEMO_REDIRECT_DIR/backup.part" ]
 }

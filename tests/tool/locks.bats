@@ -32,20 +32,22 @@ unlock()
     wait "$HOLDER"
 }
 
-# run_waiting TIMES ARGUMENTS...: runs the tool, and lets go of the lock when it has waited that often.
-# Fails when it has not waited.
+# run_waiting TIMES ARGUMENTS...: runs the tool, and lets go of the lock when it has waited that often; ahead of
+# that, it gets $SIGNAL, if that is set. Fails when it has not waited.
 run_waiting()
 {
     local times=$1 watcher
     shift
     rm -f "$DIR/waits" "$DIR/waited"
     mkfifo "$DIR/waits"
+    local shell=$BASHPID
     exec 9<>"$DIR/waits" # open for reading before the tool writes
     {
         for ((i = 0; i < times; ++i)); do
             read -r -u 9
         done
         touch "$DIR/waited"
+        [ -z "${SIGNAL-}" ] || pkill "-$SIGNAL" -P "$shell" vemo-access
         printf 'COMMIT;\n.quit\n' >&7
     } 3>&- &
     watcher=$!
@@ -149,6 +151,13 @@ TABLE
         [ "$(sql "SELECT tid FROM token")" = "$output" ]
         sql "DELETE FROM token"
     done
+    # What its caller ignores does not interrupt it.
+    lock "$READING"
+    trap '' HUP
+    SIGNAL=HUP run_waiting 1 create --uid 0 --function VPN
+    trap - HUP
+    [ "$status" -eq 0 ]
+    [ "$(sql "SELECT tid FROM token")" = "$output" ]
 }
 
 @test "a refusal that had to wait is a refusal" {
@@ -380,23 +389,35 @@ until_sql()
     done
 }
 
-@test "what a call writes back is updated again" {
-    local id change
-    for change in "--remove-allow Api:put|webapi_allow = '{\"Api\":{\"method\":[\"get\"]}}'" "--uses 2|count = 2" \
-        "--bind-sid new|bind_sid = 'new'" "--unlimited|count = -1" "--extra {\"n\":1}|extra = '{\"n\":1}'"; do
-        id=$(a_token --allow Api:get,put --uses 9 --extra '{"n":NaN}') # which programs can save
+@test "what a call writes back is updated again, and what it spends is told" {
+    local again="the token was written back as it had been 1 time, by calls that do not take the lock, and was updated again"
+    local left="left: calls have spent some meanwhile, or written back an old number"
+    local gone="the token is gone: a call has spent its last use meanwhile, or deleted it"
+    local writes="UPDATE read SET count = max(count - 1, -1); REPLACE INTO token SELECT * FROM read"
+    local uses change set call then sentence
+    while IFS='|' read -r uses change set call then sentence; do
+        # shellcheck disable=SC2086 # several arguments
+        a_token --allow Api:get,put $uses >"$DIR/id"
         calling
         # shellcheck disable=SC2086
-        "$TOOL" update "$id" ${change%%|*} >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
-        until_sql 1 "SELECT count(*) FROM token WHERE ${change#*|}"
-        echo "UPDATE read SET count = count - 1; REPLACE INTO token SELECT * FROM read;" >&7
+        "$TOOL" update - $change <"$DIR/id" >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
+        until_sql 1 "SELECT count(*) FROM token WHERE $set"
+        echo "$call;" >&7
         unlock
         wait $!
         [ "$(cat "$DIR/out")" = "1 token updated" ]
-        diff "$DIR/err" - <<< "vemo-access-token: the token was written back as it had been 1 time, by calls that do not take the lock, and was updated again"
-        [ "$(sql "SELECT count(*) FROM token WHERE ${change#*|}")" -eq 1 ]
+        diff "$DIR/err" - <<<"vemo-access-token: $sentence"
+        [ "$(sql "SELECT group_concat(count) FROM token WHERE $set")" = "$then" ]
         sql "DELETE FROM token"
-    done
+    done <<TABLE
+--uses 9|--remove-allow Api:put|webapi_allow = '{"Api":{"method":["get"]}}'|$writes|8|$again
+--uses 9 --extra {"n":NaN}|--extra {"n":1}|extra = '{"n":1}'|$writes|8|$again
+--uses 9|--uses 2|count <= 2|$writes|2|$again
+--uses 9|--unlimited|count = -1|$writes|-1|$again
+--unlimited|--uses 1|count = 1|$writes|1|$again
+--uses 9|--uses 2|count <= 2|UPDATE token SET count = 0|0|0 uses $left
+--uses 9|--uses 2|count <= 2|DELETE FROM token||$gone
+TABLE
 }
 
 @test "unlimited uses that a program writes meanwhile are told from none, whatever its number for them" {
@@ -509,9 +530,13 @@ import $DIR/other
 tune
 TABLE
     until_sql 3 "SELECT group_concat(count) FROM token"
+    local statuses=
     for i in "${pids[@]}"; do
-        wait "$i" || true
+        status=0
+        wait "$i" || status=$?
+        statuses+=$status
     done
+    [ "$statuses" = 004444444 ]
     pkill -P "$locker"
     kill "$locker" 2>/dev/null || true
     wait "$locker" || true
@@ -549,5 +574,6 @@ $open" ]
     [ "$status" -eq 4 ]
     [ "$(sort -u "$DIR/log")" = free ]
     run_tool revoke -v token---
-    [ "$(grep -c "run sql failed" <<<"$stderr")" -ge 1 ]
+    [[ $stderr == *"run sql failed"* ]]
+    [ "$(wc -l <"$DIR/log")" -eq "$(grep -c '\.cpp:' <<<"$stderr")" ]
 }

@@ -246,6 +246,11 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
     session=${session//$'\a'/\\x07}
     [ "$(below SESSION)" = "$session" ]
     [ "$(below ALLOWS)" = "Api$allow" ]
+    # A terminal that does not know its width is taken for one of 80 columns.
+    on_terminal --columns 80 -- list
+    local known=$output
+    on_terminal --columns 0 -- list
+    expect 0 "$known"
     on_terminal --columns 60 -- show "$id"
     [ "$status" -eq 0 ]
     [ "$(awk 'length > 60' <<<"$output")" = "" ]

@@ -177,16 +177,23 @@ awkward_rows()
 @test "an export never takes the place of the database, of what belongs to it, or of the lock" {
     a_row A
     ln "$DB" "$DIR/linked"
-    touch "$DB-wal"
+    touch "$DB-wal" "$DB-backup"
     cp "$DB" "$DIR/before"
     local file
-    for file in "$REAL_DB" "$DB" "$DB-journal" "$DB-wal" "$DB-shm" "$DIR/linked" "$VEMO_REDIRECT_DIR.lock"; do
+    for file in "$REAL_DB" "$DB" "$DB-journal" "$DB-wal" "$DB-shm" "$DB-backup" "$DIR/linked" \
+        "$VEMO_REDIRECT_DIR.lock"; do
         run_tool export "$file"
         expect 2 "" "vemo-access-token: $file belongs to the database; choose another name"
     done
     cmp "$DB" "$DIR/before"
     [ "$(ls "$VEMO_REDIRECT_DIR")" = "${DB##*/}
+${DB##*/}-backup
 ${DB##*/}-wal" ]
+    # Elsewhere the names are anybody's.
+    for file in "$DIR/${DB##*/}" "$DIR/vemo-access-token.lock"; do
+        run_tool export "$file"
+        expect 0 "" "vemo-access-token: 1 token exported"
+    done
 }
 
 @test "what others linked into a directory of theirs is not imported" {
@@ -216,11 +223,20 @@ ${DB##*/}-wal" ]
 @test "an export leaves alone what is not its own beside it, and removes what one has left behind" {
     a_row A
     touch "$DIR/file"
-    install -m 0644 /dev/null "$DIR/file.part"
+    local in_the_way="vemo-access-token: $DIR/file.part is in the way: another export is writing it, or it is none's"
+    install -m 0601 /dev/null "$DIR/file.part"
     run_tool export "$DIR/file"
-    expect 4 "" "vemo-access-token: $DIR/file.part is in the way: another export is writing it, or it is none's"
+    expect 4 "" "$in_the_way"
     chmod 0600 "$DIR/file.part"
-    flock "$DIR/file.part" "$TOOL" export "$DIR/file" && return 1
+    if [ "$(id -u)" -eq 0 ]; then
+        chown 1 "$DIR/file.part"
+        run_tool export "$DIR/file"
+        expect 4 "" "$in_the_way"
+        chown 0 "$DIR/file.part"
+    fi
+    run flock "$DIR/file.part" "$TOOL" export "$DIR/file"
+    [ "$status" -eq 4 ]
+    [ "$output" = "$in_the_way" ]
     [ ! -s "$DIR/file" ]
     run_tool export "$DIR/file"
     [ "$status" -eq 0 ]
