@@ -145,9 +145,7 @@ NewFile::NewFile(const std::string& strPath)
 NewFile::~NewFile()
 {
     removeUnfinished();
-    if (m_pStream) {
-        fclose(m_pStream);
-    }
+    fclose(m_pStream);
 }
 
 // Fails where no file may be put.

@@ -46,7 +46,7 @@ tool::Descriptor openBeside(const std::string& strSuffix)
     return tool::openRegular(directory, tool::databaseName() + strSuffix);
 }
 
-// Of a file that is not open there are none.
+// None of a file that is not open, or in front of its beginning.
 std::string bytesAt(const tool::Descriptor& file, off_t nOffset, size_t cbWanted)
 {
     std::string strBytes(cbWanted, '\0');
@@ -91,9 +91,7 @@ std::string lastBytes(const std::string& strSuffix, size_t cbWanted)
 {
     const Descriptor file = openBeside(strSuffix);
     const off_t cbFile = file.isOpen() ? statusOf(file).st_size : 0;
-    return cbFile < static_cast<off_t>(cbWanted)
-               ? ""
-               : bytesAt(file, cbFile - static_cast<off_t>(cbWanted), cbWanted);
+    return bytesAt(file, cbFile - static_cast<off_t>(cbWanted), cbWanted);
 }
 
 void requireDatabase(bool blCreate)

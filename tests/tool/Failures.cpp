@@ -1,9 +1,9 @@
 // For tests of what the tool says when the system fails: with "file" or "directory" in VEMO_TEST_SYNC, none
-// of these can be synced; with an errno in VEMO_TEST_LOOKUP, each look-up of a user ends with it and finds
-// nobody, with ERANGE as long as its buffer has less than 4 KiB; with one in VEMO_TEST_PROC, /proc cannot be
-// listed; with a name in VEMO_TEST_VFS, SQLite works on files in the way of that name. And of what nobody sees:
-// texts that are wiped from memory go into the file that VEMO_TEST_WIPED names. For each log line, the file that
-// VEMO_TEST_SYSLOG names gets "held" or "free": what the lock is then.
+// of these can be synced, with a path that one; with an errno in VEMO_TEST_LOOKUP, each look-up of a user
+// ends with it and finds nobody, with ERANGE as long as its buffer has less than 4 KiB; with one in VEMO_TEST_PROC,
+// /proc cannot be listed; with a name in VEMO_TEST_VFS, SQLite works on files in the way of that name. And of what
+// nobody sees: texts that are wiped from memory go into the file that VEMO_TEST_WIPED names. For each log line, the
+// file that VEMO_TEST_SYSLOG names gets its priority, and "held" or "free": what the lock is then.
 
 #include <dirent.h>
 #include <dlfcn.h>
@@ -37,8 +37,10 @@ int sync(const char* szFunction, int nFile)
 {
     const char* szKind = getenv("VEMO_TEST_SYNC");
     struct stat status = {};
+    struct stat named = {};
     if (szKind && 0 == fstat(nFile, &status) &&
-        0 == strcmp(szKind, S_ISDIR(status.st_mode) ? "directory" : "file")) {
+        (0 == strcmp(szKind, S_ISDIR(status.st_mode) ? "directory" : "file") ||
+         (0 == stat(szKind, &named) && named.st_ino == status.st_ino))) {
         errno = EIO;
         return -1;
     }
@@ -65,7 +67,7 @@ void writeLine(int nPriority, const char* szFormat, va_list args)
         return;
     }
     const int nLock = open(CallLock::FILE_OF_ALL, O_RDWR | O_CLOEXEC);
-    fputs(0 == flock(nLock, LOCK_EX | LOCK_NB) ? "free\n" : "held\n", pFile);
+    fprintf(pFile, "%d %s\n", nPriority, 0 == flock(nLock, LOCK_EX | LOCK_NB) ? "free" : "held");
     close(nLock);
     fclose(pFile);
 }

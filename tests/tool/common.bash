@@ -7,6 +7,7 @@
 #                           back. Its fields are those of ROW, which a file can set otherwise.
 #   state                   what there is of the private directory, to the byte
 #   whole                   the lines of standard input as a whole export: with the end behind them
+#   in_namespace COMMANDS   the real path, where there is nothing else
 #   run_tool ARGUMENTS...   runs it: $status, $output (standard output), $lines (of it, but for empty ones), $stderr
 
 bats_require_minimum_version 1.5.0
@@ -92,6 +93,19 @@ refuses()
         expect 2 "" "vemo-access-token: $sentence"
     done
     [ "$(state)" = "$before" ]
+}
+
+# in_namespace COMMANDS ARGUMENTS...: runs them as root of a namespace, where a layer in memory lies over /usr
+in_namespace()
+{
+    local overlay='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
+        mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr'
+    [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
+    mkdir "$DIR/layer"
+    unshare --user --map-root-user --mount bash -c "$overlay" "$DIR/layer" 2>/dev/null ||
+        skip "no namespace with an overlay here"
+    run --separate-stderr unshare --user --map-root-user --mount bash -c "unset VEMO_REDIRECT_DIR; $overlay; $1" \
+        "$DIR/layer" "${@:2}"
 }
 
 # expect STATUS OUTPUT [STDERR]: the result of run_tool, exactly

@@ -178,10 +178,12 @@ awkward_rows()
     a_row A
     ln "$DB" "$DIR/linked"
     touch "$DB-wal" "$DB-backup"
+    ln "$DB-wal" "$DIR/linked-wal"
+    ln "$VEMO_REDIRECT_DIR.lock" "$DIR/linked-lock"
     cp "$DB" "$DIR/before"
     local file
-    for file in "$REAL_DB" "$DB" "$DB-journal" "$DB-wal" "$DB-shm" "$DB-backup" "$DIR/linked" \
-        "$VEMO_REDIRECT_DIR.lock"; do
+    for file in "$REAL_DB" "$DB" "$DB-journal" "$DB-wal" "$DB-shm" "$DB-backup" "$DIR/linked" "$DIR/linked-wal" \
+        "$DIR/linked-lock" "$VEMO_REDIRECT_DIR.lock"; do
         run_tool export "$file"
         expect 2 "" "vemo-access-token: $file belongs to the database; choose another name"
     done
@@ -242,6 +244,14 @@ ${DB##*/}-wal" ]
     [ "$status" -eq 0 ]
     [ -s "$DIR/file" ]
     [ ! -e "$DIR/file.part" ]
+}
+
+@test "a file whose name is not on the disk is no success" {
+    a_row A
+    mkdir "$DIR/elsewhere"
+    VEMO_TEST_SYNC=$DIR/elsewhere run_tool export "$DIR/elsewhere/file"
+    expect 4 "" "vemo-access-token: $DIR/elsewhere/file: Input/output error; the file is there, but a power cut can undo that"
+    [ -s "$DIR/elsewhere/file" ]
 }
 
 @test "an empty name is no file" {
@@ -719,6 +729,8 @@ TABLE
     [ "$status" -eq 0 ]
     [[ $output == $'\rExporting ['*$'\rExporting '"$FULL_BAR"$'\n'"vemo-access-token: 250 tokens exported" ]]
     sql "DELETE FROM token"
+    on_terminal "$TOOL" export "$DIR/none"
+    [[ $output == *$'\rExporting '"$FULL_BAR"$'\n'"vemo-access-token: 0 tokens exported" ]]
     on_terminal "$TOOL" import "$DIR/file"
     [ "$status" -eq 0 ]
     [[ $output == $'\rImporting ['*$'\rImporting '"$FULL_BAR"$'\n'"250 tokens imported" ]]
