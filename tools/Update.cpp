@@ -62,7 +62,6 @@ void addAllowed(Json::Value& jAllow, const std::vector<tool::Allowance>& allowan
     for (const std::string& strApi : jAdded.getMemberNames()) {
         if (!jAllow.isMember(strApi)) {
             jAllow[strApi] = jAdded[strApi];
-            continue;
         }
         Json::Value& jMethods = methodsOf(jAllow, strApi);
         for (const Json::Value& jMethod : jAdded[strApi]["method"]) {

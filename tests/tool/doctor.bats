@@ -287,10 +287,13 @@ error: $REAL_DB cannot be written to: Read-only file system
 @test "directories above that others can change are left to the administrator" {
     # And nothing below is opened: neither is a table missed, nor made.
     in_namespace 'mkdir /usr/vemo && chmod 0777 /usr/vemo && "$1" init >/dev/null && sqlite3 "$2" "DROP TABLE token" &&
-        ! "$1" doctor --repair && mv /usr/vemo /usr/elsewhere && ln -s elsewhere /usr/vemo && "$1" doctor' "$TOOL" "$REAL_DB"
+        chmod 0755 "${2%/*}" && ! "$1" doctor --repair && mv /usr/vemo /usr/elsewhere && ln -s elsewhere /usr/vemo && "$1" doctor' "$TOOL" "$REAL_DB"
     expect 5 "warning: /usr/vemo belongs to uid 0 and has mode 0777
     meaning: others than root can replace the private directory below it
     remedy: chown root /usr/vemo && chmod go-w /usr/vemo
+error: $DIRECTORY has mode 0755
+    meaning: others than root can use it, and ids are credentials
+    remedy: chmod 0700 $DIRECTORY
 error: /usr/vemo is a symbolic link
     meaning: the tokens stand elsewhere, or nowhere
     remedy: find out who made it; move the directory to a directory of that name"
@@ -318,17 +321,22 @@ error: $DIRECTORY cannot be written to: Read-only file system
     expect 5 "error: $REAL_DB has mode 0750
     meaning: others than root can use it, and ids are credentials
     remedy: chmod 0700 $REAL_DB" "vemo-access-token: the repair did not help: $REAL_DB has mode 0750"
-    # No database is made where others can still put a journal beside it.
+    # Where others can still put a journal beside it, no database is made, and nobody knows whose the journal is.
     rm "$DB"
     chmod 0770 "$VEMO_REDIRECT_DIR"
+    install -m 0640 /dev/null "$DB-journal"
     LD_PRELOAD=$DIR/no-chmod.so run_tool doctor --repair
     expect 5 "error: $DIRECTORY has mode 0770
     meaning: others than root can use it, and ids are credentials
     remedy: chmod 0700 $DIRECTORY
+error: $REAL_DB-journal has mode 0640
+    meaning: others than root can use it, and ids are credentials
+    remedy: chmod 0700 $REAL_DB-journal
 error: there is no database $REAL_DB
     meaning: there are no tokens; the first call that needs it makes it
     remedy: vemo-access-token init" "vemo-access-token: the repair did not help: $DIRECTORY has mode 0770"
     [ ! -e "$DB" ]
+    rm "$DB-journal"
     chmod 0700 "$VEMO_REDIRECT_DIR"
     tool init >/dev/null
     install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
@@ -987,9 +995,13 @@ TABLE
     install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
     run flock "$VEMO_REDIRECT_DIR/backup.part" "$TOOL" doctor
     [ "$output" = "no findings" ]
+    touch "$VEMO_REDIRECT_DIR/x"
+    chmod 0640 "$DB"
     VEMO_TEST_SYNC=directory run_tool doctor --repair
     [ "$status" -eq 5 ]
-    [ "$stderr" = "vemo-access-token: cannot repair: $DIRECTORY: Input/output error; the change was made, but a power cut can undo it" ]
+    local undone="vemo-access-token: cannot repair: $DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
+    [ "$stderr" = "$undone
+$undone" ]
     install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
     expect_repair "$DIRECTORY/backup.part was left behind" "an export was cut off; the file can hold whole ids"
     [ ! -e "$VEMO_REDIRECT_DIR/backup.part" ]

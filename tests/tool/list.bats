@@ -346,16 +346,16 @@ END
 
 @test "texts come through exactly in JSON, and harmless in tables" {
     export LC_ALL=C.UTF-8
-    text=$'a\'b"c\\d\ne\tf\e[31m\xc2\x9bÄ漢\xff'
+    text=$'a\'b"c\\d\\x41\ne\tf\e[31m\xc2\x9bÄ漢\xff'
     tool init
     tool create --uid 0 --function "$text" --bind-sid "$text" --allow "$text:$text" >"$DIR/tid"
     # What is no UTF-8 stays as it is stored, for what reads it to decide.
-    json=$'a\'b\\"c\\\\d\\ne\\tf\\u001b[31m\\u009bÄ漢\xff'
+    json=$'a\'b\\"c\\\\d\\\\x41\\ne\\tf\\u001b[31m\\u009bÄ漢\xff'
     run_tool list -o jsonl
     [[ $output == "{\"bind_sid\":\"$json\","*",\"function\":\"$json\","*",\"webapi_allow\":{\"$json\":{\"method\":[\"$json\"]}}}" ]]
     run_tool list --field function
     expect 0 "$text"
-    shown='a'\''b"c\d\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff'
+    shown='a'\''b"c\d\x5cx41\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff'
     run_tool list --no-header
     [ "$status" -eq 0 ]
     [[ $output == *"  root  $shown  1  "*"  in 24 h  $shown  $shown:$shown" ||

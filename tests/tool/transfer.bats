@@ -626,7 +626,7 @@ TABLE
     tool init
     local line
     line=$(a_line A)
-    printf '%s\n' "${line/\{\}/$(printf '{"a":%.0s' {1..2000})1$(printf '}%.0s' {1..2000})}" >"$DIR/file"
+    printf '%s\n' "${line/\{\}/$(printf '{"a":%.0s' {1..1000})1$(printf '}%.0s' {1..1000})}" >"$DIR/file"
     run_tool import "$DIR/file"
     expect 2 "" "vemo-access-token: $DIR/file: line 1 is nested too deeply for JSON; nothing of this file was imported"
 }
