@@ -313,6 +313,10 @@ $OWN|1" ]
     [ "$stderr" = "" ]
     [ "$(sql "SELECT tid FROM token")" = "$output" ]
     [ "$(stat -c %a "$DB")" = 700 ]
+    # The way to one that is there may be a link.
+    ln -s session "$DIR/links"
+    VEMO_REDIRECT_DIR=$DIR/links run_tool create --uid 0 --function VPN
+    [ "$status" -eq 0 ]
 }
 
 @test "create makes no directory, and no table in another database" {

@@ -104,6 +104,12 @@ modes: as before" ]
     [ "$status" -eq 130 ]
     [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
     [ "$(tokens)" -eq 1 ]
+    # The same behind a bar, where the tool waits for the lock.
+    exec 9>>"$VEMO_REDIRECT_DIR.lock"
+    flock 9
+    on_terminal --answer "Tuning" $'\x03' -- tune 9>&-
+    [ "$status" -eq 130 ]
+    exec 9>&-
 }
 
 @test "the prompt does not get into the result, and ids from a pipe need none" {

@@ -198,6 +198,11 @@ ${DB##*/}-wal" ]
     done
 }
 
+@test "an export does not take the place of the lock while there is none, either" {
+    in_namespace 'mount -t tmpfs tmpfs /run && "$1" init >/dev/null && rm /run/* && "$1" export /run/vemo-access-token.lock' "$TOOL"
+    expect 2 "" "vemo-access-token: /run/vemo-access-token.lock belongs to the database; choose another name"
+}
+
 @test "what others linked into a directory of theirs is not imported" {
     chmod 0755 "$DIR" # whatever the umask
     mkdir -m 0777 "$DIR/theirs"
