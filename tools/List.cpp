@@ -88,7 +88,7 @@ int list(const ListOptions& options)
         return tool::EXIT_STATUS_DONE;
     }
     sort(jTokens, options.order.value_or(Order{"deadline", false}));
-    const size_t nLimit = static_cast<size_t>(options.nLimit.value_or(INT64_MAX));
+    const size_t nLimit = options.nLimit ? static_cast<size_t>(*options.nLimit) : nTokens;
     Json::Value jShown(Json::arrayValue);
     for (size_t i = 0; i < std::min(nTokens, nLimit); ++i) {
         jShown.append(std::move(jTokens[i]));

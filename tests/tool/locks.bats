@@ -568,6 +568,12 @@ $open" ]
     expect 5 "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0644
     meaning: others can hold the lock for ever; programs that take it refuse this file
     remedy: remove it while no program that uses tokens runs"
+    if [ "$(id -u)" -eq 0 ]; then
+        chmod 0600 "$VEMO_REDIRECT_DIR.lock"
+        chown 1 "$VEMO_REDIRECT_DIR.lock"
+        run_tool doctor
+        [ "${lines[0]}" = "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 1 and has mode 0600" ]
+    fi
     rm "$VEMO_REDIRECT_DIR.lock"
     run_tool purge
     expect 0 "0 tokens purged"
