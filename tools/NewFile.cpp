@@ -195,8 +195,8 @@ void NewFile::write(const std::string& strText)
 
 void NewFile::complete()
 {
-    const bool blWritten = 0 == fflush(m_pStream) && !ferror(m_pStream) && 0 == fsync(fileno(m_pStream));
-    if (!blWritten || !giveName()) {
+    fflush(m_pStream);
+    if (ferror(m_pStream) || 0 != fsync(fileno(m_pStream)) || !giveName()) {
         fail();
     }
     if (!syncNames(m_place.directory)) {

@@ -95,7 +95,7 @@ std::string lockHolders(const std::string& strFile)
         std::istringstream words(strLine);
         std::string strNumber, strKind, strStrength, strType, strPid, strName;
         words >> strNumber >> strKind >> strStrength >> strType >> strPid >> strName; // who waits has "->"
-        if (strName == lockName(status) && isNumber(strPid) && strPid != "0") {
+        if (strName == lockName(status) && strPid != "0") {
             strPids.insert(strPid);
         }
     }

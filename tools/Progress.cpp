@@ -58,7 +58,6 @@ void Progress::draw() const
     fprintf(stderr, "\r%s [%s%s] %3d %%", m_strTitle.c_str(),
             std::string(static_cast<size_t>(nFilled), '#').c_str(),
             std::string(static_cast<size_t>(BAR_WIDTH - nFilled), ' ').c_str(), nPercent);
-    fflush(stderr);
 }
 
 } // namespace tool

@@ -160,13 +160,12 @@ int64_t parseDuration(const std::string& strText)
         int64_t nNumber = 0;
         const auto [szUnit, error] = std::from_chars(szRest, szEnd, nNumber);
         const int64_t nUnit = secondsOf(*szUnit); // at the end stands a NUL
-        if (std::errc() != error || nNumber < 0 || 0 == nUnit || nNumber > DURATION_MAX / nUnit) {
+        int64_t nPart = 0;
+        if (std::errc() != error || nNumber < 0 || 0 == nUnit ||
+            __builtin_mul_overflow(nNumber, nUnit, &nPart) || nPart > DURATION_MAX - nTotal) {
             failOnDuration(strText);
         }
-        nTotal += nNumber * nUnit;
-        if (nTotal > DURATION_MAX) {
-            failOnDuration(strText);
-        }
+        nTotal += nPart;
         szRest = szUnit + 1;
     }
     if (0 == nTotal) {

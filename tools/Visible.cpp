@@ -81,7 +81,7 @@ bool isVisible(wchar_t cWide)
         return ' ' <= cWide && cWide <= '~';
     }
     const auto holds = [cWide](const Range& range) { return range.cFirst <= cWide && cWide <= range.cLast; };
-    return INVALID != cWide && iswprint_l(static_cast<wint_t>(cWide), utf8()) &&
+    return iswprint_l(static_cast<wint_t>(cWide), utf8()) && // which INVALID is not
            std::none_of(std::begin(INVISIBLE), std::end(INVISIBLE), holds);
 }
 

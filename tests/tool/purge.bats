@@ -65,6 +65,11 @@ expect_left()
         VEMO_TEST_SYNC=directory run_tool $arguments
         expect 4 "" "vemo-access-token: ${REAL_DB%/*}: Input/output error; a power cut can undo what others changed last"
     done <<'TABLE'
+list
+show token---
+check token--- Api get
+stats
+export
 purge --dry-run
 purge
 revoke --dry-run token---

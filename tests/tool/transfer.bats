@@ -251,12 +251,16 @@ ${DB##*/}-wal" ]
     [ ! -e "$DIR/file.part" ]
 }
 
-@test "a file whose name is not on the disk is no success" {
+@test "a file that is not on the disk, or its name, is no success" {
     a_row A
     mkdir "$DIR/elsewhere"
     VEMO_TEST_SYNC=$DIR/elsewhere run_tool export "$DIR/elsewhere/file"
     expect 4 "" "vemo-access-token: $DIR/elsewhere/file: Input/output error; the file is there, but a power cut can undo that"
     [ -s "$DIR/elsewhere/file" ]
+    rm "$DIR/elsewhere/file"
+    VEMO_TEST_SYNC=file run_tool export "$DIR/elsewhere/file"
+    expect 4 "" "vemo-access-token: $DIR/elsewhere/file: Input/output error"
+    [ "$(ls "$DIR/elsewhere")" = "" ]
 }
 
 @test "an empty name is no file" {
