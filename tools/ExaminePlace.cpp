@@ -271,8 +271,7 @@ bool examineFile(bool blMake, Findings& findings)
 void examineVersion(Findings& findings)
 {
     const std::string strHeader = tool::firstBytes("", WRITE_VERSION + 1);
-    if (strHeader.size() <= WRITE_VERSION || 0 != strHeader.compare(0, 6, "SQLite") ||
-        2 >= static_cast<unsigned char>(strHeader[WRITE_VERSION])) {
+    if (0 != strHeader.compare(0, 6, "SQLite") || 2 >= static_cast<unsigned char>(strHeader[WRITE_VERSION])) {
         return;
     }
     findings.push_back(
@@ -289,7 +288,7 @@ bool examineForeignJournal(Findings& findings)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH "-wal";
     const std::string strHeader = tool::firstBytes("", READ_VERSION + 1);
-    if (strHeader.size() <= READ_VERSION || strHeader[READ_VERSION] != 1 || !tool::statusOf(strPath)) {
+    if (strHeader[READ_VERSION] != 1 || !tool::statusOf(strPath)) {
         return true;
     }
     findings.push_back({Finding::Severity::Warning,

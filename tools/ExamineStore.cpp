@@ -19,8 +19,7 @@ const time_t JOURNAL_AGE_MAX = 10; // seconds; a change takes far less
 // beginning wiped.
 bool isJournalFull()
 {
-    const std::string strStart = tool::firstBytes("-journal", 1);
-    return !strStart.empty() && strStart[0] != '\0';
+    return tool::firstBytes("-journal", 1)[0] != '\0';
 }
 
 // Whether no living program can be writing it any more.

@@ -20,8 +20,8 @@ const char* const JOURNAL_SUFFIXES[] = {"-journal", "-wal", "-shm"};
 // What lstat tells of a path; nothing when there is no such file. Throws Failure.
 std::optional<struct stat> statusOf(const std::string& strPath);
 
-// The first and the last bytes of the database, or of the journal with this suffix, as many as there are;
-// none where it cannot be read or is no regular file. Those of the database not while this process has it
+// The first and the last bytes of the database, or of the journal with this suffix; zeros where there are
+// none, it cannot be read or is no regular file. Those of the database not while this process has it
 // open: its locks would be lost.
 std::string firstBytes(const std::string& strSuffix, size_t cbWanted);
 std::string lastBytes(const std::string& strSuffix, size_t cbWanted);
