@@ -104,8 +104,7 @@ void requireDatabase(bool blCreate)
     if (ENOENT != errno) {
         failOn(VEMO_ATOKEN_DB_PATH);
     }
-    const auto linkStatus = statusOf(VEMO_ATOKEN_DB_PATH);
-    if (linkStatus && S_ISLNK(linkStatus->st_mode)) {
+    if (statusOf(VEMO_ATOKEN_DB_PATH)) {
         throw Failure(EXIT_STATUS_STORE,
                       VEMO_ATOKEN_DB_PATH " is a symbolic link to a file that is not there");
     }

@@ -961,6 +961,7 @@ TABLE
     expect_no_repair error "$REAL_DB-journal is one of several that belong together" \
         "the next program to open the database changes other files, too" \
         "find out who made it; remove it while no program runs"
+    : >"$DB-journal"
     ln "$DB-journal" "$DIR/second"
     expect_no_repair error "$REAL_DB-journal has several hard links" \
         "the next program to open the database changes other files, too" \

@@ -371,9 +371,12 @@ until_sql()
     local id
     id=$(a_token)
     a_token >/dev/null
-    local arguments
-    for arguments in "revoke $id" "revoke --uid 0 --yes"; do
+    local arguments tokens times
+    while IFS='|' read -r arguments tokens times; do
         sql "DELETE FROM token WHERE tid <> '$id'"
+        [[ $arguments != *--uid* ]] || sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 8)
+            INSERT INTO token SELECT i || tid, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra
+            FROM token, n"
         calling
         # shellcheck disable=SC2086 # several arguments
         "$TOOL" $arguments >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
@@ -382,11 +385,14 @@ until_sql()
               INSERT INTO token SELECT * FROM read UNION ALL SELECT * FROM new;" >&7
         unlock
         wait $!
-        [ "$(cat "$DIR/out")" = "1 token revoked" ]
-        diff "$DIR/err" - <<< "vemo-access-token: a token came back 1 time, by calls that do not take the lock, and was revoked again"
-        [ "$(sql "SELECT tid FROM token")" = "new$id" ]
+        [ "$(cat "$DIR/out")" = "$tokens revoked" ]
+        diff "$DIR/err" - <<< "vemo-access-token: a token came back $times, by calls that do not take the lock, and was revoked again"
+        [ "$(sql "SELECT DISTINCT substr(tid, 1, 3) FROM token")" = new ]
         tool create --uid 0 --function VPN --tid "$id" >/dev/null
-    done
+    done <<TABLE
+revoke $id|1 token|1 time
+revoke --uid 0 --yes|9 tokens|9 times
+TABLE
 }
 
 @test "what a call writes back is updated again, and what it spends is told" {
@@ -509,6 +515,8 @@ print(written)' "$DB"
     flock "$DIR/links.lock" sleep 60 3>&- &
     local locker=$!
     calling
+    sleep 60 6<"$DB" 3>&- 7>&- 8<&- &
+    local reader=$!
     "$TOOL" revoke "$first" >"$DIR/out1" 2>"$DIR/err1" 3>&- 7>&- 8<&- &
     pids+=($!)
     "$TOOL" update "$second" --uses 3 >"$DIR/out2" 2>"$DIR/err2" 3>&- 7>&- 8<&- &
@@ -538,10 +546,11 @@ TABLE
     done
     [ "$statuses" = 004444444 ]
     pkill -P "$locker"
-    kill "$locker" 2>/dev/null || true
-    wait "$locker" || true
+    kill "$locker" "$reader" 2>/dev/null || true
+    wait "$locker" "$reader" || true
     local open
-    open="vemo-access-token: sqlite3 (process $HOLDER) had the database open all the time: what it read before can still be written back; look again when it has ended"
+    open=$(printf '%s\n' "$HOLDER:sqlite3" "$reader:sleep" | LC_ALL=C sort | sed -E 's/(.*):(.*)/\2 (process \1)/')
+    open="vemo-access-token: ${open/$'\n'/, } had the database open all the time: what it read before can still be written back; look again when it has ended"
     unlock
     [ "$(cat "$DIR/out1" "$DIR/err1")" = "1 token revoked
 $open" ]

@@ -304,6 +304,7 @@ token--- --remove-allow A:m,|--remove-allow: "A:m," has an empty method: write A
 token--- --extra []|--extra: is no JSON object
 token--- --extra '{'|--extra: is no JSON: Column 2 Missing '}' or object member name
 token--- --extra @$DIR|--extra: $DIR: Is a directory
+token--- --extra @/proc/$$/mem|--extra: /proc/$$/mem: Input/output error
 token--- --extra @$DIR/missing|--extra: $DIR/missing: No such file or directory
 token--- --count|unknown option "--count"
 END

@@ -606,6 +606,10 @@ TABLE
     in_wrong_places "$(printf 'Own+id-%08d/' {1..8})=="
     id=$(a_token)
     in_wrong_places "$id"
+    run_tool "${ZEROS}0000000" # one byte less than an id has
+    expect 2 "" "vemo-access-token: unknown command \"${ZEROS}0000000\""
+    run_tool "${ZEROS}00000000"
+    expect 2 "" "vemo-access-token: unknown command \"00000000...\""
     run_tool export "$DIR/$id/x"
     expect 4 "" "vemo-access-token: $DIR/${id:0:8}.../x: Not a directory"
     run_tool export "$DIR/x/$id"
