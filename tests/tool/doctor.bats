@@ -345,6 +345,36 @@ error: there is no database $REAL_DB
     [ "$stderr" = "vemo-access-token: cannot repair: backup.part: Operation not permitted" ]
 }
 
+@test "what others change in the middle of a repair is not followed" {
+    a_row aaaaaaaa
+    echo '#include <stdlib.h>
+        #include <sys/syscall.h>
+        #include <unistd.h>
+        int fchmod(int file, int mode)
+        {
+            const char* between = getenv("VEMO_TEST_BETWEEN");
+            unsetenv("VEMO_TEST_BETWEEN");
+            return between && system(between) ? -1 : syscall(SYS_fchmod, file, mode);
+        }' | cc -shared -fPIC -w -x c -o "$DIR/between.so" - || skip "no C compiler"
+    local between reason
+    while IFS='|' read -r between reason; do
+        rm -rf "$DIR/"s*
+        mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+        tool init >/dev/null
+        chmod 0640 "$DB"
+        install -m 0640 /dev/null "$DB-journal" # which is repaired first
+        VEMO_TEST_BETWEEN="cd $DIR && $between" LD_PRELOAD=$DIR/between.so run_tool doctor --repair
+        [ "$status" -eq 5 ]
+        [ "$stderr" = "vemo-access-token: cannot repair: $reason" ]
+        [ "$(stat -L -c %a "$DB")" = 640 ]
+    done <<TABLE
+ln $DB second|$REAL_DB has several hard links
+mv $DB second && ln -s $DIR/second $DB|$REAL_DB is a symbolic link; name the place that it leads to
+chmod 0750 session|$DIRECTORY is not root's alone
+mv session second && ln -s second session|$DIRECTORY is a symbolic link; name the place that it leads to
+TABLE
+}
+
 @test "a place that cannot be looked at is a finding" {
     ln -s session "$VEMO_REDIRECT_DIR"
     run_tool doctor

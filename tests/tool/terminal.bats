@@ -104,10 +104,10 @@ modes: as before" ]
     [ "$status" -eq 130 ]
     [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
     [ "$(tokens)" -eq 1 ]
-    # The same behind a bar, where the tool waits for the lock.
+    # The same behind a bar, which goes on while the tool waits for the lock.
     exec 9>>"$VEMO_REDIRECT_DIR.lock"
     flock 9
-    on_terminal --answer "Tuning" $'\x03' -- tune 9>&-
+    on_terminal --answer "Tuning [" "" --answer "Tuning [" "" --answer "Tuning [" $'\x03' -- tune 9>&-
     [ "$status" -eq 130 ]
     exec 9>&-
 }
