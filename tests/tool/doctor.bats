@@ -1030,6 +1030,8 @@ TABLE
     run flock "$VEMO_REDIRECT_DIR/backup.part" "$TOOL" doctor
     [ "$output" = "no findings" ]
     touch "$VEMO_REDIRECT_DIR/x"
+    expect_finding warning "$DIRECTORY/backup.part was left behind" \
+        "an export was cut off; the file can hold whole ids" "remove it"
     chmod 0640 "$DB"
     VEMO_TEST_SYNC=directory run_tool doctor --repair
     [ "$status" -eq 5 ]

@@ -570,11 +570,11 @@ $open" ]
 
 @test "a lock that others could hold is refused, and found" {
     a_token >/dev/null
-    chmod 0644 "$VEMO_REDIRECT_DIR.lock"
+    chmod 0601 "$VEMO_REDIRECT_DIR.lock"
     run_tool purge
     expect 4 "" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
     run_tool doctor
-    expect 5 "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0644
+    expect 5 "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0601
     meaning: others can hold the lock for ever; programs that take it refuse this file
     remedy: remove it while no program that uses tokens runs"
     if [ "$(id -u)" -eq 0 ]; then
