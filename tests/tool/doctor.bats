@@ -70,7 +70,7 @@ never_hang()
 @test "a sound store gives no findings, and stays as it is" {
     a_token --allow Example.File:get --extra '{"a":Infinity}'
     deadline="strftime('%s', 'now') - 3000" a_row expired-just-now
-    count=-1 a_row unlimited
+    count=-1 uid=4294967294 a_row unlimited
     cp "$DB" "$DIR/before"
     run_tool doctor
     expect 0 "no findings"
