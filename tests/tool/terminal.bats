@@ -295,7 +295,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
 
 # Bytes that are no UTF-8, control characters, and characters that order the text anew or cannot be seen; of the
 # last, of the first bytes of Û, too, a terminal with a character set of 8 bits takes one for ESC [.
-EVIL=$'x\e[31my\a\x7f\xc2\x9b2Jz\x9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\U000e0041\ufe0fÛ'
+EVIL=$'x\e[31my\a\x7f\xc2\x9b2Jz\x9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\U000e0041\ufe0fÛ\U00010000'
 
 # in_all_forms [LOCALE]: prints on a terminal what the tool says of tokens that hold $EVIL, in each form
 in_all_forms()
@@ -352,6 +352,7 @@ TABLE
         [[ $output == *'x\u001b[31my\u0007\u007f\u009b2Jz\udc9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\udb40\udc41\ufe0f'* ]]
         [[ $output == *"run sql failed"* ]]
         [ "$locale" = C.UTF-8 ] || [ "$(LC_ALL=C tr -d '\n -~' <<<"$output")" = "" ]
+        [ "$locale" = C.UTF-8 ] || [[ $output == *'\udb40\udc41\ufe0f\u00db\ud800\udc00'* ]]
     done
     [[ $output == *Û* ]]
     # Elsewhere a value comes out as it is.
