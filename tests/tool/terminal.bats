@@ -243,7 +243,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
     session=$(printf 'session-\a%.0s' {1..8})
     allow=Example.$(printf 'Long%.0s' {1..20}):get,list,$(printf 'put%.0s' {1..20})
     tool init
-    id=$(tool create --uid 0 --function "$function" --bind-sid "$session" --allow "$allow" --allow Api)
+    id=$(tool create --uid 0 --ttl 9d12h --function "$function" --bind-sid "$session" --allow "$allow" --allow Api)
     on_terminal --columns 60 -- list --show-ids
     [ "$status" -eq 0 ]
     [ "${#lines[@]}" -gt 10 ]
