@@ -8,6 +8,7 @@ else()
 endif()
 set(values "ON, OFF, or AUTO: where all that it needs is installed")
 set(VEMO_ATOKEN_TOOL ${default} CACHE STRING "Build the administrator's tool: ${values}")
+set(VEMO_ATOKEN_GATE ${default} CACHE STRING "Build the gate: ${values}")
 set(BUILD_TESTING ${default} CACHE STRING "Build the tests: ${values}")
 set(VEMO_ATOKEN_BENCH OFF CACHE STRING "Build the benchmarks: ${values}")
 
@@ -41,6 +42,17 @@ if(VEMO_ATOKEN_TOOL)
   endif()
   vemo_part_needs(VEMO_ATOKEN_TOOL "the tool" PKG_CONFIG_FOUND pkg-config smartcols_FOUND libsmartcols-dev
                                               libbsd_FOUND libbsd-dev libmd_FOUND libmd-dev)
+endif()
+
+if(VEMO_ATOKEN_GATE)
+  find_package(PkgConfig QUIET)
+  if(PKG_CONFIG_FOUND)
+    pkg_check_modules(libevent_core QUIET IMPORTED_TARGET libevent_core)
+    pkg_check_modules(libseccomp QUIET IMPORTED_TARGET libseccomp)
+  endif()
+  find_package(Threads REQUIRED)
+  vemo_part_needs(VEMO_ATOKEN_GATE "the gate" PKG_CONFIG_FOUND pkg-config libevent_core_FOUND libevent-dev
+                                              libseccomp_FOUND libseccomp-dev)
 endif()
 
 # The tests follow calls into the stand-ins; the platform's own libraries are not ours to test.

@@ -173,7 +173,7 @@ Check backlog()
             "expired for more than an hour: ",
             "no program has called since, or its purges fail",
             "vemo-access-token purge",
-            std::string("DELETE FROM token WHERE deadline > 0 AND ") + tool::SQL_EXPIRED};
+            std::string("DELETE FROM token WHERE deadline > 0 AND ") + grant::SQL_EXPIRED};
 }
 
 void execute(const std::string& strSql)

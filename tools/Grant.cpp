@@ -2,7 +2,6 @@
 
 #include <memory>
 
-#include "AccessTokenUtil.h"
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
@@ -12,8 +11,6 @@
 
 namespace {
 
-const char* const EXPIRED = "expired";
-
 struct Options {
     std::string strTid;
     std::string strApi;
@@ -22,43 +19,33 @@ struct Options {
     tool::Layout layout;
 };
 
-// 1, 0 or -1, as the library has it; -1 too where it meets what cannot be a method.
-int permission(Json::Value jToken, const Options& options)
+const char* reasonOf(grant::Verdict verdict)
 {
-    try {
-        return VEMO_ACCESS_TOKEN::checkPermission(jToken, options.strApi.c_str(), options.strMethod.c_str());
-    } catch (const Json::Exception&) {
-        return -1;
+    switch (verdict) {
+    case grant::Verdict::Granted: break;
+    case grant::Verdict::Unknown: return "unknown token";
+    case grant::Verdict::Expired: return "expired";
+    case grant::Verdict::ApiNotListed: return "API not listed";
+    case grant::Verdict::MethodNotListed: return "method not listed";
+    case grant::Verdict::Malformed: return "malformed token";
     }
+    return "";
 }
 
-// Why the token of an id, if there is one, does not allow the call; "" when it does.
-std::string refusal(tool::Store& store, const std::optional<Json::Value>& jFound, const Options& options)
+grant::Verdict judge(std::optional<grant::Token>& token, const Options& options)
 {
-    if (!jFound) {
-        return "unknown token";
-    }
-    Json::Value jToken = *jFound;
-    if (store.isExpired(jToken["tid"].asString())) {
-        return EXPIRED;
-    }
-    const int nPermission = permission(jToken, options);
-    const Json::Value& jAllow = jToken["webapi_allow"];
-    if (0 == nPermission) {
-        return "method not listed";
-    }
-    if (0 > nPermission) {
-        return jAllow.isObject() && !jAllow.isMember(options.strApi) ? "API not listed" : "malformed token";
-    }
-    // What is saved with its uses lowered must be sound in all its fields.
-    const bool blSaved = jToken["count"].asInt64() > 1;
-    return blSaved && 0 > VEMO_ACCESS_TOKEN::checkJsonType(jToken) ? "malformed token" : "";
+    return token ? grant::judge(*token, options.strApi, options.strMethod) : grant::Verdict::Unknown;
 }
 
 std::string refusalNow(const std::string& strTid, const Options& options)
 {
     tool::Store store(tool::Store::Access::Read);
-    return refusal(store, store.findByPrefix(strTid), options);
+    const std::optional<Json::Value> jFound = store.findByPrefix(strTid);
+    std::optional<grant::Token> token;
+    if (jFound) {
+        token = store.token((*jFound)["tid"].asString());
+    }
+    return reasonOf(judge(token, options));
 }
 
 int check(const Options& options)
@@ -76,50 +63,36 @@ int check(const Options& options)
     return strReason.empty() ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_REFUSED;
 }
 
-// Spends one use, by the rules of the library's grant. In one transaction with the look-up, so that no
-// other grant spends the same use.
-void spend(tool::Store& store, const Json::Value& jToken)
-{
-    const Json::Int64 nCount = jToken["count"].asInt64();
-    if (nCount > 1) {
-        Json::Value jChange;
-        jChange["count"] = nCount - 1;
-        store.update(jToken["tid"].asString(), jChange);
-    } else if (nCount >= 0) {
-        store.removeTid(jToken["tid"].asString());
-    }
-}
-
 // The owner's name, when the use has been spent.
-std::string owner(const Json::Value& jToken)
+std::string owner(int64_t nUid)
 {
     try {
-        return tool::userName(jToken["uid"].asInt64());
+        return tool::userName(nUid);
     } catch (const tool::Failure& failure) {
         throw tool::Failure(failure.status(), "granted, but " + failure.fact());
     }
 }
 
-int grant(const Options& options)
+// In one transaction with the look-up, so that no other grant spends the same use.
+int grantCall(const Options& options)
 {
     const std::string strTid = tool::readTid("TID", options.strTid);
     tool::Store store(tool::Store::Access::Write);
-    const bool blThere = store.find(strTid).has_value();
+    std::optional<grant::Token> token = store.token(strTid);
+    const grant::Verdict verdict = judge(token, options);
     store.purge();
-    const std::optional<Json::Value> jToken = store.find(strTid);
-    const std::string strReason = blThere && !jToken ? EXPIRED : refusal(store, jToken, options);
-    if (strReason.empty()) {
-        spend(store, *jToken);
+    if (grant::Verdict::Granted == verdict) {
+        store.spend(*token);
     }
     store.commit();
-    if (!strReason.empty()) {
-        throw tool::Failure(tool::EXIT_STATUS_REFUSED, "refused: " + strReason);
+    if (grant::Verdict::Granted != verdict) {
+        throw tool::Failure(tool::EXIT_STATUS_REFUSED, std::string("refused: ") + reasonOf(verdict));
     }
     if (!options.blPrintUser) {
         tool::print("granted\n");
         return tool::EXIT_STATUS_DONE;
     }
-    tool::printLine(owner(*jToken));
+    tool::printLine(owner(token->nUid));
     return tool::EXIT_STATUS_DONE;
 }
 
@@ -149,7 +122,7 @@ void addGrant(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
     Command& command = commands.add("grant", "grant a call, which spends one use of the token",
-                                    [pOptions] { return grant(*pOptions); });
+                                    [pOptions] { return grantCall(*pOptions); });
     addCall(command, *pOptions);
     command.flag("--print-user", pOptions->blPrintUser, "print the owner's name");
 }

@@ -191,7 +191,7 @@ int revoke(const RevokeOptions& options)
 uint64_t expired()
 {
     tool::Store store(tool::Store::Access::Read);
-    return store.number(std::string("SELECT count(*) FROM token WHERE ") + tool::SQL_EXPIRED);
+    return store.number(std::string("SELECT count(*) FROM token WHERE ") + grant::SQL_EXPIRED);
 }
 
 uint64_t removeExpired()

@@ -54,7 +54,7 @@ Statistics collect()
     const std::string strCount = "SELECT count(*) FROM token";
     Statistics statistics = {};
     statistics.nTokens = store.number(strCount);
-    statistics.nExpired = store.number(strCount + " WHERE " + tool::SQL_EXPIRED);
+    statistics.nExpired = store.number(strCount + " WHERE " + grant::SQL_EXPIRED);
     statistics.nUnlimited = store.number(strCount + " WHERE count < 0");
     for (const auto& row :
          store.query("SELECT function, count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {

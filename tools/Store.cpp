@@ -100,8 +100,6 @@ const std::chrono::seconds LOCK_WAIT(5);
 
 namespace tool {
 
-const char* const SQL_EXPIRED = "deadline < strftime('%s', 'now')";
-
 std::string sqlText(const char* szFormat, ...)
 {
     va_list args;
@@ -281,15 +279,35 @@ std::optional<Json::Value> Store::findByPrefix(const std::string& strTid)
 std::set<std::string> Store::expiredTids()
 {
     std::set<std::string> strTids;
-    for (const auto& row : query(std::string("SELECT tid FROM token WHERE ") + SQL_EXPIRED)) {
+    for (const auto& row : query(std::string("SELECT tid FROM token WHERE ") + grant::SQL_EXPIRED)) {
         strTids.insert(row[0].value_or(""));
     }
     return strTids;
 }
 
-bool Store::isExpired(const std::string& strTid)
+template <typename Use>
+auto Store::withTokens(Use use)
 {
-    return 0 != number("SELECT count(*) FROM token WHERE " + equation("tid", strTid) + " AND " + SQL_EXPIRED);
+    try {
+        grant::Tokens tokens(m_db.m_pDb);
+        return use(tokens);
+    } catch (const grant::Error& error) {
+        fail(error.what());
+    }
+}
+
+std::optional<grant::Token> Store::token(const std::string& strTid)
+{
+    const auto token = withTokens([&strTid](grant::Tokens& tokens) { return tokens.find(strTid); });
+    if (token && !token->blReadable) {
+        fail("query aborted");
+    }
+    return token;
+}
+
+void Store::spend(const grant::Token& token)
+{
+    withTokens([&token](grant::Tokens& tokens) { tokens.spend(token); });
 }
 
 void Store::create(const Json::Value& jToken)

@@ -20,6 +20,7 @@
 
 #include "CallLock.h"
 #include "Masking.h"
+#include "grant/Tokens.h"
 #include "internal/AccessTokenDbApi.h"
 
 namespace tool {
@@ -33,10 +34,6 @@ std::string sqlText(const char* szFormat, ...);
 
 // The fields of a token, in their order.
 std::vector<std::string> fieldNames();
-
-// Those tokens whose deadline has passed by now, as the purge sees it; who decides otherwise contradicts
-// the library where a deadline is no number.
-extern const char* const SQL_EXPIRED;
 
 class Store {
 public:
@@ -71,7 +68,10 @@ public:
 
     // The ids of those tokens that the purge would delete.
     std::set<std::string> expiredTids();
-    bool isExpired(const std::string& strTid);
+
+    // The token of an id as a grant sees it; and the use that a grant spends.
+    std::optional<grant::Token> token(const std::string& strTid);
+    void spend(const grant::Token& token);
 
     // Writes a new token.
     void create(const Json::Value& jToken);
@@ -131,6 +131,8 @@ private:
     void require(int nResult);
     bool holdsNull();
     std::string equation(std::string strName, Json::Value jValue);
+    template <typename Use>
+    auto withTokens(Use use);
 
     const Access m_access;
     std::optional<CallLock> m_lock;

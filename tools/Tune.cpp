@@ -55,7 +55,7 @@ Figures measured(Store& store, bool blWrite)
 {
     Figures lines = {
         {"look for expired tokens, as every call does",
-         timeOf(store, std::string("SELECT tid FROM token WHERE ") + tool::SQL_EXPIRED)},
+         timeOf(store, std::string("SELECT tid FROM token WHERE ") + grant::SQL_EXPIRED)},
         {"look for a session's tokens", timeOf(store, "SELECT tid FROM token WHERE bind_sid = '\x01'")},
         {"look for a purpose's tokens", timeOf(store, "SELECT tid FROM token WHERE function = '\x01'")},
         {"journal", store.text("PRAGMA journal_mode")}};

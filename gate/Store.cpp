@@ -1,0 +1,132 @@
+#include "Store.h"
+
+#include <sqlite3.h>
+#include <sys/stat.h>
+
+#include "AccessTokenDefine.h"
+#include "Clock.h"
+
+namespace {
+
+const int64_t PURGE_EACH = gate::SECOND;
+
+sqlite3* opened(AccessTokenDbApi& db)
+{
+    if (0 > db.initDb() || !db.m_pDb) {
+        throw grant::Error(SQLITE_CANTOPEN, "the database cannot be opened");
+    }
+    // A commit is on the disk when it returns: with a rollback journal, that takes the directory as well.
+    for (const char* szSql : {"PRAGMA synchronous = EXTRA", "PRAGMA temp_store = MEMORY"}) {
+        if (SQLITE_OK != sqlite3_exec(db.m_pDb, szSql, nullptr, nullptr, nullptr)) {
+            throw grant::Error(sqlite3_extended_errcode(db.m_pDb), sqlite3_errmsg(db.m_pDb));
+        }
+    }
+    return db.m_pDb;
+}
+
+// Whether a statement was done, and not refused because others hold the database.
+bool isDone(grant::Statement& statement)
+{
+    statement.reset();
+    try {
+        statement.step();
+    } catch (const grant::Error& error) {
+        statement.reset();
+        const int nCode = error.code() & 0xff;
+        if (SQLITE_BUSY != nCode && SQLITE_PROTOCOL != nCode) {
+            throw;
+        }
+        return false;
+    }
+    statement.reset();
+    return true;
+}
+
+} // namespace
+
+namespace gate {
+
+Store::Connection::Connection()
+    : pDb(opened(db)),
+      begin(pDb, "BEGIN IMMEDIATE"),
+      commit(pDb, "COMMIT"),
+      rollBack(pDb, "ROLLBACK"),
+      purge(pDb, grant::SQL_PURGE),
+      look(pDb, "SELECT 1 FROM token LIMIT 1"),
+      tokens(pDb),
+      nPurgedAt(now() - PURGE_EACH)
+{
+}
+
+bool Store::Connection::isOfTheFile() const
+{
+    int nMoved = 0;
+    return SQLITE_OK == sqlite3_file_control(pDb, nullptr, SQLITE_FCNTL_HAS_MOVED, &nMoved) && !nMoved;
+}
+
+void Store::open()
+{
+    if (m_connection && !m_connection->isOfTheFile()) {
+        m_connection.reset();
+    }
+    if (!m_connection) {
+        m_connection.emplace();
+    }
+}
+
+bool Store::begin()
+{
+    open();
+    return isDone(m_connection->begin);
+}
+
+uint64_t Store::purge()
+{
+    const int64_t nNow = now();
+    if (nNow - m_connection->nPurgedAt < PURGE_EACH) {
+        return 0;
+    }
+    m_connection->nPurgedAt = nNow;
+    m_connection->purge.reset();
+    m_connection->purge.step();
+    m_connection->purge.reset();
+    return static_cast<uint64_t>(sqlite3_changes64(m_connection->pDb));
+}
+
+bool Store::commit()
+{
+    return isDone(m_connection->commit);
+}
+
+void Store::rollBack() noexcept
+{
+    if (!m_connection || sqlite3_get_autocommit(m_connection->pDb)) {
+        return;
+    }
+    try {
+        m_connection->rollBack.step();
+        m_connection->rollBack.reset();
+    } catch (...) {
+        m_connection.reset(); // closing undoes it too
+    }
+}
+
+bool Store::canRead()
+{
+    open();
+    return isDone(m_connection->look);
+}
+
+uint64_t Store::size()
+{
+    uint64_t cbAll = 0;
+    for (const char* szPath : {VEMO_ATOKEN_DB_PATH, VEMO_ATOKEN_DB_PATH "-wal"}) {
+        struct stat status = {};
+        if (0 == stat(szPath, &status)) {
+            cbAll += static_cast<uint64_t>(status.st_size);
+        }
+    }
+    return cbAll;
+}
+
+} // namespace gate

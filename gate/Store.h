@@ -1,0 +1,67 @@
+// The connection to the token database that the gate holds.
+
+#ifndef GATE_STORE_H
+#define GATE_STORE_H
+
+#include <cstdint>
+#include <optional>
+
+#include "grant/Tokens.h"
+#include "internal/AccessTokenDbApi.h"
+
+namespace gate {
+
+// The connection is opened when it is needed, and anew after a failure, or when another file has taken the
+// place of the database. All members but rollBack throw grant::Error.
+class Store {
+public:
+    // Begins a transaction in which nobody else writes. Returns false when others hold the database now.
+    bool begin();
+
+    // The tokens, within a transaction.
+    grant::Tokens& tokens() { return m_connection->tokens; }
+
+    // Deletes the expired tokens, within a transaction, if that was not done a second ago or less. Returns
+    // how many.
+    uint64_t purge();
+
+    // Makes the transaction last, also when power is cut now. Returns false when others hold the database; it
+    // can be tried again.
+    bool commit();
+
+    // Undoes the transaction.
+    void rollBack() noexcept;
+
+    // Closes the connection.
+    void close() noexcept { m_connection.reset(); }
+
+    // Whether tokens can be read now. Without a transaction.
+    bool canRead();
+
+    // The size of the database, with its write-ahead journal.
+    static uint64_t size();
+
+private:
+    struct Connection {
+        Connection();
+        bool isOfTheFile() const;
+
+        AccessTokenDbApi db;
+        sqlite3* const pDb;
+        grant::Statement begin;
+        grant::Statement commit;
+        grant::Statement rollBack;
+        grant::Statement purge;
+        grant::Statement look;
+        grant::Tokens tokens;
+        int64_t nPurgedAt;
+    };
+
+    void open();
+
+    std::optional<Connection> m_connection;
+};
+
+} // namespace gate
+
+#endif

@@ -1,0 +1,109 @@
+#include "Call.h"
+
+#include "gate/Messages.h"
+
+namespace {
+
+const size_t ONCE_MAX = 128;
+
+int hexDigit(char c)
+{
+    if ('0' <= c && c <= '9') {
+        return c - '0';
+    }
+    const char cLower = static_cast<char>(c | 0x20);
+    return 'a' <= cLower && cLower <= 'f' ? cLower - 'a' + 10 : -1;
+}
+
+// The first part of a path, which is removed with the slash behind it. Returns false for one that has no
+// meaning here, or could have two.
+bool takePart(std::string_view& strPath, std::string& strPart)
+{
+    const size_t cbPart = std::min(strPath.find('/'), strPath.size());
+    for (size_t i = 0; i < cbPart; ++i) {
+        char c = strPath[i];
+        if ('%' == c) {
+            const int nHigh = i + 2 < cbPart ? hexDigit(strPath[i + 1]) : -1;
+            const int nLow = i + 2 < cbPart ? hexDigit(strPath[i + 2]) : -1;
+            if (0 > nHigh || 0 > nLow) {
+                return false;
+            }
+            c = static_cast<char>(16 * nHigh + nLow);
+            i += 2;
+        }
+        if ('\0' == c || '/' == c) {
+            return false;
+        }
+        strPart += c;
+    }
+    strPath.remove_prefix(std::min(cbPart + 1, strPath.size()));
+    return strPart != "." && strPart != "..";
+}
+
+int readTarget(std::string_view strTarget, gate::Call& call)
+{
+    const std::string_view strGrant = "/grant/";
+    if (strTarget.substr(0, strGrant.size()) != strGrant || std::string_view::npos != strTarget.find('#')) {
+        return 400;
+    }
+    std::string_view strPath = strTarget.substr(strGrant.size());
+    strPath = strPath.substr(0, strPath.find('?'));
+    if (!takePart(strPath, call.strApi) || !takePart(strPath, call.strMethod) || call.strApi.empty()) {
+        return 400;
+    }
+    return call.strApi.size() > gate::API_MAX || call.strMethod.size() > gate::METHOD_MAX ? 414 : 0;
+}
+
+// The id of "Bearer ID"; empty where there is none.
+std::string_view bearer(std::string_view strCredential)
+{
+    const std::string_view strScheme = "bearer ";
+    if (strCredential.size() <= strScheme.size()) {
+        return {};
+    }
+    for (size_t i = 0; i < strScheme.size(); ++i) {
+        if ((' ' == strScheme[i] ? strCredential[i] : strCredential[i] | 0x20) != strScheme[i]) {
+            return {};
+        }
+    }
+    strCredential.remove_prefix(strScheme.size());
+    strCredential.remove_prefix(std::min(strCredential.find_first_not_of(' '), strCredential.size()));
+    return strCredential;
+}
+
+} // namespace
+
+namespace gate {
+
+int readCall(const Head& head, const std::string& strOnceHeader, Call& call)
+{
+    if ("CONNECT" == head.strMethod || "TRACE" == head.strMethod) {
+        return 405;
+    }
+    if (const int nStatus = readTarget(head.strTarget, call)) {
+        return nStatus;
+    }
+    if (head.count("authorization") > 1) {
+        return 400;
+    }
+    call.strTid = bearer(head.value("authorization"));
+    if (call.strTid.empty()) {
+        return 401;
+    }
+    if (call.strTid.size() > TID_MAX || std::string::npos != call.strTid.find_first_of(" \t")) {
+        return 403; // nobody's id can come so
+    }
+    if (!strOnceHeader.empty()) {
+        call.strOnce = head.value(strOnceHeader);
+        if (head.count(strOnceHeader) > 1 || call.strOnce.size() > ONCE_MAX) {
+            return 400;
+        }
+    }
+    for (const Head::Header& header : head.headers) {
+        call.blRecord = call.blRecord || ("accept" == header.strName &&
+                                          std::string_view::npos != header.strValue.find("application/json"));
+    }
+    return 0;
+}
+
+} // namespace gate

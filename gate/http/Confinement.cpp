@@ -1,0 +1,119 @@
+#include "Confinement.h"
+
+#include <fcntl.h>
+#include <grp.h>
+#include <linux/capability.h>
+#include <pwd.h>
+#include <seccomp.h>
+#include <signal.h>
+#include <sys/prctl.h>
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <system_error>
+
+namespace {
+
+void require(bool blDone, const char* szWhat)
+{
+    if (!blDone) {
+        throw std::system_error(errno, std::generic_category(), szWhat);
+    }
+}
+
+// A directory that is removed while it is the root of a process stays empty for ever.
+void leaveFiles()
+{
+    char szDirectory[] = "/tmp/vemo-access-token-gate-XXXXXX";
+    require(mkdtemp(szDirectory), szDirectory);
+    const bool blEntered = 0 == chdir(szDirectory);
+    require(0 == rmdir(szDirectory) && blEntered, szDirectory);
+    require(0 == chroot("."), "chroot");
+}
+
+void dropBoundingSet()
+{
+    for (int nCapability = 0;
+         1 == prctl(PR_CAPBSET_READ, nCapability) || 0 == prctl(PR_CAPBSET_READ, nCapability);
+         ++nCapability) {
+        require(0 == prctl(PR_CAPBSET_DROP, nCapability), "PR_CAPBSET_DROP");
+    }
+}
+
+void become(const char* szUser)
+{
+    const struct passwd* pUser = getpwnam(szUser);
+    if (!pUser || 0 == pUser->pw_uid) {
+        throw std::runtime_error(std::string("there must be a user ") + szUser + ", and not root");
+    }
+    const uid_t uid = pUser->pw_uid;
+    const gid_t gid = pUser->pw_gid;
+    leaveFiles();
+    dropBoundingSet();
+    require(0 == setgroups(0, nullptr) && 0 == setresgid(gid, gid, gid) && 0 == setresuid(uid, uid, uid),
+            szUser);
+}
+
+void limit(__rlimit_resource_t resource)
+{
+    const struct rlimit none = {0, 0};
+    require(0 == setrlimit(resource, &none), "setrlimit");
+}
+
+void filterSystemCalls()
+{
+    const int SERVING[] = {
+        SCMP_SYS(accept4),       SCMP_SYS(brk),
+        SCMP_SYS(clock_gettime), SCMP_SYS(close),
+        SCMP_SYS(epoll_ctl),     SCMP_SYS(epoll_pwait),
+        SCMP_SYS(epoll_wait),    SCMP_SYS(exit_group),
+        SCMP_SYS(futex),         SCMP_SYS(getpid),
+        SCMP_SYS(getrandom),     SCMP_SYS(getsockopt),
+        SCMP_SYS(gettimeofday),  SCMP_SYS(madvise),
+        SCMP_SYS(mmap),          SCMP_SYS(mremap),
+        SCMP_SYS(munmap),        SCMP_SYS(poll),
+        SCMP_SYS(read),          SCMP_SYS(recvfrom),
+        SCMP_SYS(recvmmsg),      SCMP_SYS(restart_syscall),
+        SCMP_SYS(rt_sigreturn),  SCMP_SYS(sendmmsg),
+        SCMP_SYS(sendto),        SCMP_SYS(shutdown),
+        SCMP_SYS(write),
+    };
+    const std::unique_ptr<void, decltype(&seccomp_release)> pFilter(seccomp_init(SCMP_ACT_KILL_PROCESS),
+                                                                    seccomp_release);
+    require(pFilter != nullptr, "seccomp_init");
+    for (const int nCall : SERVING) {
+        errno = -seccomp_rule_add(pFilter.get(), SCMP_ACT_ALLOW, nCall, 0);
+        require(0 == errno, "seccomp_rule_add");
+    }
+    errno = -seccomp_load(pFilter.get());
+    require(0 == errno, "seccomp_load");
+}
+
+} // namespace
+
+namespace gate {
+
+void confine(const char* szUser)
+{
+    const pid_t pidParent = getppid();
+    if (0 == getuid()) {
+        become(szUser);
+    }
+    require(0 == prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0), "PR_SET_NO_NEW_PRIVS");
+    require(0 == prctl(PR_SET_DUMPABLE, 0, 0, 0, 0), "PR_SET_DUMPABLE");
+    require(0 == prctl(PR_SET_PDEATHSIG, SIGKILL, 0, 0, 0), "PR_SET_PDEATHSIG"); // a change of user undoes it
+    if (getppid() != pidParent) {
+        throw std::runtime_error("the parent has ended");
+    }
+    limit(RLIMIT_FSIZE);
+    limit(RLIMIT_NPROC);
+    limit(RLIMIT_CORE);
+    filterSystemCalls();
+}
+
+} // namespace gate

@@ -1,0 +1,202 @@
+#include "Head.h"
+
+#include <algorithm>
+#include <optional>
+
+namespace {
+
+bool isToken(char c)
+{
+    return ('0' <= c && c <= '9') || ('a' <= (c | 0x20) && (c | 0x20) <= 'z') ||
+           std::string_view::npos != std::string_view("!#$%&'*+-.^_`|~").find(c);
+}
+
+bool isToken(std::string_view strText)
+{
+    return !strText.empty() && std::all_of(strText.begin(), strText.end(), [](char c) { return isToken(c); });
+}
+
+// Whether a byte may stand in a value: no control character but the tab.
+bool isText(char c)
+{
+    const unsigned char n = static_cast<unsigned char>(c);
+    return '\t' == c || (' ' <= n && 0x7f != n);
+}
+
+std::string lower(std::string_view strText)
+{
+    std::string strLower(strText);
+    for (char& c : strLower) {
+        c = 'A' <= c && c <= 'Z' ? static_cast<char>(c | 0x20) : c;
+    }
+    return strLower;
+}
+
+std::string_view trimmed(std::string_view strText)
+{
+    const size_t nBegin = strText.find_first_not_of(" \t");
+    if (std::string_view::npos == nBegin) {
+        return {};
+    }
+    return strText.substr(nBegin, strText.find_last_not_of(" \t") - nBegin + 1);
+}
+
+// What stands before a separator, which is removed from the text too; all of it where there is none.
+std::string_view cut(std::string_view& strText, std::string_view strSeparator)
+{
+    const size_t nEnd = strText.find(strSeparator);
+    const std::string_view strPart = strText.substr(0, nEnd);
+    strText.remove_prefix(std::string_view::npos == nEnd ? strText.size() : nEnd + strSeparator.size());
+    return strPart;
+}
+
+// The first bytes that no head can have, or that end one, from nBegin on: a control character, or a line that
+// does not end as lines do.
+enum class Scan { Incomplete, End, Bad };
+Scan scan(std::string_view strBytes, size_t& nPlace)
+{
+    for (; nPlace < strBytes.size(); ++nPlace) {
+        const char c = strBytes[nPlace];
+        if ('\n' == c) {
+            if (0 == nPlace || '\r' != strBytes[nPlace - 1]) {
+                return Scan::Bad;
+            }
+            if (3 <= nPlace && "\r\n\r" == strBytes.substr(nPlace - 3, 3)) {
+                ++nPlace;
+                return Scan::End;
+            }
+        } else if ((0 < nPlace && '\r' == strBytes[nPlace - 1]) || ('\r' != c && !isText(c))) {
+            return Scan::Bad;
+        }
+    }
+    return Scan::Incomplete;
+}
+
+bool readLine(std::string_view strLine, gate::Head& head, bool& blOld)
+{
+    head.strMethod = cut(strLine, " ");
+    head.strTarget = cut(strLine, " ");
+    blOld = "HTTP/1.0" == strLine;
+    const bool blPlain = std::all_of(head.strTarget.begin(), head.strTarget.end(), [](char c) {
+        return '\t' != c; // blanks are the separators
+    });
+    return isToken(head.strMethod) && !head.strTarget.empty() && blPlain && (blOld || "HTTP/1.1" == strLine);
+}
+
+bool readHeader(std::string_view strLine, gate::Head& head)
+{
+    const size_t nColon = strLine.find(':');
+    if (std::string_view::npos == nColon || !isToken(strLine.substr(0, nColon))) {
+        return false; // a continuation of the line before, too
+    }
+    head.headers.push_back({lower(strLine.substr(0, nColon)), trimmed(strLine.substr(nColon + 1))});
+    return true;
+}
+
+// Whether the connection goes on, by what the client says of it.
+bool keepsAlive(const gate::Head& head, bool blOld)
+{
+    bool blKeep = !blOld;
+    for (const auto& header : head.headers) {
+        if ("connection" != header.strName) {
+            continue;
+        }
+        for (std::string_view strRest = header.strValue; !strRest.empty();) {
+            const std::string strOption = lower(trimmed(cut(strRest, ",")));
+            if ("close" == strOption) {
+                return false;
+            }
+            blKeep = blKeep || "keep-alive" == strOption;
+        }
+    }
+    return blKeep;
+}
+
+// Whether a body follows; nothing where that is not clear.
+std::optional<bool> announcesBody(const gate::Head& head, bool blOld)
+{
+    const size_t nCoded = head.count("transfer-encoding");
+    const size_t nSized = head.count("content-length");
+    if (nCoded) {
+        const bool blClear =
+            1 == nCoded && 0 == nSized && !blOld && "chunked" == lower(head.value("transfer-encoding"));
+        return blClear ? std::optional<bool>(true) : std::nullopt;
+    }
+    if (0 == nSized) {
+        return false;
+    }
+    const std::string_view strSize = head.value("content-length");
+    const bool blNumber = !strSize.empty() && strSize.size() <= 18 &&
+                          std::string_view::npos == strSize.find_first_not_of("0123456789");
+    if (1 != nSized || !blNumber) {
+        return std::nullopt;
+    }
+    return std::string_view::npos != strSize.find_first_not_of('0');
+}
+
+} // namespace
+
+namespace gate {
+
+size_t Head::count(std::string_view strName) const
+{
+    return static_cast<size_t>(std::count_if(headers.begin(), headers.end(), [strName](const Header& header) {
+        return strName == header.strName;
+    }));
+}
+
+std::string_view Head::value(std::string_view strName) const
+{
+    for (const Header& header : headers) {
+        if (strName == header.strName) {
+            return header.strValue;
+        }
+    }
+    return {};
+}
+
+Reading readHead(std::string_view strBytes, size_t& cbSeen, Head& head, size_t& cbHead)
+{
+    if (!strBytes.empty() && !isToken(strBytes[0])) {
+        return Reading::BadRequest;
+    }
+    const Scan found = scan(strBytes, cbSeen);
+    const size_t cbLine = strBytes.substr(0, cbSeen).find('\r');
+    if (Scan::Bad == found) {
+        return Reading::BadRequest;
+    }
+    if (std::min(cbLine, cbSeen) > LINE_MAX_BYTES) {
+        return Reading::TargetTooLong;
+    }
+    if (cbSeen > HEAD_MAX_BYTES) {
+        return Reading::HeadTooLarge;
+    }
+    if (Scan::Incomplete == found) {
+        return Reading::Incomplete;
+    }
+
+    cbHead = cbSeen;
+    head = Head();
+    bool blOld = false;
+    std::string_view strRest = strBytes.substr(0, cbHead - 2); // without the empty line
+    if (!readLine(cut(strRest, "\r\n"), head, blOld)) {
+        return Reading::BadRequest;
+    }
+    while (!strRest.empty()) {
+        if (HEADERS_MAX == head.headers.size()) {
+            return Reading::HeadTooLarge;
+        }
+        if (!readHeader(cut(strRest, "\r\n"), head)) {
+            return Reading::BadRequest;
+        }
+    }
+    const std::optional<bool> blBody = announcesBody(head, blOld);
+    if (!blBody || head.count("host") > 1 || (0 == head.count("host") && !blOld)) {
+        return Reading::BadRequest;
+    }
+    head.blBody = *blBody;
+    head.blKeepAlive = !head.blBody && keepsAlive(head, blOld);
+    return Reading::Whole;
+}
+
+} // namespace gate

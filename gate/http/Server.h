@@ -1,0 +1,87 @@
+// The process that reads HTTP: its connections, and what it asks the other process.
+
+#ifndef GATE_HTTP_SERVER_H
+#define GATE_HTTP_SERVER_H
+
+#include <event2/event.h>
+
+#include <list>
+#include <memory>
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+#include "Call.h"
+#include "Connection.h"
+#include "Metrics.h"
+#include "Repeats.h"
+#include "gate/Link.h"
+
+namespace gate {
+
+class Server {
+public:
+    // nCalls, nStatus: listening sockets; nStatus -1: none. All three are taken over.
+    Server(int nLink, int nCalls, int nStatus, std::string strOnceHeader);
+
+    // Serves until the other process ends, or asks to stop and all calls are answered.
+    void run();
+
+private:
+    struct BaseDeleter {
+        void operator()(struct event_base* pBase) const { event_base_free(pBase); }
+    };
+    typedef std::list<Connection> Connections;
+    // A call that has been asked.
+    struct Asked {
+        std::vector<Connection*> waiting; // for its answer; more than one where it has come again
+        std::string strKey;               // of Repeats; empty: none
+        bool blHealth = false;
+    };
+
+    Event listen(int nSocket);
+    static void onConnection(int nSocket, short, void* pServer);
+    static void onLink(int, short, void* pServer);
+    static void onTick(int, short, void* pServer);
+    void accept(int nSocket);
+    bool makeRoom(uid_t uid);
+    void changed(Connection& connection);
+    void readNext(Connection& connection);
+    void readStatus(Connection& connection, const Head& head);
+    void askCall(Connection& connection, const Call& call);
+    void ask(Request request, Connection& connection, std::string strKey);
+    void respond(Connection& connection, int nStatus, const std::string& strResponse);
+    void respond(Connection& connection, int nStatus);
+    void respond(Connection& connection, const Answer& answer);
+    void forget(Connection& connection);
+    void sweep();
+    void take(std::string_view strMessage);
+    void tick();
+    void stop();
+
+    const std::unique_ptr<struct event_base, BaseDeleter> m_pBase;
+    const std::string m_strOnceHeader;
+    Link m_link;
+    const int m_nCalls;
+    const int m_nStatus;
+    Connections m_connections;
+    std::vector<Connection*> m_changed;          // to be looked at when all events of a round have been
+    std::unordered_map<uint64_t, Asked> m_asked; // by their numbers
+    uint64_t m_nNumber = 0;                      // the last that was used
+    Repeats m_repeats;
+    Metrics m_metrics;
+    Figures m_figures = {};
+    int64_t m_nTickAt = 0;
+    int64_t m_nStopping = 0; // since when; 0: not
+    bool m_blAlone = false;  // the other process has ended
+    // Last, so that no event outlives what it is about.
+    Event m_linkReadable;
+    Event m_linkWritable;
+    Event m_tick;
+    Event m_callsListening;
+    Event m_statusListening;
+};
+
+} // namespace gate
+
+#endif

@@ -1,0 +1,229 @@
+#include "Tokens.h"
+
+#include <json/value.h>
+#include <sqlite3.h>
+
+#include <cstdlib>
+#include <new>
+
+#include "AccessTokenUtil.h"
+#include "internal/JsonText.h"
+
+namespace {
+
+#define WHERE_TID " WHERE tid = ?1"
+#define EXPIRED "deadline < strftime('%s', 'now')"
+
+// In the order of the field list.
+enum Column {
+    TID,
+    BIND_SID,
+    UID,
+    DEADLINE,
+    COUNT,
+    CREATE_TIME,
+    FUNCTION,
+    WEBAPI_ALLOW,
+    EXTRA,
+    COLUMNS,
+    HAS_EXPIRED = COLUMNS
+};
+
+const char* const FIELDS[COLUMNS] = {
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) #name,
+#include "internal/vemo-access-token-data-member"
+#undef VEMO_ATOKEN_DATA_MEMBER
+};
+
+std::string findSql()
+{
+    std::string strSql = "SELECT ";
+    for (const char* szField : FIELDS) {
+        strSql.append(szField).append(", ");
+    }
+    return strSql + EXPIRED " FROM token" WHERE_TID;
+}
+
+} // namespace
+
+namespace grant {
+
+const char* const SQL_EXPIRED = EXPIRED;
+const char* const SQL_PURGE = "DELETE FROM token WHERE " EXPIRED;
+
+Statement::Statement(sqlite3* pDb, const char* szSql) : m_pDb(pDb)
+{
+    if (SQLITE_OK != sqlite3_prepare_v3(pDb, szSql, -1, SQLITE_PREPARE_PERSISTENT, &m_pStatement, nullptr)) {
+        fail();
+    }
+}
+
+Statement::~Statement()
+{
+    sqlite3_finalize(m_pStatement);
+}
+
+void Statement::fail()
+{
+    const int nCode = sqlite3_extended_errcode(m_pDb);
+    if (SQLITE_NOMEM == (nCode & 0xff)) {
+        throw std::bad_alloc();
+    }
+    throw Error(nCode, sqlite3_errmsg(m_pDb));
+}
+
+Statement& Statement::bind(int nParameter, const std::string& strText)
+{
+    if (SQLITE_OK != sqlite3_bind_text64(m_pStatement, nParameter, strText.data(), strText.size(),
+                                         SQLITE_STATIC, SQLITE_UTF8)) {
+        fail();
+    }
+    return *this;
+}
+
+Statement& Statement::bind(int nParameter, int64_t nNumber)
+{
+    if (SQLITE_OK != sqlite3_bind_int64(m_pStatement, nParameter, nNumber)) {
+        fail();
+    }
+    return *this;
+}
+
+bool Statement::step()
+{
+    switch (sqlite3_step(m_pStatement)) {
+    case SQLITE_ROW: return true;
+    case SQLITE_DONE: return false;
+    default: fail();
+    }
+}
+
+void Statement::reset()
+{
+    sqlite3_reset(m_pStatement); // repeats the result of the last step
+}
+
+const char* Statement::text(int nColumn) const
+{
+    const auto szText = reinterpret_cast<const char*>(sqlite3_column_text(m_pStatement, nColumn));
+    if (!szText && SQLITE_NULL != sqlite3_column_type(m_pStatement, nColumn)) {
+        throw std::bad_alloc();
+    }
+    return szText;
+}
+
+int64_t Statement::number(int nColumn) const
+{
+    return strtoll(text(nColumn), nullptr, 10);
+}
+
+std::string Token::recordWithoutTid() const
+{
+    Json::Value jRecord;
+    jRecord[FIELDS[BIND_SID]] = strSession;
+    jRecord[FIELDS[UID]] = Json::Int64(nUid);
+    jRecord[FIELDS[DEADLINE]] = Json::Int64(nDeadline);
+    jRecord[FIELDS[COUNT]] = Json::Int64(nCount);
+    jRecord[FIELDS[CREATE_TIME]] = Json::Int64(nCreateTime);
+    jRecord[FIELDS[FUNCTION]] = strFunction;
+    jRecord[FIELDS[WEBAPI_ALLOW]] = jAllow[FIELDS[WEBAPI_ALLOW]];
+    jRecord[FIELDS[EXTRA]] = jExtra;
+    return VEMO_ACCESS_TOKEN::toString(jRecord);
+}
+
+Verdict judge(Token& token, const std::string& strApi, const std::string& strMethod)
+{
+    if (!token.blReadable) {
+        return Verdict::Malformed;
+    }
+    if (token.blExpired) {
+        return Verdict::Expired;
+    }
+    int nPermission = -1;
+    try {
+        nPermission = VEMO_ACCESS_TOKEN::checkPermission(token.jAllow, strApi.c_str(), strMethod.c_str());
+    } catch (const Json::LogicError&) {
+        return Verdict::Malformed; // what stands among the methods cannot be read as one
+    }
+    if (0 == nPermission) {
+        return Verdict::MethodNotListed;
+    }
+    if (0 > nPermission) {
+        const Json::Value& jAllow = token.jAllow[FIELDS[WEBAPI_ALLOW]];
+        return jAllow.isObject() && !jAllow.isMember(strApi) ? Verdict::ApiNotListed : Verdict::Malformed;
+    }
+    // What is saved with its uses lowered must be sound in all its fields.
+    return Left::Less == left(token.nCount) && !token.jExtra.isObject() ? Verdict::Malformed
+                                                                        : Verdict::Granted;
+}
+
+Left left(int64_t nCount)
+{
+    if (0 > nCount) {
+        return Left::All;
+    }
+    return 1 < nCount ? Left::Less : Left::Nothing;
+}
+
+Tokens::Tokens(sqlite3* pDb)
+    : m_find(pDb, findSql().c_str()),
+      m_setCount(pDb, "UPDATE token SET count = ?2" WHERE_TID),
+      m_remove(pDb, "DELETE FROM token" WHERE_TID)
+{
+}
+
+std::optional<Token> Tokens::find(const std::string& strTid)
+{
+    m_find.reset();
+    std::optional<Token> token;
+    // All rows, as the library does: one that cannot be read makes the look-up fail, wherever it stands.
+    for (m_find.bind(1, strTid); m_find.step();) {
+        if (!token) {
+            token.emplace();
+        }
+        for (int nColumn = 0; nColumn < COLUMNS; ++nColumn) {
+            token->blReadable = token->blReadable && m_find.text(nColumn);
+        }
+        if (!token->blReadable || !token->strTid.empty()) {
+            continue;
+        }
+        token->strTid = m_find.text(TID);
+        token->strSession = m_find.text(BIND_SID);
+        token->nUid = m_find.number(UID);
+        token->nDeadline = m_find.number(DEADLINE);
+        token->nCount = m_find.number(COUNT);
+        token->nCreateTime = m_find.number(CREATE_TIME);
+        token->strFunction = m_find.text(FUNCTION);
+        VEMO_ACCESS_TOKEN::fromString(m_find.text(WEBAPI_ALLOW), token->jAllow[FIELDS[WEBAPI_ALLOW]]);
+        VEMO_ACCESS_TOKEN::fromString(m_find.text(EXTRA), token->jExtra);
+        const char* szExpired = m_find.text(HAS_EXPIRED);
+        token->blExpired = szExpired && '1' == szExpired[0];
+    }
+    m_find.reset();
+    return token;
+}
+
+void Tokens::setCount(const std::string& strTid, int64_t nCount)
+{
+    m_setCount.reset();
+    m_setCount.bind(1, strTid).bind(2, nCount).step();
+    m_setCount.reset();
+}
+
+void Tokens::spend(const Token& token)
+{
+    switch (left(token.nCount)) {
+    case Left::Nothing: remove(token.strTid); break;
+    case Left::Less: setCount(token.strTid, token.nCount - 1); break;
+    case Left::All: break;
+    }
+}
+
+void Tokens::remove(const std::string& strTid)
+{
+    m_remove.reset();
+    m_remove.bind(1, strTid).step();
+    m_remove.reset();
+}
+
+} // namespace grant
