@@ -74,8 +74,7 @@ void Statement::fail()
 
 Statement& Statement::bind(int nParameter, const std::string& strText)
 {
-    if (SQLITE_OK != sqlite3_bind_text64(m_pStatement, nParameter, strText.data(), strText.size(),
-                                         SQLITE_STATIC, SQLITE_UTF8)) {
+    if (SQLITE_OK != sqlite3_bind_text(m_pStatement, nParameter, strText.c_str(), -1, SQLITE_STATIC)) {
         fail();
     }
     return *this;

@@ -45,7 +45,8 @@ public:
     Statement(const Statement&) = delete;
     Statement& operator=(const Statement&) = delete;
 
-    // Sets a parameter, counted from 1. A text must live until the statement is reset.
+    // Sets a parameter, counted from 1. A text counts up to its first NUL, as in the library's statements,
+    // and must live until the statement is reset.
     Statement& bind(int nParameter, const std::string& strText);
     Statement& bind(int nParameter, int64_t nNumber);
 

@@ -8,14 +8,6 @@
 
 namespace {
 
-// Long enough to be accepted; TokenStore::state() shows it without the filling.
-std::string idOf(const std::string& strName)
-{
-    std::string strTid = "known-" + strName;
-    strTid.resize(VEMO_ATOKEN_LENGTH_MIN, 'x');
-    return strTid;
-}
-
 Json::Value options()
 {
     Json::Value jOption(Json::objectValue);
@@ -128,6 +120,14 @@ Files makeStore(const TokenStore& store)
 }
 
 } // namespace
+
+// Long enough to be accepted.
+std::string idOf(const std::string& strName)
+{
+    std::string strTid = "known-" + strName;
+    strTid.resize(VEMO_ATOKEN_LENGTH_MIN, 'x');
+    return strTid;
+}
 
 const std::vector<Operation>& operations()
 {

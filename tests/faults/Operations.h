@@ -3,6 +3,7 @@
 #ifndef TESTS_FAULT_OPERATIONS_H
 #define TESTS_FAULT_OPERATIONS_H
 
+#include <string>
 #include <vector>
 
 #include "TokenStore.h"
@@ -16,6 +17,9 @@ struct Operation {
 
 // Twelve: creating the store, and each way in which the library changes it or reads it.
 const std::vector<Operation>& operations();
+
+// The id that a token of the store has by its name; TokenStore::state() shows the name.
+std::string idOf(const std::string& strName);
 
 // Puts the store in the state in which the operation finds it.
 void prepareStore(const TokenStore& store, const Operation& operation);

@@ -11,6 +11,11 @@
 #include "Oracle.h"
 #include "PowerJudge.h"
 
+#ifdef VEMO_TEST_GATE
+#include "gate/Batch.h"
+#include "gate/Store.h"
+#endif
+
 namespace {
 
 typedef std::vector<std::function<int()>> Calls;
@@ -176,6 +181,44 @@ TEST_F(PowerCut, UndoesNothingOnceTheCallerHasSyncedTheDirectory)
     EXPECT_EQ(0, tally.nExposed);
     report("directory synced after the call", tally);
 }
+
+#ifdef VEMO_TEST_GATE
+TEST_F(PowerCut, UndoesNothingThatTheGateHasAnswered)
+{
+    gate::Store store;
+    const auto batch = [&store](const std::vector<std::string>& strNames) {
+        const std::function<gate::Owners::Owner(uid_t)> fOwner = [](uid_t) {
+            return gate::Owners::Owner{gate::Owners::State::Known, "anybody", 0};
+        };
+        EXPECT_TRUE(store.begin());
+        store.purge();
+        gate::Batch calls(store.tokens(), fOwner);
+        for (const std::string& strName : strNames) {
+            gate::Request request;
+            request.strTid = idOf(strName);
+            request.strApi = "Example.Api";
+            EXPECT_EQ(gate::Outcome::Granted, calls.call(request).value().outcome) << strName;
+        }
+        calls.save();
+        EXPECT_TRUE(store.commit());
+        return 0;
+    };
+    const PowerTally tally =
+        judgeAll({recordOn(filesBefore(CREATION), {[&] { return batch({"three"}); },
+                                                   [&] {
+                                                       return batch({"one", "large", "three"});
+                                                   },
+                                                   [&] { return batch({"large"}); },
+                                                   [&] {
+                                                       store.close();
+                                                       return 0;
+                                                   }})},
+                 Order::Kept, scaled(4));
+    EXPECT_EQ(0, tally.nExposed);
+    EXPECT_EQ(0, tally.nDamaged);
+    report("grants of the gate", tally);
+}
+#endif
 
 // SQLite truncates a database that has shrunk after it has unlinked the journal, and journals nothing of what
 // it cuts off. A disk that keeps the truncation and loses the unlink has a journal that cannot bring that

@@ -7,6 +7,7 @@
 #include <sstream>
 
 #include "Figures.h"
+#include "GateGrant.h"
 #include "Operations.h"
 #include "Table.h"
 #include "TokenStore.h"
@@ -95,6 +96,20 @@ protected:
         m_nRows += static_cast<int64_t>(m_model.store.rows().size());
     }
 
+    void runAll(const std::string& strName, int64_t nOperations)
+    {
+        for (int64_t i = 0; i < nOperations && !HasFatalFailure(); ++i) {
+            runOne();
+        }
+        if (HasFatalFailure()) {
+            return;
+        }
+        for (size_t i = 0; i < m_tallies.size(); ++i) {
+            EXPECT_LT(0, m_tallies[i].nSucceeded) << operations()[i].szName << " never succeeded";
+        }
+        print(strName, nOperations);
+    }
+
     size_t drawOperation()
     {
         size_t nDraw = m_draws.below(m_nWeights);
@@ -126,7 +141,7 @@ protected:
         return strText;
     }
 
-    void print(int64_t nOperations) const
+    void print(const std::string& strName, int64_t nOperations) const
     {
         Tally all;
         for (const Tally& tally : m_tallies) {
@@ -138,7 +153,7 @@ protected:
         text << nOperations << " operations, " << all.nSucceeded << " of them succeeded, " << all.nRefused
              << " were refused, " << all.nThrown << " threw; " << m_nRows / nOperations
              << " tokens on average";
-        figure("model check", text.str());
+        figure(strName, text.str());
     }
 
     const TokenStore m_files;
@@ -167,15 +182,13 @@ private:
 
 TEST_F(ModelCheck, LibraryDoesWhatTheModelDoes)
 {
-    const int64_t nOperations = scaled(VEMO_TEST_OPERATIONS);
-    for (int64_t i = 0; i < nOperations && !HasFatalFailure(); ++i) {
-        runOne();
-    }
-    if (HasFatalFailure()) {
-        return;
-    }
-    for (size_t i = 0; i < m_tallies.size(); ++i) {
-        EXPECT_LT(0, m_tallies[i].nSucceeded) << operations()[i].szName << " never succeeded";
-    }
-    print(nOperations);
+    runAll("model check", scaled(VEMO_TEST_OPERATIONS));
 }
+
+#ifdef VEMO_TEST_GATE
+TEST_F(ModelCheck, GateGrantsWhatTheModelGrants)
+{
+    m_library.functions.grantEx = &grantAtTheGate;
+    runAll("model check of the gate", scaled(VEMO_TEST_OPERATIONS / 5));
+}
+#endif

@@ -1,0 +1,45 @@
+// Clients of a server in a closed loop: each sends a request, waits for the whole reply, and sends the next. All run
+// in one thread, which takes much less of the machine than a server does.
+
+#ifndef VEMO_ACCESS_TOKEN_BENCH_LOAD_H
+#define VEMO_ACCESS_TOKEN_BENCH_LOAD_H
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+// What a server has replied so far.
+struct Reply {
+    size_t cbReply = 0; // the size of the whole reply; 0: more must come
+    bool blGranted = false;
+};
+
+// Reads the reply at the beginning of what has come.
+typedef std::function<Reply(std::string_view)> ReplyReader;
+
+Reply readHttpReply(std::string_view strBytes);
+Reply readRedisReply(std::string_view strBytes); // an array: granted; nil: refused
+
+struct Load {
+    std::string strAddress; // the path of a Unix socket, or "PORT" of 127.0.0.1
+    std::vector<std::string> strRequests;
+    ReplyReader readReply;
+    size_t nClients = 1;
+    double dSeconds = 1;
+};
+
+struct Loaded {
+    uint64_t nReplies = 0;
+    uint64_t nGranted = 0;
+    double dSeconds = 0;
+    double dMedian = 0; // s
+    double d99th = 0;
+};
+
+// Runs it, and waits for the replies that are still to come. Throws std::runtime_error when a connection fails.
+Loaded run(const Load& load);
+
+#endif
