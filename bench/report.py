@@ -190,6 +190,60 @@ def peers_table(results):
     return table(["Grant", "Median", "99th percentile", "At a power cut"], rows)
 
 
+GATE_GOALS = (  # what, beside what, the least ratio
+    ("write-ahead/8", "redis/8", 0.9),
+    ("write-ahead/64", "redis/64", 1.0),
+    ("write-ahead/256", "redis/256", 0.9),
+    ("one-token/64", "redis-one-token/64", 1.0),
+    ("rollback/64", "calls/64", 30),
+    ("rollback/64", "calls-locked/64", 20),
+    ("nginx/64", "nginx-at-once/64", 0.4),
+    ("many-tokens/64", "write-ahead/64", 0.5),
+    ("call-beside/1", "call/1", 2),
+)
+
+
+def gate_table(results):
+    cells = results["gate"].cells
+    rows = []
+    for ours, other, goal in GATE_GOALS:
+        rate, beside = (cells[tuple(name.split("/"))]["per_second"] for name in (ours, other))
+        ratio = rate / beside
+        rows.append(
+            [ours, f"{rate:,.0f}", other, f"{beside:,.0f}", f"{ratio:.2f}", f"{goal:g}"
+             + (": met" if ratio >= goal else ": missed")]
+        )
+    busy, many = cells[("write-ahead", "64")], cells[("write-ahead", "256")]
+    spread = busy["p99_us"] / busy["median_us"]
+    rows.append(["99th percentile, 64 clients", microseconds(busy["p99_us"]), "median", microseconds(busy["median_us"]),
+                 f"{spread:.2f}", "at most 2.5: " + ("met" if spread <= 2.5 else "missed")])
+    rows.append(["memory, 256 clients", f"{many['memory_MB']:.1f} MB", "", "", "",
+                 "30 MB: " + ("met" if many["memory_MB"] < 30 else "missed")])
+    return table(["Grants/s (clients)", "Gate", "Beside", "Grants/s", "Ratio", "Goal"], rows)
+
+
+def plot_gate(results, directory):
+    cells = results["gate"].cells
+    figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5))
+    for series in ("write-ahead", "rollback", "redis"):
+        points = [(int(key[1]), cell) for key, cell in cells.items() if key[0] == series]
+        label = "Redis, appendfsync always" if series == "redis" else f"gate, {series} journal"
+        clients = [number for number, _ in points]
+        panels[0].plot(clients, [cell["per_second"] for _, cell in points], marker="o", label=label)
+        (line,) = panels[1].plot(clients, [cell["p99_us"] / 1000 for _, cell in points], marker="o", label=label)
+        panels[1].plot(clients, [cell["median_us"] / 1000 for _, cell in points], linestyle=":", color=line.get_color())
+    panels[0].set_title("grants a second")
+    panels[1].set_title("a grant: 99th percentile, dotted: median (ms)")
+    for axes in panels:
+        axes.set_xscale("log", base=2)
+        axes.set_yscale("log")
+        axes.xaxis.set_major_formatter("{x:.0f}")
+        axes.set_xlabel("clients")
+        axes.grid(True, alpha=0.3)
+    panels[0].legend()
+    save(figure, directory, "gate.png")
+
+
 def growth_table(results):
     cells = results["growth"].cells
     rows = []
@@ -322,7 +376,7 @@ def main():
     if len(sys.argv) != 2:
         sys.exit("usage: report.py DIRECTORY")
     directory = sys.argv[1]
-    names = ("overhead", "listing", "breakdown", "growth", "contention", "peers")
+    names = ("overhead", "listing", "breakdown", "growth", "contention", "peers", "gate")
     results = {name: Results(directory, name) for name in names}
     sections = [
         ("Ratios", machine(results) + "\n" + ratios(results)),
@@ -336,6 +390,9 @@ def main():
     if results["peers"].cells:
         sections.append(("Peers", peers_table(results)))
         plot_peers(results, directory)
+    if results["gate"].cells:
+        sections.append(("The gate", gate_table(results)))
+        plot_gate(results, directory)
     with open(os.path.join(directory, "report.md"), "w", encoding="utf-8") as file:
         file.write("\n".join(f"## {title}\n\n{text}" for title, text in sections))
     print(sections[0][1])

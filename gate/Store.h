@@ -54,7 +54,7 @@ private:
         grant::Statement purge;
         grant::Statement look;
         grant::Tokens tokens;
-        int64_t nPurgedAt;
+        int64_t nPurgeAt = 0;
     };
 
     void open();

@@ -40,9 +40,8 @@ int connectTo(const std::string& strAddress)
     port.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
     const bool blPath = '/' == strAddress[0];
     const int nSocket = socket(blPath ? AF_UNIX : AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    const int nResult = blPath
-                            ? connect(nSocket, reinterpret_cast<struct sockaddr*>(&path), sizeof(path))
-                            : connect(nSocket, reinterpret_cast<struct sockaddr*>(&port), sizeof(port));
+    const int nResult = blPath ? connect(nSocket, reinterpret_cast<struct sockaddr*>(&path), sizeof(path))
+                               : connect(nSocket, reinterpret_cast<struct sockaddr*>(&port), sizeof(port));
     if (0 != nResult) {
         fail(strAddress.c_str());
     }
@@ -74,7 +73,8 @@ Reply readHttpReply(std::string_view strBytes)
         return {};
     }
     const size_t nLength = strBytes.substr(0, nEnd).find("Content-Length: ");
-    const size_t cbBody = std::string_view::npos == nLength ? 0 : strtoul(&strBytes[nLength + 16], nullptr, 10);
+    const size_t cbBody =
+        std::string_view::npos == nLength ? 0 : strtoul(&strBytes[nLength + 16], nullptr, 10);
     if (strBytes.size() < nEnd + 4 + cbBody) {
         return {};
     }

@@ -1,5 +1,5 @@
-// Clients of a server in a closed loop: each sends a request, waits for the whole reply, and sends the next. All run
-// in one thread, which takes much less of the machine than a server does.
+// Clients of a server in a closed loop: each sends a request, waits for the whole reply, and sends the next.
+// All run in one thread, which takes much less of the machine than a server does.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_LOAD_H
 #define VEMO_ACCESS_TOKEN_BENCH_LOAD_H
@@ -39,7 +39,8 @@ struct Loaded {
     double d99th = 0;
 };
 
-// Runs it, and waits for the replies that are still to come. Throws std::runtime_error when a connection fails.
+// Runs it, and waits for the replies that are still to come. Throws std::runtime_error when a connection
+// fails.
 Loaded run(const Load& load);
 
 #endif
