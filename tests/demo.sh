@@ -51,6 +51,9 @@ for line in \
     'VemoAccessTokenDeleteByTid(strUnknown)' \
     'VemoAccessTokenDeleteByBindSid("demo-login-1")' \
     'VemoAccessTokenDeleteByFunction(strFunction)' \
-    'The table: no tokens'; do
+    'The table: no tokens' \
+    'HTTP/1.1 200 OK' \
+    'X-Token-User: root' \
+    'Refused, granted on behalf of its owner, and spent.'; do
     grep -qF "$line" "$dir/transcript"
 done
