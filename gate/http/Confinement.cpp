@@ -6,6 +6,7 @@
 #include <pwd.h>
 #include <seccomp.h>
 #include <signal.h>
+#include <sys/mman.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
 #include <unistd.h>
@@ -68,20 +69,15 @@ void limit(__rlimit_resource_t resource)
 void filterSystemCalls()
 {
     const int SERVING[] = {
-        SCMP_SYS(accept4),       SCMP_SYS(brk),
-        SCMP_SYS(clock_gettime), SCMP_SYS(close),
-        SCMP_SYS(epoll_ctl),     SCMP_SYS(epoll_pwait),
-        SCMP_SYS(epoll_wait),    SCMP_SYS(exit_group),
-        SCMP_SYS(futex),         SCMP_SYS(getpid),
-        SCMP_SYS(getrandom),     SCMP_SYS(getsockopt),
-        SCMP_SYS(gettimeofday),  SCMP_SYS(madvise),
-        SCMP_SYS(mmap),          SCMP_SYS(mremap),
-        SCMP_SYS(munmap),        SCMP_SYS(poll),
-        SCMP_SYS(read),          SCMP_SYS(recvfrom),
-        SCMP_SYS(recvmmsg),      SCMP_SYS(restart_syscall),
-        SCMP_SYS(rt_sigreturn),  SCMP_SYS(sendmmsg),
-        SCMP_SYS(sendto),        SCMP_SYS(shutdown),
-        SCMP_SYS(write),
+        SCMP_SYS(accept4),      SCMP_SYS(brk),        SCMP_SYS(clock_gettime),
+        SCMP_SYS(close),        SCMP_SYS(epoll_ctl),  SCMP_SYS(epoll_pwait),
+        SCMP_SYS(epoll_wait),   SCMP_SYS(exit_group), SCMP_SYS(futex),
+        SCMP_SYS(getpid),       SCMP_SYS(getrandom),  SCMP_SYS(getsockopt),
+        SCMP_SYS(gettimeofday), SCMP_SYS(madvise),    SCMP_SYS(mremap),
+        SCMP_SYS(munmap),       SCMP_SYS(poll),       SCMP_SYS(read),
+        SCMP_SYS(recvfrom),     SCMP_SYS(recvmmsg),   SCMP_SYS(restart_syscall),
+        SCMP_SYS(rt_sigreturn), SCMP_SYS(sendmmsg),   SCMP_SYS(sendto),
+        SCMP_SYS(shutdown),     SCMP_SYS(write),
     };
     const std::unique_ptr<void, decltype(&seccomp_release)> pFilter(seccomp_init(SCMP_ACT_KILL_PROCESS),
                                                                     seccomp_release);
@@ -90,6 +86,10 @@ void filterSystemCalls()
         errno = -seccomp_rule_add(pFilter.get(), SCMP_ACT_ALLOW, nCall, 0);
         require(0 == errno, "seccomp_rule_add");
     }
+    // Memory, but none that could be executed.
+    errno = -seccomp_rule_add(pFilter.get(), SCMP_ACT_ALLOW, SCMP_SYS(mmap), 1,
+                              SCMP_A2(SCMP_CMP_MASKED_EQ, PROT_EXEC, 0));
+    require(0 == errno, "seccomp_rule_add");
     errno = -seccomp_load(pFilter.get());
     require(0 == errno, "seccomp_load");
 }
