@@ -56,7 +56,7 @@ std::optional<Answer> Batch::call(const Request& request)
     }
     // An answer names the owner, so a token of nobody's opens nothing here.
     const std::optional<uid_t> uid = userOf(token.nUid);
-    const Owners::Owner owner = uid ? m_fOwner(*uid) : Owners::Owner{Owners::State::Nobody, "", 0};
+    const Owners::Owner owner = uid ? m_fOwner(*uid) : Owners::Owner{Owners::State::Nobody, ""};
     Answer answer;
     answer.nNumber = request.nNumber;
     switch (owner.state) {

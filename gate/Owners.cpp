@@ -14,7 +14,8 @@
 
 namespace {
 
-const int64_t KEPT = 10 * gate::SECOND;
+const int64_t FRESH = 10 * gate::SECOND; // a name that is older is looked up again
+const int64_t KEPT = 60 * gate::SECOND;  // and used until then, where that takes long
 const int64_t FAILING_KEPT = gate::SECOND;
 const size_t OWNERS_MAX = 4096; // more than that are forgotten all at once
 
@@ -35,17 +36,25 @@ Owners::Owners(std::function<Owner(uid_t)> fLookUp)
 Owners::Owner Owners::find(uid_t uid)
 {
     const std::lock_guard guard(m_mutex);
+    const int64_t nNow = now();
     const auto it = m_owners.find(uid);
-    if (it != m_owners.end() && (State::Asked == it->second.state || now() < it->second.nUntil)) {
+    const bool blKnown = it != m_owners.end() && nNow < it->second.nUntil;
+    if (blKnown && (it->second.blAsked || nNow < it->second.nFreshUntil)) {
         return it->second;
     }
     if (m_owners.size() >= OWNERS_MAX) {
         m_owners.clear();
     }
-    m_owners[uid] = Owner();
-    m_queue.push_back(uid);
-    m_asked.notify_one();
-    return Owner();
+    Owner& owner = m_owners[uid];
+    if (!blKnown && !owner.blAsked) {
+        owner = Owner();
+    }
+    if (!owner.blAsked) {
+        owner.blAsked = true;
+        m_queue.push_back(uid);
+        m_asked.notify_one();
+    }
+    return blKnown ? owner : Owner();
 }
 
 void Owners::clear()
@@ -63,6 +72,7 @@ void Owners::run()
         lock.unlock();
         Owner owner = m_fLookUp(uid);
         owner.nUntil = now() + (State::Failing == owner.state ? FAILING_KEPT : KEPT);
+        owner.nFreshUntil = now() + FRESH;
         lock.lock();
         m_owners[uid] = owner;
         eventfd_write(m_nEvent, 1);

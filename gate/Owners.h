@@ -28,7 +28,9 @@ public:
     struct Owner {
         State state = State::Asked;
         std::string strName;
-        int64_t nUntil = 0; // until when it is to be believed
+        int64_t nFreshUntil = 0; // when to look again
+        int64_t nUntil = 0;      // when to believe it no more
+        bool blAsked = false;    // it is being looked up
     };
 
     // fLookUp tells the state and the name; it runs in the thread.

@@ -68,6 +68,9 @@ bool Service::run()
             m_calls.insert(m_calls.begin(), m_parked.begin(), m_parked.end());
             m_parked.clear();
         }
+        if (rgEvent[2].revents) {
+            m_nTryAt = 0;
+        }
         if (rgEvent[3].revents) {
             struct signalfd_siginfo signal;
             if (sizeof(signal) == read(m_nSignals, &signal, sizeof(signal)) && !m_blStopping) {
@@ -205,7 +208,11 @@ void Service::wait(int64_t nNow)
 void Service::serve()
 {
     const int64_t nNow = now();
-    if (m_calls.empty() || nNow < m_nTryAt) {
+    if (m_calls.empty()) {
+        m_turn.give(); // it may have come when nobody waited any more
+        return;
+    }
+    if (nNow < m_nTryAt) {
         return;
     }
     try {

@@ -62,6 +62,9 @@ bool Turn::take()
 void Turn::give()
 {
     const std::lock_guard guard(m_mutex);
+    if (m_blWanted || !m_lock) {
+        return;
+    }
     m_lock.reset();
     const int64_t nNow = now();
     if (nNow >= m_nPauseAt) {

@@ -24,7 +24,8 @@ public:
     // std::system_error when it cannot be had at all.
     bool take();
 
-    // Frees the lock.
+    // Frees the lock, if it is held. While the thread still waits for it, it comes later, and the descriptor
+    // tells: whoever has no use for it any more gives it again then.
     void give();
 
     int descriptor() const { return m_nEvent; }

@@ -1,5 +1,7 @@
 #include "Confinement.h"
 
+#include "Server.h"
+
 #include <fcntl.h>
 #include <grp.h>
 #include <linux/capability.h>
@@ -66,6 +68,18 @@ void limit(__rlimit_resource_t resource)
     require(0 == setrlimit(resource, &none), "setrlimit");
 }
 
+void raiseDescriptors()
+{
+    struct rlimit descriptors = {};
+    require(0 == getrlimit(RLIMIT_NOFILE, &descriptors), "getrlimit");
+    descriptors.rlim_cur = descriptors.rlim_max;
+    require(0 == setrlimit(RLIMIT_NOFILE, &descriptors), "setrlimit");
+    if (descriptors.rlim_max < gate::DESCRIPTORS) {
+        throw std::runtime_error("the limit of open files must be " + std::to_string(gate::DESCRIPTORS) +
+                                 " or more");
+    }
+}
+
 void filterSystemCalls()
 {
     const int SERVING[] = {
@@ -110,6 +124,7 @@ void confine(const char* szUser)
     if (getppid() != pidParent) {
         throw std::runtime_error("the parent has ended");
     }
+    raiseDescriptors();
     limit(RLIMIT_FSIZE);
     limit(RLIMIT_NPROC);
     limit(RLIMIT_CORE);

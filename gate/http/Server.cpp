@@ -12,7 +12,7 @@
 namespace {
 
 // The bounds of the manual page.
-const size_t CONNECTIONS_MAX = 1024;
+const size_t CONNECTIONS_MAX = gate::DESCRIPTORS - 64;
 const size_t CONNECTIONS_OF_USER_MAX = 768;
 const int64_t HEAD_WAIT = 5 * gate::SECOND;
 const int64_t IDLE_WAIT = 75 * gate::SECOND;
@@ -94,12 +94,12 @@ void Server::onTick(int, short, void* pServer)
     static_cast<Server*>(pServer)->tick();
 }
 
-void Server::accept(int nSocket)
+bool Server::accept(int nSocket)
 {
     for (size_t i = 0; i < ACCEPTED_AT_ONCE; ++i) {
         const int nConnection = accept4(nSocket, nullptr, nullptr, SOCK_NONBLOCK | SOCK_CLOEXEC);
         if (0 > nConnection) {
-            return;
+            return false;
         }
         m_connections.emplace_back(m_pBase.get(), nConnection, nSocket == m_nStatus,
                                    [this](Connection& connection) { changed(connection); });
@@ -108,6 +108,7 @@ void Server::accept(int nSocket)
             m_metrics.countTurnedAway();
         }
     }
+    return true;
 }
 
 // Closes a connection that waits for its client, if there are too many: of the same user, if that user has
@@ -362,7 +363,8 @@ void Server::tick()
 void Server::stop()
 {
     m_nStopping = now();
-    accept(m_nCalls);
+    while (accept(m_nCalls)) {
+    }
     m_callsListening.reset();
     m_statusListening.reset();
     close(m_nCalls);

@@ -19,6 +19,9 @@
 
 namespace gate {
 
+// The descriptors that serving takes at most.
+const size_t DESCRIPTORS = 1024 + 64;
+
 class Server {
 public:
     // nCalls, nStatus: listening sockets; nStatus -1: none. All three are taken over.
@@ -43,7 +46,7 @@ private:
     static void onConnection(int nSocket, short, void* pServer);
     static void onLink(int, short, void* pServer);
     static void onTick(int, short, void* pServer);
-    void accept(int nSocket);
+    bool accept(int nSocket); // whether there may be more
     bool makeRoom(uid_t uid);
     void changed(Connection& connection);
     void readNext(Connection& connection);

@@ -188,7 +188,7 @@ TEST_F(PowerCut, UndoesNothingThatTheGateHasAnswered)
     gate::Store store;
     const auto batch = [&store](const std::vector<std::string>& strNames) {
         const std::function<gate::Owners::Owner(uid_t)> fOwner = [](uid_t) {
-            return gate::Owners::Owner{gate::Owners::State::Known, "anybody", 0};
+            return gate::Owners::Owner{gate::Owners::State::Known, "anybody"};
         };
         EXPECT_TRUE(store.begin());
         store.purge();

@@ -192,6 +192,27 @@ TEST_F(Exactness, GrantsAreTheUsesSpentBesideOtherPrograms)
                " grants, all of them exact");
 }
 
+TEST_F(Exactness, CallsAreAnsweredWhileAnotherProgramHoldsTheLock)
+{
+    const RunningGate gate(m_store);
+    GateClient client(m_store);
+    const int64_t nBefore = usesLeft();
+    {
+        const CallLock lock;
+        EXPECT_EQ("503", client.call(idOfNumber(0), TARGET));
+        EXPECT_EQ(nBefore, usesLeft());
+    }
+    EXPECT_EQ("200", client.call(idOfNumber(0), TARGET));
+    EXPECT_EQ(nBefore - 1, usesLeft());
+    {
+        const CallLock lock;
+        EXPECT_EQ("503", client.call(idOfNumber(0), TARGET));
+    }
+    usleep(20000);
+    // The gate had its turn when nobody waited for it any more, and did not keep it.
+    EXPECT_NO_THROW(CallLock(CallLock::FILE_OF_ALL, std::chrono::milliseconds(500)));
+}
+
 TEST_F(Killed, TheOneThatHoldsTheTokens)
 {
     killSome("gate, its parent killed", [](const RunningGate& gate) { return gate.parent(); });
