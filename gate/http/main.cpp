@@ -1,6 +1,5 @@
 // The process that reads HTTP. vemo-access-token-gate starts it, with the user whom it is to become and the
-// header of
-// --once-header as arguments, and its sockets under the numbers of ChildDescriptor.
+// header of --once-header as arguments, and its sockets under the numbers of ChildDescriptor.
 
 #include <sys/socket.h>
 #include <syslog.h>
