@@ -1,6 +1,6 @@
 #!/bin/bash
-# What the build does to the library and the tool so that faults of the code are harder to exploit.
-# usage: hardening.sh LIBRARY TOOL
+# What the build does to the library and the programs so that faults of the code are harder to exploit.
+# usage: hardening.sh LIBRARY PROGRAM...
 set -euo pipefail
 status=0
 

@@ -17,12 +17,13 @@ configure -DCMAKE_DISABLE_FIND_PACKAGE_{PkgConfig,GTest,benchmark,Doxygen}=ON >"
 sed -n 's/^-- Left out: //p' "$dir/log" | tee "$dir/left-out"
 diff "$dir/left-out" - <<END
 the tool. Missing packages: pkg-config, libsmartcols-dev, libbsd-dev, libmd-dev
+the gate. Missing packages: pkg-config, libevent-dev, libseccomp-dev
 the tests. Missing packages: libgtest-dev
 the API reference. Missing packages: doxygen
 END
 
 echo "Asked for:"
-for part in VEMO_ATOKEN_TOOL BUILD_TESTING VEMO_ATOKEN_BENCH; do
+for part in VEMO_ATOKEN_TOOL VEMO_ATOKEN_GATE BUILD_TESTING VEMO_ATOKEN_BENCH; do
     if configure -D$part=ON >"$dir/log" 2>&1; then
         echo "$part: no error"
         exit 1
@@ -32,6 +33,7 @@ for part in VEMO_ATOKEN_TOOL BUILD_TESTING VEMO_ATOKEN_BENCH; do
 done | tee "$dir/errors"
 diff "$dir/errors" - <<END
 Missing packages for the tool: pkg-config, libsmartcols-dev, libbsd-dev, libmd-dev
+Missing packages for the gate: pkg-config, libevent-dev, libseccomp-dev
 Missing packages for the tests: libgtest-dev
 Missing packages for the benchmarks: libbenchmark-dev
 END

@@ -205,7 +205,8 @@ class Proxy:
     def test_grants_and_refuses(self):
         granted = {"x-token-user": USER, "x-token-uid": str(os.getuid()), "x-token-function": "50%20%25%20off"}
         status, _, told = self.request(id=self.id)
-        self.assertEqual((status, told["method"], told["path"], self.users(told)), (200, "GET", "/files/a?b=c", granted))
+        self.assertEqual((status, told["method"], told["path"], self.users(told)),
+                         (200, "GET", "/files/a?b=c", granted))
         self.assertEqual(self.uses(self.id), 2)
 
         # Who forges the headers, in whatever case, gets one's own.
