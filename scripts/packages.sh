@@ -66,7 +66,7 @@ install_needed()
         libmd-dev libevent-dev libseccomp-dev)
     UNIT_TEST_PACKAGES=(libgtest-dev)
     TEST_PACKAGES=(valgrind bats sqlite3 tzdata python3-pexpect mandoc bash-completion zsh fish doxygen curl nginx-light
-        caddy)
+        caddy openssl)
     CLANG_PACKAGES=(clang libclang-rt-dev lld)
     BENCH_PACKAGES=(libbenchmark-dev)
     PEER_PACKAGES=(libhiredis-dev libpq-dev) # to build what measures Redis and PostgreSQL
