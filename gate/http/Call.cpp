@@ -15,10 +15,11 @@ int hexDigit(char c)
     return 'a' <= cLower && cLower <= 'f' ? cLower - 'a' + 10 : -1;
 }
 
-// The first part of a path, which is removed with the slash behind it. Returns false for one that has no
+// The first part of a path, which is removed with the slash ahead of it. Returns false for one that has no
 // meaning here, or could have two.
 bool takePart(std::string_view& strPath, std::string& strPart)
 {
+    strPath.remove_prefix(1);
     const size_t cbPart = std::min(strPath.find('/'), strPath.size());
     for (size_t i = 0; i < cbPart; ++i) {
         char c = strPath[i];
@@ -36,8 +37,8 @@ bool takePart(std::string_view& strPath, std::string& strPart)
         }
         strPart += c;
     }
-    strPath.remove_prefix(std::min(cbPart + 1, strPath.size()));
-    return strPart != "." && strPart != "..";
+    strPath.remove_prefix(cbPart);
+    return !strPart.empty() && strPart != "." && strPart != "..";
 }
 
 int readTarget(std::string_view strTarget, gate::Call& call)
@@ -46,9 +47,10 @@ int readTarget(std::string_view strTarget, gate::Call& call)
     if (strTarget.substr(0, strGrant.size()) != strGrant || std::string_view::npos != strTarget.find('#')) {
         return 400;
     }
-    std::string_view strPath = strTarget.substr(strGrant.size());
+    std::string_view strPath = strTarget.substr(strGrant.size() - 1);
     strPath = strPath.substr(0, strPath.find('?'));
-    if (!takePart(strPath, call.strApi) || !takePart(strPath, call.strMethod) || call.strApi.empty()) {
+    // A method that is empty is not none: the API alone would allow more than who left it empty may think.
+    if (!takePart(strPath, call.strApi) || (!strPath.empty() && !takePart(strPath, call.strMethod))) {
         return 400;
     }
     return call.strApi.size() > gate::API_MAX || call.strMethod.size() > gate::METHOD_MAX ? 414 : 0;
@@ -99,10 +101,7 @@ int readCall(const Head& head, const std::string& strOnceHeader, Call& call)
             return 400;
         }
     }
-    for (const Head::Header& header : head.headers) {
-        call.blRecord = call.blRecord || ("accept" == header.strName &&
-                                          std::string_view::npos != header.strValue.find("application/json"));
-    }
+    call.blRecord = head.lists("accept", "application/json");
     return 0;
 }
 

@@ -72,15 +72,16 @@ Scan scan(std::string_view strBytes, size_t& nPlace)
     return Scan::Incomplete;
 }
 
-bool readLine(std::string_view strLine, gate::Head& head, bool& blOld)
+bool readLine(std::string_view strLine, gate::Head& head)
 {
     head.strMethod = cut(strLine, " ");
     head.strTarget = cut(strLine, " ");
-    blOld = "HTTP/1.0" == strLine;
+    head.blOld = "HTTP/1.0" == strLine;
     const bool blPlain = std::all_of(head.strTarget.begin(), head.strTarget.end(), [](char c) {
         return '\t' != c; // blanks are the separators
     });
-    return isToken(head.strMethod) && !head.strTarget.empty() && blPlain && (blOld || "HTTP/1.1" == strLine);
+    return isToken(head.strMethod) && !head.strTarget.empty() && blPlain &&
+           (head.blOld || "HTTP/1.1" == strLine);
 }
 
 bool readHeader(std::string_view strLine, gate::Head& head)
@@ -93,33 +94,14 @@ bool readHeader(std::string_view strLine, gate::Head& head)
     return true;
 }
 
-// Whether the connection goes on, by what the client says of it.
-bool keepsAlive(const gate::Head& head, bool blOld)
-{
-    bool blKeep = !blOld;
-    for (const auto& header : head.headers) {
-        if ("connection" != header.strName) {
-            continue;
-        }
-        for (std::string_view strRest = header.strValue; !strRest.empty();) {
-            const std::string strOption = lower(trimmed(cut(strRest, ",")));
-            if ("close" == strOption) {
-                return false;
-            }
-            blKeep = blKeep || "keep-alive" == strOption;
-        }
-    }
-    return blKeep;
-}
-
 // Whether a body follows; nothing where that is not clear.
-std::optional<bool> announcesBody(const gate::Head& head, bool blOld)
+std::optional<bool> announcesBody(const gate::Head& head)
 {
     const size_t nCoded = head.count("transfer-encoding");
     const size_t nSized = head.count("content-length");
     if (nCoded) {
         const bool blClear =
-            1 == nCoded && 0 == nSized && !blOld && "chunked" == lower(head.value("transfer-encoding"));
+            1 == nCoded && 0 == nSized && !head.blOld && "chunked" == lower(head.value("transfer-encoding"));
         return blClear ? std::optional<bool>(true) : std::nullopt;
     }
     if (0 == nSized) {
@@ -155,6 +137,20 @@ std::string_view Head::value(std::string_view strName) const
     return {};
 }
 
+bool Head::lists(std::string_view strName, std::string_view strElement) const
+{
+    for (const Header& header : headers) {
+        std::string_view strRest = strName == header.strName ? header.strValue : std::string_view();
+        while (!strRest.empty()) {
+            std::string_view strOne = cut(strRest, ",");
+            if (strElement == lower(trimmed(cut(strOne, ";")))) {
+                return true;
+            }
+        }
+    }
+    return false;
+}
+
 Reading readHead(std::string_view strBytes, size_t& cbSeen, Head& head, size_t& cbHead)
 {
     if (!strBytes.empty() && !isToken(strBytes[0])) {
@@ -162,14 +158,15 @@ Reading readHead(std::string_view strBytes, size_t& cbSeen, Head& head, size_t& 
     }
     const Scan found = scan(strBytes, cbSeen);
     const size_t cbLine = strBytes.substr(0, cbSeen).find('\r');
-    if (Scan::Bad == found) {
-        return Reading::BadRequest;
-    }
+    // The limits first: what stands behind them may not have come yet.
     if (std::min(cbLine, cbSeen) > LINE_MAX_BYTES) {
         return Reading::TargetTooLong;
     }
     if (cbSeen > HEAD_MAX_BYTES) {
         return Reading::HeadTooLarge;
+    }
+    if (Scan::Bad == found) {
+        return Reading::BadRequest;
     }
     if (Scan::Incomplete == found) {
         return Reading::Incomplete;
@@ -177,9 +174,8 @@ Reading readHead(std::string_view strBytes, size_t& cbSeen, Head& head, size_t& 
 
     cbHead = cbSeen;
     head = Head();
-    bool blOld = false;
     std::string_view strRest = strBytes.substr(0, cbHead - 2); // without the empty line
-    if (!readLine(cut(strRest, "\r\n"), head, blOld)) {
+    if (!readLine(cut(strRest, "\r\n"), head)) {
         return Reading::BadRequest;
     }
     while (!strRest.empty()) {
@@ -190,12 +186,13 @@ Reading readHead(std::string_view strBytes, size_t& cbSeen, Head& head, size_t& 
             return Reading::BadRequest;
         }
     }
-    const std::optional<bool> blBody = announcesBody(head, blOld);
-    if (!blBody || head.count("host") > 1 || (0 == head.count("host") && !blOld)) {
+    const std::optional<bool> blBody = announcesBody(head);
+    if (!blBody || head.count("host") > 1 || (0 == head.count("host") && !head.blOld)) {
         return Reading::BadRequest;
     }
     head.blBody = *blBody;
-    head.blKeepAlive = !head.blBody && keepsAlive(head, blOld);
+    head.blKeepAlive = !head.blBody && !head.lists("connection", "close") &&
+                       (!head.blOld || head.lists("connection", "keep-alive"));
     return Reading::Whole;
 }
 

@@ -21,12 +21,17 @@ const size_t HEADERS_MAX = 256;
 struct Head {
     std::string_view strMethod;
     std::string_view strTarget;
+    bool blOld = false;       // of HTTP/1.0
     bool blKeepAlive = false; // the connection can take another request afterwards
     bool blBody = false;      // a body follows
 
     // How many headers of a name there are (in lower case), and the value of the first.
     size_t count(std::string_view strName) const;
     std::string_view value(std::string_view strName) const;
+
+    // Whether an element (in lower case) stands in the headers of a name that are lists. Parameters do not
+    // count.
+    bool lists(std::string_view strName, std::string_view strElement) const;
 
     struct Header {
         std::string strName; // in lower case
@@ -45,7 +50,7 @@ enum class Reading {
 
 // Reads the head that strBytes begins with. cbHead receives its size when it is whole; the head's views are
 // of strBytes. cbSeen, 0 at first, tells from call to call how much has been looked at, so that a slow head
-// costs no more than a quick one.
+// costs no more than a quick one, and is read alike.
 Reading readHead(std::string_view strBytes, size_t& cbSeen, Head& head, size_t& cbHead);
 
 } // namespace gate

@@ -62,7 +62,10 @@ std::string response(const Status& status, std::string_view strHeaders, std::str
         strResponse.append("Content-Type: ").append(strType).append("\r\n");
     }
     strResponse.append("Content-Length: ").append(std::to_string(strBody.size())).append("\r\n");
-    strResponse.append(manner.blKeepAlive ? "\r\n" : "Connection: close\r\n\r\n");
+    if (!manner.blKeepAlive || manner.blOld) {
+        strResponse.append(manner.blKeepAlive ? "Connection: keep-alive\r\n" : "Connection: close\r\n");
+    }
+    strResponse.append("\r\n");
     if (!manner.blHead) {
         strResponse.append(strBody);
     }

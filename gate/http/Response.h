@@ -14,6 +14,7 @@ namespace gate {
 struct Manner {
     bool blKeepAlive = false;
     bool blHead = false; // without its body, as HEAD has it
+    bool blOld = false;  // for HTTP/1.0, which is told that the connection goes on
 };
 
 // For a call that has been decided.

@@ -194,7 +194,7 @@ void Server::readNext(Connection& connection)
         if (Reading::Incomplete == reading && !connection.hasEnded()) {
             return;
         }
-        connection.manner = {head.blKeepAlive && !m_nStopping, "HEAD" == head.strMethod};
+        connection.manner = {head.blKeepAlive && !m_nStopping, "HEAD" == head.strMethod, head.blOld};
         switch (reading) {
         case Reading::TargetTooLong: connection.manner = {}; return respond(connection, 414);
         case Reading::HeadTooLarge: connection.manner = {}; return respond(connection, 431);

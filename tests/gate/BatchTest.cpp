@@ -1,0 +1,197 @@
+#include "gate/Batch.h"
+
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+
+#include <memory>
+
+using gate::Answer;
+using gate::Outcome;
+using gate::Owners;
+using gate::Request;
+
+namespace {
+
+// A database in memory with tokens whose ids tell what they are, and a batch over it.
+class Batch : public testing::Test {
+protected:
+    void SetUp() override
+    {
+        sqlite3* pDb = nullptr;
+        ASSERT_EQ(SQLITE_OK, sqlite3_open(":memory:", &pDb));
+        m_pDb.reset(pDb);
+        run("CREATE TABLE token (tid TEXT PRIMARY KEY, bind_sid TEXT, uid INTEGER, deadline INTEGER, count "
+            "INTEGER, "
+            "create_time INTEGER, function TEXT, webapi_allow TEXT, extra TEXT)");
+        for (const auto& [szTid, szChange] : {
+                 std::pair("three", "count = 3"),
+                 std::pair("one", "count = 1"),
+                 std::pair("none", "count = 0"),
+                 std::pair("unlimited", "count = -1"),
+                 std::pair("expired", "deadline = 1"),
+                 std::pair("malformed", "webapi_allow = '[]'"),
+                 std::pair("null", "function = NULL"),
+                 std::pair("nobody", "uid = -1"),
+                 std::pair("no uid", "uid = 4294967295"),
+                 std::pair("last uid", "uid = 4294967294"),
+                 std::pair("slow", "uid = 1"),
+                 std::pair("failing", "uid = 2"),
+                 std::pair("unnamed", "uid = 3"),
+                 std::pair("long", "function = printf('%.*c', 1024, 'f')"),
+                 std::pair("too long", "function = printf('%.*c', 1025, 'f')"),
+                 std::pair("large", "bind_sid = printf('%.*c', 16384, 's')"),
+             }) {
+            run(std::string("INSERT INTO token VALUES ('") + szTid +
+                "', 's', 1000, 9999999999, 2, 5, 'VPN', " +
+                "'{\"Api\":{\"method\":[\"get\"]}}', '{}'); UPDATE token SET " + szChange + " WHERE tid = '" +
+                szTid + "'");
+        }
+        m_tokens.emplace(m_pDb.get());
+        m_batch.emplace(*m_tokens, m_fOwner);
+    }
+
+    void run(const std::string& strSql)
+    {
+        ASSERT_EQ(SQLITE_OK, sqlite3_exec(m_pDb.get(), strSql.c_str(), nullptr, nullptr, nullptr)) << strSql;
+    }
+
+    // How many uses a token has, or "gone".
+    std::string uses(const std::string& strTid)
+    {
+        grant::Statement select(m_pDb.get(), "SELECT count FROM token WHERE tid = ?1");
+        return select.bind(1, strTid).step() ? select.text(0) : "gone";
+    }
+
+    std::optional<Answer> call(const std::string& strTid, const std::string& strMethod = "get",
+                               const std::string& strApi = "Api", bool blRecord = false)
+    {
+        Request request;
+        request.nNumber = ++m_nNumber;
+        request.strTid = strTid;
+        request.strApi = strApi;
+        request.strMethod = strMethod;
+        request.blRecord = blRecord;
+        std::optional<Answer> answer = m_batch->call(request);
+        EXPECT_EQ(m_nNumber, answer ? answer->nNumber : m_nNumber);
+        return answer;
+    }
+
+    // The outcomes of so many calls, by their letters.
+    std::string calls(size_t nCalls, const std::string& strTid)
+    {
+        std::string strOutcomes;
+        for (size_t i = 0; i < nCalls; ++i) {
+            strOutcomes += "GRF"[static_cast<size_t>(call(strTid)->outcome)];
+        }
+        return strOutcomes;
+    }
+
+    gate::Figures figures() const { return m_batch->figures(); }
+
+    std::unique_ptr<sqlite3, decltype(&sqlite3_close)> m_pDb{nullptr, sqlite3_close};
+    std::optional<grant::Tokens> m_tokens;
+    std::optional<gate::Batch> m_batch;
+
+private:
+    static Owners::Owner owner(uid_t uid)
+    {
+        const Owners::State STATES[] = {Owners::State::Known, Owners::State::Asked, Owners::State::Failing,
+                                        Owners::State::Nobody};
+        return {STATES[uid < 4 ? uid : 0], "user" + std::to_string(uid), 0};
+    }
+
+    const std::function<Owners::Owner(uid_t)> m_fOwner = owner;
+    uint64_t m_nNumber = 0;
+};
+
+} // namespace
+
+TEST_F(Batch, SpendsTheUsesThatItsOwnCallsHaveLeft)
+{
+    const struct {
+        const char* szTid;
+        const char* szOutcomes;
+        const char* szUses; // afterwards
+    } TOKENS[] = {
+        {"three", "GGGR", "gone"},   {"one", "GR", "gone"},  {"none", "GR", "gone"},
+        {"unlimited", "GGGG", "-1"}, {"last uid", "G", "1"}, {"long", "G", "1"},
+    };
+    for (const auto& row : TOKENS) {
+        const std::string strBefore = uses(row.szTid);
+        EXPECT_EQ(row.szOutcomes, calls(strlen(row.szOutcomes), row.szTid));
+        EXPECT_EQ(strBefore, uses(row.szTid)) << "nothing is written before it is saved";
+    }
+    m_batch->save();
+    for (const auto& row : TOKENS) {
+        EXPECT_EQ(row.szUses, uses(row.szTid)) << row.szTid;
+    }
+    EXPECT_EQ(11U, figures()[gate::GRANTED]);
+    EXPECT_EQ(3U, figures()[gate::REFUSED_UNKNOWN]);
+}
+
+TEST_F(Batch, RefusesAndSpendsNothing)
+{
+    const struct {
+        const char* szTid;
+        const char* szApi;
+        const char* szMethod;
+        gate::Figure figure;
+    } CALLS[] = {
+        {"unknown", "Api", "get", gate::REFUSED_UNKNOWN},
+        {"three", "Other", "get", gate::REFUSED_API},
+        {"three", "Api", "put", gate::REFUSED_METHOD},
+        {"expired", "Api", "get", gate::REFUSED_EXPIRED},
+        {"malformed", "Api", "get", gate::REFUSED_MALFORMED},
+        {"null", "Api", "get", gate::REFUSED_MALFORMED},
+        {"nobody", "Api", "get", gate::REFUSED_OWNER},
+        {"no uid", "Api", "get", gate::REFUSED_OWNER},
+        {"unnamed", "Api", "get", gate::REFUSED_OWNER},
+        {"too long", "Api", "get", gate::REFUSED_LARGE},
+    };
+    for (const auto& row : CALLS) {
+        const std::string strBefore = uses(row.szTid);
+        const uint64_t nBefore = figures()[row.figure];
+        EXPECT_EQ(Outcome::Refused, call(row.szTid, row.szMethod, row.szApi)->outcome) << row.szTid;
+        EXPECT_EQ(nBefore + 1, figures()[row.figure]) << row.szTid;
+        m_batch->save();
+        EXPECT_EQ(strBefore, uses(row.szTid)) << row.szTid;
+    }
+    EXPECT_EQ(0U, figures()[gate::GRANTED]);
+}
+
+TEST_F(Batch, RefusesARecordThatNoAnswerCanCarryAndNotTheCall)
+{
+    EXPECT_EQ(Outcome::Refused, call("large", "get", "Api", true)->outcome);
+    EXPECT_EQ(1U, figures()[gate::REFUSED_LARGE]);
+    EXPECT_EQ(Outcome::Granted, call("large")->outcome);
+    m_batch->save();
+    EXPECT_EQ("1", uses("large"));
+}
+
+TEST_F(Batch, WaitsForTheNameOfTheOwner)
+{
+    EXPECT_FALSE(call("slow"));
+    EXPECT_EQ(Outcome::Failed, call("failing")->outcome);
+    EXPECT_EQ(1U, figures()[gate::FAILED]);
+    m_batch->save();
+    EXPECT_EQ("2", uses("slow"));
+    EXPECT_EQ("2", uses("failing"));
+}
+
+TEST_F(Batch, TellsTheTokenAsItIsAfterTheCallButForItsLastUse)
+{
+    const std::string strBegin = R"({"bind_sid":"s","count":)";
+    const std::string strEnd =
+        R"(,"create_time":5,"deadline":9999999999,"extra":{},"function":"VPN","uid":1000,)"
+        R"("webapi_allow":{"Api":{"method":["get"]}}})";
+    for (const char* szCount : {"2", "1", "1"}) {
+        const Answer answer = call("three", "get", "Api", true).value();
+        EXPECT_EQ("user1000", answer.strUser);
+        EXPECT_EQ(1000U, answer.nUid);
+        EXPECT_EQ("VPN", answer.strFunction);
+        const std::string strWanted = strBegin + szCount + strEnd;
+        EXPECT_EQ(strWanted, answer.strRecord.substr(0, strWanted.size()));
+        EXPECT_GE(strWanted.size() + 1, answer.strRecord.size());
+    }
+    EXPECT_EQ("", call("one", "")->strRecord) << "of the API alone, and without the record";
+}
