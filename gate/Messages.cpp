@@ -154,8 +154,8 @@ std::optional<Answer> decodeAnswer(std::string_view strMessage)
     answer.strFunction = reader.takeText(head.cbFunction, FUNCTION_MAX);
     answer.strRecord = reader.take(head.cbRecord, RECORD_MAX);
     const std::string_view strFigures = reader.take(head.cbFigures, sizeof(Figures));
-    if (!reader.isWhole() || head.nOutcome > static_cast<uint8_t>(Outcome::Stop) ||
-        (!strFigures.empty() && strFigures.size() != sizeof(Figures))) {
+    if (!reader.isWhole() || head.nOutcome > static_cast<uint8_t>(Outcome::Stop) || head.nHealthy > 1 ||
+        head.nUnused || (!strFigures.empty() && strFigures.size() != sizeof(Figures))) {
         return std::nullopt;
     }
     answer.nNumber = head.nNumber;
@@ -164,6 +164,12 @@ std::optional<Answer> decodeAnswer(std::string_view strMessage)
     answer.nUid = head.nUid;
     if (!strFigures.empty()) {
         memcpy(answer.figures.data(), strFigures.data(), strFigures.size());
+    }
+    const bool blToken = head.nUid || head.cbUser || head.cbFunction || head.cbRecord;
+    const bool blTold = head.nHealthy || head.cbFigures;
+    if ((blToken && Outcome::Granted != answer.outcome) || (blTold && Outcome::Told != answer.outcome) ||
+        (head.cbFigures && answer.figures == Figures())) {
+        return std::nullopt;
     }
     return answer;
 }

@@ -83,7 +83,7 @@ struct Answer {
     uint64_t nNumber = 0;
     Outcome outcome = Outcome::Failed;
     bool blHealthy = false; // for Ask::Health
-    uint32_t nUid = 0;
+    uint32_t nUid = 0;      // this and the texts: for Outcome::Granted
     std::string strUser;
     std::string strFunction;
     std::string strRecord; // without the tid; JSON
@@ -98,7 +98,8 @@ const size_t ANSWER_MAX = 64 + USER_MAX + FUNCTION_MAX + RECORD_MAX;
 std::string encode(const Request& request);
 std::string encode(const Answer& answer);
 
-// Nothing for what is no message: a size, a text's size or a value that cannot be.
+// Nothing for what is no message: a size, a text's size or a value that cannot be. So each message has one
+// form.
 std::optional<Request> decodeRequest(std::string_view strMessage);
 std::optional<Answer> decodeAnswer(std::string_view strMessage);
 
