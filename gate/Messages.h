@@ -43,12 +43,13 @@ struct Request {
 };
 
 enum class Outcome : uint8_t {
-    Granted, // one use is spent; strUser, nUid and strFunction tell whose token it is
-    Refused, // nothing is spent
-    Failed,  // the store failed, and nothing is spent
-    Late,    // it was due, and nothing is spent
-    Told,    // what Ask::Health and Ask::Figures asked for
-    Stop     // no answer: take no more calls, and end when all are answered
+    Granted,   // one use is spent; strUser, nUid and strFunction tell whose token it is
+    Refused,   // nothing is spent
+    Failed,    // the store failed, and nothing is spent
+    Late,      // it was due, and nothing is spent
+    Cancelled, // by Ask::Cancel, and nothing is spent
+    Told,      // what Ask::Health and Ask::Figures asked for
+    Stop       // no answer: take no more calls, and end when all are answered
 };
 
 // What the process that holds the tokens counts. All begin at 0 when it starts.

@@ -140,12 +140,15 @@ void Service::cancel(uint64_t nNumber)
     const auto itCall = std::find_if(m_calls.begin(), m_calls.end(), isIt);
     const auto itParked = std::find_if(m_parked.begin(), m_parked.end(), isIt);
     if (itCall != m_calls.end()) {
+        answer(*itCall, Outcome::Cancelled);
         m_calls.erase(itCall);
-        ++m_figures[CANCELLED];
     } else if (itParked != m_parked.end()) {
+        answer(*itParked, Outcome::Cancelled);
         m_parked.erase(itParked);
-        ++m_figures[CANCELLED];
+    } else {
+        return; // it has its answer already
     }
+    ++m_figures[CANCELLED];
 }
 
 void Service::look()

@@ -74,7 +74,7 @@ void Connection::receive()
         m_blEnded = true;
         event_del(m_readable.get());
         // One who has only finished sending still wants the answer that is under way.
-        m_blOver = 0 > cbBytes || State::Closing == state || hasGone() || isIdle();
+        m_blOver = m_blOver || 0 > cbBytes || State::Closing == state || hasGone() || isIdle();
         return;
     }
     if (State::Closing == state) {
@@ -84,12 +84,11 @@ void Connection::receive()
         nSince = now(); // a head begins
     }
     strInput.append(rgBytes, static_cast<size_t>(cbBytes));
-    if (State::Reading != state && strInput.size() > HEAD_MAX_BYTES) {
-        event_del(m_readable.get()); // until what is there has been taken
+    if (!isReady() && strInput.size() > HEAD_MAX_BYTES) {
+        event_del(m_readable.get()); // until a response has gone
     }
 }
 
-// Whether the client has closed its end for both directions.
 bool Connection::hasGone() const
 {
     struct pollfd end = {m_nSocket, 0, 0};
@@ -101,9 +100,6 @@ void Connection::send(const std::string& strResponse)
     changeTo(State::Reading);
     m_strOutput.append(strResponse);
     flush();
-    if (!m_blEnded) {
-        event_add(m_readable.get(), nullptr);
-    }
 }
 
 void Connection::flush()
@@ -120,6 +116,9 @@ void Connection::flush()
         return;
     }
     event_del(m_writable.get());
+    if (!m_blEnded) {
+        event_add(m_readable.get(), nullptr);
+    }
     if (!manner.blKeepAlive) {
         finish();
     }
@@ -131,7 +130,7 @@ void Connection::finish()
     shutdown(m_nSocket, SHUT_WR);
     changeTo(State::Closing);
     strInput.clear();
-    m_blOver = m_blEnded;
+    m_blOver = m_blOver || m_blEnded;
 }
 
 } // namespace gate

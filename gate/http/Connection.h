@@ -68,6 +68,9 @@ public:
     // The client sends nothing more.
     bool hasEnded() const { return m_blEnded; }
 
+    // The client has closed its end for both directions.
+    bool hasGone() const;
+
     void changeTo(State stateNew);
 
 private:
@@ -76,7 +79,6 @@ private:
     void receive();
     void flush();
     void finish();
-    bool hasGone() const;
 
     const int m_nSocket;
     const std::function<void(Connection&)> m_fChanged;

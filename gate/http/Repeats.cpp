@@ -5,7 +5,12 @@
 namespace {
 
 const int64_t REMEMBERED = 5 * gate::SECOND;
-const size_t REMEMBERED_MAX = 65536; // the oldest are forgotten beyond
+const size_t HELD_MAX = 32 << 20; // bytes; the oldest are forgotten beyond
+
+size_t sizeOf(const gate::Answer& answer)
+{
+    return answer.strUser.size() + answer.strFunction.size() + answer.strRecord.size();
+}
 
 } // namespace
 
@@ -13,12 +18,11 @@ namespace gate {
 
 void Repeats::expire(int64_t nNow)
 {
-    while (!m_due.empty() && (m_due.front().nUntil <= nNow || m_due.size() > REMEMBERED_MAX)) {
-        const auto it = m_entries.find(m_due.front().strKey);
-        if (it != m_entries.end() && it->second.nCall == m_due.front().nCall) {
-            m_entries.erase(it);
-        }
+    while (!m_due.empty() && (m_due.front().nUntil <= nNow || m_cbHeld > HELD_MAX)) {
+        const Due due = std::move(m_due.front());
         m_due.pop_front();
+        m_cbHeld -= sizeof(due) + due.strKey.size();
+        forget(due.strKey, due.nCall);
     }
 }
 
@@ -31,19 +35,28 @@ const Repeats::Remembered* Repeats::find(const std::string& strKey, uint64_t nCa
     }
     it->second.nCall = nCall;
     m_due.push_back({nNow + REMEMBERED, strKey, nCall});
+    m_cbHeld += sizeof(Remembered) + sizeof(Due) + 2 * strKey.size();
     return nullptr;
 }
 
 void Repeats::answer(const std::string& strKey, const Answer& answer)
 {
-    const auto it = m_entries.find(strKey);
-    if (it == m_entries.end() || it->second.nCall != answer.nNumber) {
-        return;
+    if (Outcome::Granted != answer.outcome && Outcome::Refused != answer.outcome) {
+        return forget(strKey, answer.nNumber);
     }
-    if (Outcome::Granted == answer.outcome || Outcome::Refused == answer.outcome) {
+    const auto it = m_entries.find(strKey);
+    if (it != m_entries.end() && it->second.nCall == answer.nNumber) {
         it->second.blAnswered = true;
         it->second.answer = answer;
-    } else {
+        m_cbHeld += sizeOf(answer);
+    }
+}
+
+void Repeats::forget(const std::string& strKey, uint64_t nCall)
+{
+    const auto it = m_entries.find(strKey);
+    if (it != m_entries.end() && it->second.nCall == nCall) {
+        m_cbHeld -= sizeof(Remembered) + strKey.size() + sizeOf(it->second.answer);
         m_entries.erase(it);
     }
 }

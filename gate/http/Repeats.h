@@ -13,7 +13,7 @@
 namespace gate {
 
 // What is remembered for some seconds of each call that has a key. A key counts for one call only: the same
-// key with another id, API or method is another call.
+// key with another id, API or method, or for an answer with the record, is another call.
 class Repeats {
 public:
     struct Remembered {
@@ -29,7 +29,7 @@ public:
     // Remembers the answer of a call. An answer that spent nothing because something failed is forgotten: the
     // next may have more luck.
     void answer(const std::string& strKey, const Answer& answer);
-    void forget(const std::string& strKey) { m_entries.erase(strKey); }
+    void forget(const std::string& strKey, uint64_t nCall);
 
 private:
     struct Due {
@@ -41,6 +41,7 @@ private:
 
     std::unordered_map<std::string, Remembered> m_entries;
     std::deque<Due> m_due; // in the order in which they become due
+    size_t m_cbHeld = 0;   // of memory, about
 };
 
 } // namespace gate

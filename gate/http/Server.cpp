@@ -22,6 +22,7 @@ const int64_t CALL_WAIT = gate::SECOND;
 const int64_t STOP_WAIT = gate::SECOND / 2; // for requests on connections that are open already
 const size_t ACCEPTED_AT_ONCE = 64;
 const size_t SENT_AT_ONCE = 16; // calls go on while others are still read
+const size_t UNSENT_MAX = 2048; // messages; beyond, the other process stands still
 
 template <typename Pointer>
 Pointer required(Pointer p)
@@ -94,49 +95,49 @@ void Server::onTick(int, short, void* pServer)
     static_cast<Server*>(pServer)->tick();
 }
 
-bool Server::accept(int nSocket)
+void Server::accept(int nSocket)
 {
     for (size_t i = 0; i < ACCEPTED_AT_ONCE; ++i) {
         const int nConnection = accept4(nSocket, nullptr, nullptr, SOCK_NONBLOCK | SOCK_CLOEXEC);
         if (0 > nConnection) {
-            return false;
+            return;
         }
         m_connections.emplace_back(m_pBase.get(), nConnection, nSocket == m_nStatus,
                                    [this](Connection& connection) { changed(connection); });
-        if (!makeRoom(m_connections.back().uid)) {
+        if (!makeRoomFor(m_connections.back())) {
             m_connections.pop_back();
             m_metrics.countTurnedAway();
         }
     }
-    return true;
 }
 
-// Closes a connection that waits for its client, if there are too many: of the same user, if that user has
-// too many. Returns false where all wait for the gate.
-bool Server::makeRoom(uid_t uid)
+// If there are too many connections now, closes one: of the same user, if that user has too many. Returns
+// false where there is none to close.
+bool Server::makeRoomFor(const Connection& connection)
 {
     size_t nOfUser = 0;
-    for (const Connection& connection : m_connections) {
-        nOfUser += connection.uid == uid;
+    for (const Connection& other : m_connections) {
+        nOfUser += other.uid == connection.uid;
     }
     const bool blUser = nOfUser > CONNECTIONS_OF_USER_MAX;
-    if (!blUser && m_connections.size() <= CONNECTIONS_MAX) {
-        return true;
-    }
-    Connection* pOldest = nullptr;
-    for (auto it = m_connections.begin(); it != std::prev(m_connections.end()); ++it) {
-        const bool blCandidate =
-            Connection::State::Waiting != it->state && !it->isOver() && (!blUser || it->uid == uid);
-        if (blCandidate && (!pOldest || it->nSince < pOldest->nSince)) {
-            pOldest = &*it;
+    return (!blUser && m_connections.size() <= CONNECTIONS_MAX) || closeOldest(connection, blUser);
+}
+
+// Closes the connection that waits for its client longest. Returns false where all wait for the gate.
+bool Server::closeOldest(const Connection& newest, bool blOfUser)
+{
+    const Connection* pOldest = nullptr;
+    for (const Connection& connection : m_connections) {
+        const bool blCandidate = &connection != &newest && Connection::State::Waiting != connection.state &&
+                                 (!blOfUser || connection.uid == newest.uid);
+        if (blCandidate && (!pOldest || connection.nSince < pOldest->nSince)) {
+            pOldest = &connection;
         }
     }
     if (!pOldest) {
         return false;
     }
     m_metrics.countTurnedAway();
-    forget(*pOldest);
-    m_changed.erase(std::remove(m_changed.begin(), m_changed.end(), pOldest), m_changed.end());
     m_connections.remove_if([pOldest](const Connection& connection) { return &connection == pOldest; });
     return true;
 }
@@ -146,18 +147,19 @@ void Server::changed(Connection& connection)
     if (connection.isReady()) {
         readNext(connection);
     }
-    if (connection.isOver()) {
-        m_changed.push_back(&connection);
+    if (connection.hasEnded() && connection.isIdle()) {
+        connection.end(); // all that was asked is answered
     }
+    m_blOver = m_blOver || connection.isOver();
 }
 
 // Destroys what is over. Not in the middle of its own events.
 void Server::sweep()
 {
-    if (m_changed.empty()) {
+    if (!m_blOver) {
         return;
     }
-    m_changed.clear();
+    m_blOver = false;
     m_connections.remove_if([this](Connection& connection) {
         if (connection.isOver()) {
             forget(connection);
@@ -175,14 +177,16 @@ void Server::forget(Connection& connection)
     }
     std::vector<Connection*>& waiting = it->second.waiting;
     waiting.erase(std::remove(waiting.begin(), waiting.end(), &connection), waiting.end());
-    if (waiting.empty()) {
-        Request cancel;
-        cancel.ask = Ask::Cancel;
-        cancel.nNumber = it->first;
-        m_link.add(encode(cancel));
-        m_repeats.forget(it->second.strKey);
-        m_asked.erase(it);
+    if (!waiting.empty()) {
+        return;
     }
+    Request cancel;
+    cancel.ask = Ask::Cancel;
+    cancel.nNumber = it->first;
+    m_link.add(encode(cancel));
+    if (it->second.strKey.empty()) {
+        m_asked.erase(it);
+    } // else it may come again before it is known whether a use was spent
 }
 
 void Server::readNext(Connection& connection)
@@ -195,6 +199,7 @@ void Server::readNext(Connection& connection)
             return;
         }
         connection.manner = {head.blKeepAlive && !m_nStopping, "HEAD" == head.strMethod, head.blOld};
+        connection.nSince = now();
         switch (reading) {
         case Reading::TargetTooLong: connection.manner = {}; return respond(connection, 414);
         case Reading::HeadTooLarge: connection.manner = {}; return respond(connection, 431);
@@ -202,7 +207,6 @@ void Server::readNext(Connection& connection)
         case Reading::BadRequest: connection.manner = {}; return respond(connection, 400);
         case Reading::Whole: break;
         }
-        connection.nSince = now();
         if (connection.blStatus) {
             readStatus(connection, head);
             connection.take(cbHead);
@@ -234,17 +238,21 @@ void Server::readStatus(Connection& connection, const Head& head)
     }
     Request request;
     request.ask = Ask::Health;
-    ask(request, connection, "");
+    Asked asked;
+    asked.blHealth = true;
+    ask(std::move(request), connection, std::move(asked));
 }
 
 void Server::askCall(Connection& connection, const Call& call)
 {
-    std::string strKey;
+    Asked asked;
+    asked.call = call;
     if (!call.strOnce.empty()) {
         for (const std::string* pText : {&call.strOnce, &call.strTid, &call.strApi, &call.strMethod}) {
-            strKey.append(*pText).append(1, '\0');
+            asked.strKey.append(*pText).append(1, '\0');
         }
-        if (const Repeats::Remembered* pRemembered = m_repeats.find(strKey, m_nNumber + 1, now())) {
+        asked.strKey.append(call.blRecord ? "record" : "");
+        if (const Repeats::Remembered* pRemembered = m_repeats.find(asked.strKey, m_nNumber + 1, now())) {
             m_metrics.countRepeated();
             if (pRemembered->blAnswered) {
                 return respond(connection, pRemembered->answer);
@@ -262,15 +270,20 @@ void Server::askCall(Connection& connection, const Call& call)
     request.strTid = call.strTid;
     request.strApi = call.strApi;
     request.strMethod = call.strMethod;
-    ask(std::move(request), connection, strKey);
+    ask(std::move(request), connection, std::move(asked));
 }
 
-void Server::ask(Request request, Connection& connection, std::string strKey)
+void Server::ask(Request request, Connection& connection, Asked asked)
 {
     request.nNumber = ++m_nNumber;
+    if (m_link.waiting() >= UNSENT_MAX) {
+        m_repeats.forget(asked.strKey, request.nNumber);
+        return respond(connection, 503);
+    }
     connection.nCall = request.nNumber;
     connection.changeTo(Connection::State::Waiting);
-    m_asked[request.nNumber] = {{&connection}, std::move(strKey), Ask::Health == request.ask};
+    asked.waiting.push_back(&connection);
+    m_asked[request.nNumber] = std::move(asked);
     m_link.add(encode(request));
     if (m_link.waiting() >= SENT_AT_ONCE) {
         m_blAlone = m_blAlone || !m_link.flush();
@@ -307,18 +320,21 @@ void Server::take(std::string_view strMessage)
     if (Outcome::Stop == answer->outcome) {
         return stop();
     }
+    if (m_nFigures == answer->nNumber) {
+        m_figures = answer->figures;
+        return;
+    }
     const auto it = m_asked.find(answer->nNumber);
     if (it == m_asked.end()) {
-        if (Outcome::Told == answer->outcome) {
-            m_figures = answer->figures; // nobody waits for them
-        }
         return;
     }
     const Asked asked = std::move(it->second);
     m_asked.erase(it);
     m_repeats.answer(asked.strKey, *answer);
     for (Connection* pConnection : asked.waiting) {
-        if (asked.blHealth) {
+        if (Outcome::Cancelled == answer->outcome) {
+            askCall(*pConnection, asked.call); // it has come again since
+        } else if (asked.blHealth) {
             const int nStatus = answer->blHealthy ? 200 : 503;
             const char* szBody = answer->blHealthy ? "healthy\n" : "the token database cannot be read\n";
             respond(*pConnection, nStatus, textResponse(nStatus, "text/plain", szBody, pConnection->manner));
@@ -338,7 +354,9 @@ void Server::tick()
         const bool blHurry = m_nStopping && nNow - m_nStopping > STOP_WAIT;
         int64_t nWait = HEAD_WAIT;
         switch (connection.state) {
-        case Connection::State::Waiting: continue;
+        case Connection::State::Waiting: // for a second at most, unless the other process stands still
+            nWait = connection.hasGone() ? 0 : INT64_MAX;
+            break;
         case Connection::State::Closing: nWait = CLOSE_WAIT; break;
         case Connection::State::Reading:
             nWait = connection.isIdle() ? (blHurry ? 0 : IDLE_WAIT)
@@ -347,14 +365,14 @@ void Server::tick()
         }
         if (nTook > nWait) {
             connection.end();
-            m_changed.push_back(&connection);
+            m_blOver = true;
         }
     }
     if (nNow >= m_nTickAt) {
         m_nTickAt = nNow + SECOND;
         Request request;
         request.ask = Ask::Figures;
-        request.nNumber = ++m_nNumber;
+        request.nNumber = m_nFigures = ++m_nNumber;
         m_link.add(encode(request));
     }
 }
@@ -363,7 +381,8 @@ void Server::tick()
 void Server::stop()
 {
     m_nStopping = now();
-    while (accept(m_nCalls)) {
+    for (size_t nAccepted = 0; nAccepted < CONNECTIONS_MAX; nAccepted += ACCEPTED_AT_ONCE) { // not for ever
+        accept(m_nCalls);
     }
     m_callsListening.reset();
     m_statusListening.reset();

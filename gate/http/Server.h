@@ -38,6 +38,7 @@ private:
     // A call that has been asked.
     struct Asked {
         std::vector<Connection*> waiting; // for its answer; more than one where it has come again
+        Call call;                        // what it is, for Ask::Grant
         std::string strKey;               // of Repeats; empty: none
         bool blHealth = false;
     };
@@ -46,13 +47,14 @@ private:
     static void onConnection(int nSocket, short, void* pServer);
     static void onLink(int, short, void* pServer);
     static void onTick(int, short, void* pServer);
-    bool accept(int nSocket); // whether there may be more
-    bool makeRoom(uid_t uid);
+    void accept(int nSocket);
+    bool makeRoomFor(const Connection& connection);
+    bool closeOldest(const Connection& newest, bool blOfUser);
     void changed(Connection& connection);
     void readNext(Connection& connection);
     void readStatus(Connection& connection, const Head& head);
     void askCall(Connection& connection, const Call& call);
-    void ask(Request request, Connection& connection, std::string strKey);
+    void ask(Request request, Connection& connection, Asked asked);
     void respond(Connection& connection, int nStatus, const std::string& strResponse);
     void respond(Connection& connection, int nStatus);
     void respond(Connection& connection, const Answer& answer);
@@ -68,12 +70,13 @@ private:
     const int m_nCalls;
     const int m_nStatus;
     Connections m_connections;
-    std::vector<Connection*> m_changed;          // to be looked at when all events of a round have been
+    bool m_blOver = false; // some of them are over, and go when all events of a round have been
     std::unordered_map<uint64_t, Asked> m_asked; // by their numbers
     uint64_t m_nNumber = 0;                      // the last that was used
     Repeats m_repeats;
     Metrics m_metrics;
     Figures m_figures = {};
+    uint64_t m_nFigures = 0; // the number of the request for them
     int64_t m_nTickAt = 0;
     int64_t m_nStopping = 0; // since when; 0: not
     bool m_blAlone = false;  // the other process has ended

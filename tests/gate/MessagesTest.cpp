@@ -117,8 +117,8 @@ TEST(Messages, AnswersComeBackAsTheyWere)
         EXPECT_EQ(answer.strRecord, read->strRecord);
         EXPECT_EQ(answer.figures, read->figures);
     }
-    for (const Outcome outcome :
-         {Outcome::Refused, Outcome::Failed, Outcome::Late, Outcome::Told, Outcome::Stop}) {
+    for (const Outcome outcome : {Outcome::Refused, Outcome::Failed, Outcome::Late, Outcome::Cancelled,
+                                  Outcome::Told, Outcome::Stop}) {
         Answer bare;
         bare.outcome = outcome;
         ASSERT_TRUE(decodeAnswer(encode(bare)));
@@ -177,7 +177,7 @@ TEST(Messages, AnswersWithWhatCannotBeAreNone)
     small.strFunction = "f";
     const std::string strSmall = encode(small);
     ASSERT_TRUE(decodeAnswer(strSmall));
-    EXPECT_FALSE(decodeAnswer(changed(strSmall, OUTCOME, 6)));
+    EXPECT_FALSE(decodeAnswer(changed(strSmall, OUTCOME, 7)));
     EXPECT_FALSE(decodeAnswer(changed(strSmall, HEALTHY, 1))) << "of a grant";
     EXPECT_FALSE(decodeAnswer(changed(strSmall, UNUSED, 1)));
     EXPECT_FALSE(decodeAnswer(changed(strSmall, ANSWER_HEAD, '\0')));
@@ -188,9 +188,9 @@ TEST(Messages, AnswersWithWhatCannotBeAreNone)
     EXPECT_FALSE(decodeAnswer(changed(strTold, FIGURES_SIZE, 0)));
     EXPECT_FALSE(decodeAnswer(strTold.substr(0, ANSWER_HEAD) + std::string(sizeof(gate::Figures), '\0')))
         << "figures of zeros are left out";
-    for (char cOutcome = 1; cOutcome <= 5; ++cOutcome) { // but for a grant, there is no token
+    for (char cOutcome = 1; cOutcome <= 6; ++cOutcome) { // but for a grant, there is no token
         EXPECT_FALSE(decodeAnswer(changed(strSmall, OUTCOME, cOutcome)));
-        EXPECT_EQ(4 == cOutcome, decodeAnswer(changed(strTold, OUTCOME, cOutcome)).has_value());
+        EXPECT_EQ(5 == cOutcome, decodeAnswer(changed(strTold, OUTCOME, cOutcome)).has_value());
     }
     struct Text {
         std::string Answer::*pText;

@@ -1,0 +1,532 @@
+// The process that reads HTTP, in a child of the test, which is its clients and the other process. Time
+// passes when the test says so, and a client's user is the number that its address ends with.
+
+#include "gate/http/Server.h"
+
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/mman.h>
+#include <sys/resource.h>
+#include <sys/socket.h>
+#include <sys/syscall.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cstring>
+
+#include "gate/Clock.h"
+
+namespace {
+
+std::atomic<int64_t>* g_pLater = nullptr; // how far the clock is ahead, in ns; shared with the child
+
+struct sockaddr_un addressOf(const std::string& strName)
+{
+    struct sockaddr_un address = {};
+    address.sun_family = AF_UNIX; // in the abstract name space, which leaves no files
+    memcpy(&address.sun_path[1], strName.data(), strName.size());
+    return address;
+}
+
+} // namespace
+
+extern "C" int clock_gettime(clockid_t clock, struct timespec* pTime) noexcept
+{
+    const int nResult = static_cast<int>(syscall(SYS_clock_gettime, clock, pTime));
+    if (g_pLater && CLOCK_REALTIME != clock) {
+        const int64_t nTime = pTime->tv_sec * gate::SECOND + pTime->tv_nsec + *g_pLater;
+        *pTime = {nTime / gate::SECOND, nTime % gate::SECOND};
+    }
+    return nResult;
+}
+
+extern "C" int getsockopt(int nSocket, int nLevel, int nOption, void* pValue, socklen_t* pcbValue) noexcept
+{
+    const long nResult = syscall(SYS_getsockopt, nSocket, nLevel, nOption, pValue, pcbValue);
+    if (SO_PEERCRED == nOption) {
+        struct sockaddr_un address = {};
+        socklen_t cbAddress = sizeof(address);
+        getpeername(nSocket, reinterpret_cast<struct sockaddr*>(&address), &cbAddress);
+        const char* szUser = strrchr(&address.sun_path[1], ' ');
+        static_cast<struct ucred*>(pValue)->uid = static_cast<uid_t>(atoi(szUser ? szUser : "0"));
+    }
+    return static_cast<int>(nResult);
+}
+
+namespace {
+
+using gate::Answer;
+using gate::Ask;
+using gate::Outcome;
+using gate::Request;
+
+const std::string CALL = "GET /grant/Api/get HTTP/1.1\r\nHost: gate\r\nAuthorization: Bearer id\r\n\r\n";
+const std::string KEYED = CALL.substr(0, CALL.size() - 2) + "X-Once: key\r\n\r\n";
+const std::string NO_CALL = "GET /grant/Api HTTP/1.1\r\nHost: gate\r\n\r\n";
+const int USER = 1000;
+const size_t MANY = 200;
+
+// What listens, connects and is connected.
+class Socket {
+public:
+    explicit Socket(int nSocket) : m_nSocket(nSocket) {}
+    ~Socket() { close(); }
+    Socket(Socket&& other) noexcept : m_nSocket(std::exchange(other.m_nSocket, -1)) {}
+    int number() const { return m_nSocket; }
+    void close()
+    {
+        if (0 <= m_nSocket) {
+            ::close(std::exchange(m_nSocket, -1));
+        }
+    }
+    ssize_t send(std::string_view strBytes) const
+    {
+        return ::send(m_nSocket, strBytes.data(), strBytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
+    }
+    // What comes next; "end" when nothing comes any more.
+    std::string receive() const
+    {
+        char rgBytes[32768];
+        const ssize_t cbBytes = recv(m_nSocket, rgBytes, sizeof(rgBytes), 0);
+        return 0 < cbBytes    ? std::string(rgBytes, static_cast<size_t>(cbBytes))
+               : 0 == cbBytes ? "end"
+                              : "error";
+    }
+    std::string status() const { return receive().substr(9, 3); }
+    // All that comes.
+    std::string receiveAll() const
+    {
+        std::string strAll;
+        for (std::string strNow; (strNow = receive()) != "end" && strNow != "error";) {
+            strAll += strNow;
+        }
+        return strAll;
+    }
+    bool isOpen() const
+    {
+        char c;
+        return 0 > recv(m_nSocket, &c, 1, MSG_DONTWAIT) && EAGAIN == errno;
+    }
+
+private:
+    int m_nSocket;
+};
+
+size_t count(const std::string& strText, const std::string& strPart)
+{
+    size_t nCount = 0;
+    for (size_t n = 0; (n = strText.find(strPart, n)) != std::string::npos; ++n) {
+        ++nCount;
+    }
+    return nCount;
+}
+
+class Server : public testing::Test {
+protected:
+    void SetUp() override
+    {
+        void* pShared =
+            mmap(nullptr, sizeof(*g_pLater), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
+        ASSERT_NE(MAP_FAILED, pShared);
+        g_pLater = new (pShared) std::atomic<int64_t>(0);
+        struct rlimit files = {};
+        getrlimit(RLIMIT_NOFILE, &files);
+        files.rlim_cur = files.rlim_max;
+        setrlimit(RLIMIT_NOFILE, &files);
+    }
+
+    void TearDown() override
+    {
+        m_link.close();
+        int nStatus = -1;
+        waitpid(m_pid, &nStatus, 0);
+        EXPECT_TRUE(WIFEXITED(nStatus) && 0 == WEXITSTATUS(nStatus)) << nStatus;
+        munmap(static_cast<void*>(g_pLater), sizeof(*g_pLater));
+        g_pLater = nullptr;
+    }
+
+    void start()
+    {
+        int rgEnd[2];
+        ASSERT_EQ(0, socketpair(AF_UNIX, SOCK_SEQPACKET, 0, rgEnd));
+        m_strName = "vemo-gate-test " + std::to_string(getpid());
+        Socket calls = listening("calls");
+        Socket status = listening("status");
+        m_pid = fork();
+        if (0 == m_pid) {
+            ::close(rgEnd[0]);
+            gate::Server(rgEnd[1], calls.number(), status.number(), "x-once").run();
+            _exit(0);
+        }
+        ::close(rgEnd[1]);
+        m_link.~Socket();
+        new (&m_link) Socket(rgEnd[0]);
+        setTimeout(m_link);
+    }
+
+    Socket listening(const std::string& strWhat) const
+    {
+        Socket socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_NONBLOCK, 0));
+        const struct sockaddr_un address = addressOf(m_strName + strWhat);
+        bind(socket.number(), reinterpret_cast<const struct sockaddr*>(&address), sizeof(address));
+        listen(socket.number(), 2048);
+        return socket;
+    }
+
+    static void setTimeout(const Socket& socket)
+    {
+        const struct timeval timeout = {5, 0};
+        setsockopt(socket.number(), SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof(timeout));
+    }
+
+    Socket client(int nUser = USER, const char* szWhere = "calls")
+    {
+        Socket socket(::socket(AF_UNIX, SOCK_STREAM, 0));
+        const struct sockaddr_un own =
+            addressOf(m_strName + " " + std::to_string(++m_nClients) + " " + std::to_string(nUser));
+        bind(socket.number(), reinterpret_cast<const struct sockaddr*>(&own), sizeof(own));
+        const struct sockaddr_un address = addressOf(m_strName + szWhere);
+        EXPECT_EQ(
+            0, connect(socket.number(), reinterpret_cast<const struct sockaddr*>(&address), sizeof(address)));
+        setTimeout(socket);
+        return socket;
+    }
+
+    Socket client(const std::string& strBytes)
+    {
+        Socket socket = client();
+        socket.send(strBytes);
+        return socket;
+    }
+
+    // What is asked next. Figures are told, as the other process would.
+    Request asked()
+    {
+        for (;;) {
+            const std::optional<Request> request = gate::decodeRequest(m_link.receive());
+            if (!request) {
+                ADD_FAILURE() << "nothing is asked";
+                return {};
+            }
+            if (Ask::Figures != request->ask) {
+                return *request;
+            }
+            Answer told;
+            told.nNumber = request->nNumber;
+            told.outcome = Outcome::Told;
+            told.figures[gate::STORE_BYTES] = 4711;
+            m_link.send(gate::encode(told));
+        }
+    }
+
+    void answer(const Request& request, Outcome outcome)
+    {
+        Answer answer;
+        answer.nNumber = request.nNumber;
+        answer.outcome = outcome;
+        if (Outcome::Granted == outcome) {
+            answer.strUser = "anna";
+        }
+        m_link.send(gate::encode(answer));
+    }
+
+    // Ends when all that was there before has been looked at.
+    void settle()
+    {
+        Socket other = client(0, "status");
+        other.send(NO_CALL);
+        EXPECT_EQ("404", other.status());
+    }
+
+    void pass(int64_t nTime)
+    {
+        *g_pLater += nTime;
+        answer({}, Outcome::Late); // wakes it up
+        settle();
+    }
+
+    std::string metric(const std::string& strName)
+    {
+        Socket status = client(0, "status");
+        status.send("GET /metrics HTTP/1.1\r\nHost: gate\r\n\r\n");
+        const std::string strText = status.receive();
+        const size_t nBegin = strText.find("\n" + strName + " ") + strName.size() + 2;
+        return strText.substr(nBegin, strText.find('\n', nBegin) - nBegin);
+    }
+
+    Socket m_link{-1};
+    pid_t m_pid = -1;
+
+private:
+    std::string m_strName;
+    int m_nClients = 0;
+};
+
+} // namespace
+
+TEST_F(Server, EndsWhoIsTooSlow)
+{
+    start();
+    const struct {
+        std::string strSent;
+        std::string strReceived;
+        int64_t nSeconds;
+    } CLIENTS[] = {
+        {"", "", 75},
+        {"G", "", 5},
+        {CALL.substr(0, CALL.size() - 1), "", 5},
+        {NO_CALL, "401", 75},
+        {NO_CALL + "G", "401", 5},
+    };
+    for (const auto& row : CLIENTS) {
+        const Socket slow = client(row.strSent);
+        if (!row.strReceived.empty()) {
+            EXPECT_EQ(row.strReceived, slow.status());
+        }
+        settle();
+        pass(row.nSeconds * gate::SECOND - gate::SECOND / 2);
+        EXPECT_TRUE(slow.isOpen()) << row.strSent;
+        pass(gate::SECOND);
+        EXPECT_EQ("end", slow.receive()) << row.strSent;
+    }
+}
+
+TEST_F(Server, HoldsLittleOfWhatComesFromWhoDoesNotRead)
+{
+    start();
+    const Socket greedy = client();
+    const size_t cbMuch = 4 << 20; // more than the buffers of all sockets
+    std::string strMany;
+    while (strMany.size() < 10000) {
+        strMany += NO_CALL;
+    }
+    size_t cbSent = 0;
+    for (int nFull = 0; nFull < 20 && cbSent < cbMuch;) {
+        const ssize_t cbNow = greedy.send(strMany);
+        nFull = 0 > cbNow ? nFull + 1 : 0;
+        cbSent += 0 > cbNow ? 0 : static_cast<size_t>(cbNow);
+        if (0 > cbNow) {
+            settle();
+        }
+    }
+    EXPECT_LT(cbSent, cbMuch);
+    pass(6 * gate::SECOND);
+    EXPECT_EQ(-1, greedy.send(NO_CALL));
+    EXPECT_EQ(EPIPE, errno);
+}
+
+TEST_F(Server, GoesOnWithWhoReadsLate)
+{
+    start();
+    const Socket late = client();
+    size_t nSent = 0;
+    for (int nFull = 0; nFull < 20;) {
+        const bool blSent = 0 < late.send(NO_CALL);
+        nSent += blSent;
+        nFull = blSent ? 0 : nFull + 1;
+        if (!blSent) {
+            settle();
+        }
+    }
+    shutdown(late.number(), SHUT_WR);
+    EXPECT_LT(1000U, nSent) << "more than the server holds";
+    EXPECT_EQ(nSent, count(late.receiveAll(), "HTTP/1.1 401"));
+}
+
+TEST_F(Server, MakesRoomAtTheCostOfWhoWaitsLongest)
+{
+    start();
+    std::vector<Socket> idle;
+    for (int i = 0; i < 768; ++i) {
+        idle.push_back(client(1));
+    }
+    settle();
+    EXPECT_TRUE(idle[0].isOpen());
+    Socket one = client(1);
+    settle();
+    EXPECT_FALSE(idle[0].isOpen());
+    for (size_t i = 1; i < idle.size(); ++i) {
+        ASSERT_TRUE(idle[i].isOpen()) << i;
+    }
+    for (int i = 0; i < 256; ++i) {
+        idle.push_back(client(2));
+    }
+    settle();
+    const Socket other = client(3);
+    other.send(NO_CALL);
+    EXPECT_EQ("401", other.status());
+    one.send(NO_CALL);
+    EXPECT_EQ("401", one.status());
+    for (size_t i = idle.size() - 256; i < idle.size(); ++i) {
+        ASSERT_TRUE(idle[i].isOpen()) << i;
+    }
+}
+
+TEST_F(Server, CancelsTheCallOfAClientThatHasGone)
+{
+    start();
+    for (const bool blHalfClosedBefore : {false, true}) {
+        Socket gone = client(CALL);
+        const Request request = asked();
+        EXPECT_EQ(Ask::Grant, request.ask);
+        if (blHalfClosedBefore) {
+            shutdown(gone.number(), SHUT_WR);
+            settle();
+        }
+        gone.close();
+        const Request cancel = asked();
+        EXPECT_EQ(Ask::Cancel, cancel.ask) << blHalfClosedBefore;
+        EXPECT_EQ(request.nNumber, cancel.nNumber);
+    }
+    EXPECT_EQ("1", metric("vemo_gate_connections")) << "that of who asks";
+}
+
+TEST_F(Server, AnswersAndEndsWhoHasFinishedSending)
+{
+    start();
+    const Socket half = client(CALL);
+    shutdown(half.number(), SHUT_WR);
+    const Request request = asked();
+    settle();
+    answer(request, Outcome::Refused);
+    EXPECT_EQ("403", half.status());
+    EXPECT_EQ("end", half.receive());
+    const Socket two = client(NO_CALL + NO_CALL + "G");
+    shutdown(two.number(), SHUT_WR);
+    const std::string strAll = two.receiveAll();
+    EXPECT_EQ(2U, count(strAll, "HTTP/1.1 401"));
+    EXPECT_EQ(1U, count(strAll, "HTTP/1.1 400"));
+}
+
+TEST_F(Server, AsksOnceForCallsOfTheSameKey)
+{
+    start();
+    const Socket first = client(KEYED);
+    const Request request = asked();
+    const Socket second = client(KEYED);
+    settle();
+    answer(request, Outcome::Granted);
+    EXPECT_EQ("200", first.status());
+    EXPECT_EQ("200", second.status());
+    const Socket third = client(KEYED);
+    EXPECT_EQ("200", third.status());
+    EXPECT_EQ("2", metric("vemo_gate_repeated_total"));
+
+    // Neither another call nor an answer with the record.
+    for (const std::string strOther :
+         {"GET /grant/Api/put HTTP/1.1\r\nHost: gate\r\nAuthorization: Bearer id\r\nX-Once: key\r\n\r\n",
+          "GET /grant/Api/get HTTP/1.1\r\nHost: gate\r\nAuthorization: Bearer id2\r\nX-Once: key\r\n\r\n",
+          "GET /grant/Api/get HTTP/1.1\r\nHost: gate\r\nAuthorization: Bearer id\r\nX-Once: key\r\n"
+          "Accept: application/json\r\n\r\n"}) {
+        const Socket other = client(strOther);
+        answer(asked(), Outcome::Refused);
+        EXPECT_EQ("403", other.status());
+    }
+    pass(6 * gate::SECOND);
+    const Socket later = client(KEYED);
+    answer(asked(), Outcome::Late);
+    EXPECT_EQ("503", later.status());
+    later.send(KEYED);
+    answer(asked(), Outcome::Granted);
+    EXPECT_EQ("200", later.status());
+}
+
+TEST_F(Server, KeepsTheAnswerForAKeyWhoseClientHasGone)
+{
+    start();
+    Socket gone = client(KEYED);
+    const Request request = asked();
+    gone.close();
+    EXPECT_EQ(Ask::Cancel, asked().ask);
+    const Socket again = client(KEYED);
+    settle();
+    answer(request, Outcome::Granted); // it was decided when it was cancelled
+    EXPECT_EQ("200", again.status());
+    const Socket later = client(KEYED);
+    EXPECT_EQ("200", later.status());
+}
+
+TEST_F(Server, AsksAnewForAKeyThatComesAgainWhileItsCallIsCancelled)
+{
+    start();
+    Socket gone = client(KEYED);
+    const Request request = asked();
+    gone.close();
+    EXPECT_EQ(Ask::Cancel, asked().ask);
+    const Socket again = client(KEYED);
+    const Socket andAgain = client(KEYED);
+    settle();
+    answer(request, Outcome::Cancelled);
+    const Request second = asked();
+    EXPECT_EQ(Ask::Grant, second.ask);
+    EXPECT_LT(request.nNumber, second.nNumber);
+    answer(second, Outcome::Granted);
+    EXPECT_EQ("200", again.status());
+    EXPECT_EQ("200", andAgain.status());
+}
+
+TEST_F(Server, TellsTheFiguresThatWereToldAndNoOthers)
+{
+    start();
+    const Socket call = client(CALL);
+    answer(asked(), Outcome::Refused); // the figures too
+    EXPECT_EQ("403", call.status());
+    EXPECT_EQ("4711", metric("vemo_gate_store_bytes"));
+    Socket prober = client(0, "status");
+    prober.send("GET /health HTTP/1.1\r\nHost: gate\r\n\r\n");
+    const Request health = asked();
+    EXPECT_EQ(Ask::Health, health.ask);
+    prober.close();
+    EXPECT_EQ(Ask::Cancel, asked().ask);
+    answer(health, Outcome::Told);
+    EXPECT_EQ("4711", metric("vemo_gate_store_bytes"));
+}
+
+TEST_F(Server, QueuesNoMoreThanItCanSendSoon)
+{
+    start();
+    size_t nClients = 0;
+    for (std::string strStatus; strStatus != "503" && ++nClients < 8000;) {
+        Socket one = client(CALL);
+        if (nClients % 100 == 0) { // all others have gone
+            const struct timeval timeout = {0, 50000};
+            setsockopt(one.number(), SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof(timeout));
+            const std::string strReceived = one.receive();
+            strStatus = strReceived.size() > 12 ? strReceived.substr(9, 3) : "";
+        }
+    }
+    EXPECT_GT(8000U, nClients);
+    for (int nEmpty = 0; nEmpty < 3;) { // the other process goes on
+        char rgMessage[gate::REQUEST_MAX];
+        const bool blEmpty = 0 > recv(m_link.number(), rgMessage, sizeof(rgMessage), MSG_DONTWAIT);
+        nEmpty = blEmpty ? nEmpty + 1 : 0;
+        if (blEmpty) {
+            settle();
+        }
+    }
+    const Socket last = client(CALL);
+    answer(asked(), Outcome::Refused);
+    EXPECT_EQ("403", last.status());
+}
+
+TEST_F(Server, ServesWhoHasConnectedWhenItIsToStop)
+{
+    start();
+    settle();
+    kill(m_pid, SIGSTOP);
+    std::vector<Socket> clients;
+    for (size_t i = 0; i < MANY; ++i) {
+        clients.push_back(client(CALL));
+    }
+    answer({}, Outcome::Stop);
+    kill(m_pid, SIGCONT);
+    for (size_t i = 0; i < MANY; ++i) {
+        answer(asked(), Outcome::Granted);
+    }
+    for (const Socket& one : clients) {
+        EXPECT_NE(std::string::npos, one.receive().find("\r\nConnection: close\r\n"));
+        EXPECT_EQ("end", one.receive());
+    }
+}
