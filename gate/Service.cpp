@@ -151,13 +151,17 @@ void Service::cancel(uint64_t nNumber)
     ++m_figures[CANCELLED];
 }
 
+// One look for all who have asked.
 void Service::look()
 {
+    if (m_looks.empty()) {
+        return;
+    }
+    Answer told;
+    told.outcome = Outcome::Told;
+    told.blHealthy = healthy();
     for (const uint64_t nNumber : m_looks) {
-        Answer told;
         told.nNumber = nNumber;
-        told.outcome = Outcome::Told;
-        told.blHealthy = healthy();
         m_link.add(encode(told));
     }
     m_looks.clear();
