@@ -1,9 +1,10 @@
 // For tests of what the tool says when the system fails: with "file" or "directory" in VEMO_TEST_SYNC, none
 // of these can be synced, with a path that one; with an errno in VEMO_TEST_LOOKUP, each look-up of a user
-// ends with it and finds nobody, with ERANGE as long as its buffer has less than 4 KiB; with one in VEMO_TEST_PROC,
-// /proc cannot be listed; with a name in VEMO_TEST_VFS, SQLite works on files in the way of that name. And of what
-// nobody sees: texts that are wiped from memory go into the file that VEMO_TEST_WIPED names. For each log line, the
-// file that VEMO_TEST_SYSLOG names gets its priority, and "held" or "free": what the lock is then.
+// ends with it and finds nobody, with ERANGE as long as its buffer has less than 4 KiB; with one in
+// VEMO_TEST_PROC, /proc cannot be listed; with a name in VEMO_TEST_VFS, SQLite works on files in the way of
+// that name. And of what nobody sees: texts that are wiped from memory go into the file that VEMO_TEST_WIPED
+// names. For each log line, the file that VEMO_TEST_SYSLOG names gets its priority, and "held" or "free":
+// what the lock is then.
 
 #include <dirent.h>
 #include <dlfcn.h>
