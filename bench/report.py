@@ -227,6 +227,7 @@ def plot_gate(results, directory):
     figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5))
     for series in ("write-ahead", "rollback", "redis"):
         points = [(int(key[1]), cell) for key, cell in cells.items() if key[0] == series]
+        points.sort(key=lambda point: point[0])
         label = "Redis, appendfsync always" if series == "redis" else f"gate, {series} journal"
         clients = [number for number, _ in points]
         panels[0].plot(clients, [cell["per_second"] for _, cell in points], marker="o", label=label)
