@@ -101,8 +101,8 @@ void filterSystemCalls()
         require(0 == errno, "seccomp_rule_add");
     }
     // Memory, but none that could be executed.
-    errno = -seccomp_rule_add(pFilter.get(), SCMP_ACT_ALLOW, SCMP_SYS(mmap), 1,
-                              SCMP_A2(SCMP_CMP_MASKED_EQ, PROT_EXEC, 0));
+    const struct scmp_arg_cmp notExecutable = {2, SCMP_CMP_MASKED_EQ, PROT_EXEC, 0};
+    errno = -seccomp_rule_add_array(pFilter.get(), SCMP_ACT_ALLOW, SCMP_SYS(mmap), 1, &notExecutable);
     require(0 == errno, "seccomp_rule_add");
     errno = -seccomp_load(pFilter.get());
     require(0 == errno, "seccomp_load");
