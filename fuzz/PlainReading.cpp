@@ -76,7 +76,7 @@ private:
             return each.strName == strNext.substr(0, nEquals);
         });
         if (pOption && std::string::npos != nEquals) {
-            return pOption->blTakesText && add(pOption, strNext.substr(nEquals + 1), m_reading);
+            return !pOption->strType.empty() && add(pOption, strNext.substr(nEquals + 1), m_reading);
         }
         return addNext(pOption);
     }
@@ -91,17 +91,17 @@ private:
         if (strMore.empty() || !pOption) {
             return addNext(pOption);
         }
-        return pOption->blTakesText ? add(pOption, strMore, m_reading)
-                                    : add(pOption, "", m_reading) && readShort(strMore);
+        return !pOption->strType.empty() ? add(pOption, strMore, m_reading)
+                                         : add(pOption, "", m_reading) && readShort(strMore);
     }
 
     // An option whose text, if it takes one, is the next argument.
     bool addNext(const Parameter* pOption)
     {
-        if (!pOption || (pOption->blTakesText && m_strRest.empty())) {
+        if (!pOption || (!pOption->strType.empty() && m_strRest.empty())) {
             return false;
         }
-        return add(pOption, pOption->blTakesText ? takeNext() : "", m_reading);
+        return add(pOption, pOption->strType.empty() ? "" : takeNext(), m_reading);
     }
 
     const tool::Command& m_command;
