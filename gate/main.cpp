@@ -1,6 +1,7 @@
 // vemo-access-token-gate: grants tokens over HTTP to programs that are not root. This process, root's, holds
 // the token database; another, which it starts, reads HTTP and may do nothing else.
 
+#include <fcntl.h>
 #include <getopt.h>
 #include <signal.h>
 #include <sys/signalfd.h>
@@ -76,6 +77,20 @@ Options read(int nArguments, char** rgArguments)
     return options;
 }
 
+// A socket with the number of a closed standard stream would be taken for that stream. And a log that nobody
+// reads must not end the gate: the child inherits both.
+void prepareStreams()
+{
+    int nStream = 0;
+    do {
+        nStream = open("/dev/null", O_RDWR);
+    } while (0 <= nStream && nStream <= STDERR_FILENO);
+    if (STDERR_FILENO < nStream) {
+        close(nStream);
+    }
+    signal(SIGPIPE, SIG_IGN);
+}
+
 gate::Sockets listenWhere(const Options& options)
 {
     gate::Sockets sockets = gate::handedOver();
@@ -141,6 +156,7 @@ int serve(const Options& options)
 
 int main(int nArguments, char** rgArguments)
 {
+    prepareStreams();
     try {
         // The threads of the service may stand still, and nothing waits for them.
         _exit(serve(read(nArguments, rgArguments)));
