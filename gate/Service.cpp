@@ -201,7 +201,7 @@ void Service::expire()
     m_calls.erase(std::remove_if(m_calls.begin(), m_calls.end(), isLate), m_calls.end());
     m_parked.erase(std::remove_if(m_parked.begin(), m_parked.end(), isLate), m_parked.end());
     if (m_calls.empty()) {
-        m_nTryAt = 0;
+        endWait();
     }
 }
 
@@ -210,6 +210,13 @@ void Service::wait(int64_t nNow)
 {
     m_nWaitingSince = m_nWaitingSince ? m_nWaitingSince : nNow;
     m_nTryAt = nNow + TRY_AGAIN_AFTER;
+}
+
+// Others are in the way no more, or nobody is who waits for them.
+void Service::endWait()
+{
+    m_figures[WAIT_NS] += m_nWaitingSince ? static_cast<uint64_t>(now() - m_nWaitingSince) : 0;
+    m_nWaitingSince = m_nTryAt = 0;
 }
 
 void Service::serve()
@@ -233,8 +240,7 @@ void Service::serve()
     }
     try {
         if (m_store.begin()) {
-            m_figures[WAIT_NS] += m_nWaitingSince ? static_cast<uint64_t>(now() - m_nWaitingSince) : 0;
-            m_nWaitingSince = m_nTryAt = 0;
+            endWait();
             serveBatch();
         } else {
             wait(nNow);
@@ -259,7 +265,7 @@ void Service::failAll(const std::string& strReason)
     ++m_figures[BATCHES_FAILED];
     m_calls.clear();
     m_batch.clear();
-    m_nTryAt = 0;
+    endWait();
 }
 
 // Within a transaction, which it ends.

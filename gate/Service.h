@@ -36,6 +36,7 @@ private:
     void answer(const Request& request, Outcome outcome);
     void failAll(const std::string& strReason);
     void wait(int64_t nNow);
+    void endWait();
     bool healthy();
     void notifyManager();
 

@@ -79,3 +79,19 @@ end()
     chmod 0600 "$dir/session.lock"
     [ "$(status)" = 200 ]
 }
+
+@test "the time that it waits for locks ends with the last call that waits" {
+    (exec "${gate[@]}" 3>&- --status-socket "$dir/status") &
+    pid=$!
+    wait_for_socket
+    [ "$(status)" = 200 ]
+    exec {lock}<>"$dir/session.lock"
+    flock "$lock"
+    [ "$(status --retry 0 -m 0.2)" = 000 ] # and takes the call back
+    flock -u "$lock"
+    sleep 1
+    [ "$(status)" = 200 ]
+    sleep 1.2 # figures are as old as that
+    waited=$(curl -s --unix-socket "$dir/status" http://gate/metrics | sed -n 's/^vemo_gate_wait_seconds_total //p')
+    awk -v waited="$waited" 'BEGIN { exit !(0.1 < waited && waited < 0.9) }'
+}
