@@ -46,6 +46,13 @@ struct Options {
     gate::Child child = {VEMO_GATE_CHILD, "vemo-access-token-gate", ""};
 };
 
+bool isHeaderName(const std::string& strName)
+{
+    return !strName.empty() && std::string::npos == strName.find_first_not_of(
+                                                        "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ"
+                                                        "0123456789!#$%&'*+-.^_`|~");
+}
+
 Options read(int nArguments, char** rgArguments)
 {
     enum { SOCKET = 1, STATUS_SOCKET, USER, ONCE_HEADER, SHOW_HELP, SHOW_VERSION };
@@ -64,7 +71,13 @@ Options read(int nArguments, char** rgArguments)
         case SOCKET: options.strSocket = optarg; break;
         case STATUS_SOCKET: options.strStatusSocket = optarg; break;
         case USER: options.child.strUser = optarg; break;
-        case ONCE_HEADER: options.child.strOnceHeader = optarg; break;
+        case ONCE_HEADER:
+            options.child.strOnceHeader = optarg;
+            if (!isHeaderName(optarg)) { // no call would have it, and each repetition would spend a use
+                fprintf(stderr, "vemo-access-token-gate: \"%s\" is no name of a header\n", optarg);
+                exit(2);
+            }
+            break;
         case SHOW_HELP: fputs(HELP, stdout); exit(EXIT_SUCCESS);
         case SHOW_VERSION: puts("vemo-access-token-gate " VEMO_ATOKEN_VERSION); exit(EXIT_SUCCESS);
         default: exit(2);

@@ -95,3 +95,11 @@ end()
     waited=$(curl -s --unix-socket "$dir/status" http://gate/metrics | sed -n 's/^vemo_gate_wait_seconds_total //p')
     awk -v waited="$waited" 'BEGIN { exit !(0.1 < waited && waited < 0.9) }'
 }
+
+@test "what cannot be a header's name is refused" {
+    for name in '' 'X-Once:' 'X Once' 'Xé'; do
+        run timeout 5 "${gate[@]}" --once-header "$name"
+        [ "$status" -eq 2 ]
+        [ "$output" = "vemo-access-token-gate: \"$name\" is no name of a header" ]
+    done
+}
