@@ -18,8 +18,9 @@
 namespace {
 
 const size_t BATCH_MAX = 256;
-const size_t CALLS_MAX = 4096;   // more are not taken from the socket
-const size_t ANSWERS_MAX = 4096; // the same while so many wait to be taken
+const size_t CALLS_MAX = 4096;              // more are not taken from the socket
+const size_t ANSWERS_MAX = 4096;            // the same while so many wait to be taken
+const int64_t CALL_WAIT_MAX = gate::SECOND; // whatever is asked for
 const int64_t TRY_AGAIN_AFTER = gate::MILLISECOND;
 const int64_t COMMIT_WAIT = gate::SECOND / 2; // for readers that keep a commit waiting
 const int64_t HEALTH_WAIT = gate::SECOND / 20;
@@ -54,7 +55,7 @@ Service::Service(Link& link, int nSignals) : m_link(link), m_nSignals(nSignals) 
 bool Service::run()
 {
     for (;;) {
-        const bool blTakes = m_calls.size() < CALLS_MAX && m_link.waiting() < ANSWERS_MAX;
+        const bool blTakes = m_calls.size() + m_parked.size() < CALLS_MAX && m_link.waiting() < ANSWERS_MAX;
         struct pollfd rgEvent[] = {
             {m_link.descriptor(),
              static_cast<short>((blTakes ? POLLIN : 0) | (m_link.waiting() ? POLLOUT : 0)), 0},
@@ -116,7 +117,10 @@ void Service::take(std::string_view strMessage)
         _exit(EXIT_FAILURE); // who sends such things has been taken over
     }
     switch (request->ask) {
-    case Ask::Grant: m_calls.push_back(std::move(*request)); return;
+    case Ask::Grant:
+        request->nDue = std::min(request->nDue, now() + CALL_WAIT_MAX);
+        m_calls.push_back(std::move(*request));
+        return;
     case Ask::Cancel: cancel(request->nNumber); return;
     case Ask::Health: m_looks.push_back(request->nNumber); return; // not within a transaction
     case Ask::Figures: tellFigures(request->nNumber); return;
