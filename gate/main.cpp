@@ -114,6 +114,10 @@ gate::Sockets listenWhere(const Options& options)
         fputs("vemo-access-token-gate: no socket was handed over, and none is named by --socket\n", stderr);
         exit(2);
     }
+    if (options.strSocket == options.strStatusSocket) {
+        fputs("vemo-access-token-gate: --socket and --status-socket name the same path\n", stderr);
+        exit(2);
+    }
     sockets.nCalls = gate::listenAt(options.strSocket, GROUP);
     if (!options.strStatusSocket.empty()) {
         sockets.nStatus = gate::listenAt(options.strStatusSocket, GROUP);

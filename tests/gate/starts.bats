@@ -103,3 +103,9 @@ end()
         [ "$output" = "vemo-access-token-gate: \"$name\" is no name of a header" ]
     done
 }
+
+@test "calls and status cannot share a socket" {
+    run timeout 5 "${gate[@]}" --status-socket "$dir/calls"
+    [ "$status" -eq 2 ]
+    [ "$output" = "vemo-access-token-gate: --socket and --status-socket name the same path" ]
+}
