@@ -122,8 +122,29 @@ int fileDeviceCharacteristics(sqlite3_file* pFile)
     return fileOf(pFile).real()->pMethods->xDeviceCharacteristics(fileOf(pFile).real());
 }
 
-// Version 1: no shared memory, no mapping. The library's journal mode uses neither.
-const sqlite3_io_methods g_methods = {1,
+// The index of a write-ahead log: memory, which no disk and no fault concerns.
+int fileShmMap(sqlite3_file* pFile, int nRegion, int cb, int nExtend, void volatile** ppRegion)
+{
+    return fileOf(pFile).real()->pMethods->xShmMap(fileOf(pFile).real(), nRegion, cb, nExtend, ppRegion);
+}
+
+int fileShmLock(sqlite3_file* pFile, int nOffset, int n, int nFlags)
+{
+    return fileOf(pFile).real()->pMethods->xShmLock(fileOf(pFile).real(), nOffset, n, nFlags);
+}
+
+void fileShmBarrier(sqlite3_file* pFile)
+{
+    fileOf(pFile).real()->pMethods->xShmBarrier(fileOf(pFile).real());
+}
+
+int fileShmUnmap(sqlite3_file* pFile, int nDelete)
+{
+    return fileOf(pFile).real()->pMethods->xShmUnmap(fileOf(pFile).real(), nDelete);
+}
+
+// Version 2: no mapping of the database.
+const sqlite3_io_methods g_methods = {2,
                                       &fileClose,
                                       &fileRead,
                                       &fileWrite,
@@ -136,10 +157,10 @@ const sqlite3_io_methods g_methods = {1,
                                       &fileControl,
                                       &fileSectorSize,
                                       &fileDeviceCharacteristics,
-                                      nullptr,
-                                      nullptr,
-                                      nullptr,
-                                      nullptr,
+                                      &fileShmMap,
+                                      &fileShmLock,
+                                      &fileShmBarrier,
+                                      &fileShmUnmap,
                                       nullptr,
                                       nullptr};
 

@@ -109,26 +109,64 @@ std::vector<std::string> PowerJudge::steps(const Recording& recording)
     return states;
 }
 
-PowerTally PowerJudge::judge(const Recording& recording, Order order, int64_t nDraws)
+void PowerJudge::visit(const Recording& recording, Order order, int64_t nDraws,
+                       const std::function<void(const DiskCall&, const PowerDisk&)>& fPassed,
+                       const std::function<void(const Files&)>& fImage)
 {
     PowerDisk disk(recording.files, order);
+    const auto cutPower = [&] {
+        fImage(disk.files());
+        fImage(disk.afterPowerCut(&onlySynced));
+        for (int64_t nLeft = nDraws * static_cast<int64_t>(disk.pending()); 0 < nLeft; --nLeft) {
+            fImage(draw(disk));
+        }
+    };
+    cutPower();
+    for (const DiskCall& call : recording.calls) {
+        disk.take(call);
+        fPassed(call, disk);
+        cutPower();
+    }
+}
+
+PowerTally PowerJudge::judge(const Recording& recording, Order order, int64_t nDraws)
+{
     Moment moment;
     moment.strNow = stateOf(recording.files);
     PowerTally tally;
-    const auto judgeOne = [&](const Files& files) { moment.judge(stateOf(files), hasJournal(files), tally); };
-    const auto judgeMoment = [&] {
-        judgeOne(disk.files());
-        judgeOne(disk.afterPowerCut(&onlySynced));
-        for (int64_t nLeft = nDraws * static_cast<int64_t>(disk.pending()); 0 < nLeft; --nLeft) {
-            judgeOne(draw(disk));
-        }
-    };
-    judgeMoment();
+    visit(
+        recording, order, nDraws,
+        [&](const DiskCall& call, const PowerDisk& disk) {
+            moment.pass(call, isStep(call) ? stateOf(disk.files()) : "");
+        },
+        [&](const Files& files) { moment.judge(stateOf(files), hasJournal(files), tally); });
+    return tally;
+}
+
+PowerTally PowerJudge::judgeReturned(const Recording& recording, int64_t nDraws)
+{
+    std::vector<std::string> states = {stateOf(recording.files)};
+    PowerDisk whole(recording.files, Order::Kept);
     for (const DiskCall& call : recording.calls) {
-        disk.take(call);
-        moment.pass(call, isStep(call) ? stateOf(disk.files()) : "");
-        judgeMoment();
+        whole.take(call);
+        if (DiskCall::Kind::Return == call.kind) {
+            states.push_back(stateOf(whole.files()));
+        }
     }
+    auto itReturned = states.begin();
+    PowerTally tally;
+    visit(
+        recording, Order::Kept, nDraws,
+        [&](const DiskCall& call, const PowerDisk&) { itReturned += DiskCall::Kind::Return == call.kind; },
+        [&](const Files& files) {
+            const std::string& strState = stateOf(files);
+            ++tally.nImages;
+            if (strState != *itReturned && (itReturned + 1 == states.end() || strState != itReturned[1])) {
+                ++tally.nWrong;
+                tally.strFirstWrong =
+                    tally.strFirstWrong.empty() ? "wrong: " + strState : tally.strFirstWrong;
+            }
+        });
     return tally;
 }
 

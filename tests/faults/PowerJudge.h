@@ -4,6 +4,7 @@
 #define TESTS_POWER_JUDGE_H
 
 #include <cstdint>
+#include <functional>
 #include <random>
 #include <set>
 #include <string>
@@ -38,6 +39,10 @@ public:
     // each change that is not synced.
     PowerTally judge(const Recording& recording, Order order, int64_t nDraws);
 
+    // Each image must hold what all calls that returned have done, and of the next one all or nothing. Knows
+    // of no journals, and so serves each way of journalling.
+    PowerTally judgeReturned(const Recording& recording, int64_t nDraws);
+
     // The states that the steps led to, from the one that was found.
     std::vector<std::string> steps(const Recording& recording);
 
@@ -48,6 +53,12 @@ public:
     int64_t different() const { return static_cast<int64_t>(m_stateOfImage.size()); }
 
 private:
+    // Calls the first function behind each call of the recording, and the second for the images of each
+    // moment.
+    void visit(const Recording& recording, Order order, int64_t nDraws,
+               const std::function<void(const DiskCall&, const PowerDisk&)>& fPassed,
+               const std::function<void(const Files&)>& fImage);
+
     const TokenStore& m_store;
     std::mt19937_64 m_random;
     std::set<std::string> m_states;

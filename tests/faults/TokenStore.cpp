@@ -98,7 +98,9 @@ Files TokenStore::files() const
 {
     Files files;
     for (const auto& entry : std::filesystem::directory_iterator(m_strDirectory)) {
-        files[entry.path().filename()] = contentsOf(entry.path());
+        if (entry.path().extension() != ".db-shm") { // memory: who opens the database first makes it anew
+            files[entry.path().filename()] = contentsOf(entry.path());
+        }
     }
     return files;
 }
