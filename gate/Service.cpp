@@ -23,7 +23,7 @@ const size_t ANSWERS_MAX = 4096;            // the same while so many wait to be
 const int64_t CALL_WAIT_MAX = gate::SECOND; // whatever is asked for
 const int64_t TRY_AGAIN_AFTER = gate::MILLISECOND;
 const int64_t COMMIT_WAIT = gate::SECOND / 2; // for readers that keep a commit waiting
-const int64_t HEALTH_WAIT = gate::SECOND / 20;
+const int64_t LOOK_WAIT = gate::SECOND / 2;   // for writers that keep a look at the store waiting
 
 gate::Figure sizeFigure(size_t nCalls)
 {
@@ -55,7 +55,8 @@ Service::Service(Link& link, int nSignals) : m_link(link), m_nSignals(nSignals) 
 bool Service::run()
 {
     for (;;) {
-        const bool blTakes = m_calls.size() + m_parked.size() < CALLS_MAX && m_link.waiting() < ANSWERS_MAX;
+        const bool blTakes =
+            m_calls.size() + m_parked.size() + m_looks.size() < CALLS_MAX && m_link.waiting() < ANSWERS_MAX;
         struct pollfd rgEvent[] = {
             {m_link.descriptor(),
              static_cast<short>((blTakes ? POLLIN : 0) | (m_link.waiting() ? POLLOUT : 0)), 0},
@@ -98,10 +99,13 @@ bool Service::run()
 // How long to wait for something to happen, in ms: not at all while there is something to do.
 int Service::timeout() const
 {
-    if (m_calls.empty()) {
-        return m_parked.empty() ? 1000 : 10;
+    if (!m_calls.empty() && !m_nTryAt) {
+        return 0;
     }
-    return m_nTryAt ? 1 : 0;
+    if (!m_calls.empty() || !m_looks.empty()) {
+        return 1;
+    }
+    return m_parked.empty() ? 1000 : 10;
 }
 
 bool Service::receive()
@@ -122,7 +126,10 @@ void Service::take(std::string_view strMessage)
         m_calls.push_back(std::move(*request));
         return;
     case Ask::Cancel: cancel(request->nNumber); return;
-    case Ask::Health: m_looks.push_back(request->nNumber); return; // not within a transaction
+    case Ask::Health: // not within a transaction
+        request->nDue = now() + LOOK_WAIT;
+        m_looks.push_back(std::move(*request));
+        return;
     case Ask::Figures: tellFigures(request->nNumber); return;
     }
 }
@@ -155,32 +162,34 @@ void Service::cancel(uint64_t nNumber)
     ++m_figures[CANCELLED];
 }
 
-// One look for all who have asked.
+// One look for all who have asked. They wait while others are in the way.
 void Service::look()
 {
     if (m_looks.empty()) {
         return;
     }
-    Answer told;
-    told.outcome = Outcome::Told;
-    told.blHealthy = healthy();
-    for (const uint64_t nNumber : m_looks) {
-        told.nNumber = nNumber;
-        m_link.add(encode(told));
-    }
-    m_looks.clear();
-}
-
-// A look at the store that does not give up for a lock of a moment.
-bool Service::healthy()
-{
+    bool blHealthy = false;
+    bool blFailed = false;
     try {
-        return isDoneWithin(HEALTH_WAIT, [this] { return m_store.canRead(); });
+        blHealthy = m_store.canRead();
     } catch (const std::runtime_error& error) {
         log(LOG_ERR, std::string("store: ") + error.what());
         m_store.close();
-        return false;
+        blFailed = true;
     }
+    const int64_t nNow = now();
+    const auto isTold = [&](const Request& request) {
+        if (!blHealthy && !blFailed && nNow < request.nDue) {
+            return false;
+        }
+        Answer told;
+        told.nNumber = request.nNumber;
+        told.outcome = Outcome::Told;
+        told.blHealthy = blHealthy;
+        m_link.add(encode(told));
+        return true;
+    };
+    m_looks.erase(std::remove_if(m_looks.begin(), m_looks.end(), isTold), m_looks.end());
 }
 
 void Service::answer(const Request& request, Outcome outcome)

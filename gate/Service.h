@@ -37,7 +37,6 @@ private:
     void failAll(const std::string& strReason);
     void wait(int64_t nNow);
     void endWait();
-    bool healthy();
     void notifyManager();
 
     Link& m_link;
@@ -48,7 +47,7 @@ private:
     std::deque<Request> m_calls;   // to be decided
     std::vector<Request> m_parked; // until their owners' names are known
     std::vector<Request> m_batch;  // of the transaction at hand
-    std::vector<uint64_t> m_looks; // of Ask::Health
+    std::vector<Request> m_looks;  // at the store, for those who ask for its health
     Figures m_figures = {};
     int64_t m_nWaitingSince = 0; // for the locks of others; 0: not waiting
     int64_t m_nTryAt = 0;

@@ -1,7 +1,7 @@
 #!/usr/bin/python3
-"""The examples of examples/gate/ in front of the gate: nginx, Caddy, and clients in four languages.
+"""The examples of examples/gate/ in front of the gate: nginx, Caddy, both at once, and clients in four languages.
 
-usage: proxies.py nginx|caddy|clients SOURCE-DIRECTORY GATE TOOL
+usage: proxies.py nginx|caddy|both|clients SOURCE-DIRECTORY GATE TOOL
 GATE and TOOL: built with the redirection linked in. All runs below one throw-away directory, on Unix sockets, as the
 user who calls it; of the examples, only paths and addresses are replaced. Exit status 77: skipped, for the reason
 printed.
@@ -120,8 +120,8 @@ class Scene(unittest.TestCase):
 
     @classmethod
     def start_gate(cls):
-        cls.gate = cls.start(cls.at("calls"), GATE, "--socket", cls.at("calls"), "--user", "nobody",
-                             "--once-header", "X-Request-Once")
+        cls.gate = cls.start(cls.at("calls"), GATE, "--socket", cls.at("calls"), "--status-socket", cls.at("status"),
+                             "--user", "nobody", "--once-header", "X-Request-Once")
 
     @classmethod
     def tool(cls, *arguments):
@@ -148,6 +148,51 @@ class Scene(unittest.TestCase):
         with open(cls.at(name), "w") as file:
             file.write(text)
         return cls.at(name)
+
+    @classmethod
+    def start_application(cls):
+        server = ApplicationServer(cls.at("application"), Application)
+        threading.Thread(target=server.serve_forever, kwargs={"poll_interval": 0.01}).start()
+        cls.addClassCleanup(server.server_close)
+        cls.addClassCleanup(server.shutdown)
+
+    @classmethod
+    def start_nginx(cls):
+        os.makedirs(cls.at("www/pages/inner"))
+        with open(cls.at("www/pages/inner/index.html"), "w") as file:
+            file.write("a page\n")
+        server = cls.example("nginx.conf", ("/run/vemo-access-token-gate/calls.sock", cls.at("calls")),
+                             ("/run/application/http.sock", cls.at("application")), ("/srv/www", cls.at("www")),
+                             ("listen 80;", f"listen unix:{cls.at('nginx')};"))
+        kinds = ("client_body", "proxy", "fastcgi", "uwsgi", "scgi")
+        with open(cls.at("main.conf"), "w") as file:
+            file.write("daemon off; master_process off; error_log stderr;\n"
+                       f"pid {cls.at('nginx.pid')}; events {{}}\n"
+                       "http { access_log off;" + "".join(f"{kind}_temp_path {cls.at(kind)}.temp;" for kind in kinds) +
+                       f"include {server}; }}\n")
+        cls.start(cls.at("nginx"), "nginx", "-p", cls.directory, "-e", "stderr", "-c", cls.at("main.conf"))
+
+    @classmethod
+    def start_caddy(cls):
+        cls.environment.update(XDG_CONFIG_HOME=cls.at("config"), XDG_DATA_HOME=cls.at("data"))
+        site = cls.example("Caddyfile", ("/run/vemo-access-token-gate/calls.sock", cls.at("calls")),
+                           ("/run/application/http.sock", cls.at("application")),
+                           ("example.org {", f"http://example.org {{\n\tbind unix/{cls.at('caddy')}"))
+        with open(cls.at("main"), "w") as file:
+            file.write("{\n\tadmin off\n}\nimport " + site + "\n")
+        cls.start(cls.at("caddy"), "caddy", "run", "--adapter", "caddyfile", "--config", cls.at("main"))
+
+    def answer(self, socket, method="GET", path="/", id=None, headers=None, body=None):
+        """The status, the headers and the text of an answer."""
+        connection = UnixConnection(self.at(socket))
+        headers = dict(headers or {})
+        if id:
+            headers["Authorization"] = "Bearer " + id
+        connection.request(method, path, body, headers)
+        answer = connection.getresponse()
+        text = answer.read()
+        connection.close()
+        return answer.status, answer.headers, text
 
 
 class Clients(Scene):
@@ -178,24 +223,13 @@ class Proxy:
     @classmethod
     def setUpClass(cls):
         super().setUpClass()
-        server = ApplicationServer(cls.at("application"), Application)
-        threading.Thread(target=server.serve_forever, kwargs={"poll_interval": 0.01}).start()
-        cls.addClassCleanup(server.server_close)
-        cls.addClassCleanup(server.shutdown)
-        cls.start_proxy()
+        cls.start_application()
+        getattr(cls, "start_" + KIND)()
 
     def request(self, method="GET", path="/files/a?b=c", id=None, headers=None, body=None):
-        """The status, the headers, and what the application told, or the text of the answer."""
-        connection = UnixConnection(self.at("proxy"))
-        headers = dict(headers or {})
-        if id:
-            headers["Authorization"] = "Bearer " + id
-        connection.request(method, path, body, headers)
-        answer = connection.getresponse()
-        text = answer.read()
-        connection.close()
-        told = json.loads(text) if text.startswith(b'{"method"') else None
-        return answer.status, answer.headers, told
+        """The status, the headers, and what the application told, if it was asked."""
+        status, headers, text = self.answer(KIND, method, path, id, headers, body)
+        return status, headers, json.loads(text) if text.startswith(b'{"method"') else None
 
     def users(self, told):
         """What the application gets of the user's headers and the id."""
@@ -265,22 +299,6 @@ class Proxy:
 class Nginx(Proxy, Scene):
     AWAY = 503
 
-    @classmethod
-    def start_proxy(cls):
-        os.makedirs(cls.at("www/pages/inner"))
-        with open(cls.at("www/pages/inner/index.html"), "w") as file:
-            file.write("a page\n")
-        server = cls.example("nginx.conf", ("/run/vemo-access-token-gate/calls.sock", cls.at("calls")),
-                             ("/run/application/http.sock", cls.at("application")), ("/srv/www", cls.at("www")),
-                             ("listen 80;", f"listen unix:{cls.at('proxy')};"))
-        kinds = ("client_body", "proxy", "fastcgi", "uwsgi", "scgi")
-        with open(cls.at("main.conf"), "w") as file:
-            file.write("daemon off; master_process off; error_log stderr;\n"
-                       f"pid {cls.at('nginx.pid')}; events {{}}\n"
-                       "http { access_log off;" + "".join(f"{kind}_temp_path {cls.at(kind)}.temp;" for kind in kinds) +
-                       f"include {server}; }}\n")
-        cls.start(cls.at("proxy"), "nginx", "-p", cls.directory, "-e", "stderr", "-c", cls.at("main.conf"))
-
     def test_spends_one_use_where_nginx_asks_twice(self):
         self.assertEqual(self.request(path="/pages/inner/", id=self.id)[0], 200)
         self.assertEqual(self.uses(self.id), 2)
@@ -297,24 +315,71 @@ class Nginx(Proxy, Scene):
 class Caddy(Proxy, Scene):
     AWAY = 502
 
-    @classmethod
-    def start_proxy(cls):
-        cls.environment.update(XDG_CONFIG_HOME=cls.at("config"), XDG_DATA_HOME=cls.at("data"))
-        site = cls.example("Caddyfile", ("/run/vemo-access-token-gate/calls.sock", cls.at("calls")),
-                           ("/run/application/http.sock", cls.at("application")),
-                           ("example.org {", f"http://example.org {{\n\tbind unix/{cls.at('proxy')}"))
-        with open(cls.at("main"), "w") as file:
-            file.write("{\n\tadmin off\n}\nimport " + site + "\n")
-        cls.start(cls.at("proxy"), "caddy", "run", "--adapter", "caddyfile", "--config", cls.at("main"))
-
     def test_asks_under_a_key_that_the_client_cannot_choose(self):
         for status in (200, 200, 200, 403):
             self.assertEqual(self.request(id=self.id, headers={"X-Request-Once": "chosen"})[0], status)
 
 
-KINDS = {"nginx": Nginx, "caddy": Caddy, "clients": Clients}
-if KIND != "clients" and not shutil.which(KIND, path="/usr/sbin:/usr/bin"):
-    print(f"skipped: {KIND} is not installed")
-    sys.exit(77)
+class Both(Scene):
+    """The two proxies, a client of the gate's and the tool spend the uses of one token, while its status is asked."""
+
+    @classmethod
+    def setUpClass(cls):
+        super().setUpClass()
+        cls.start_application()
+        cls.start_nginx()
+        cls.start_caddy()
+
+    def test_grant_as_often_as_the_token_has_uses(self):
+        uses = 200
+        id = self.token(uses)
+        ends = {"nginx": lambda: self.answer("nginx", path="/files/a", id=id)[0],
+                "caddy": lambda: self.answer("caddy", path="/files/a", id=id)[0],
+                "client": lambda: self.answer("calls", path="/grant/Example.Page/get", id=id)[0],
+                "tool": lambda: self.grant_by_tool(id)}
+        told = {name: [] for name in (*ends, "health", "metrics")}
+        is_over = threading.Event()
+
+        def spend(name):
+            while 403 not in told[name]:
+                told[name].append(ends[name]())
+
+        def look(name):
+            while not is_over.is_set():
+                told[name].append(self.answer("status", path="/" + name))
+
+        spenders = [threading.Thread(target=spend, args=(name,)) for name in list(ends) * 2]
+        lookers = [threading.Thread(target=look, args=(name,)) for name in ("health", "metrics")]
+        for thread in spenders + lookers:
+            thread.start()
+        for thread in spenders:
+            thread.join()
+        is_over.set()
+        for thread in lookers:
+            thread.join()
+
+        granted = {name: told[name].count(200) for name in ends}
+        self.assertEqual({name: set(told[name]) for name in ends}, {name: {200, 403} for name in ends})
+        self.assertEqual(sum(granted.values()), uses)
+        self.assertEqual({answer[0] for name in ("health", "metrics") for answer in told[name]}, {200})
+        line = f'vemo_gate_calls_total{{outcome="granted"}} {uses - granted["tool"]}\n'
+        for _ in range(300): # the figures are up to a second old
+            metrics = self.answer("status", path="/metrics")[2].decode()
+            if line in metrics:
+                break
+            time.sleep(0.01)
+        self.assertIn(line, metrics)
+
+    def grant_by_tool(self, id):
+        result = subprocess.run([TOOL, "grant", "-", "Example.File", "get"], env=self.environment, input=id.encode(),
+                                stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL)
+        return {0: 200, 1: 403}.get(result.returncode, result.returncode)
+
+
+KINDS = {"nginx": Nginx, "caddy": Caddy, "both": Both, "clients": Clients}
+for program in {"clients": [], "both": ["nginx", "caddy"]}.get(KIND, [KIND]):
+    if not shutil.which(program, path="/usr/sbin:/usr/bin"):
+        print(f"skipped: {program} is not installed")
+        sys.exit(77)
 suite = unittest.defaultTestLoader.loadTestsFromTestCase(KINDS[KIND])
 sys.exit(not unittest.TextTestRunner(verbosity=2).run(suite).wasSuccessful())
