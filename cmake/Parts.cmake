@@ -36,12 +36,11 @@ endfunction()
 if(VEMO_ATOKEN_TOOL)
   find_package(PkgConfig QUIET)
   if(PKG_CONFIG_FOUND)
-    pkg_check_modules(smartcols QUIET IMPORTED_TARGET smartcols)
     pkg_check_modules(libbsd QUIET IMPORTED_TARGET libbsd)
     pkg_check_modules(libmd QUIET IMPORTED_TARGET libmd)
   endif()
-  vemo_part_needs(VEMO_ATOKEN_TOOL "the tool" PKG_CONFIG_FOUND pkg-config smartcols_FOUND libsmartcols-dev
-                                              libbsd_FOUND libbsd-dev libmd_FOUND libmd-dev)
+  vemo_part_needs(VEMO_ATOKEN_TOOL "the tool" PKG_CONFIG_FOUND pkg-config libbsd_FOUND libbsd-dev
+                                              libmd_FOUND libmd-dev)
 endif()
 
 if(VEMO_ATOKEN_GATE)

@@ -62,7 +62,7 @@ install_needed()
 
 # shellcheck disable=SC2034 # for those who source this
 {
-    BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libsmartcols-dev libbsd-dev
+    BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libbsd-dev
         libmd-dev libevent-dev libseccomp-dev)
     UNIT_TEST_PACKAGES=(libgtest-dev)
     TEST_PACKAGES=(valgrind bats sqlite3 tzdata python3-pexpect mandoc bash-completion zsh fish doxygen curl nginx-light

@@ -16,7 +16,7 @@ echo "Left out:"
 configure -DCMAKE_DISABLE_FIND_PACKAGE_{PkgConfig,GTest,benchmark,Doxygen}=ON >"$dir/log"
 sed -n 's/^-- Left out: //p' "$dir/log" | tee "$dir/left-out"
 diff "$dir/left-out" - <<END
-the tool. Missing packages: pkg-config, libsmartcols-dev, libbsd-dev, libmd-dev
+the tool. Missing packages: pkg-config, libbsd-dev, libmd-dev
 the gate. Missing packages: pkg-config, libevent-dev, libseccomp-dev
 the tests. Missing packages: libgtest-dev
 the API reference. Missing packages: doxygen
@@ -32,7 +32,7 @@ for part in VEMO_ATOKEN_TOOL VEMO_ATOKEN_GATE BUILD_TESTING VEMO_ATOKEN_BENCH; d
     configure -D$part=OFF >"$dir/log"
 done | tee "$dir/errors"
 diff "$dir/errors" - <<END
-Missing packages for the tool: pkg-config, libsmartcols-dev, libbsd-dev, libmd-dev
+Missing packages for the tool: pkg-config, libbsd-dev, libmd-dev
 Missing packages for the gate: pkg-config, libevent-dev, libseccomp-dev
 Missing packages for the tests: libgtest-dev
 Missing packages for the benchmarks: libbenchmark-dev

@@ -88,7 +88,7 @@ void printTable(const Json::Value& jTokens, const Layout& layout)
                    usesText(jToken["count"]), timeIn(jToken["deadline"], layout),
                    tool::relativeText(jToken["deadline"].asInt64(), nNow), jToken["bind_sid"].asString(),
                    allowText(jToken["webapi_allow"])},
-                  isExpired(jToken, nNow) ? "red" : nullptr);
+                  isExpired(jToken, nNow));
     }
     table.print();
 }
@@ -104,7 +104,7 @@ void printField(const Json::Value& jToken, const std::string& strField)
 void printSheet(const Json::Value& jToken, const Layout& layout)
 {
     const time_t nNow = time(nullptr);
-    const char* szColour = isExpired(jToken, nNow) ? "red" : nullptr;
+    const bool blExpired = isExpired(jToken, nNow);
     tool::Table table({{"FIELD", Kind::Short}, {"VALUE", Kind::Long}}, !layout.blNoHeader);
     for (const std::string& strField : tool::fieldNames()) {
         const Json::Value& jValue = jToken[strField];
@@ -114,7 +114,7 @@ void printSheet(const Json::Value& jToken, const Layout& layout)
         } else if (strField == "deadline") {
             table.add(
                 {strField, timeIn(jValue, layout) + " (" + tool::relativeText(jValue.asInt64(), nNow) + ")"},
-                szColour);
+                blExpired);
         } else if (strField == "create_time") {
             table.add({strField, timeIn(jValue, layout)});
         } else if (strField == "count") {

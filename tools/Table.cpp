@@ -1,31 +1,21 @@
 #include "Table.h"
 
-#include <libsmartcols/libsmartcols.h>
 #include <sys/ioctl.h>
 #include <wchar.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdint>
 #include <cstring>
-#include <memory>
-#include <new>
 #include <string_view>
 
 #include "Console.h"
-#include "Failure.h"
 #include "Visible.h"
 
 namespace {
 
 const char* const SEPARATOR = "  ";
-
-void require(bool blDone)
-{
-    if (!blDone) {
-        throw std::bad_alloc(); // the one thing that these calls can fail of
-    }
-}
+const char* const RED = "\033[31m";
+const char* const NO_COLOUR = "\033[0m";
 
 // The columns of the terminal that the result goes to. Elsewhere there is no end of them.
 size_t terminalWidth()
@@ -34,54 +24,32 @@ size_t terminalWidth()
         return SIZE_MAX;
     }
     struct winsize size = {};
-    const bool blKnown = 0 == ioctl(fileno(tool::resultStream()), TIOCGWINSZ, &size) && size.ws_col;
-    return blKnown ? size.ws_col : 80;
+    ioctl(fileno(tool::resultStream()), TIOCGWINSZ, &size); // it stays as it is where that is not known
+    return size.ws_col ? size.ws_col : 80;
 }
 
-struct Character {
+struct Piece {
     size_t cb;
-    size_t nWidth; // the columns that it takes; none for a mark on another
+    size_t nWidth; // the columns that it takes
 };
 
-// The first character of a printable text.
-Character firstOf(std::string_view strText)
+// What of a printable text fits into so many columns.
+Piece firstOf(std::string_view strText, size_t nColumns)
 {
-    wchar_t cWide = 0;
-    mbstate_t state = {};
-    const size_t cb = mbrtowc(&cWide, strText.data(), strText.size(), &state);
-    if (cb > strText.size()) {
-        return {1, 1}; // a byte that the locale makes nothing of
-    }
-    return {std::max<size_t>(cb, 1), static_cast<size_t>(std::max(wcwidth(cWide), 0))};
-}
-
-size_t widthOf(std::string_view strText)
-{
-    size_t nWidth = 0;
-    while (!strText.empty()) {
-        const Character character = firstOf(strText);
-        nWidth += character.nWidth;
-        strText.remove_prefix(character.cb);
-    }
-    return nWidth;
-}
-
-// The text in pieces of this width, the last one what is left of it.
-std::vector<std::string> broken(std::string_view strText, size_t nWidth)
-{
-    std::vector<std::string> strPieces(1);
-    size_t nUsed = 0;
-    while (!strText.empty()) {
-        const Character character = firstOf(strText);
-        if (nUsed + character.nWidth > nWidth) {
-            strPieces.emplace_back();
-            nUsed = 0;
+    Piece piece = {};
+    while (piece.cb < strText.size()) {
+        const std::string_view strRest = strText.substr(piece.cb);
+        wchar_t cWide = L'\0';
+        mbstate_t state = {};
+        const size_t cb = mbrtowc(&cWide, strRest.data(), strRest.size(), &state);
+        const size_t nWidth = static_cast<size_t>(std::max(wcwidth(cWide), 0)); // none for a mark on another
+        if (piece.nWidth + nWidth > nColumns) {
+            break;
         }
-        strPieces.back() += strText.substr(0, character.cb);
-        nUsed += character.nWidth;
-        strText.remove_prefix(character.cb);
+        piece.cb += std::min(cb, strRest.size()); // an error is a large number, but printable texts have none
+        piece.nWidth += nWidth;
     }
-    return strPieces;
+    return piece;
 }
 
 } // namespace
@@ -90,13 +58,18 @@ namespace tool {
 
 Table::Table(const std::vector<Column>& columns, bool blHeader) : m_columns(columns), m_blHeader(blHeader) {}
 
-void Table::add(const std::vector<std::string>& strCells, const char* szColour)
+void Table::add(const std::vector<std::string>& strCells, bool blRed)
 {
-    Line line{{}, szColour};
+    if (m_blHeader && m_lines.empty()) {
+        Line& titles = m_lines.emplace_back();
+        for (const Column& column : m_columns) {
+            titles.strCells.emplace_back(column.szTitle);
+        }
+    }
+    Line& line = m_lines.emplace_back(Line{{}, blRed});
     for (const std::string& strCell : strCells) {
         line.strCells.push_back(printable(strCell, localeCharset()));
     }
-    m_lines.push_back(std::move(line));
 }
 
 // How wide each column is, so that a line fits. What cannot be broken is as wide as it has to be. The others
@@ -108,9 +81,9 @@ std::vector<size_t> Table::widthsWithin(size_t nTerminal) const
     std::vector<size_t> nLong; // numbers of columns
     size_t nTaken = (m_columns.size() - 1) * strlen(SEPARATOR);
     for (size_t i = 0; i < m_columns.size(); ++i) {
-        size_t nWidth = m_blHeader ? strlen(m_columns[i].szTitle) : 0;
+        size_t nWidth = 0;
         for (const Line& line : m_lines) {
-            nWidth = std::max(nWidth, widthOf(line.strCells[i]));
+            nWidth = std::max(nWidth, firstOf(line.strCells[i], SIZE_MAX).nWidth);
         }
         nWidths.push_back(nWidth);
         if (Kind::Long == m_columns[i].kind) {
@@ -129,50 +102,36 @@ std::vector<size_t> Table::widthsWithin(size_t nTerminal) const
     return nWidths;
 }
 
+std::string Table::text(size_t nTerminal, bool blColoured) const
+{
+    const std::vector<size_t> nWidths = widthsWithin(nTerminal);
+    std::string strText;
+    for (const Line& line : m_lines) {
+        const bool blRed = blColoured && line.blRed;
+        const auto isEmpty = [](std::string_view strRest) { return strRest.empty(); };
+        std::vector<std::string_view> strRests(line.strCells.begin(), line.strCells.end());
+        do {
+            strText += blRed ? RED : "";
+            for (size_t i = 0; i < strRests.size(); ++i) {
+                const Piece piece = firstOf(strRests[i], nWidths[i]);
+                const std::string strBlanks(nWidths[i] - piece.nWidth, ' ');
+                const bool blLast = strRests.size() == i + 1;
+                strText += Kind::Right == m_columns[i].kind ? strBlanks : "";
+                strText += strRests[i].substr(0, piece.cb);
+                strText += Kind::Right == m_columns[i].kind || blLast ? "" : strBlanks;
+                strText += blLast ? "" : SEPARATOR;
+                strRests[i].remove_prefix(piece.cb);
+            }
+            strText += blRed ? NO_COLOUR : "";
+            strText += '\n';
+        } while (!std::all_of(strRests.begin(), strRests.end(), isEmpty));
+    }
+    return strText;
+}
+
 void Table::print() const
 {
-    const std::unique_ptr<struct libscols_table, decltype(&scols_unref_table)> pOwner(scols_new_table(),
-                                                                                      scols_unref_table);
-    struct libscols_table* pTable = pOwner.get();
-    require(nullptr != pTable);
-    scols_table_set_stream(pTable, resultStream());
-    scols_table_enable_noheadings(pTable, !m_blHeader);
-    scols_table_enable_colors(pTable, isColoured(resultStream()));
-    scols_table_set_column_separator(pTable, SEPARATOR);
-    scols_table_enable_noencoding(pTable, true); // cells are printable
-    // Some versions of libsmartcols repeat parts of what they break, and cut characters in two: cells are
-    // broken here, and fit.
-    scols_table_set_termforce(pTable, SCOLS_TERMFORCE_NEVER);
-    for (const Column& column : m_columns) {
-        // Some make room for titles that they do not print.
-        const char* szTitle = m_blHeader ? column.szTitle : nullptr;
-        const int nFlags = Kind::Right == column.kind ? SCOLS_FL_RIGHT : 0;
-        require(nullptr != scols_table_new_column(pTable, szTitle, 0, nFlags));
-    }
-    const std::vector<size_t> nWidths = widthsWithin(terminalWidth());
-    for (const Line& line : m_lines) {
-        std::vector<std::vector<std::string>> strPieces;
-        size_t nHeight = 0;
-        for (size_t i = 0; i < line.strCells.size(); ++i) {
-            strPieces.push_back(broken(line.strCells[i], nWidths[i]));
-            nHeight = std::max(nHeight, strPieces.back().size());
-        }
-        for (size_t n = 0; n < nHeight; ++n) {
-            struct libscols_line* pLine = scols_table_new_line(pTable, nullptr);
-            require(nullptr != pLine);
-            for (size_t i = 0; i < strPieces.size(); ++i) {
-                const char* szPiece = n < strPieces[i].size() ? strPieces[i][n].c_str() : "";
-                require(0 == scols_line_set_data(pLine, i, szPiece));
-            }
-            require(!line.szColour || 0 == scols_line_set_color(pLine, line.szColour));
-        }
-    }
-    errno = 0;
-    const int nResult = scols_print_table(pTable);
-    require(ENOMEM != errno); // it leaves cells empty then, and does not tell
-    if (0 != nResult) {
-        throw Failure(EXIT_STATUS_STORE, std::string("cannot print the table: ") + strerror(-nResult));
-    }
+    tool::print(text(terminalWidth(), isColoured(resultStream())));
 }
 
 } // namespace tool

@@ -1,4 +1,4 @@
-// Tables for people, drawn by libsmartcols.
+// Tables for people.
 
 #ifndef TOOLS_TABLE_H
 #define TOOLS_TABLE_H
@@ -17,15 +17,17 @@ public:
         Right, // short, aligned to the right
     };
     struct Column {
-        const char* szTitle;
+        const char* szTitle; // ASCII; a long column is at least as wide, which any character must fit into
         Kind kind;
     };
 
     Table(const std::vector<Column>& columns, bool blHeader);
 
-    // Adds a line, its texts made printable, in a colour of libsmartcols ("red", ...) or nullptr. Colours
-    // show where the result is a coloured terminal.
-    void add(const std::vector<std::string>& strCells, const char* szColour = nullptr);
+    // Adds a line, its texts made printable. A red one is so where there are colours.
+    void add(const std::vector<std::string>& strCells, bool blRed = false);
+
+    // The table for a terminal of so many columns; where it has no line, no titles either.
+    std::string text(size_t nTerminal, bool blColoured) const;
 
     // Writes the table to the result.
     void print() const;
@@ -33,7 +35,7 @@ public:
 private:
     struct Line {
         std::vector<std::string> strCells;
-        const char* szColour;
+        bool blRed;
     };
 
     std::vector<size_t> widthsWithin(size_t nTerminal) const;

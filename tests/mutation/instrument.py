@@ -417,7 +417,7 @@ class Source:
 
 def main():
     project, output = (pathlib.Path(argument).resolve() for argument in sys.argv[1:])
-    libraries = subprocess.run(["pkg-config", "--cflags", "jsoncpp", "smartcols"], check=True, stdout=subprocess.PIPE)
+    libraries = subprocess.run(["pkg-config", "--cflags", "jsoncpp"], check=True, stdout=subprocess.PIPE)
     arguments = ["-xc++", "-std=c++17", f"-I{project}", f"-I{project}/include", f"-I{project}/platform", f"-I{project}/examples",
                  '-DVEMO_ATOKEN_VERSION=""', *libraries.stdout.decode().split()]
     view = ["-include", f"{project}/tests/mutation/view.h"]
