@@ -66,21 +66,32 @@ struct User {
 template <typename Lookup>
 std::optional<User> lookUp(const std::string& strWho, Lookup lookup)
 {
-    std::vector<char> buffer(1024);
+    std::vector<char> buffer;
     struct passwd entry = {};
     struct passwd* pFound = nullptr;
-    int nError = ERANGE;
-    while (ERANGE == (nError = lookup(&entry, buffer.data(), buffer.size(), &pFound))) {
-        buffer.resize(2 * buffer.size());
+    for (;;) {
+        buffer.resize(buffer.size() + 1024);
+        const int nError = lookup(&entry, buffer.data(), buffer.size(), &pFound);
+        if (pFound) {
+            return User{entry.pw_name, entry.pw_uid};
+        }
+        if (isNotFound(nError)) {
+            return std::nullopt;
+        }
+        if (ERANGE != nError) {
+            throw tool::Failure(tool::EXIT_STATUS_STORE,
+                                "the " + strWho + " could not be looked up: " + strerror(nError));
+        }
     }
-    if (pFound) {
-        return User{entry.pw_name, entry.pw_uid};
-    }
-    if (!isNotFound(nError)) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE,
-                            "the " + strWho + " could not be looked up: " + strerror(nError));
-    }
-    return std::nullopt;
+}
+
+// The number in decimal that a text begins with, if it does; szText is then behind it.
+std::optional<int64_t> readNumber(const char*& szText, const char* szEnd)
+{
+    int64_t nNumber = 0;
+    const auto [szRest, error] = std::from_chars(szText, szEnd, nNumber);
+    szText = szRest;
+    return std::errc() == error ? std::optional(nNumber) : std::nullopt;
 }
 
 [[noreturn]] void failOnDuration(const std::string& strText)
@@ -94,14 +105,14 @@ namespace tool {
 
 int64_t parseNumber(const std::string& strText, int64_t nMin, int64_t nMax)
 {
-    int64_t nNumber = 0;
-    const char* szEnd = strText.data() + strText.size();
-    const auto [szRead, error] = std::from_chars(strText.data(), szEnd, nNumber);
-    if (std::errc() != error || szRead != szEnd || nNumber < nMin || nNumber > nMax) {
+    const char* szRest = strText.data();
+    const char* szEnd = szRest + strText.size();
+    const auto nNumber = readNumber(szRest, szEnd);
+    if (!nNumber || szRest != szEnd || *nNumber < nMin || *nNumber > nMax) {
         throw BadValue(quoted(strText) + " is no number from " + std::to_string(nMin) + " to " +
                        std::to_string(nMax));
     }
-    return nNumber;
+    return *nNumber;
 }
 
 unsigned int parseUid(const std::string& strText)
@@ -124,9 +135,9 @@ std::string userName(Json::Int64 nUid)
 {
     const std::string strWho = "user of the number " + std::to_string(nUid);
     std::optional<User> found;
-    if (nUid >= 0 && nUid < Json::Int64{UID_ERR}) { // or it would be narrowed to another's number
-        found = lookUp(
-            strWho, [nUid](auto... arguments) { return getpwuid_r(static_cast<uid_t>(nUid), arguments...); });
+    const uid_t uid = static_cast<uid_t>(nUid);
+    if (uid == nUid) { // or it is narrowed to another's number
+        found = lookUp(strWho, [uid](auto... arguments) { return getpwuid_r(uid, arguments...); });
     }
     if (!found) {
         throw Failure(EXIT_STATUS_STORE, "there is no " + strWho);
@@ -157,16 +168,13 @@ int64_t parseDuration(const std::string& strText)
     const char* szEnd = szRest + strParts.size();
     int64_t nTotal = 0;
     while (szRest != szEnd) {
-        int64_t nNumber = 0;
-        const auto [szUnit, error] = std::from_chars(szRest, szEnd, nNumber);
-        const int64_t nUnit = secondsOf(*szUnit); // at the end stands a NUL
-        int64_t nPart = 0;
-        if (std::errc() != error || nNumber < 0 || 0 == nUnit ||
-            __builtin_mul_overflow(nNumber, nUnit, &nPart) || nPart > DURATION_MAX - nTotal) {
+        const auto nNumber = readNumber(szRest, szEnd);
+        const int64_t nUnit = secondsOf(*szRest); // at the end stands a NUL
+        if (!nNumber || *nNumber < 0 || 0 == nUnit || *nNumber > (DURATION_MAX - nTotal) / nUnit) {
             failOnDuration(strText);
         }
-        nTotal += nPart;
-        szRest = szUnit + 1;
+        nTotal += *nNumber * nUnit;
+        ++szRest;
     }
     if (0 == nTotal) {
         failOnDuration(strText);
@@ -179,13 +187,12 @@ int64_t parseTime(const std::string& strText)
     if (strText[0] == '@') {
         return parseNumber(strText.substr(1), 0, INT64_MAX);
     }
-    const bool blUtc = !strText.empty() && strText.back() == 'Z';
-    const std::string strDate = strText.substr(0, strText.size() - (blUtc ? 1 : 0));
     for (const char* szFormat :
          {"%Y-%m-%d", "%Y-%m-%d %H:%M", "%Y-%m-%dT%H:%M", "%Y-%m-%d %H:%M:%S", "%Y-%m-%dT%H:%M:%S"}) {
         struct tm tmTime = {};
-        const char* szEnd = strptime(strDate.c_str(), szFormat, &tmTime);
-        if (!szEnd || *szEnd) {
+        const char* szRest = strptime(strText.c_str(), szFormat, &tmTime);
+        const bool blUtc = szRest && 0 == strcmp(szRest, "Z");
+        if (!szRest || (*szRest && !blUtc)) {
             continue;
         }
         const struct tm tmAsked = tmTime;

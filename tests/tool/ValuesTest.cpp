@@ -2,6 +2,11 @@
 
 #include <gtest/gtest.h>
 
+#include "Seam.h"
+#include "tools/Failure.h"
+
+using tool::parseDuration;
+using tool::parseTime;
 using tool::relativeText;
 
 namespace {
@@ -10,7 +15,184 @@ const int64_t MINUTE = 60;
 const int64_t HOUR = 60 * MINUTE;
 const int64_t DAY = 24 * HOUR;
 
+// What a reader says of a text that it refuses.
+template <typename Read>
+std::string refusal(Read read, const std::string& strText)
+{
+    try {
+        return "read as " + std::to_string(read(strText));
+    } catch (const tool::BadValue& bad) {
+        return bad.what();
+    }
+}
+
+void setZone(const char* szZone)
+{
+    setenv("TZ", szZone, 1);
+    tzset();
+}
+
 } // namespace
+
+TEST(Users, AreLookedUpOnceInAList)
+{
+    for (const char* szTime : {"first", "second"}) {
+        EXPECT_EQ("root", tool::userNameIfKnown(0)) << szTime;
+        EXPECT_EQ(std::nullopt, tool::userNameIfKnown(4000000000)) << szTime;
+    }
+    EXPECT_EQ((std::vector<std::string>{"getpwuid_r 0", "getpwuid_r 4000000000"}),
+              seam().callsOf({"getpwuid_r"}));
+}
+
+TEST(Users, AreNotLookedUpByNumbersThatNobodyCanHave)
+{
+    for (const int64_t nUid : {int64_t{-1}, int64_t{-4294967296}, int64_t{4294967296}}) {
+        EXPECT_THROW(tool::userName(nUid), tool::Failure);
+    }
+    EXPECT_EQ(std::vector<std::string>(), seam().callsOf({"getpwuid_r"}));
+}
+
+TEST(Durations, AreANumberOfSecondsOrNumbersWithUnits)
+{
+    const struct {
+        const char* szText;
+        int64_t nSeconds;
+    } CASES[] = {
+        {"1", 1},
+        {"45s", 45},
+        {"90m", 90 * MINUTE},
+        {"8h", 8 * HOUR},
+        {"1h30m", 90 * MINUTE},
+        {"2d12h", 60 * HOUR},
+        {"1w", 7 * DAY},
+        {"1w1d1h1m1s", 8 * DAY + HOUR + MINUTE + 1},
+        {"0h1s", 1},
+        {"52178w", 365246 * DAY},
+        {"365250d", 365250 * DAY},
+        {"365249d24h", 365250 * DAY},
+        {"31557600000", 365250 * DAY},
+    };
+    for (const auto& each : CASES) {
+        EXPECT_EQ(each.nSeconds, parseDuration(each.szText)) << each.szText;
+    }
+}
+
+TEST(Durations, AreFromASecondToAThousandYears)
+{
+    for (const std::string strText : {"0",
+                                      "0s",
+                                      "00",
+                                      "",
+                                      "h",
+                                      "1x",
+                                      "1H",
+                                      "1y",
+                                      "1.5h",
+                                      "-1m",
+                                      "1h-1m",
+                                      "+5m",
+                                      " 5m",
+                                      "5 m",
+                                      "5m,",
+                                      "1h30",
+                                      "1hh",
+                                      "1h99999999999999999999w",
+                                      "P1D",
+                                      "365251d",
+                                      "52179w",
+                                      "31557600001",
+                                      "365250d1s",
+                                      "9223372036854775807",
+                                      "9223372036854775808s",
+                                      "9223372036854775807w",
+                                      "99999999999999999999w"}) {
+        EXPECT_EQ("\"" + strText + "\" is no duration such as 90s, 15m, 8h, 2d12h or 1w",
+                  refusal(parseDuration, strText));
+    }
+}
+
+TEST(Times, AreLocalOrUtcOrSeconds)
+{
+    const struct {
+        const char* szZone;
+        const char* szText;
+        int64_t nTime;
+    } CASES[] = {
+        {"Europe/Berlin", "2060-02-29", 2845234800},
+        {"Europe/Berlin", "2060-02-29Z", 2845238400},
+        {"Europe/Berlin", "2060-06-30 12:34", 2855817240},
+        {"Europe/Berlin", "2060-06-30 12:34:56", 2855817296},
+        {"Europe/Berlin", "2060-06-30T12:34", 2855817240},
+        {"Europe/Berlin", "2060-06-30T12:34:56", 2855817296},
+        {"Europe/Berlin", "2060-06-30 12:34Z", 2855824440},
+        {"Europe/Berlin", "2060-06-30 12:34:56Z", 2855824496},
+        {"Europe/Berlin", "2060-06-30T12:34Z", 2855824440},
+        {"Europe/Berlin", "2060-06-30T12:34:56Z", 2855824496},
+        {"Europe/Berlin", "9999-12-31 23:59:59Z", 253402300799},
+        {"Europe/Berlin", "@4294967296", 4294967296},
+        {"Europe/Berlin", "@9223372036854775807", INT64_MAX},
+        {"America/New_York", "2060-01-01", 2840158800},
+        {"UTC", "2060-01-01", 2840140800},
+        // The clocks go from 2 to 3 o'clock on 28 March and from 3 to 2 on 31 October.
+        {"Europe/Berlin", "2060-03-28", 2847654000},
+        {"Europe/Berlin", "2060-03-28 01:59:59", 2847661199},
+        {"Europe/Berlin", "2060-03-28 03:00", 2847661200},
+        {"Europe/Berlin", "2060-03-28 02:30Z", 2847666600},
+        {"Europe/Berlin", "2060-10-31", 2866399200},
+        {"Europe/Berlin", "2060-10-31 01:59:59", 2866406399},
+        {"Europe/Berlin", "2060-10-31 03:00", 2866413600},
+        {"Africa/Cairo", "2060-04-30", 2850501600}, // a day that begins at 1 o'clock
+    };
+    for (const auto& each : CASES) {
+        setZone(each.szZone);
+        EXPECT_EQ(each.nTime, parseTime(each.szText)) << each.szText;
+    }
+    setZone("Europe/Berlin");
+    const int64_t nTwice = parseTime("2060-10-31 02:30");
+    EXPECT_TRUE(2866408200 == nTwice || 2866411800 == nTwice) << nTwice;
+}
+
+TEST(Times, ThatDoNotExistAreRefused)
+{
+    const auto sentence = [](const std::string& strText) {
+        return "\"" + strText +
+               "\" is no time such as 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @1798761599";
+    };
+    setZone("Europe/Berlin");
+    for (const char* szText : {"",
+                               "Z",
+                               "tomorrow",
+                               "2061-02-29",
+                               "2060-06-31",
+                               "2060-00-10",
+                               "2060-13-01",
+                               "2060-01-00",
+                               "2060-01",
+                               "10000-01-01",
+                               "2060-01-01 ",
+                               "2060-01-01 12",
+                               "2060-01-01 24:00",
+                               "2060-01-01 12:60",
+                               "2060-01-01 12:00:60",
+                               "2060-01-01 12:00:61",
+                               "2060-01-01 23:59:60",
+                               "2060-01-01T12:00:00z",
+                               "2060-01-01ZZ",
+                               "2060-01-01T12:00:00+01:00",
+                               "2060-01-01 12:00:00.5",
+                               "01.01.2060",
+                               "2060-03-28 02:00",
+                               "2060-03-28 02:30",
+                               "2060-03-28T02:59:59"}) {
+        EXPECT_EQ(sentence(szText), refusal(parseTime, szText));
+    }
+    setZone("Australia/Lord_Howe"); // where they leap over half an hour
+    EXPECT_EQ(sentence("2060-10-03 02:15"), refusal(parseTime, "2060-10-03 02:15"));
+    for (const std::string strSeconds : {"", "-1", " 1", "1x", "1.5", "9223372036854775808", "4000000000Z"}) {
+        EXPECT_EQ("\"" + strSeconds + "\" is no number from 0 to 9223372036854775807",
+                  refusal(parseTime, "@" + strSeconds));
+    }
+}
 
 TEST(RelativeText, HasOneUnit)
 {
@@ -37,4 +219,10 @@ TEST(RelativeText, HasOneUnit)
     for (const auto& each : CASES) {
         EXPECT_EQ(each.szText, relativeText(nNow + each.nLeft, nNow)) << each.nLeft;
     }
+    // What is too far away to be counted, and what is just not.
+    EXPECT_EQ("far off", relativeText(INT64_MAX, -1));
+    EXPECT_EQ("in 106751991167300 d", relativeText(INT64_MAX, 0));
+    EXPECT_EQ("expired 106751991167300 d ago", relativeText(INT64_MIN + 1, 0));
+    EXPECT_EQ("expired", relativeText(INT64_MIN, 0));
+    EXPECT_EQ("expired", relativeText(INT64_MIN, 1));
 }
