@@ -16,9 +16,8 @@ std::string write(const Json::Value& jValue, const char* szIndentation)
 {
     Json::StreamWriterBuilder builder;
     builder["indentation"] = szIndentation;
-    builder["precision"] = 17;
-    // What the store can hold comes out as it is: doubles that JSON has no name for, and bytes that
-    // are not valid UTF-8.
+    // What the store can hold comes out as it is: doubles that JSON has no name for, and bytes that are not
+    // valid UTF-8. All digits of doubles come in any case.
     builder["useSpecialFloats"] = true;
     builder["emitUTF8"] = true;
     std::ostringstream stream;
@@ -98,19 +97,14 @@ Json::Value ObjectReader::read(const std::string& strText) const
 std::string flawOfStored(const std::string& strText)
 {
     static const std::unique_ptr<Json::CharReader> pReader = [] {
-        Json::CharReaderBuilder builder; // as lenient as the library
+        Json::CharReaderBuilder builder; // as lenient as the library's
         builder["allowSpecialFloats"] = true;
-        builder["stackLimit"] = NESTED_MAX;
         return std::unique_ptr<Json::CharReader>(builder.newCharReader());
     }();
     Json::Value jValue;
     std::string strReport;
-    switch (readBy(*pReader, strText, jValue, strReport)) {
-    case Reading::Whole: break;
-    case Reading::Bad: return "is no JSON";
-    case Reading::TooDeep: return "is nested too deeply";
-    }
-    return "";
+    const Reading reading = readBy(*pReader, strText, jValue, strReport);
+    return Reading::Whole == reading ? "" : Reading::Bad == reading ? "is no JSON" : "is nested too deeply";
 }
 
 int nestingOf(const std::string& strText)

@@ -1,0 +1,110 @@
+#include "tools/Json.h"
+
+#include <gtest/gtest.h>
+
+#include <limits>
+
+#include "ScarceMemory.h"
+#include "tools/Failure.h"
+
+using tool::compactJson;
+using tool::flawOfStored;
+using tool::nestingOf;
+using tool::parseObject;
+
+namespace {
+
+std::string nested(int nLevels)
+{
+    return std::string(static_cast<size_t>(nLevels), '[') + std::string(static_cast<size_t>(nLevels), ']');
+}
+
+// What is read, or why not.
+std::string read(const std::string& strText)
+{
+    try {
+        return compactJson(parseObject(strText));
+    } catch (const tool::BadValue& bad) {
+        return bad.what();
+    }
+}
+
+const std::string LONG(100, 'x');
+
+} // namespace
+
+TEST(Json, TellsHowDeepATextIsNested)
+{
+    const struct {
+        const char* szText;
+        int nLevels;
+    } CASES[] = {
+        {"", 0},
+        {"1", 0},
+        {"{}", 1},
+        {"[]", 1},
+        {"[[[]]]", 3},
+        {"[[],[[]],{}]", 3},
+        {R"({"a":{"b":[1]},"c":{}})", 3},
+        {R"([{},{},[],[]])", 2},
+        {R"({"a":"[[[{{{"})", 1},
+        {R"(["\"[[", [[]]])", 3},
+        {R"(["\\", [["]"]]])", 3},
+        {R"("\)", 0},
+        {"]]]]", 0},
+        {"}[[", 1},
+    };
+    for (const auto& each : CASES) {
+        EXPECT_EQ(each.nLevels, nestingOf(each.szText)) << each.szText;
+    }
+}
+
+TEST(Json, IsReadStrictly)
+{
+    const char* const CASES[][2] = {
+        {R"({"a":[1,"b",null]})", R"({"a":[1,"b",null]})"},
+        {"{\n \"a\": NaN, \"b\": -Infinity}", R"({"a":NaN,"b":-Infinity})"},
+        {"", "is no JSON: Column 1 Syntax error: value, object or array expected."},
+        {"[]", "is no JSON object"},
+        {"1", "is no JSON: Column 1 A valid JSON document must be either an array or an object value."},
+        {R"({"a":1} x)", "is no JSON: Column 9 Extra non-whitespace after JSON value."},
+        {R"({"a":1,"a":2})", "is no JSON: Column 8 Duplicate key: 'a'"},
+        {R"({'a':1})", "is no JSON: Column 2 Missing '}' or object member name"},
+        {"{\n\"a\":}", "is no JSON: Line 2, Column 5 Syntax error: value, object or array expected."},
+        {R"({"a":tru,"b":fals})", "is no JSON: Column 6 Syntax error: value, object or array expected."},
+    };
+    for (const auto& each : CASES) {
+        EXPECT_EQ(each[1], read(each[0])) << each[0];
+    }
+    EXPECT_EQ("is nested too deeply for JSON", read(R"({"a":)" + nested(1000) + "}"));
+    EXPECT_EQ(R"({"a":)" + nested(999) + "}", read(R"({"a":)" + nested(999) + "}"));
+}
+
+TEST(Json, ThatATokenHoldsIsReadAsLenientlyAsByTheLibrary)
+{
+    for (const std::string& strText : {std::string("/**/{\"a\":1,}x"), std::string("1"), nested(1000)}) {
+        EXPECT_EQ("", flawOfStored(strText));
+    }
+    EXPECT_EQ("is no JSON", flawOfStored("{"));
+    EXPECT_EQ("is nested too deeply", flawOfStored(nested(1001)));
+}
+
+TEST(Json, IsWrittenAsItIs)
+{
+    Json::Value jValue;
+    jValue["double"] = 0.1 + 0.2;
+    jValue["infinite"] = std::numeric_limits<double>::infinity();
+    jValue["text"] = "\xc3\xa4\xff\x1b";
+    EXPECT_EQ("{\"double\":0.30000000000000004,\"infinite\":Infinity,\"text\":\"\xc3\xa4\xff\\u001b\"}",
+              compactJson(jValue));
+}
+
+// What streams hide of it must not cut a text short, or turn a number into none.
+TEST(Json, IsWholeOrNoneWhenMemoryFails)
+{
+    const std::string strText = R"({"a":[0.12345678901234559,")" + LONG + R"("]})";
+    EXPECT_EQ(std::set<std::string>{strText}, resultsWhileMemoryFails([&] { return read(strText); }));
+    const std::string strBad = R"({"a":)" + LONG + "}";
+    EXPECT_EQ(std::set<std::string>{read(strBad)}, resultsWhileMemoryFails([&] { return read(strBad); }));
+    EXPECT_EQ(std::set<std::string>{""}, resultsWhileMemoryFails([&] { return flawOfStored(strText); }));
+}
