@@ -14,23 +14,12 @@ namespace {
 const int DIRECTORY_FLAGS = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 const mode_t OTHERS_WRITE_MODE = 0022;
 
-// ENOTDIR is what the kernel says of a symbolic link, too.
-int errorOf(const tool::Descriptor& directory, const std::string& strName)
-{
-    const int nError = errno;
-    struct stat status = {}; // no link, unless it is found to be one
-    fstatat(directory.get(), strName.c_str(), &status, AT_SYMLINK_NOFOLLOW);
-    return S_ISLNK(status.st_mode) ? ELOOP : nError;
-}
-
 // Whether an open file has the name by which it was opened, and no other. Both by one call: others, who gave
 // it that name, can take it away again, and one is left then, too.
 bool hasThisNameOnly(const tool::Descriptor& file, const tool::FilePlace& place)
 {
-    const struct stat status = tool::statusOf(file);
-    struct stat named = {};
-    return 0 == fstatat(place.directory.get(), place.strName.c_str(), &named, AT_SYMLINK_NOFOLLOW) &&
-           named.st_dev == status.st_dev && named.st_ino == status.st_ino && 1 == named.st_nlink;
+    const struct stat named = tool::statusAt(place.directory, place.strName);
+    return tool::isSame(named, tool::statusOf(file)) && 1 == named.st_nlink;
 }
 
 } // namespace
@@ -50,28 +39,20 @@ Descriptor& Descriptor::operator=(Descriptor&& other) noexcept
     return *this;
 }
 
-int Descriptor::release()
-{
-    const int nFile = m_nFile;
-    m_nFile = -1;
-    return nFile;
-}
-
 Walk::Walk(const std::string& strPath)
     : m_strWhole(strPath),
+      m_nNext(strPath.find_first_not_of('/')),
       m_strPath(strPath.substr(0, 1) == "/" ? "/" : "."),
       m_directory(open(m_strPath.c_str(), DIRECTORY_FLAGS))
 {
-    m_nError = errno;
-    m_nNext = m_strWhole.find_first_not_of('/');
+    if (!m_directory.isOpen()) {
+        throw Failure(EXIT_STATUS_STORE, m_strPath + ": " + strerror(errno));
+    }
 }
 
 bool Walk::step()
 {
-    if (!m_directory.isOpen()) {
-        errno = m_nError;
-        return false;
-    }
+    m_blMade = false;
     const size_t nEnd = m_strWhole.find('/', m_nNext);
     m_strName = m_strWhole.substr(m_nNext, nEnd - m_nNext);
     m_strPath = m_strWhole.substr(0, nEnd);
@@ -79,21 +60,19 @@ bool Walk::step()
     return openNamed();
 }
 
-bool Walk::make(mode_t mode, bool& blMade)
+bool Walk::make(mode_t mode)
 {
     const UmaskOff umaskOff;
-    blMade = 0 == mkdirat(m_directory.get(), m_strName.c_str(), mode);
-    if (blMade ? !syncNames(m_directory) : EEXIST != errno) {
-        return false;
-    }
-    return openNamed();
+    m_blMade = 0 == mkdirat(m_directory.get(), m_strName.c_str(), mode);
+    return (m_blMade ? syncNames(m_directory) : EEXIST == errno) && openNamed();
 }
 
 bool Walk::openNamed()
 {
     Descriptor next(openat(m_directory.get(), m_strName.c_str(), DIRECTORY_FLAGS));
     if (!next.isOpen()) {
-        errno = errorOf(m_directory, m_strName);
+        const int nError = errno; // ENOTDIR is what the kernel says of a symbolic link, too
+        errno = S_ISLNK(statusAt(m_directory, m_strName).st_mode) ? ELOOP : nError;
         return false;
     }
     m_directory = std::move(next);
@@ -112,8 +91,7 @@ BadValue badPath(const std::string& strPath, const std::string& strReached)
 
 FilePlace::FilePlace(const std::string& strPath)
 {
-    const size_t nSlash = strPath.rfind('/');
-    const size_t nName = std::string::npos == nSlash ? 0 : nSlash + 1;
+    const size_t nName = strPath.rfind('/') + 1; // 0 where there is none: npos is one less
     Walk walk(strPath.substr(0, nName));
     while (!walk.isDone()) {
         if (!walk.step()) {
@@ -124,20 +102,28 @@ FilePlace::FilePlace(const std::string& strPath)
     strName = strPath.substr(nName);
 }
 
+struct stat statusAt(const Descriptor& directory, const std::string& strName)
+{
+    struct stat status = {};
+    fstatat(directory.get(), strName.c_str(), &status, AT_SYMLINK_NOFOLLOW);
+    return status;
+}
+
+bool isSame(const struct stat& one, const struct stat& other)
+{
+    return one.st_dev == other.st_dev && one.st_ino == other.st_ino;
+}
+
 Descriptor openRegular(const Descriptor& directory, const std::string& strName)
 {
-    const auto isRegular = [](const struct stat& status) { return S_ISREG(status.st_mode); };
-    struct stat status = {};
-    if (0 != fstatat(directory.get(), strName.c_str(), &status, AT_SYMLINK_NOFOLLOW)) {
-        return Descriptor();
-    }
-    if (!isRegular(status)) {
-        errno = S_ISLNK(status.st_mode) ? ELOOP : S_ISDIR(status.st_mode) ? EISDIR : EINVAL;
+    const mode_t mode = statusAt(directory, strName).st_mode;
+    if (!S_ISREG(mode)) {
+        errno = S_ISLNK(mode) ? ELOOP : S_ISDIR(mode) ? EISDIR : mode ? EINVAL : errno;
         return Descriptor();
     }
     // It can have become another thing since.
     Descriptor file(openat(directory.get(), strName.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
-    if (file.isOpen() && !isRegular(statusOf(file))) {
+    if (file.isOpen() && !S_ISREG(statusOf(file).st_mode)) {
         errno = EINVAL;
         return Descriptor();
     }
@@ -160,7 +146,7 @@ Descriptor openToRead(const std::string& strPath)
 
 bool syncNames(const Descriptor& directory)
 {
-    const Descriptor readable(openat(directory.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    const Descriptor readable(openat(directory.get(), ".", O_RDONLY | O_CLOEXEC));
     return readable.isOpen() && 0 == fsync(readable.get());
 }
 

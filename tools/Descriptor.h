@@ -7,6 +7,7 @@
 #include <sys/stat.h>
 
 #include <string>
+#include <utility>
 
 #include "Failure.h"
 
@@ -22,7 +23,7 @@ public:
 
     bool isOpen() const { return 0 <= m_nFile; }
     int get() const { return m_nFile; }
-    int release(); // hands it on
+    int release() { return std::exchange(m_nFile, -1); } // hands it on
 
 private:
     int m_nFile;
@@ -44,19 +45,23 @@ private:
 // none through a symbolic link.
 class Walk {
 public:
+    // Throws Failure where not even the first of them can be opened.
     explicit Walk(const std::string& strPath);
 
-    // Whether all directories of the path are open.
-    bool isDone() const { return m_directory.isOpen() && std::string::npos == m_nNext; }
+    // Whether all directories of the path have been stepped to.
+    bool isDone() const { return std::string::npos == m_nNext; }
 
     // Opens the next one. Returns false, with errno set, where that is not possible: ENOENT there is none,
     // ELOOP it is a symbolic link, ENOTDIR it is something else.
     bool step();
 
     // Makes the one that a step found missing, with this mode whatever the umask, and opens it. Returns
-    // false, with errno set, where that is not possible. blMade tells whether it was not another process that
-    // made it; then no power cut undoes that.
-    bool make(mode_t mode, bool& blMade);
+    // false, with errno set, where that is not possible.
+    bool make(mode_t mode);
+
+    // Whether it was that, and not another process, that made the last one. Once make() has succeeded, no
+    // power cut undoes it.
+    bool hasMade() const { return m_blMade; }
 
     // The last one that was opened or, when a step failed, that was not.
     const std::string& path() const { return m_strPath; }
@@ -68,11 +73,11 @@ private:
     bool openNamed();
 
     const std::string m_strWhole;
-    size_t m_nNext = 0; // where the next name begins; npos behind the last
+    size_t m_nNext; // where the next name begins; npos behind the last
     std::string m_strPath;
     std::string m_strName; // of the directory that path() ends with
     Descriptor m_directory;
-    int m_nError = 0; // why that could not be opened
+    bool m_blMade = false;
 };
 
 // What is said of a path when errno tells why it, or the directory of it that a walk reached, cannot be
@@ -87,6 +92,12 @@ struct FilePlace {
     Descriptor directory;
     std::string strName;
 };
+
+// What lstat tells of a name in a directory; zeros, with errno set, where it tells nothing.
+struct stat statusAt(const Descriptor& directory, const std::string& strName);
+
+// Whether two descriptions are those of one file.
+bool isSame(const struct stat& one, const struct stat& other);
 
 // Opens a file of a directory for reading, without waiting, if it is a regular one. Returns none, with errno
 // set, where it is not: EINVAL for what is no regular file. Nothing else is opened.

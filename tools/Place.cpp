@@ -21,28 +21,23 @@ const mode_t PARENT_MODE = 0755;
     throw tool::Failure(tool::EXIT_STATUS_STORE, tool::shownPath(strPath) + ": " + strerror(errno), strHint);
 }
 
-// The private directory, which must not be reached through a symbolic link. Makes what is missing of it;
-// blMade tells whether that was the directory itself.
-tool::Descriptor makePrivateDirectory(bool& blMade)
+// The way to the private directory, which must not lead through a symbolic link. Makes what is missing of it.
+tool::Walk walkMaking()
 {
     tool::Walk walk(tool::databaseDirectory());
     while (!walk.isDone()) {
-        blMade = false;
-        if (!walk.step() &&
-            (ENOENT != errno || !walk.make(walk.isDone() ? PRIVATE_MODE : PARENT_MODE, blMade))) {
+        if (!walk.step() && (ENOENT != errno || !walk.make(walk.isDone() ? PRIVATE_MODE : PARENT_MODE))) {
             throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(walk.path(), walk.path()).what(),
-                                blMade ? "the change was made, but a power cut can undo it" : "");
+                                walk.hasMade() ? "the change was made, but a power cut can undo it" : "");
         }
     }
-    return std::move(walk.directory());
+    return walk;
 }
 
 // The database, or the journal with this suffix, if it is a regular file.
 tool::Descriptor openBeside(const std::string& strSuffix)
 {
-    const tool::Descriptor directory(
-        open(tool::databaseDirectory().c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    return tool::openRegular(directory, tool::databaseName() + strSuffix);
+    return tool::openRegular(tool::openDirectory(), tool::databaseName() + strSuffix);
 }
 
 // Zeros where there are none.
@@ -71,13 +66,13 @@ std::string databaseName()
 std::optional<struct stat> statusOf(const std::string& strPath)
 {
     struct stat status = {};
-    if (0 == lstat(strPath.c_str(), &status)) {
-        return status;
+    if (0 != lstat(strPath.c_str(), &status)) {
+        if (ENOENT != errno) {
+            failOn(strPath);
+        }
+        return std::nullopt;
     }
-    if (ENOENT != errno) {
-        failOn(strPath);
-    }
-    return std::nullopt;
+    return status;
 }
 
 std::string firstBytes(const std::string& strSuffix, size_t cbWanted)
@@ -88,8 +83,7 @@ std::string firstBytes(const std::string& strSuffix, size_t cbWanted)
 std::string lastBytes(const std::string& strSuffix, size_t cbWanted)
 {
     const Descriptor file = openBeside(strSuffix);
-    const off_t cbFile = file.isOpen() ? statusOf(file).st_size : 0;
-    return bytesAt(file, cbFile - static_cast<off_t>(cbWanted), cbWanted);
+    return bytesAt(file, lseek(file.get(), 0, SEEK_END) - static_cast<off_t>(cbWanted), cbWanted);
 }
 
 void requireDatabase(bool blCreate)
@@ -120,31 +114,33 @@ void requireDatabase(bool blCreate)
 
 bool makeDirectory()
 {
-    bool blMade = false;
-    makePrivateDirectory(blMade);
-    return blMade;
+    return walkMaking().hasMade();
 }
 
 bool makeFile()
 {
-    bool blDirectory = false;
-    const Descriptor directory = makePrivateDirectory(blDirectory);
+    Walk walk = walkMaking();
     const UmaskOff umaskOff;
-    const Descriptor file(openat(directory.get(), databaseName().c_str(),
-                                 O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, PRIVATE_MODE));
+    const Descriptor file(openat(walk.directory().get(), databaseName().c_str(),
+                                 O_RDONLY | O_CREAT | O_EXCL | O_CLOEXEC, PRIVATE_MODE));
     if (!file.isOpen() && EEXIST != errno) {
         failOn(VEMO_ATOKEN_DB_PATH);
     }
     return file.isOpen();
 }
 
-void syncDirectory(const char* szMeaning)
+Descriptor openDirectory()
 {
     char szDirectory[] = VEMO_ATOKEN_DB_PATH;
     *strrchr(szDirectory, '/') = '\0';
-    const Descriptor directory(open(szDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    return Descriptor(open(szDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+}
+
+void syncDirectory(const char* szMeaning)
+{
+    const Descriptor directory = openDirectory();
     if (!directory.isOpen() || 0 != fsync(directory.get())) {
-        failOn(szDirectory, szMeaning);
+        failOn(databaseDirectory(), szMeaning);
     }
 }
 

@@ -8,11 +8,17 @@
 #include <optional>
 #include <string>
 
+#include "Descriptor.h"
+
 namespace tool {
 
 // The private directory that holds the database, and the name of that in it.
 std::string databaseDirectory();
 std::string databaseName();
+
+// Opens that directory, whatever the way to it; none, with errno set, where that is not possible. Takes no
+// memory.
+Descriptor openDirectory();
 
 // What stands behind that in the names of its journals.
 const char* const JOURNAL_SUFFIXES[] = {"-journal", "-wal", "-shm"};

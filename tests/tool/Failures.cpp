@@ -2,9 +2,13 @@
 // of these can be synced, with a path that one; with an errno in VEMO_TEST_LOOKUP, each look-up of a user
 // ends with it and finds nobody, with ERANGE as long as its buffer has less than 4 KiB; with one in
 // VEMO_TEST_PROC, /proc cannot be listed; with a name in VEMO_TEST_VFS, SQLite works on files in the way of
-// that name. And of what nobody sees: texts that are wiped from memory go into the file that VEMO_TEST_WIPED
-// names. For each log line, the file that VEMO_TEST_SYSLOG names gets its priority, and "held" or "free":
-// what the lock is then.
+// that name; with VEMO_TEST_ROOM, so many blocks of a file system are free, of so many bytes each, and there
+// are so many files, of which so many are free. Lines of VEMO_TEST_CALLS are "CALL|ERRNO", and all those
+// calls fail with it, or "CALL|COMMAND": in front of the first, that does what another program could do in
+// this moment. CALL is the name of one of the functions below that ask fails(), with that of the file behind
+// it, if it has one. And of what nobody sees: texts that are wiped from memory go into the file that
+// VEMO_TEST_WIPED names. For each log line, the file that VEMO_TEST_SYSLOG names gets its priority, and
+// "held" or "free": what the lock is then. What is opened to be handed on to other programs ends the tool.
 
 #include <dirent.h>
 #include <dlfcn.h>
@@ -13,6 +17,7 @@
 #include <sqlite3.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <sys/statvfs.h>
 #include <syslog.h>
 #include <unistd.h>
 
@@ -21,6 +26,8 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <sstream>
+#include <string>
 
 #include "CallLock.h"
 
@@ -34,8 +41,36 @@ int next(const char* szFunction, Arguments... arguments)
     return reinterpret_cast<int (*)(Arguments...)>(dlsym(RTLD_NEXT, szFunction))(arguments...);
 }
 
+bool fails(const std::string& strCall)
+{
+    const char* szCalls = getenv("VEMO_TEST_CALLS");
+    std::istringstream lines(szCalls ? szCalls : "");
+    const int nBefore = errno;
+    for (std::string strLine; std::getline(lines, strLine);) {
+        if (0 == strLine.compare(0, strCall.size() + 1, strCall + "|")) {
+            const std::string strRest = strLine.substr(strCall.size() + 1);
+            errno = atoi(strRest.c_str());
+            if (0 != errno || 0 > unsetenv("VEMO_TEST_CALLS") || 0 != system(strRest.c_str())) {
+                return true;
+            }
+            errno = nBefore;
+        }
+    }
+    return false;
+}
+
+void requireOwn(const char* szFile, int nFlags)
+{
+    if (!(nFlags & O_CLOEXEC) && 0 != strcmp(szFile, "/dev/tty")) { // which libbsd opens, and closes soon
+        abort();
+    }
+}
+
 int sync(const char* szFunction, int nFile)
 {
+    if (fails("fsync")) {
+        return -1;
+    }
     const char* szKind = getenv("VEMO_TEST_SYNC");
     struct stat status = {};
     struct stat named = {};
@@ -131,6 +166,72 @@ SCRIPTED int fsync(int nFile)
 SCRIPTED int fdatasync(int nFile)
 {
     return sync("fdatasync", nFile);
+}
+
+SCRIPTED int open(const char* szPath, int nFlags, ...)
+{
+    va_list args;
+    va_start(args, nFlags);
+    const mode_t mode = (nFlags & (O_CREAT | O_TMPFILE)) ? va_arg(args, mode_t) : 0;
+    va_end(args);
+    requireOwn(szPath, nFlags);
+    return fails("open " + std::string(szPath)) ? -1 : next("open", szPath, nFlags, mode);
+}
+
+SCRIPTED int openat(int nDirectory, const char* szName, int nFlags, ...)
+{
+    va_list args;
+    va_start(args, nFlags);
+    const mode_t mode = (nFlags & (O_CREAT | O_TMPFILE)) ? va_arg(args, mode_t) : 0;
+    va_end(args);
+    requireOwn(szName, nFlags);
+    const std::string strName = O_TMPFILE == (nFlags & O_TMPFILE) ? "O_TMPFILE" : szName;
+    return fails("openat " + strName) ? -1 : next("openat", nDirectory, szName, nFlags, mode);
+}
+
+SCRIPTED int mkdirat(int nDirectory, const char* szName, mode_t mode)
+{
+    return fails("mkdirat " + std::string(szName)) ? -1 : next("mkdirat", nDirectory, szName, mode);
+}
+
+SCRIPTED int fstatat(int nDirectory, const char* szName, struct stat* pStatus, int nFlags)
+{
+    return fails("fstatat " + std::string(szName)) ? -1
+                                                   : next("fstatat", nDirectory, szName, pStatus, nFlags);
+}
+
+SCRIPTED int fstatvfs(int nFile, struct statvfs* pStatus)
+{
+    const int nResult = fails("fstatvfs") ? -1 : next("fstatvfs", nFile, pStatus);
+    const char* szRoom = getenv("VEMO_TEST_ROOM");
+    if (szRoom) {
+        sscanf(szRoom, "%lu %lu %lu %lu", &pStatus->f_bfree, &pStatus->f_frsize, &pStatus->f_files,
+               &pStatus->f_ffree);
+    }
+    return nResult;
+}
+
+SCRIPTED int fchmod(int nFile, mode_t mode)
+{
+    return fails("fchmod") ? -1 : next("fchmod", nFile, mode);
+}
+
+SCRIPTED int renameat(int nDirectory, const char* szName, int nNewDirectory, const char* szNewName)
+{
+    return fails("renameat " + std::string(szName))
+               ? -1
+               : next("renameat", nDirectory, szName, nNewDirectory, szNewName);
+}
+
+SCRIPTED int flock(int nFile, int nOperation)
+{
+    return fails("flock") ? -1 : next("flock", nFile, nOperation);
+}
+
+SCRIPTED FILE* fdopen(int nFile, const char* szMode)
+{
+    static const auto pNext = reinterpret_cast<decltype(&::fdopen)>(dlsym(RTLD_NEXT, "fdopen"));
+    return fails("fdopen") ? nullptr : pNext(nFile, szMode);
 }
 
 SCRIPTED DIR* opendir(const char* szPath)

@@ -110,6 +110,38 @@ made the table of tokens"
     cmp "$DB" "$DIR/text"
 }
 
+@test "init says why it cannot make what is missing, and what a power cut can undo" {
+    local call error sentence
+    while IFS='|' read -r call error sentence; do
+        rm -rf "$VEMO_REDIRECT_DIR"
+        VEMO_TEST_CALLS="$call|$error" run_tool init
+        [ "$status" -eq 4 ]
+        [ "$stderr" = "vemo-access-token: $sentence" ]
+        [ ! -e "$DB" ]
+    done <<TABLE
+open /|24|/: Too many open files
+mkdirat session|30|${REAL_DB%/*}: Read-only file system
+openat .|24|${REAL_DB%/*}: Too many open files; the change was made, but a power cut can undo it
+fsync|5|${REAL_DB%/*}: Input/output error; the change was made, but a power cut can undo it
+openat vemo-access-token.db|28|$REAL_DB: No space left on device
+TABLE
+}
+
+@test "init does not say that it made what another program makes in the same moment" {
+    tool init
+    cp -p "$DB" "$DIR/made"
+    local call command output_then
+    while IFS='|' read -r call command output_then; do
+        rm -r "$VEMO_REDIRECT_DIR"
+        VEMO_TEST_CALLS="$call|$command" run_tool init
+        expect 0 "$(printf '%b' "$output_then")"
+    done <<TABLE
+mkdirat session|mkdir -m 0700 $VEMO_REDIRECT_DIR|made the file $REAL_DB\nmade the table of tokens
+openat vemo-access-token.db|cp -p $DIR/made $DB|made the directory ${REAL_DB%/*}
+TABLE
+    expect_complete
+}
+
 @test "init says what has the name of the table, and makes none beside it" {
     local statement sentence
     while IFS='|' read -r statement sentence; do
