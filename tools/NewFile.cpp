@@ -47,56 +47,36 @@ tool::FilePlace placeOf(const std::string& strPath)
     }
 }
 
-// Whether a name in a directory is that of an open file. errno tells why not: EEXIST when it is another's.
-bool isNamed(const tool::Descriptor& file, const tool::Descriptor& directory, const std::string& strName)
+// Locks an open file, as an export does while it writes one. Returns whether nobody else has it locked and a
+// name in a directory is still its own; errno tells why not: EEXIST when that is another's by now.
+bool lockNamed(const tool::Descriptor& file, const tool::Descriptor& directory, const std::string& strName)
 {
-    const struct stat status = tool::statusOf(file);
-    struct stat named = {};
-    if (0 != fstatat(directory.get(), strName.c_str(), &named, AT_SYMLINK_NOFOLLOW)) {
-        return false;
-    }
-    const bool blSame = named.st_dev == status.st_dev && named.st_ino == status.st_ino;
-    errno = blSame ? errno : EEXIST;
-    return blSame;
+    errno = EEXIST;
+    return 0 == flock(file.get(), LOCK_EX | LOCK_NB) &&
+           tool::isSame(tool::statusOf(file), tool::statusAt(directory, strName));
 }
 
-// Whether a file that one export writes, as its lock tells, is free; errno tells why not.
-bool lockUnfinished(int nFile)
-{
-    if (0 == flock(nFile, LOCK_EX | LOCK_NB)) {
-        return true;
-    }
-    errno = EWOULDBLOCK == errno ? EEXIST : errno;
-    return false;
-}
-
-bool isSame(const struct stat& status, const std::string& strPath)
+// Whether a path leads to a file.
+bool isAt(const struct stat& status, const std::string& strPath)
 {
     struct stat other = {};
-    return 0 == stat(strPath.c_str(), &other) && other.st_dev == status.st_dev &&
-           other.st_ino == status.st_ino;
-}
-
-// Whether a place is that of a path, whatever the way to it is called.
-bool isPlaceOf(const tool::FilePlace& place, const std::string& strPath)
-{
-    const size_t nSlash = strPath.rfind('/');
-    return place.strName == strPath.substr(nSlash + 1) &&
-           isSame(tool::statusOf(place.directory), strPath.substr(0, nSlash));
+    return 0 == stat(strPath.c_str(), &other) && tool::isSame(status, other);
 }
 
 // Whether a name belongs to the database: it, its journals and the lock, whatever the way to them is called.
-bool isOfDatabase(const tool::FilePlace& place, const struct stat* pStatus)
+bool isOfDatabase(const tool::FilePlace& place, const struct stat& status)
 {
+    const struct stat directory = tool::statusOf(place.directory);
     const std::string strDatabase = tool::databaseName();
-    bool blSame = isSame(tool::statusOf(place.directory), tool::databaseDirectory()) &&
-                  0 == place.strName.compare(0, strDatabase.size(), strDatabase);
-    blSame = blSame || isPlaceOf(place, CallLock::FILE_OF_ALL);
-    if (pStatus) {
-        blSame = blSame || isSame(*pStatus, VEMO_ATOKEN_DB_PATH) || isSame(*pStatus, CallLock::FILE_OF_ALL);
-        for (const char* szSuffix : tool::JOURNAL_SUFFIXES) {
-            blSame = blSame || isSame(*pStatus, std::string(VEMO_ATOKEN_DB_PATH) + szSuffix);
-        }
+    const std::string strLock = CallLock::FILE_OF_ALL;
+    const size_t nLockName = strLock.rfind('/') + 1;
+    bool blSame =
+        (isAt(directory, tool::databaseDirectory()) &&
+         0 == place.strName.compare(0, strDatabase.size(), strDatabase)) ||
+        (isAt(directory, strLock.substr(0, nLockName)) && place.strName == strLock.substr(nLockName)) ||
+        isAt(status, VEMO_ATOKEN_DB_PATH) || isAt(status, strLock);
+    for (const char* szSuffix : tool::JOURNAL_SUFFIXES) {
+        blSame = blSame || isAt(status, std::string(VEMO_ATOKEN_DB_PATH) + szSuffix);
     }
     return blSame;
 }
@@ -112,12 +92,9 @@ Descriptor lockRemains(const Descriptor& directory, const std::string& strName)
         return remains;
     }
     const struct stat status = statusOf(remains);
-    const bool blOurs = geteuid() == status.st_uid && FILE_MODE == (status.st_mode & 07777);
-    // While somebody waited for the lock, the name can have gone to another file.
     errno = EEXIST;
-    return blOurs && lockUnfinished(remains.get()) && isNamed(remains, directory, strName)
-               ? std::move(remains)
-               : Descriptor();
+    const bool blOurs = geteuid() == status.st_uid && FILE_MODE == (status.st_mode & 07777);
+    return blOurs && lockNamed(remains, directory, strName) ? std::move(remains) : Descriptor();
 }
 
 bool removeRemains(const Descriptor& directory, const std::string& strName)
@@ -132,11 +109,12 @@ NewFile::NewFile(const std::string& strPath)
     requirePlace();
     const UmaskOff umaskOff;
     Descriptor file(openat(m_place.directory.get(), ".", O_WRONLY | O_TMPFILE | O_CLOEXEC, FILE_MODE));
-    if (!file.isOpen() && (EOPNOTSUPP == errno || EISDIR == errno)) {
-        file = makeNamed();
+    if (!file.isOpen()) {
+        file = makeNamed(); // which fails, too, unless it is that the file system knows no such files
     }
-    m_pStream = file.isOpen() ? fdopen(file.get(), "w") : nullptr;
+    m_pStream.reset(file.isOpen() ? fdopen(file.get(), "w") : nullptr);
     if (!m_pStream) {
+        removeUnfinished(); // no destructor runs
         fail();
     }
     file.release();
@@ -144,20 +122,18 @@ NewFile::NewFile(const std::string& strPath)
 
 NewFile::~NewFile()
 {
-    removeUnfinished();
-    fclose(m_pStream);
+    removeUnfinished(); // before others can take it for remains
 }
 
 // Fails where no file may be put.
 void NewFile::requirePlace() const
 {
-    struct stat status = {};
-    const bool blThere =
-        0 == fstatat(m_place.directory.get(), m_place.strName.c_str(), &status, AT_SYMLINK_NOFOLLOW);
+    const struct stat status = statusAt(m_place.directory, m_place.strName);
+    const bool blThere = 0 != status.st_mode;
     if (!blThere && ENOENT != errno) {
         fail();
     }
-    if (isOfDatabase(m_place, blThere ? &status : nullptr)) {
+    if (isOfDatabase(m_place, status)) {
         throw Failure(EXIT_STATUS_USAGE,
                       shownPath(m_strPath) + " belongs to the database; choose another name");
     }
@@ -171,32 +147,28 @@ void NewFile::requirePlace() const
 // The lock on it tells that it is being written. Until it has that, another export can take it for remains.
 Descriptor NewFile::makeNamed()
 {
-    if (!removeRemains(m_place.directory, m_strUnfinished)) {
-        return Descriptor();
-    }
+    removeRemains(m_place.directory, m_strUnfinished);
     handleEndingSignals(removeAndEnd);
     const SignalPause pause;
     Descriptor file(openat(m_place.directory.get(), m_strUnfinished.c_str(),
                            O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, FILE_MODE));
-    if (file.isOpen()) {
-        if (!lockUnfinished(file.get()) || !isNamed(file, m_place.directory, m_strUnfinished)) {
-            return Descriptor();
-        }
-        g_nDirectory = m_place.directory.get();
-        g_szUnfinished = m_strUnfinished.c_str();
+    if (!file.isOpen() || !lockNamed(file, m_place.directory, m_strUnfinished)) {
+        return Descriptor();
     }
+    g_nDirectory = m_place.directory.get();
+    g_szUnfinished = m_strUnfinished.c_str();
     return file;
 }
 
 void NewFile::write(const std::string& strText)
 {
-    fwrite(strText.data(), 1, strText.size(), m_pStream);
+    fwrite(strText.data(), 1, strText.size(), m_pStream.get());
 }
 
 void NewFile::complete()
 {
-    fflush(m_pStream);
-    if (ferror(m_pStream) || 0 != fsync(fileno(m_pStream)) || !giveName()) {
+    fflush(m_pStream.get());
+    if (ferror(m_pStream.get()) || 0 != fsync(fileno(m_pStream.get())) || !giveName()) {
         fail();
     }
     if (!syncNames(m_place.directory)) {
@@ -214,8 +186,9 @@ bool NewFile::giveName()
         if (link(m_place.strName)) {
             return true;
         }
-        if (EEXIST != errno || !lockUnfinished(fileno(m_pStream)) ||
-            !removeRemains(m_place.directory, m_strUnfinished) || !link(m_strUnfinished)) {
+        flock(fileno(m_pStream.get()), LOCK_EX); // it is no remains
+        removeRemains(m_place.directory, m_strUnfinished);
+        if (!link(m_strUnfinished)) { // nor did the name above fail because it is taken
             return false;
         }
         g_nDirectory = nDirectory;
@@ -231,14 +204,14 @@ bool NewFile::giveName()
 // Gives a name to a file that has none.
 bool NewFile::link(const std::string& strName)
 {
-    const std::string strFile = "/proc/self/fd/" + std::to_string(fileno(m_pStream));
+    const std::string strFile = "/proc/self/fd/" + std::to_string(fileno(m_pStream.get()));
     return 0 ==
            linkat(AT_FDCWD, strFile.c_str(), m_place.directory.get(), strName.c_str(), AT_SYMLINK_FOLLOW);
 }
 
 void NewFile::fail() const
 {
-    if (EEXIST == errno) {
+    if (EEXIST == errno || EWOULDBLOCK == errno) {
         throw Failure(EXIT_STATUS_STORE, shownPath(m_strPath + UNFINISHED_SUFFIX) +
                                              " is in the way: another export is writing it, "
                                              "or it is none's");

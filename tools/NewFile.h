@@ -4,6 +4,7 @@
 #define TOOLS_NEW_FILE_H
 
 #include <cstdio>
+#include <memory>
 #include <string>
 
 #include "Descriptor.h"
@@ -46,7 +47,7 @@ private:
     const std::string m_strPath;
     const FilePlace m_place;
     const std::string m_strUnfinished; // its name until it is complete
-    FILE* m_pStream = nullptr;
+    std::unique_ptr<FILE, int (*)(FILE*)> m_pStream{nullptr, fclose};
 };
 
 } // namespace tool

@@ -5,6 +5,9 @@ load common
 
 LINE='{"bind_sid":"","count":1,"create_time":0,"deadline":9999999999,"extra":{},"function":"VPN","tid":"TID","uid":0,"webapi_allow":{}}'
 
+# For VEMO_TEST_CALLS: the file system does not know files without a name.
+NAMELESS='openat O_TMPFILE|95'
+
 # a_tid LETTERS: an id of 127 characters that begins with them
 a_tid()
 {
@@ -192,15 +195,17 @@ awkward_rows()
 ${DB##*/}-backup
 ${DB##*/}-wal" ]
     # Elsewhere the names are anybody's.
-    for file in "$DIR/${DB##*/}" "$DIR/vemo-access-token.lock"; do
+    for file in "$DIR/${DB##*/}" "$DIR/vemo-access-token.lock" "$VEMO_REDIRECT_DIR/backup"; do
         run_tool export "$file"
         expect 0 "" "vemo-access-token: 1 token exported"
     done
 }
 
 @test "an export does not take the place of the lock while there is none, either" {
-    in_namespace 'mount -t tmpfs tmpfs /run && "$1" init >/dev/null && rm /run/* && "$1" export /run/vemo-access-token.lock' "$TOOL"
-    expect 2 "" "vemo-access-token: /run/vemo-access-token.lock belongs to the database; choose another name"
+    in_namespace 'mount -t tmpfs tmpfs /run && "$1" init >/dev/null && rm /run/* &&
+        "$1" export /run/another.lock && "$1" export /run/vemo-access-token.lock' "$TOOL"
+    expect 2 "" "vemo-access-token: 0 tokens exported
+vemo-access-token: /run/vemo-access-token.lock belongs to the database; choose another name"
 }
 
 @test "what others linked into a directory of theirs is not imported" {
@@ -223,7 +228,17 @@ ${DB##*/}-wal" ]
     LD_PRELOAD=$DIR/unlinks.so run_tool import "$DIR/theirs/file"
     expect 2 "" "vemo-access-token: $DIR/theirs/file has other names besides, and others can change its directory; copy it to a place of yours"
     [ ! -e "$DIR/theirs/file" ]
-    run_tool import "$DIR/secret"
+    # Nor what they put in its place while it is being opened; but a file that is theirs alone.
+    cp "$DIR/secret" "$DIR/theirs/file"
+    VEMO_TEST_CALLS="openat file|rm $DIR/theirs/file && mkfifo $DIR/theirs/file" run_tool import "$DIR/theirs/file"
+    expect 2 "" "vemo-access-token: $DIR/theirs/file is no regular file"
+    rm "$DIR/theirs/file"
+    cp "$DIR/secret" "$DIR/theirs/file"
+    VEMO_TEST_CALLS="openat file|ln -sf $DIR/secret $DIR/theirs/file" run_tool import "$DIR/theirs/file"
+    expect 2 "" "vemo-access-token: $DIR/theirs/file is a symbolic link; name the place that it leads to"
+    rm "$DIR/theirs/file"
+    cp "$DIR/secret" "$DIR/theirs/file"
+    run_tool import "$DIR/theirs/file"
     expect 0 "1 token imported"
 }
 
@@ -249,6 +264,48 @@ ${DB##*/}-wal" ]
     [ "$status" -eq 0 ]
     [ -s "$DIR/file" ]
     [ ! -e "$DIR/file.part" ]
+}
+
+@test "what an export writes has no name, and where it needs one, nobody takes it for remains" {
+    a_row A
+    mkdir "$DIR/out"
+    VEMO_TEST_CALLS="fdopen|ls $DIR/out >$DIR/names" run_tool export "$DIR/out/file"
+    expect 0 "" "vemo-access-token: 1 token exported"
+    [ ! -s "$DIR/names" ]
+    VEMO_TEST_CALLS="renameat file.part|! flock -ns $DIR/out/file.part true" run_tool export "$DIR/out/file"
+    expect 0 "" "vemo-access-token: 1 token exported"
+    VEMO_TEST_CALLS="$NAMELESS
+fdopen|ls $DIR/out >$DIR/names; ! flock -ns $DIR/out/file.part true" run_tool export "$DIR/out/file"
+    expect 0 "" "vemo-access-token: 1 token exported"
+    [ "$(cat "$DIR/names")" = "file
+file.part" ]
+    [ "$(ls "$DIR/out")" = file ]
+    [ "$(stat -c %a "$DIR/out/file")" = 600 ]
+}
+
+@test "an export with a name of its own leaves nothing when it fails, and never what is another's" {
+    a_row A
+    local another="is in the way: another export is writing it, or it is none's" there calls sentence left
+    while IFS=% read -r there calls sentence left; do
+        rm -rf "$DIR/out"
+        mkdir "$DIR/out"
+        cd "$DIR/out"
+        install -m 0600 /dev/stdin ../another <<<another
+        [ ! "$there" ] || cp -p ../another file.part
+        VEMO_TEST_CALLS="$NAMELESS
+$calls" run_tool export file
+        expect 4 "" "vemo-access-token: $sentence"
+        [ "$(cat file* 2>/dev/null)" = "$left" ]
+    done <<TABLE
+%fdopen|12%file: Cannot allocate memory%
+%fstatat file|5%file: Input/output error%
+%openat file.part|28%file: No space left on device%
+%openat file.part|cp -p ../another file.part%file.part $another%another
+%flock|mv ../another file.part%file.part $another%another
+%flock|rm file.part%file: No such file or directory%
+there%flock|mv ../another file.part%file.part $another%another
+there%flock|11%file.part $another%another
+TABLE
 }
 
 @test "a file that is not on the disk, or its name, is no success" {
