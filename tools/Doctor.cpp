@@ -14,8 +14,6 @@ namespace {
 
 using tool::Finding;
 
-const int ROUNDS_MAX = 5; // what one repair lets doctor look at can need the next
-
 struct Options {
     bool blRepair = false;
     tool::Layout layout;
@@ -122,9 +120,8 @@ int doctor(const Options& options)
 {
     tool::Findings repaired;
     tool::Findings left = tool::examine();
-    if (options.blRepair) {
-        for (int i = 0; i < ROUNDS_MAX && repairOnce(repaired, left); ++i) {
-        }
+    while (options.blRepair && repairOnce(repaired, left)) {
+        // What a repair lets doctor look at can need the next.
     }
     report(repaired, left, options.layout);
     return left.empty() ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_FINDINGS;

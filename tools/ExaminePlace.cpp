@@ -27,6 +27,7 @@ const mode_t PRIVATE_MODE = 0700;
 const mode_t OTHERS_MODE = 0077;
 const size_t WRITE_VERSION = 18; // where the database says what its writers must know: 2 at most
 const size_t READ_VERSION = 19;  // the same of its readers: 2 is the write-ahead journal
+const size_t HEADER_BYTES = READ_VERSION + 1;
 
 std::string octal(mode_t mode)
 {
@@ -40,21 +41,26 @@ bool isPrivate(const struct stat& status)
     return 0 == status.st_uid && !(status.st_mode & OTHERS_MODE);
 }
 
+[[noreturn]] void fail(const std::string& strReason)
+{
+    throw tool::Failure(tool::EXIT_STATUS_STORE, strReason);
+}
+
 // The private directory, if it is reached through directories alone in which only root can replace anything.
 Descriptor openTrustedDirectory()
 {
     tool::Walk walk(tool::databaseDirectory());
     while (!walk.isDone()) {
         if (!walk.step()) {
-            throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(walk.path(), walk.path()).what());
+            fail(tool::badPath(walk.path(), walk.path()).what());
         }
         if (!walk.isDone() && tool::canOthersWrite(tool::statusOf(walk.directory()))) {
-            throw tool::Failure(tool::EXIT_STATUS_STORE, "others than root can change " + walk.path());
+            fail("others than root can change " + walk.path());
         }
     }
     Descriptor directory(openat(walk.directory().get(), ".", O_RDONLY | O_CLOEXEC));
     if (!directory.isOpen()) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, walk.path() + ": " + strerror(errno));
+        fail(walk.path() + ": " + strerror(errno));
     }
     return directory;
 }
@@ -64,23 +70,23 @@ Descriptor openTrustedFile(const std::string& strSuffix)
 {
     const Descriptor directory = openTrustedDirectory();
     if (!isPrivate(tool::statusOf(directory))) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, tool::databaseDirectory() + " is not root's alone");
+        fail(tool::databaseDirectory() + " is not root's alone");
     }
     Descriptor file = tool::openRegular(directory, tool::databaseName() + strSuffix);
     const std::string strPath = VEMO_ATOKEN_DB_PATH + strSuffix;
     if (!file.isOpen()) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, tool::badPath(strPath, strPath).what());
+        fail(tool::badPath(strPath, strPath).what());
     }
     if (1 != tool::statusOf(file).st_nlink) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + " has several hard links");
+        fail(strPath + " has several hard links");
     }
     return file;
 }
 
-void requireCall(int nResult, const std::string& strPath)
+void requireCall(bool blDone, const std::string& strPath)
 {
-    if (0 != nResult) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, tool::shownPath(strPath) + ": " + strerror(errno));
+    if (!blDone) {
+        fail(tool::shownPath(strPath) + ": " + strerror(errno));
     }
 }
 
@@ -89,8 +95,8 @@ template <typename Open>
 void makePrivate(const std::string& strPath, const Open& open)
 {
     const Descriptor file = open();
-    requireCall(fchown(file.get(), 0, static_cast<gid_t>(-1)), strPath);
-    requireCall(fchmod(file.get(), PRIVATE_MODE), strPath);
+    requireCall(0 == fchown(file.get(), 0, static_cast<gid_t>(-1)), strPath);
+    requireCall(0 == fchmod(file.get(), PRIVATE_MODE), strPath);
     Store::settleChange();
 }
 
@@ -148,19 +154,22 @@ bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings
                             "the tokens stand elsewhere, or nowhere",
                             "find out who made it; move the database to a directory of that name", none});
         return false;
-    default: throw tool::Failure(tool::EXIT_STATUS_STORE, strPath + ": " + strerror(errno));
+    default: fail(strPath + ": " + strerror(errno));
     }
 }
 
-// Returns whether there may be files. blTrusted tells whether only root can put anything in their place.
-bool examineDirectory(bool& blTrusted, Findings& findings)
+struct Directory {
+    bool blFiles;   // there may be some in it
+    bool blTrusted; // only root can put anything in their place
+};
+
+Directory examineDirectory(Findings& findings)
 {
     tool::Walk walk(tool::databaseDirectory());
-    blTrusted = true; // so far
+    bool blTrusted = true; // so far
     while (!walk.isDone()) {
         if (!walk.step()) {
-            blTrusted = false;
-            return examineObstacle(walk.path(), walk.isDone(), findings);
+            return {examineObstacle(walk.path(), walk.isDone(), findings), false};
         }
         const struct stat status = tool::statusOf(walk.directory());
         if (walk.isDone()) {
@@ -179,7 +188,7 @@ bool examineDirectory(bool& blTrusted, Findings& findings)
         }
     }
     tool::examineWritability(walk.path(), findings);
-    return true;
+    return {true, blTrusted};
 }
 
 // Whether a journal names another one, of a change to several databases at once, in its end. Whoever opens
@@ -268,9 +277,8 @@ bool examineFile(bool blMake, Findings& findings)
     return true;
 }
 
-void examineVersion(Findings& findings)
+void examineVersion(const std::string& strHeader, Findings& findings)
 {
-    const std::string strHeader = tool::firstBytes("", WRITE_VERSION + 1);
     if (0 != strHeader.compare(0, 6, "SQLite") || 2 >= static_cast<unsigned char>(strHeader[WRITE_VERSION])) {
         return;
     }
@@ -284,10 +292,9 @@ void examineVersion(Findings& findings)
 
 // Returns whether the database can be opened without harm. Whoever opens it takes the changes in a
 // write-ahead journal for its own.
-bool examineForeignJournal(Findings& findings)
+bool examineForeignJournal(const std::string& strHeader, Findings& findings)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH "-wal";
-    const std::string strHeader = tool::firstBytes("", READ_VERSION + 1);
     if (strHeader[READ_VERSION] != 1 || !tool::statusOf(strPath)) {
         return true;
     }
@@ -299,16 +306,6 @@ bool examineForeignJournal(Findings& findings)
     return false;
 }
 
-// Whether a file is what an export has left behind, and none is writing it.
-bool isLeftBehind(const std::string& strName)
-{
-    const std::string strEnd = tool::UNFINISHED_SUFFIX;
-    const Descriptor directory(open(tool::databaseDirectory().c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
-    return strName.size() > strEnd.size() &&
-           0 == strName.compare(strName.size() - strEnd.size(), strEnd.size(), strEnd) &&
-           tool::lockRemains(directory, strName).isOpen();
-}
-
 // What an export leaves behind that was cut off by a power cut.
 void examineRemains(Findings& findings)
 {
@@ -316,18 +313,19 @@ void examineRemains(Findings& findings)
     std::error_code error;
     for (Entry entry(tool::databaseDirectory(), error); entry != Entry(); entry.increment(error)) {
         const std::string strName = entry->path().filename();
-        if (isLeftBehind(strName)) {
+        if (entry->path().extension() == tool::UNFINISHED_SUFFIX &&
+            tool::lockRemains(tool::openDirectory(), strName).isOpen()) {
             findings.push_back(
                 {Finding::Severity::Warning,
                  tool::databaseDirectory() + "/" + tool::shownPath(strName) + " was left behind",
                  "an export was cut off; the file can hold whole ids", "remove it", [strName] {
-                     requireCall(tool::removeRemains(openTrustedDirectory(), strName) ? 0 : -1, strName);
+                     requireCall(tool::removeRemains(openTrustedDirectory(), strName), strName);
                      Store::settleChange();
                  }});
         }
     }
     if (error && error != std::errc::no_such_file_or_directory) { // behind a link that leads nowhere
-        throw tool::Failure(tool::EXIT_STATUS_STORE, tool::databaseDirectory() + ": " + error.message());
+        fail(tool::databaseDirectory() + ": " + error.message());
     }
 }
 
@@ -353,8 +351,8 @@ namespace tool {
 bool examinePlace(Findings& findings)
 {
     examineLock(findings);
-    bool blTrusted = false;
-    if (!examineDirectory(blTrusted, findings)) {
+    const auto [blFiles, blTrusted] = examineDirectory(findings);
+    if (!blFiles) {
         return false;
     }
     examineRemains(findings);
@@ -365,8 +363,9 @@ bool examinePlace(Findings& findings)
     if (!blOpens || !blFile) {
         return false;
     }
-    examineVersion(findings);
-    return examineForeignJournal(findings);
+    const std::string strHeader = tool::firstBytes("", HEADER_BYTES);
+    examineVersion(strHeader, findings);
+    return examineForeignJournal(strHeader, findings);
 }
 
 } // namespace tool

@@ -22,6 +22,16 @@ const uint64_t ROOM_MIN = 65536; // bytes: the journal of a small change, and th
 
 const char* const UNCHANGEABLE = "no token can be created, changed or granted";
 
+// What chattr(1) sets to forbid changes.
+const struct {
+    uint64_t nBit; // of statx
+    const char* szName;
+    const char* szRemedy;
+} FORBIDDING[] = {
+    {STATX_ATTR_IMMUTABLE, "immutable", "chattr -i "},
+    {STATX_ATTR_APPEND, "append-only", "chattr -a "},
+};
+
 // What look() fills in about a name's file, whatever that is: nothing is read of it, so nothing waits for
 // another end.
 template <typename Status, typename Look>
@@ -35,7 +45,6 @@ Status lookAt(const std::string& strPath, Look look)
     return status;
 }
 
-// What chattr(1) has set.
 uint64_t attributesOf(const std::string& strPath)
 {
     const auto look = [](int nFile, struct statx* pStatus) {
@@ -44,15 +53,9 @@ uint64_t attributesOf(const std::string& strPath)
     return lookAt<struct statx>(strPath, look).stx_attributes;
 }
 
-bool isReadOnlyFileSystem()
-{
-    return 0 != access(tool::databaseDirectory().c_str(), W_OK) && EROFS == errno;
-}
-
-void examineRoom(Findings& findings)
+void examineRoom(const struct statvfs& status, Findings& findings)
 {
     const std::string strPath = tool::databaseDirectory();
-    const auto status = lookAt<struct statvfs>(strPath, fstatvfs);
     // Programs run as root, whom the file system gives its reserve too. Some have no number of files to run
     // out of.
     const bool blRoom = uint64_t{status.f_bfree} * status.f_frsize >= ROOM_MIN;
@@ -75,16 +78,14 @@ namespace tool {
 void examineWritability(const std::string& strPath, Findings& findings)
 {
     const uint64_t nAttributes = attributesOf(strPath);
-    if (nAttributes & STATX_ATTR_IMMUTABLE) {
-        findings.push_back(
-            {Finding::Severity::Error, strPath + " is immutable", UNCHANGEABLE, "chattr -i " + strPath, {}});
-    }
-    if (nAttributes & STATX_ATTR_APPEND) {
-        findings.push_back({Finding::Severity::Error,
-                            strPath + " is append-only",
-                            UNCHANGEABLE,
-                            "chattr -a " + strPath,
-                            {}});
+    for (const auto& attribute : FORBIDDING) {
+        if (nAttributes & attribute.nBit) {
+            findings.push_back({Finding::Severity::Error,
+                                strPath + " is " + attribute.szName,
+                                UNCHANGEABLE,
+                                attribute.szRemedy + strPath,
+                                {}});
+        }
     }
     if (0 == (nAttributes & STATX_ATTR_IMMUTABLE) && 0 != access(strPath.c_str(), W_OK)) {
         findings.push_back({Finding::Severity::Error,
@@ -98,14 +99,15 @@ void examineWritability(const std::string& strPath, Findings& findings)
 
 void examineFileSystem(Findings& findings)
 {
-    if (isReadOnlyFileSystem()) {
+    const auto fileSystem = lookAt<struct statvfs>(databaseDirectory(), fstatvfs);
+    if (fileSystem.f_flag & ST_RDONLY) {
         return; // a finding about the directory
     }
     const auto status = statusOf(VEMO_ATOKEN_DB_PATH);
     if (status && S_ISREG(status->st_mode)) {
         examineWritability(VEMO_ATOKEN_DB_PATH, findings);
     }
-    examineRoom(findings);
+    examineRoom(fileSystem, findings);
 }
 
 } // namespace tool

@@ -169,6 +169,14 @@ no findings"
     ln -s elsewhere "$VEMO_REDIRECT_DIR"
     expect_no_repair error "$DIRECTORY is a symbolic link" "the tokens stand elsewhere, or nowhere" \
         "find out who made it; move the database to a directory of that name"
+    rm -r "$DIR/elsewhere"
+    run_tool doctor
+    expect 5 "error: $DIRECTORY is a symbolic link
+    meaning: the tokens stand elsewhere, or nowhere
+    remedy: find out who made it; move the database to a directory of that name
+error: there is no database $REAL_DB
+    meaning: there are no tokens; the first call that needs it makes it
+    remedy: vemo-access-token init"
 }
 
 @test "another thing in place of the directory is left to the administrator" {
@@ -185,9 +193,8 @@ no findings"
     expect_no_repair error "$REAL_DB is a symbolic link" "programs work on another file than this one, or on none" \
         "find out who made it; move the database to this name"
     rm "$DIR/elsewhere"
-    run_tool doctor
-    [ "$status" -eq 5 ]
-    [ "${lines[0]}" = "error: $REAL_DB is a symbolic link" ]
+    expect_finding error "$REAL_DB is a symbolic link" "programs work on another file than this one, or on none" \
+        "find out who made it; move the database to this name"
     [ ! -e "$DIR/elsewhere" ]
 }
 
@@ -346,16 +353,6 @@ error: there is no database $REAL_DB
 }
 
 @test "what others change in the middle of a repair is not followed" {
-    a_row aaaaaaaa
-    echo '#include <stdlib.h>
-        #include <sys/syscall.h>
-        #include <unistd.h>
-        int fchmod(int file, int mode)
-        {
-            const char* between = getenv("VEMO_TEST_BETWEEN");
-            unsetenv("VEMO_TEST_BETWEEN");
-            return between && system(between) ? -1 : syscall(SYS_fchmod, file, mode);
-        }' | cc -shared -fPIC -w -x c -o "$DIR/between.so" - || skip "no C compiler"
     local between reason
     while IFS='|' read -r between reason; do
         rm -rf "$DIR/"s*
@@ -363,7 +360,7 @@ error: there is no database $REAL_DB
         tool init >/dev/null
         chmod 0640 "$DB"
         install -m 0640 /dev/null "$DB-journal" # which is repaired first
-        VEMO_TEST_BETWEEN="cd $DIR && $between" LD_PRELOAD=$DIR/between.so run_tool doctor --repair
+        VEMO_TEST_CALLS="fchmod|cd $DIR && $between" run_tool doctor --repair
         [ "$status" -eq 5 ]
         [ "$stderr" = "vemo-access-token: cannot repair: $reason" ]
         [ "$(stat -L -c %a "$DB")" = 640 ]
@@ -373,9 +370,45 @@ mv $DB second && ln -s $DIR/second $DB|$REAL_DB is a symbolic link; name the pla
 chmod 0750 session|$DIRECTORY is not root's alone
 mv session second && ln -s second session|$DIRECTORY is a symbolic link; name the place that it leads to
 TABLE
+    # Remains of an export that another one takes, or that are gone.
+    while IFS='|' read -r between reason; do
+        rm -rf "$DIR/"s*
+        mkdir -m 0750 "$VEMO_REDIRECT_DIR"
+        tool init >/dev/null
+        install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
+        VEMO_TEST_CALLS="fchmod|$between $VEMO_REDIRECT_DIR/backup.part" run_tool doctor --repair
+        [ "$stderr" = "$reason" ]
+    done <<TABLE
+chmod 0640|vemo-access-token: cannot repair: backup.part: File exists
+rm|
+TABLE
+}
+
+@test "who can change a directory above in the middle of a repair gets nothing from root" {
+    in_namespace '"$1" init >/dev/null && chmod 0640 "$2" && install -m 0640 /dev/null "$2-journal" &&
+        VEMO_TEST_CALLS="fchmod|chmod 0777 /usr/vemo/etc" "$1" doctor --repair || stat -c %a "$2"' "$TOOL" "$REAL_DB"
+    [ "${lines[-1]}" = 640 ]
+    [ "$stderr" = "vemo-access-token: cannot repair: others than root can change /usr/vemo/etc" ]
 }
 
 @test "a place that cannot be looked at is a finding" {
+    tool init
+    local call error
+    while IFS='|' read -r call error; do
+        VEMO_TEST_CALLS="$call|$error" run_tool doctor
+        expect 5 "error: $DIRECTORY: Too many open files
+    meaning: programs fail in the same way
+    remedy: mend the cause; or $REPLACE"
+    done <<TABLE
+openat session|24
+open $DIRECTORY|24
+fstatvfs|24
+TABLE
+    chmod 0750 "$VEMO_REDIRECT_DIR"
+    VEMO_TEST_CALLS="openat .|24" run_tool doctor --repair
+    [ "$status" -eq 5 ]
+    [ "$stderr" = "vemo-access-token: cannot repair: $DIRECTORY: Too many open files" ]
+    rm -r "$VEMO_REDIRECT_DIR"
     ln -s session "$VEMO_REDIRECT_DIR"
     run_tool doctor
     expect 5 "error: $DIRECTORY is a symbolic link
@@ -397,12 +430,13 @@ error: $DIRECTORY: Too many levels of symbolic links
 }
 
 @test "an index that does not fit its table is damage" {
-    a_row aaaaaaaa
+    deadline=1 a_row aaaaaaaa # which is not looked at
+    a_row bbbbbbbb
     # Newer versions of the shell protect the schema.
     sqlite3 -cmd '.dbconfig defensive off' "$DB" "
         CREATE INDEX i ON token (deadline); PRAGMA writable_schema = ON;
         UPDATE sqlite_schema SET sql = 'CREATE INDEX i ON token (uid)' WHERE name = 'i'" >"$DIR/defensive"
-    expect_no_repair error "the database is damaged: row 1 missing from index i" "tokens may be lost or wrong" \
+    expect_no_repair error "the database is damaged: row 1 missing from index i; row 2 missing from index i" "tokens may be lost or wrong" \
         "$SAVE_AND_REPLACE; where export fails, import a backup or what sqlite3 can still read: see vemo-access-token(8)"
     run_tool export
     [ "$status" -eq 0 ]
@@ -865,6 +899,13 @@ SQL
     [ -s "$DB-journal" ]
     run_tool doctor
     expect 0 "no findings"
+    # Of a program that takes its time.
+    sqlite3 "$DB" >/dev/null <<SQL
+BEGIN;
+UPDATE token SET count = 3;
+.shell touch -d "1 hour ago" "$DB-journal"; "$TOOL" doctor >"$DIR/doctor"
+SQL
+    [ "$(cat "$DIR/doctor")" = "no findings" ]
 }
 
 @test "a write-ahead journal that belongs to the database is no finding" {
@@ -888,6 +929,7 @@ SQL
 @test "a write-ahead journal beside a database that has none is left to the administrator" {
     a_row aaaaaaaa
     install -m 0700 /dev/stdin "$DB-wal" <<<journal
+    printf '\002' | dd of="$DB" bs=1 seek=18 conv=notrunc status=none # which says how it is written to, not read
     expect_no_repair warning "$REAL_DB-wal does not belong to the database" \
         "the database was copied or replaced without it, and may lack changes" \
         "if the database is complete, remove it while no program runs"
@@ -1041,4 +1083,21 @@ $undone" ]
     install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
     expect_repair "$DIRECTORY/backup.part was left behind" "an export was cut off; the file can hold whole ids"
     [ ! -e "$VEMO_REDIRECT_DIR/backup.part" ]
+    # However many there are.
+    (umask 077 && touch "$VEMO_REDIRECT_DIR/"{1..40}.part)
+    run --separate-stderr bash -c 'ulimit -n 32 && "$0" doctor' "$TOOL"
+    [ "${#lines[@]}" -eq 120 ]
+}
+
+@test "what is left of a file system is enough for a change and for another file, or is not" {
+    tool init
+    local room
+    for room in "16 4096 0 0" "65536 1 2 1"; do
+        VEMO_TEST_ROOM=$room run_tool doctor
+        expect 0 "no findings"
+    done
+    VEMO_TEST_ROOM="65535 1 2 1" run_tool doctor
+    [ "${lines[0]}" = "error: the file system of $DIRECTORY has no room for a change" ]
+    VEMO_TEST_ROOM="16 4096 1 0" run_tool doctor
+    [ "${lines[0]}" = "error: the file system of $DIRECTORY has no room for another file" ]
 }
