@@ -59,9 +59,9 @@ bool examineIntegrity(Store& store, Findings& findings)
 // Returns whether it is whole.
 bool examineDatabase(Findings& findings)
 {
-    const bool blJournal = isJournalFull() && isJournalOld();
+    const bool blLeftBehind = isJournalFull() && isJournalOld();
     Store store(Store::Access::Read);
-    if (blJournal && !isJournalFull()) {
+    if (blLeftBehind) {
         findings.push_back({Finding::Severity::Warning, VEMO_ATOKEN_DB_PATH "-journal was left behind",
                             "a program or the machine stopped in the middle of a change",
                             "none needed: reading the database has just undone the half change", [] {}});

@@ -194,6 +194,11 @@ SCRIPTED int mkdirat(int nDirectory, const char* szName, mode_t mode)
     return fails("mkdirat " + std::string(szName)) ? -1 : next("mkdirat", nDirectory, szName, mode);
 }
 
+SCRIPTED int fstat(int nFile, struct stat* pStatus)
+{
+    return fails("fstat") ? -1 : next("fstat", nFile, pStatus);
+}
+
 SCRIPTED int fstatat(int nDirectory, const char* szName, struct stat* pStatus, int nFlags)
 {
     return fails("fstatat " + std::string(szName)) ? -1
@@ -209,6 +214,11 @@ SCRIPTED int fstatvfs(int nFile, struct statvfs* pStatus)
                &pStatus->f_ffree);
     }
     return nResult;
+}
+
+SCRIPTED int fchown(int nFile, uid_t uid, gid_t gid)
+{
+    return fails("fchown") ? -1 : next("fchown", nFile, uid, gid);
 }
 
 SCRIPTED int fchmod(int nFile, mode_t mode)
