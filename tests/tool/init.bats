@@ -111,16 +111,17 @@ made the table of tokens"
 }
 
 @test "init says why it cannot make what is missing, and what a power cut can undo" {
-    local call error sentence
-    while IFS='|' read -r call error sentence; do
+    local call act sentence
+    while IFS='|' read -r call act sentence; do
         rm -rf "$VEMO_REDIRECT_DIR"
-        VEMO_TEST_CALLS="$call|$error" run_tool init
+        VEMO_TEST_CALLS="$call|$act" run_tool init
         [ "$status" -eq 4 ]
         [ "$stderr" = "vemo-access-token: $sentence" ]
         [ ! -e "$DB" ]
     done <<TABLE
 open /|24|/: Too many open files
 mkdirat session|30|${REAL_DB%/*}: Read-only file system
+mkdirat session|touch $VEMO_REDIRECT_DIR|${REAL_DB%/*}: Not a directory
 openat .|24|${REAL_DB%/*}: Too many open files; the change was made, but a power cut can undo it
 fsync|5|${REAL_DB%/*}: Input/output error; the change was made, but a power cut can undo it
 openat vemo-access-token.db|28|$REAL_DB: No space left on device
