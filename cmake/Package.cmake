@@ -1,6 +1,19 @@
-# What CMake and pkg-config need to find the installed library.
+# The library as it is installed, and what CMake and pkg-config need to find it.
 
 include(CMakePackageConfigHelpers)
+
+set(header_dir ${CMAKE_INSTALL_INCLUDEDIR}/vemo-access-token)
+install(TARGETS vemoaccesstoken EXPORT VemoAccessTokenTargets
+        LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}
+        INCLUDES DESTINATION ${header_dir})
+install(FILES
+          ${PROJECT_SOURCE_DIR}/include/AccessTokenApi.h
+          ${PROJECT_SOURCE_DIR}/include/AccessTokenDefine.h
+          ${PROJECT_SOURCE_DIR}/include/AccessTokenUtil.h
+          ${PROJECT_SOURCE_DIR}/include/vemo-access-token.h
+        DESTINATION ${header_dir})
+# The one internal header whose class is exported.
+install(FILES ${PROJECT_SOURCE_DIR}/include/internal/AccessTokenDbApi.h DESTINATION ${header_dir}/internal)
 
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/VemoAccessToken)
 configure_package_config_file(${CMAKE_CURRENT_LIST_DIR}/VemoAccessTokenConfig.cmake.in VemoAccessTokenConfig.cmake

@@ -1,6 +1,7 @@
 #!/bin/bash
 # Installs the build below a prefix of its own, and builds and runs a program outside of the tree against
 # that, found once by pkg-config and once by CMake; and installs it into a staging directory.
+# A project that takes this one in installs nothing of it.
 # usage: consumer.sh BUILD-DIRECTORY SOURCE-DIRECTORY COMPILER
 set -euo pipefail
 build=$1
@@ -56,3 +57,16 @@ if grep -rl "$dir" "$dir/stage" --include='*.cmake' --include='*.pc'; then
     echo "These files name the directory that they were installed to."
     exit 1
 fi
+
+echo "A project that takes this one in, unless it asks:"
+cat >"$dir/CMakeLists.txt" <<'END'
+cmake_minimum_required(VERSION 3.25)
+project(taker LANGUAGES CXX)
+include(FetchContent)
+FetchContent_Declare(vemoaccesstoken SOURCE_DIR ${SOURCE})
+FetchContent_MakeAvailable(vemoaccesstoken)
+install(FILES CMakeLists.txt DESTINATION own)
+END
+cmake -S "$dir" -B "$dir/taker" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" -DSOURCE="$source" >"$dir/log"
+cmake --install "$dir/taker" --prefix "$dir/taken"
+(cd "$dir/taken" && find . -type f) | diff - <(echo ./own/CMakeLists.txt)
