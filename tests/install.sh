@@ -33,8 +33,9 @@ while read -r header; do
     "${compile[@]}" -fsyntax-only "$dir/alone.cpp"
 done <"$dir/headers"
 
-echo "The installed tool:"
+echo "The installed tool, where root has it in the path and where others do:"
 LD_LIBRARY_PATH=$libdir "$dir/usr/sbin/vemo-access-token" --version
+[ "$(LD_LIBRARY_PATH=$libdir "$dir/usr/bin/vemo-access-token" generate | wc -c)" -gt 127 ]
 
 echo "The installed manual pages and completions:"
 (cd "$dir/usr/share" && find . ! -type d | LC_ALL=C sort) | tee "$dir/shared"
