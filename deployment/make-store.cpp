@@ -1,0 +1,16 @@
+// Makes the database of tokens and its table where they are missing, as the first call of a program does. The
+// package of the library runs it before there is any program: of several first calls at once, some can fail
+// and be lost.
+
+#include <AccessTokenUtil.h>
+#include <internal/AccessTokenDbApi.h>
+
+#include <cstdlib>
+
+int main()
+{
+    VEMO_ACCESS_TOKEN::logToStdout(true);
+    AccessTokenDbApi store;
+    const bool blMade = 0 <= store.initDb() && 0 <= store.createTable();
+    return blMade ? EXIT_SUCCESS : EXIT_FAILURE;
+}
