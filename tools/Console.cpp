@@ -40,12 +40,10 @@ namespace tool {
 
 void completeStreams()
 {
-    int nStream = 0;
-    do {
-        nStream = open("/dev/null", O_RDONLY | O_CLOEXEC);
-    } while (0 <= nStream && nStream <= STDERR_FILENO);
-    if (STDERR_FILENO < nStream) {
-        close(nStream);
+    for (const int nStream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) {
+        if (-1 == fcntl(nStream, F_GETFD)) {
+            open("/dev/null", O_RDONLY | O_CLOEXEC); // takes the lowest number
+        }
     }
     std::cin.exceptions(std::ios_base::badbit); // it would hide that memory ran out, and cut lines short
 }
@@ -57,10 +55,13 @@ FILE* resultStream()
 
 void divertStdout(FILE* pStream)
 {
-    if (pStream != stdout) {
-        g_pResult = stdout;
-        stdout = pStream;
-    }
+    g_pResult = stdout;
+    stdout = pStream;
+}
+
+void restoreStdout()
+{
+    stdout = g_pResult;
 }
 
 bool isTerminal(FILE* pStream)
@@ -104,7 +105,8 @@ void complainOfMemory()
 
 void flushResult()
 {
-    if (0 != fflush(g_pResult) || ferror(g_pResult)) {
+    fflush(g_pResult);
+    if (ferror(g_pResult)) { // then, or before
         throw Failure(EXIT_STATUS_STORE, std::string("cannot write the result: ") + strerror(errno));
     }
 }

@@ -19,8 +19,9 @@ void completeStreams();
 // Where results go: the standard output that the process was started with.
 FILE* resultStream();
 
-// Lets what others print to stdout go to another stream. Results go where they did.
+// Lets what others print to stdout go to another stream, or no longer. Results go where they did.
 void divertStdout(FILE* pStream);
+void restoreStdout();
 
 bool isTerminal(FILE* pStream);
 

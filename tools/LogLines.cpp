@@ -2,7 +2,8 @@
 
 #include <syslog.h>
 
-#include <cstdio>
+#include <cstdlib>
+#include <memory>
 #include <new>
 #include <sstream>
 #include <string>
@@ -10,49 +11,24 @@
 #include "AccessTokenUtil.h"
 #include "Console.h"
 
-namespace {
-
-std::string g_strLines;
-
-// The write function of the stream of log lines.
-ssize_t keep(void*, const char* szText, size_t cbText)
-{
-    try {
-        g_strLines.append(szText, cbText);
-    } catch (const std::bad_alloc&) {
-        return -1; // the caller is a C function
-    }
-    return static_cast<ssize_t>(cbText);
-}
-
-FILE* openLog()
-{
-    cookie_io_functions_t functions = {};
-    functions.write = keep;
-    FILE* const pLog = fopencookie(nullptr, "w", functions);
-    if (!pLog) {
-        throw std::bad_alloc();
-    }
-    setvbuf(pLog, nullptr, _IOLBF, BUFSIZ);
-    return pLog;
-}
-
-} // namespace
-
 namespace tool {
 
-LogLines::LogLines(bool blShown) : m_blShown(blShown)
+LogLines::LogLines(bool blShown) : m_blShown(blShown), m_pStream(open_memstream(&m_szLines, &m_cbLines))
 {
-    static FILE* const pLog = openLog();
-    divertStdout(pLog);
+    if (!m_pStream) {
+        throw std::bad_alloc();
+    }
+    divertStdout(m_pStream);
     VEMO_ACCESS_TOKEN::logToStdout(true);
 }
 
 LogLines::~LogLines()
 {
+    restoreStdout();
+    fclose(m_pStream);
+    const std::unique_ptr<char, decltype(&free)> pOwner(m_szLines, free);
     try {
-        std::istringstream lines(g_strLines);
-        g_strLines.clear();
+        std::istringstream lines(m_szLines ? m_szLines : ""); // none where memory ran out
         for (std::string strLine; std::getline(lines, strLine);) {
             if (m_blShown) {
                 fprintf(stderr, "%s\n", errorLine(strLine).c_str());
@@ -61,7 +37,7 @@ LogLines::~LogLines()
             }
         }
     } catch (const std::bad_alloc&) {
-        g_strLines.clear(); // what else is to be told of that, the command does
+        // what is to be told of that, the command does
     }
 }
 

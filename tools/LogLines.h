@@ -3,6 +3,9 @@
 #ifndef TOOLS_LOG_LINES_H
 #define TOOLS_LOG_LINES_H
 
+#include <cstddef>
+#include <cstdio>
+
 namespace tool {
 
 // Keeps them while it lives and writes them in the end: on standard error, to a terminal printable, or to the
@@ -17,6 +20,9 @@ public:
 
 private:
     const bool m_blShown;
+    char* m_szLines = nullptr;
+    size_t m_cbLines = 0;
+    FILE* const m_pStream;
 };
 
 } // namespace tool

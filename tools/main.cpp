@@ -18,18 +18,17 @@ namespace {
 // What no handler catches: there was no memory for the handler, or for the exception itself.
 void endWithoutMemory()
 {
-    if (!std::current_exception()) {
-        tool::complainOfMemory();
-        _exit(tool::EXIT_STATUS_STORE);
-    }
     try {
-        std::rethrow_exception(std::current_exception());
+        if (std::current_exception()) {
+            throw;
+        }
     } catch (const std::bad_alloc&) {
-        tool::complainOfMemory();
-        _exit(tool::EXIT_STATUS_STORE);
+        // the same
     } catch (...) {
         abort();
     }
+    tool::complainOfMemory();
+    _exit(tool::EXIT_STATUS_STORE);
 }
 
 } // namespace
