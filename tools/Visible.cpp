@@ -63,25 +63,16 @@ locale_t utf8()
     return locale;
 }
 
-// The largest character that can be told: of ASCII where the machine has no UTF-8 locale, or no memory for
-// it.
-wchar_t largestCharacter()
-{
-    return utf8() ? 0x10ffff : 0x7f;
-}
-
 bool isAscii(wchar_t cWide)
 {
     return static_cast<unsigned int>(cWide) < 0x80;
 }
 
+// In the locale that rewritten() sets.
 bool isVisible(wchar_t cWide)
 {
-    if (isAscii(cWide)) {
-        return ' ' <= cWide && cWide <= '~';
-    }
     const auto holds = [cWide](const Range& range) { return range.cFirst <= cWide && cWide <= range.cLast; };
-    return iswprint_l(static_cast<wint_t>(cWide), utf8()) && // which INVALID is not
+    return iswprint(static_cast<wint_t>(cWide)) && // which INVALID is not
            std::none_of(std::begin(INVISIBLE), std::end(INVISIBLE), holds);
 }
 
@@ -96,33 +87,31 @@ bool isPlain(char c)
     return ' ' <= c && c <= '~' && c != '\\';
 }
 
-// The text with what write() makes of each character, which is handed over with its bytes.
+// The text with what write() makes of each character, which is handed over with its bytes. Where the machine
+// has no locale for UTF-8, or no memory for it, only ASCII is valid.
 template <typename Write>
 std::string rewritten(const std::string& strText, Write write)
 {
     const locale_t before = uselocale(utf8());
     std::string strOut;
-    for (size_t i = 0; i < strText.size();) {
+    const char* szRest = strText.data();
+    const char* const szEnd = szRest + strText.size();
+    for (;;) {
         // At once, most of it goes several times as fast.
-        const auto pPlainEnd = std::find_if_not(&strText[i], strText.data() + strText.size(), isPlain);
-        const size_t cbPlain = static_cast<size_t>(pPlainEnd - &strText[i]);
-        if (cbPlain) {
-            strOut.append(strText, i, cbPlain);
-            i += cbPlain;
-            continue;
+        const char* const szOdd = std::find_if_not(szRest, szEnd, isPlain);
+        strOut.append(szRest, szOdd);
+        if (szOdd == szEnd) {
+            break;
         }
-        wchar_t cWide = static_cast<unsigned char>(strText[i]);
-        size_t cbCharacter = 1;
-        if (!isAscii(cWide)) {
-            mbstate_t state = {};
-            const size_t cbRead = mbrtowc(&cWide, &strText[i], strText.size() - i, &state);
-            // What is too large is an error's number, or none that UTF-8 goes to.
-            const bool blValid = cbRead <= strText.size() - i && cWide <= largestCharacter();
-            cbCharacter = blValid ? cbRead : 1;
-            cWide = blValid ? cWide : INVALID;
-        }
-        write(strOut, std::string_view(strText).substr(i, cbCharacter), cWide);
-        i += cbCharacter;
+        const size_t cbOdd = static_cast<size_t>(szEnd - szOdd);
+        wchar_t cWide = L'\0';
+        mbstate_t state = {};
+        const size_t cbRead = mbrtowc(&cWide, szOdd, cbOdd, &state); // 0 for a NUL
+        // What is too large is an error's number, or none that UTF-8 goes to.
+        const bool blValid = cbRead <= cbOdd && (isAscii(cWide) || (utf8() && cWide <= 0x10ffff));
+        const size_t cbCharacter = blValid && cbRead ? cbRead : 1;
+        write(strOut, std::string_view(szOdd, cbCharacter), blValid ? cWide : INVALID);
+        szRest = szOdd + cbCharacter;
     }
     uselocale(before);
     return strOut;
