@@ -89,10 +89,14 @@ void Command::remainingArguments(const std::string& strName, Take take, const st
 
 Command::Parameter* Command::find(const std::string& strName)
 {
-    auto& parameters = '-' == strName[0] ? m_options : m_arguments;
-    const auto pFound = std::find_if(parameters.begin(), parameters.end(),
-                                     [&](const Parameter& each) { return each.strName == strName; });
-    return parameters.end() == pFound ? nullptr : &*pFound;
+    for (auto* pParameters : {&m_options, &m_arguments}) {
+        for (Parameter& each : *pParameters) {
+            if (each.strName == strName) {
+                return &each;
+            }
+        }
+    }
+    return nullptr;
 }
 
 void Command::require(const std::string& strName)

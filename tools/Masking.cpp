@@ -40,14 +40,16 @@ namespace tool {
 std::string masked(const std::string& strTid)
 {
     size_t nCharacters = 0;
-    for (size_t i = 0; i < strTid.size(); ++i) {
-        const bool blContinued = (static_cast<unsigned char>(strTid[i]) & 0xc0) == 0x80; // UTF-8
-        const bool blCharacter = !blContinued && ++nCharacters > PREFIX_MIN;
-        if (blCharacter || i == PREFIX_MIN * CHARACTER_MAX) { // bytes that continue nothing are none
-            return strTid.substr(0, i);
+    size_t cbMasked = 0;
+    for (const char c : strTid) {
+        const bool blContinued = (static_cast<unsigned char>(c) & 0xc0) == 0x80; // UTF-8
+        const bool blEnough = !blContinued && ++nCharacters > PREFIX_MIN;
+        if (blEnough || cbMasked == PREFIX_MIN * CHARACTER_MAX) { // bytes that continue nothing are none
+            break;
         }
+        ++cbMasked;
     }
-    return strTid;
+    return strTid.substr(0, cbMasked);
 }
 
 std::string shortened(const std::string& strTid)

@@ -15,6 +15,7 @@
 
 namespace {
 
+typedef tool::Layout::Form Form;
 typedef tool::Table::Kind Kind;
 
 struct Options {
@@ -188,10 +189,12 @@ int stats(const Options& options)
         printMetrics(statistics);
         return tool::EXIT_STATUS_DONE;
     }
-    switch (options.layout.form) {
-    case tool::Layout::Form::Table: printTables(statistics, !options.layout.blNoHeader); break;
-    case tool::Layout::Form::Json: tool::print(tool::styledJson(jsonOf(statistics)) + "\n"); break;
-    case tool::Layout::Form::JsonLines: tool::print(tool::compactJson(jsonOf(statistics)) + "\n"); break;
+    if (Form::Table == options.layout.form) {
+        printTables(statistics, !options.layout.blNoHeader);
+    } else {
+        const Json::Value jStatistics = jsonOf(statistics);
+        const bool blStyled = Form::Json == options.layout.form;
+        tool::print((blStyled ? tool::styledJson(jStatistics) : tool::compactJson(jStatistics)) + "\n");
     }
     return tool::EXIT_STATUS_DONE;
 }

@@ -146,10 +146,10 @@ Json::Value changeOf(const Json::Value& jToken, const Options& options)
 }
 
 // Whether a number of uses is one from before the one that was set: no grant adds uses, takes a limit away or
-// brings one. Negative ones are without a limit.
+// brings one. Negative ones are without a limit; of these, -1 is the one that is set.
 bool isOldCount(int64_t nCount, int64_t nSet)
 {
-    return (nCount < 0) != (nSet < 0) || (nSet >= 0 && nCount > nSet);
+    return (nCount < 0) != (nSet < 0) || nCount > nSet;
 }
 
 // As texts: a NaN in it is not equal to itself.
@@ -191,10 +191,12 @@ void updateAgain(const Json::Value& jBefore, const Json::Value& jChange)
         return blNeeded;
     };
     tool::outlastCalls({isNeeded, update}, "the token was written back as it had been", "updated");
-    const int64_t nLeft = jNow ? (*jNow)["count"].asInt64() : 0;
     if (!jNow) {
         tool::complain("the token is gone: a call has spent its last use meanwhile, or deleted it");
-    } else if (jChange.isMember("count") && nLeft >= 0 && nLeft != jChange["count"].asInt64()) {
+        return;
+    }
+    const int64_t nLeft = (*jNow)["count"].asInt64();
+    if (jChange.isMember("count") && nLeft >= 0 && nLeft != jChange["count"].asInt64()) {
         tool::complain(tool::countText(static_cast<uint64_t>(nLeft), "use") +
                        " left: calls have spent some meanwhile, or written back an old number");
     }
