@@ -7,6 +7,7 @@
 
 #include <cerrno>
 #include <clocale>
+#include <cstring>
 #include <filesystem>
 #include <iostream>
 
@@ -105,6 +106,7 @@ TEST(Result, IsShownOnATerminalAsItCanBe)
     const Terminal terminal(stdout);
     EXPECT_EQ("\"\\u00e4\\udcff\\ud83d\\ude00\"",
               terminal.shown([] { tool::print("\"\u00e4\xff\U0001f600\""); }));
+    EXPECT_EQ("\\udcff", terminal.shown([] { tool::print("\xff"); }));
     EXPECT_EQ("\\xc3\\xa4\r\n", terminal.shown([] { tool::printLine("\u00e4"); }));
     ASSERT_NE(nullptr, setlocale(LC_CTYPE, "C.UTF-8"));
     EXPECT_EQ("\"\u00e4\\udcff\U0001f600\"", terminal.shown([] { tool::print("\"\u00e4\xff\U0001f600\""); }));
@@ -129,19 +131,25 @@ TEST(Errors, AreEscapedForATerminalAlone)
     EXPECT_EQ("\\xc3\\xa4\\x1b", tool::errorLine("\u00e4\x1b"));
 }
 
-// As twice in one process: each has its own, and the result goes where it did.
+// As twice in one process, with another stdout: each has its own, and the result goes where it did.
 TEST(LogLines, AreKeptUntilTheEnd)
 {
+    FILE* const pBefore = stdout;
     for (const char* szResult : {"first", "second"}) {
-        std::string strErrors;
-        EXPECT_EQ(szResult, written(stdout, [&] {
-                      strErrors = written(stderr, [&] {
-                          const tool::LogLines logLines(true);
-                          printf("line of the %s\n", szResult);
-                          tool::print(szResult);
-                          fputs("then ", stderr);
-                      });
+        FILE* const pFile = tmpfile();
+        stdout = pFile;
+        EXPECT_EQ(std::string("then line of the ") + szResult + "\n", written(stderr, [szResult] {
+                      const tool::LogLines logLines(true);
+                      printf("line of the %s\n", szResult);
+                      tool::print(szResult);
+                      fputs("then ", stderr);
                   }));
-        EXPECT_EQ(std::string("then line of the ") + szResult + "\n", strErrors);
+        EXPECT_EQ(pFile, stdout);
+        char szWritten[100] = "";
+        rewind(pFile);
+        EXPECT_EQ(strlen(szResult), fread(szWritten, 1, sizeof(szWritten), pFile));
+        EXPECT_STREQ(szResult, szWritten);
+        stdout = pBefore;
+        fclose(pFile);
     }
 }

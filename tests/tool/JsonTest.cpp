@@ -49,6 +49,8 @@ TEST(Json, TellsHowDeepATextIsNested)
         {R"([{},{},[],[]])", 2},
         {R"({"a":"[[[{{{"})", 1},
         {R"(["\"[[", [[]]])", 3},
+        {R"(["\\"])", 1},
+        {R"("\"[[[")", 0},
         {R"(["\\", [["]"]]])", 3},
         {R"("\)", 0},
         {"]]]]", 0},
@@ -104,7 +106,7 @@ TEST(Json, IsWholeOrNoneWhenMemoryFails)
 {
     const std::string strText = R"({"a":[0.12345678901234559,")" + LONG + R"("]})";
     EXPECT_EQ(std::set<std::string>{strText}, resultsWhileMemoryFails([&] { return read(strText); }));
-    const std::string strBad = R"({"a":)" + LONG + "}";
+    const std::string strBad = "{\"" + LONG + "\":1,\"" + LONG + "\":2}";
     EXPECT_EQ(std::set<std::string>{read(strBad)}, resultsWhileMemoryFails([&] { return read(strBad); }));
     EXPECT_EQ(std::set<std::string>{""}, resultsWhileMemoryFails([&] { return flawOfStored(strText); }));
 }

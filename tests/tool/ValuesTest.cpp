@@ -52,6 +52,13 @@ TEST(Users, AreNotLookedUpByNumbersThatNobodyCanHave)
     EXPECT_EQ(std::vector<std::string>(), seam().callsOf({"getpwuid_r"}));
 }
 
+TEST(Users, HaveNumbersButForTheLast)
+{
+    EXPECT_EQ(4294967294U, tool::parseUid("4294967294"));
+    EXPECT_EQ("\"4294967295\" is no number from 0 to 4294967294", refusal(tool::parseUid, "4294967295"));
+    EXPECT_EQ("\"-1\" is no number from 0 to 4294967294", refusal(tool::parseUid, "-1"));
+}
+
 TEST(Durations, AreANumberOfSecondsOrNumbersWithUnits)
 {
     const struct {
