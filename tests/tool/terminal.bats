@@ -253,7 +253,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
     [ "$(below SESSION)" = "$session" ]
     [ "$(below ALLOWS)" = "Api$allow" ]
     on_terminal --columns 60 -- stats
-    [ "$(awk 'length > 60' <<<"$output")" = "" ]
+    [ "$(wc -L <<<"$output")" -eq 60 ]
     # A terminal that does not know its width is taken for one of 80 columns.
     on_terminal --columns 80 -- list
     local known=$output
