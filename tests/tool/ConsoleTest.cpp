@@ -101,8 +101,9 @@ TEST(Secrets, AreWholeLinesOrNoneWhenMemoryFails)
     EXPECT_EQ((std::set<std::vector<std::string>>{{ID, ID}}), results);
 }
 
-TEST(Result, IsShownOnATerminalAsItCanBe)
+TEST(Result, IsEscapedForATerminalAlone)
 {
+    EXPECT_EQ("\u00e4\xff", written(stdout, [] { tool::print("\u00e4\xff"); }));
     const Terminal terminal(stdout);
     EXPECT_EQ("\"\\u00e4\\udcff\\ud83d\\ude00\"",
               terminal.shown([] { tool::print("\"\u00e4\xff\U0001f600\""); }));
