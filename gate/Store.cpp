@@ -32,11 +32,9 @@ sqlite3* opened(AccessTokenDbApi& db)
 // Whether a statement was done, and not refused because others hold the database.
 bool isDone(grant::Statement& statement)
 {
-    statement.reset();
     try {
         statement.step();
     } catch (const grant::Error& error) {
-        statement.reset();
         const int nCode = error.code() & 0xff;
         if (SQLITE_BUSY != nCode && SQLITE_PROTOCOL != nCode) {
             throw;
@@ -90,9 +88,7 @@ uint64_t Store::purge()
     if (nNow < m_connection->nPurgeAt) {
         return 0;
     }
-    m_connection->purge.reset();
     m_connection->purge.step();
-    m_connection->purge.reset();
     const int64_t nEnd = now();
     m_connection->nPurgeAt = nEnd + std::max(PURGE_EACH, PURGE_SHARE * (nEnd - nNow));
     return static_cast<uint64_t>(sqlite3_changes64(m_connection->pDb));
@@ -110,7 +106,6 @@ void Store::rollBack() noexcept
     }
     try {
         m_connection->rollBack.step();
-        m_connection->rollBack.reset();
     } catch (...) {
         m_connection.reset(); // closing undoes it too
     }

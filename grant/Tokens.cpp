@@ -44,6 +44,16 @@ std::string findSql()
     return strSql + EXPIRED " FROM token" WHERE_TID;
 }
 
+// As the library's, and below 0 also where what stands among the methods cannot be read as one.
+int permission(Json::Value& jAllow, const std::string& strApi, const std::string& strMethod)
+{
+    try {
+        return VEMO_ACCESS_TOKEN::checkPermission(jAllow, strApi.c_str(), strMethod.c_str());
+    } catch (const Json::LogicError&) {
+        return -1;
+    }
+}
+
 } // namespace
 
 namespace grant {
@@ -66,7 +76,7 @@ Statement::~Statement()
 void Statement::fail()
 {
     const int nCode = sqlite3_extended_errcode(m_pDb);
-    if (SQLITE_NOMEM == (nCode & 0xff)) {
+    if (SQLITE_NOMEM == nCode) {
         throw std::bad_alloc();
     }
     throw Error(nCode, sqlite3_errmsg(m_pDb));
@@ -90,22 +100,27 @@ Statement& Statement::bind(int nParameter, int64_t nNumber)
 
 bool Statement::step()
 {
-    switch (sqlite3_step(m_pStatement)) {
-    case SQLITE_ROW: return true;
-    case SQLITE_DONE: return false;
-    default: fail();
+    if (SQLITE_ROW == sqlite3_step(m_pStatement)) {
+        return true;
     }
+    if (SQLITE_OK != sqlite3_reset(m_pStatement)) { // tells the result of the step once more
+        fail();
+    }
+    return false;
 }
 
 void Statement::reset()
 {
-    sqlite3_reset(m_pStatement); // repeats the result of the last step
+    sqlite3_reset(m_pStatement);
 }
 
 const char* Statement::text(int nColumn) const
 {
+    if (SQLITE_NULL == sqlite3_column_type(m_pStatement, nColumn)) {
+        return nullptr; // asked for first: a column whose text finds no memory turns into NULL
+    }
     const auto szText = reinterpret_cast<const char*>(sqlite3_column_text(m_pStatement, nColumn));
-    if (!szText && SQLITE_NULL != sqlite3_column_type(m_pStatement, nColumn)) {
+    if (!szText) {
         throw std::bad_alloc();
     }
     return szText;
@@ -138,18 +153,13 @@ Verdict judge(Token& token, const std::string& strApi, const std::string& strMet
     if (token.blExpired) {
         return Verdict::Expired;
     }
-    int nPermission = -1;
-    try {
-        nPermission = VEMO_ACCESS_TOKEN::checkPermission(token.jAllow, strApi.c_str(), strMethod.c_str());
-    } catch (const Json::LogicError&) {
-        return Verdict::Malformed; // what stands among the methods cannot be read as one
-    }
-    if (0 == nPermission) {
-        return Verdict::MethodNotListed;
-    }
+    const int nPermission = permission(token.jAllow, strApi, strMethod);
     if (0 > nPermission) {
         const Json::Value& jAllow = token.jAllow[FIELDS[WEBAPI_ALLOW]];
         return jAllow.isObject() && !jAllow.isMember(strApi) ? Verdict::ApiNotListed : Verdict::Malformed;
+    }
+    if (0 == nPermission) {
+        return Verdict::MethodNotListed;
     }
     // What is saved with its uses lowered must be sound in all its fields.
     return Left::Less == left(token.nCount) && !token.jExtra.isObject() ? Verdict::Malformed
@@ -173,7 +183,7 @@ Tokens::Tokens(sqlite3* pDb)
 
 std::optional<Token> Tokens::find(const std::string& strTid)
 {
-    m_find.reset();
+    m_find.reset(); // where lack of memory ended the look-up before, it stands at its row still
     std::optional<Token> token;
     // All rows, as the library does: one that cannot be read makes the look-up fail, wherever it stands.
     for (m_find.bind(1, strTid); m_find.step();) {
@@ -195,34 +205,29 @@ std::optional<Token> Tokens::find(const std::string& strTid)
         token->strFunction = m_find.text(FUNCTION);
         VEMO_ACCESS_TOKEN::fromString(m_find.text(WEBAPI_ALLOW), token->jAllow[FIELDS[WEBAPI_ALLOW]]);
         VEMO_ACCESS_TOKEN::fromString(m_find.text(EXTRA), token->jExtra);
-        const char* szExpired = m_find.text(HAS_EXPIRED);
-        token->blExpired = szExpired && '1' == szExpired[0];
+        token->blExpired = 0 != m_find.number(HAS_EXPIRED);
     }
-    m_find.reset();
     return token;
 }
 
 void Tokens::setCount(const std::string& strTid, int64_t nCount)
 {
-    m_setCount.reset();
     m_setCount.bind(1, strTid).bind(2, nCount).step();
-    m_setCount.reset();
 }
 
 void Tokens::spend(const Token& token)
 {
-    switch (left(token.nCount)) {
-    case Left::Nothing: remove(token.strTid); break;
-    case Left::Less: setCount(token.strTid, token.nCount - 1); break;
-    case Left::All: break;
+    const Left nLeft = left(token.nCount);
+    if (Left::Nothing == nLeft) {
+        remove(token.strTid);
+    } else if (Left::Less == nLeft) {
+        setCount(token.strTid, token.nCount - 1);
     }
 }
 
 void Tokens::remove(const std::string& strTid)
 {
-    m_remove.reset();
     m_remove.bind(1, strTid).step();
-    m_remove.reset();
 }
 
 } // namespace grant

@@ -50,10 +50,11 @@ public:
     Statement& bind(int nParameter, const std::string& strText);
     Statement& bind(int nParameter, int64_t nNumber);
 
-    // Runs it to its next row; returns false behind the last, and at once for a statement without rows.
+    // Runs it to its next row; returns false behind the last, and at once for a statement without rows. Then,
+    // and where it fails, it has ended and can be run again.
     bool step();
 
-    // Ends it, so that it can be run again.
+    // Ends it ahead of that.
     void reset();
 
     // A column of the row, counted from 0, as the library reads it: text up to the first NUL; null where it
