@@ -49,7 +49,7 @@ std::string ownTid(const std::string& strArgument)
 
 Json::Value recordOf(const Options& options)
 {
-    Json::Value jToken(Json::objectValue);
+    Json::Value jToken;
     jToken["tid"] = options.strTid ? ownTid(*options.strTid) : newTid();
     jToken["bind_sid"] = options.strSid;
     jToken["uid"] = *options.nUid;

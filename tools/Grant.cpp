@@ -73,10 +73,9 @@ std::string owner(int64_t nUid)
     }
 }
 
-// In one transaction with the look-up, so that no other grant spends the same use.
-int grantCall(const Options& options)
+// In one transaction with the look-up, so that no other grant spends the same use. Returns the owner.
+int64_t spendUse(const std::string& strTid, const Options& options)
 {
-    const std::string strTid = tool::readTid("TID", options.strTid);
     tool::Store store(tool::Store::Access::Write);
     std::optional<grant::Token> token = store.token(strTid);
     const grant::Verdict verdict = judge(token, options);
@@ -88,11 +87,17 @@ int grantCall(const Options& options)
     if (grant::Verdict::Granted != verdict) {
         throw tool::Failure(tool::EXIT_STATUS_REFUSED, std::string("refused: ") + reasonOf(verdict));
     }
-    if (!options.blPrintUser) {
+    return token->nUid;
+}
+
+int grantCall(const Options& options)
+{
+    const int64_t nUid = spendUse(tool::readTid("TID", options.strTid), options);
+    if (options.blPrintUser) {
+        tool::printLine(owner(nUid));
+    } else {
         tool::print("granted\n");
-        return tool::EXIT_STATUS_DONE;
     }
-    tool::printLine(owner(token->nUid));
     return tool::EXIT_STATUS_DONE;
 }
 

@@ -12,7 +12,8 @@ void handleEndingSignals(void (*handle)(int))
 {
     for (const int nSignal : ENDING_SIGNALS) {
         struct sigaction action = {};
-        if (0 == sigaction(nSignal, nullptr, &action) && SIG_DFL == action.sa_handler) {
+        sigaction(nSignal, nullptr, &action);
+        if (SIG_DFL == action.sa_handler) {
             action.sa_handler = handle;
             action.sa_flags = static_cast<int>(SA_RESETHAND); // and calls that wait are not begun anew
             sigaction(nSignal, &action, nullptr);

@@ -78,6 +78,12 @@ std::string sqlBehind(std::string strPrefix)
 // As long as the library waits for the database.
 const std::chrono::seconds LOCK_WAIT(5);
 
+// What it means that a command which changes something did not get a lock.
+const char* meaningOfLocked()
+{
+    return g_blChanged ? "" : "nothing was changed";
+}
+
 [[noreturn]] void failOnLock(int nError)
 {
     const std::string strFile = CallLock::FILE_OF_ALL;
@@ -86,7 +92,7 @@ const std::chrono::seconds LOCK_WAIT(5);
         throw tool::LockedFailure(tool::EXIT_STATUS_STORE,
                                   strFile + " stayed locked by " + tool::lockHolders(strFile) +
                                       " for 5 seconds",
-                                  g_blChanged ? "" : "nothing was changed");
+                                  meaningOfLocked());
     case EPERM:
     case ELOOP:
         throw tool::Failure(tool::EXIT_STATUS_STORE,
@@ -137,37 +143,33 @@ Store::Store(Access access, Missing missing) : m_access(access)
         m_blMadeFile = makeFile();
         settleChange();
     }
-    errno = 0;
     if (0 > m_db.initDb()) {
-        const std::string strReason = errno ? std::string(": ") + strerror(errno) : "";
-        throw Failure(EXIT_STATUS_STORE, std::string(VEMO_ATOKEN_DB_PATH) + " cannot be opened" + strReason);
+        throw Failure(EXIT_STATUS_STORE,
+                      std::string(VEMO_ATOKEN_DB_PATH) + " cannot be opened: " + strerror(errno));
     }
     query("PRAGMA temp_store = MEMORY"); // what is sorted holds purposes and sessions, and stays private
-    switch (access) {
-    case Access::Locked: break;
-    case Access::Glance: beginReading(); break;
-    case Access::Read:
-        beginReading();
+    if (Access::Write == access) {
+        beginWriting(missing);
+    } else if (Access::Locked != access) {
+        query("BEGIN");
+        query("SELECT count(*) FROM sqlite_schema"); // takes the lock
+    }
+    if (Access::Read == access) {
         syncDirectory("a power cut can undo what others changed last");
-        break;
-    case Access::Write:
-        // A database without anything is one that another program is just making, or was kept from making:
-        // the table comes after the file. Whoever is first makes it.
-        if (Missing::Make == missing && 0 == number("SELECT count(*) FROM sqlite_schema")) {
-            makeTable();
-        }
-        if (!hasTable()) {
-            fail("no such table: token"); // before an empty file becomes a database without one
-        }
-        query("BEGIN IMMEDIATE");
-        break;
     }
 }
 
-void Store::beginReading()
+void Store::beginWriting(Missing missing)
 {
-    query("BEGIN");
-    query("SELECT count(*) FROM sqlite_schema"); // takes the lock
+    // A database without anything is one that another program is just making, or was kept from making:
+    // the table comes after the file. Whoever is first makes it.
+    if (Missing::Make == missing && 0 == number("SELECT count(*) FROM sqlite_schema")) {
+        makeTable();
+    }
+    if (!hasTable()) {
+        fail("no such table: token"); // before an empty file becomes a database without one
+    }
+    query("BEGIN IMMEDIATE");
 }
 
 void Store::lock()
@@ -194,9 +196,8 @@ void Store::fail(const std::string& strErr)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH " ";
     if (contains(strErr, "database is locked")) {
-        const bool blNothing = Access::Glance != m_access && Access::Read != m_access && !g_blChanged;
         throw LockedFailure(EXIT_STATUS_STORE, strPath + "stayed locked by another process for 5 seconds",
-                            blNothing ? "nothing was changed" : "");
+                            Access::Read == m_access ? "" : meaningOfLocked());
     }
     // No statement failed but there was no memory for its text, or for a row.
     if (strErr.empty() || (contains(strErr, "query aborted") && !holdsNull())) {
@@ -231,13 +232,11 @@ void Store::commit()
     const bool blChanged = 0 != number("SELECT total_changes()");
     m_blCommitting = blChanged;
     query("COMMIT");
-    m_blCommitting = false;
     if (blChanged) {
         settleChange();
     } else {
         syncDirectory("a power cut can undo what others changed last");
     }
-    m_lock.reset();
 }
 
 Json::Value Store::tokens(const Json::Value& jFilter)
@@ -394,15 +393,10 @@ bool Store::makeTable()
     }
     query("PRAGMA auto_vacuum = FULL"); // as the library has it; within a transaction it does nothing
     query("BEGIN IMMEDIATE");
-    const bool blMade = !hasTable();
-    if (blMade) {
-        require(m_db.createTable());
-    }
+    require(m_db.createTable()); // unless another program just has
     query("COMMIT");
-    if (blMade) {
-        settleChange();
-    }
-    return blMade;
+    settleChange();
+    return true;
 }
 
 Rows Store::query(const std::string& strSql)

@@ -52,8 +52,8 @@ public:
     // Whether the file was missing, and was made.
     bool hasMadeFile() const { return m_blMadeFile; }
 
-    // Waits, for 5 s at most, until the change can be written. It outlasts a power cut. Others can change
-    // tokens from then on.
+    // Waits, for 5 s at most, until the change can be written. It outlasts a power cut. Others that take the
+    // lock can change tokens when this object is gone.
     void commit();
 
     // The tokens whose fields equal the filter's.
@@ -124,7 +124,7 @@ public:
     static bool hasChanged();
 
 private:
-    void beginReading();
+    void beginWriting(Missing missing);
     void lock();
     [[noreturn]] void fail(const std::string& strErr);
     std::string run(const std::string& strSql, const std::function<void(Row)>& take);

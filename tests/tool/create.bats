@@ -320,3 +320,12 @@ $OWN|1" ]
     [ "$output" != "$(tool generate)" ]
     [ ! -e "$VEMO_REDIRECT_DIR" ]
 }
+
+@test "create says what became of a token that was to be taken back" {
+    tool init
+    VEMO_TEST_SYNC=file run_tool create --uid 0 --function VPN
+    expect 4 "" "vemo-access-token: $REAL_DB failed: disk I/O error"
+    VEMO_TEST_SYNC=directory run_tool create --uid 0 --function VPN
+    expect 4 "" "vemo-access-token: ${REAL_DB%/*}: Input/output error; the change was made, and cannot be taken back: ${REAL_DB%/*}: Input/output error"
+    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
+}

@@ -64,6 +64,17 @@ expect_tokens()
     [[ $output != *index* ]]
 }
 
+@test "what is sorted stays in memory, and goes into no file beside the store" {
+    a_store
+    sql "INSERT INTO token SELECT hex(randomblob(8)), hex(randomblob(500000)), 0, 9999999999, 1, 0, 'VPN', '{}', '{}'
+         FROM (VALUES (1), (2), (3))"
+    mkdir "$DIR/temporary"
+    touch -d @0 "$DIR/temporary"
+    SQLITE_TMPDIR=$DIR/temporary run_tool tune
+    expect_change no yes delete delete
+    [ "$(stat -c %Y "$DIR/temporary")" -eq 0 ]
+}
+
 @test "tune can be run twice" {
     a_store
     tool tune --wal
@@ -109,6 +120,10 @@ expect_tokens()
 |delete|3
 --wal|wal|0
 TABLE
+    a_store
+    VEMO_TEST_SYNC=file run_tool tune
+    expect 4 "" "vemo-access-token: $REAL_DB failed: disk I/O error"
+    [ "$(indexes)" = "" ]
 }
 
 @test "tune --undo takes back what tune did, and nothing else" {
