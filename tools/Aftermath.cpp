@@ -35,14 +35,34 @@ void waitForClosed(std::vector<std::string>& strOpen, Clock::duration wait)
     }
 }
 
+bool isUndone(const tool::Change& change)
+{
+    tool::Store store(tool::Store::Access::Glance);
+    return change.isUndone(store);
+}
+
+// Looks until who has the database open has closed it, or has had all the time that a call can take; but
+// returns true at once where the change was undone.
+bool isUndoneMeanwhile(const tool::Change& change, std::vector<std::string>& strOpen)
+{
+    strOpen = tool::databaseDescriptors();
+    const auto end = Clock::now() + CALL_MAX;
+    for (;;) {
+        const bool blLast = strOpen.empty() || Clock::now() >= end;
+        const auto start = Clock::now();
+        if (isUndone(change)) {
+            return true;
+        }
+        if (blLast) {
+            return false;
+        }
+        // It takes turns with the other programs, whom a look at many tokens keeps from committing.
+        waitForClosed(strOpen, std::max<Clock::duration>(LOOK_AGAIN_AFTER, Clock::now() - start));
+    }
+}
+
 uint64_t restore(const tool::Change& change)
 {
-    {
-        tool::Store store(tool::Store::Access::Glance);
-        if (!change.isUndone(store)) {
-            return 0;
-        }
-    }
     tool::Store store(tool::Store::Access::Write);
     const uint64_t nUndone = change.makeAgain(store);
     store.commit();
@@ -70,27 +90,14 @@ uint64_t restoreAndHold(const tool::Change& change, std::vector<std::string>& st
 // Returns who has had the database open all the time.
 std::vector<std::string> outlast(const tool::Change& change, uint64_t& nUndone)
 {
-    std::vector<std::string> strOpen = tool::databaseDescriptors();
-    auto end = Clock::now() + CALL_MAX;
-    for (int nRestored = 0;;) {
-        const bool blLast = strOpen.empty() || Clock::now() >= end;
-        const auto start = Clock::now();
-        const uint64_t nAgain = restore(change);
-        if (nAgain) {
-            nUndone += nAgain;
-            strOpen = tool::databaseDescriptors();
-            end = Clock::now() + CALL_MAX;
-            if (++nRestored == RESTORED_MAX) {
-                nUndone += restoreAndHold(change, strOpen);
-                end = Clock::now();
-            }
-        } else if (blLast) {
-            break;
-        } else {
-            // It takes turns with the other programs, whom a look at many tokens keeps from committing.
-            waitForClosed(strOpen, std::max<Clock::duration>(LOOK_AGAIN_AFTER, Clock::now() - start));
+    std::vector<std::string> strOpen;
+    for (int i = 0; i < RESTORED_MAX; ++i) {
+        if (!isUndoneMeanwhile(change, strOpen)) {
+            return strOpen;
         }
+        nUndone += restore(change);
     }
+    nUndone += restoreAndHold(change, strOpen);
     return strOpen;
 }
 

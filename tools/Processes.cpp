@@ -38,9 +38,12 @@ std::string processesText(const std::set<std::string>& strPids)
     return strText;
 }
 
-// A file as /proc/locks names it: the numbers of its device, and its own.
-std::string lockName(const struct stat& status)
+// A file as /proc/locks names it: the numbers of its device, and its own. No file has the numbers of one that
+// cannot be looked at.
+std::string lockName(const std::string& strFile)
 {
+    struct stat status = {};
+    stat(strFile.c_str(), &status);
     char szName[64];
     snprintf(szName, sizeof(szName), "%02x:%02x:%ju", major(status.st_dev), minor(status.st_dev),
              uintmax_t{status.st_ino});
@@ -58,10 +61,14 @@ std::vector<std::string> namesIn(const std::string& strDirectory)
 {
     std::vector<std::string> strNames;
     const std::unique_ptr<DIR, int (*)(DIR*)> pDirectory(opendir(strDirectory.c_str()), closedir);
-    if (!pDirectory && (ENOMEM == errno || EMFILE == errno || ENFILE == errno)) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, strDirectory + ": " + strerror(errno));
+    if (!pDirectory) {
+        if (ENOMEM == errno || EMFILE == errno || ENFILE == errno) {
+            throw tool::Failure(tool::EXIT_STATUS_STORE, strDirectory + ": " + strerror(errno));
+        }
+        return strNames;
     }
-    for (const struct dirent* pEntry = nullptr; pDirectory && (pEntry = readdir(pDirectory.get()));) {
+    DIR* const pOpen = pDirectory.get();
+    for (const struct dirent* pEntry = readdir(pOpen); pEntry; pEntry = readdir(pOpen)) {
         strNames.emplace_back(pEntry->d_name);
     }
     return strNames;
@@ -87,15 +94,14 @@ namespace tool {
 
 std::string lockHolders(const std::string& strFile)
 {
+    const std::string strLock = lockName(strFile);
     std::set<std::string> strPids;
-    struct stat status = {};
     std::ifstream locks(std::string(PROC) + "locks");
-    const bool blFound = 0 == stat(strFile.c_str(), &status);
-    for (std::string strLine; blFound && std::getline(locks, strLine);) {
+    for (std::string strLine; std::getline(locks, strLine);) {
         std::istringstream words(strLine);
         std::string strNumber, strKind, strStrength, strType, strPid, strName;
         words >> strNumber >> strKind >> strStrength >> strType >> strPid >> strName; // who waits has "->"
-        if (strName == lockName(status) && strPid != "0") {
+        if (strName == strLock) {
             strPids.insert(strPid);
         }
     }
@@ -132,11 +138,9 @@ bool isOfDatabase(const std::string& strDescriptor)
 {
     // By its name first: to look at what stands on a network can take for ever.
     static const std::string strName = realName();
-    struct stat status = {};
-    struct stat database = {};
-    return nameBehind(strDescriptor) == strName && 0 == stat(VEMO_ATOKEN_DB_PATH, &database) &&
-           0 == stat(strDescriptor.c_str(), &status) && status.st_dev == database.st_dev &&
-           status.st_ino == database.st_ino;
+    std::error_code error;
+    return nameBehind(strDescriptor) == strName &&
+           std::filesystem::equivalent(strDescriptor, VEMO_ATOKEN_DB_PATH, error);
 }
 
 std::string ownersText(const std::vector<std::string>& strDescriptors)

@@ -15,7 +15,7 @@ lock()
 {
     rm -f "$DIR/to-holder" "$DIR/from-holder"
     mkfifo "$DIR/to-holder" "$DIR/from-holder"
-    sqlite3 "$DB" <"$DIR/to-holder" >"$DIR/from-holder" 3>&- &
+    sqlite3 "$DB" <"$DIR/to-holder" >"$DIR/from-holder" 3>&- 9>&- &
     HOLDER=$!
     exec 7>"$DIR/to-holder" 8<"$DIR/from-holder"
     echo "$1 SELECT 'held';" >&7
@@ -158,6 +158,12 @@ TABLE
     trap - HUP
     [ "$status" -eq 0 ]
     [ "$(sql "SELECT tid FROM token")" = "$output" ]
+    # What does interrupt it leaves no token whose id nobody got to know.
+    sql "DELETE FROM token"
+    lock "$READING"
+    SIGNAL=TERM run_waiting 1 create --uid 0 --function VPN
+    expect 143 "" "vemo-access-token: interrupted; the token was taken back"
+    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }
 
 @test "a refusal that had to wait is a refusal" {
@@ -301,7 +307,41 @@ locked_commands()
 4|; nothing was changed|init
 4|; nothing was changed|tune
 4|; nothing was changed|tune --wal
+4|; nothing was changed|second create --uid 0 --function VPN
 4|; nothing was changed|second grant $ID Api get
+TABLE
+}
+
+@test "of a lock that stays behind a first change, it is not said that nothing was changed" {
+    a_store
+    local kind sentence importer locker
+    while IFS='|' read -r kind sentence; do
+        sql "DELETE FROM token"
+        rm -f "$DIR/lines"
+        mkfifo "$DIR/lines"
+        VEMO_TEST_HASTE=1 "$TOOL" import "$DIR/other" - <"$DIR/lines" >"$DIR/out" 2>&1 3>&- &
+        importer=$!
+        exec 9>"$DIR/lines"
+        until_sql 1 "SELECT count(*) FROM token"
+        if [ "$kind" = database ]; then
+            lock "$EXCLUSIVE"
+        else
+            exec 6>"$VEMO_REDIRECT_DIR.lock"
+            flock 6 & # a program that is gone then, so that nobody knows its name
+            locker=$!
+            wait $locker
+        fi
+        whole </dev/null >&9
+        exec 9>&-
+        wait $importer || echo "status $?" >>"$DIR/out"
+        [ "$kind" = file ] || unlock
+        exec 6>&-
+        diff "$DIR/out" - <<<"1 token imported
+vemo-access-token: $sentence${locker:+ $locker)} for 5 seconds
+status 4"
+    done <<TABLE
+database|$REAL_DB stayed locked by another process
+file|/run/vemo-access-token.lock stayed locked by a program (process
 TABLE
 }
 
@@ -479,22 +519,41 @@ print(written)' "$DB"
 }
 
 @test "where it cannot be told which programs have the database open, the change is no success" {
-    local id
+    local id error reason uses=1
     id=$(a_token)
-    VEMO_TEST_PROC=24 run_tool revoke "$id" # EMFILE
-    expect 4 "" "vemo-access-token: /proc/: Too many open files; the change was made, but calls that were under way can have undone it"
-    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
+    while IFS='|' read -r error reason; do
+        uses=$((uses + 1))
+        VEMO_TEST_PROC=$error run_tool update "$id" --uses $uses
+        expect 4 "" "vemo-access-token: /proc/: $reason; the change was made, but calls that were under way can have undone it"
+        [ "$(sql "SELECT count FROM token")" -eq $uses ]
+    done <<'TABLE'
+12|Cannot allocate memory
+23|Too many open files in system
+24|Too many open files
+TABLE
+    # What it may not see is no reason to fail.
+    VEMO_TEST_PROC=13 run_tool revoke "$id"
+    expect 0 "1 token revoked"
 }
 
 @test "who had read a token, and ended without writing it back, is waited for and not named" {
     local id
     id=$(a_token)
     calling
-    "$TOOL" revoke "$id" >"$DIR/out" 2>&1 3>&- 7>&- 8<&- &
+    mkfifo "$DIR/waits"
+    exec 9<>"$DIR/waits"
+    VEMO_TEST_WAITS=$DIR/waits "$TOOL" revoke "$id" >"$DIR/out" 2>&1 3>&- 7>&- 8<&- 9>&- &
     until_sql 0 "SELECT count(*) FROM token"
-    sleep 0.5 # for the tool to have looked
+    echo "$EXCLUSIVE SELECT 'held';" >&7
+    local line=
+    read -r -t 20 -u 8 line
+    while read -r -t 0 -u 9; do
+        read -r -u 9 # what it had waited for before
+    done
+    read -r -t 20 -u 9 # to look again
     unlock
     wait $!
+    exec 9>&-
     diff "$DIR/out" - <<< "1 token revoked"
 }
 
@@ -504,6 +563,12 @@ print(written)' "$DB"
     id=$(a_token)
     run --separate-stderr "${namespace[@]}" sh -c 'mount -t tmpfs none /proc && exec "$@"' - "$TOOL" revoke "$id"
     expect 0 "1 token revoked" "vemo-access-token: /proc does not tell who has the database open: what was read before can still be written back"
+    # And nobody knows who holds the lock.
+    exec 6>"$VEMO_REDIRECT_DIR.lock"
+    flock 6
+    VEMO_TEST_HASTE=1 run --separate-stderr "${namespace[@]}" sh -c 'mount -t tmpfs none /proc && exec "$@"' - "$TOOL" purge
+    exec 6>&-
+    expect 4 "" "vemo-access-token: /run/vemo-access-token.lock stayed locked by another process for 5 seconds; nothing was changed"
 }
 
 @test "programs that may still write back are named, and so is who holds the lock" {
