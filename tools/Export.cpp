@@ -92,6 +92,34 @@ size_t writeLines(const Contents& contents, bool blProgress, Write write)
     return nTokens;
 }
 
+size_t print(const Contents& contents)
+{
+    // On one terminal the two would get mixed.
+    const bool blProgress = !tool::isTerminal(tool::resultStream());
+    const size_t nTokens = writeLines(contents, blProgress, tool::print);
+    tool::flushResult();
+    return nTokens;
+}
+
+size_t save(const Contents& contents, const std::string& strFile)
+{
+    tool::NewFile file(strFile);
+    const auto write = [&file](const std::string& strText) { file.write(strText); };
+    const size_t nTokens = writeLines(contents, true, write);
+    file.complete();
+    return nTokens;
+}
+
+// The sentence about an export that lacks the tokens with flaws.
+tool::Failure notWhole(const Contents& contents, const std::string& strExported,
+                       const std::string& strMeaning)
+{
+    return tool::Failure(tool::EXIT_STATUS_STORE,
+                         strExported + " exported; without " +
+                             tool::countText(contents.flaws.size(), "token") + ", " + strMeaning,
+                         "\"sqlite3 " VEMO_ATOKEN_DB_PATH " '.backup FILE'\" keeps all");
+}
+
 int exportTokens(const Options& options)
 {
     const Contents contents = readStore();
@@ -99,25 +127,15 @@ int exportTokens(const Options& options)
         tool::complain("token " + tool::masked(strTid) + " cannot be exported: " + strFlaw);
     }
     const bool blPrint = options.strFile == "-";
-    size_t nTokens = 0;
-    if (blPrint) {
-        // On one terminal the two would get mixed.
-        nTokens = writeLines(contents, !tool::isTerminal(tool::resultStream()), tool::print);
-        tool::flushResult();
-    } else if (contents.flaws.empty()) {
-        tool::NewFile file(options.strFile);
-        nTokens = writeLines(contents, true, [&file](const std::string& strText) { file.write(strText); });
-        file.complete();
+    if (!blPrint && !contents.flaws.empty()) {
+        throw notWhole(contents, "nothing", "the file would not be whole");
     }
+    const size_t nTokens = blPrint ? print(contents) : save(contents, options.strFile);
+    const std::string strExported = tool::countText(nTokens, "token");
     if (!contents.flaws.empty()) {
-        const std::string strWithout = "without " + tool::countText(contents.flaws.size(), "token");
-        throw tool::Failure(tool::EXIT_STATUS_STORE,
-                            blPrint ? tool::countText(nTokens, "token") + " exported; " + strWithout +
-                                          ", the export has no end"
-                                    : "nothing exported; " + strWithout + ", the file would not be whole",
-                            "\"sqlite3 " VEMO_ATOKEN_DB_PATH " '.backup FILE'\" keeps all");
+        throw notWhole(contents, strExported, "the export has no end");
     }
-    tool::complain(tool::countText(nTokens, "token") + " exported");
+    tool::complain(strExported + " exported");
     return tool::EXIT_STATUS_DONE;
 }
 

@@ -34,7 +34,7 @@ Json::Value ExportEnd::json(uint64_t nTokens) const
 
 bool ExportEnd::is(const Json::Value& jLine)
 {
-    return 1 == jLine.size() && jLine.isMember(END) && jLine[END].isObject() && 2 == jLine[END].size() &&
+    return 1 == jLine.size() && jLine[END].isObject() && 2 == jLine[END].size() &&
            jLine[END][SHA256].isString() && jLine[END][TOKENS].isUInt64();
 }
 
