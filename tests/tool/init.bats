@@ -193,3 +193,15 @@ no findings"
     # shellcheck disable=SC2154 # bats sets it
     [[ $stderr == *" stayed locked by flock (process "*") for 5 seconds" ]] # and not that nothing was changed
 }
+
+@test "init makes no table before the file is on the disk, and tells what a power cut can undo" {
+    local sentence="vemo-access-token: ${REAL_DB%/*}: Input/output error; the change was made, but a power cut can undo it"
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    VEMO_TEST_SYNC=directory run_tool init
+    expect 4 "" "$sentence"
+    [ -f "$DB" ]
+    [ ! -s "$DB" ]
+    VEMO_TEST_SYNC=directory run_tool init
+    expect 4 "" "$sentence"
+    [ -s "$DB" ]
+}
