@@ -10,6 +10,8 @@ install(FILES
           ${PROJECT_SOURCE_DIR}/include/AccessTokenApi.h
           ${PROJECT_SOURCE_DIR}/include/AccessTokenDefine.h
           ${PROJECT_SOURCE_DIR}/include/AccessTokenUtil.h
+          ${PROJECT_SOURCE_DIR}/include/AccessTokens.h
+          ${PROJECT_SOURCE_DIR}/include/CallLock.h
           ${PROJECT_SOURCE_DIR}/include/vemo-access-token.h
         DESTINATION ${header_dir})
 # The one internal header whose class is exported.

@@ -4,6 +4,7 @@
 
 #include <AccessTokenApi.h>
 #include <AccessTokenUtil.h>
+#include <AccessTokens.h>
 #include <json/json.h>
 #include <vemo-access-token.h>
 
@@ -193,6 +194,23 @@ void deleteTokens()
     showTable();
 }
 
+void withTheClass()
+{
+    typedef AccessTokens::Answer Answer;
+    const AccessTokens tokens;
+    Json::Value jToken;
+    Json::Value jOption = json(R"({"webapi_allow": {"Demo.File": {"method": ["get"]}}})");
+
+    step("The same in C++17, by the class AccessTokens: it tells refusals from failures, and holds the\n"
+         "   lock of all programs meanwhile.");
+    const std::string strTid = tokens.create(0, "demo-class", jOption);
+    CALL(true, Answer::Refused == tokens.grant(strTid, "Demo.File", "delete"));
+    CALL(true, Answer::Granted == tokens.grant(strTid, "Demo.File", "get", &jToken));
+    CALL(true, Answer::Refused == tokens.grant(strTid, "Demo.File", "get"));
+    CALL(false, tokens.revoke(strTid));
+    showTable();
+}
+
 } // namespace
 
 int main()
@@ -206,5 +224,6 @@ int main()
     createUnlimited(strTid);
     purge();
     deleteTokens();
+    withTheClass();
     return g_blAsExpected ? EXIT_SUCCESS : EXIT_FAILURE;
 }

@@ -51,6 +51,7 @@ for line in \
     'VemoAccessTokenDeleteByTid(strUnknown)' \
     'VemoAccessTokenDeleteByBindSid("demo-login-1")' \
     'VemoAccessTokenDeleteByFunction(strFunction)' \
+    'Answer::Granted == tokens.grant(strTid, "Demo.File", "get", &jToken)' \
     'The table: no tokens' \
     'HTTP/1.1 200 OK' \
     'X-Token-User: root' \

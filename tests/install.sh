@@ -24,6 +24,8 @@ diff "$dir/headers" - <<END
 ./AccessTokenApi.h
 ./AccessTokenDefine.h
 ./AccessTokenUtil.h
+./AccessTokens.h
+./CallLock.h
 ./internal/AccessTokenDbApi.h
 ./vemo-access-token.h
 END
@@ -51,4 +53,4 @@ sed -n '/^```cpp$/,/^```$/p' "$readme" | grep -v '^```' >"$dir/example.cpp"
     "-Wl,-rpath,$build/examples" "-L$libdir" "-Wl,-rpath,$libdir" -lvemoaccesstoken -ljsoncpp
 mkdir "$dir/database"
 VEMO_REDIRECT_DIR=$dir/database "$dir/example" | tee "$dir/output"
-grep -xE '    (granted on behalf of root|1 token deleted)' "$readme" | sed 's/^ *//' | diff "$dir/output" -
+grep -xE '    (granted on behalf of user 0|the token is deleted)' "$readme" | sed 's/^ *//' | diff "$dir/output" -

@@ -55,8 +55,12 @@ while read -r name number; do
     fi
 done < <(grep -hoE '\bXr [^ ]+ [1-9]' "${pages[@]}" | cut -d ' ' -f 2- | grep -i '^vemo\|^AccessToken' | sort -u)
 
-echo "Functions (< exported, > in a SYNOPSIS):"
-cut -d ' ' -f 2 "$source/tests/exported-symbols.txt" | c++filt | sort -u | sed 's/(.*//' | sort >"$dir/exported"
+echo "Functions (< exported, or of the class that programs compile themselves; > in a SYNOPSIS):"
+{
+    cut -d ' ' -f 2 "$source/tests/exported-symbols.txt" | c++filt | sort -u | sed 's/(.*//'
+    sed -n '/^public:/,/^private:/p' "$source/include/AccessTokens.h" |
+        sed -nE 's/^    [A-Za-z].* ([A-Za-z]+)\(.*/AccessTokens::\1/p'
+} | sort >"$dir/exported"
 for page in "${functions[@]}"; do
     class=${page%.3}
     grep -q "^\.Vt class $class" "$page" || class=
@@ -129,7 +133,7 @@ echo 'extern "C" void syslog(int, const char*, ...) {}' >log.cc
 
 # The headers that most programs begin with, parsed once.
 cp -r "$source/include" headers
-compile=("$compiler" -std=c++17 -Wall -Wextra -Werror -Iheaders "-I$source/examples" -isystem "$json")
+compile=("$compiler" -std=c++17 -Wall -Wextra -Werror -Iheaders -isystem "$json")
 for header in vemo-access-token.h AccessTokenUtil.h; do
     "${compile[@]}" -x c++-header "headers/$header" -o "headers/$header.gch"
 done

@@ -62,9 +62,12 @@ for path in sorted(pathlib.Path(sys.argv[1]).glob("*.xml")):
         if scope or name.endswith(".h"):
             check(compound, name)
         for member in compound.iter("memberdef"):
+            if member.get("prot") == "private":
+                continue
             name = scope + member.findtext("name")
             check(member, name)
-            if member.get("kind") == "function" and not member.findtext("argsstring").endswith("=delete"):
+            exported = member.get("inline") == "no" and not member.findtext("argsstring").endswith("=delete")
+            if member.get("kind") == "function" and exported:
                 print(name)
 sys.exit(undescribed != 0)
 PYTHON

@@ -1,8 +1,10 @@
-// A program outside of the library's tree: takes a token through its life, through the functions, the
-// service and the store. Prints one line, and ends with status 1 where a step does not do what it should.
+// A program outside of the library's tree: takes tokens through their life, through the functions, the
+// service, the store and the class that it compiles itself. Prints one line, and ends with status 1 where a
+// step does not do what it should.
 
 #include <AccessTokenApi.h>
 #include <AccessTokenUtil.h>
+#include <AccessTokens.h>
 #include <internal/AccessTokenDbApi.h>
 #include <vemo-access-token.h>
 
@@ -55,5 +57,11 @@ int main()
     }
     REQUIRE(1 == VemoAccessTokenDeleteByTid(strTid));
     REQUIRE(0 == VemoAccessTokenDeleteByTid(strTid));
+
+    const AccessTokens tokens;
+    const std::string strOther = tokens.create(uid, strFunction, jOption);
+    REQUIRE(AccessTokens::Answer::Refused == tokens.grant(strOther, "Consumer.Api", "put"));
+    REQUIRE(AccessTokens::Answer::Granted == tokens.grant(strOther, "Consumer.Api", "get"));
+    REQUIRE(tokens.revoke(strOther));
     puts("the life of a token: ok");
 }

@@ -34,7 +34,7 @@ from clang.cindex import Index, TranslationUnit, TypeKind
 FIELD_LIST = re.compile(
     r"#define VEMO_ATOKEN_DATA_MEMBER\(name, type, column, value\)(?P<body>(?:.*\\\n)*.*)\n"
     r'(?P<rest>#include "internal/vemo-access-token-data-member"\n#undef VEMO_ATOKEN_DATA_MEMBER\n)')
-SOURCES = ("src/*.cpp", "platform/*.cpp", "grant/*.cpp", "tools/*.cpp", "examples/CallLock.h")
+SOURCES = ("src/*.cpp", "platform/*.cpp", "grant/*.cpp", "tools/*.cpp", "include/CallLock.h")
 BODIES = (Kind.FUNCTION_DECL, Kind.CXX_METHOD, Kind.CONSTRUCTOR, Kind.DESTRUCTOR, Kind.FUNCTION_TEMPLATE)
 LEAVING = (Kind.BREAK_STMT, Kind.CONTINUE_STMT, Kind.GOTO_STMT, Kind.CXX_FOR_RANGE_STMT)
 LABELS = (Kind.LABEL_STMT, Kind.CASE_STMT, Kind.DEFAULT_STMT)
@@ -418,7 +418,7 @@ class Source:
 def main():
     project, output = (pathlib.Path(argument).resolve() for argument in sys.argv[1:])
     libraries = subprocess.run(["pkg-config", "--cflags", "jsoncpp"], check=True, stdout=subprocess.PIPE)
-    arguments = ["-xc++", "-std=c++17", f"-I{project}", f"-I{project}/include", f"-I{project}/platform", f"-I{project}/examples",
+    arguments = ["-xc++", "-std=c++17", f"-I{project}", f"-I{project}/include", f"-I{project}/platform",
                  '-DVEMO_ATOKEN_VERSION=""', *libraries.stdout.decode().split()]
     view = ["-include", f"{project}/tests/mutation/view.h"]
     mutants = Mutants()

@@ -21,6 +21,7 @@
 
 class CallLock {
 public:
+    // The one lock file. Every program of the machine that uses tokens takes this lock.
     static constexpr const char* FILE_OF_ALL = "/run/vemo-access-token.lock";
 
     // Waits until no other object holds the lock, in this process or another: never hold two. Throws
@@ -52,13 +53,15 @@ public:
         }
     }
 
-    // Unlocks by name: closing would leave the lock to a child that was forked meanwhile.
+    // Lets the next one have it. Unlocks by name: closing would leave the lock to a child that was forked
+    // meanwhile.
     ~CallLock()
     {
         flock(m_nFile, LOCK_UN);
         close(m_nFile);
     }
 
+    // The lock has one owner.
     CallLock(const CallLock&) = delete;
     CallLock& operator=(const CallLock&) = delete;
 
