@@ -1,0 +1,204 @@
+#!/usr/bin/env bats
+# deployment/: what systemd, AppArmor and PAM are given for programs that use tokens, and the tasks of the
+# administrator's. (The units of the gate have a test of their own.)
+
+load common
+
+DEPLOYMENT=$BATS_TEST_DIRNAME/../../deployment
+INCLUDE=$BATS_TEST_DIRNAME/../../include
+CONFIGURED=$(dirname "$TOOL")/../../tools
+SESSION=/usr/vemo/etc/private/session
+LOCK=/run/vemo-access-token.lock
+
+# bin: a directory with the tool that is tested
+bin()
+{
+    mkdir -p "$DIR/bin"
+    ln -sf "$TOOL" "$DIR/bin/vemo-access-token"
+    echo "$DIR/bin"
+}
+
+# task NAME ARGUMENTS...: runs one, as run_tool does the tool
+task()
+{
+    PATH=$(bin):$PATH run --separate-stderr "$DEPLOYMENT/libexec/$1" "${@:2}"
+}
+
+# paths FILE [BEGINNING]: what stands behind that on lines of the file, sorted
+paths()
+{
+    sed -n "s,^ *${2-}/,/,p" "$DEPLOYMENT/$1" | LC_ALL=C sort
+}
+
+@test "the paths are those of the library" {
+    [ "$(sed -n 's/^#define VEMO_ATOKEN_DB_PATH "\(.*\)"$/\1/p' "$INCLUDE/AccessTokenDefine.h")" = "$REAL_DB" ]
+    grep -qF "FILE_OF_ALL = \"$LOCK\";" "$INCLUDE/CallLock.h"
+    [ "$(paths systemd/uses-access-tokens.conf ReadWritePaths=)" = "$(printf '%s\n' $LOCK $SESSION)" ]
+    grep -qx "ReadWritePaths=$SESSION" "$DEPLOYMENT/systemd/vemo-access-token@.service.in"
+    grep -qx "ConditionPathExists=$REAL_DB" "$DEPLOYMENT/systemd/vemo-access-token@.service.in"
+    grep -qx "database=$REAL_DB" "$DEPLOYMENT/libexec/revoke-session.in"
+    [ "$(paths apparmor/vemo-access-token)" = "$(printf '%s,\n' "$LOCK rwk" "$SESSION/ r" "$REAL_DB rwk" \
+        "$REAL_DB-journal rw" "$REAL_DB-shm rwk" "$REAL_DB-wal rw")" ]
+}
+
+@test "systemd has nothing to say against the units, and leaves the tasks little of root's power" {
+    command -v systemd-analyze >/dev/null || skip "systemd-analyze is not installed"
+    local task
+    mkdir "$DIR/units" "$DIR/units/service.service.d"
+    cp "$DEPLOYMENT/systemd/uses-access-tokens.conf" "$DIR/units/service.service.d"
+    printf '[Service]\nExecStart=/bin/true\nProtectSystem=strict\nCapabilityBoundingSet=\n' >"$DIR/units/service.service"
+    for task in backup expiry-notice metrics; do
+        sed "s,^ExecStart=.*/%i$,ExecStart=$(realpath "$DEPLOYMENT")/libexec/%i," \
+            "$CONFIGURED/vemo-access-token@.service" >"$DIR/units/vemo-access-token@$task.service"
+        cp "$DEPLOYMENT/systemd/vemo-access-token-$task.timer" "$DIR/units"
+    done
+    grep -q libexec "$DIR/units/vemo-access-token@backup.service"
+    # It looks up manual pages with man, which need not be there.
+    run systemd-analyze --man=no verify "$DIR"/units/*.service "$DIR"/units/*.timer
+    [ "$output" = "" ]
+    [ "$status" -eq 0 ]
+    run systemd-analyze security --offline=true --threshold=15 --no-pager "$DIR/units/vemo-access-token@backup.service"
+    [ "$status" -eq 0 ]
+    [[ $output == *"Overall exposure level"* ]]
+}
+
+@test "AppArmor takes the abstraction" {
+    command -v apparmor_parser >/dev/null || skip "apparmor_parser is not installed"
+    cp -r /etc/apparmor.d "$DIR/profiles"
+    cp "$DEPLOYMENT/apparmor/vemo-access-token" "$DIR/profiles/abstractions"
+    echo 'include <tunables/global>
+        profile program /usr/bin/program { include <abstractions/base> include <abstractions/vemo-access-token> }' \
+        >"$DIR/profile"
+    apparmor_parser --base "$DIR/profiles" --skip-kernel-load --skip-cache --stdout "$DIR/profile" >"$DIR/compiled"
+    [ -s "$DIR/compiled" ]
+}
+
+# As the drop-in has it for services, on the real path.
+@test "without a capability, root takes a token through its life" {
+    # shellcheck disable=SC2016 # expanded there
+    in_namespace 'mount -t tmpfs tmpfs /run
+        tool=(setpriv --bounding-set=-all --inh-caps=-all --ambient-caps=-all "$1")
+        "${tool[@]}" init && id=$("${tool[@]}" create --uid 0 --function VPN --allow Api) &&
+            "${tool[@]}" grant "$id" Api && "${tool[@]}" doctor' "$TOOL"
+    echo "$output" "${stderr-}"
+    [ "$status" -eq 0 ]
+    [ "${lines[-2]}" = granted ]
+    [ "${lines[-1]}" = "no findings" ]
+}
+
+@test "metrics appear at once, readable for the collector" {
+    a_token >/dev/null
+    mkdir "$DIR/collected"
+    echo old >"$DIR/elsewhere"
+    ln -s "$DIR/elsewhere" "$DIR/collected/vemo-access-token.new"
+    task metrics "$DIR/collected"
+    [ "$status" -eq 0 ]
+    [ "$output$stderr" = "" ]
+    [ "$(stat -c '%n %a' "$DIR"/collected/*)" = "$DIR/collected/vemo-access-token.prom 644" ]
+    tool stats --prometheus | diff "$DIR/collected/vemo-access-token.prom" -
+    [ "$(<"$DIR/elsewhere")" = old ]
+
+    # What cannot be known stays as it was.
+    cp "$DIR/collected/vemo-access-token.prom" "$DIR/before"
+    echo "no database" >"$DB"
+    task metrics "$DIR/collected"
+    [ "$status" -eq 4 ]
+    cmp "$DIR/collected/vemo-access-token.prom" "$DIR/before"
+}
+
+@test "a notice tells of the tokens that expire soon" {
+    a_token --ttl 30d >/dev/null
+    task expiry-notice
+    [ "$status-$output$stderr" = 0- ]
+    a_token --ttl 6d >/dev/null
+    task expiry-notice
+    [ "$status-$stderr" = 0- ]
+    [ "$output" = "<5>tokens that expire within 7d: 1; see vemo-access-token list --expiring 7d" ]
+    rm "$DB"
+    task expiry-notice
+    [ "$status" -eq 4 ]
+    [ "$output" = "" ]
+}
+
+@test "a backup is root's alone, can be imported, and is one of seven" {
+    local id day
+    id=$(a_token)
+    mkdir "$DIR/backups"
+    touch "$DIR/backups/of-mine.jsonl"
+    for day in 1 2 3 4 5 6 7 8; do
+        touch "$DIR/backups/2099-01-0${day}T000000Z.jsonl" # by a clock that went wrong
+    done
+    STATE_DIRECTORY=$DIR/backups task backup
+    [ "$status-$output" = 0- ]
+    local file
+    file=$(echo "$DIR"/backups/20[2-8]*.jsonl)
+    [ "$(echo "$DIR"/backups/*)" = "$(printf "%s " "$file" "$DIR"/backups/2099-01-0{3..8}T000000Z.jsonl)$DIR/backups/of-mine.jsonl" ]
+    [ "$(stat -c %a "$file")" = 600 ]
+    tool revoke --all --yes
+    [ "$(tool import "$file")" = "1 token imported" ]
+    [ "$(tool list --field tid --show-ids)" = "$id" ]
+
+    # Where there is no new one, the old ones stay.
+    rm "$DB"
+    task backup "$DIR/backups"
+    [ "$status" -eq 4 ]
+    [ "$(find "$DIR/backups" -type f | wc -l)" -eq 8 ]
+}
+
+# logout [NAME=VALUE...]: runs the hook as pam_exec does; $told is what it logs
+logout()
+{
+    local hook=$DIR/revoke-session bin
+    bin=$(bin)
+    printf '#!/bin/sh\necho "$@" >>"%s/told"\n' "$DIR" >"$bin/logger"
+    chmod +x "$bin/logger"
+    sed "s,^export PATH=.*,export PATH=$bin:/usr/bin:/bin,; s,^database=.*,database=$DB," "$CONFIGURED/revoke-session" \
+        >"$hook"
+    : >"$DIR/told"
+    run env -i "VEMO_REDIRECT_DIR=$VEMO_REDIRECT_DIR" PAM_SERVICE=sshd PAM_TYPE=close_session XDG_SESSION_ID=42 "$@" \
+        sh "$hook"
+    [ "$status-$output" = 0- ]
+    told=$(<"$DIR/told")
+    echo "told: $told"
+}
+
+@test "the end of a session revokes its tokens, and no others" {
+    local boot others arguments
+    boot=$(</proc/sys/kernel/random/boot_id)
+    logout
+    [ "$told" = "" ] # there is no store
+    others=$(a_token --bind-sid "$boot-421" && a_token --bind-sid 42 && a_token)
+    logout
+    [ "$told" = "" ]
+    a_token --bind-sid "$boot-42" >/dev/null
+    while read -r arguments; do
+        # shellcheck disable=SC2086
+        logout $arguments
+        [ "$told" = "" ]
+        [ "$(sql "SELECT count(*) FROM token")" -eq 4 ]
+    done <<'TABLE'
+PAM_TYPE=open_session
+PAM_TYPE=
+XDG_SESSION_ID=
+XDG_SESSION_ID=42/1
+XDG_SESSION_ID=--all
+XDG_SESSION_ID=43
+PAM_SERVICE=sudo
+TABLE
+    logout
+    [ "$told" = "-t vemo-access-token -p authpriv.info -- session 42: its tokens are revoked" ]
+    [ "$(tool list --field tid --show-ids | sort)" = "$(sort <<<"$others")" ]
+}
+
+@test "the end of a session tells of tokens that it could not revoke, and does not wait for them" {
+    local boot
+    boot=$(</proc/sys/kernel/random/boot_id)
+    a_token --bind-sid "$boot-42" >/dev/null
+    local start=$SECONDS
+    exec 8<>"$VEMO_REDIRECT_DIR.lock"
+    flock 8
+    logout
+    exec 8>&-
+    [ $((SECONDS - start)) -le 6 ]
+    [ "$told" = "-t vemo-access-token -p authpriv.err -- session 42: its tokens may be there still, see vemo-access-token list --bind-sid $boot-42" ]
+}
