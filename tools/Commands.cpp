@@ -1,5 +1,6 @@
 #include "Commands.h"
 
+#include "Audit.h"
 #include "Console.h"
 #include "LogLines.h"
 #include "Masking.h"
@@ -12,6 +13,14 @@ const char* const VERSION_TEXT = "vemo-access-token " VEMO_ATOKEN_VERSION "\n";
 
 const char* const HELP = "print this help and exit";
 const char* const VERSION = "print the version and exit";
+
+// Tells also of changes that are made without opening the store.
+int runAudited(const tool::Command& command)
+{
+    tool::audit::setCommand(command.name());
+    const tool::audit::Teller teller;
+    return command.run();
+}
 
 int printText(const std::string& strText)
 {
@@ -89,7 +98,7 @@ int Commands::run(int nArguments, char** rgArguments)
     }
     command.take();
     const LogLines logLines(m_blVerbose);
-    const int nStatus = command.run();
+    const int nStatus = runAudited(command);
     try {
         flushResult();
     } catch (const Failure& failure) {

@@ -184,6 +184,7 @@ void Store::lock()
 void Store::settleChange()
 {
     g_blChanged = true;
+    audit::made();
     syncDirectory("the change was made, but a power cut can undo it");
 }
 
@@ -205,6 +206,9 @@ void Store::fail(const std::string& strErr)
     }
     // SQLite shortens the file when the change is made already, and can fail of that.
     const bool blPerhaps = m_blCommitting && contains(strErr, "disk I/O error");
+    if (blPerhaps) {
+        audit::made(audit::Certainty::Perhaps);
+    }
     const auto [strFact, strHint] = explained(shownReason(strErr));
     throw Failure(EXIT_STATUS_STORE, strPath + strFact,
                   blPerhaps ? "the change may have been made" : strHint);
@@ -229,12 +233,18 @@ void Store::require(int nResult)
 
 void Store::commit()
 {
-    const bool blChanged = 0 != number("SELECT total_changes()");
-    m_blCommitting = blChanged;
+    const uint64_t nChanges = number("SELECT total_changes()");
+    if (!audit::hasNotes()) {
+        audit::note("changed or deleted", {}, nChanges);
+    }
+    m_blCommitting = 0 != nChanges;
     query("COMMIT");
-    if (blChanged) {
+    if (0 != nChanges) {
         settleChange();
     } else {
+        if (audit::hasNotes()) {
+            audit::made(); // the use of an unlimited token, which changes nothing
+        }
         syncDirectory("a power cut can undo what others changed last");
     }
 }
@@ -307,12 +317,14 @@ std::optional<grant::Token> Store::token(const std::string& strTid)
 void Store::spend(const grant::Token& token)
 {
     withTokens([&token](grant::Tokens& tokens) { tokens.spend(token); });
+    audit::note("granted", token.strTid);
 }
 
 void Store::create(const Json::Value& jToken)
 {
     Json::Value jTokenCopy = jToken;
     require(m_db.tokenCreate(jTokenCopy));
+    audit::note("created", jToken["tid"].asString());
 }
 
 void Store::update(const std::string& strTid, const Json::Value& jChange)
@@ -322,6 +334,7 @@ void Store::update(const std::string& strTid, const Json::Value& jChange)
         strChanges += (strChanges.empty() ? "" : ", ") + equation(strName, jChange[strName]);
     }
     query("UPDATE token SET " + strChanges + " WHERE " + equation("tid", strTid));
+    audit::note("updated", strTid);
 }
 
 // "name='value'", with the value written and quoted as the library does.
@@ -332,19 +345,30 @@ std::string Store::equation(std::string strName, Json::Value jValue)
     return strEquation;
 }
 
-uint64_t Store::count(const Json::Value& jFilter)
+// " WHERE ..." as the library writes it; "" for an empty filter.
+std::string Store::whereOf(const Json::Value& jFilter)
 {
     Json::Value jFilterCopy = jFilter;
     std::string strWhere;
     require(m_db.SqlWhereFromJson(jFilterCopy, strWhere, true));
-    return number("SELECT count(*) FROM token" + (strWhere.empty() ? "" : " WHERE" + strWhere));
+    return strWhere.empty() ? "" : " WHERE" + strWhere;
+}
+
+uint64_t Store::count(const Json::Value& jFilter)
+{
+    return number("SELECT count(*) FROM token" + whereOf(jFilter));
 }
 
 uint64_t Store::remove(const Json::Value& jFilter)
 {
+    std::vector<std::string> strTids;
+    eachRow("SELECT tid FROM token" + whereOf(jFilter) + " ORDER BY tid LIMIT " +
+                std::to_string(audit::PREFIXES_MAX),
+            [&strTids](const Row& row) { strTids.push_back(row[0].value_or("")); });
     Json::Value jFilterCopy = jFilter;
     const int nRemoved = m_db.tokenDelete(jFilterCopy, true);
     require(nRemoved);
+    audit::note("deleted", strTids, static_cast<uint64_t>(nRemoved));
     return static_cast<uint64_t>(nRemoved);
 }
 
@@ -358,7 +382,9 @@ uint64_t Store::removeTid(const std::string& strTid)
 uint64_t Store::purge()
 {
     require(m_db.cleanExpireToken(true));
-    return number("SELECT changes()");
+    const uint64_t nPurged = number("SELECT changes()");
+    audit::note("purged", {}, nPurged);
+    return nPurged;
 }
 
 std::string Store::tableKind()
@@ -421,10 +447,7 @@ std::string Store::queryAsFarAsItGoes(const std::string& strSql, Rows& rows)
 
 void Store::eachTid(const Json::Value& jFilter, const std::function<void(const std::string&)>& take)
 {
-    Json::Value jFilterCopy = jFilter;
-    std::string strWhere;
-    require(m_db.SqlWhereFromJson(jFilterCopy, strWhere, true));
-    eachRow("SELECT tid FROM token" + (strWhere.empty() ? "" : " WHERE" + strWhere),
+    eachRow("SELECT tid FROM token" + whereOf(jFilter),
             [&take](const Row& row) { take(row[0].value_or("")); });
 }
 

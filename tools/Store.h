@@ -18,6 +18,7 @@
 #include <string>
 #include <vector>
 
+#include "Audit.h"
 #include "CallLock.h"
 #include "Masking.h"
 #include "grant/Tokens.h"
@@ -130,10 +131,12 @@ private:
     std::string run(const std::string& strSql, const std::function<void(Row)>& take);
     void require(int nResult);
     bool holdsNull();
+    std::string whereOf(const Json::Value& jFilter);
     std::string equation(std::string strName, Json::Value jValue);
     template <typename Use>
     auto withTokens(Use use);
 
+    audit::Teller m_teller; // the last that goes: the database is closed, and nobody waits for the lock
     const Access m_access;
     std::optional<CallLock> m_lock;
     bool m_blMadeFile = false;

@@ -85,11 +85,25 @@ const char* Log::text()
     return g_szLog;
 }
 
-extern "C" void syslog(int, const char* szFormat, ...)
+extern "C" void vsyslog(int, const char* szFormat, va_list args)
+{
+    const int cch = vsnprintf(g_szLog + g_cchLog, sizeof(g_szLog) - g_cchLog, szFormat, args);
+    g_cchLog = std::min(g_cchLog + static_cast<size_t>(std::max(cch, 0)), sizeof(g_szLog) - 1);
+}
+
+extern "C" void syslog(int nPriority, const char* szFormat, ...)
 {
     va_list args;
     va_start(args, szFormat);
-    const int cch = vsnprintf(g_szLog + g_cchLog, sizeof(g_szLog) - g_cchLog, szFormat, args);
+    vsyslog(nPriority, szFormat, args);
     va_end(args);
-    g_cchLog = std::min(g_cchLog + static_cast<size_t>(std::max(cch, 0)), sizeof(g_szLog) - 1);
+}
+
+// What the tool calls where it is hardened.
+extern "C" void __syslog_chk(int nPriority, int, const char* szFormat, ...)
+{
+    va_list args;
+    va_start(args, szFormat);
+    vsyslog(nPriority, szFormat, args);
+    va_end(args);
 }

@@ -8,7 +8,8 @@
 // this moment. CALL is the name of one of the functions below that ask fails(), with that of the file behind
 // it, if it has one. And of what nobody sees: texts that are wiped from memory go into the file that
 // VEMO_TEST_WIPED names. For each log line, the file that VEMO_TEST_SYSLOG names gets its priority, and
-// "held" or "free": what the lock is then. What is opened to be handed on to other programs ends the tool.
+// "held" or "free": what the lock is then; and of those that tell of changes, which are kept from the log of
+// the machine, the text. What is opened to be handed on to other programs ends the tool.
 
 #include <dirent.h>
 #include <dlfcn.h>
@@ -98,12 +99,20 @@ int lookUp(const char* szFunction, Key key, struct passwd* pEntry, char* szBuffe
 void writeLine(int nPriority, const char* szFormat, va_list args)
 {
     FILE* const pFile = getenv("VEMO_TEST_SYSLOG") ? fopen(getenv("VEMO_TEST_SYSLOG"), "a") : nullptr;
+    const bool blAudit = LOG_AUTHPRIV == (nPriority & LOG_FACMASK);
     if (!pFile) {
-        vsyslog(nPriority, szFormat, args);
+        if (!blAudit) {
+            vsyslog(nPriority, szFormat, args);
+        }
         return;
     }
     const int nLock = open(CallLock::FILE_OF_ALL, O_RDWR | O_CLOEXEC);
-    fprintf(pFile, "%d %s\n", nPriority, 0 == flock(nLock, LOCK_EX | LOCK_NB) ? "free" : "held");
+    fprintf(pFile, "%d %s", nPriority, 0 == flock(nLock, LOCK_EX | LOCK_NB) ? "free" : "held");
+    if (blAudit) {
+        fputc(' ', pFile);
+        vfprintf(pFile, szFormat, args);
+    }
+    fputc('\n', pFile);
     close(nLock);
     fclose(pFile);
 }

@@ -1,0 +1,153 @@
+#!/usr/bin/env bats
+# What the system log tells of changes: who made them, and of which tokens.
+
+load common
+
+# told [CALLER]: the lines so far, without what all of them have: priority, that the lock was free, and the caller;
+# that is who runs the test, or as given
+told()
+{
+    local caller=${1-by uid $(id -u)} login line
+    login=$(cat /proc/self/loginuid 2>/dev/null) || true
+    case $login in
+        '' | 4294967295) caller+=", no login uid" ;;
+        *) caller+=", login uid $login" ;;
+    esac
+    [ -e "$DIR/log" ] || return 0
+    while IFS= read -r line; do
+        [[ $line == "85 free "*"; $caller" ]] || {
+            echo "a line of its own: $line"
+            continue
+        }
+        line=${line#85 free }
+        echo "${line%"; $caller"}"
+    done <"$DIR/log"
+    rm "$DIR/log"
+}
+
+setup_log()
+{
+    unset SUDO_UID
+    export VEMO_TEST_SYSLOG=$DIR/log
+}
+
+@test "each change has its line, and nothing else has one" {
+    setup_log
+    local arguments expected name
+    while IFS='|' read -r arguments expected; do
+        # shellcheck disable=SC2086
+        run_tool $arguments
+        [ "$(told)" = "$expected" ] || {
+            echo "$arguments: $output$stderr"
+            false
+        }
+        case $arguments in
+            init)
+                row token--- "count = 2"
+                row expired- "deadline = 5"
+                ;;
+            "revoke token---")
+                for name in one two three four five six; do
+                    row "$name$ZEROS" "function = '$name'"
+                done
+                ;;
+        esac
+    done <<TABLE
+init|init: the store was changed
+list|
+list --count|
+check token---$ZEROS Api get|
+grant token---$ZEROS Api put|grant: 1 token purged
+grant token---$ZEROS Api put|
+grant token---$ZEROS Api get|grant: 1 token granted (token---...)
+update token--- --unlimited|update: 1 token updated (token---...)
+grant token---$ZEROS Api get|grant: 1 token granted (token---...)
+update unknown- --unlimited|
+export $DIR/lines|
+revoke --all --dry-run|
+revoke token--- token---$ZEROS|revoke: 1 token deleted (token---...)
+revoke token---|
+revoke --function one --yes|revoke: 1 token deleted (one00000...)
+revoke --all --yes|revoke: 5 tokens deleted (five0000..., four0000..., six00000..., three000..., two00000...)
+import $DIR/lines|import: 1 token created (token---...)
+import $DIR/lines|
+create --uid 0 --function VPN --tid created-$ZEROS|create: 1 token created (created-...)
+create --uid 0 --function VPN --tid created-$ZEROS|
+generate|
+init --verbose|
+purge|
+tune --dry-run|
+tune|tune: the store was changed
+doctor|
+TABLE
+}
+
+@test "many tokens are told by their number" {
+    setup_log
+    local name
+    for name in one two three four five six; do
+        row "$name$ZEROS" "deadline = 5"
+    done
+    told >/dev/null
+    tool export "$DIR/lines"
+    tool revoke --all --yes
+    tool import "$DIR/lines"
+    tool doctor --repair
+    tool import "$DIR/lines"
+    tool purge
+    [ "$(told)" = "revoke: 6 tokens deleted
+import: 6 tokens created
+doctor: 6 tokens changed or deleted
+import: 6 tokens created
+purge: 6 tokens purged" ]
+}
+
+@test "who has become root by sudo is told" {
+    setup_log
+    tool init
+    told >/dev/null
+    local uid
+    SUDO_UID=1000 tool create --uid 0 --function VPN --tid "created-$ZEROS"
+    [ "$(told "by uid 1000 (sudo)")" = "create: 1 token created (created-...)" ]
+    for uid in "" root -1 4294967295 4294967296 1000x " 1000" $'1000\nby uid 7'; do
+        SUDO_UID=$uid tool update created- --uses 2
+        [ "$(told)" = "update: 1 token updated (created-...)" ]
+    done
+}
+
+@test "a change is told that is made when the command fails or is ended" {
+    setup_log
+    row token---
+    told >/dev/null
+    VEMO_TEST_SYNC=directory run_tool update token--- --uses 3
+    [ "$status" -eq 4 ]
+    [ "$(told)" = "update: 1 token updated (token---...)" ]
+
+    run bash -c '"$@" >/dev/full' - "$TOOL" create --uid 0 --function VPN --tid "created-$ZEROS"
+    [ "$status" -eq 4 ]
+    [ "$(told)" = "create: 1 token created (created-...)
+create: 1 token deleted (created-...)" ]
+
+    # Somebody has the database open, so it looks for seconds whether the token comes back.
+    run timeout 1 "$TOOL" revoke token--- 8<"$DB"
+    [ "$status" -eq 124 ]
+    [ "$(told)" = "revoke: 1 token deleted (token---...)" ]
+
+    # What is undone is none.
+    row token---
+    sql "CREATE TRIGGER refuse BEFORE DELETE ON token BEGIN SELECT RAISE(ABORT, 'no'); END"
+    run_tool revoke token---
+    [ "$status" -eq 4 ]
+    [ "$(told | grep -v '^a line of its own: 3 ')" = "" ]
+}
+
+@test "a line shows no whole id, and no character that could make two lines of one" {
+    setup_log
+    row short
+    sql "UPDATE token SET tid = 'short'"
+    row odd-----
+    sql "UPDATE token SET tid = char(10) || 'by uid' || tid WHERE tid LIKE 'odd%'"
+    told >/dev/null
+    tool revoke --all --yes
+    [ "$(told)" = 'revoke: 2 tokens deleted (\x0aby uido..., ...)' ]
+}
