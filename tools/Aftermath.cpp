@@ -35,12 +35,6 @@ void waitForClosed(std::vector<std::string>& strOpen, Clock::duration wait)
     }
 }
 
-bool isUndone(const tool::Change& change)
-{
-    tool::Store store(tool::Store::Access::Glance);
-    return change.isUndone(store);
-}
-
 // Looks until who has the database open has closed it, or has had all the time that a call can take; but
 // returns true at once where the change was undone.
 bool isUndoneMeanwhile(const tool::Change& change, std::vector<std::string>& strOpen)
@@ -50,7 +44,7 @@ bool isUndoneMeanwhile(const tool::Change& change, std::vector<std::string>& str
     for (;;) {
         const bool blLast = strOpen.empty() || Clock::now() >= end;
         const auto start = Clock::now();
-        if (isUndone(change)) {
+        if (change.isUndone()) {
             return true;
         }
         if (blLast) {

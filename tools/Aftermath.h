@@ -13,8 +13,8 @@ namespace tool {
 
 // A change that has been made.
 struct Change {
-    // Whether it was undone.
-    std::function<bool(Store&)> isUndone;
+    // Whether it was undone; looks in transactions of its own.
+    std::function<bool()> isUndone;
 
     // Makes it again where it was undone, in a transaction, and returns how often it was.
     std::function<uint64_t(Store&)> makeAgain;

@@ -1,6 +1,34 @@
 #include "Arguments.h"
 
+#include <set>
+
 #include "Console.h"
+#include "Steps.h"
+
+namespace {
+
+// The uids of all owners who are no users, as SQL. No user is looked up while the store is in use: that can
+// take long.
+std::string ownersThatAreGone()
+{
+    std::set<Json::Int64> nUids;
+    for (tool::Steps steps(tool::Store::Access::Glance);
+         steps.next([&nUids](tool::Store&store, const std::string&strThose) {
+             store.eachRow(
+                 "SELECT DISTINCT uid FROM token WHERE typeof(uid) = 'integer' AND " + strThose,
+                 [&nUids](const tool::Row& row) { nUids.insert(strtoll(row[0]->c_str(), nullptr, 10)); });
+         });) {
+    }
+    std::string strUids;
+    for (const Json::Int64 nUid : nUids) {
+        if (!tool::findUserName(nUid)) {
+            strUids += (strUids.empty() ? "" : ", ") + std::to_string(nUid);
+        }
+    }
+    return strUids;
+}
+
+} // namespace
 
 namespace tool {
 
@@ -28,19 +56,54 @@ void addAllowances(Command& command, const std::string& strName, std::vector<All
         strDescription);
 }
 
-Json::Value Selection::filter() const
+bool Selection::empty() const
 {
-    Json::Value jFilter(Json::objectValue);
+    return !nUid && !strFunction && !strSid && !nCreatedBefore && !nCreatedAfter && opens.empty() &&
+           !nExpiring && !blExpired && !blUnlimited && !blNoOwner;
+}
+
+std::string Selection::sql() const
+{
+    std::string strSql = "true";
+    const auto add = [&strSql](const std::string& strCondition) { strSql += " AND " + strCondition; };
     if (nUid) {
-        jFilter["uid"] = *nUid;
+        add("uid = " + std::to_string(*nUid));
     }
     if (strFunction) {
-        jFilter["function"] = *strFunction;
+        add(sqlText("function = %Q", strFunction->c_str()));
     }
     if (strSid) {
-        jFilter["bind_sid"] = *strSid;
+        add(sqlText("bind_sid = %Q", strSid->c_str()));
     }
-    return jFilter;
+    if (nCreatedBefore) {
+        add("create_time < " + std::to_string(*nCreatedBefore));
+    }
+    if (nCreatedAfter) {
+        add("create_time >= " + std::to_string(*nCreatedAfter));
+    }
+    for (const Allowance& allowance : opens) {
+        if (allowance.strMethods.empty()) {
+            add(sqlText("opens(webapi_allow, %Q, '')", allowance.strApi.c_str()));
+        }
+        for (const std::string& strMethod : allowance.strMethods) {
+            add(sqlText("opens(webapi_allow, %Q, %Q)", allowance.strApi.c_str(), strMethod.c_str()));
+        }
+    }
+    const std::string strExpired = grant::SQL_EXPIRED;
+    const std::string strSoon =
+        nExpiring ? "(NOT (" + strExpired +
+                        ") AND deadline - strftime('%s', 'now') <= " + std::to_string(*nExpiring) + ")"
+                  : "false";
+    if (blExpired || nExpiring) {
+        add("(" + (blExpired ? strExpired : "false") + " OR " + strSoon + ")");
+    }
+    if (blUnlimited) {
+        add("count < 0");
+    }
+    if (blNoOwner) {
+        add("uid IN (" + ownersThatAreGone() + ")");
+    }
+    return strSql;
 }
 
 void addSelection(Command& command, Selection& selection)
@@ -49,6 +112,28 @@ void addSelection(Command& command, Selection& selection)
     addUser(command, selection.nUid);
     addParsed(command, "--function", "TAG", selection.strFunction, keep, "those of this purpose");
     addParsed(command, "--bind-sid", "SID", selection.strSid, keep, "those bound to this login session");
+    addParsed(command, "--created-before", "TIME", selection.nCreatedBefore, parseTime,
+              "those made before a time, such as 2026-12-31 or \"2026-12-31 12:00\"");
+    addParsed(command, "--created-after", "TIME", selection.nCreatedAfter, parseTime,
+              "those made then or later");
+    addAllowances(command, "--opens", selection.opens, "those that open these methods, or the API alone");
+    command.flag("--no-owner", selection.blNoOwner, "those whose owner is no user of this machine any more");
+    command.flag("--unlimited", selection.blUnlimited, "those with any number of uses");
+    command.flag("--expired", selection.blExpired, "those whose deadline has passed");
+    addParsed(command, "--expiring", "DURATION", selection.nExpiring, parseDuration,
+              "those that expire within this time; with --expired, these and those");
+}
+
+uint64_t countSelected(const Selection& selection)
+{
+    const std::string strSelected = selection.sql();
+    uint64_t nTokens = 0;
+    Steps steps(Store::Access::Glance);
+    while (steps.next([&](Store& store, const std::string& strThose) {
+        nTokens += store.number("SELECT count(*) FROM token WHERE " + strThose + " AND " + strSelected);
+    })) {
+    }
+    return nTokens;
 }
 
 void addUser(Command& command, std::optional<unsigned int>& nUid)
@@ -79,6 +164,21 @@ void addExtra(Command& command, std::optional<Json::Value>& jExtra)
               "data of your own, a JSON object or a file of one");
 }
 
+void addNote(Command& command, std::optional<std::string>& strNote)
+{
+    const auto keep = [](const std::string& strText) { return strText; };
+    addParsed(command, "--note", "TEXT", strNote, keep, "a note of yours, kept in the data; \"\" for none");
+}
+
+void setNote(Json::Value& jExtra, const std::string& strNote)
+{
+    if (strNote.empty()) {
+        jExtra.removeMember("note");
+    } else {
+        jExtra["note"] = strNote;
+    }
+}
+
 void addTid(Command& command, std::string& strTid)
 {
     command.argument("TID", into(strTid), "the id; \"-\" reads it from standard input");
@@ -104,17 +204,16 @@ std::vector<std::string> readTids(const std::string& strName, const std::string&
             strTids.push_back(strLine);
         }
     }
-    if (strTids.empty()) {
-        throw bad("there is no id on standard input");
-    }
     return strTids;
 }
 
 std::string readTid(const std::string& strName, const std::string& strArgument)
 {
     const std::vector<std::string> strTids = readTids(strName, strArgument);
-    if (strTids.size() > 1) {
-        throw Failure(EXIT_STATUS_USAGE, strName + ": there is more than one id on standard input");
+    if (strTids.size() != 1) {
+        throw Failure(EXIT_STATUS_USAGE, strName + ": there is " +
+                                             (strTids.empty() ? "no" : "more than one") +
+                                             " id on standard input");
     }
     return strTids[0];
 }

@@ -24,16 +24,29 @@ Command::Take notEmptyInto(std::string& strTarget);
 void addAllowances(Command& command, const std::string& strName, std::vector<Allowance>& allowances,
                    const std::string& strDescription);
 
-// Whose tokens, made for what, bound to which session.
+// Which tokens: those that fulfil all that is asked for.
 struct Selection {
     std::optional<unsigned int> nUid;
     std::optional<std::string> strFunction;
     std::optional<std::string> strSid;
+    std::optional<int64_t> nCreatedBefore; // seconds since the epoch
+    std::optional<int64_t> nCreatedAfter;
+    std::vector<Allowance> opens;
+    std::optional<int64_t> nExpiring; // within so many seconds
+    bool blExpired = false;
+    bool blUnlimited = false;
+    bool blNoOwner = false;
 
-    bool empty() const { return !nUid && !strFunction && !strSid; }
-    Json::Value filter() const; // in the library's filter language
+    // Whether it asks for nothing, and so selects all.
+    bool empty() const;
+
+    // As a condition in SQL. To know which owners are gone, it looks at the store and up all users.
+    std::string sql() const;
 };
 void addSelection(Command& command, Selection& selection);
+
+// How many tokens there are of them.
+uint64_t countSelected(const Selection& selection);
 
 // --uid and --user, which exclude each other.
 void addUser(Command& command, std::optional<unsigned int>& nUid);
@@ -46,14 +59,20 @@ void addTtl(Command& command, std::optional<int64_t>& nTtl);
 
 void addExtra(Command& command, std::optional<Json::Value>& jExtra);
 
+// The administrator's note on a token, which stands in its data.
+void addNote(Command& command, std::optional<std::string>& strNote);
+
+// Writes a note into a token's data, an object; "" removes it.
+void setNote(Json::Value& jExtra, const std::string& strNote);
+
 // The argument TID.
 void addTid(Command& command, std::string& strTid);
 
-// The ids that an argument of a name stands for: itself, or for "-" the lines of standard input. Fails
-// when there is none.
+// The ids that an argument of a name stands for: itself, or for "-" the lines of standard input, of which
+// there can be none.
 std::vector<std::string> readTids(const std::string& strName, const std::string& strArgument);
 
-// The same for commands that take one id.
+// The same for commands that take one id. Fails when there is none.
 std::string readTid(const std::string& strName, const std::string& strArgument);
 
 // What is said of an id that no token has.

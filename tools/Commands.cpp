@@ -116,6 +116,7 @@ void addAll(Commands& commands)
     addCheck(commands);
     addGrant(commands);
     addUpdate(commands);
+    addRotate(commands);
     addRevoke(commands);
     addPurge(commands);
     addStats(commands);

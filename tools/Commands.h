@@ -38,6 +38,7 @@ void addShow(Commands& commands);
 void addCheck(Commands& commands);
 void addGrant(Commands& commands);
 void addUpdate(Commands& commands);
+void addRotate(Commands& commands);
 void addRevoke(Commands& commands);
 void addPurge(Commands& commands);
 void addStats(Commands& commands);

@@ -1,15 +1,14 @@
 // create and generate: new tokens, new ids.
 
-#include <csignal>
 #include <ctime>
 #include <memory>
 
 #include "AccessTokenDefine.h"
-#include "AccessTokenUtil.h"
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
-#include "Signals.h"
+#include "Handover.h"
+#include "Layout.h"
 #include "Store.h"
 
 namespace {
@@ -22,19 +21,12 @@ struct Options {
     std::vector<tool::Allowance> allowances;
     std::string strSid;
     std::optional<Json::Value> jExtra;
+    std::optional<std::string> strNote;
     std::optional<std::string> strTid;
+    tool::Layout layout;
 };
 
 const int64_t TTL_DEFAULT = 86400; // the library's
-
-std::string newTid()
-{
-    std::string strTid;
-    if (0 > VEMO_ACCESS_TOKEN::tokenGenerate(strTid)) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, "the kernel gives no random numbers");
-    }
-    return strTid;
-}
 
 std::string ownTid(const std::string& strArgument)
 {
@@ -50,7 +42,7 @@ std::string ownTid(const std::string& strArgument)
 Json::Value recordOf(const Options& options)
 {
     Json::Value jToken;
-    jToken["tid"] = options.strTid ? ownTid(*options.strTid) : newTid();
+    jToken["tid"] = options.strTid ? ownTid(*options.strTid) : tool::newTid();
     jToken["bind_sid"] = options.strSid;
     jToken["uid"] = *options.nUid;
     jToken["create_time"] = Json::Int64{time(nullptr)};
@@ -59,28 +51,10 @@ Json::Value recordOf(const Options& options)
     jToken["function"] = options.strFunction;
     jToken["webapi_allow"] = tool::allowanceJson(options.allowances);
     jToken["extra"] = options.jExtra.value_or(Json::Value(Json::objectValue));
-    return jToken;
-}
-
-// Deletes a token whose id nobody got to know. Returns what to say of that; "" when there was none.
-std::string takeBack(const std::string& strTid)
-{
-    const std::string strChange = tool::Store::hasChanged() ? "was made" : "may have been made";
-    try {
-        tool::Store store(tool::Store::Access::Write);
-        const bool blThere = 0 != store.removeTid(strTid);
-        store.commit();
-        return blThere ? "the token was taken back" : "";
-    } catch (const tool::Failure& failure) {
-        return "the change " + strChange + ", and cannot be taken back: " + failure.fact();
+    if (options.strNote) {
+        tool::setNote(jToken["extra"], *options.strNote);
     }
-}
-
-volatile sig_atomic_t g_nSignal = 0; // that came since the token was created
-
-void noteSignal(int nSignal)
-{
-    g_nSignal = nSignal;
+    return jToken;
 }
 
 // Writes the token, but for the end of the transaction.
@@ -95,19 +69,6 @@ std::unique_ptr<tool::Store> prepare(const Json::Value& jToken)
     return pStore;
 }
 
-// Commits, and prints the id of a token that is there now.
-void complete(std::unique_ptr<tool::Store> pStore, const std::string& strLine)
-{
-    pStore->commit();
-    pStore.reset();
-    if (g_nSignal) {
-        throw tool::Failure(tool::EXIT_STATUS_STORE, "interrupted");
-    }
-    signal(SIGPIPE, SIG_IGN); // for write() to fail, where nobody reads
-    tool::print(strLine);
-    tool::flushResult(); // a signal ends the wait for who reads it
-}
-
 int create(const Options& options)
 {
     if (!options.nUid) {
@@ -115,23 +76,13 @@ int create(const Options& options)
     }
     const Json::Value jToken = recordOf(options);
     const std::string strTid = jToken["tid"].asString();
-    const std::string strLine = tool::resultLine(strTid); // now, when a lack of memory does no harm yet
-    auto pStore = prepare(jToken);
-    tool::handleEndingSignals(noteSignal);
-    try {
-        complete(std::move(pStore), strLine);
-    } catch (const tool::LockedFailure&) {
-        throw; // there is no token
-    } catch (const tool::Failure& failure) {
-        const std::string strDone = takeBack(strTid);
-        if (!g_nSignal) {
-            throw tool::Failure(failure.status(), failure.fact(), strDone);
-        }
-        tool::complain(strDone.empty() ? "interrupted" : "interrupted; " + strDone);
-    }
-    if (g_nSignal) {
-        raise(g_nSignal);
-    }
+    // Now, when a lack of memory does no harm yet.
+    const std::string strResult = tool::Layout::Form::Table == options.layout.form
+                                      ? tool::resultLine(strTid)
+                                      : tool::recordText(jToken, options.layout.form);
+    tool::handOver(prepare(jToken), strResult, [&strTid](tool::Store& store) {
+        return 0 == store.removeTid(strTid) ? "" : "the token was taken back";
+    });
     return tool::EXIT_STATUS_DONE;
 }
 
@@ -153,9 +104,11 @@ void addCreate(Commands& commands)
     addAllowances(command, "--allow", pOptions->allowances, "an API, and methods of it, that it opens");
     command.option("--bind-sid", "SID", into(pOptions->strSid), "bind it to this login session");
     addExtra(command, pOptions->jExtra);
+    addNote(command, pOptions->strNote);
     const auto keep = [](const std::string& strText) { return strText; };
     addParsed(command, "--tid", "TID", pOptions->strTid, keep,
               "an id of your own; \"-\" reads it from standard input");
+    addForm(command, pOptions->layout);
 }
 
 void addGenerate(Commands& commands)

@@ -8,7 +8,7 @@
 #include "AccessTokenDefine.h"
 #include "Examination.h"
 #include "Masking.h"
-#include "Store.h"
+#include "Steps.h"
 
 namespace {
 
@@ -107,11 +107,15 @@ std::string lacking(const std::map<std::string, std::string>& strDefinitions,
 }
 
 // Ids are unique in the library's table, so only in another there can be two of the same.
-void examineDuplicates(Store& store, Findings& findings)
+void examineDuplicates(Findings& findings)
 {
     tool::TokenNames names;
-    store.eachRow("SELECT tid FROM token GROUP BY tid HAVING count(*) > 1",
-                  [&](const tool::Row& row) { names.add(row[0]); });
+    tool::Steps steps(Store::Access::Glance);
+    while (steps.next([&](Store& step, const std::string& strThose) {
+        step.eachRow("SELECT tid FROM token WHERE " + strThose + " GROUP BY tid HAVING count(*) > 1",
+                     [&](const tool::Row& row) { names.add(row[0]); });
+    })) {
+    }
     if (names.count()) {
         findings.push_back({Finding::Severity::Error,
                             "several tokens of the same id: " + names.text(),
@@ -147,7 +151,7 @@ void examineColumns(Store& store, Findings& findings)
          "calls can fail, spend no use, report what did not happen, or take one token for another",
          tool::REMEDY_SAVE_AND_REPLACE,
          {}});
-    examineDuplicates(store, findings);
+    examineDuplicates(findings);
 }
 
 // Finds what a query names, of a kind that can be dropped.

@@ -4,10 +4,11 @@
 
 #include "AccessTokenDefine.h"
 #include "AccessTokenUtil.h"
+#include "Arguments.h"
 #include "Examination.h"
 #include "Failure.h"
 #include "Json.h"
-#include "Store.h"
+#include "Steps.h"
 
 namespace {
 
@@ -27,7 +28,8 @@ struct Check {
     std::string strWhat; // in front of the tokens
     std::string strMeaning;
     std::string strRemedy;
-    std::string strRepair; // the statement that repairs it; empty where an administrator must decide
+    std::string strRepair;        // the statement that repairs them; empty where an administrator must decide
+    std::string strRepaired = {}; // which of them; empty: all
 };
 
 bool isAny(const Json::Value&)
@@ -73,7 +75,7 @@ Check nulls()
             "a NULL in ",
             "such a token cannot be read or granted, and every listing that meets it fails",
             "delete them: vemo-access-token doctor --repair",
-            "DELETE FROM token WHERE " + anyNull()};
+            "DELETE FROM token"};
 }
 
 Check numbers()
@@ -100,7 +102,7 @@ Check texts()
             "bytes where there should be a text in ",
             "no look-up by that field finds such a token",
             "make texts of them: vemo-access-token doctor --repair",
-            "UPDATE token SET " + strTexts + " WHERE " + strWhere};
+            "UPDATE token SET " + strTexts};
 }
 
 Check users()
@@ -173,14 +175,17 @@ Check backlog()
             "expired for more than an hour: ",
             "no program has called since, or its purges fail",
             "vemo-access-token purge",
-            std::string("DELETE FROM token WHERE deadline > 0 AND ") + grant::SQL_EXPIRED};
+            "DELETE FROM token",
+            std::string("deadline > 0 AND ") + grant::SQL_EXPIRED};
 }
 
-void execute(const std::string& strSql)
+void execute(const std::string& strStatement, const std::string& strWhere)
 {
-    Store store(Store::Access::Write);
-    store.query(strSql);
-    store.commit();
+    tool::Steps steps(Store::Access::Write);
+    while (steps.next([&](Store& store, const std::string& strThose) {
+        store.query(strStatement + " WHERE " + strThose + " AND " + strWhere);
+    })) {
+    }
 }
 
 // Whatever is wrong with the table takes part in a repair, so it goes first.
@@ -188,7 +193,10 @@ void report(const Check& check, const TokenNames& names, bool blTableSound, Find
 {
     Finding finding = {check.severity, check.strWhat + names.text(), check.strMeaning, check.strRemedy, {}};
     if (!check.strRepair.empty() && blTableSound) {
-        finding.repair = [strSql = check.strRepair] { execute(strSql); };
+        finding.repair = [strRepair = check.strRepair,
+                          strWhere = check.strRepaired.empty() ? check.strWhere : check.strRepaired] {
+            execute(strRepair, strWhere);
+        };
     } else if (!check.strRepair.empty()) {
         finding.strRemedy = "when the table is mended: " + finding.strRemedy;
     }
@@ -196,7 +204,7 @@ void report(const Check& check, const TokenNames& names, bool blTableSound, Find
 }
 
 // All in one pass over the table, and another for each finding.
-void examineRows(Store& store, bool blTableSound, Findings& findings)
+void examineRows(bool blTableSound, Findings& findings)
 {
     const std::vector<Check> checks = {nulls(),     numbers(),  texts(),    users(),     unnamed(),
                                        shortened(), cutTexts(), purposes(), deadlines(), backlog()};
@@ -204,13 +212,21 @@ void examineRows(Store& store, bool blTableSound, Findings& findings)
     for (const Check& check : checks) {
         strSql += (strSql.empty() ? "SELECT max(" : ", max(") + check.strWhere + ")";
     }
-    const tool::Row isThere = store.query(strSql + " FROM token")[0];
+    std::vector<TokenNames> names(checks.size());
+    tool::Steps steps(Store::Access::Glance);
+    while (steps.next([&](Store& store, const std::string& strThose) {
+        const tool::Row isThere = store.query(strSql + " FROM token WHERE " + strThose)[0];
+        for (size_t i = 0; i < checks.size(); ++i) {
+            if (isThere[i] == "1") {
+                store.eachRow("SELECT tid FROM token WHERE " + strThose + " AND " + checks[i].strWhere,
+                              [&](const tool::Row& row) { names[i].add(row[0]); });
+            }
+        }
+    })) {
+    }
     for (size_t i = 0; i < checks.size(); ++i) {
-        if (isThere[i] == "1") {
-            TokenNames names;
-            store.eachRow("SELECT tid FROM token WHERE " + checks[i].strWhere,
-                          [&names](const tool::Row& row) { names.add(row[0]); });
-            report(checks[i], names, blTableSound, findings);
+        if (names[i].count()) {
+            report(checks[i], names[i], blTableSound, findings);
         }
     }
 }
@@ -257,14 +273,20 @@ void judge(const tool::ObjectReader& reader, const tool::Row& row, Objects& obje
     }
 }
 
-void examineObjects(Store& store, Findings& findings)
+void examineObjects(Findings& findings)
 {
     const tool::ObjectReader reader;
     Objects objects;
-    store.eachRow("SELECT tid, webapi_allow, extra FROM token WHERE (webapi_allow <> '{}' OR extra <> '{}') "
-                  "AND NOT " +
-                      anyNull(),
-                  [&](const tool::Row& row) { judge(reader, row, objects); });
+    tool::Steps steps(Store::Access::Glance);
+    tool::Rows rows;
+    while (steps.next([&](Store& store, const std::string& strThose) {
+        rows = store.query("SELECT tid, webapi_allow, extra FROM token WHERE " + strThose +
+                           " AND (webapi_allow <> '{}' OR extra <> '{}') AND NOT " + anyNull());
+    })) {
+        for (const tool::Row& row : rows) {
+            judge(reader, row, objects);
+        }
+    }
     const auto add = [&](const TokenNames& names, Finding::Severity severity, const std::string& strWhat,
                          const std::string& strMeaning, const std::string& strRemedy) {
         if (names.count()) {
@@ -289,9 +311,10 @@ void examineObjects(Store& store, Findings& findings)
         "revoke them, or update --allow and --extra");
 }
 
-void examineSpeed(Store& store, Findings& findings)
+void examineSpeed(Findings& findings)
 {
-    const uint64_t nTokens = store.number("SELECT count(*) FROM token");
+    const uint64_t nTokens = tool::countSelected({});
+    Store store(Store::Access::Glance);
     const std::string strIndexed =
         "SELECT count(*) FROM pragma_index_list('token') AS list, "
         "pragma_index_info(list.name) AS info WHERE info.seqno = 0 AND info.name = 'deadline'";
@@ -310,14 +333,9 @@ namespace tool {
 
 void examineTokens(bool blTableSound, Findings& findings)
 {
-    {
-        Store store(Store::Access::Read);
-        examineRows(store, blTableSound, findings);
-        examineSpeed(store, findings);
-    }
-    // In a transaction of its own: at a million tokens each takes seconds, and programs wait for 5.
-    Store store(Store::Access::Read);
-    examineObjects(store, findings);
+    examineRows(blTableSound, findings);
+    examineSpeed(findings);
+    examineObjects(findings);
 }
 
 } // namespace tool

@@ -1,6 +1,5 @@
 // export: writes all tokens as JSON lines and an end, for backups and for moving to another machine.
 
-#include <map>
 #include <memory>
 
 #include "AccessTokenDefine.h"
@@ -13,129 +12,140 @@
 #include "Masking.h"
 #include "NewFile.h"
 #include "Progress.h"
-#include "Store.h"
+#include "Steps.h"
 #include "Values.h"
 
 namespace {
 
 struct Options {
+    tool::Selection selection;
     std::string strFile = "-";
 };
 
-// Why tokens cannot be exported, by their ids: an import would not make them what they are.
-typedef std::map<std::string, std::string> Flaws;
-
-Flaws findFlaws(tool::Store& store)
+// In SQL, why a token cannot be exported: an import would not make it what it is.
+std::string flawInSql()
 {
-    Flaws flaws;
+    std::string strSql = "CASE";
     for (const std::string& strName : tool::fieldNames()) {
-        const auto add = [&](const tool::Rows& tids, const std::string& strReason) {
-            for (const auto& row : tids) {
-                flaws.emplace(row[0].value_or(""), "\"" + strName + "\" " + strReason);
-            }
-        };
-        const auto select = [&](const std::string& strWhat, const std::string& strWhere) {
-            return store.query("SELECT " + strWhat + " FROM token WHERE " + strWhere);
+        const auto add = [&](const std::string& strCondition, const std::string& strFlaw) {
+            strSql += " WHEN " + strCondition + " THEN '\"" + strName + "\" " + strFlaw + "'";
         };
         const Json::Value& jDefault = VEMO_ACCESS_TOKEN::tokenType()[strName][1];
         if (jDefault.isIntegral()) {
-            add(select("tid", "typeof(" + strName + ") <> 'integer'"), "is no whole number");
+            add("typeof(" + strName + ") <> 'integer'", "is no whole number");
             continue;
         }
-        add(select("tid", "instr(" + strName + ", char(0))"), "holds a NUL character");
+        add("instr(" + strName + ", char(0))", "holds a NUL character");
         if (jDefault.isString()) {
-            add(select("tid", "typeof(" + strName + ") <> 'text'"), "is no text");
-            continue;
-        }
-        for (const auto& row : select("tid, " + strName, strName + " <> '{}'")) {
-            const std::string strFlaw = tool::flawOfStored(row[1].value_or(""));
-            if (!strFlaw.empty()) {
-                add({row}, strFlaw);
-            }
+            add("typeof(" + strName + ") <> 'text'", "is no text");
         }
     }
-    return flaws;
+    return strSql + " ELSE '' END";
 }
 
-// The tokens of the store, and why some of them are not exported.
-struct Contents {
-    Json::Value jTokens;
-    Flaws flaws;
+// The fields that hold JSON.
+std::vector<std::string> objectNames()
+{
+    std::vector<std::string> strNames;
+    for (const std::string& strName : tool::fieldNames()) {
+        if (VEMO_ACCESS_TOKEN::tokenType()[strName][1].isObject()) {
+            strNames.push_back(strName);
+        }
+    }
+    return strNames;
+}
+
+struct Token {
+    Json::Value jToken;
+    std::string strFlaw;
 };
 
-Contents readStore()
-{
-    tool::Store store(tool::Store::Access::Read);
-    Json::Value jTokens = store.tokens(Json::Value(Json::objectValue));
-    return {std::move(jTokens), findFlaws(store)};
-}
+struct Exported {
+    uint64_t nTokens = 0;
+    uint64_t nLeftOut = 0;
+};
 
-// Writes a line for each token and, behind all of them, the end. Returns how many lines of tokens there are.
+// Writes a line for each token and, behind all of them, the end.
 template <typename Write>
-size_t writeLines(const Contents& contents, bool blProgress, Write write)
+Exported writeLines(const tool::Selection& selection, bool blProgress, Write write)
 {
-    tool::Progress progress("Exporting", contents.jTokens.size(), blProgress);
+    tool::Progress progress(
+        "Exporting", [&selection] { return tool::countSelected(selection); }, blProgress);
+    const std::string strSelected = selection.sql();
+    const std::vector<std::string> strObjects = objectNames();
+    std::string strColumns = ", " + flawInSql();
+    for (const std::string& strObject : strObjects) {
+        strColumns += ", " + strObject;
+    }
     tool::ExportEnd end;
-    size_t nTokens = 0;
-    for (const Json::Value& jToken : contents.jTokens) {
-        if (!contents.flaws.count(jToken["tid"].asString())) {
-            const std::string strLine = tool::compactJson(jToken) + "\n";
-            end.add(strLine);
-            write(strLine);
-            ++nTokens;
+    Exported exported;
+    std::vector<Token> tokens;
+    const auto take = [&](Json::Value jToken, const tool::Row& columns) {
+        std::string strFlaw = *columns[0];
+        for (size_t i = 0; strFlaw.empty() && i < strObjects.size(); ++i) {
+            const std::string strText = tool::flawOfStored(*columns[i + 1]);
+            strFlaw = strText.empty() ? "" : "\"" + strObjects[i] + "\" " + strText;
         }
-        progress.step();
+        tokens.push_back({std::move(jToken), strFlaw});
+    };
+    tool::Steps steps(tool::Store::Access::Glance);
+    while (steps.next([&](tool::Store& store, const std::string& strThose) {
+        store.eachToken(strThose + " AND " + strSelected, strColumns, take);
+    })) {
+        for (const Token& token : tokens) {
+            if (token.strFlaw.empty()) {
+                const std::string strLine = tool::compactJson(token.jToken) + "\n";
+                end.add(strLine);
+                write(strLine);
+                ++exported.nTokens;
+            } else {
+                tool::complain("token " + tool::masked(token.jToken["tid"].asString()) +
+                               " cannot be exported: " + token.strFlaw);
+                ++exported.nLeftOut;
+            }
+            progress.step();
+        }
+        tokens.clear();
     }
-    if (contents.flaws.empty()) {
-        write(tool::compactJson(end.json(nTokens)) + "\n");
+    if (0 == exported.nLeftOut) {
+        write(tool::compactJson(end.json(exported.nTokens)) + "\n");
     }
-    return nTokens;
+    return exported;
 }
 
-size_t print(const Contents& contents)
+Exported print(const tool::Selection& selection)
 {
     // On one terminal the two would get mixed.
     const bool blProgress = !tool::isTerminal(tool::resultStream());
-    const size_t nTokens = writeLines(contents, blProgress, tool::print);
+    const Exported exported = writeLines(selection, blProgress, tool::print);
     tool::flushResult();
-    return nTokens;
+    return exported;
 }
 
-size_t save(const Contents& contents, const std::string& strFile)
+Exported save(const tool::Selection& selection, const std::string& strFile)
 {
     tool::NewFile file(strFile);
     const auto write = [&file](const std::string& strText) { file.write(strText); };
-    const size_t nTokens = writeLines(contents, true, write);
-    file.complete();
-    return nTokens;
-}
-
-// The sentence about an export that lacks the tokens with flaws.
-tool::Failure notWhole(const Contents& contents, const std::string& strExported,
-                       const std::string& strMeaning)
-{
-    return tool::Failure(tool::EXIT_STATUS_STORE,
-                         strExported + " exported; without " +
-                             tool::countText(contents.flaws.size(), "token") + ", " + strMeaning,
-                         "\"sqlite3 " VEMO_ATOKEN_DB_PATH " '.backup FILE'\" keeps all");
+    const Exported exported = writeLines(selection, true, write);
+    if (0 == exported.nLeftOut) {
+        file.complete();
+    }
+    return exported;
 }
 
 int exportTokens(const Options& options)
 {
-    const Contents contents = readStore();
-    for (const auto& [strTid, strFlaw] : contents.flaws) {
-        tool::complain("token " + tool::masked(strTid) + " cannot be exported: " + strFlaw);
-    }
     const bool blPrint = options.strFile == "-";
-    if (!blPrint && !contents.flaws.empty()) {
-        throw notWhole(contents, "nothing", "the file would not be whole");
+    const Exported exported = blPrint ? print(options.selection) : save(options.selection, options.strFile);
+    const std::string strTokens = tool::countText(exported.nTokens, "token");
+    if (exported.nLeftOut) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE,
+                            (blPrint ? strTokens : "nothing") + " exported; without " +
+                                tool::countText(exported.nLeftOut, "token") + ", " +
+                                (blPrint ? "the export has no end" : "the file would not be whole"),
+                            "\"sqlite3 " VEMO_ATOKEN_DB_PATH " '.backup FILE'\" keeps all");
     }
-    const size_t nTokens = blPrint ? print(contents) : save(contents, options.strFile);
-    const std::string strExported = tool::countText(nTokens, "token");
-    if (!contents.flaws.empty()) {
-        throw notWhole(contents, strExported, "the export has no end");
-    }
-    tool::complain(strExported + " exported");
+    tool::complain(strTokens + " exported");
     return tool::EXIT_STATUS_DONE;
 }
 
@@ -150,6 +160,7 @@ void addExport(Commands& commands)
                                     [pOptions] { return exportTokens(*pOptions); });
     command.optionalArgument("FILE", notEmptyInto(pOptions->strFile),
                              "the file, of mode 0600; without it, standard output");
+    addSelection(command, pOptions->selection);
 }
 
 } // namespace tool

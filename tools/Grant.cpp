@@ -73,28 +73,57 @@ std::string owner(int64_t nUid)
     }
 }
 
-// In one transaction with the look-up, so that no other grant spends the same use. Returns the owner.
-int64_t spendUse(const std::string& strTid, const Options& options)
+struct Outcome {
+    grant::Verdict verdict;
+    int64_t nUid;
+    Json::Value jToken; // but for its id, where it is granted and asked for
+};
+
+// In one transaction with the look-up, so that no other grant spends the same use.
+Outcome spendUse(const std::string& strTid, const Options& options)
 {
     tool::Store store(tool::Store::Access::Write);
     std::optional<grant::Token> token = store.token(strTid);
-    const grant::Verdict verdict = judge(token, options);
+    Outcome outcome = {judge(token, options), token ? token->nUid : 0, {}};
+    if (grant::Verdict::Granted == outcome.verdict && tool::Layout::Form::Table != options.layout.form) {
+        outcome.jToken = *store.find(strTid);
+        outcome.jToken.removeMember("tid");
+    }
     store.purge();
-    if (grant::Verdict::Granted == verdict) {
+    if (grant::Verdict::Granted == outcome.verdict) {
         store.spend(*token);
     }
     store.commit();
-    if (grant::Verdict::Granted != verdict) {
-        throw tool::Failure(tool::EXIT_STATUS_REFUSED, std::string("refused: ") + reasonOf(verdict));
+    return outcome;
+}
+
+int printOutcome(const Outcome& outcome, const Options& options)
+{
+    const bool blGranted = grant::Verdict::Granted == outcome.verdict;
+    Json::Value jResult;
+    jResult["granted"] = blGranted;
+    jResult["reason"] = reasonOf(outcome.verdict);
+    if (blGranted) {
+        jResult["token"] = outcome.jToken;
     }
-    return token->nUid;
+    if (blGranted && options.blPrintUser) {
+        jResult["user"] = owner(outcome.nUid);
+    }
+    tool::print(tool::compactJson(jResult) + "\n");
+    return blGranted ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_REFUSED;
 }
 
 int grantCall(const Options& options)
 {
-    const int64_t nUid = spendUse(tool::readTid("TID", options.strTid), options);
+    const Outcome outcome = spendUse(tool::readTid("TID", options.strTid), options);
+    if (tool::Layout::Form::Table != options.layout.form) {
+        return printOutcome(outcome, options);
+    }
+    if (grant::Verdict::Granted != outcome.verdict) {
+        throw tool::Failure(tool::EXIT_STATUS_REFUSED, std::string("refused: ") + reasonOf(outcome.verdict));
+    }
     if (options.blPrintUser) {
-        tool::printLine(owner(nUid));
+        tool::printLine(owner(outcome.nUid));
     } else {
         tool::print("granted\n");
     }
@@ -130,6 +159,7 @@ void addGrant(Commands& commands)
                                     [pOptions] { return grantCall(*pOptions); });
     addCall(command, *pOptions);
     command.flag("--print-user", pOptions->blPrintUser, "print the owner's name");
+    addForm(command, pOptions->layout);
 }
 
 } // namespace tool

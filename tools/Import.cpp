@@ -1,11 +1,14 @@
-// import: creates the tokens of files that export wrote; all of a file or none.
+// import: creates the tokens of files that export wrote; all of a file or none, or in steps.
 
 #include <cerrno>
+#include <chrono>
 #include <cstring>
 #include <ctime>
+#include <functional>
 #include <iostream>
 #include <map>
 #include <memory>
+#include <thread>
 
 #include "AccessTokenUtil.h"
 #include "Arguments.h"
@@ -20,8 +23,15 @@
 
 namespace {
 
+// What one transaction takes: it holds others up for less than half a second.
+const size_t TOKENS_AT_ONCE = 10000;
+const size_t TOKENS_OF_A_STEP = 2000;
+const std::chrono::milliseconds BETWEEN_STEPS(12); // programs that wait try each 10 ms
+
 struct Options {
     bool blPartial = false;
+    bool blSkipExisting = false;
+    bool blInSteps = false;
     std::vector<std::string> strFiles;
 };
 
@@ -31,11 +41,13 @@ struct Line {
     Json::Value jToken;
 };
 
-// The tokens of a file, and why it is no whole export; "" when it is one.
+// How a file was read: how many tokens it has, and why it is no whole export; "" when it is one.
 struct Contents {
-    std::vector<Line> lines;
+    uint64_t nTokens = 0;
     std::string strFlaw = "the export has no end";
 };
+
+typedef std::function<void(Line line)> Take;
 
 [[noreturn]] void failOnReading(const std::string& strFile)
 {
@@ -103,10 +115,9 @@ bool isCutOff(const std::string& strText)
     }
 }
 
-Contents readLines(std::istream& stream, const std::string& strFile)
+Contents readLines(std::istream& stream, const std::string& strFile, const Take& take)
 {
     Contents contents;
-    std::map<std::string, size_t> lineOf;
     tool::ExportEnd end;
     bool blEnded = false;
     std::string strText;
@@ -123,19 +134,16 @@ Contents readLines(std::istream& stream, const std::string& strFile)
                 break;
             }
             if (strText.find_first_not_of(" \t\r") != std::string::npos) {
-                const Json::Value jLine = objectOf(strText);
+                Json::Value jLine = objectOf(strText);
                 if (tool::ExportEnd::is(jLine)) {
-                    const std::string strFlaw = end.flawOf(jLine, contents.lines.size());
+                    const std::string strFlaw = end.flawOf(jLine, contents.nTokens);
                     contents.strFlaw = strFlaw.empty() ? "" : lineText(nLine, strFlaw);
                     blEnded = true;
                     continue;
                 }
                 checkRecord(jLine);
-                const auto [pFirst, blNew] = lineOf.emplace(jLine["tid"].asString(), nLine);
-                if (!blNew) {
-                    throw tool::BadValue("has the id of line " + std::to_string(pFirst->second));
-                }
-                contents.lines.push_back({nLine, jLine});
+                take({nLine, std::move(jLine)});
+                ++contents.nTokens;
             }
             end.add(strText + "\n");
         } catch (const tool::BadValue& bad) {
@@ -145,11 +153,11 @@ Contents readLines(std::istream& stream, const std::string& strFile)
     return contents;
 }
 
-Contents readStream(std::istream& stream, const std::string& strFile)
+Contents readStream(std::istream& stream, const std::string& strFile, const Take& take)
 {
     try {
         stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts a line short
-        Contents contents = readLines(stream, strFile);
+        const Contents contents = readLines(stream, strFile, take);
         if (!ferror(stdin)) {
             return contents;
         }
@@ -163,53 +171,131 @@ std::string nameOf(const std::string& strFile)
     return strFile == "-" ? "standard input" : tool::shownPath(strFile);
 }
 
-Contents readFile(const std::string& strFile)
+Contents readFile(const std::string& strFile, const Take& take)
 {
     if (strFile == "-") {
-        return readStream(std::cin, nameOf(strFile));
+        return readStream(std::cin, nameOf(strFile), take);
     }
     try {
         tool::InputFile file(strFile);
-        return readStream(file, nameOf(strFile));
+        return readStream(file, nameOf(strFile), take);
     } catch (const tool::BadValue& bad) {
         throw tool::Failure(tool::EXIT_STATUS_USAGE, bad.what());
     }
 }
 
-// Returns how many of them have expired.
-size_t createTokens(const std::vector<Line>& lines, const std::string& strFile)
+// What became of the tokens of a file.
+struct Imported {
+    uint64_t nCreated = 0;
+    uint64_t nSkipped = 0;
+    uint64_t nExpired = 0; // of those that were created
+};
+
+// In one transaction. Those that are there already are left as they are, or make it fail.
+void createTokens(const std::vector<Line>& lines, const std::string& strFile, bool blSkip,
+                  tool::Progress& progress, Imported& imported)
 {
-    tool::Progress progress("Importing", lines.size());
+    Imported now;
     tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
-    size_t nExpired = 0;
     for (const Line& line : lines) {
-        Json::Value jFilter;
-        jFilter["tid"] = line.jToken["tid"];
-        if (!store.tokens(jFilter).empty()) {
+        if (!store.has(line.jToken["tid"].asString())) {
+            store.create(line.jToken);
+            ++now.nCreated;
+            now.nExpired += line.jToken["deadline"].asInt64() < time(nullptr);
+        } else if (blSkip) {
+            ++now.nSkipped;
+        } else {
             throw badLine(nameOf(strFile), line.nNumber, "has the id of a token that is there already");
         }
-        store.create(line.jToken);
-        nExpired += line.jToken["deadline"].asInt64() < time(nullptr);
         progress.step();
     }
     store.commit();
-    return nExpired;
+    imported.nCreated += now.nCreated;
+    imported.nSkipped += now.nSkipped;
+    imported.nExpired += now.nExpired;
 }
 
-void importFile(const std::string& strFile, bool blPartial)
+void requireWhole(const Contents& contents, const std::string& strFile, const Options& options)
 {
-    const Contents contents = readFile(strFile);
-    const std::vector<Line>& lines = contents.lines;
-    if (!contents.strFlaw.empty() && !blPartial) {
+    if (!contents.strFlaw.empty() && !options.blPartial) {
         throw badFile(nameOf(strFile), contents.strFlaw, "--partial imports what is there");
     }
-    const size_t nExpired = createTokens(lines, strFile);
-    tool::print(tool::countText(lines.size(), "token") + " imported\n");
+}
+
+Contents importAtOnce(const std::string& strFile, const Options& options, Imported& imported)
+{
+    std::vector<Line> lines;
+    std::map<std::string, size_t> lineOf;
+    const Contents contents = readFile(strFile, [&](Line line) {
+        const auto [pFirst, blNew] = lineOf.emplace(line.jToken["tid"].asString(), line.nNumber);
+        if (!blNew) {
+            throw tool::BadValue("has the id of line " + std::to_string(pFirst->second));
+        }
+        if (lines.size() == TOKENS_AT_ONCE) {
+            throw badFile(nameOf(strFile),
+                          "more than " + std::to_string(TOKENS_AT_ONCE) +
+                              " tokens would hold all programs up",
+                          "--in-steps lets them through");
+        }
+        lines.push_back(std::move(line));
+    });
+    requireWhole(contents, strFile, options);
+    tool::Progress progress("Importing", [&lines] { return lines.size(); });
+    createTokens(lines, strFile, options.blSkipExisting, progress, imported);
+    return contents;
+}
+
+// A file is read once ahead, to see that it is whole. Of a stream that turns out not to be, a part is
+// imported.
+Contents importInSteps(const std::string& strFile, const Options& options, Imported& imported)
+{
+    uint64_t nTokens = 0;
+    if (strFile != "-") {
+        const Contents ahead = readFile(strFile, [](const Line&) {});
+        requireWhole(ahead, strFile, options);
+        nTokens = ahead.nTokens;
+    }
+    tool::Progress progress(
+        "Importing", [nTokens] { return nTokens; }, strFile != "-");
+    std::vector<Line> lines;
+    const auto create = [&] {
+        createTokens(lines, strFile, true, progress, imported);
+        lines.clear();
+        std::this_thread::sleep_for(BETWEEN_STEPS);
+    };
+    try {
+        const Contents contents = readFile(strFile, [&](Line line) {
+            lines.push_back(std::move(line));
+            if (lines.size() == TOKENS_OF_A_STEP) {
+                create();
+            }
+        });
+        create();
+        if (!contents.strFlaw.empty() && !options.blPartial) {
+            throw tool::Failure(tool::EXIT_STATUS_USAGE, nameOf(strFile) + ": " + contents.strFlaw);
+        }
+        return contents;
+    } catch (const tool::Failure& failure) {
+        throw tool::Failure(failure.status(), failure.fact(),
+                            tool::countText(imported.nCreated, "token") +
+                                " imported; the command can be repeated without harm");
+    }
+}
+
+void importFile(const std::string& strFile, const Options& options)
+{
+    Imported imported;
+    const Contents contents = options.blInSteps ? importInSteps(strFile, options, imported)
+                                                : importAtOnce(strFile, options, imported);
+    tool::print(
+        tool::countText(imported.nCreated, "token") + " imported" +
+        (imported.nSkipped ? "; " + tool::countText(imported.nSkipped, "token") + " there already" : "") +
+        "\n");
     if (!contents.strFlaw.empty()) {
         tool::complain(nameOf(strFile) + ": " + contents.strFlaw + "; the whole lines were imported");
     }
-    if (nExpired) {
-        tool::complain(std::to_string(nExpired) +
+    if (imported.nExpired) {
+        tool::complain(std::to_string(imported.nExpired) +
                        " of them expired: the next call of a program purges those");
     }
 }
@@ -217,7 +303,7 @@ void importFile(const std::string& strFile, bool blPartial)
 int importTokens(const Options& options)
 {
     for (const std::string& strFile : options.strFiles) {
-        importFile(strFile, options.blPartial);
+        importFile(strFile, options);
     }
     return tool::EXIT_STATUS_DONE;
 }
@@ -234,6 +320,10 @@ void addImport(Commands& commands)
                      [pOptions] { return importTokens(*pOptions); });
     command.flag("--partial", pOptions->blPartial,
                  "import what is there of an export that is not whole or was changed");
+    command.flag("--skip-existing", pOptions->blSkipExisting,
+                 "leave tokens as they are whose ids are there already");
+    command.flag("--in-steps", pOptions->blInSteps,
+                 "let programs through in between; what is there already stays, so it can be repeated");
     const auto add = [pOptions](const std::string& strFile) {
         if (strFile.empty()) {
             throw BadValue("must not be empty");

@@ -12,7 +12,7 @@
 
 namespace {
 
-std::string write(const Json::Value& jValue, const char* szIndentation)
+std::unique_ptr<Json::StreamWriter> makeWriter(const char* szIndentation)
 {
     Json::StreamWriterBuilder builder;
     builder["indentation"] = szIndentation;
@@ -20,9 +20,14 @@ std::string write(const Json::Value& jValue, const char* szIndentation)
     // valid UTF-8. All digits of doubles come in any case.
     builder["useSpecialFloats"] = true;
     builder["emitUTF8"] = true;
+    return std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter());
+}
+
+std::string write(const Json::Value& jValue, Json::StreamWriter& writer)
+{
     std::ostringstream stream;
     stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
-    std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter())->write(jValue, &stream);
+    writer.write(jValue, &stream);
     return tool::visibleJson(stream.str());
 }
 
@@ -130,12 +135,14 @@ int nestingOf(const std::string& strText)
 
 std::string compactJson(const Json::Value& jValue)
 {
-    return write(jValue, "");
+    static const std::unique_ptr<Json::StreamWriter> pWriter = makeWriter("");
+    return write(jValue, *pWriter);
 }
 
 std::string styledJson(const Json::Value& jValue)
 {
-    return write(jValue, "  ");
+    static const std::unique_ptr<Json::StreamWriter> pWriter = makeWriter("  ");
+    return write(jValue, *pWriter);
 }
 
 } // namespace tool

@@ -1,14 +1,12 @@
 #include "Layout.h"
 
 #include <algorithm>
-#include <ctime>
-#include <vector>
+#include <sstream>
 
 #include "Arguments.h"
 #include "Console.h"
 #include "Json.h"
 #include "Store.h"
-#include "Table.h"
 #include "Values.h"
 
 namespace {
@@ -16,7 +14,7 @@ namespace {
 using tool::Layout;
 typedef tool::Table::Kind Kind;
 
-Layout::Form parseForm(const std::string& strText)
+Layout::Form parseForm(const std::string& strText, const char* szForms)
 {
     if (strText == "table") {
         return Layout::Form::Table;
@@ -27,7 +25,7 @@ Layout::Form parseForm(const std::string& strText)
     if (strText == "jsonl") {
         return Layout::Form::JsonLines;
     }
-    throw tool::BadValue(tool::quoted(strText) + " is no form: table, json or jsonl");
+    throw tool::BadValue(tool::quoted(strText) + " is no form: " + szForms);
 }
 
 std::string timeIn(const Json::Value& jTime, const Layout& layout)
@@ -71,26 +69,119 @@ bool isExpired(const Json::Value& jToken, time_t nNow)
     return jToken["deadline"].asInt64() < nNow;
 }
 
-void printTable(const Json::Value& jTokens, const Layout& layout)
+// The note that the administrator has made of a token.
+std::string noteOf(const Json::Value& jToken)
 {
-    tool::Table table({{"TID", Kind::Short},
-                       {"USER", Kind::Short},
-                       {"FUNCTION", Kind::Long},
-                       {"USES", Kind::Right},
-                       {"DEADLINE", Kind::Short},
-                       {"EXPIRES", Kind::Short},
-                       {"SESSION", Kind::Long},
-                       {"ALLOWS", Kind::Long}},
-                      !layout.blNoHeader);
-    const time_t nNow = time(nullptr);
-    for (const Json::Value& jToken : jTokens) {
-        table.add({jToken["tid"].asString(), userText(jToken["uid"]), jToken["function"].asString(),
-                   usesText(jToken["count"]), timeIn(jToken["deadline"], layout),
-                   tool::relativeText(jToken["deadline"].asInt64(), nNow), jToken["bind_sid"].asString(),
-                   allowText(jToken["webapi_allow"])},
-                  isExpired(jToken, nNow));
+    const Json::Value& jExtra = jToken["extra"];
+    const Json::Value& jNote = jExtra.isObject() ? jExtra["note"] : Json::Value::nullSingleton();
+    return jNote.isString() ? jNote.asString() : jNote.isNull() ? "" : tool::compactJson(jNote);
+}
+
+// What a table can show of a token.
+struct Column {
+    const char* szName; // for --columns
+    tool::Table::Column title;
+    std::string (*text)(const Json::Value& jToken, const Layout& layout, time_t nNow);
+};
+
+const Column COLUMNS[] = {
+    {"tid",
+     {"TID", Kind::Short},
+     [](const Json::Value& j, const Layout&, time_t) { return j["tid"].asString(); }},
+    {"user",
+     {"USER", Kind::Short},
+     [](const Json::Value& j, const Layout&, time_t) { return userText(j["uid"]); }},
+    {"function",
+     {"FUNCTION", Kind::Long},
+     [](const Json::Value& j, const Layout&, time_t) { return j["function"].asString(); }},
+    {"uses",
+     {"USES", Kind::Right},
+     [](const Json::Value& j, const Layout&, time_t) { return usesText(j["count"]); }},
+    {"deadline",
+     {"DEADLINE", Kind::Short},
+     [](const Json::Value& j, const Layout& layout, time_t) { return timeIn(j["deadline"], layout); }},
+    {"expires",
+     {"EXPIRES", Kind::Short, true},
+     [](const Json::Value& j, const Layout&, time_t nNow) {
+         return tool::relativeText(j["deadline"].asInt64(), nNow);
+     }},
+    {"session",
+     {"SESSION", Kind::Long, true},
+     [](const Json::Value& j, const Layout&, time_t) { return j["bind_sid"].asString(); }},
+    {"allows",
+     {"ALLOWS", Kind::Long},
+     [](const Json::Value& j, const Layout&, time_t) { return allowText(j["webapi_allow"]); }},
+    {"uid",
+     {"UID", Kind::Right},
+     [](const Json::Value& j, const Layout&, time_t) { return j["uid"].asString(); }},
+    {"created",
+     {"CREATED", Kind::Short},
+     [](const Json::Value& j, const Layout& layout, time_t) { return timeIn(j["create_time"], layout); }},
+    {"note", {"NOTE", Kind::Long}, [](const Json::Value& j, const Layout&, time_t) { return noteOf(j); }},
+    {"extra",
+     {"EXTRA", Kind::Long},
+     [](const Json::Value& j, const Layout&, time_t) { return tool::compactJson(j["extra"]); }},
+};
+const size_t USUAL_COLUMNS = 8; // these come first
+
+std::vector<size_t> parseColumns(const std::string& strText)
+{
+    std::vector<size_t> nColumns;
+    std::istringstream names(strText + ",");
+    for (std::string strName; std::getline(names, strName, ',');) {
+        const auto pColumn =
+            std::find_if(std::begin(COLUMNS), std::end(COLUMNS),
+                         [&strName](const Column& column) { return strName == column.szName; });
+        if (std::end(COLUMNS) == pColumn) {
+            std::string strNames;
+            for (const Column& column : COLUMNS) {
+                strNames += (strNames.empty() ? "" : ", ") + std::string(column.szName);
+            }
+            throw tool::BadValue(tool::quoted(strName) + " is no column: " + strNames);
+        }
+        nColumns.push_back(static_cast<size_t>(pColumn - std::begin(COLUMNS)));
     }
-    table.print();
+    return nColumns;
+}
+
+std::vector<size_t> columnsOf(const Layout& layout)
+{
+    std::vector<size_t> nColumns = layout.nColumns;
+    for (size_t n = 0; layout.nColumns.empty() && n < USUAL_COLUMNS; ++n) {
+        nColumns.push_back(n);
+    }
+    return nColumns;
+}
+
+// Of those that were chosen, none is spare.
+std::vector<tool::Table::Column> titlesOf(const Layout& layout)
+{
+    std::vector<tool::Table::Column> titles;
+    for (const size_t n : columnsOf(layout)) {
+        titles.push_back(COLUMNS[n].title);
+        titles.back().blSpare = titles.back().blSpare && layout.nColumns.empty();
+    }
+    return titles;
+}
+
+// As RFC 4180 has it, but that lines end with a line feed alone.
+std::string csvLine(const std::vector<std::string>& strCells)
+{
+    std::string strLine;
+    for (const std::string& strCell : strCells) {
+        strLine += strLine.empty() ? "" : ",";
+        const bool blPlain = !strCell.empty() && strCell.find_first_of("\",\r\n") == std::string::npos;
+        if (blPlain) {
+            strLine += strCell;
+            continue;
+        }
+        strLine += '"';
+        for (const char c : strCell) {
+            strLine += c == '"' ? "\"\"" : std::string(1, c);
+        }
+        strLine += '"';
+    }
+    return strLine;
 }
 
 // For scripts: as it is stored.
@@ -141,7 +232,8 @@ std::string parseField(const std::string& strText)
 
 void addForm(Command& command, Layout& layout)
 {
-    addParsed(command, "-o,--output", "FORM", layout.form, parseForm, "table (the default), json or jsonl");
+    const auto parse = [](const std::string& strText) { return parseForm(strText, "table, json or jsonl"); };
+    addParsed(command, "-o,--output", "FORM", layout.form, parse, "table (the default), json or jsonl");
 }
 
 void addFormOptions(Command& command, Layout& layout)
@@ -152,43 +244,133 @@ void addFormOptions(Command& command, Layout& layout)
 
 void addTokenOptions(Command& command, Layout& layout)
 {
-    addFormOptions(command, layout);
+    const auto take = [&layout](const std::string& strText) {
+        layout.blCsv = strText == "csv";
+        layout.form = layout.blCsv ? Layout::Form::Table : parseForm(strText, "table, json, jsonl or csv");
+    };
+    command.option("-o,--output", "FORM", take, "table (the default), json, jsonl or csv");
+    command.flag("--no-header", layout.blNoHeader, "no line of titles");
+    addParsed(command, "--columns", "NAME,...", layout.nColumns, parseColumns,
+              "these columns of a table or CSV: tid, user, function, uses, deadline, expires, session, "
+              "allows, uid, created, note, extra");
     addParsed(command, "--field", "NAME", layout.strField, parseField, "this field only, as it is stored");
     command.flag("--utc", layout.blUtc, "times in UTC instead of local time");
     command.flag("--epoch", layout.blEpoch, "times in seconds since the epoch");
     command.exclude("--epoch", "--utc");
 }
 
-void printTokens(Json::Value& jTokens, const Layout& layout)
+TokenPrinter::TokenPrinter(const Layout& layout)
+    : m_layout(layout),
+      m_nNow(time(nullptr)),
+      m_nColumns(columnsOf(layout)),
+      m_table(titlesOf(layout), !layout.blNoHeader)
 {
-    if (!layout.blShowIds) {
-        for (Json::Value& jToken : jTokens) {
-            jToken["tid"] = masked(jToken["tid"].asString());
-        }
+}
+
+bool TokenPrinter::measures() const
+{
+    return m_layout.strField.empty() && Layout::Form::Table == m_layout.form && !m_layout.blCsv;
+}
+
+void TokenPrinter::mask(Json::Value& jToken) const
+{
+    if (!m_layout.blShowIds) {
+        jToken["tid"] = masked(jToken["tid"].asString());
     }
-    if (!layout.strField.empty() || Layout::Form::JsonLines == layout.form) {
-        for (const Json::Value& jToken : jTokens) {
-            if (layout.strField.empty()) {
-                print(compactJson(jToken) + "\n");
-            } else {
-                printField(jToken, layout.strField);
-            }
-        }
-    } else if (Layout::Form::Json == layout.form) {
-        print(styledJson(jTokens) + "\n");
-    } else {
-        printTable(jTokens, layout);
+}
+
+void TokenPrinter::measure(Json::Value& jToken)
+{
+    mask(jToken);
+    m_table.measure(cellsOf(jToken));
+}
+
+std::vector<std::string> TokenPrinter::cellsOf(const Json::Value& jToken) const
+{
+    std::vector<std::string> strCells;
+    for (const size_t n : m_nColumns) {
+        strCells.push_back(COLUMNS[n].text(jToken, m_layout, m_nNow));
     }
+    return strCells;
+}
+
+void TokenPrinter::print(Json::Value& jToken)
+{
+    mask(jToken);
+    if (!m_layout.strField.empty()) {
+        printField(jToken, m_layout.strField);
+        return;
+    }
+    switch (m_layout.form) {
+    case Layout::Form::Table:
+        if (m_layout.blCsv) {
+            printCsv(jToken);
+        } else {
+            m_table.print(cellsOf(jToken), isExpired(jToken, m_nNow));
+        }
+        break;
+    case Layout::Form::JsonLines: tool::print(compactJson(jToken) + "\n"); break;
+    case Layout::Form::Json: {
+        // As the only one of a list, without the brackets around it.
+        Json::Value jTokens;
+        jTokens.append(jToken);
+        const std::string strList = styledJson(jTokens);
+        tool::print((m_blFirst ? "[" : ",") + strList.substr(1, strList.size() - 3));
+        break;
+    }
+    }
+    m_blFirst = false;
+}
+
+void TokenPrinter::printCsv(const Json::Value& jToken)
+{
+    if (m_blFirst && !m_layout.blNoHeader) {
+        std::vector<std::string> strNames;
+        for (const size_t n : m_nColumns) {
+            strNames.emplace_back(COLUMNS[n].szName);
+        }
+        printLine(csvLine(strNames));
+    }
+    printLine(csvLine(cellsOf(jToken)));
+}
+
+void TokenPrinter::end()
+{
+    if (m_layout.strField.empty() && Layout::Form::Json == m_layout.form) {
+        tool::print(m_blFirst ? "[]\n" : "\n]\n");
+    }
+}
+
+namespace {
+
+// As the only one of a list.
+void printAsOnly(Json::Value jToken, Layout layout)
+{
+    layout.blShowIds = true;
+    TokenPrinter printer(layout);
+    if (printer.measures()) {
+        printer.measure(jToken);
+    }
+    printer.print(jToken);
+}
+
+} // namespace
+
+std::string recordText(const Json::Value& jToken, Layout::Form form)
+{
+    return (Layout::Form::Json == form ? styledJson(jToken) : compactJson(jToken)) + "\n";
 }
 
 void printToken(const Json::Value& jToken, const Layout& layout)
 {
     if (!layout.strField.empty()) {
         printField(jToken, layout.strField);
+    } else if (Layout::Form::Table == layout.form && (layout.blCsv || !layout.nColumns.empty())) {
+        printAsOnly(jToken, layout);
     } else if (Layout::Form::Table == layout.form) {
         printSheet(jToken, layout);
     } else {
-        print((Layout::Form::Json == layout.form ? styledJson(jToken) : compactJson(jToken)) + "\n");
+        print(recordText(jToken, layout.form));
     }
 }
 

@@ -5,10 +5,12 @@
 
 #include <json/value.h>
 
-#include <optional>
+#include <ctime>
 #include <string>
+#include <vector>
 
 #include "Commands.h"
+#include "Table.h"
 
 namespace tool {
 
@@ -16,11 +18,13 @@ struct Layout {
     enum class Form { Table, Json, JsonLines };
 
     Form form = Form::Table;
+    bool blCsv = false; // a table as CSV
     bool blNoHeader = false;
     bool blUtc = false;
     bool blEpoch = false;
     bool blShowIds = false;
-    std::string strField; // this one only; "" for all
+    std::string strField;         // this one only; "" for all
+    std::vector<size_t> nColumns; // of a table, as they are numbered here; empty for the usual ones
 };
 
 // The name of a field, if it is one. Throws BadValue.
@@ -30,11 +34,37 @@ std::string parseField(const std::string& strText);
 void addForm(Command& command, Layout& layout);
 void addFormOptions(Command& command, Layout& layout);
 
-// Adds what commands that show tokens have besides: --field, --utc, --epoch.
+// Adds what commands that show tokens have besides: CSV, --field, --columns, --utc, --epoch.
 void addTokenOptions(Command& command, Layout& layout);
 
-// Prints a list of tokens, their ids masked unless the layout shows them.
-void printTokens(Json::Value& jTokens, const Layout& layout);
+// Prints tokens one after the other, their ids masked unless the layout shows them.
+class TokenPrinter {
+public:
+    explicit TokenPrinter(const Layout& layout);
+
+    // Whether all tokens must be measured first: a table is as wide as it needs to be.
+    bool measures() const;
+    void measure(Json::Value& jToken);
+
+    void print(Json::Value& jToken);
+
+    // To be called behind the last.
+    void end();
+
+private:
+    void mask(Json::Value& jToken) const;
+    std::vector<std::string> cellsOf(const Json::Value& jToken) const;
+    void printCsv(const Json::Value& jToken);
+
+    const Layout m_layout;
+    const time_t m_nNow;
+    std::vector<size_t> m_nColumns;
+    Table m_table;
+    bool m_blFirst = true;
+};
+
+// A token in full as JSON, with its end of line.
+std::string recordText(const Json::Value& jToken, Layout::Form form);
 
 // Prints one token in full.
 void printToken(const Json::Value& jToken, const Layout& layout);

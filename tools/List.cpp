@@ -1,14 +1,15 @@
 // list and show: which tokens there are.
 
-#include <algorithm>
-#include <ctime>
+#include <map>
 #include <memory>
 
+#include "AccessTokenUtil.h"
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
 #include "Layout.h"
-#include "Store.h"
+#include "SortedIds.h"
+#include "Steps.h"
 
 namespace {
 
@@ -20,9 +21,7 @@ struct Order {
 
 struct ListOptions {
     tool::Selection selection;
-    bool blExpired = false;
-    std::optional<int64_t> nExpiring;
-    std::optional<Order> order;
+    Order order = {"deadline", false};
     std::optional<int64_t> nLimit;
     bool blCount = false;
     tool::Layout layout;
@@ -45,60 +44,89 @@ Order parseOrder(const std::string& strText)
     return order;
 }
 
-// What a token is sorted by: its field, but that more uses than any number sort behind all numbers.
-Json::Value sortKey(const Json::Value& jToken, const std::string& strField)
+// What tokens are sorted by, in SQL: their field, but that more uses than any number sort behind all numbers.
+std::string keyOf(const Order& order)
 {
-    const Json::Value& jValue = jToken[strField];
-    return strField == "count" && jValue.asInt64() < 0 ? Json::Value(Json::Value::maxInt64) : jValue;
+    return order.strField == "count" ? "iif(count < 0, " + std::to_string(INT64_MAX) + ", count)"
+                                     : order.strField;
 }
 
-void sort(std::vector<Json::Value>& jTokens, const Order& order)
+// Puts the ids of the tokens in order, or but for those that the limit leaves out. Returns how many there
+// are.
+uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
 {
-    std::stable_sort(jTokens.begin(), jTokens.end(),
-                     [&order](const Json::Value& jLeft, const Json::Value& jRight) {
-                         const Json::Value jLeftKey = sortKey(jLeft, order.strField);
-                         const Json::Value jRightKey = sortKey(jRight, order.strField);
-                         return order.blDescending ? jRightKey < jLeftKey : jLeftKey < jRightKey;
-                     });
-}
-
-std::vector<Json::Value> selected(const ListOptions& options)
-{
-    const int64_t nNow = time(nullptr);
-    tool::Store store(tool::Store::Access::Read);
-    const std::set<std::string> strExpired = store.expiredTids();
-    std::vector<Json::Value> jTokens;
-    for (Json::Value& jToken : store.tokens(options.selection.filter())) {
-        const int64_t nDeadline = jToken["deadline"].asInt64();
-        const bool blExpired = strExpired.count(jToken["tid"].asString()) != 0;
-        const bool blExpiring = !blExpired && options.nExpiring && nDeadline - nNow <= *options.nExpiring;
-        if ((!options.blExpired && !options.nExpiring) || (options.blExpired && blExpired) || blExpiring) {
-            jTokens.push_back(std::move(jToken));
+    const bool blNumber = VEMO_ACCESS_TOKEN::tokenType()[options.order.strField][1].isIntegral();
+    const std::string strSelected = options.selection.sql();
+    std::string strOrder;
+    if (options.nLimit) {
+        strOrder = std::string(" ORDER BY 2") + (options.order.blDescending ? " DESC" : "") +
+                   ", rowid LIMIT " + std::to_string(*options.nLimit);
+    }
+    uint64_t nTokens = 0;
+    for (tool::Steps steps(tool::Store::Access::Glance);;) {
+        tool::Rows rows;
+        const auto read = [&](tool::Store& store, const std::string& strThose) {
+            const std::string strFrom = " FROM token WHERE " + strThose + " AND " + strSelected;
+            nTokens += store.number("SELECT count(*)" + strFrom);
+            rows = store.query(std::string("SELECT ") + tool::SQL_QUOTED_TID + ", " + keyOf(options.order) +
+                               ", rowid" + strFrom + strOrder);
+        };
+        if (!steps.next(read)) {
+            return nTokens;
+        }
+        for (const tool::Row& row : rows) {
+            ids.add(row[0].value_or(""), row[1].value_or(""), blNumber,
+                    strtoll(row[2]->c_str(), nullptr, 10));
         }
     }
-    return jTokens;
+}
+
+// Hands out the tokens of the ids, in their order, but those that are gone.
+template <typename Use>
+void eachOf(tool::SortedIds& ids, const ListOptions& options, Use use)
+{
+    ids.each(static_cast<uint64_t>(options.nLimit.value_or(INT64_MAX)),
+             [&](const std::vector<std::string>& strTids) {
+                 std::string strList;
+                 for (const std::string& strTid : strTids) {
+                     strList += (strList.empty() ? "" : ",") + strTid;
+                 }
+                 std::multimap<std::string, Json::Value> tokens;
+                 tool::Store(tool::Store::Access::Glance)
+                     .eachToken("tid IN (" + strList + ")", std::string(", ") + tool::SQL_QUOTED_TID,
+                                [&tokens](Json::Value jToken, const tool::Row& columns) {
+                                    tokens.emplace(*columns[0], std::move(jToken));
+                                });
+                 for (const std::string& strTid : strTids) {
+                     const auto pToken = tokens.find(strTid);
+                     if (pToken != tokens.end()) {
+                         use(pToken->second);
+                         tokens.erase(pToken);
+                     }
+                 }
+             });
 }
 
 int list(const ListOptions& options)
 {
-    std::vector<Json::Value> jTokens = selected(options);
-    const size_t nTokens = jTokens.size();
     if (options.blCount) {
-        tool::print(std::to_string(nTokens) + "\n");
+        tool::print(std::to_string(tool::countSelected(options.selection)) + "\n");
         return tool::EXIT_STATUS_DONE;
     }
-    sort(jTokens, options.order.value_or(Order{"deadline", false}));
-    const size_t nLimit = options.nLimit ? static_cast<size_t>(*options.nLimit) : nTokens;
-    Json::Value jShown(Json::arrayValue);
-    for (size_t i = 0; i < std::min(nTokens, nLimit); ++i) {
-        jShown.append(std::move(jTokens[i]));
+    tool::SortedIds ids(options.order.blDescending);
+    const uint64_t nTokens = sort(options, ids);
+    tool::TokenPrinter printer(options.layout);
+    if (printer.measures()) {
+        eachOf(ids, options, [&printer](Json::Value& jToken) { printer.measure(jToken); });
     }
-    tool::printTokens(jShown, options.layout);
+    eachOf(ids, options, [&printer](Json::Value& jToken) { printer.print(jToken); });
+    printer.end();
     if (0 == nTokens) {
         tool::complain("there are no such tokens");
     }
-    if (nLimit < nTokens) {
-        tool::complain(std::to_string(nLimit) + " of " + std::to_string(nTokens) + " tokens are shown");
+    if (options.nLimit && static_cast<uint64_t>(*options.nLimit) < nTokens) {
+        tool::complain(std::to_string(*options.nLimit) + " of " + std::to_string(nTokens) +
+                       " tokens are shown");
     }
     return tool::EXIT_STATUS_DONE;
 }
@@ -124,9 +152,6 @@ void addList(Commands& commands)
     Command& command =
         commands.add("list", "list tokens; purges nothing", [pOptions] { return list(*pOptions); });
     addSelection(command, pOptions->selection);
-    command.flag("--expired", pOptions->blExpired, "those whose deadline has passed");
-    addParsed(command, "--expiring", "DURATION", pOptions->nExpiring, parseDuration,
-              "those that expire within this time");
     addParsed(command, "--sort", "FIELD[:desc]", pOptions->order, parseOrder,
               "by this field, not by deadline");
     const auto parseLimit = [](const std::string& strText) { return parseNumber(strText, 1, INT64_MAX); };

@@ -1,6 +1,6 @@
 #include "Progress.h"
 
-#include <chrono>
+#include <algorithm>
 #include <cstdio>
 #include <system_error>
 
@@ -16,8 +16,8 @@ const std::chrono::milliseconds DRAW_AGAIN_AFTER(50);
 
 namespace tool {
 
-Progress::Progress(const std::string& strTitle, size_t nTotal, bool blWanted)
-    : m_strTitle(strTitle), m_nTotal(nTotal), m_blShown(blWanted && isTerminal(stderr))
+Progress::Progress(const std::string& strTitle, const std::function<uint64_t()>& count, bool blWanted)
+    : m_strTitle(strTitle), m_blShown(blWanted && isTerminal(stderr)), m_nTotal(m_blShown ? count() : 0)
 {
     if (!m_blShown) {
         return;
@@ -53,11 +53,20 @@ void Progress::drawAgain()
 
 void Progress::draw() const
 {
-    const int nPercent = m_nTotal ? static_cast<int>(100 * m_nDone / m_nTotal) : 100;
+    const uint64_t nDone = std::min<uint64_t>(m_nDone, m_nTotal); // some can come meanwhile
+    const int nPercent = m_nTotal ? static_cast<int>(100 * nDone / m_nTotal) : 100;
     const int nFilled = BAR_WIDTH * nPercent / 100;
-    fprintf(stderr, "\r%s [%s%s] %3d %%", m_strTitle.c_str(),
+    const double dSeconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - m_start).count();
+    std::string strSpeed;
+    if (dSeconds > 1 && nDone) {
+        const double dRate = static_cast<double>(nDone) / dSeconds;
+        const auto nLeft = static_cast<uint64_t>(static_cast<double>(m_nTotal - nDone) / dRate);
+        strSpeed = ", " + std::to_string(static_cast<uint64_t>(dRate)) + "/s, " + std::to_string(nLeft) +
+                   " s left\033[K"; // what stood there may be longer
+    }
+    fprintf(stderr, "\r%s [%s%s] %3d %%%s", m_strTitle.c_str(),
             std::string(static_cast<size_t>(nFilled), '#').c_str(),
-            std::string(static_cast<size_t>(BAR_WIDTH - nFilled), ' ').c_str(), nPercent);
+            std::string(static_cast<size_t>(BAR_WIDTH - nFilled), ' ').c_str(), nPercent, strSpeed.c_str());
 }
 
 } // namespace tool

@@ -1,10 +1,12 @@
-// A progress bar on standard error, where that is a terminal.
+// A progress bar on standard error, where that is a terminal, with the rate and the time left.
 
 #ifndef TOOLS_PROGRESS_H
 #define TOOLS_PROGRESS_H
 
 #include <atomic>
-#include <cstddef>
+#include <chrono>
+#include <cstdint>
+#include <functional>
 #include <string>
 #include <thread>
 
@@ -14,21 +16,23 @@ namespace tool {
 // for the thread, so whoever works on the store makes it before the store.
 class Progress {
 public:
-    Progress(const std::string& strTitle, size_t nTotal, bool blWanted = true);
+    // count: tells how many steps there are, and is only asked where the bar is shown.
+    Progress(const std::string& strTitle, const std::function<uint64_t()>& count, bool blWanted = true);
     ~Progress();
     Progress(const Progress&) = delete;
     Progress& operator=(const Progress&) = delete;
 
-    void step() { ++m_nDone; }
+    void step(uint64_t n = 1) { m_nDone += n; }
 
 private:
     void draw() const;
     void drawAgain();
 
     const std::string m_strTitle;
-    const size_t m_nTotal;
     const bool m_blShown;
-    std::atomic<size_t> m_nDone{0};
+    const uint64_t m_nTotal;
+    const std::chrono::steady_clock::time_point m_start = std::chrono::steady_clock::now();
+    std::atomic<uint64_t> m_nDone{0};
     std::atomic<bool> m_blEnd{false};
     std::thread m_thread;
 };

@@ -7,11 +7,12 @@
 #include <memory>
 #include <set>
 
-#include "Aftermath.h"
 #include "Arguments.h"
+#include "ChangedTokens.h"
 #include "Commands.h"
 #include "Console.h"
-#include "Store.h"
+#include "Progress.h"
+#include "Steps.h"
 
 namespace {
 
@@ -26,6 +27,8 @@ struct RevokeOptions {
 struct PurgeOptions {
     bool blDryRun = false;
 };
+
+const uint64_t MANY = 1000; // tokens, for which there is a bar
 
 void report(uint64_t nTokens, const std::string& strDone, bool blDryRun)
 {
@@ -44,86 +47,70 @@ std::vector<std::string> readAll(const std::vector<std::string>& strArguments)
     return strTids;
 }
 
-// Deletes the tokens again that find() finds in the store, for as long as calls can write them back.
-template <typename Find>
-void revokeAgain(Find find)
-{
-    const auto isUndone = [&find](tool::Store& store) { return !find(store).empty(); };
-    const auto revoke = [&find](tool::Store& store) {
-        uint64_t nRevoked = 0;
-        for (const std::string& strTid : find(store)) {
-            nRevoked += store.removeTid(strTid);
-        }
-        return nRevoked;
-    };
-    tool::outlastCalls({isUndone, revoke}, "a token came back", "revoked");
-}
-
-// The ids of the tokens that the names stand for; two can name the same.
-std::set<std::string> tidsOf(tool::Store& store, const std::vector<std::string>& strNames)
-{
+// The ids of the tokens that names stand for, of which two can name the same; and how many name none.
+struct Named {
     std::set<std::string> strTids;
+    uint64_t nUnknown = 0;
+};
+
+Named findNamed(tool::Store& store, const std::vector<std::string>& strNames)
+{
+    Named named;
     for (const std::string& strName : strNames) {
         const auto jToken = store.findByPrefix(strName);
         if (jToken) {
-            strTids.insert((*jToken)["tid"].asString());
+            named.strTids.insert((*jToken)["tid"].asString());
+        } else {
+            ++named.nUnknown;
         }
     }
-    return strTids;
+    return named;
 }
 
-size_t countNamed(const std::vector<std::string>& strNames)
+Named lookUpNamed(const std::vector<std::string>& strNames)
 {
     tool::Store store(tool::Store::Access::Read);
-    return tidsOf(store, strNames).size();
+    return findNamed(store, strNames);
 }
 
-std::set<std::string> removeNamed(const std::vector<std::string>& strNames)
+Named removeNamed(const std::vector<std::string>& strNames)
 {
     tool::Store store(tool::Store::Access::Write);
-    const std::set<std::string> strTids = tidsOf(store, strNames);
-    for (const std::string& strTid : strTids) {
+    const Named named = findNamed(store, strNames);
+    for (const std::string& strTid : named.strTids) {
         store.removeTid(strTid);
     }
     store.commit();
-    return strTids;
+    return named;
 }
 
 int revokeNamed(const RevokeOptions& options)
 {
     const std::vector<std::string> strNames = readAll(options.strTids);
-    if (options.blDryRun) {
-        report(countNamed(strNames), "revoked", true);
-        return tool::EXIT_STATUS_DONE;
+    const Named named = options.blDryRun ? lookUpNamed(strNames) : removeNamed(strNames);
+    if (!options.blDryRun) {
+        tool::outlastRevoked(named.strTids);
     }
-    const std::set<std::string> strTids = removeNamed(strNames);
-    revokeAgain([&strTids](tool::Store& store) {
-        std::vector<std::string> strBack;
-        for (const std::string& strTid : strTids) {
-            if (store.find(strTid)) {
-                strBack.push_back(strTid);
-            }
-        }
-        return strBack;
-    });
-    report(strTids.size(), "revoked", false);
+    report(named.strTids.size(), "revoked", options.blDryRun);
+    if (strNames.empty()) {
+        tool::complain("no token matches");
+    }
+    if (named.nUnknown) {
+        tool::complain(tool::countText(named.nUnknown, "id") + (1 == named.nUnknown ? " is" : " are") +
+                       " unknown");
+    }
     return tool::EXIT_STATUS_DONE;
-}
-
-uint64_t countOf(const Json::Value& jFilter)
-{
-    return tool::Store(tool::Store::Access::Read).count(jFilter);
 }
 
 // Whether the administrator wants it. Tokens that come or go meanwhile do not matter: those that are
 // there in the end are revoked, and counted.
-bool isWanted(const Json::Value& jFilter)
+bool isWanted(const tool::Selection& selection)
 {
     if (!tool::isTerminal(stdin) || !tool::isTerminal(stderr)) {
         throw tool::Failure(tool::EXIT_STATUS_USAGE,
                             "--yes is needed to revoke many where there is nobody to ask");
     }
-    const uint64_t nTokens = countOf(jFilter);
+    const uint64_t nTokens = tool::countSelected(selection);
     return 0 == nTokens || tool::confirm("Revoke " + tool::countText(nTokens, "token") + "?");
 }
 
@@ -136,39 +123,91 @@ size_t hashOf(const std::string& strTid)
     return std::hash<std::string>()(strTid);
 }
 
-// Returns those of the tokens that it has deleted, in ascending order.
-Hashes removeMany(const Json::Value& jFilter)
+// Deletes those that fulfil a condition, in steps that let others through. Calls gone() for each, and returns
+// how many they were.
+uint64_t removeInSteps(const std::string& strTitle, const std::string& strWhere,
+                       const std::function<uint64_t()>& count,
+                       const std::function<void(const std::string&)>& gone)
 {
-    tool::Store store(tool::Store::Access::Write);
-    Hashes hashes;
-    store.eachTid(jFilter, [&hashes](const std::string& strTid) { hashes.push_back(hashOf(strTid)); });
-    store.remove(jFilter);
-    store.commit();
-    std::sort(hashes.begin(), hashes.end());
-    return hashes;
+    const uint64_t nTokens = tool::isTerminal(stderr) ? count() : 0;
+    tool::Progress progress(
+        strTitle, [nTokens] { return nTokens; }, nTokens >= MANY);
+    uint64_t nRemoved = 0;
+    try {
+        tool::Steps steps(tool::Store::Access::Write);
+        uint64_t nNow = 0;
+        while (steps.next([&](tool::Store& store, const std::string& strThose) {
+            const std::string strFrom = " FROM token WHERE " + strThose + " AND " + strWhere;
+            nNow = 0;
+            store.eachRow("SELECT tid" + strFrom, [&](const tool::Row& row) {
+                gone(row[0].value_or(""));
+                ++nNow;
+            });
+            store.remove(strThose + " AND " + strWhere);
+        })) {
+            nRemoved += nNow;
+            progress.step(nNow);
+        }
+    } catch (const tool::Failure& failure) {
+        if (0 == nRemoved) {
+            throw;
+        }
+        throw tool::Failure(failure.status(), failure.fact(),
+                            tool::countText(nRemoved, "token") +
+                                " are gone already; repeat the command for the rest");
+    }
+    return nRemoved;
+}
+
+// In ascending order.
+bool isOneOf(const Hashes& hashes, const std::string& strTid)
+{
+    return std::binary_search(hashes.begin(), hashes.end(), hashOf(strTid));
 }
 
 int revokeMany(const RevokeOptions& options)
 {
-    const Json::Value jFilter = options.selection.filter();
+    const tool::Selection& selection = options.selection;
     if (options.blDryRun) {
-        report(countOf(jFilter), "revoked", true);
+        report(tool::countSelected(selection), "revoked", true);
         return tool::EXIT_STATUS_DONE;
     }
-    if (!options.blYes && !isWanted(jFilter)) {
+    if (!options.blYes && !isWanted(selection)) {
         report(0, "revoked", false);
         return tool::EXIT_STATUS_DONE;
     }
-    const Hashes revoked = removeMany(jFilter);
-    revokeAgain([&](tool::Store& store) {
-        std::vector<std::string> strBack;
-        store.eachTid(jFilter, [&](const std::string& strTid) {
-            if (std::binary_search(revoked.begin(), revoked.end(), hashOf(strTid))) {
-                strBack.push_back(strTid);
-            }
-        });
-        return strBack;
-    });
+    const std::string strWhere = selection.sql();
+    Hashes revoked;
+    removeInSteps(
+        "Revoking", strWhere, [&selection] { return tool::countSelected(selection); },
+        [&revoked](const std::string& strTid) { revoked.push_back(hashOf(strTid)); });
+    std::sort(revoked.begin(), revoked.end());
+
+    const auto findBack = [&](tool::Store& store, const std::string& strThose) {
+        std::vector<std::string> strTids;
+        store.eachRow("SELECT tid FROM token WHERE " + strThose + " AND " + strWhere,
+                      [&](const tool::Row& row) {
+                          if (isOneOf(revoked, row[0].value_or(""))) {
+                              strTids.push_back(*row[0]);
+                          }
+                      });
+        return strTids;
+    };
+    std::vector<std::string> strBack;
+    const auto isUndone = [&] {
+        tool::Steps steps(tool::Store::Access::Glance);
+        while (steps.next([&](tool::Store& store, const std::string& strThose) {
+            const std::vector<std::string> strMore = findBack(store, strThose);
+            strBack.insert(strBack.end(), strMore.begin(), strMore.end());
+        })) {
+        }
+        return !strBack.empty();
+    };
+    const auto revokeAgain = [&](tool::Store& store) {
+        const auto strTids = strBack.empty() ? findBack(store, "true") : std::exchange(strBack, {});
+        return store.removeTids(strTids);
+    };
+    tool::outlastRevoked({isUndone, revokeAgain});
     report(revoked.size(), "revoked", false);
     return tool::EXIT_STATUS_DONE;
 }
@@ -177,9 +216,8 @@ int revoke(const RevokeOptions& options)
 {
     const int nWays = !options.strTids.empty() + !options.selection.empty() + options.blAll;
     if (nWays != 1) {
-        throw tool::Failure(
-            tool::EXIT_STATUS_USAGE,
-            "say which tokens: by TID, by --uid, --user, --function and --bind-sid, or --all");
+        throw tool::Failure(tool::EXIT_STATUS_USAGE,
+                            "say which tokens: by TID, by options that select, or --all");
     }
     // A script's empty variable shall not revoke all that is bound to no session.
     if (options.selection.strSid == "") {
@@ -188,23 +226,15 @@ int revoke(const RevokeOptions& options)
     return options.strTids.empty() ? revokeMany(options) : revokeNamed(options);
 }
 
-uint64_t expired()
-{
-    tool::Store store(tool::Store::Access::Read);
-    return store.number(std::string("SELECT count(*) FROM token WHERE ") + grant::SQL_EXPIRED);
-}
-
-uint64_t removeExpired()
-{
-    tool::Store store(tool::Store::Access::Write);
-    const uint64_t nTokens = store.purge();
-    store.commit();
-    return nTokens;
-}
-
 int purge(const PurgeOptions& options)
 {
-    report(options.blDryRun ? expired() : removeExpired(), "purged", options.blDryRun);
+    tool::Selection expired;
+    expired.blExpired = true;
+    const auto count = [&expired] { return tool::countSelected(expired); };
+    const uint64_t nTokens = options.blDryRun
+                                 ? count()
+                                 : removeInSteps("Purging", expired.sql(), count, [](const std::string&) {});
+    report(nTokens, "purged", options.blDryRun);
     return tool::EXIT_STATUS_DONE;
 }
 

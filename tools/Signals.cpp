@@ -8,12 +8,12 @@ const int ENDING_SIGNALS[] = {SIGHUP, SIGINT, SIGQUIT, SIGTERM, SIGXFSZ};
 
 namespace tool {
 
-void handleEndingSignals(void (*handle)(int))
+void handleEndingSignals(void (*handle)(int), void (*before)(int))
 {
     for (const int nSignal : ENDING_SIGNALS) {
         struct sigaction action = {};
         sigaction(nSignal, nullptr, &action);
-        if (SIG_DFL == action.sa_handler) {
+        if (before == action.sa_handler) {
             action.sa_handler = handle;
             action.sa_flags = static_cast<int>(SA_RESETHAND); // and calls that wait are not begun anew
             sigaction(nSignal, &action, nullptr);

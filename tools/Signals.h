@@ -7,9 +7,9 @@
 
 namespace tool {
 
-// Has them handled, each once: its second coming does what it does by default. Those that are ignored stay
-// so.
-void handleEndingSignals(void (*handle)(int));
+// Has those handled that so far do what they do by default, or what else is named, each once: its second
+// coming does what it does by default. Those that are ignored stay so.
+void handleEndingSignals(void (*handle)(int), void (*before)(int) = SIG_DFL);
 
 // Holds all signals up while it lives.
 class SignalPause {

@@ -1,5 +1,6 @@
 // stats: what the store holds, in numbers.
 
+#include <algorithm>
 #include <map>
 #include <memory>
 
@@ -9,7 +10,7 @@
 #include "Json.h"
 #include "Layout.h"
 #include "Place.h"
-#include "Store.h"
+#include "Steps.h"
 #include "Table.h"
 #include "Values.h"
 
@@ -49,25 +50,43 @@ Json::Int64 numberOf(const std::optional<std::string>& strText)
     return strtoll(strText.value_or("").c_str(), nullptr, 10);
 }
 
+// Those of a name, with the most tokens first.
+template <typename Group, typename Name>
+std::vector<Group> groupsOf(const std::map<Name, uint64_t>& counts)
+{
+    std::vector<Group> groups;
+    for (const auto& [name, nTokens] : counts) {
+        groups.push_back({name, nTokens});
+    }
+    std::stable_sort(groups.begin(), groups.end(),
+                     [](const Group& left, const Group& right) { return left.nTokens > right.nTokens; });
+    return groups;
+}
+
 Statistics collect()
 {
-    tool::Store store(tool::Store::Access::Read);
-    const std::string strCount = "SELECT count(*) FROM token";
     Statistics statistics = {};
-    statistics.nTokens = store.number(strCount);
-    statistics.nExpired = store.number(strCount + " WHERE " + grant::SQL_EXPIRED);
-    statistics.nUnlimited = store.number(strCount + " WHERE count < 0");
-    for (const auto& row :
-         store.query("SELECT function, count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
-        statistics.functions.push_back({row[0].value_or(""), static_cast<uint64_t>(numberOf(row[1]))});
+    std::map<std::string, uint64_t> functions;
+    std::map<std::optional<Json::Int64>, uint64_t> users;
+    const std::string strSelect = std::string("SELECT function, CAST(uid AS INTEGER), count(*), "
+                                              "total(count < 0), total(") +
+                                  grant::SQL_EXPIRED + ") FROM token WHERE ";
+    tool::Steps steps(tool::Store::Access::Glance);
+    while (steps.next([&](tool::Store& store, const std::string& strThose) {
+        store.eachRow(strSelect + strThose + " GROUP BY 1, 2", [&](const tool::Row& row) {
+            const auto nTokens = static_cast<uint64_t>(numberOf(row[2]));
+            statistics.nTokens += nTokens;
+            statistics.nUnlimited += static_cast<uint64_t>(numberOf(row[3]));
+            statistics.nExpired += static_cast<uint64_t>(numberOf(row[4]));
+            functions[row[0].value_or("")] += nTokens;
+            users[row[1] ? std::optional(numberOf(row[1])) : std::nullopt] += nTokens;
+        });
+        statistics.nFreePages = store.number("PRAGMA freelist_count");
+        statistics.nPageBytes = store.number("PRAGMA page_size");
+    })) {
     }
-    for (const auto& row :
-         store.query("SELECT CAST(uid AS INTEGER), count(*) FROM token GROUP BY 1 ORDER BY 2 DESC, 1")) {
-        const auto nUid = row[0] ? std::optional<Json::Int64>(numberOf(row[0])) : std::nullopt;
-        statistics.users.push_back({nUid, static_cast<uint64_t>(numberOf(row[1]))});
-    }
-    statistics.nFreePages = store.number("PRAGMA freelist_count");
-    statistics.nPageBytes = store.number("PRAGMA page_size");
+    statistics.functions = groupsOf<Group>(functions);
+    statistics.users = groupsOf<UserGroup>(users);
     const auto status = tool::statusOf(VEMO_ATOKEN_DB_PATH);
     statistics.nFileBytes = status ? static_cast<uint64_t>(status->st_size) : 0;
     return statistics;

@@ -3,17 +3,23 @@
 #include <sqlite3.h>
 
 #include <cerrno>
+#include <condition_variable>
 #include <cstdarg>
 #include <cstdlib>
 #include <cstring>
 #include <exception>
 #include <memory>
+#include <mutex>
 #include <new>
 #include <system_error>
+#include <thread>
 
+#include "AccessTokenUtil.h"
 #include "Failure.h"
 #include "Place.h"
 #include "Processes.h"
+#include "Signals.h"
+#include "internal/JsonText.h"
 
 namespace {
 
@@ -60,6 +66,27 @@ std::pair<std::string, std::string> explained(const std::string& strErr)
         return {"holds a token that cannot be read", "\"vemo-access-token doctor\" finds it"};
     }
     return {"failed: " + strErr, ""};
+}
+
+// In SQL, opens(webapi_allow, API, METHOD): whether a token opens a call; of a method "", of the API alone.
+void opens(sqlite3_context* pContext, int, sqlite3_value** rgValue)
+{
+    try {
+        std::string strTexts[3];
+        for (size_t i = 0; i < std::size(strTexts); ++i) {
+            const auto szText = reinterpret_cast<const char*>(sqlite3_value_text(rgValue[i]));
+            strTexts[i] = szText ? szText : "";
+        }
+        Json::Value jToken;
+        VEMO_ACCESS_TOKEN::fromString(strTexts[0], jToken["webapi_allow"]);
+        const int nOpens =
+            VEMO_ACCESS_TOKEN::checkPermission(jToken, strTexts[1].c_str(), strTexts[2].c_str());
+        sqlite3_result_int(pContext, 0 < nOpens);
+    } catch (const Json::LogicError&) {
+        sqlite3_result_int(pContext, 0); // what stands among the methods cannot be read as one
+    } catch (const std::bad_alloc&) {
+        sqlite3_result_error_nomem(pContext);
+    }
 }
 
 bool g_blChanged = false; // what stays when the process fails now
@@ -119,6 +146,9 @@ std::string sqlText(const char* szFormat, ...)
     return szText.get();
 }
 
+const char* const SQL_QUOTED_TID = "iif(typeof(tid) = 'text' AND instr(tid, char(0)), "
+                                   "'CAST(x''' || hex(tid) || ''' AS TEXT)', quote(tid))";
+
 std::vector<std::string> fieldNames()
 {
     std::string strList;
@@ -146,6 +176,10 @@ Store::Store(Access access, Missing missing) : m_access(access)
     if (0 > m_db.initDb()) {
         throw Failure(EXIT_STATUS_STORE,
                       std::string(VEMO_ATOKEN_DB_PATH) + " cannot be opened: " + strerror(errno));
+    }
+    if (SQLITE_OK !=
+        sqlite3_create_function(m_db.m_pDb, "opens", 3, SQLITE_UTF8, nullptr, opens, nullptr, nullptr)) {
+        throw std::bad_alloc();
     }
     query("PRAGMA temp_store = MEMORY"); // what is sorted holds purposes and sessions, and stays private
     if (Access::Write == access) {
@@ -198,7 +232,7 @@ void Store::fail(const std::string& strErr)
     const std::string strPath = VEMO_ATOKEN_DB_PATH " ";
     if (contains(strErr, "database is locked")) {
         throw LockedFailure(EXIT_STATUS_STORE, strPath + "stayed locked by another process for 5 seconds",
-                            Access::Read == m_access ? "" : meaningOfLocked());
+                            Access::Read == m_access || Access::Glance == m_access ? "" : meaningOfLocked());
     }
     // No statement failed but there was no memory for its text, or for a row.
     if (strErr.empty() || (contains(strErr, "query aborted") && !holdsNull())) {
@@ -257,6 +291,37 @@ Json::Value Store::tokens(const Json::Value& jFilter)
     return jTokens;
 }
 
+void Store::eachToken(const std::string& strWhere, const std::string& strColumns, const TakeToken& take)
+{
+    const std::vector<std::string> strNames = fieldNames();
+    std::string strFields;
+    m_db.SqlExpandMemberName(strFields);
+    eachRow("SELECT " + strFields + strColumns + " FROM token WHERE " + strWhere, [&](Row row) {
+        Json::Value jToken;
+        for (size_t i = 0; i < strNames.size(); ++i) {
+            if (!row[i]) {
+                fail("query aborted"); // as the library, which cannot read such a token
+            }
+            const Json::Value& jDefault = VEMO_ACCESS_TOKEN::tokenType()[strNames[i]][1];
+            Json::Value& jValue = jToken[strNames[i]];
+            if (jDefault.isIntegral()) {
+                jValue = Json::Int64{strtoll(row[i]->c_str(), nullptr, 10)};
+            } else if (jDefault.isString()) {
+                jValue = *row[i];
+            } else {
+                VEMO_ACCESS_TOKEN::fromString(*row[i], jValue);
+            }
+        }
+        row.erase(row.begin(), row.begin() + static_cast<std::ptrdiff_t>(strNames.size()));
+        take(std::move(jToken), row);
+    });
+}
+
+bool Store::has(const std::string& strTid)
+{
+    return !query(sqlText("SELECT 1 FROM token WHERE tid = %Q LIMIT 1", strTid.c_str())).empty();
+}
+
 std::optional<Json::Value> Store::find(const std::string& strTid)
 {
     std::string strTidCopy = strTid;
@@ -283,15 +348,6 @@ std::optional<Json::Value> Store::findByPrefix(const std::string& strTid)
                       "TID: several tokens begin with \"" + shortened(strTid) + "\"; give more of the id");
     }
     return rows.empty() ? std::nullopt : find(rows[0][0].value_or(""));
-}
-
-std::set<std::string> Store::expiredTids()
-{
-    std::set<std::string> strTids;
-    for (const auto& row : query(std::string("SELECT tid FROM token WHERE ") + grant::SQL_EXPIRED)) {
-        strTids.insert(row[0].value_or(""));
-    }
-    return strTids;
 }
 
 template <typename Use>
@@ -345,38 +401,46 @@ std::string Store::equation(std::string strName, Json::Value jValue)
     return strEquation;
 }
 
-// " WHERE ..." as the library writes it; "" for an empty filter.
-std::string Store::whereOf(const Json::Value& jFilter)
+void Store::copy(const std::string& strTid, const std::string& strNewTid, int64_t nCreateTime)
 {
-    Json::Value jFilterCopy = jFilter;
-    std::string strWhere;
-    require(m_db.SqlWhereFromJson(jFilterCopy, strWhere, true));
-    return strWhere.empty() ? "" : " WHERE" + strWhere;
+    std::string strFields;
+    std::string strValues;
+    for (const std::string& strName : fieldNames()) {
+        strFields += (strFields.empty() ? "" : ", ") + strName;
+        strValues += strValues.empty() ? "" : ", ";
+        strValues += strName == "tid"           ? sqlText("%Q", strNewTid.c_str())
+                     : strName == "create_time" ? std::to_string(nCreateTime)
+                                                : strName;
+    }
+    query("INSERT INTO token (" + strFields + ") SELECT " + strValues + " FROM token WHERE " +
+          equation("tid", strTid));
+    audit::note("created", strNewTid);
 }
 
-uint64_t Store::count(const Json::Value& jFilter)
-{
-    return number("SELECT count(*) FROM token" + whereOf(jFilter));
-}
-
-uint64_t Store::remove(const Json::Value& jFilter)
+uint64_t Store::remove(const std::string& strWhere)
 {
     std::vector<std::string> strTids;
-    eachRow("SELECT tid FROM token" + whereOf(jFilter) + " ORDER BY tid LIMIT " +
+    eachRow("SELECT tid FROM token WHERE " + strWhere + " ORDER BY tid LIMIT " +
                 std::to_string(audit::PREFIXES_MAX),
             [&strTids](const Row& row) { strTids.push_back(row[0].value_or("")); });
-    Json::Value jFilterCopy = jFilter;
-    const int nRemoved = m_db.tokenDelete(jFilterCopy, true);
-    require(nRemoved);
-    audit::note("deleted", strTids, static_cast<uint64_t>(nRemoved));
-    return static_cast<uint64_t>(nRemoved);
+    query("DELETE FROM token WHERE " + strWhere);
+    const uint64_t nRemoved = number("SELECT changes()");
+    audit::note("deleted", strTids, nRemoved);
+    return nRemoved;
 }
 
 uint64_t Store::removeTid(const std::string& strTid)
 {
-    Json::Value jFilter;
-    jFilter["tid"] = strTid;
-    return remove(jFilter);
+    return remove(sqlText("tid = %Q", strTid.c_str()));
+}
+
+uint64_t Store::removeTids(const std::vector<std::string>& strTids)
+{
+    uint64_t nRemoved = 0;
+    for (const std::string& strTid : strTids) {
+        nRemoved += removeTid(strTid);
+    }
+    return nRemoved;
 }
 
 uint64_t Store::purge()
@@ -445,10 +509,29 @@ std::string Store::queryAsFarAsItGoes(const std::string& strSql, Rows& rows)
     return run(strSql, [&rows](Row row) { rows.push_back(std::move(row)); });
 }
 
-void Store::eachTid(const Json::Value& jFilter, const std::function<void(const std::string&)>& take)
+std::optional<std::string> Store::queryWithin(std::chrono::milliseconds longest, const std::string& strSql,
+                                              Rows& rows)
 {
-    eachRow("SELECT tid FROM token" + whereOf(jFilter),
-            [&take](const Row& row) { take(row[0].value_or("")); });
+    std::mutex mutex;
+    std::condition_variable ended;
+    bool blEnded = false;
+    bool blInterrupted = false;
+    const SignalPause pause; // which the thread inherits: signals are for those who clean up
+    std::thread watch([&] {
+        std::unique_lock guard(mutex);
+        blInterrupted = !ended.wait_for(guard, longest, [&blEnded] { return blEnded; });
+        if (blInterrupted) {
+            sqlite3_interrupt(m_db.m_pDb);
+        }
+    });
+    const std::string strErr = queryAsFarAsItGoes(strSql, rows);
+    {
+        const std::lock_guard guard(mutex);
+        blEnded = true;
+    }
+    ended.notify_one();
+    watch.join();
+    return blInterrupted && !strErr.empty() ? std::nullopt : std::optional(strErr);
 }
 
 // Returns why the statement failed, or "".

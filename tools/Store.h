@@ -11,10 +11,10 @@
 
 #include <json/value.h>
 
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <optional>
-#include <set>
 #include <string>
 #include <vector>
 
@@ -35,6 +35,9 @@ std::string sqlText(const char* szFormat, ...);
 
 // The fields of a token, in their order.
 std::vector<std::string> fieldNames();
+
+// In a statement, an id as SQL has it, whatever it is; one that can be compared with "tid".
+extern const char* const SQL_QUOTED_TID;
 
 class Store {
 public:
@@ -60,15 +63,21 @@ public:
     // The tokens whose fields equal the filter's.
     Json::Value tokens(const Json::Value& jFilter);
 
+    // The tokens that a condition in SQL selects, one by one, with the columns behind them that are asked
+    // for:
+    // ", COLUMN, ...".
+    typedef std::function<void(Json::Value jToken, const Row& columns)> TakeToken;
+    void eachToken(const std::string& strWhere, const std::string& strColumns, const TakeToken& take);
+
+    // Whether there is a token of an id.
+    bool has(const std::string& strTid);
+
     // The token of an id.
     std::optional<Json::Value> find(const std::string& strTid);
 
     // The token of an id, or the one whose id begins with these 8 or more characters. Fails with a
     // usage failure when the prefix is too short or fits several.
     std::optional<Json::Value> findByPrefix(const std::string& strTid);
-
-    // The ids of those tokens that the purge would delete.
-    std::set<std::string> expiredTids();
 
     // The token of an id as a grant sees it; and the use that a grant spends.
     std::optional<grant::Token> token(const std::string& strTid);
@@ -81,14 +90,14 @@ public:
     // they could not be read.
     void update(const std::string& strTid, const Json::Value& jChange);
 
-    // How many tokens there are whose fields equal the filter's; and their ids, one after the other.
-    uint64_t count(const Json::Value& jFilter);
-    void eachTid(const Json::Value& jFilter, const std::function<void(const std::string&)>& take);
+    // Makes a copy of a token under another id and time of creation, exact to the byte.
+    void copy(const std::string& strTid, const std::string& strNewTid, int64_t nCreateTime);
 
-    // Deletes the tokens whose fields equal the filter's, all of them for an empty one. Returns how
+    // Deletes the tokens that a condition in SQL selects, those of these ids, or that of one. Returns how
     // many there were.
-    uint64_t remove(const Json::Value& jFilter);
+    uint64_t remove(const std::string& strWhere);
     uint64_t removeTid(const std::string& strTid);
+    uint64_t removeTids(const std::vector<std::string>& strTids);
 
     // Deletes the expired tokens, as the library does. Returns how many there were.
     uint64_t purge();
@@ -112,6 +121,10 @@ public:
     // The same for a statement that can give rows before it fails; returns why it did, or "".
     std::string queryAsFarAsItGoes(const std::string& strSql, Rows& rows);
 
+    // The same for one that is interrupted when it takes longer; returns nothing then.
+    std::optional<std::string> queryWithin(std::chrono::milliseconds longest, const std::string& strSql,
+                                           Rows& rows);
+
     // The first column of a query's first row, as text and as a number of 0 or more.
     std::string text(const std::string& strSql);
     uint64_t number(const std::string& strSql);
@@ -131,7 +144,6 @@ private:
     std::string run(const std::string& strSql, const std::function<void(Row)>& take);
     void require(int nResult);
     bool holdsNull();
-    std::string whereOf(const Json::Value& jFilter);
     std::string equation(std::string strName, Json::Value jValue);
     template <typename Use>
     auto withTokens(Use use);

@@ -14,6 +14,8 @@
 namespace {
 
 const char* const SEPARATOR = "  ";
+const size_t LEFT_OUT = SIZE_MAX; // the width of a column that is not shown
+const size_t WORD_MAX = 40;       // columns; longer words are broken
 const char* const RED = "\033[31m";
 const char* const NO_COLOUR = "\033[0m";
 
@@ -28,103 +30,202 @@ size_t terminalWidth()
     return size.ws_col ? size.ws_col : 80;
 }
 
-struct Piece {
-    size_t cb;
-    size_t nWidth; // the columns that it takes
-};
-
-// What of a printable text fits into so many columns.
-Piece firstOf(std::string_view strText, size_t nColumns)
+size_t columnsOf(wchar_t cWide)
 {
-    Piece piece = {};
-    while (piece.cb < strText.size()) {
-        const std::string_view strRest = strText.substr(piece.cb);
+    return static_cast<size_t>(std::max(wcwidth(cWide), 0)); // none for a mark on another
+}
+
+// Calls use(character, its bytes) for each of a printable text, until that returns false.
+template <typename Use>
+void eachOf(std::string_view strText, Use use)
+{
+    while (!strText.empty()) {
         wchar_t cWide = L'\0';
         mbstate_t state = {};
-        const size_t cb = mbrtowc(&cWide, strRest.data(), strRest.size(), &state);
-        const size_t nWidth = static_cast<size_t>(std::max(wcwidth(cWide), 0)); // none for a mark on another
-        if (piece.nWidth + nWidth > nColumns) {
-            break;
+        // An error is a large number, but printable texts have none.
+        const size_t cb = std::min(mbrtowc(&cWide, strText.data(), strText.size(), &state), strText.size());
+        if (!use(cWide, cb)) {
+            return;
         }
-        piece.cb += std::min(cb, strRest.size()); // an error is a large number, but printable texts have none
-        piece.nWidth += nWidth;
+        strText.remove_prefix(cb);
     }
-    return piece;
+}
+
+// What of a text stands on one line.
+struct Piece {
+    size_t cbShown;
+    size_t nWidth;  // the columns that it takes
+    size_t cbTaken; // with the blank that it breaks at
+};
+
+// The words of what fits into so many columns; of a longer word, a part.
+Piece firstOf(std::string_view strText, size_t nColumns)
+{
+    Piece fitting = {};
+    Piece words = {};
+    bool blWhole = true;
+    eachOf(strText, [&](wchar_t cWide, size_t cb) {
+        blWhole = fitting.nWidth + columnsOf(cWide) <= nColumns;
+        if (!blWhole) {
+            words = cWide == L' ' ? Piece{fitting.cbShown, fitting.nWidth, fitting.cbShown + cb} : words;
+            return false;
+        }
+        fitting.cbShown += cb;
+        fitting.cbTaken += cb;
+        fitting.nWidth += columnsOf(cWide);
+        if (cWide == L' ') {
+            words = {fitting.cbShown - cb, fitting.nWidth - 1, fitting.cbTaken};
+        } else if (cWide == L',') {
+            words = fitting;
+        }
+        return true;
+    });
+    return blWhole || 0 == words.cbTaken ? fitting : words;
+}
+
+size_t widthOf(std::string_view strText)
+{
+    return firstOf(strText, SIZE_MAX).nWidth;
+}
+
+// How wide the longest word is that a line does not break in.
+size_t longestWord(std::string_view strText)
+{
+    size_t nLongest = 0;
+    size_t nWord = 0;
+    eachOf(strText, [&](wchar_t cWide, size_t) {
+        nWord += cWide == L' ' ? 0 : columnsOf(cWide);
+        nLongest = std::max(nLongest, nWord);
+        nWord = cWide == L' ' || cWide == L',' ? 0 : nWord;
+        return true;
+    });
+    return std::min(nLongest, WORD_MAX);
+}
+
+std::vector<std::string> printableCells(const std::vector<std::string>& strCells)
+{
+    std::vector<std::string> strPrintable;
+    for (const std::string& strCell : strCells) {
+        strPrintable.push_back(tool::printable(strCell, tool::localeCharset()));
+    }
+    return strPrintable;
 }
 
 } // namespace
 
 namespace tool {
 
-Table::Table(const std::vector<Column>& columns, bool blHeader) : m_columns(columns), m_blHeader(blHeader) {}
-
-void Table::add(const std::vector<std::string>& strCells, bool blRed)
+Table::Table(const std::vector<Column>& columns, bool blHeader)
+    : m_columns(columns), m_blHeader(blHeader), m_nWidths(columns.size())
 {
-    if (m_blHeader && m_lines.empty()) {
-        Line& titles = m_lines.emplace_back();
-        for (const Column& column : m_columns) {
-            titles.strCells.emplace_back(column.szTitle);
-        }
-    }
-    Line& line = m_lines.emplace_back(Line{{}, blRed});
-    for (const std::string& strCell : strCells) {
-        line.strCells.push_back(printable(strCell, localeCharset()));
+    for (size_t i = 0; i < m_columns.size(); ++i) {
+        m_nLeast.push_back(strlen(m_columns[i].szTitle));
+        m_nWidths[i] = m_blHeader ? m_nLeast[i] : 0;
     }
 }
 
+void Table::measure(const std::vector<std::string>& strCells)
+{
+    for (size_t i = 0; i < m_columns.size(); ++i) {
+        const std::string strCell = printable(strCells[i], localeCharset());
+        m_nWidths[i] = std::max(m_nWidths[i], widthOf(strCell));
+        m_nLeast[i] = std::max(m_nLeast[i], longestWord(strCell));
+    }
+}
+
+void Table::add(const std::vector<std::string>& strCells, bool blRed)
+{
+    measure(strCells);
+    m_lines.push_back({printableCells(strCells), blRed});
+}
+
 // How wide each column is, so that a line fits. What cannot be broken is as wide as it has to be. The others
-// have equal shares of the rest, but no less than their titles need; what one does not need is for those that
-// need more.
+// have equal shares of the rest, but no less than their titles and words need; what one does not need is for
+// those that need more.
 std::vector<size_t> Table::widthsWithin(size_t nTerminal) const
 {
-    std::vector<size_t> nWidths;
+    std::vector<size_t> nWidths = m_nWidths;
     std::vector<size_t> nLong; // numbers of columns
-    size_t nTaken = (m_columns.size() - 1) * strlen(SEPARATOR);
+    size_t nTaken = 0;
+    size_t nNeeded = 0;
+    const auto least = [&](size_t i) {
+        return strlen(SEPARATOR) +
+               (Kind::Long == m_columns[i].kind ? std::min(m_nWidths[i], m_nLeast[i]) : m_nWidths[i]);
+    };
     for (size_t i = 0; i < m_columns.size(); ++i) {
-        size_t nWidth = 0;
-        for (const Line& line : m_lines) {
-            nWidth = std::max(nWidth, firstOf(line.strCells[i], SIZE_MAX).nWidth);
-        }
-        nWidths.push_back(nWidth);
-        if (Kind::Long == m_columns[i].kind) {
+        nNeeded += least(i);
+    }
+    for (size_t i = m_columns.size(); 0 < i--;) {
+        if (m_columns[i].blSpare && nNeeded > nTerminal && nNeeded - nTerminal > strlen(SEPARATOR)) {
+            nNeeded -= least(i);
+            nWidths[i] = LEFT_OUT;
+        } else if (Kind::Long == m_columns[i].kind) {
             nLong.push_back(i);
+            nTaken += strlen(SEPARATOR);
         } else {
-            nTaken += nWidth;
+            nTaken += nWidths[i] + strlen(SEPARATOR);
         }
     }
+    nTaken -= strlen(SEPARATOR);
     std::sort(nLong.begin(), nLong.end(), [&](size_t i, size_t j) { return nWidths[i] < nWidths[j]; });
     for (size_t n = 0; n < nLong.size(); ++n) {
         size_t& nWidth = nWidths[nLong[n]];
         const size_t nShare = (nTerminal - std::min(nTaken, nTerminal)) / (nLong.size() - n);
-        nWidth = std::min(nWidth, std::max(nShare, strlen(m_columns[nLong[n]].szTitle)));
+        nWidth = std::min(nWidth, std::max(nShare, m_nLeast[nLong[n]]));
         nTaken += nWidth;
     }
     return nWidths;
 }
 
+std::string Table::titles(const std::vector<size_t>& nWidths) const
+{
+    Line line;
+    for (const Column& column : m_columns) {
+        line.strCells.emplace_back(column.szTitle);
+    }
+    return m_blHeader ? lineText(line, nWidths) : "";
+}
+
+std::string Table::lineText(const Line& line, const std::vector<size_t>& nWidths) const
+{
+    std::vector<std::string_view> strRests;
+    size_t nLast = 0;
+    for (size_t i = 0; i < nWidths.size(); ++i) {
+        nLast = LEFT_OUT == nWidths[i] ? nLast : i;
+        strRests.push_back(LEFT_OUT == nWidths[i] ? std::string_view() : line.strCells[i]);
+    }
+    const auto isEmpty = [](std::string_view strRest) { return strRest.empty(); };
+    std::string strText;
+    do {
+        strText += line.blRed ? RED : "";
+        for (size_t i = 0; i <= nLast; ++i) {
+            if (LEFT_OUT == nWidths[i]) {
+                continue;
+            }
+            // Any character fits into as much as the title needs.
+            const Piece piece = firstOf(strRests[i], std::max(nWidths[i], strlen(m_columns[i].szTitle)));
+            const std::string strBlanks(nWidths[i] - std::min(nWidths[i], piece.nWidth), ' ');
+            strText += Kind::Right == m_columns[i].kind ? strBlanks : "";
+            strText += strRests[i].substr(0, piece.cbShown);
+            strText += Kind::Right == m_columns[i].kind || nLast == i ? "" : strBlanks;
+            strText += nLast == i ? "" : SEPARATOR;
+            strRests[i].remove_prefix(piece.cbTaken);
+        }
+        strText += line.blRed ? NO_COLOUR : "";
+        strText += '\n';
+    } while (!std::all_of(strRests.begin(), strRests.end(), isEmpty));
+    return strText;
+}
+
 std::string Table::text(size_t nTerminal, bool blColoured) const
 {
+    if (m_lines.empty()) {
+        return "";
+    }
     const std::vector<size_t> nWidths = widthsWithin(nTerminal);
-    std::string strText;
+    std::string strText = titles(nWidths);
     for (const Line& line : m_lines) {
-        const bool blRed = blColoured && line.blRed;
-        const auto isEmpty = [](std::string_view strRest) { return strRest.empty(); };
-        std::vector<std::string_view> strRests(line.strCells.begin(), line.strCells.end());
-        do {
-            strText += blRed ? RED : "";
-            for (size_t i = 0; i < strRests.size(); ++i) {
-                const Piece piece = firstOf(strRests[i], nWidths[i]);
-                const std::string strBlanks(nWidths[i] - piece.nWidth, ' ');
-                const bool blLast = strRests.size() == i + 1;
-                strText += Kind::Right == m_columns[i].kind ? strBlanks : "";
-                strText += strRests[i].substr(0, piece.cb);
-                strText += Kind::Right == m_columns[i].kind || blLast ? "" : strBlanks;
-                strText += blLast ? "" : SEPARATOR;
-                strRests[i].remove_prefix(piece.cb);
-            }
-            strText += blRed ? NO_COLOUR : "";
-            strText += '\n';
-        } while (!std::all_of(strRests.begin(), strRests.end(), isEmpty));
+        strText += lineText({line.strCells, blColoured && line.blRed}, nWidths);
     }
     return strText;
 }
@@ -132,6 +233,15 @@ std::string Table::text(size_t nTerminal, bool blColoured) const
 void Table::print() const
 {
     tool::print(text(terminalWidth(), isColoured(resultStream())));
+}
+
+void Table::print(const std::vector<std::string>& strCells, bool blRed)
+{
+    if (m_nPrinted.empty()) {
+        m_nPrinted = widthsWithin(terminalWidth());
+        tool::print(titles(m_nPrinted));
+    }
+    tool::print(lineText({printableCells(strCells), blRed && isColoured(resultStream())}, m_nPrinted));
 }
 
 } // namespace tool

@@ -133,7 +133,7 @@ int tell(const Options& options)
 // Returns what was before and what is after.
 std::pair<Figures, Figures> change(const Options& options)
 {
-    tool::Progress progress("Tuning", statements(options).size());
+    tool::Progress progress("Tuning", [&options] { return statements(options).size(); });
     Store store(Store::Access::Locked);
     const Figures before = measured(store, true);
     execute(store, options, progress);

@@ -4,8 +4,8 @@
 #include <ctime>
 #include <memory>
 
-#include "Aftermath.h"
 #include "Arguments.h"
+#include "ChangedTokens.h"
 #include "Commands.h"
 #include "Console.h"
 #include "Json.h"
@@ -23,11 +23,12 @@ struct Options {
     std::vector<tool::Allowance> removeAllow;
     std::optional<std::string> strSid;
     std::optional<Json::Value> jExtra;
+    std::optional<std::string> strNote;
 
     bool empty() const
     {
         return !nCount && !nDeadline && !nTtl && allow.empty() && addAllow.empty() && removeAllow.empty() &&
-               !strSid && !jExtra;
+               !strSid && !jExtra && !strNote;
     }
 };
 
@@ -120,8 +121,26 @@ Json::Value changedAllow(const Json::Value& jToken, const Options& options)
     return jAllow;
 }
 
+// The token's data after the change. Of a text that cannot be read as a whole, a part would be lost.
+Json::Value changedExtra(tool::Store& store, const Json::Value& jToken, const Options& options)
+{
+    Json::Value jExtra = options.jExtra.value_or(jToken["extra"]);
+    const std::string strWhere = tool::sqlText("tid = %Q", jToken["tid"].asCString());
+    const bool blWhole =
+        options.jExtra || tool::flawOfStored(store.text("SELECT extra FROM token WHERE " + strWhere)).empty();
+    if (!blWhole || !jExtra.isObject()) {
+        throw tool::Failure(
+            tool::EXIT_STATUS_USAGE,
+            "the data of the token are malformed and cannot hold a note; replace them with --extra");
+    }
+    if (options.strNote) {
+        tool::setNote(jExtra, *options.strNote);
+    }
+    return jExtra;
+}
+
 // The fields that change.
-Json::Value changeOf(const Json::Value& jToken, const Options& options)
+Json::Value changeOf(tool::Store& store, const Json::Value& jToken, const Options& options)
 {
     Json::Value jChange(Json::objectValue);
     if (options.nCount) {
@@ -136,8 +155,8 @@ Json::Value changeOf(const Json::Value& jToken, const Options& options)
     if (options.strSid) {
         jChange["bind_sid"] = *options.strSid;
     }
-    if (options.jExtra) {
-        jChange["extra"] = *options.jExtra;
+    if (options.jExtra || options.strNote) {
+        jChange["extra"] = changedExtra(store, jToken, options);
     }
     if (!options.allow.empty() || !options.addAllow.empty() || !options.removeAllow.empty()) {
         jChange["webapi_allow"] = changedAllow(jToken, options);
@@ -145,52 +164,10 @@ Json::Value changeOf(const Json::Value& jToken, const Options& options)
     return jChange;
 }
 
-// Whether a number of uses is one from before the one that was set: no grant adds uses, takes a limit away or
-// brings one. Negative ones are without a limit; of these, -1 is the one that is set.
-bool isOldCount(int64_t nCount, int64_t nSet)
-{
-    return (nCount < 0) != (nSet < 0) || nCount > nSet;
-}
-
-// As texts: a NaN in it is not equal to itself.
-bool isSame(const Json::Value& jLeft, const Json::Value& jRight)
-{
-    return tool::compactJson(jLeft) == tool::compactJson(jRight);
-}
-
-// Whether a record is one from before the change: a call that had read it has written it back, with a use
-// less. It cannot be told from one whose uses were raised here, and spent since.
-bool isUndone(const Json::Value& jNow, const Json::Value& jBefore, const Json::Value& jChange)
-{
-    for (const std::string& strName : jChange.getMemberNames()) {
-        const Json::Value& jSet = jChange[strName];
-        const Json::Value& jIs = jNow[strName];
-        const bool blUndone = strName == "count" ? isOldCount(jIs.asInt64(), jSet.asInt64())
-                                                 : !isSame(jIs, jSet) && isSame(jIs, jBefore[strName]);
-        if (blUndone) {
-            return true;
-        }
-    }
-    return false;
-}
-
 // Makes the change of a token again, for as long as calls can write it back as it was.
 void updateAgain(const Json::Value& jBefore, const Json::Value& jChange)
 {
-    const std::string strTid = jBefore["tid"].asString();
-    std::optional<Json::Value> jNow;
-    const auto isNeeded = [&](tool::Store& store) {
-        jNow = store.find(strTid);
-        return jNow && isUndone(*jNow, jBefore, jChange);
-    };
-    const auto update = [&](tool::Store& store) -> uint64_t {
-        const bool blNeeded = isNeeded(store);
-        if (blNeeded) {
-            store.update(strTid, jChange);
-        }
-        return blNeeded;
-    };
-    tool::outlastCalls({isNeeded, update}, "the token was written back as it had been", "updated");
+    const std::optional<Json::Value> jNow = tool::outlastUpdated(jBefore, jChange);
     if (!jNow) {
         tool::complain("the token is gone: a call has spent its last use meanwhile, or deleted it");
         return;
@@ -211,7 +188,7 @@ Json::Value updateToken(const std::string& strTid, const Options& options, Json:
         store.commit();
         throw tool::noSuchToken();
     }
-    jChange = changeOf(*jToken, options);
+    jChange = changeOf(store, *jToken, options);
     store.update((*jToken)["tid"].asString(), jChange);
     store.commit();
     return *jToken;
@@ -259,6 +236,7 @@ void addUpdate(Commands& commands)
     addParsed(command, "--bind-sid", "SID", pOptions->strSid, keep,
               "bind it to this login session; \"\" to none");
     addExtra(command, pOptions->jExtra);
+    addNote(command, pOptions->strNote);
 }
 
 } // namespace tool

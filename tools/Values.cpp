@@ -22,6 +22,7 @@ const int64_t MINUTE = 60;
 const int64_t HOUR = 60 * MINUTE;
 const int64_t DAY = 24 * HOUR;
 const int64_t WEEK = 7 * DAY;
+const size_t KNOWN_MAX = 10000;            // users
 const int64_t DURATION_MAX = 365250 * DAY; // a thousand years
 
 int64_t secondsOf(char cUnit)
@@ -85,6 +86,11 @@ std::optional<User> lookUp(const std::string& strWho, Lookup lookup)
     }
 }
 
+std::string userOfNumber(Json::Int64 nUid)
+{
+    return "user of the number " + std::to_string(nUid);
+}
+
 // The number in decimal that a text begins with, if it does; szText is then behind it.
 std::optional<int64_t> readNumber(const char*& szText, const char* szEnd)
 {
@@ -131,27 +137,36 @@ unsigned int parseUser(const std::string& strName)
     return found->uid;
 }
 
+std::optional<std::string> findUserName(Json::Int64 nUid)
+{
+    const uid_t uid = static_cast<uid_t>(nUid);
+    if (uid != nUid) { // it would be narrowed to another's number
+        return std::nullopt;
+    }
+    const auto found =
+        lookUp(userOfNumber(nUid), [uid](auto... arguments) { return getpwuid_r(uid, arguments...); });
+    return found ? std::optional(found->strName) : std::nullopt;
+}
+
 std::string userName(Json::Int64 nUid)
 {
-    const std::string strWho = "user of the number " + std::to_string(nUid);
-    std::optional<User> found;
-    const uid_t uid = static_cast<uid_t>(nUid);
-    if (uid == nUid) { // or it is narrowed to another's number
-        found = lookUp(strWho, [uid](auto... arguments) { return getpwuid_r(uid, arguments...); });
+    const auto strName = findUserName(nUid);
+    if (!strName) {
+        throw Failure(EXIT_STATUS_STORE, "there is no " + userOfNumber(nUid));
     }
-    if (!found) {
-        throw Failure(EXIT_STATUS_STORE, "there is no " + strWho);
-    }
-    return found->strName;
+    return *strName;
 }
 
 std::optional<std::string> userNameIfKnown(Json::Int64 nUid)
 {
     static std::map<Json::Int64, std::optional<std::string>> known; // a look-up can go over the network
+    if (known.size() == KNOWN_MAX) {
+        known.clear();
+    }
     const auto [pKnown, blNew] = known.try_emplace(nUid);
     if (blNew) {
         try {
-            pKnown->second = userName(nUid);
+            pKnown->second = findUserName(nUid);
         } catch (const Failure&) {
             // it has a number
         }

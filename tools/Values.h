@@ -19,8 +19,9 @@ int64_t parseNumber(const std::string& strText, int64_t nMin, int64_t nMax);
 unsigned int parseUid(const std::string& strText);
 unsigned int parseUser(const std::string& strName);
 
-// The name of a user. Throws Failure, which tells a user whom this machine does not know from a user database
-// that fails. The second is for lists, which do without the name in either case.
+// The name of a user; nothing, or a Failure, where this machine does not know the user. Both throw Failure
+// where the user database fails. The third is for lists, which do without the name in either case.
+std::optional<std::string> findUserName(Json::Int64 nUid);
 std::string userName(Json::Int64 nUid);
 std::optional<std::string> userNameIfKnown(Json::Int64 nUid);
 

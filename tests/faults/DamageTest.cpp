@@ -127,9 +127,10 @@ TEST_F(DamagedByte, WithOneBitFlippedIsReadWithoutHarm)
 
 TEST_F(DamagedByte, MissingWithAllBehindItHarmsNobody)
 {
-    for (size_t cb = 0; cb < m_strSound.size(); ++cb) {
+    const size_t nStride = scaled(1) > 1 ? 1 : 4; // longer runs look at each
+    for (size_t cb = seed() % nStride; cb < m_strSound.size(); cb += nStride) {
         SCOPED_TRACE(cb);
         use(m_strSound.substr(0, cb));
     }
-    print("each truncation");
+    print("truncations");
 }

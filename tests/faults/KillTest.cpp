@@ -183,7 +183,7 @@ TEST_F(Kill, AtACallLeavesAStateThatTheCallerKnows)
         prepareStore(m_store, operation);
         calls[operation.szName] = countCalls(operation);
     }
-    killAll("at a call", scaled(1500), [&](const Operation& operation) {
+    killAll("at a call", scaled(500), [&](const Operation& operation) {
         const int64_t nFatal = 1 + static_cast<int64_t>(m_random() >> 1) % calls[operation.szName];
         const uint64_t nWhere = m_random() % 3;
         return [&operation, nFatal, nWhere] { return runUntil(operation, nFatal, nWhere); };
@@ -196,7 +196,7 @@ TEST_F(Kill, AtAMomentLeavesAStateThatTheCallerKnows)
     for (const Operation& operation : operations()) {
         nanoseconds[operation.szName] = nanosecondsOf(operation);
     }
-    killAll("at a moment", scaled(1500), [&](const Operation& operation) {
+    killAll("at a moment", scaled(500), [&](const Operation& operation) {
         const int64_t nTime = 1 + static_cast<int64_t>(m_random() >> 1) % nanoseconds[operation.szName];
         return [&operation, nTime] { return runFor(operation, nTime); };
     });

@@ -230,8 +230,9 @@ std::string Scene::judge(const Fault& fault) const
     if (strState != m_strBefore && strState != m_strPurged && strState != m_strAfter && !blHalfMade) {
         strWrong += "a third state: " + strState.substr(0, 200) + "; ";
     }
-    if (m_strArguments[0] == "create" && SIGKILL != fault.nSignal && strState == m_strAfter &&
-        ending.strOutput.empty() && !contains(ending.strError, "cannot be taken back")) {
+    const bool blTellsId = m_strArguments[0] == "create" || m_strArguments[0] == "rotate";
+    if (blTellsId && SIGKILL != fault.nSignal && strState == m_strAfter && ending.strOutput.empty() &&
+        !contains(ending.strError, "cannot be taken back")) {
         strWrong += "a token whose id nobody knows; ";
     }
     if (ending.nSignal != (Fault::Kind::Signal == fault.kind ? fault.nSignal : 0)) {

@@ -36,16 +36,16 @@ TEST(Table, AlignsItsColumnsAndPutsNoBlanksBehindTheLast)
 TEST(Table, IsRedOnlyWhereItIsColoured)
 {
     Table table({{"LONG", Kind::Long}, {"SHORT", Kind::Short}}, true);
-    table.add({"expired", "1"}, true);
+    table.add({"has gone", "1"}, true);
     table.add({"none", "2"});
     EXPECT_EQ("LONG  SHORT\n"
-              "expi  1\n"
-              "red   \n"
+              "has   1\n"
+              "gone  \n"
               "none  2\n",
               table.text(1, false));
     EXPECT_EQ("LONG  SHORT\n"
-              "\033[31mexpi  1\033[0m\n"
-              "\033[31mred   \033[0m\n"
+              "\033[31mhas   1\033[0m\n"
+              "\033[31mgone  \033[0m\n"
               "none  2\n",
               table.text(1, true));
 }
@@ -58,33 +58,41 @@ TEST(Table, GivesItsLongColumnsEqualSharesOfWhatIsLeft)
         size_t nTerminal;
         const char* szText;
     } CASES[] = {
-        {"0123456789", "01234567", 24,
+        {"0123 56789", "01 34567", 24,
          "FIRST        N  LAST\n"
-         "0123456789  12  01234567\n"},
-        {"0123456789", "01234567", 23,
+         "0123 56789  12  01 34567\n"},
+        {"0123 56789", "01 34567", 23,
          "FIRST       N  LAST\n"
-         "012345678  12  01234567\n"
-         "9              \n"},
-        {"01234567", "0123456789", 23,
+         "0123       12  01 34567\n"
+         "56789          \n"},
+        {"01 34567", "0123 56789", 23,
          "FIRST      N  LAST\n"
-         "01234567  12  012345678\n"
-         "              9\n"},
+         "01 34567  12  0123\n"
+         "              56789\n"},
         // What the one does not need is for the other.
-        {"01234", "0123456789012345678", 23,
+        {"01234", "0 2 4 6 8 0 2 4 6 8", 23,
          "FIRST   N  LAST\n"
-         "01234  12  012345678901\n"
-         "           2345678\n"},
-        {"01234567890123456789", "012", 23,
+         "01234  12  0 2 4 6 8 0\n"
+         "           2 4 6 8\n"},
+        {"0 2 4 6 8 0 2 4 6 8", "012", 23,
          "FIRST           N  LAST\n"
-         "0123456789012  12  012\n"
-         "3456789            \n"},
-        // No less than the titles need.
-        {"0123456789", "01234567", 0,
+         "0 2 4 6 8 0 2  12  012\n"
+         "4 6 8              \n"},
+        // No less than the titles and the words need; a word ends behind a comma, too.
+        {"0 2 4 6", "0 2 4", 0,
          "FIRST   N  LAST\n"
-         "01234  12  0123\n"
-         "56789      4567\n"},
+         "0 2 4  12  0 2\n"
+         "6          4\n"},
+        {"0123456,89", "01234567 9", 0,
+         "FIRST      N  LAST\n"
+         "0123456,  12  01234567\n"
+         "89            9\n"},
+        {"0123456789012345678901234567890123456789", "0123456789012345678901234567890123456789xy", 0,
+         "FIRST                                      N  LAST\n"
+         "0123456789012345678901234567890123456789  12  0123456789012345678901234567890123456789\n"
+         "                                              xy\n"},
         // Characters of two columns, and marks that take none and stay with their letters.
-        {"\u6f22\u5b57\u6f22\u5b57", "e\u0301e\u0301e\u0301e\u0301e\u0301e\u0301", 17,
+        {"\u6f22\u5b57\u6f22 \u5b57", "e\u0301e\u0301e\u0301e\u0301e\u0301 e\u0301", 17,
          "FIRST    N  LAST\n"
          "\u6f22\u5b57\u6f22  12  e\u0301e\u0301e\u0301e\u0301e\u0301\n"
          "\u5b57          e\u0301\n"},
@@ -98,4 +106,37 @@ TEST(Table, GivesItsLongColumnsEqualSharesOfWhatIsLeft)
         table.add({each.szFirst, "12", each.szLast});
         EXPECT_EQ(each.szText, table.text(each.nTerminal, false));
     }
+}
+
+TEST(Table, LeavesSpareColumnsOutWhereALineDoesNotFitTheLastFirst)
+{
+    const struct {
+        size_t nTerminal;
+        const char* szText;
+    } CASES[] = {
+        {20, "A   SPARE  MORE  Z\n"
+             "aa  bb     cc    zz\n"},
+        {19, "A   SPARE  MORE  Z\n"
+             "aa  bb     cc    zz\n"},
+        {18, "A   SPARE  Z\n"
+             "aa  bb     zz\n"},
+        {13, "A   SPARE  Z\n"
+             "aa  bb     zz\n"},
+        {12, "A   Z\n"
+             "aa  zz\n"},
+        {0, "A   Z\n"
+            "aa  zz\n"},
+    };
+    for (const auto& each : CASES) {
+        Table table(
+            {{"A", Kind::Short}, {"SPARE", Kind::Short, true}, {"MORE", Kind::Long, true}, {"Z", Kind::Long}},
+            true);
+        table.add({"aa", "bb", "cc", "zz"});
+        EXPECT_EQ(each.szText, table.text(each.nTerminal, false)) << each.nTerminal;
+    }
+    // The last column can be one of them; what is measured line by line is laid out in the same way.
+    Table last({{"A", Kind::Short}, {"LAST", Kind::Short, true}}, true);
+    last.add({"aa", "bb"});
+    EXPECT_EQ("A\naa\n", last.text(7, false));
+    EXPECT_EQ("A   LAST\naa  bb\n", last.text(8, false));
 }

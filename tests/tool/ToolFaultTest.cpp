@@ -45,6 +45,8 @@ const Command COMMANDS[] = {
     {"check", {"check", TID, "Example.Api", "get"}, true, 1, READS},
     {"grant", {"grant", TID, "Example.Api", "get"}},
     {"update", {"update", TID, "--uses", "7", "--add-allow", "Example.Api:put"}},
+    {"rotate", {"rotate", TID}},
+    {"rotate_grace", {"rotate", TID, "--grace", "1h"}},
     {"revoke", {"revoke", TID}},
     {"revoke_all", {"revoke", "--all", "--yes"}},
     {"purge", {"purge"}},
@@ -154,7 +156,7 @@ TEST_P(ToolFault, OfMemoryIsTold)
 TEST_P(ToolChange, BySignalLeavesAllOrNothing)
 {
     const std::string& strCommand = GetParam().strArguments[0];
-    const auto signals = strCommand == "export" || strCommand == "create"
+    const auto signals = strCommand == "export" || strCommand == "create" || strCommand == "rotate"
                              ? std::vector<int>{SIGKILL, SIGINT, SIGTERM}
                              : std::vector<int>{SIGKILL};
     m_nCalls = m_pScene->calls(Fault::Kind::Signal);

@@ -99,7 +99,7 @@ TABLE
 import: 6 tokens created
 doctor: 6 tokens changed or deleted
 import: 6 tokens created
-purge: 6 tokens purged" ]
+purge: 6 tokens deleted" ]
 }
 
 @test "who has become root by sudo is told" {

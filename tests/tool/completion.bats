@@ -160,6 +160,9 @@ list --user roo                      => list,--user,root
 create --user=roo                    => create,--user=root
 list --output ta                     => list,--output,table
 check -o ta                          => check,-o,table
+show -o c                            => show,-o,csv
+list --columns exp                   => list,--columns,expires
+list --columns tid,no                => list,--columns,tid,note
 show --field=bin                     => show,--field=bind_sid
 list --sort dea                      => list,--sort,deadline
 list --sort count:                   => list,--sort,count:desc
@@ -231,7 +234,7 @@ vemo-access-token,list,--sort,uid|uid|uid:desc
 vemo-access-token,create,--extra,@|@
 vemo-access-token,show
 vemo-access-token,tune,--wal,--|--dry-run|--help|--no-header|--verbose|--version
-vemo-access-token,update,x,--allow,A,--ttl,1h,--|--allow|--bind-sid|--extra|--help|--unlimited|--uses|--verbose|--version"
+vemo-access-token,update,x,--allow,A,--ttl,1h,--|--allow|--bind-sid|--extra|--help|--note|--unlimited|--uses|--verbose|--version"
 }
 
 @test "fish completes the commands and options that there are" {
@@ -246,6 +249,8 @@ vemo-access-token list --user roo
 vemo-access-token create --user=roo
 vemo-access-token stats --output 
 vemo-access-token check -o ta
+vemo-access-token list --output 
+vemo-access-token list --columns tid,no
 vemo-access-token list --field 
 vemo-access-token list --sort uid
 vemo-access-token list --sort=count:
@@ -270,6 +275,8 @@ vemo-access-token list --user roo|root
 vemo-access-token create --user=roo|--user=root
 vemo-access-token stats --output |json|jsonl|table
 vemo-access-token check -o ta|table
+vemo-access-token list --output |csv|json|jsonl|table
+vemo-access-token list --columns tid,no|tid,note
 vemo-access-token list --field |bind_sid|count|create_time|deadline|extra|function|tid|uid|webapi_allow
 vemo-access-token list --sort uid|uid|uid:desc
 vemo-access-token list --sort=count:|--sort=count:desc

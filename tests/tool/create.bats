@@ -39,6 +39,33 @@ OWN=own-$(printf '%0123d' 0)
     [ "$(column uid "$(tool create --uid 4294967294 --function VPN)")" = 4294967294 ]
 }
 
+@test "a note stands in the token's data" {
+    tool init
+    local arguments stored
+    while IFS='|' read -r arguments stored; do
+        [ "$(column extra "$(eval "a_token $arguments")")" = "$stored" ]
+    done <<'END'
+--note 'it is "mine"'|{"note":"it is \"mine\""}
+--note a --extra '{"b":1,"note":2}'|{"b":1,"note":"a"}
+--note '' --extra '{"b":1,"note":2}'|{"b":1}
+--note ''|{}
+END
+}
+
+@test "create prints its record as JSON, as show does" {
+    tool init
+    local form
+    for form in json jsonl; do
+        run_tool create --uid 0 --function VPN --allow A:m --note ü -o $form
+        [ "$status" -eq 0 ]
+        [ "$stderr" = "" ]
+        [ "$output" = "$(tool show "$(sql "SELECT tid FROM token")" -o $form)" ]
+        sql "DELETE FROM token"
+    done
+    run_tool create --uid 0 --function VPN -o table
+    [ "$output" = "$(sql "SELECT tid FROM token")" ]
+}
+
 @test "create refuses options that it cannot use, and touches nothing" {
     refuses <<'END'
 create --function VPN|--uid or --user is required
@@ -58,6 +85,7 @@ create --uid 0 --function VPN --uses 9223372036854775808|--uses: "92233720368547
 create --uid 0 --function VPN --uses 2 --unlimited|--uses excludes --unlimited
 create --uid 0 --function|--function: needs a value
 create --uid 0 --uid 1 --function VPN|--uid: can be given once only
+create --uid 0 --function VPN -o csv|--output: "csv" is no form: table, json or jsonl
 create --uid 0 --function VPN --count|unknown option "--count"
 create --uid 0 --function VPN more|unexpected argument "more"
 generate more|unexpected argument "more"

@@ -215,3 +215,28 @@ token---$ZEROS Api --field||unknown option "--field"
 END
     [ "$(rows)" = "$before" ]
 }
+
+@test "a grant gives JSON, with the token as it was, but for its id" {
+    local form record
+    row token---
+    for form in json jsonl; do
+        record=$(tool show token--- -o jsonl | sed "s/\"tid\":\"[^\"]*\",//")
+        run_tool grant "token---$ZEROS" Api get -o $form
+        expect 0 "{\"granted\":true,\"reason\":\"\",\"token\":$record}"
+    done
+    [ "$(count token---)" = 3 ]
+    record=${record/:4,/:3,}
+    run_tool grant "token---$ZEROS" Api get -o json --print-user
+    expect 0 "{\"granted\":true,\"reason\":\"\",\"token\":$record,\"user\":\"root\"}"
+    run_tool grant "token---$ZEROS" Api put -o json --print-user
+    expect 1 '{"granted":false,"reason":"method not listed"}'
+    run_tool grant token--- Api get -o json
+    expect 1 '{"granted":false,"reason":"unknown token"}'
+    [ "$(count token---)" = 2 ]
+    VEMO_TEST_LOOKUP=0 run_tool grant "token---$ZEROS" Api -o json --print-user
+    expect 4 "" "vemo-access-token: granted, but there is no user of the number 0"
+    # The last one is told as it was, too.
+    run_tool grant "token---$ZEROS" Api get -o json
+    expect 0 "{\"granted\":true,\"reason\":\"\",\"token\":${record/:3,/:1,}}"
+    [ "$(count token---)" = "" ]
+}

@@ -204,6 +204,102 @@ END
     expect 0 "" "vemo-access-token: there are no such tokens"
 }
 
+@test "list selects by time of creation, by what a token opens, by its uses and by owners that are gone" {
+    row a------- "uid = 4294967294, create_time = 1999999999, webapi_allow = '{\"A\":{\"method\":[]}}'"
+    row b------- "create_time = 2000000000, count = -1,
+        webapi_allow = '{\"A\":{\"method\":[\"m\",\"n\"]},\"B\":{\"method\":[\"m\"]}}'"
+    row c------- "create_time = 2000000001, count = -7, webapi_allow = '{\"B\":{\"method\":[\"n\"]}}'"
+    row d------- "uid = 4294967293, deadline = 1, webapi_allow = '{\"A\":{\"method\":[\"m\"]}}'"
+    while IFS='|' read -r names arguments; do
+        names=${names//?/&------- }
+        echo "$arguments"
+        eval "lists '${names% }' --sort tid $arguments"
+    done <<'END'
+ad|--created-before @2000000000
+abd|--created-before @2000000001
+abd|--created-before '2033-05-18 03:33:21Z'
+abd|--created-before '2033-05-18 05:33:21'
+bc|--created-after @2000000000
+c|--created-after 2033-05-18T03:33:21Z
+b|--created-after @2000000000 --created-before @2000000001
+abd|--opens A
+bd|--opens A:m
+b|--opens A:m,n
+b|--opens A:n --opens B:m
+bc|--opens B
+ad|--no-owner
+bc|--unlimited
+d|--no-owner --expired
+b|--unlimited --opens A:m
+c|--unlimited --created-after @2000000001 --opens B:n --uid 0 --function VPN --bind-sid ''
+END
+    for arguments in "--opens a" "--opens A:M" "--opens A:m:n" "--no-owner --unlimited" \
+        "--created-after @2000000000 --created-before @2000000000"; do
+        run_tool list --field tid $arguments
+        expect 0 "" "vemo-access-token: there are no such tokens"
+    done
+    run_tool list --count --no-owner --opens A:m
+    expect 0 1
+}
+
+@test "a token opens nothing where that cannot be read" {
+    for stored in '' 'no JSON' '[]' 'null' '"A"' '{"A":1}' '{"A":{}}' '{"A":{"method":"m"}}' '{"A":{"method":[["m"]]}}' \
+        "$(printf '{"A":%.0s' {1..1001})1$(printf '}%.0s' {1..1001})"; do
+        n=$((n + 1))
+        row "$(printf 'at%06d' $n)" "webapi_allow = '$stored'"
+    done
+    run_tool list --count --opens A:m
+    expect 0 0
+    # The API alone, whatever stands there: as for a grant.
+    lists "at000006 at000007 at000008 at000009 at000010" --opens A --sort tid
+    local tid allowed=
+    for tid in at0000{01..10}; do
+        [ "$(tool check $tid A m)" = "refused: malformed token" ]
+        [ "$(tool check $tid A)" != allowed ] || allowed+=" $tid"
+    done
+    [ "$allowed" = " at000006 at000007 at000008 at000009 at000010" ]
+}
+
+@test "no owner is taken for gone when users cannot be looked up" {
+    row token---
+    VEMO_TEST_LOOKUP=5 run_tool list --no-owner
+    expect 4 "" "vemo-access-token: the user of the number 0 could not be looked up: Input/output error"
+}
+
+@test "CSV holds every value as it is" {
+    row a------- "deadline = 4073014800, create_time = 4073014801, function = 'a \"b\", c', bind_sid = 'x' || char(10) || 'y',
+        extra = '{\"note\":\"of mine\"}'"
+    row b------- "uid = 4294967294, deadline = 4073014802, count = -1, webapi_allow = '{}'"
+    run_tool list -o csv --utc --columns tid,user,function,uses,deadline,session,allows
+    expect 0 'tid,user,function,uses,deadline,session,allows
+a-------,root,"a ""b"", c",1,2099-01-25 09:00:00Z,"x
+y",Api:get
+b-------,4294967294,VPN,unlimited,2099-01-25 09:00:02Z,"",""'
+    run_tool list -o csv --no-header --epoch --columns created,note,extra,uid --limit 1
+    expect 0 '4073014801,of mine,"{""note"":""of mine""}",0' "vemo-access-token: 1 of 2 tokens are shown"
+    run_tool list -o csv --show-ids
+    [ "${lines[0]}" = "tid,user,function,uses,deadline,expires,session,allows" ]
+    [[ ${lines[1]} == "a-------$ZEROS,root,"* ]]
+    run_tool list -o csv --uid 7
+    expect 0 "" "vemo-access-token: there are no such tokens"
+}
+
+@test "--columns chooses those of a table" {
+    row a------- "extra = '{\"note\":7}'"
+    row b------- "extra = '[]', deadline = 99999999999"
+    run_tool list --columns uses,note,tid
+    expect 0 "\
+USES  NOTE  TID
+   1  7     a-------
+   1        b-------"
+    run_tool list --columns uid,uid --no-header
+    expect 0 $'0  0\n0  0'
+    # JSON and single fields have no columns.
+    [ "$(tool list --columns uid -o json)" = "$(tool list -o json)" ]
+    run_tool list --columns uid --field function
+    expect 0 $'VPN\nVPN'
+}
+
 @test "--count counts what is selected, and says no more" {
     row a------- "deadline = -1"
     row b-------
@@ -241,8 +337,8 @@ deadline cadb
 count bdca
 create_time dacb
 function dcab
-webapi_allow cadb
-extra cbda
+webapi_allow dbac
+extra adbc
 tid:desc dcba
 bind_sid:desc dabc
 uid:desc dbca
@@ -306,8 +402,15 @@ more|unexpected argument "more"
 --limit -1|--limit: "-1" is no number from 1 to 9223372036854775807
 --limit ten|--limit: "ten" is no number from 1 to 9223372036854775807
 --limit 9223372036854775808|--limit: "9223372036854775808" is no number from 1 to 9223372036854775807
--o xml|--output: "xml" is no form: table, json or jsonl
--o JSON|--output: "JSON" is no form: table, json or jsonl
+--created-before soon|--created-before: "soon" is no time such as 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
+--created-after ''|--created-after: "" is no time such as 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
+--opens :m|--opens: ":m" names no API: write API or API:METHOD,METHOD
+--opens A:|--opens: "A:" has an empty method: write API or API:METHOD,METHOD
+--columns ''|--columns: "" is no column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
+--columns tid,|--columns: "" is no column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
+--columns name|--columns: "name" is no column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
+-o xml|--output: "xml" is no form: table, json, jsonl or csv
+-o JSON|--output: "JSON" is no form: table, json, jsonl or csv
 --field name|--field: "name" is no field of a token
 --sort tid --sort uid|--sort: can be given once only
 --limit|--limit: needs a value

@@ -300,6 +300,7 @@ locked_commands()
 4|; nothing was changed|create --uid 0 --function VPN
 4|; nothing was changed|grant $ID Api get
 4|; nothing was changed|update $ID --uses 1
+4|; nothing was changed|rotate $ID
 4|; nothing was changed|revoke $ID
 4|; nothing was changed|revoke --all --yes
 4|; nothing was changed|purge
@@ -389,7 +390,7 @@ TABLE
     for i in "${pids[@]}"; do
         wait "$i" # each has succeeded
     done
-    [ "$(sort "$DIR"/out[1-4] | uniq -c | xargs)" = "3 0 tokens revoked 1 1 token revoked" ]
+    [ "$(sort "$DIR"/out[1-4] | uniq -c | xargs)" = "3 0 tokens revoked 1 1 token revoked 3 vemo-access-token: 1 id is unknown" ]
     [ "$(sort "$DIR"/out[5-8])" = "$(sql "SELECT tid FROM token" | sort)" ]
 }
 
@@ -463,6 +464,27 @@ TABLE
 --unlimited|--uses 1|count = 1|$writes|1|$again
 --uses 9|--uses 2|count <= 2|UPDATE token SET count = 0|0|0 uses $left
 --uses 9|--uses 2|count <= 2|DELETE FROM token||$gone
+TABLE
+}
+
+@test "the old token of a rotation is brought to its end again when a call has written it back" {
+    local old arguments then sentence again
+    while IFS=';' read -r arguments then sentence again; do
+        old=$(a_token --uses 9 --ttl 2h)
+        calling
+        # shellcheck disable=SC2086
+        "$TOOL" rotate $arguments - <<<"$old" >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
+        until_sql 1 "SELECT count(*) FROM token WHERE tid <> '$old'"
+        echo "UPDATE read SET count = 8; REPLACE INTO token SELECT * FROM read;" >&7
+        unlock
+        wait $!
+        diff "$DIR/err" - <<<"vemo-access-token: $sentence 1 time, by calls that do not take the lock, and was $again again"
+        [ "$(sql "SELECT count, round((deadline - strftime('%s', 'now')) / 100.0) FROM token ORDER BY tid = '$old'" | xargs)" = "9|72.0$then" ]
+        [ "$(sql "SELECT tid FROM token WHERE tid <> '$old'")" = "$(<"$DIR/out")" ]
+        sql "DELETE FROM token"
+    done <<'TABLE'
+;;a token came back;revoked
+--grace 10m; 8|6.0;the token was written back as it had been;updated
 TABLE
 }
 

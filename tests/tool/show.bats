@@ -76,6 +76,18 @@ END
     [ "$(sqlite3 :memory: "SELECT json(CAST(readfile('$DIR/json') AS TEXT))")" = "$record" ]
 }
 
+@test "CSV and chosen columns are as in a list, with the whole id" {
+    row token--- "bind_sid = 'a,b'"
+    run_tool show token--- -o csv --columns tid,session
+    expect 0 "tid,session
+token---$ZEROS,\"a,b\""
+    run_tool show token--- -o csv --columns uid --no-header
+    expect 0 0
+    run_tool show token--- --columns uid,session
+    expect 0 $'UID  SESSION\n  0  a,b'
+    [ "$(tool show token--- -o json --columns uid)" = "$(tool show token--- -o json)" ]
+}
+
 @test "--field gives one field as it is stored" {
     row token--- "bind_sid = ' a', extra = '{\"a\":\"ü\"}', count = -1"
     while IFS='|' read -r field value; do
@@ -222,7 +234,7 @@ END
 ''|TID: the id is empty
 token---0 token---1|unexpected argument "token---1"
 token---0 --show-ids|unknown option "--show-ids"
-token---0 -o yaml|--output: "yaml" is no form: table, json or jsonl
+token---0 -o yaml|--output: "yaml" is no form: table, json, jsonl or csv
 token---0 --field TID|--field: "TID" is no field of a token
 token---0 --epoch --utc|--utc excludes --epoch
 END

@@ -102,6 +102,41 @@ awkward_rows()
     expect_left A B
 }
 
+@test "an export of a selection is a whole one of these tokens" {
+    local arguments letters
+    a_row A
+    a_row B
+    a_row C
+    sql "UPDATE token SET uid = 4294967294, create_time = 7 WHERE tid LIKE 'A%';
+         UPDATE token SET count = -1, webapi_allow = '{\"Api\":{\"method\":[\"get\"]}}' WHERE tid LIKE 'B%';
+         UPDATE token SET deadline = 1, bind_sid = 's', function = 'Mail' WHERE tid LIKE 'C%'"
+    while IFS='|' read -r arguments letters; do
+        run_tool export $arguments
+        [ "$status" -eq 0 ]
+        [ "$(grep -oE '"tid":".' <<<"$output" | cut -c 8 | xargs)" = "$letters" ]
+        [ "$output" = "$(grep tid <<<"$output" | whole)" ]
+    done <<'TABLE'
+--uid 4294967294|A
+--user root|B C
+--function Mail|C
+--bind-sid s|C
+--created-before @7|B C
+--created-after @7|A
+--opens Api:get|B
+--no-owner|A
+--unlimited|B
+--expired|C
+--expiring 1h|
+--user root --created-before @7 --function VPN|B
+TABLE
+    tool export --no-owner "$DIR/file"
+    rm -r "$VEMO_REDIRECT_DIR"
+    tool init
+    run_tool import "$DIR/file"
+    expect 0 "1 token imported"
+    expect_left A
+}
+
 @test "export counts in plain English" {
     tool init
     run_tool export
@@ -587,6 +622,22 @@ TABLE
     run_tool import "$DIR/a" "$DIR/bc" "$DIR/unread"
     expect 2 "1 token imported" "vemo-access-token: $DIR/bc: line 3 has the id of a token that is there already; nothing of this file was imported"
     expect_left A
+}
+
+@test "--skip-existing leaves tokens as they are that are there already, and counts them" {
+    a_row A
+    sql "UPDATE token SET count = 7"
+    { a_line A; a_line B; } | whole >"$DIR/file"
+    run_tool import --skip-existing "$DIR/file"
+    expect 0 "1 token imported; 1 token there already"
+    run_tool import --skip-existing "$DIR/file"
+    expect 0 "0 tokens imported; 2 tokens there already"
+    expect_left A B
+    [ "$(sql "SELECT count FROM token ORDER BY tid" | xargs)" = "7 1" ]
+    # What stands twice in the file is a fault of the file.
+    { a_line C; a_line C; } | whole >"$DIR/file"
+    run_tool import --skip-existing "$DIR/file"
+    expect 2 "" "vemo-access-token: $DIR/file: line 2 has the id of line 1; nothing of this file was imported"
 }
 
 @test "an id that is there twice is refused with its line" {

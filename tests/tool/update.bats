@@ -40,6 +40,10 @@ rows()
 --extra '{"b": 1, "a": 2}'|extra = '{"a":2,"b":1}'
 --extra '{}'|extra = '{}'
 --extra @"$DIR/extra"|extra = '{"file":1}'
+--note ''|
+--note 'of mine'|extra = '{"n":[1,"ü"],"note":"of mine"}'
+--extra '{"b":1,"note":2}' --note 'it''s'|extra = '{"b":1,"note":"its"}'
+--extra '{"b":1,"note":2}' --note ''|extra = '{"b":1}'
 --uses 5|
 --uses 2 --bind-sid s --deadline 2060-01-01Z --add-allow B --extra '{}'|count = 2, bind_sid = 's', deadline = 2840140800, webapi_allow = '{"Api":{"method":["get"]},"B":{"method":[]}}', extra = '{}'
 END
@@ -261,4 +265,23 @@ expired-|5|7" ]
     expect 0 "1 token updated"
     run_tool check expired- Api get
     expect 0 allowed
+}
+
+@test "a note is changed alone, and what cannot hold one stays" {
+    row token--- "extra = '{\"a\":[1.5,\"ü\"],\"note\":{}}'"
+    run_tool update token--- --note $'"new"\n'
+    expect 0 "1 token updated"
+    [ "$(sql "SELECT extra FROM token")" = '{"a":[1.5,"ü"],"note":"\"new\"\n"}' ]
+    [ "$(tool list --columns note -o csv --no-header)" = $'"""new""\n"' ]
+    run_tool update token--- --note ""
+    [ "$(sql "SELECT extra FROM token")" = '{"a":[1.5,"ü"]}' ]
+    local stored
+    for stored in '' '[]' null '{"a":1'; do
+        sql "UPDATE token SET extra = '$stored'"
+        refuses update <<'TABLE'
+token--- --note x|the data of the token are malformed and cannot hold a note; replace them with --extra
+TABLE
+        tool update token--- --note x --extra '{}'
+        [ "$(sql "SELECT extra FROM token")" = '{"note":"x"}' ]
+    done
 }

@@ -3,7 +3,7 @@
 
 load common
 
-COMMANDS="create generate list show check grant update revoke purge stats export import init doctor tune"
+COMMANDS="create generate list show check grant update rotate revoke purge stats export import init doctor tune"
 
 # plain ARGUMENTS...: the tool as it ships, without the redirection, as a user who is not root
 plain()
@@ -84,18 +84,19 @@ tokens()
             return 1
         }
     done <<'TABLE'
-create|--uid --user --function --ttl --uses --unlimited --allow --bind-sid --extra --tid
+create|--uid --user --function --ttl --uses --unlimited --allow --bind-sid --extra --note --tid -o,--output
 generate|
-list|--uid --user --function --bind-sid --expired --expiring --sort --limit --count -o,--output --no-header --field --utc --epoch --show-ids
-show|-o,--output --no-header --field --utc --epoch
+list|--uid --user --function --bind-sid --created-before --created-after --opens --no-owner --unlimited --expired --expiring --sort --limit --count -o,--output --no-header --columns --field --utc --epoch --show-ids
+show|-o,--output --no-header --columns --field --utc --epoch
 check|-o,--output
-grant|--print-user
-update|--uses --unlimited --deadline --ttl --allow --add-allow --remove-allow --bind-sid --extra
-revoke|--uid --user --function --bind-sid --all --dry-run --yes
+grant|--print-user -o,--output
+update|--uses --unlimited --deadline --ttl --allow --add-allow --remove-allow --bind-sid --extra --note
+rotate|--grace
+revoke|--uid --user --function --bind-sid --created-before --created-after --opens --no-owner --unlimited --expired --expiring --all --dry-run --yes
 purge|--dry-run
 stats|--prometheus -o,--output --no-header
-export|
-import|--partial
+export|--uid --user --function --bind-sid --created-before --created-after --opens --no-owner --unlimited --expired --expiring
+import|--partial --skip-existing --in-steps
 init|
 doctor|--repair -o,--output
 tune|--wal --undo --dry-run --no-header
@@ -124,7 +125,8 @@ Options:
   --remove-allow API[:METHOD,...]
                               what it no longer opens (repeatable, not with --allow)
   --bind-sid SID              bind it to this login session; "" to none
-  --extra JSON|@FILE          data of your own, a JSON object or a file of one'
+  --extra JSON|@FILE          data of your own, a JSON object or a file of one
+  --note TEXT                 a note of yours, kept in the data; "" for none'
     run_tool create --help
     [[ $output == *"
   --function TAG              its purpose (required)
@@ -187,7 +189,9 @@ grant TID|API is required
 grant TID API METHOD more|unexpected argument "more"
 update|TID is required
 update TID|say what to change; "update --help" lists the fields
-revoke|say which tokens: by TID, by --uid, --user, --function and --bind-sid, or --all
+rotate|TID is required
+rotate TID --grace 0|--grace: "0" is no duration such as 90s, 15m, 8h, 2d12h or 1w
+revoke|say which tokens: by TID, by options that select, or --all
 import|FILE is required
 export FILE more|unexpected argument "more"
 create|--function is required
@@ -199,7 +203,7 @@ create --function TAG --uid 0 --uses 1 --unlimited|--uses excludes --unlimited
 list --uid 0 --user root|--uid excludes --user
 list --utc --epoch|--utc excludes --epoch
 list --output|--output: needs a value
-list -o xml|--output: "xml" is no form: table, json or jsonl
+list -o xml|--output: "xml" is no form: table, json, jsonl or csv
 update TID --ttl 1h --deadline 2999-01-01|--deadline excludes --ttl
 update TID --allow A --add-allow B|--allow excludes --add-allow
 update TID --allow A --remove-allow B|--allow excludes --remove-allow
@@ -272,7 +276,7 @@ TABLE
     one=$(a_token)
     other=$(a_token)
     run_tool revoke "[${one:0:8},${other:0:8},$ZEROS]"
-    expect 0 "0 tokens revoked"
+    expect 0 "0 tokens revoked" "vemo-access-token: 1 id is unknown"
     [ "$(tokens)" -eq 2 ]
     cd "$DIR"
     tool export x
@@ -451,7 +455,7 @@ TABLE
 >&- 2>&-|4||
 <&- >&- 2>&-|4||
 TABLE
-    run bash -c '"$@" <&- >&-' - "$TOOL" revoke -
+    run bash -c '"$@" <&- >&-' - "$TOOL" show -
     [ "$status" -eq 2 ]
     [ "$output" = "vemo-access-token: TID: there is no id on standard input" ]
 }
@@ -554,6 +558,7 @@ purge $id
 show $id $id
 check $id Api get $id
 update $id $id --uses 1
+rotate $id $id
 show --tid=$id
 grant --id=$id Api
 list --field $id

@@ -16,31 +16,34 @@ _vemo_access_token()
         fi
     done
 
-    local selection='--uid --user --function --bind-sid'
+    local selection='--uid --user --function --bind-sid --created-before --created-after --opens'
+    selection+=' --no-owner --unlimited --expired --expiring'
     local uses='--uses --unlimited'
     local form='--output'
     local table_form="$form --no-header"
-    local token_form="$table_form --field --utc --epoch"
+    local token_form="$table_form --columns --field --utc --epoch"
     local options
     case $command in
-        create) options="--uid --user --function --ttl $uses --allow --bind-sid --extra --tid" ;;
-        list) options="$selection --expired --expiring --sort --limit --count --show-ids $token_form" ;;
+        create) options="--uid --user --function --ttl $uses --allow --bind-sid --extra --note --tid $form" ;;
+        list) options="$selection --sort --limit --count --show-ids $token_form" ;;
         show) options=$token_form ;;
         check) options=$form ;;
-        grant) options='--print-user' ;;
+        grant) options="--print-user $form" ;;
+        rotate) options='--grace' ;;
         update)
-            options="$uses --deadline --ttl --allow --add-allow --remove-allow --bind-sid --extra"
+            options="$uses --deadline --ttl --allow --add-allow --remove-allow --bind-sid --extra --note"
             ;;
         revoke) options="$selection --all --dry-run --yes" ;;
         purge) options='--dry-run' ;;
         stats) options="--prometheus $table_form" ;;
         doctor) options="--repair $form" ;;
         tune) options='--wal --undo --dry-run --no-header' ;;
-        import) options='--partial' ;;
-        generate | export | init) options= ;;
+        import) options='--partial --skip-existing --in-steps' ;;
+        export) options=$selection ;;
+        generate | init) options= ;;
         '')
-            local commands='create generate list show check grant update revoke purge stats export
-                import init doctor tune'
+            local commands='create generate list show check grant update rotate revoke purge stats
+                export import init doctor tune'
             [[ $cur == -* ]] && commands='--help --version'
             COMPREPLY=($(compgen -W "$commands" -- "$cur"))
             return
@@ -50,6 +53,7 @@ _vemo_access_token()
     options+=' --help --version --verbose'
 
     # The value of an option.
+    local columns='tid user function uses deadline expires session allows uid created note extra'
     local option=$prev fields='tid bind_sid uid deadline count create_time function webapi_allow extra'
     [[ $option == -o ]] && option=--output
     if [[ " $options " == *" $option "* ]]; then
@@ -63,7 +67,17 @@ _vemo_access_token()
                 return
                 ;;
             --output)
-                COMPREPLY=($(compgen -W 'table json jsonl' -- "$cur"))
+                local forms='table json jsonl'
+                [[ $command == @(list|show) ]] && forms+=' csv'
+                COMPREPLY=($(compgen -W "$forms" -- "$cur"))
+                return
+                ;;
+            --columns)
+                # The names in front of the last comma stay.
+                local first=
+                [[ $cur == *,* ]] && first=${cur%,*},
+                COMPREPLY=($(compgen -P "$first" -W "$columns" -- "${cur##*,}"))
+                compopt -o nospace
                 return
                 ;;
             --field)
@@ -80,7 +94,7 @@ _vemo_access_token()
                 return
                 ;;
             --function | --ttl | --uses | --allow | --add-allow | --remove-allow | --bind-sid | --tid | \
-                --expiring | --limit | --deadline)
+                --note | --grace | --created-before | --created-after | --opens | --expiring | --limit | --deadline)
                 return
                 ;;
         esac

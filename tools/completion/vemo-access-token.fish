@@ -39,6 +39,7 @@ for command in \
     'check:Tell whether a grant would succeed, and why not' \
     'grant:Grant a call, which spends one use of the token' \
     'update:Change fields of a token' \
+    'rotate:Give a token a fresh id and print it' \
     'revoke:Delete tokens' \
     'purge:Delete the expired tokens' \
     'stats:Count the tokens, by purpose and by owner' \
@@ -56,28 +57,39 @@ complete -c vemo-access-token -l version -d 'Print the version and exit'
 
 set -l fields tid bind_sid uid deadline count create_time function webapi_allow extra
 set -l forms 'table json jsonl'
+set -l columns tid user function uses deadline expires session allows uid created note extra
+set -l selecting 'list revoke export'
 
-__vemo_access_token_option 'create list revoke' uid 'The owner, as a number' -x -a '(__fish_complete_user_ids)'
-__vemo_access_token_option 'create list revoke' user 'The owner, by name' -x -a '(__fish_complete_users)'
+__vemo_access_token_option "create $selecting" uid 'The owner, as a number' -x -a '(__fish_complete_user_ids)'
+__vemo_access_token_option "create $selecting" user 'The owner, by name' -x -a '(__fish_complete_users)'
 __vemo_access_token_option create function 'Its purpose' -x
-__vemo_access_token_option 'list revoke' function 'Those of this purpose' -x
+__vemo_access_token_option $selecting function 'Those of this purpose' -x
 __vemo_access_token_option 'create update' bind-sid 'Bind it to this login session' -x
-__vemo_access_token_option 'list revoke' bind-sid 'Those bound to this login session' -x
+__vemo_access_token_option $selecting bind-sid 'Those bound to this login session' -x
 __vemo_access_token_option 'create update' ttl 'Lifetime from now' -x
 __vemo_access_token_option 'create update' uses 'How many times it can be granted' -x
 __vemo_access_token_option 'create update' unlimited 'Any number of times'
 __vemo_access_token_option create allow 'An API, and methods of it, that it opens' -x
 __vemo_access_token_option 'create update' extra 'Data of your own' -x -a '(__vemo_access_token_at_file)'
+__vemo_access_token_option 'create update' note 'A note of yours, kept in the data' -x
 __vemo_access_token_option create tid 'An id of your own' -x
 
-__vemo_access_token_option list expired 'Those whose deadline has passed'
-__vemo_access_token_option list expiring 'Those that expire within this time' -x
+__vemo_access_token_option $selecting created-before 'Those made before a time' -x
+__vemo_access_token_option $selecting created-after 'Those made then or later' -x
+__vemo_access_token_option $selecting opens 'Those that open these methods, or the API alone' -x
+__vemo_access_token_option $selecting no-owner 'Those whose owner is no user any more'
+__vemo_access_token_option $selecting unlimited 'Those with any number of uses'
+__vemo_access_token_option $selecting expired 'Those whose deadline has passed'
+__vemo_access_token_option $selecting expiring 'Those that expire within this time' -x
 __vemo_access_token_option list sort 'By this field, not by deadline' -x -a (string join " " $fields{,:desc})
 __vemo_access_token_option list limit 'The first of them' -x
 __vemo_access_token_option list count 'How many there are, no more'
 __vemo_access_token_option list show-ids 'Whole ids, not their first 8 characters'
 
-__vemo_access_token_option 'list show check stats doctor' output 'The form of the output' -s o -x -a $forms
+__vemo_access_token_option 'create check grant stats doctor' output 'The form of the output' -s o -x -a $forms
+__vemo_access_token_option 'list show' output 'The form of the output' -s o -x -a "$forms csv"
+__vemo_access_token_option 'list show' columns 'These columns of a table or CSV' -x \
+    -a "(__fish_append , $columns)"
 __vemo_access_token_option 'list show stats tune' no-header 'No line of titles above a table'
 __vemo_access_token_option 'list show' field 'This field only, as it is stored' -x -a "$fields"
 __vemo_access_token_option 'list show' utc 'Times in UTC instead of local time'
@@ -90,6 +102,8 @@ __vemo_access_token_option update allow 'What it opens, instead of what it did' 
 __vemo_access_token_option update add-allow 'What it opens besides' -x
 __vemo_access_token_option update remove-allow 'What it no longer opens' -x
 
+__vemo_access_token_option rotate grace 'The old id stays good for so long' -x
+
 __vemo_access_token_option revoke all 'Every token there is'
 __vemo_access_token_option revoke yes 'Do not ask'
 __vemo_access_token_option 'revoke purge' dry-run 'Only tell how many'
@@ -97,6 +111,8 @@ __vemo_access_token_option 'revoke purge' dry-run 'Only tell how many'
 __vemo_access_token_option stats prometheus "As metrics for Prometheus' node exporter"
 
 __vemo_access_token_option import partial 'What is there of an export that is not whole'
+__vemo_access_token_option import skip-existing 'Leave tokens as they are whose ids are there already'
+__vemo_access_token_option import in-steps 'Let programs through in between'
 
 __vemo_access_token_option doctor repair 'Repair what can be'
 

@@ -1,0 +1,82 @@
+#!/usr/bin/env bats
+# Many tokens: what the commands take of memory, and how long they hold other programs up
+
+load common
+
+TOKENS=30000
+
+setup_file()
+{
+    export VEMO_REDIRECT_DIR=$BATS_FILE_TMPDIR/many
+    "$VEMO_TEST_TOOL" init >/dev/null
+    sqlite3 "$VEMO_REDIRECT_DIR/vemo-access-token.db" "PRAGMA journal_mode = OFF; PRAGMA synchronous = OFF;
+        WITH RECURSIVE number(n) AS (SELECT 1 UNION ALL SELECT n + 1 FROM number WHERE n < $TOKENS)
+        INSERT INTO token SELECT printf('%08d%0192d', n * 7919 % 99999989, n), iif(n % 3, '', 'session-' || (n % 100)), n % 50,
+            9999999999 - n % 1000, n % 10, 1000000000 + n, 'purpose ' || (n % 20),
+            '{\"Example.File\":{\"method\":[\"get\",\"list\"]},\"Example.Page\":{\"method\":[\"get\"]}}', '{}' FROM number;
+        PRAGMA journal_mode = DELETE" >/dev/null
+    "$VEMO_TEST_TOOL" export "$BATS_FILE_TMPDIR/exported" 2>/dev/null
+}
+
+setup()
+{
+    DIR=$BATS_TEST_TMPDIR
+    export VEMO_REDIRECT_DIR=$DIR/session
+    DB=$VEMO_REDIRECT_DIR/vemo-access-token.db
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    cp --sparse=never "$BATS_FILE_TMPDIR/many/vemo-access-token.db" "$DB"
+    chmod 0700 "$DB"
+}
+
+# beside ARGUMENTS...: runs the tool beside a program that creates a token each 20 ms. Nothing takes more than a tenth
+# of the memory that so many tokens took once, each creation is made, and none waits for a second.
+beside()
+{
+    local creations absent calls there longest
+    coproc creations { exec "$VEMO_TEST_CREATIONS" 20; }
+    # shellcheck disable=SC2154 # coproc sets it
+    exec {absent}>&"${creations[1]}" 4<&"${creations[0]}"
+    status=0
+    (ulimit -v 64000 && exec "$TOOL" "$@") >"$DIR/output" 2>"$DIR/stderr" 3>&- 4<&- || status=$?
+    eval "exec {absent}>&- ${creations[1]}>&-"
+    read -r calls there longest <&4
+    exec 4<&-
+    echo "$*: status $status; $calls creations, $there there, the longest $longest ms; $(head -3 "$DIR/stderr")"
+    [ "$there" = "$calls" ]
+    [ "$longest" -lt 1000 ]
+}
+
+@test "reading many tokens takes little memory and holds nobody up" {
+    local arguments lines
+    while read -r lines arguments; do
+        # shellcheck disable=SC2086 # several arguments
+        beside $arguments
+        [ $status -eq 0 ] || [ "$arguments $status" = "doctor 5" ]
+        [ "$(grep -vc '"function":"beside-' "$DIR/output")" -ge "$lines" ]
+    done <<END
+1 list --count
+$TOKENS list -o jsonl --show-ids
+10 list --limit 10 --sort create_time:desc
+$TOKENS list --columns tid,uses
+0 stats -o jsonl
+$((TOKENS + 1)) export
+END
+}
+
+@test "changing many tokens goes in steps, which can be repeated" {
+    beside revoke --created-before @1000010000 --yes
+    [ "$(cat "$DIR/output")" = "9999 tokens revoked" ]
+    [ "$(sql "SELECT count(*) FROM token WHERE create_time < 1000010000")" = 0 ]
+    run_tool import "$BATS_FILE_TMPDIR/exported"
+    expect 2 "" "vemo-access-token: $BATS_FILE_TMPDIR/exported: more than 10000 tokens would hold all programs up; nothing of \
+this file was imported; --in-steps lets them through"
+    beside import --in-steps "$BATS_FILE_TMPDIR/exported"
+    [ "$(cat "$DIR/output")" = "9999 tokens imported; 20001 tokens there already" ]
+    [ "$(sql "SELECT count(*) FROM token WHERE function LIKE 'purpose %'")" = $TOKENS ]
+    sql "UPDATE token SET deadline = 5 WHERE create_time < 1000015000"
+    beside doctor --repair
+    [ $status -eq 5 ]
+    [ "$(sql "SELECT count(*) FROM token WHERE create_time < 1000015000")" = 0 ]
+    beside purge
+    [ "$(cat "$DIR/output")" = "0 tokens purged" ]
+}

@@ -1,0 +1,126 @@
+#!/usr/bin/env bats
+# rotate
+
+load common
+
+ROW="'s ''1''', 4294967294, 9999999999, 5, 1000000000, 'File' || char(10) || 'share', '{ \"Api\":1,\"Api\":2', '[1e400'"
+
+# kept: what a copy keeps of each token, and its own id
+kept()
+{
+    sql "SELECT quote(tid), hex(bind_sid), uid, deadline, count, hex(function), hex(webapi_allow), hex(extra) FROM token
+         ORDER BY tid" | sed "${1-}"
+}
+
+@test "rotate moves a token to a fresh id, to the byte, and prints that" {
+    local before now
+    row token---
+    row another-
+    before=$(kept "s/^'token---$ZEROS'/'fresh'/")
+    now=$(date +%s)
+    VEMO_TEST_SYSLOG=$DIR/log run_tool rotate token---
+    [ "$status" -eq 0 ]
+    [ "$stderr" = "" ]
+    [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
+    [[ $(<"$DIR/log") == *" rotate: 1 token created (${output:0:8}...), 1 token deleted (token---...); "* ]]
+    [ "$(kept "s/^'$output'/'fresh'/" | sort)" = "$(sort <<<"$before")" ]
+    [ "$(sql "SELECT create_time BETWEEN $now AND $(date +%s) FROM token WHERE tid = '$output'")" = 1 ]
+    # From standard input too, and whole.
+    local first=$output
+    run_tool rotate - <<<"$first"
+    [ "$status" -eq 0 ]
+    [ "$(sql "SELECT group_concat(tid, ' ') FROM (SELECT tid FROM token ORDER BY rowid)")" = "another-$ZEROS $output" ]
+}
+
+@test "--grace leaves the old token for a time, and never gives it more" {
+    local grace left
+    while IFS='|' read -r grace left; do
+        rm -rf "$VEMO_REDIRECT_DIR"
+        row token--- "deadline = strftime('%s', 'now') + 7200"
+        run_tool rotate token--- --grace "$grace"
+        [ "$status" -eq 0 ]
+        [ "$stderr" = "" ]
+        [ "$(sql "SELECT round((deadline - strftime('%s', 'now')) / 100.0) FROM token ORDER BY tid = '$output'" | xargs)" = "$left 72.0" ]
+        [ "$(sql "SELECT count(DISTINCT hex(webapi_allow) || hex(extra) || count || uid), count(*) FROM token")" = "1|2" ]
+        [ "$(sql "SELECT create_time FROM token WHERE tid = 'token---$ZEROS'")" = 1000000000 ]
+    done <<'TABLE'
+1h|36.0
+10m|6.0
+2h1m|72.0
+365250d|72.0
+TABLE
+}
+
+@test "what cannot be rotated stays as it is" {
+    row expired- "deadline = 5"
+    row token--1
+    row token--2
+    refuses rotate <<'END'
+token--|TID: "token--" is too short: give the id or its first 8 characters, or more
+''|TID: the id is empty
+-|TID: there is no id on standard input
+expired-|the token has expired; "vemo-access-token update" can give it time
+token--1 --grace 0|--grace: "0" is no duration such as 90s, 15m, 8h, 2d12h or 1w
+token--1 --grace -1|--grace: "-1" is no duration such as 90s, 15m, 8h, 2d12h or 1w
+token--1 token--2|unexpected argument "token--2"
+END
+    local before
+    before=$(state)
+    run_tool rotate unknown-
+    expect 3 "" "vemo-access-token: there is no such token"
+    [ "$(state)" = "$before" ]
+}
+
+@test "where the fresh id cannot be printed, the old token is as it was" {
+    local grace before reason="cannot write the result: No space left on device"
+    row token---
+    before=$(sql "SELECT * FROM token")
+    for grace in "" "--grace 1m" "--grace 365250d"; do
+        run --separate-stderr bash -c '"$0" "$@" >/dev/full' "$TOOL" rotate token--- $grace
+        expect 4 "" "vemo-access-token: $reason; the change was taken back"
+        [ "$(sql "SELECT * FROM token")" = "$before" ]
+    done
+    VEMO_TEST_SYNC=file run_tool rotate token---
+    expect 4 "" "vemo-access-token: $REAL_DB failed: disk I/O error"
+    [ "$(sql "SELECT * FROM token")" = "$before" ]
+}
+
+# interrupted SQL ARGUMENTS...: rotate, whose result has no room in its pipe; once the change is made, the SQL is
+# done behind its back, and it gets a signal
+interrupted()
+{
+    local pid change=$1
+    shift
+    mkfifo "$DIR/pipe"
+    exec 9<>"$DIR/pipe"
+    head -c 65536 /dev/zero >&9
+    "$TOOL" rotate "$@" >&9 2>"$DIR/err" 9>&- 3>&- &
+    pid=$!
+    until [ "$(sql "SELECT count(*) FROM token WHERE create_time > 1000000000" 2>/dev/null)" = 1 ]; do :; done
+    sqlite3 -cmd ".timeout 5000" "$DB" "$change"
+    kill "$pid"
+    status=0
+    wait "$pid" || status=$?
+    exec 9>&-
+    rm "$DIR/pipe"
+    output=
+    stderr=$(<"$DIR/err")
+    expect 143 "" "vemo-access-token: interrupted; the change was taken back"
+}
+
+@test "an interrupt takes the rotation back, but no use that was spent meanwhile" {
+    local before
+    row token---
+    before=$(sql "SELECT * FROM token")
+    interrupted "" token---
+    [ "$(sql "SELECT * FROM token")" = "$before" ]
+    interrupted "UPDATE token SET count = count - 1 WHERE tid LIKE 'token%'" token--- --grace 1m
+    [ "$(sql "SELECT * FROM token")" = "${before/|5|/|4|}" ]
+    # A call that had read it has written it back.
+    interrupted "INSERT INTO token SELECT 'token---$ZEROS', bind_sid, uid, deadline, 3, 7, function, webapi_allow, extra FROM token" \
+        token---
+    [ "$(sql "SELECT count, create_time FROM token")" = "3|7" ]
+    # Its last use was spent.
+    interrupted "DELETE FROM token WHERE tid LIKE 'token%'" token--- --grace 1m
+    [ "$(sql "SELECT count(*) FROM token")" = 0 ]
+}

@@ -1,0 +1,109 @@
+// rotate: gives a token a fresh id.
+
+#include <algorithm>
+#include <ctime>
+#include <memory>
+
+#include "Arguments.h"
+#include "ChangedTokens.h"
+#include "Commands.h"
+#include "Console.h"
+#include "Handover.h"
+#include "Store.h"
+
+namespace {
+
+struct Options {
+    std::string strTid;
+    std::optional<int64_t> nGrace;
+};
+
+struct Rotation {
+    std::string strTid; // the fresh one
+    Json::Value jBefore;
+    bool blKept = false;                    // the old token, which has a last grace
+    Json::Value jChange{Json::objectValue}; // of it
+};
+
+// Makes the copy and brings the old token to its end, but for the end of the transaction.
+std::unique_ptr<tool::Store> prepare(const std::string& strName, const Options& options, Rotation& rotation)
+{
+    auto pStore = std::make_unique<tool::Store>(tool::Store::Access::Write);
+    const std::optional<Json::Value> jToken = pStore->findByPrefix(strName);
+    if (!jToken) {
+        pStore->commit();
+        throw tool::noSuchToken();
+    }
+    const std::string strOld = (*jToken)["tid"].asString();
+    if (pStore->token(strOld)->blExpired) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, "the token has expired",
+                            "\"vemo-access-token update\" can give it time");
+    }
+    rotation.jBefore = *jToken;
+    const int64_t nNow = time(nullptr);
+    pStore->copy(strOld, rotation.strTid, nNow);
+    if (options.nGrace) {
+        rotation.blKept = true;
+        const int64_t nEnd = nNow + *options.nGrace;
+        if (nEnd < (*jToken)["deadline"].asInt64()) {
+            rotation.jChange["deadline"] = Json::Int64{nEnd};
+            pStore->update(strOld, rotation.jChange);
+        }
+    } else {
+        pStore->removeTid(strOld);
+    }
+    return pStore;
+}
+
+// Nobody knows the fresh id, so nothing has become of its token. What calls have made of the old one stays.
+std::string undo(tool::Store& store, const Rotation& rotation)
+{
+    if (!store.find(rotation.strTid)) {
+        return "";
+    }
+    const std::string strOld = rotation.jBefore["tid"].asString();
+    const bool blThere = store.find(strOld).has_value();
+    if (!rotation.blKept && !blThere) {
+        store.copy(rotation.strTid, strOld, rotation.jBefore["create_time"].asInt64());
+    }
+    if (blThere && !rotation.jChange.empty()) {
+        Json::Value jDeadline;
+        jDeadline["deadline"] = rotation.jBefore["deadline"];
+        store.update(strOld, jDeadline);
+    }
+    store.removeTid(rotation.strTid);
+    return "the change was taken back";
+}
+
+int rotate(const Options& options)
+{
+    Rotation rotation;
+    const std::string strName = tool::readTid("TID", options.strTid);
+    rotation.strTid = tool::newTid();
+    const std::string strLine = tool::resultLine(rotation.strTid);
+    auto pStore = prepare(strName, options, rotation);
+    tool::handOver(std::move(pStore), strLine,
+                   [&rotation](tool::Store& store) { return undo(store, rotation); });
+    if (!rotation.blKept) {
+        tool::outlastRevoked(std::set<std::string>{rotation.jBefore["tid"].asString()});
+    } else if (!rotation.jChange.empty()) {
+        tool::outlastUpdated(rotation.jBefore, rotation.jChange);
+    }
+    return tool::EXIT_STATUS_DONE;
+}
+
+} // namespace
+
+namespace tool {
+
+void addRotate(Commands& commands)
+{
+    auto pOptions = std::make_shared<Options>();
+    Command& command = commands.add("rotate", "give a token a fresh id, and print that",
+                                    [pOptions] { return rotate(*pOptions); });
+    addTid(command, pOptions->strTid);
+    addParsed(command, "--grace", "DURATION", pOptions->nGrace, parseDuration,
+              "the old id stays good for so long, at most");
+}
+
+} // namespace tool

@@ -1,0 +1,63 @@
+#include "Steps.h"
+
+#include <algorithm>
+#include <thread>
+
+#include "Place.h"
+
+namespace {
+
+// How long a step is to take, and how many tokens it has at first and at most. What is written must get to
+// the disk each time, so there are fewer steps for that.
+const std::chrono::milliseconds READING(20);
+const std::chrono::milliseconds WRITING(100);
+const size_t TOKENS_FIRST = 250;
+const size_t TOKENS_MAX = 64000;
+
+// Programs that wait for the database try each 10 ms; in between, one of them has it.
+const std::chrono::milliseconds PAUSE(12);
+
+} // namespace
+
+namespace tool {
+
+Steps::Steps(Store::Access access) : m_access(access), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
+{
+}
+
+bool Steps::next(const Use& use)
+{
+    if (m_blEnd) {
+        return false;
+    }
+    std::this_thread::sleep_until(m_ended + PAUSE);
+    const Clock::time_point start = Clock::now();
+    {
+        Store store(m_access);
+        const std::string strFrom = m_strLast.empty() ? "tid IS NULL OR " : "tid > " + m_strLast + " AND ";
+        const std::string strBound =
+            store.text(std::string("SELECT ") + SQL_QUOTED_TID + " FROM token" +
+                       (m_strLast.empty() ? "" : " WHERE tid > " + m_strLast) +
+                       " ORDER BY tid LIMIT 1 OFFSET " + std::to_string(m_nTokens - 1));
+        m_blEnd = strBound.empty();
+        const std::string strTo = m_blEnd ? "true" : "tid <= " + strBound;
+        use(store, "(" + strFrom + strTo + ")");
+        m_strLast = strBound;
+        if (Store::Access::Write == m_access) {
+            store.commit();
+        }
+    }
+    m_ended = Clock::now();
+    if (Store::Access::Write != m_access) {
+        syncDirectory("a power cut can undo what others changed last");
+    }
+    const std::chrono::milliseconds wanted = Store::Access::Write == m_access ? WRITING : READING;
+    if (m_ended - start > 2 * wanted) {
+        m_nTokens = std::max(TOKENS_FIRST, m_nTokens / 2);
+    } else if (m_ended - start < wanted) {
+        m_nTokens = std::min(TOKENS_MAX, m_nTokens * 2);
+    }
+    return true;
+}
+
+} // namespace tool

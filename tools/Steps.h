@@ -1,0 +1,44 @@
+// All tokens, some at a time.
+//
+// Between two steps others can change tokens, and nobody waits long for one. Tokens do not depend on each
+// other, so this is as good as one look at all of them: a token that is there throughout comes exactly once,
+// and one that comes or goes meanwhile once or not at all.
+
+#ifndef TOOLS_STEPS_H
+#define TOOLS_STEPS_H
+
+#include <chrono>
+#include <functional>
+#include <string>
+
+#include "Store.h"
+
+namespace tool {
+
+// Members throw Failure.
+class Steps {
+public:
+    // access: Glance, or Write where something is to change.
+    explicit Steps(Store::Access access);
+
+    // Looks at the next tokens, in the order of their ids, which fulfil a condition in SQL. The transaction
+    // ends, with what was changed on the disk, when the function returns.
+    typedef std::function<void(Store&, const std::string& strThose)> Use;
+
+    // Returns false, and calls nothing, when there are no more. What it returns true for outlasts a power
+    // cut, as do the changes of others that it met.
+    bool next(const Use& use);
+
+private:
+    typedef std::chrono::steady_clock Clock;
+
+    const Store::Access m_access;
+    size_t m_nTokens;      // of a step
+    std::string m_strLast; // the id that the last step ended with, as SQL
+    bool m_blEnd = false;
+    Clock::time_point m_ended; // the last step
+};
+
+} // namespace tool
+
+#endif
