@@ -117,7 +117,8 @@ void addSelection(Command& command, Selection& selection)
     addParsed(command, "--created-after", "TIME", selection.nCreatedAfter, parseTime,
               "those made then or later");
     addAllowances(command, "--opens", selection.opens, "those that open these methods, or the API alone");
-    command.flag("--no-owner", selection.blNoOwner, "those whose owner is no user of this machine any more");
+    command.flag("--no-owner", selection.blNoOwner,
+                 "those whose owner is not a user of this machine any more");
     command.flag("--unlimited", selection.blUnlimited, "those with any number of uses");
     command.flag("--expired", selection.blExpired, "those whose deadline has passed");
     addParsed(command, "--expiring", "DURATION", selection.nExpiring, parseDuration,

@@ -84,7 +84,7 @@ BadValue badPath(const std::string& strPath, const std::string& strReached)
     switch (errno) {
     case ELOOP:
         return BadValue(shownPath(strReached) + " is a symbolic link; name the place that it leads to");
-    case EINVAL: return BadValue(shownPath(strPath) + " is no regular file");
+    case EINVAL: return BadValue(shownPath(strPath) + " is not a regular file");
     default: return BadValue(shownPath(strPath) + ": " + strerror(errno));
     }
 }

@@ -150,7 +150,7 @@ bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings
                             none});
         return true;
     case ENOTDIR:
-        findings.push_back({Finding::Severity::Error, strPath + " is no directory",
+        findings.push_back({Finding::Severity::Error, strPath + " is not a directory",
                             "the tokens stand elsewhere, or nowhere",
                             "find out who made it; move the database to a directory of that name", none});
         return false;
@@ -213,7 +213,7 @@ bool examineBeside(Findings& findings)
         if (!S_ISREG(status->st_mode)) {
             findings.push_back(
                 {Finding::Severity::Error,
-                 strPath + (S_ISLNK(status->st_mode) ? " is a symbolic link" : " is no regular file"),
+                 strPath + (S_ISLNK(status->st_mode) ? " is a symbolic link" : " is not a regular file"),
                  "the database takes it for a journal of its own: calls can fail, or never end",
                  strRemedy,
                  {}});
@@ -259,7 +259,7 @@ bool examineFile(bool blMake, Findings& findings)
     if (!S_ISREG(status->st_mode)) {
         findings.push_back(
             {Finding::Severity::Error,
-             strPath + (S_ISLNK(status->st_mode) ? " is a symbolic link" : " is no regular file"),
+             strPath + (S_ISLNK(status->st_mode) ? " is a symbolic link" : " is not a regular file"),
              "programs work on another file than this one, or on none",
              "find out who made it; move the database to this name",
              {}});

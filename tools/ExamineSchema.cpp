@@ -200,7 +200,7 @@ void examineEncoding(Store& store, Findings& findings)
     if (strEncoding != "UTF-8") {
         findings.push_back({Finding::Severity::Error,
                             "the database is in " + strEncoding + ", and not in UTF-8",
-                            "bytes that are no UTF-8 are not kept: such an id is never found again",
+                            "bytes that are not UTF-8 are not kept: such an id is never found again",
                             tool::REMEDY_SAVE_AND_REPLACE,
                             {}});
     }

@@ -32,12 +32,12 @@ std::string flawInSql()
         };
         const Json::Value& jDefault = VEMO_ACCESS_TOKEN::tokenType()[strName][1];
         if (jDefault.isIntegral()) {
-            add("typeof(" + strName + ") <> 'integer'", "is no whole number");
+            add("typeof(" + strName + ") <> 'integer'", "is not a whole number");
             continue;
         }
         add("instr(" + strName + ", char(0))", "holds a NUL character");
         if (jDefault.isString()) {
-            add("typeof(" + strName + ") <> 'text'", "is no text");
+            add("typeof(" + strName + ") <> 'text'", "is not a text");
         }
     }
     return strSql + " ELSE '' END";

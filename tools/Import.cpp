@@ -41,7 +41,7 @@ struct Line {
     Json::Value jToken;
 };
 
-// How a file was read: how many tokens it has, and why it is no whole export; "" when it is one.
+// How a file was read: how many tokens it has, and why it is not a whole export; "" when it is one.
 struct Contents {
     uint64_t nTokens = 0;
     std::string strFlaw = "the export has no end";
@@ -66,10 +66,10 @@ void checkRecord(const Json::Value& jToken)
         const Json::Value& jValue = jToken[strName];
         const bool blWhole = jValue.isInt64() && Json::realValue != jValue.type();
         if (jDefault.isIntegral() && !blWhole) {
-            throw tool::BadValue("\"" + strName + "\" is no whole number");
+            throw tool::BadValue("\"" + strName + "\" is not a whole number");
         }
         if (jDefault.isString() && !jValue.isString()) {
-            throw tool::BadValue("\"" + strName + "\" is no string");
+            throw tool::BadValue("\"" + strName + "\" is not a string");
         }
         if (jDefault.isString() && jValue.asString().find('\0') != std::string::npos) {
             throw tool::BadValue("\"" + strName + "\" holds a NUL character");
@@ -77,7 +77,7 @@ void checkRecord(const Json::Value& jToken)
     }
     for (const std::string& strName : jToken.getMemberNames()) {
         if (!VEMO_ACCESS_TOKEN::tokenType().isMember(strName)) {
-            throw tool::BadValue(tool::quoted(strName) + " is no field of a token");
+            throw tool::BadValue(tool::quoted(strName) + " is not a field of a token");
         }
     }
 }

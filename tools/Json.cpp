@@ -90,11 +90,11 @@ Json::Value ObjectReader::read(const std::string& strText) const
     std::string strReport;
     switch (readBy(*m_pReader, strText, jValue, strReport)) {
     case Reading::Whole: break;
-    case Reading::Bad: throw BadValue("is no JSON: " + shownReason(firstError(strReport)));
+    case Reading::Bad: throw BadValue("is not JSON: " + shownReason(firstError(strReport)));
     case Reading::TooDeep: throw BadValue("is nested too deeply for JSON");
     }
     if (!jValue.isObject()) {
-        throw BadValue("is no JSON object");
+        throw BadValue("is not a JSON object");
     }
     return jValue;
 }
@@ -109,7 +109,7 @@ std::string flawOfStored(const std::string& strText)
     Json::Value jValue;
     std::string strReport;
     const Reading reading = readBy(*pReader, strText, jValue, strReport);
-    return Reading::Whole == reading ? "" : Reading::Bad == reading ? "is no JSON" : "is nested too deeply";
+    return Reading::Whole == reading ? "" : Reading::Bad == reading ? "is not JSON" : "is nested too deeply";
 }
 
 int nestingOf(const std::string& strText)

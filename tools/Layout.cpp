@@ -25,7 +25,7 @@ Layout::Form parseForm(const std::string& strText, const char* szForms)
     if (strText == "jsonl") {
         return Layout::Form::JsonLines;
     }
-    throw tool::BadValue(tool::quoted(strText) + " is no form: " + szForms);
+    throw tool::BadValue(tool::quoted(strText) + " is not a form: " + szForms);
 }
 
 std::string timeIn(const Json::Value& jTime, const Layout& layout)
@@ -137,7 +137,7 @@ std::vector<size_t> parseColumns(const std::string& strText)
             for (const Column& column : COLUMNS) {
                 strNames += (strNames.empty() ? "" : ", ") + std::string(column.szName);
             }
-            throw tool::BadValue(tool::quoted(strName) + " is no column: " + strNames);
+            throw tool::BadValue(tool::quoted(strName) + " is not a column: " + strNames);
         }
         nColumns.push_back(static_cast<size_t>(pColumn - std::begin(COLUMNS)));
     }
@@ -225,7 +225,7 @@ std::string parseField(const std::string& strText)
 {
     const std::vector<std::string> strNames = fieldNames();
     if (strNames.end() == std::find(strNames.begin(), strNames.end(), strText)) {
-        throw BadValue(quoted(strText) + " is no field of a token");
+        throw BadValue(quoted(strText) + " is not a field of a token");
     }
     return strText;
 }

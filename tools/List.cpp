@@ -122,7 +122,7 @@ int list(const ListOptions& options)
     eachOf(ids, options, [&printer](Json::Value& jToken) { printer.print(jToken); });
     printer.end();
     if (0 == nTokens) {
-        tool::complain("there are no such tokens");
+        tool::complain("no token matches");
     }
     if (options.nLimit && static_cast<uint64_t>(*options.nLimit) < nTokens) {
         tool::complain(std::to_string(*options.nLimit) + " of " + std::to_string(nTokens) +

@@ -140,7 +140,7 @@ void NewFile::requirePlace() const
     if (blThere && !S_ISREG(status.st_mode)) {
         throw Failure(EXIT_STATUS_USAGE,
                       shownPath(m_strPath) +
-                          " is no regular file; to write to a pipe, write to standard output");
+                          " is not a regular file; to write to a pipe, write to standard output");
     }
 }
 

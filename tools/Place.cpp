@@ -91,7 +91,7 @@ void requireDatabase(bool blCreate)
     struct stat status = {};
     if (0 == stat(VEMO_ATOKEN_DB_PATH, &status)) {
         if (!S_ISREG(status.st_mode)) {
-            throw Failure(EXIT_STATUS_STORE, VEMO_ATOKEN_DB_PATH " is no regular file");
+            throw Failure(EXIT_STATUS_STORE, VEMO_ATOKEN_DB_PATH " is not a regular file");
         }
         return;
     }

@@ -107,8 +107,7 @@ int revokeNamed(const RevokeOptions& options)
 bool isWanted(const tool::Selection& selection)
 {
     if (!tool::isTerminal(stdin) || !tool::isTerminal(stderr)) {
-        throw tool::Failure(tool::EXIT_STATUS_USAGE,
-                            "--yes is needed to revoke many where there is nobody to ask");
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, "repeat with --yes: there is nobody to ask");
     }
     const uint64_t nTokens = tool::countSelected(selection);
     return 0 == nTokens || tool::confirm("Revoke " + tool::countText(nTokens, "token") + "?");

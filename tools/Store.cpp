@@ -57,7 +57,7 @@ std::pair<std::string, std::string> explained(const std::string& strErr)
         return {"has no table of tokens", "\"vemo-access-token doctor --repair\" makes it"};
     }
     if (contains(strErr, "file is not a database")) {
-        return {"is no token database, or a damaged one (" + strErr + ")", ""};
+        return {"is not a token database, or is damaged (" + strErr + ")", ""};
     }
     if (contains(strErr, "malformed")) {
         return {"is damaged (" + strErr + ")", "\"vemo-access-token doctor\" says how badly"};

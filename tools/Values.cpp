@@ -102,7 +102,7 @@ std::optional<int64_t> readNumber(const char*& szText, const char* szEnd)
 
 [[noreturn]] void failOnDuration(const std::string& strText)
 {
-    throw tool::BadValue(tool::quoted(strText) + " is no duration such as 90s, 15m, 8h, 2d12h or 1w");
+    throw tool::BadValue(tool::quoted(strText) + " is not a duration: write 90s, 15m, 8h, 2d12h or 1w");
 }
 
 } // namespace
@@ -115,7 +115,7 @@ int64_t parseNumber(const std::string& strText, int64_t nMin, int64_t nMax)
     const char* szEnd = szRest + strText.size();
     const auto nNumber = readNumber(szRest, szEnd);
     if (!nNumber || szRest != szEnd || *nNumber < nMin || *nNumber > nMax) {
-        throw BadValue(quoted(strText) + " is no number from " + std::to_string(nMin) + " to " +
+        throw BadValue(quoted(strText) + " is not a number from " + std::to_string(nMin) + " to " +
                        std::to_string(nMax));
     }
     return *nNumber;
@@ -223,7 +223,7 @@ int64_t parseTime(const std::string& strText)
     }
     throw BadValue(
         quoted(strText) +
-        " is no time such as 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @1798761599");
+        " is not a time: write 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @1798761599");
 }
 
 std::string countText(uint64_t nCount, const std::string& strWhat)

@@ -66,14 +66,14 @@ TEST(Json, IsReadStrictly)
     const char* const CASES[][2] = {
         {R"({"a":[1,"b",null]})", R"({"a":[1,"b",null]})"},
         {"{\n \"a\": NaN, \"b\": -Infinity}", R"({"a":NaN,"b":-Infinity})"},
-        {"", "is no JSON: Column 1 Syntax error: value, object or array expected."},
-        {"[]", "is no JSON object"},
-        {"1", "is no JSON: Column 1 A valid JSON document must be either an array or an object value."},
-        {R"({"a":1} x)", "is no JSON: Column 9 Extra non-whitespace after JSON value."},
-        {R"({"a":1,"a":2})", "is no JSON: Column 8 Duplicate key: 'a'"},
-        {R"({'a':1})", "is no JSON: Column 2 Missing '}' or object member name"},
-        {"{\n\"a\":}", "is no JSON: Line 2, Column 5 Syntax error: value, object or array expected."},
-        {R"({"a":tru,"b":fals})", "is no JSON: Column 6 Syntax error: value, object or array expected."},
+        {"", "is not JSON: Column 1 Syntax error: value, object or array expected."},
+        {"[]", "is not a JSON object"},
+        {"1", "is not JSON: Column 1 A valid JSON document must be either an array or an object value."},
+        {R"({"a":1} x)", "is not JSON: Column 9 Extra non-whitespace after JSON value."},
+        {R"({"a":1,"a":2})", "is not JSON: Column 8 Duplicate key: 'a'"},
+        {R"({'a':1})", "is not JSON: Column 2 Missing '}' or object member name"},
+        {"{\n\"a\":}", "is not JSON: Line 2, Column 5 Syntax error: value, object or array expected."},
+        {R"({"a":tru,"b":fals})", "is not JSON: Column 6 Syntax error: value, object or array expected."},
     };
     for (const auto& each : CASES) {
         EXPECT_EQ(each[1], read(each[0])) << each[0];
@@ -87,7 +87,7 @@ TEST(Json, ThatATokenHoldsIsReadAsLenientlyAsByTheLibrary)
     for (const std::string& strText : {std::string("/**/{\"a\":1,}x"), std::string("1"), nested(1000)}) {
         EXPECT_EQ("", flawOfStored(strText));
     }
-    EXPECT_EQ("is no JSON", flawOfStored("{"));
+    EXPECT_EQ("is not JSON", flawOfStored("{"));
     EXPECT_EQ("is nested too deeply", flawOfStored(nested(1001)));
 }
 

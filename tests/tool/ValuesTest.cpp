@@ -55,8 +55,8 @@ TEST(Users, AreNotLookedUpByNumbersThatNobodyCanHave)
 TEST(Users, HaveNumbersButForTheLast)
 {
     EXPECT_EQ(4294967294U, tool::parseUid("4294967294"));
-    EXPECT_EQ("\"4294967295\" is no number from 0 to 4294967294", refusal(tool::parseUid, "4294967295"));
-    EXPECT_EQ("\"-1\" is no number from 0 to 4294967294", refusal(tool::parseUid, "-1"));
+    EXPECT_EQ("\"4294967295\" is not a number from 0 to 4294967294", refusal(tool::parseUid, "4294967295"));
+    EXPECT_EQ("\"-1\" is not a number from 0 to 4294967294", refusal(tool::parseUid, "-1"));
 }
 
 TEST(Durations, AreANumberOfSecondsOrNumbersWithUnits)
@@ -113,7 +113,7 @@ TEST(Durations, AreFromASecondToAThousandYears)
                                       "9223372036854775808s",
                                       "9223372036854775807w",
                                       "99999999999999999999w"}) {
-        EXPECT_EQ("\"" + strText + "\" is no duration such as 90s, 15m, 8h, 2d12h or 1w",
+        EXPECT_EQ("\"" + strText + "\" is not a duration: write 90s, 15m, 8h, 2d12h or 1w",
                   refusal(parseDuration, strText));
     }
 }
@@ -163,7 +163,8 @@ TEST(Times, ThatDoNotExistAreRefused)
 {
     const auto sentence = [](const std::string& strText) {
         return "\"" + strText +
-               "\" is no time such as 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @1798761599";
+               "\" is not a time: write 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or "
+               "@1798761599";
     };
     setZone("Europe/Berlin");
     for (const char* szText : {"",
@@ -196,7 +197,7 @@ TEST(Times, ThatDoNotExistAreRefused)
     setZone("Australia/Lord_Howe"); // where they leap over half an hour
     EXPECT_EQ(sentence("2060-10-03 02:15"), refusal(parseTime, "2060-10-03 02:15"));
     for (const std::string strSeconds : {"", "-1", " 1", "1x", "1.5", "9223372036854775808", "4000000000Z"}) {
-        EXPECT_EQ("\"" + strSeconds + "\" is no number from 0 to 9223372036854775807",
+        EXPECT_EQ("\"" + strSeconds + "\" is not a number from 0 to 9223372036854775807",
                   refusal(parseTime, "@" + strSeconds));
     }
 }

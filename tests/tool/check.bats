@@ -154,7 +154,7 @@ second-1 '' get||API: must not be empty
 second Api||TID: "second" is too short: give the id or its first 8 characters, or more
 second-1 Api||TID: several tokens begin with "second-1"; give more of the id
 second-1 Api get put||unexpected argument "put"
-second-1 Api -o xml||--output: "xml" is no form: table, json or jsonl
+second-1 Api -o xml||--output: "xml" is not a form: table, json or jsonl
 second-1 Api --utc||unknown option "--utc"
 - Api||TID: there is no id on standard input
 - Api|\n|TID: there is no id on standard input

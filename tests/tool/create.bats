@@ -72,20 +72,20 @@ create --function VPN|--uid or --user is required
 create --uid 0|--function is required
 create --uid 0 --user root --function VPN|--uid excludes --user
 create --uid 0 --function ''|--function: must not be empty
-create --uid x --function VPN|--uid: "x" is no number from 0 to 4294967294
-create --uid -1 --function VPN|--uid: "-1" is no number from 0 to 4294967294
-create --uid 4294967295 --function VPN|--uid: "4294967295" is no number from 0 to 4294967294
-create --uid '' --function VPN|--uid: "" is no number from 0 to 4294967294
+create --uid x --function VPN|--uid: "x" is not a number from 0 to 4294967294
+create --uid -1 --function VPN|--uid: "-1" is not a number from 0 to 4294967294
+create --uid 4294967295 --function VPN|--uid: "4294967295" is not a number from 0 to 4294967294
+create --uid '' --function VPN|--uid: "" is not a number from 0 to 4294967294
 create --user no-such-user --function VPN|--user: there is no user "no-such-user"
 create --user '' --function VPN|--user: there is no user ""
-create --uid 0 --function VPN --uses 0|--uses: "0" is no number from 1 to 9223372036854775807
-create --uid 0 --function VPN --uses -1|--uses: "-1" is no number from 1 to 9223372036854775807
-create --uid 0 --function VPN --uses 1.5|--uses: "1.5" is no number from 1 to 9223372036854775807
-create --uid 0 --function VPN --uses 9223372036854775808|--uses: "9223372036854775808" is no number from 1 to 9223372036854775807
+create --uid 0 --function VPN --uses 0|--uses: "0" is not a number from 1 to 9223372036854775807
+create --uid 0 --function VPN --uses -1|--uses: "-1" is not a number from 1 to 9223372036854775807
+create --uid 0 --function VPN --uses 1.5|--uses: "1.5" is not a number from 1 to 9223372036854775807
+create --uid 0 --function VPN --uses 9223372036854775808|--uses: "9223372036854775808" is not a number from 1 to 9223372036854775807
 create --uid 0 --function VPN --uses 2 --unlimited|--uses excludes --unlimited
 create --uid 0 --function|--function: needs a value
 create --uid 0 --uid 1 --function VPN|--uid: can be given once only
-create --uid 0 --function VPN -o csv|--output: "csv" is no form: table, json or jsonl
+create --uid 0 --function VPN -o csv|--output: "csv" is not a form: table, json or jsonl
 create --uid 0 --function VPN --count|unknown option "--count"
 create --uid 0 --function VPN more|unexpected argument "more"
 generate more|unexpected argument "more"
@@ -172,25 +172,25 @@ END
     [ "$(tool show "$tid" --field extra)" = "$(nested 1000)" ]
 }
 
-@test "an --extra that is no JSON object is refused" {
+@test "an --extra that is not a JSON object is refused" {
     tool init
     while IFS='|' read -r extra sentence; do
         echo "$extra"
         run_tool create --uid 0 --function VPN --extra "$extra"
         expect 2 "" "vemo-access-token: --extra: $sentence"
     done <<'END'
-[]|is no JSON object
-[{"a":1}]|is no JSON object
-|is no JSON: Column 1 Syntax error: value, object or array expected.
-{|is no JSON: Column 2 Missing '}' or object member name
-{"a":1,}|is no JSON: Column 8 Missing '}' or object member name
-{"a" 1}|is no JSON: Column 6 Missing ':' after object member name
-{"a":1} x|is no JSON: Column 9 Extra non-whitespace after JSON value.
-{"a":1,"a":2}|is no JSON: Column 8 Duplicate key: 'a'
-{a:1}|is no JSON: Column 2 Missing '}' or object member name
-{} //|is no JSON: Column 4 Extra non-whitespace after JSON value.
-1|is no JSON: Column 1 A valid JSON document must be either an array or an object value.
-null|is no JSON: Column 1 A valid JSON document must be either an array or an object value.
+[]|is not a JSON object
+[{"a":1}]|is not a JSON object
+|is not JSON: Column 1 Syntax error: value, object or array expected.
+{|is not JSON: Column 2 Missing '}' or object member name
+{"a":1,}|is not JSON: Column 8 Missing '}' or object member name
+{"a" 1}|is not JSON: Column 6 Missing ':' after object member name
+{"a":1} x|is not JSON: Column 9 Extra non-whitespace after JSON value.
+{"a":1,"a":2}|is not JSON: Column 8 Duplicate key: 'a'
+{a:1}|is not JSON: Column 2 Missing '}' or object member name
+{} //|is not JSON: Column 4 Extra non-whitespace after JSON value.
+1|is not JSON: Column 1 A valid JSON document must be either an array or an object value.
+null|is not JSON: Column 1 A valid JSON document must be either an array or an object value.
 END
     run_tool create --uid 0 --function VPN --extra "$(nested 1001)"
     expect 2 "" "vemo-access-token: --extra: is nested too deeply for JSON"
@@ -214,10 +214,10 @@ $DIR/missing|$DIR/missing: No such file or directory
 $DIR|$DIR: Is a directory
 $DIR/nul|$DIR/nul holds a NUL byte
 $DIR/nul-behind|$DIR/nul-behind holds a NUL byte
-$DIR/array|is no JSON object
-$DIR/broken|is no JSON: Column 6 Syntax error: value, object or array expected.
-$DIR/lines|is no JSON: Line 3, Column 1 Syntax error: value, object or array expected.
-$DIR/empty|is no JSON: Column 1 Syntax error: value, object or array expected.
+$DIR/array|is not a JSON object
+$DIR/broken|is not JSON: Column 6 Syntax error: value, object or array expected.
+$DIR/lines|is not JSON: Line 3, Column 1 Syntax error: value, object or array expected.
+$DIR/empty|is not JSON: Column 1 Syntax error: value, object or array expected.
 |"@" names no file
 END
     [ "$(sql "SELECT count(*) FROM token")" = 0 ]

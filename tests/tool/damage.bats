@@ -4,7 +4,7 @@
 
 load common
 
-NO_DATABASE="is no token database, or a damaged one (file is not a database)"
+NO_DATABASE="is not a token database, or is damaged (file is not a database)"
 MALFORMED="is damaged (database disk image is malformed); \"vemo-access-token doctor\" says how badly"
 UNREADABLE="holds a token that cannot be read; \"vemo-access-token doctor\" finds it"
 
@@ -277,14 +277,14 @@ create --uid 0 --function TAG"
     doctor_finds "the table of tokens lacks columns: extra"
 }
 
-@test "what stands in the database's place is no regular file" {
+@test "what stands in the database's place is not a regular file" {
     a_store
     rm "$DB"
     local make finding
     while IFS='|' read -r make finding; do
         $make "$DB"
-        all_fail "$REAL_DB is no regular file" "$([ "$make" = mkfifo ] && commands || some_commands)"
-        all_fail "$REAL_DB is no regular file" init
+        all_fail "$REAL_DB is not a regular file" "$([ "$make" = mkfifo ] && commands || some_commands)"
+        all_fail "$REAL_DB is not a regular file" init
         doctor_looks "$REAL_DB is $finding"
         rm -d "$DB"
     done <<'TABLE'
@@ -323,7 +323,7 @@ TABLE
     all_fail "${REAL_DB%/*}: Not a directory" init
     run_shortly doctor
     [ "$status" -eq 5 ]
-    [ "${lines[0]}" = "error: ${REAL_DB%/*} is no directory" ]
+    [ "${lines[0]}" = "error: ${REAL_DB%/*} is not a directory" ]
 }
 
 @test "no database, and no directory" {

@@ -181,7 +181,7 @@ error: there is no database $REAL_DB
 
 @test "another thing in place of the directory is left to the administrator" {
     echo text >"$VEMO_REDIRECT_DIR"
-    expect_no_repair error "$DIRECTORY is no directory" "the tokens stand elsewhere, or nowhere" \
+    expect_no_repair error "$DIRECTORY is not a directory" "the tokens stand elsewhere, or nowhere" \
         "find out who made it; move the database to a directory of that name"
     [ "$(cat "$VEMO_REDIRECT_DIR")" = text ]
 }
@@ -201,7 +201,7 @@ error: there is no database $REAL_DB
 @test "another thing in place of the file is left to the administrator" {
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
     mkdir "$DB"
-    expect_no_repair error "$REAL_DB is no regular file" "programs work on another file than this one, or on none" \
+    expect_no_repair error "$REAL_DB is not a regular file" "programs work on another file than this one, or on none" \
         "find out who made it; move the database to this name"
 }
 
@@ -228,7 +228,7 @@ TABLE
     run_tool doctor --repair
     [ "$status" -eq 5 ]
     [ "$stderr" = "" ]
-    [ "${lines[0]}" = "error: $REAL_DB-journal is no regular file" ]
+    [ "${lines[0]}" = "error: $REAL_DB-journal is not a regular file" ]
     [ "${lines[3]}" = "error: there is no database $REAL_DB" ]
     rm "$DB-journal"
     mv "$DIR/away" "$DB"
@@ -426,7 +426,7 @@ error: $DIRECTORY: Too many levels of symbolic links
     echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
     chmod 0600 "$DB"
     cp "$DB" "$DIR/text"
-    expect_no_repair error "$REAL_DB is no token database, or a damaged one (file is not a database)" \
+    expect_no_repair error "$REAL_DB is not a token database, or is damaged (file is not a database)" \
         "programs fail in the same way" "mend the cause; or $REPLACE"
     cmp "$DB" "$DIR/text"
 }
@@ -522,7 +522,7 @@ TABLE
     install -m 0700 /dev/null "$DB"
     sqlite3 -cmd "PRAGMA encoding = 'UTF-16le'" "$DB" <"$DIR/dump"
     expect_no_repair error "the database is in UTF-16le, and not in UTF-8" \
-        "bytes that are no UTF-8 are not kept: such an id is never found again" "$SAVE_AND_REPLACE"
+        "bytes that are not UTF-8 are not kept: such an id is never found again" "$SAVE_AND_REPLACE"
     save_and_replace
     expect_sound
 }
@@ -649,7 +649,7 @@ TABLE
         "no program has called since, or its purges fail" "vemo-access-token purge"
 }
 
-@test "what is no whole number is left to the administrator" {
+@test "what is not a whole number is left to the administrator" {
     a_row kept
     deadline="'soon'" a_row aaaaaaaa
     count=1.5 a_row bbbbbbbb
@@ -724,7 +724,7 @@ TABLE
     expect_sound
 }
 
-@test "what is no JSON object is left to the administrator" {
+@test "what is not a JSON object is left to the administrator" {
     a_row kept
     extra="'{\"a\":Infinity}'" a_row kept-too # JSON for the library
     webapi_allow="'[]'" a_row aaaaaaaa-long
@@ -1011,7 +1011,7 @@ sys.stdout.buffer.write(child.before.replace(b"\r\n", b"\n"))'
         run_tool doctor $arguments
         expect 2 "" "vemo-access-token: $sentence"
     done <<'TABLE'
--o xml|--output: "xml" is no form: table, json or jsonl
+-o xml|--output: "xml" is not a form: table, json or jsonl
 --fix|unknown option "--fix"
 aaaaaaaa|unexpected argument "aaaaaaaa"
 TABLE

@@ -80,7 +80,7 @@ made the table of tokens"
 
     mkdir -p "$DB"
     run_tool init
-    expect 4 "" "vemo-access-token: $REAL_DB is no regular file"
+    expect 4 "" "vemo-access-token: $REAL_DB is not a regular file"
     rmdir "$DB"
 
     ln -s nowhere/x "$DB"
@@ -106,7 +106,7 @@ made the table of tokens"
     echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
     cp "$DB" "$DIR/text"
     run_tool init
-    expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+    expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
     cmp "$DB" "$DIR/text"
 }
 

@@ -35,18 +35,18 @@ later---  4294967294  VPN         unlimited  $(at $((now + 200000)))  in 2 d    
 @test "where there are no tokens, list says so and succeeds" {
     tool init
     run_tool list
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
     run_tool list -o json
-    expect 0 "[]" "vemo-access-token: there are no such tokens"
+    expect 0 "[]" "vemo-access-token: no token matches"
     run_tool list -o jsonl
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
     run_tool list --field uid
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
     run_tool list --count
     expect 0 0
     row token---
     run_tool list --function Other
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
 }
 
 @test "times are in local time, in UTC or in seconds" {
@@ -162,9 +162,9 @@ END
     lists d------- --user nobody --function Other --bind-sid s1
     lists b------- --uid 65534 --function VPN --bind-sid ''
     run_tool list --function '' --field tid
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
     run_tool list --function other --field tid
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
 }
 
 @test "an option with nothing behind its equals sign is given the empty text, not the next argument" {
@@ -183,7 +183,7 @@ END
     lists b------- --function "$odd\""
     lists b------- --bind-sid %
     run_tool list --bind-sid "$odd" --field tid
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
 }
 
 @test "list selects what has expired and what soon will, alone and together" {
@@ -201,7 +201,7 @@ END
     lists b------- --expired --function Other
     lists "b------- c-------" --expired --expiring 3h --function Other --uid 0
     run_tool list --expiring 60s
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
 }
 
 @test "list selects by time of creation, by what a token opens, by its uses and by owners that are gone" {
@@ -236,7 +236,7 @@ END
     for arguments in "--opens a" "--opens A:M" "--opens A:m:n" "--no-owner --unlimited" \
         "--created-after @2000000000 --created-before @2000000000"; do
         run_tool list --field tid $arguments
-        expect 0 "" "vemo-access-token: there are no such tokens"
+        expect 0 "" "vemo-access-token: no token matches"
     done
     run_tool list --count --no-owner --opens A:m
     expect 0 1
@@ -281,7 +281,7 @@ b-------,4294967294,VPN,unlimited,2099-01-25 09:00:02Z,"",""'
     [ "${lines[0]}" = "tid,user,function,uses,deadline,expires,session,allows" ]
     [[ ${lines[1]} == "a-------$ZEROS,root,"* ]]
     run_tool list -o csv --uid 7
-    expect 0 "" "vemo-access-token: there are no such tokens"
+    expect 0 "" "vemo-access-token: no token matches"
 }
 
 @test "--columns chooses those of a table" {
@@ -387,31 +387,31 @@ END
 more|unexpected argument "more"
 --unknown|unknown option "--unknown"
 --uid 0 --user root|--uid excludes --user
---uid root|--uid: "root" is no number from 0 to 4294967294
---uid '0 or 1=1'|--uid: "0 or 1=1" is no number from 0 to 4294967294
---uid 4294967295|--uid: "4294967295" is no number from 0 to 4294967294
+--uid root|--uid: "root" is not a number from 0 to 4294967294
+--uid '0 or 1=1'|--uid: "0 or 1=1" is not a number from 0 to 4294967294
+--uid 4294967295|--uid: "4294967295" is not a number from 0 to 4294967294
 --user no-such-user|--user: there is no user "no-such-user"
---limit ''|--limit: "" is no number from 1 to 9223372036854775807
---expiring 0|--expiring: "0" is no duration such as 90s, 15m, 8h, 2d12h or 1w
---expiring soon|--expiring: "soon" is no duration such as 90s, 15m, 8h, 2d12h or 1w
---sort colour|--sort: "colour" is no field of a token
---sort tid:asc|--sort: "tid:asc" is no field of a token
---sort :desc|--sort: ":desc" is no field of a token
---sort ''|--sort: "" is no field of a token
---limit 0|--limit: "0" is no number from 1 to 9223372036854775807
---limit -1|--limit: "-1" is no number from 1 to 9223372036854775807
---limit ten|--limit: "ten" is no number from 1 to 9223372036854775807
---limit 9223372036854775808|--limit: "9223372036854775808" is no number from 1 to 9223372036854775807
---created-before soon|--created-before: "soon" is no time such as 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
---created-after ''|--created-after: "" is no time such as 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
+--limit ''|--limit: "" is not a number from 1 to 9223372036854775807
+--expiring 0|--expiring: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
+--expiring soon|--expiring: "soon" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
+--sort colour|--sort: "colour" is not a field of a token
+--sort tid:asc|--sort: "tid:asc" is not a field of a token
+--sort :desc|--sort: ":desc" is not a field of a token
+--sort ''|--sort: "" is not a field of a token
+--limit 0|--limit: "0" is not a number from 1 to 9223372036854775807
+--limit -1|--limit: "-1" is not a number from 1 to 9223372036854775807
+--limit ten|--limit: "ten" is not a number from 1 to 9223372036854775807
+--limit 9223372036854775808|--limit: "9223372036854775808" is not a number from 1 to 9223372036854775807
+--created-before soon|--created-before: "soon" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
+--created-after ''|--created-after: "" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
 --opens :m|--opens: ":m" names no API: write API or API:METHOD,METHOD
 --opens A:|--opens: "A:" has an empty method: write API or API:METHOD,METHOD
---columns ''|--columns: "" is no column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
---columns tid,|--columns: "" is no column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
---columns name|--columns: "name" is no column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
--o xml|--output: "xml" is no form: table, json, jsonl or csv
--o JSON|--output: "JSON" is no form: table, json, jsonl or csv
---field name|--field: "name" is no field of a token
+--columns ''|--columns: "" is not a column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
+--columns tid,|--columns: "" is not a column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
+--columns name|--columns: "name" is not a column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
+-o xml|--output: "xml" is not a form: table, json, jsonl or csv
+-o JSON|--output: "JSON" is not a form: table, json, jsonl or csv
+--field name|--field: "name" is not a field of a token
 --sort tid --sort uid|--sort: can be given once only
 --limit|--limit: needs a value
 --utc --epoch|--utc excludes --epoch
@@ -423,7 +423,7 @@ END
     text=$'a\'b"c\\d\\x41\ne\tf\e[31m\xc2\x9bÄ漢\xff'
     tool init
     tool create --uid 0 --function "$text" --bind-sid "$text" --allow "$text:$text" >"$DIR/tid"
-    # What is no UTF-8 stays as it is stored, for what reads it to decide.
+    # What is not UTF-8 stays as it is stored, for what reads it to decide.
     json=$'a\'b\\"c\\\\d\\\\x41\\ne\\tf\\u001b[31m\\u009bÄ漢\xff'
     run_tool list -o jsonl
     [[ $output == "{\"bind_sid\":\"$json\","*",\"function\":\"$json\","*",\"webapi_allow\":{\"$json\":{\"method\":[\"$json\"]}}}" ]]
@@ -454,10 +454,10 @@ END
 @test "what an error sentence repeats of an argument commands no terminal" {
     tool init
     run_tool list --sort $'a\e[31m\nb\x7f'
-    expect 2 "" 'vemo-access-token: --sort: "a\x1b[31m\x0ab\x7f" is no field of a token'
+    expect 2 "" 'vemo-access-token: --sort: "a\x1b[31m\x0ab\x7f" is not a field of a token'
     # Terminals take the other control characters as commands too: this one like ESC [.
     run_tool list --sort $'Ä\xc2\x9b31m'
-    expect 2 "" 'vemo-access-token: --sort: "Ä\xc2\x9b31m" is no field of a token'
+    expect 2 "" 'vemo-access-token: --sort: "Ä\xc2\x9b31m" is not a field of a token'
 }
 
 @test "list changes nothing: expired tokens stay, the file's bytes too" {

@@ -117,7 +117,7 @@ there is no database ...|rm "$DB"; tool list
 ... has a ... in the place of the table of tokens|sql "DROP TABLE token; CREATE VIEW token AS SELECT 1"; tool init
 ... holds a token that cannot be read|sql "UPDATE token SET extra = NULL"; tool list
 ... is damaged|truncate -s 8192 "$DB"; tool list
-... is no token database, or a damaged one|printf '%04096d' 0 >"$DB"; tool list
+... is not a token database, or is damaged|printf '%04096d' 0 >"$DB"; tool list
 token ... cannot be exported: ...|sql "UPDATE token SET extra = ''"; tool export
 several tokens begin with ...|sql "INSERT INTO token SELECT tid || 'x', $ROW FROM token"; tool show token---
 the user ... could not be looked up: ...|VEMO_TEST_LOOKUP=5 tool list --user root

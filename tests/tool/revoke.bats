@@ -221,7 +221,7 @@ TABLE
     local arguments
     for arguments in "--all" "--uid 0" "--user root" "--function VPN" "--bind-sid s1" "--bind-sid unknown"; do
         run_tool revoke $arguments
-        expect 2 "" "vemo-access-token: --yes is needed to revoke many where there is nobody to ask"
+        expect 2 "" "vemo-access-token: repeat with --yes: there is nobody to ask"
     done
     # Both what is asked and what is answered need the terminal.
     on_terminal "" "" bash -c '"$0" revoke --all </dev/null' "$TOOL"
@@ -296,11 +296,11 @@ TABLE
         eval "run_tool revoke --yes $arguments"
         expect 2 "" "vemo-access-token: $sentence"
     done <<'TABLE'
---uid abc|--uid: "abc" is no number from 0 to 4294967294
---uid ""|--uid: "" is no number from 0 to 4294967294
---uid -1|--uid: "-1" is no number from 0 to 4294967294
---uid 4294967295|--uid: "4294967295" is no number from 0 to 4294967294
---uid "0 or 1=1"|--uid: "0 or 1=1" is no number from 0 to 4294967294
+--uid abc|--uid: "abc" is not a number from 0 to 4294967294
+--uid ""|--uid: "" is not a number from 0 to 4294967294
+--uid -1|--uid: "-1" is not a number from 0 to 4294967294
+--uid 4294967295|--uid: "4294967295" is not a number from 0 to 4294967294
+--uid "0 or 1=1"|--uid: "0 or 1=1" is not a number from 0 to 4294967294
 --user no-such-user|--user: there is no user "no-such-user"
 --user root --uid 0|--uid excludes --user
 --nonsense|unknown option "--nonsense"
@@ -324,7 +324,7 @@ TABLE
         echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
         cp "$DB" "$DIR/text"
         run_tool revoke $arguments
-        expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+        expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
         cmp "$DB" "$DIR/text"
         rm -r "$VEMO_REDIRECT_DIR"
     done

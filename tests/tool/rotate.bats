@@ -60,8 +60,8 @@ token--|TID: "token--" is too short: give the id or its first 8 characters, or m
 ''|TID: the id is empty
 -|TID: there is no id on standard input
 expired-|the token has expired; "vemo-access-token update" can give it time
-token--1 --grace 0|--grace: "0" is no duration such as 90s, 15m, 8h, 2d12h or 1w
-token--1 --grace -1|--grace: "-1" is no duration such as 90s, 15m, 8h, 2d12h or 1w
+token--1 --grace 0|--grace: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
+token--1 --grace -1|--grace: "-1" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
 token--1 token--2|unexpected argument "token--2"
 END
     local before

@@ -114,7 +114,7 @@ END
     text=$'a\'b"c\\d\ne\tf\e[31m\xc2\x9bÄ漢\xff'
     tool init
     tid=$(tool create --uid 0 --function "$text" --bind-sid "$text" --allow "$text:$text" --extra '{"\u001b[31m":"\n"}')
-    # What is no UTF-8 stays as it is stored, for what reads it to decide.
+    # What is not UTF-8 stays as it is stored, for what reads it to decide.
     json=$'a\'b\\"c\\\\d\\ne\\tf\\u001b[31m\\u009bÄ漢\xff'
     run_tool show "$tid" -o jsonl
     [[ $output == "{\"bind_sid\":\"$json\","*",\"extra\":{\"\\u001b[31m\":\"\\n\"},\"function\":\"$json\","* ]]
@@ -234,8 +234,8 @@ END
 ''|TID: the id is empty
 token---0 token---1|unexpected argument "token---1"
 token---0 --show-ids|unknown option "--show-ids"
-token---0 -o yaml|--output: "yaml" is no form: table, json, jsonl or csv
-token---0 --field TID|--field: "TID" is no field of a token
+token---0 -o yaml|--output: "yaml" is not a form: table, json, jsonl or csv
+token---0 --field TID|--field: "TID" is not a field of a token
 token---0 --epoch --utc|--utc excludes --epoch
 END
 }

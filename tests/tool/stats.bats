@@ -198,7 +198,7 @@ free pages of 4096 bytes       0"
         run_tool stats $arguments
         expect 2 "" "vemo-access-token: $sentence"
     done <<'TABLE'
--o xml|--output: "xml" is no form: table, json or jsonl
+-o xml|--output: "xml" is not a form: table, json or jsonl
 --prometheus -o json|--prometheus excludes --output
 VPN|unexpected argument "VPN"
 TABLE
@@ -218,7 +218,7 @@ TABLE
         expect 4 "" "vemo-access-token: $REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
         echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
         run_tool stats $arguments
-        expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+        expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
         rm -r "$VEMO_REDIRECT_DIR"
     done
 }

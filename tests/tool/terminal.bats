@@ -159,10 +159,10 @@ modes: as before" ]
     on_terminal -- revoke --function Other
     expect 0 "0 tokens revoked"
     sh_on_terminal -- '"$0" revoke --all </dev/null'
-    expect 2 "vemo-access-token: --yes is needed to revoke many where there is nobody to ask"
+    expect 2 "vemo-access-token: repeat with --yes: there is nobody to ask"
     sh_on_terminal -- '"$0" revoke --all 2>"$1"' "$DIR/stderr"
     expect 2 ""
-    [ "$(cat "$DIR/stderr")" = "vemo-access-token: --yes is needed to revoke many where there is nobody to ask" ]
+    [ "$(cat "$DIR/stderr")" = "vemo-access-token: repeat with --yes: there is nobody to ask" ]
     [ "$(tokens)" -eq 1 ]
     on_terminal -- revoke "$id"
     expect 0 "1 token revoked"

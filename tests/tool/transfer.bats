@@ -197,7 +197,7 @@ TABLE
     local file
     for file in out fifo link /dev/null; do
         run_tool export "$file"
-        expect 2 "" "vemo-access-token: $file is no regular file; to write to a pipe, write to standard output"
+        expect 2 "" "vemo-access-token: $file is not a regular file; to write to a pipe, write to standard output"
     done
     mkdir there
     ln -s there here
@@ -261,7 +261,7 @@ vemo-access-token: /run/vemo-access-token.lock belongs to the database; choose a
     # Nor what they put in its place while it is being opened; but a file that is theirs alone.
     cp "$DIR/secret" "$DIR/theirs/file"
     VEMO_TEST_CALLS="openat file|rm $DIR/theirs/file && mkfifo $DIR/theirs/file" run_tool import "$DIR/theirs/file"
-    expect 2 "" "vemo-access-token: $DIR/theirs/file is no regular file"
+    expect 2 "" "vemo-access-token: $DIR/theirs/file is not a regular file"
     rm "$DIR/theirs/file"
     cp "$DIR/secret" "$DIR/theirs/file"
     VEMO_TEST_CALLS="openat file|ln -sf $DIR/secret $DIR/theirs/file" run_tool import "$DIR/theirs/file"
@@ -395,7 +395,7 @@ TABLE
         expect 4 "" "vemo-access-token: $REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
         echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
         run_tool export $arguments
-        expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+        expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
         rm "$DB"
         a_row A
         sql "UPDATE token SET extra = NULL"
@@ -426,20 +426,20 @@ vemo-access-token: nothing exported; without 1 token, the file would not be whol
         [ "$(cat "$DIR/file")" = old ]
         cp "$DIR/sound" "$DB"
     done <<TABLE
-uid = 'root'~"uid" is no whole number
-deadline = 9999999999.5~"deadline" is no whole number
-count = 'two'~"count" is no whole number
-create_time = CURRENT_TIMESTAMP~"create_time" is no whole number
-tid = CAST(tid AS BLOB)~"tid" is no text
-bind_sid = x''~"bind_sid" is no text
-function = CAST('VPN' AS BLOB)~"function" is no text
+uid = 'root'~"uid" is not a whole number
+deadline = 9999999999.5~"deadline" is not a whole number
+count = 'two'~"count" is not a whole number
+create_time = CURRENT_TIMESTAMP~"create_time" is not a whole number
+tid = CAST(tid AS BLOB)~"tid" is not a text
+bind_sid = x''~"bind_sid" is not a text
+function = CAST('VPN' AS BLOB)~"function" is not a text
 function = 'V' || char(0)~"function" holds a NUL character
 tid = tid || char(0, 65)~"tid" holds a NUL character
 extra = '{}' || char(0)~"extra" holds a NUL character
 webapi_allow = x'7b7d00'~"webapi_allow" holds a NUL character
-webapi_allow = '{"Api":'~"webapi_allow" is no JSON
-extra = ''~"extra" is no JSON
-extra = '{"a":"\ud800"}'~"extra" is no JSON
+webapi_allow = '{"Api":'~"webapi_allow" is not JSON
+extra = ''~"extra" is not JSON
+extra = '{"a":"\ud800"}'~"extra" is not JSON
 extra = '$(printf '{"a":%.0s' {1..1000})1$(printf '}%.0s' {1..1000})'~"extra" is nested too deeply
 TABLE
 }
@@ -459,7 +459,7 @@ TABLE
         expect 0 "$read"
     else
         [ "$read" = '{"a":null}' ]
-        expect 4 "" "vemo-access-token: token A0000000 cannot be exported: \"extra\" is no JSON
+        expect 4 "" "vemo-access-token: token A0000000 cannot be exported: \"extra\" is not JSON
 vemo-access-token: nothing exported; without 1 token, the file would not be whole; \"sqlite3 $REAL_DB '.backup FILE'\" keeps all"
         [ ! -e "$DIR/file" ]
     fi
@@ -472,8 +472,8 @@ vemo-access-token: nothing exported; without 1 token, the file would not be whol
     sql "UPDATE token SET count = 'x', extra = '' WHERE tid LIKE 'A%';
          UPDATE token SET webapi_allow = '[' WHERE tid LIKE 'C%'"
     run_tool export
-    expect 4 "$(a_line B)" "vemo-access-token: token A0000000 cannot be exported: \"count\" is no whole number
-vemo-access-token: token C0000000 cannot be exported: \"webapi_allow\" is no JSON
+    expect 4 "$(a_line B)" "vemo-access-token: token A0000000 cannot be exported: \"count\" is not a whole number
+vemo-access-token: token C0000000 cannot be exported: \"webapi_allow\" is not JSON
 vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"sqlite3 $REAL_DB '.backup FILE'\" keeps all"
     tool export 2>/dev/null >"$DIR/file" || true
     sql "DELETE FROM token"
@@ -593,9 +593,9 @@ sed '3s/2}/-2}/';3 has no "tid"
 sed '3s/2}/2.5}/';3 has no "tid"
 sed '3s/:"[^"]*"/:1/';3 has no "tid"
 sed '3s/:.*/:[1,2]}/';3 has no "tid"
-sed '1s/}$//';1 is no JSON: 
+sed '1s/}$//';1 is not JSON: 
 sed '2s/"uid":0,//';2 has no "uid"
-head -n 1 | cat - <(printf x);2 is no JSON: 
+head -n 1 | cat - <(printf x);2 is not JSON: 
 head -n 1 | cat - <(printf '{\0');2 holds a NUL byte
 TABLE
 }
@@ -676,19 +676,19 @@ TABLE
 "function":"VPN",||has no "function"
 ,"webapi_allow":{}||has no "webapi_allow"
 "extra":{},||has no "extra"
-"tid":"TID"|"tid":1|"tid" is no string
-"bind_sid":""|"bind_sid":null|"bind_sid" is no string
-"function":"VPN"|"function":["VPN"]|"function" is no string
-"uid":0|"uid":"0"|"uid" is no whole number
-"uid":0|"uid":9223372036854775808|"uid" is no whole number
-"deadline":9999999999|"deadline":null|"deadline" is no whole number
-"deadline":9999999999|"deadline":9223372036854775808|"deadline" is no whole number
-"count":1|"count":1.5|"count" is no whole number
-"count":1|"count":true|"count" is no whole number
-"count":1|"count":Infinity|"count" is no whole number
-"count":1|"count":-9223372036854775809|"count" is no whole number
-"create_time":0|"create_time":{}|"create_time" is no whole number
-"extra":{}|"extra":{},"other":1|"other" is no field of a token
+"tid":"TID"|"tid":1|"tid" is not a string
+"bind_sid":""|"bind_sid":null|"bind_sid" is not a string
+"function":"VPN"|"function":["VPN"]|"function" is not a string
+"uid":0|"uid":"0"|"uid" is not a whole number
+"uid":0|"uid":9223372036854775808|"uid" is not a whole number
+"deadline":9999999999|"deadline":null|"deadline" is not a whole number
+"deadline":9999999999|"deadline":9223372036854775808|"deadline" is not a whole number
+"count":1|"count":1.5|"count" is not a whole number
+"count":1|"count":true|"count" is not a whole number
+"count":1|"count":Infinity|"count" is not a whole number
+"count":1|"count":-9223372036854775809|"count" is not a whole number
+"create_time":0|"create_time":{}|"create_time" is not a whole number
+"extra":{}|"extra":{},"other":1|"other" is not a field of a token
 "function":"VPN"|"function":"VNULN"|"function" holds a NUL character
 "bind_sid":""|"bind_sid":"NUL"|"bind_sid" holds a NUL character
 TID|TIDNUL|"tid" holds a NUL character
@@ -696,7 +696,7 @@ TABLE
     cmp "$DB" "$DIR/before"
 }
 
-@test "a line that is no JSON object is refused with its number" {
+@test "a line that is not a JSON object is refused with its number" {
     tool init
     cp "$DB" "$DIR/before"
     local good line
@@ -704,7 +704,7 @@ TABLE
     for line in '[]' "[$good]"; do
         { a_line A; echo "$line"; } >"$DIR/file"
         run_tool import "$DIR/file"
-        expect 2 "" "vemo-access-token: $DIR/file: line 2 is no JSON object; nothing of this file was imported"
+        expect 2 "" "vemo-access-token: $DIR/file: line 2 is not a JSON object; nothing of this file was imported"
     done
     for line in x 1 '"a"' null '{' "${good%?}" "$good," "$good$good" "$good x" "'$good'" "//$good" "${good/1/}" \
         "${good/VPN/\\ud800}" "${good/VPN/\\x}" "${good/:1,/:1,\"count\":2,}" "${good/:/}"; do
@@ -712,12 +712,12 @@ TABLE
         run_tool import "$DIR/file"
         [ "$status" -eq 2 ]
         [ "$output" = "" ]
-        [[ $stderr == "vemo-access-token: $DIR/file: line 2 is no JSON: "*"; nothing of this file was imported" ]]
+        [[ $stderr == "vemo-access-token: $DIR/file: line 2 is not JSON: "*"; nothing of this file was imported" ]]
     done
     cmp "$DB" "$DIR/before"
 }
 
-@test "of a line that is no JSON, no other line's number is told" {
+@test "of a line that is not JSON, no other line's number is told" {
     tool init
     { a_line A; echo "{"; } >"$DIR/file"
     run_tool import "$DIR/file"
@@ -781,7 +781,7 @@ TABLE
 nowhere|nowhere: No such file or directory
 nowhere/file|nowhere/file: No such file or directory
 directory|directory: Is a directory
-fifo|fifo is no regular file
+fifo|fifo is not a regular file
 loop|loop is a symbolic link; name the place that it leads to
 link/file|link is a symbolic link; name the place that it leads to
 /proc/$$/mem|/proc/$$/mem: Input/output error
@@ -832,7 +832,7 @@ TABLE
         echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
         cp "$DB" "$DIR/text"
         run_tool import "$file"
-        expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+        expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
         cmp "$DB" "$DIR/text"
         rm -r "$VEMO_REDIRECT_DIR"
     done

@@ -265,7 +265,7 @@ TABLE
         echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
         cp "$DB" "$DIR/text"
         run_tool tune $arguments
-        expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+        expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
         cmp "$DB" "$DIR/text"
         rm -r "$VEMO_REDIRECT_DIR"
     done

@@ -214,12 +214,12 @@ token---|say what to change; "update --help" lists the fields
 token-- --uses 2|TID: "token--" is too short: give the id or its first 8 characters, or more
 second-1 --uses 2|TID: several tokens begin with "second-1"; give more of the id
 token--- second-1 --uses 2|unexpected argument "second-1"
-token--- --uses 0|--uses: "0" is no number from 1 to 9223372036854775807
-token--- --uses -1|--uses: "-1" is no number from 1 to 9223372036854775807
+token--- --uses 0|--uses: "0" is not a number from 1 to 9223372036854775807
+token--- --uses -1|--uses: "-1" is not a number from 1 to 9223372036854775807
 token--- --uses 2 --unlimited|--uses excludes --unlimited
 token--- --uses 2 --uses 3|--uses: can be given once only
-token--- --ttl 0|--ttl: "0" is no duration such as 90s, 15m, 8h, 2d12h or 1w
-token--- --ttl ''|--ttl: "" is no duration such as 90s, 15m, 8h, 2d12h or 1w
+token--- --ttl 0|--ttl: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
+token--- --ttl ''|--ttl: "" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
 token--- --ttl 1h --deadline 2060-01-01|--deadline excludes --ttl
 token--- --allow A --add-allow B|--allow excludes --add-allow
 token--- --allow A --remove-allow B|--allow excludes --remove-allow
@@ -227,8 +227,8 @@ token--- --allow :m|--allow: ":m" names no API: write API or API:METHOD,METHOD
 token--- --allow ''|--allow: "" names no API: write API or API:METHOD,METHOD
 token--- --add-allow A:|--add-allow: "A:" has an empty method: write API or API:METHOD,METHOD
 token--- --remove-allow A:m,|--remove-allow: "A:m," has an empty method: write API or API:METHOD,METHOD
-token--- --extra []|--extra: is no JSON object
-token--- --extra '{'|--extra: is no JSON: Column 2 Missing '}' or object member name
+token--- --extra []|--extra: is not a JSON object
+token--- --extra '{'|--extra: is not JSON: Column 2 Missing '}' or object member name
 token--- --extra @$DIR|--extra: $DIR: Is a directory
 token--- --extra @/proc/$$/mem|--extra: /proc/$$/mem: Input/output error
 token--- --extra @$DIR/missing|--extra: $DIR/missing: No such file or directory

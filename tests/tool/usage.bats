@@ -190,7 +190,7 @@ grant TID API METHOD more|unexpected argument "more"
 update|TID is required
 update TID|say what to change; "update --help" lists the fields
 rotate|TID is required
-rotate TID --grace 0|--grace: "0" is no duration such as 90s, 15m, 8h, 2d12h or 1w
+rotate TID --grace 0|--grace: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
 revoke|say which tokens: by TID, by options that select, or --all
 import|FILE is required
 export FILE more|unexpected argument "more"
@@ -203,7 +203,7 @@ create --function TAG --uid 0 --uses 1 --unlimited|--uses excludes --unlimited
 list --uid 0 --user root|--uid excludes --user
 list --utc --epoch|--utc excludes --epoch
 list --output|--output: needs a value
-list -o xml|--output: "xml" is no form: table, json, jsonl or csv
+list -o xml|--output: "xml" is not a form: table, json, jsonl or csv
 update TID --ttl 1h --deadline 2999-01-01|--deadline excludes --ttl
 update TID --allow A --add-allow B|--allow excludes --add-allow
 update TID --allow A --remove-allow B|--allow excludes --remove-allow
@@ -349,11 +349,11 @@ TABLE
 
     echo "no database" >"$DB"
     run_tool list
-    expect 4 "" "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)"
+    expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
     run_tool list --verbose
     [ "$status" -eq 4 ]
     [ "$output" = "" ]
-    [ "$(tail -n 1 <<<"$stderr")" = "vemo-access-token: $REAL_DB is no token database, or a damaged one (file is not a database)" ]
+    [ "$(tail -n 1 <<<"$stderr")" = "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)" ]
     log_lines_only "$(sed '$d' <<<"$stderr")"
     [[ $stderr == *"run sql failed, error=file is not a database"* ]]
 }
@@ -623,7 +623,7 @@ TABLE
     expect 4 "" "vemo-access-token: $DIR/x/${id:0:8}...: No such file or directory"
     mkdir -p "$DIR/x/$id"
     run_tool export "$DIR/x/$id"
-    expect 2 "" "vemo-access-token: $DIR/x/${id:0:8}... is no regular file; to write to a pipe, write to standard output"
+    expect 2 "" "vemo-access-token: $DIR/x/${id:0:8}... is not a regular file; to write to a pipe, write to standard output"
 }
 
 @test "no id appears on standard error when SQLite's reason holds it" {
@@ -637,12 +637,12 @@ TABLE
     expect 4 "" "vemo-access-token: $REAL_DB failed: ${id:0:8}..."
 }
 
-@test "an id that is no text is masked, too" {
+@test "an id that is not a text is masked, too" {
     row token---
     sql "UPDATE token SET tid = CAST(x'61' || x'$(printf '9b%.0s' {1..140})' AS TEXT)"
     [ "$(tool list --field tid | wc -c)" -eq 33 ] # 8 characters of 4 bytes at most, and the end of the line
     run_tool list --sort "$(tool list --field tid --show-ids)"
-    [ "$stderr" = "vemo-access-token: --sort: \"a$(printf '\\x9b%.0s' {1..31})...\" is no field of a token" ]
+    [ "$stderr" = "vemo-access-token: --sort: \"a$(printf '\\x9b%.0s' {1..31})...\" is not a field of a token" ]
 }
 
 @test "no id appears on standard error when a long beginning fits several tokens" {
