@@ -3,21 +3,24 @@
 #include <getopt.h>
 
 #include <algorithm>
+#include <sstream>
 
 #include "Masking.h"
+#include "Nearest.h"
 
 namespace {
 
 const size_t NAME_WIDTH = 28;
+const size_t HELP_WIDTH = 80;
 
 // What getopt_long() gives for the first option, above all characters.
 const int FIRST_OPTION = 256;
 
 const int AN_ARGUMENT = 1; // what it gives for an argument that is no option
 
-tool::Failure usageFailure(const std::string& strSentence)
+tool::Failure usageFailure(const std::string& strSentence, const std::string& strHint = "")
 {
-    return tool::Failure(tool::EXIT_STATUS_USAGE, strSentence);
+    return tool::Failure(tool::EXIT_STATUS_USAGE, strSentence, strHint);
 }
 
 // The name of a long option, if the argument is one: "--name" of "--name=value".
@@ -26,6 +29,22 @@ std::string longNameOf(const std::string& strArgument)
     return strArgument.size() > 2 && 0 == strArgument.compare(0, 2, "--")
                ? strArgument.substr(0, strArgument.find('='))
                : "";
+}
+
+// A line, with words behind it, and more lines behind a margin of the same width for those that it has no
+// room for.
+std::string wrapped(std::string strLine, const std::string& strMargin, const std::string& strWords)
+{
+    std::string strText;
+    std::istringstream words(strWords);
+    for (std::string strWord; words >> strWord;) {
+        if (strLine.size() + 1 + strWord.size() > HELP_WIDTH) {
+            strText += strLine + "\n";
+            strLine = strMargin;
+        }
+        strLine += (strLine.size() == strMargin.size() ? "" : " ") + strWord;
+    }
+    return strText + strLine + "\n";
 }
 
 } // namespace
@@ -99,6 +118,11 @@ Command::Parameter* Command::find(const std::string& strName)
     return nullptr;
 }
 
+void Command::example(const std::string& strArguments)
+{
+    m_strExamples.push_back(strArguments);
+}
+
 void Command::require(const std::string& strName)
 {
     find(strName)->blRequired = true;
@@ -110,22 +134,28 @@ void Command::exclude(const std::string& strName, const std::string& strOther)
     find(strOther)->strExcluded.push_back(strName);
 }
 
+void Command::addWord(Parameter& parameter, const char* szText)
+{
+    parameter.blGiven = true;
+    m_words.push_back({&parameter, szText});
+}
+
 void Command::addOptionText(Parameter& option, const char* szText)
 {
-    if (!option.blRepeated && !option.strTexts.empty()) {
+    if (!option.blRepeated && option.blGiven) {
         throw usageFailure(option.strName + ": can be given once only");
     }
-    option.strTexts.emplace_back(szText);
+    addWord(option, szText);
 }
 
 void Command::addArgument(const char* szText)
 {
-    const auto isOpen = [](const Parameter& each) { return each.blRepeated || each.strTexts.empty(); };
+    const auto isOpen = [](const Parameter& each) { return each.blRepeated || !each.blGiven; };
     const auto pNext = std::find_if(m_arguments.begin(), m_arguments.end(), isOpen);
     if (m_arguments.end() == pNext) {
         throw usageFailure("unexpected argument " + quoted(szText));
     }
-    pNext->strTexts.emplace_back(szText);
+    addWord(*pNext, szText);
 }
 
 // What getopt_long() knows of the options.
@@ -175,18 +205,27 @@ void Command::addFound(int nFound)
     }
 }
 
-void Command::read(int nArguments, char** rgArguments)
+// Whole names only: what is short for one option today may be short for two tomorrow.
+void Command::requireLongName(const std::string& strName)
+{
+    if (strName.empty() || find(strName)) {
+        return;
+    }
+    std::vector<std::string> strNames;
+    for (const Parameter& each : m_options) {
+        strNames.push_back(each.strName);
+    }
+    throw usageFailure("unknown option " + quoted(strName), didYouMean(strName, strNames));
+}
+
+void Command::readWords(int nArguments, char** rgArguments)
 {
     const std::string strShort = shortOptions();
     const std::vector<struct option> rgLong = longOptions();
     optind = 0; // unlike 1 it makes getopt_long() forget what it has read before
     int nNext = 1;
     for (; nNext < nArguments; nNext = optind) {
-        // Whole names only: what is short for one option today may be short for two tomorrow.
-        const std::string strName = longNameOf(rgArguments[nNext]);
-        if (!strName.empty() && nullptr == find(strName)) {
-            throw usageFailure("unknown option " + quoted(strName));
-        }
+        requireLongName(longNameOf(rgArguments[nNext]));
         const int nFound = getopt_long(nArguments, rgArguments, strShort.c_str(), rgLong.data(), nullptr);
         if (-1 == nFound) { // the one argument that it does not tell: "--"
             ++nNext;
@@ -199,47 +238,62 @@ void Command::read(int nArguments, char** rgArguments)
     }
 }
 
+void Command::read(int nArguments, char** rgArguments)
+{
+    try {
+        readWords(nArguments, rgArguments);
+    } catch (const Failure&) {
+        takeWords(); // of several faults, the first is told
+        throw;
+    }
+}
+
 bool Command::has(const std::string& strName) const
 {
-    return std::any_of(m_options.begin(), m_options.end(), [&](const Parameter& each) {
-        return each.strName == strName && !each.strTexts.empty();
-    });
+    return std::any_of(m_options.begin(), m_options.end(),
+                       [&](const Parameter& each) { return each.strName == strName && each.blGiven; });
 }
 
 void Command::check() const
 {
     for (const auto* pParameters : {&m_arguments, &m_options}) {
         for (const Parameter& each : *pParameters) {
-            if (each.blRequired && each.strTexts.empty()) {
+            if (each.blRequired && !each.blGiven) {
                 throw usageFailure(each.strName + " is required");
             }
-            for (const std::string& strOther : each.strExcluded) {
-                if (!each.strTexts.empty() && has(strOther)) {
-                    throw usageFailure(each.strName + " excludes " + strOther);
-                }
+        }
+    }
+    for (const Word& word : m_words) {
+        for (const std::string& strOther : word.pParameter->strExcluded) {
+            if (has(strOther)) {
+                throw usageFailure(word.pParameter->strName + " excludes " + strOther);
             }
         }
+    }
+}
+
+void Command::takeWords() const
+{
+    for (const Word& word : m_words) {
+        tool::argument(word.pParameter->strName, [&word] { word.pParameter->take(word.strText); });
     }
 }
 
 void Command::take()
 {
     check();
-    for (auto* pParameters : {&m_options, &m_arguments}) {
-        for (Parameter& each : *pParameters) {
-            for (const std::string& strText : each.strTexts) {
-                tool::argument(each.strName, [&] { each.take(strText); });
-            }
-        }
-    }
+    takeWords();
 }
 
 std::string helpLine(const std::string& strName, const std::string& strDescription)
 {
-    const size_t nBlanks = NAME_WIDTH - std::min(NAME_WIDTH, strName.size());
-    return "  " + strName +
-           (0 == nBlanks ? "\n" + std::string(NAME_WIDTH + 2, ' ') : std::string(nBlanks, ' ')) +
-           strDescription + "\n";
+    const std::string strMargin(NAME_WIDTH + 2, ' ');
+    std::string strLine = "  " + strName;
+    if (strName.size() >= NAME_WIDTH) {
+        return strLine + "\n" + wrapped(strMargin, strMargin, strDescription);
+    }
+    strLine.resize(strMargin.size(), ' ');
+    return wrapped(strLine, strMargin, strDescription);
 }
 
 std::string Command::help() const
@@ -255,16 +309,19 @@ std::string Command::help() const
     for (const Parameter& each : m_options) {
         std::string strNote = each.blRequired ? ", required" : "";
         strNote += !each.strType.empty() && each.blRepeated ? ", repeatable" : "";
-        for (const std::string& strOther : each.strExcluded) {
-            strNote += ", not with " + strOther;
-        }
         const std::string strShort = 0 == each.cShort ? "" : std::string{'-', each.cShort, ','};
         const std::string strType = each.strType.empty() ? "" : " " + each.strType;
         strOptions += helpLine(strShort + each.strName + strType,
                                each.strDescription + (strNote.empty() ? "" : " (" + strNote.substr(2) + ")"));
     }
-    return strUsage + "\n" + m_strDescription + "\n" +
-           (strArguments.empty() ? "" : "\nArguments:\n" + strArguments) + "\nOptions:\n" + strOptions;
+    std::string strExamples;
+    for (const std::string& strExample : m_strExamples) {
+        strExamples +=
+            "  vemo-access-token " + m_strName + (strExample.empty() ? "" : " ") + strExample + "\n";
+    }
+    return strUsage + "\n" + wrapped("", "", m_strDescription) +
+           (strArguments.empty() ? "" : "\nArguments:\n" + strArguments) + "\nOptions:\n" + strOptions +
+           "\nExamples:\n" + strExamples;
 }
 
 } // namespace tool

@@ -39,7 +39,7 @@ public:
         bool blRequired = false;
         char cShort = '\0'; // none
         std::vector<std::string> strExcluded = {};
-        std::vector<std::string> strTexts = {}; // as read
+        bool blGiven = false; // on the command line
     };
 
     void option(const std::string& strName, const std::string& strType, Take take,
@@ -52,6 +52,9 @@ public:
     void optionalArgument(const std::string& strName, Take take, const std::string& strDescription);
     void remainingArguments(const std::string& strName, Take take, const std::string& strDescription);
 
+    // A command line that help shows, from behind the command's name.
+    void example(const std::string& strArguments);
+
     // Of those that have been added, by "--name" or "NAME".
     void require(const std::string& strName);
     void exclude(const std::string& strName, const std::string& strOther);
@@ -63,26 +66,37 @@ public:
     std::string help() const;
 
     // Notes the texts of a command line that begins with the command's name, byte for byte. Throws Failure
-    // where it cannot be read; what is missing or excluded is for take().
+    // where it cannot be read, or about what stands before that; what is missing or excluded is for take().
     void read(int nArguments, char** rgArguments);
 
     // Whether an option was read.
     bool has(const std::string& strName) const;
 
-    // Checks what is required and excluded, and hands each text to its Take. Throws Failure.
+    // Checks what is required and excluded, and hands each text to its Take, in the order of the command
+    // line. Throws Failure.
     void take();
 
     int run() const { return m_run(); }
 
 private:
+    // A text of the command line; "" of a flag.
+    struct Word {
+        Parameter* pParameter;
+        std::string strText;
+    };
+
     Parameter* find(const std::string& strName); // nullptr: there is none
     void addOption(const std::string& strNames, Parameter parameter);
+    void addWord(Parameter& parameter, const char* szText);
     void addOptionText(Parameter& option, const char* szText);
     void addArgument(const char* szText);
     void addFound(int nFound);
     std::string shortOptions() const;
     std::vector<struct option> longOptions() const;
     Parameter& optionOf(int nFound);
+    void requireLongName(const std::string& strName);
+    void readWords(int nArguments, char** rgArguments);
+    void takeWords() const;
     void check() const;
 
     const std::string m_strName;
@@ -90,6 +104,8 @@ private:
     const Run m_run;
     std::vector<Parameter> m_options;
     std::vector<Parameter> m_arguments;
+    std::vector<std::string> m_strExamples;
+    std::vector<Word> m_words; // as read
 };
 
 // Adds an option whose text parse() reads into target.
@@ -102,7 +118,7 @@ void addParsed(Command& command, const std::string& strName, const std::string& 
         strDescription);
 }
 
-// Two columns of a help text: names, and what they are.
+// Two columns of a help text, of 80 together: names, and what they are.
 std::string helpLine(const std::string& strName, const std::string& strDescription);
 
 } // namespace tool

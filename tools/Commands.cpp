@@ -1,9 +1,13 @@
 #include "Commands.h"
 
+#include <memory>
+
+#include "Arguments.h"
 #include "Audit.h"
 #include "Console.h"
 #include "LogLines.h"
 #include "Masking.h"
+#include "Nearest.h"
 #include "Place.h"
 #include "Store.h"
 
@@ -45,7 +49,7 @@ Command& Commands::add(const std::string& strName, const std::string& strDescrip
     // run() looks for these two, ahead of what is missing or excluded.
     const auto nothing = [] {};
     command.flag("-h,--help", nothing, HELP);
-    command.flag("--version", nothing, VERSION);
+    command.flag("-V,--version", nothing, VERSION);
     command.flag("-v,--verbose", m_blVerbose, "show the library's log lines on standard error");
     return command;
 }
@@ -59,10 +63,10 @@ std::string Commands::help() const
     return "Usage: vemo-access-token [OPTIONS] COMMAND\n"
            "Administers the access tokens of this machine.\n"
            "\nOptions:\n" +
-           helpLine("-h,--help", HELP) + helpLine("--version", VERSION) + "\nCommands:\n" + strCommands +
-           "\n\"vemo-access-token COMMAND --help\" tells more, and so does vemo-access-token(8).\n\n"
-           "Exit status: 0 done or granted, 1 refused (grant, check), 2 usage, 3 no such token,\n"
-           "4 store or permission failure, 5 doctor has findings.\n";
+           helpLine("-h,--help", HELP) + helpLine("-V,--version", VERSION) + "\nCommands:\n" + strCommands +
+           "\n\"vemo-access-token help COMMAND\" tells more, and so does vemo-access-token(8).\n\n"
+           "Exit status: 0 done or granted, 1 refused (grant, check), 2 usage,\n"
+           "3 no such token, 4 store or permission failure, 5 doctor has findings.\n";
 }
 
 Command& Commands::find(const std::string& strName)
@@ -72,8 +76,15 @@ Command& Commands::find(const std::string& strName)
             return command;
         }
     }
-    const char* const szWhat = '-' == strName[0] ? "unknown option " : "unknown command ";
-    throw Failure(EXIT_STATUS_USAGE, szWhat + quoted(strName));
+    if ('-' == strName[0]) {
+        throw Failure(EXIT_STATUS_USAGE, "unknown option " + quoted(strName),
+                      didYouMean(strName, {"--help", "--version"}));
+    }
+    std::vector<std::string> strNames;
+    for (const Command& command : m_commands) {
+        strNames.push_back(command.name());
+    }
+    throw Failure(EXIT_STATUS_USAGE, "unknown command " + quoted(strName), didYouMean(strName, strNames));
 }
 
 int Commands::run(int nArguments, char** rgArguments)
@@ -85,7 +96,7 @@ int Commands::run(int nArguments, char** rgArguments)
     if ("-h" == strFirst || "--help" == strFirst) {
         return printText(help());
     }
-    if ("--version" == strFirst) {
+    if ("-V" == strFirst || "--version" == strFirst) {
         return printText(VERSION_TEXT);
     }
     Command& command = find(strFirst);
@@ -107,6 +118,20 @@ int Commands::run(int nArguments, char** rgArguments)
     return nStatus;
 }
 
+void addHelp(Commands& commands)
+{
+    auto pName = std::make_shared<std::string>();
+    const auto help = [&commands, pName] {
+        print(pName->empty() ? commands.help() : commands.find(*pName).help());
+        return EXIT_STATUS_DONE;
+    };
+    Command& command = commands.add("help", "print what a command takes, or which commands there are", help,
+                                    Commands::Needs::Nothing);
+    command.optionalArgument("COMMAND", notEmptyInto(*pName), "its name");
+    command.example("create");
+    command.example("list");
+}
+
 void addAll(Commands& commands)
 {
     addCreate(commands);
@@ -125,6 +150,7 @@ void addAll(Commands& commands)
     addInit(commands);
     addDoctor(commands);
     addTune(commands);
+    addHelp(commands);
 }
 
 } // namespace tool

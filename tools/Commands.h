@@ -23,10 +23,12 @@ public:
     // Reads the arguments and runs the command. Throws Failure.
     int run(int nArguments, char** rgArguments);
 
-private:
     std::string help() const;
+
+    // The command of a name. Throws Failure where there is none.
     Command& find(const std::string& strName);
 
+private:
     std::deque<Command> m_commands;
     bool m_blVerbose = false;
 };
@@ -47,6 +49,7 @@ void addImport(Commands& commands);
 void addInit(Commands& commands);
 void addDoctor(Commands& commands);
 void addTune(Commands& commands);
+void addHelp(Commands& commands);
 
 // All of these, in the order that the help text has.
 void addAll(Commands& commands);

@@ -109,6 +109,8 @@ void addCreate(Commands& commands)
     addParsed(command, "--tid", "TID", pOptions->strTid, keep,
               "an id of your own; \"-\" reads it from standard input");
     addForm(command, pOptions->layout);
+    command.example("--user root --function backup --allow Backup:put >id");
+    command.example("--uid 1000 --function login --ttl 8h --allow Login");
 }
 
 void addGenerate(Commands& commands)
@@ -117,7 +119,10 @@ void addGenerate(Commands& commands)
         print(newTid() + "\n");
         return EXIT_STATUS_DONE;
     };
-    commands.add("generate", "print a fresh id; touches no database", generate, Commands::Needs::Nothing);
+    Command& command =
+        commands.add("generate", "print a fresh id; touches no database", generate, Commands::Needs::Nothing);
+    command.example(">id");
+    command.example("--verbose >id");
 }
 
 } // namespace tool

@@ -140,6 +140,8 @@ void addDoctor(Commands& commands)
     command.flag("--repair", pOptions->blRepair,
                  "repair what can be; deletes tokens that cannot be read, and the expired");
     addForm(command, pOptions->layout);
+    command.example("");
+    command.example("--repair");
 }
 
 } // namespace tool

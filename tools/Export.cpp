@@ -161,6 +161,8 @@ void addExport(Commands& commands)
     command.optionalArgument("FILE", notEmptyInto(pOptions->strFile),
                              "the file, of mode 0600; without it, standard output");
     addSelection(command, pOptions->selection);
+    command.example("tokens.jsonl");
+    command.example("--function backup >backup.jsonl");
 }
 
 } // namespace tool

@@ -150,6 +150,8 @@ void addCheck(Commands& commands)
                      [pOptions] { return check(*pOptions); });
     addCall(command, *pOptions);
     addForm(command, pOptions->layout);
+    command.example("- Backup put <id");
+    command.example("- Backup put -o json <id");
 }
 
 void addGrant(Commands& commands)
@@ -160,6 +162,8 @@ void addGrant(Commands& commands)
     addCall(command, *pOptions);
     command.flag("--print-user", pOptions->blPrintUser, "print the owner's name");
     addForm(command, pOptions->layout);
+    command.example("- Backup put <id");
+    command.example("- Backup put --print-user <id");
 }
 
 } // namespace tool

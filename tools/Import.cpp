@@ -332,6 +332,8 @@ void addImport(Commands& commands)
     };
     command.remainingArguments("FILE", add, "the files; \"-\" is standard input");
     command.require("FILE");
+    command.example("tokens.jsonl");
+    command.example("--partial tokens.jsonl");
 }
 
 } // namespace tool

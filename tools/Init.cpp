@@ -46,8 +46,10 @@ namespace tool {
 
 void addInit(Commands& commands)
 {
-    commands.add("init", "make the directory, the file and the table, so that no program's first call has to",
-                 init);
+    Command& command = commands.add(
+        "init", "make the directory, the file and the table, so that no program's first call has to", init);
+    command.example("");
+    command.example("&& vemo-access-token doctor");
 }
 
 } // namespace tool

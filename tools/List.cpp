@@ -159,6 +159,8 @@ void addList(Commands& commands)
     command.flag("--count", pOptions->blCount, "how many there are, no more");
     addTokenOptions(command, pOptions->layout);
     command.flag("--show-ids", pOptions->layout.blShowIds, "whole ids, not their first 8 characters");
+    command.example("--user root --expiring 7d");
+    command.example("--sort count:desc --limit 10 -o jsonl");
 }
 
 void addShow(Commands& commands)
@@ -168,6 +170,8 @@ void addShow(Commands& commands)
                                     [pOptions] { return show(*pOptions); });
     addTid(command, pOptions->strTid);
     addTokenOptions(command, pOptions->layout);
+    command.example("- <id");
+    command.example("- --field deadline <id");
 }
 
 } // namespace tool

@@ -251,6 +251,8 @@ void addRevoke(Commands& commands)
     command.flag("--all", pOptions->blAll, "every token there is");
     command.flag("--dry-run", pOptions->blDryRun, "only tell how many");
     command.flag("--yes", pOptions->blYes, "do not ask");
+    command.example("- <id");
+    command.example("--user root --function backup --yes");
 }
 
 void addPurge(Commands& commands)
@@ -259,6 +261,8 @@ void addPurge(Commands& commands)
     Command& command =
         commands.add("purge", "delete the expired tokens", [pOptions] { return purge(*pOptions); });
     command.flag("--dry-run", pOptions->blDryRun, "only tell how many");
+    command.example("");
+    command.example("--dry-run");
 }
 
 } // namespace tool

@@ -104,6 +104,8 @@ void addRotate(Commands& commands)
     addTid(command, pOptions->strTid);
     addParsed(command, "--grace", "DURATION", pOptions->nGrace, parseDuration,
               "the old id stays good for so long, at most");
+    command.example("- <id >new-id");
+    command.example("- --grace 1h <id >new-id");
 }
 
 } // namespace tool

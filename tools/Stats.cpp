@@ -231,6 +231,8 @@ void addStats(Commands& commands)
                  "as metrics for the textfile collector of Prometheus' node exporter");
     addFormOptions(command, pOptions->layout);
     command.exclude("--output", "--prometheus");
+    command.example("");
+    command.example("-o json");
 }
 
 } // namespace tool

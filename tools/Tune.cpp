@@ -170,6 +170,8 @@ void addTune(Commands& commands)
     command.exclude("--undo", "--wal");
     command.flag("--dry-run", pOptions->blDryRun, "only measure, and tell what would be run");
     command.flag("--no-header", pOptions->blNoHeader, "no line of titles above the table");
+    command.example("--dry-run");
+    command.example("--wal");
 }
 
 } // namespace tool

@@ -237,6 +237,8 @@ void addUpdate(Commands& commands)
               "bind it to this login session; \"\" to none");
     addExtra(command, pOptions->jExtra);
     addNote(command, pOptions->strNote);
+    command.example("- --ttl 30d --uses 5 <id");
+    command.example("- --add-allow Backup:list,get <id");
 }
 
 } // namespace tool

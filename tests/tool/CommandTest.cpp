@@ -17,6 +17,8 @@ public:
             return [&strKept](const std::string& strText) { strKept += "<" + strText + ">"; };
         };
         m_command.option("-o,--option", "TEXT", keep(m_strOption), "an option");
+        const auto refuse = [](const std::string&) { throw tool::BadValue("refused"); };
+        m_command.option("--refuse", "TEXT", refuse, "takes nothing");
         m_command.optionalArgument("FIRST", keep(m_strFirst), "the first");
         m_command.remainingArguments("MORE", keep(m_strMore), "all others");
     }
@@ -69,10 +71,13 @@ TEST(CommandLine, IsReadFromItsBeginning)
         {{"-o"}, "--option: needs a value"},
         {{"--flag=1"}, "--flag: takes no value"},
         {{"--flag="}, "--flag: takes no value"},
-        {{"--fla"}, "unknown option \"--fla\""},
+        {{"--fla"}, "unknown option \"--fla\"; did you mean \"--flag\"?"},
         {{"--x=1"}, "unknown option \"--x\""},
         {{"--="}, "unknown option \"--\""},
         {{"FIRST"}, "option first<FIRST> more"},
+        {{"--refuse=1", "--x"}, "--refuse: refused"},
+        {{"--x", "--refuse=1"}, "unknown option \"--x\""},
+        {{"--refuse=1", "--refuse=2"}, "--refuse: refused"},
     };
     for (const auto& each : CASES) {
         EXPECT_EQ(each.second, Reading(each.first).text());

@@ -181,6 +181,7 @@ show d                               => show,d
 grant --user roo                     => grant,--user,roo
 revoke d                             => revoke,d
 doctor d                             => doctor,d
+help doc                             => help,doctor
 nothing --d                          => nothing,--d'
 
 @test "bash completes the commands and options that there are" {
@@ -267,6 +268,7 @@ vemo-access-token show d
 vemo-access-token grant --user roo
 vemo-access-token revoke d
 vemo-access-token doctor d
+vemo-access-token help doc
 vemo-access-token nothing --d
 END
     not_called
@@ -293,5 +295,6 @@ vemo-access-token show d
 vemo-access-token grant --user roo
 vemo-access-token revoke d
 vemo-access-token doctor d
+vemo-access-token help doc|doctor
 vemo-access-token nothing --d"
 }

@@ -302,7 +302,7 @@ TABLE
 --uid 4294967295|--uid: "4294967295" is not a number from 0 to 4294967294
 --uid "0 or 1=1"|--uid: "0 or 1=1" is not a number from 0 to 4294967294
 --user no-such-user|--user: there is no user "no-such-user"
---user root --uid 0|--uid excludes --user
+--user root --uid 0|--user excludes --uid
 --nonsense|unknown option "--nonsense"
 TABLE
     expect_left aaaaaaaa bbbbbbbb cccccccc dddddddd eeeeeeee ffffffff

@@ -236,7 +236,7 @@ token---0 token---1|unexpected argument "token---1"
 token---0 --show-ids|unknown option "--show-ids"
 token---0 -o yaml|--output: "yaml" is not a form: table, json, jsonl or csv
 token---0 --field TID|--field: "TID" is not a field of a token
-token---0 --epoch --utc|--utc excludes --epoch
+token---0 --epoch --utc|--epoch excludes --utc
 END
 }
 

@@ -242,7 +242,7 @@ look for a session's tokens|T" ]
         expect 2 "" "vemo-access-token: $sentence"
     done <<'TABLE'
 --wal --undo|--wal excludes --undo
---undo --wal --dry-run|--wal excludes --undo
+--undo --wal --dry-run|--undo excludes --wal
 deadline|unexpected argument "deadline"
 -o|unknown option "-o"
 TABLE

@@ -220,7 +220,7 @@ token--- --uses 2 --unlimited|--uses excludes --unlimited
 token--- --uses 2 --uses 3|--uses: can be given once only
 token--- --ttl 0|--ttl: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
 token--- --ttl ''|--ttl: "" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
-token--- --ttl 1h --deadline 2060-01-01|--deadline excludes --ttl
+token--- --ttl 1h --deadline 2060-01-01|--ttl excludes --deadline
 token--- --allow A --add-allow B|--allow excludes --add-allow
 token--- --allow A --remove-allow B|--allow excludes --remove-allow
 token--- --allow :m|--allow: ":m" names no API: write API or API:METHOD,METHOD

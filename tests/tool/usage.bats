@@ -3,7 +3,7 @@
 
 load common
 
-COMMANDS="create generate list show check grant update rotate revoke purge stats export import init doctor tune"
+COMMANDS="create generate list show check grant update rotate revoke purge stats export import init doctor tune help"
 
 # plain ARGUMENTS...: the tool as it ships, without the redirection, as a user who is not root
 plain()
@@ -63,11 +63,17 @@ tokens()
     [ "$stderr" = "" ]
     [ "$(sed -n '/^Commands:/,/^$/s/^  \([a-z]*\)  .*/\1/p' <<<"$output" | xargs)" = "$COMMANDS" ]
     [[ $output == "Usage: vemo-access-token [OPTIONS] COMMAND"* ]]
-    [[ $output == *"Exit status: 0 done or granted, 1 refused (grant, check), 2 usage, 3 no such token,
-4 store or permission failure, 5 doctor has findings."* ]]
+    [[ $output == *"Exit status: 0 done or granted, 1 refused (grant, check), 2 usage,
+3 no such token, 4 store or permission failure, 5 doctor has findings."* ]]
     local help=$output
-    run_tool -h
-    expect 0 "$help"
+    for arguments in -h help; do
+        run_tool $arguments
+        expect 0 "$help"
+    done
+    run_tool help list
+    expect 0 "$(tool list --help)"
+    run_tool help help
+    expect 0 "$(tool help --help)"
 }
 
 @test "--help of a command names each of its flags, and no others" {
@@ -78,8 +84,8 @@ tokens()
         [ "$stderr" = "" ]
         [[ $output == "Usage: vemo-access-token $command [OPTIONS]"* ]]
         local got
-        got=$(grep -oE '^  (-[a-z],)?--[a-z-]+' <<<"$output" | tr -d ' ' | sort)
-        [ "$got" = "$(tr ' ' '\n' <<<"-h,--help --version -v,--verbose${flags:+ $flags}" | sort)" ] || {
+        got=$(grep -oE '^  (-[a-zA-Z],)?--[a-z-]+' <<<"$output" | tr -d ' ' | sort)
+        [ "$got" = "$(tr ' ' '\n' <<<"-h,--help -V,--version -v,--verbose${flags:+ $flags}" | sort)" ] || {
             echo "$command: $got"
             return 1
         }
@@ -100,6 +106,7 @@ import|--partial --skip-existing --in-steps
 init|
 doctor|--repair -o,--output
 tune|--wal --undo --dry-run --no-header
+help|
 TABLE
 }
 
@@ -113,20 +120,26 @@ Arguments:
 
 Options:
   -h,--help                   print this help and exit
-  --version                   print the version and exit
+  -V,--version                print the version and exit
   -v,--verbose                show the library'"'"'s log lines on standard error
-  --uses N                    how many times it can be granted (not with --unlimited)
-  --unlimited                 any number of times (not with --uses)
-  --deadline TIME             expiry: 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @SECONDS (not with --ttl)
-  --ttl DURATION              lifetime from now: 45s, 90m, 8h, 2d12h, 1w, or seconds (not with --deadline)
-  --allow API[:METHOD,...]    what it opens, instead of what it did (repeatable, not with --add-allow, not with --remove-allow)
+  --uses N                    how many times it can be granted
+  --unlimited                 any number of times
+  --deadline TIME             expiry: 2026-12-31, "2026-12-31 23:59",
+                              2026-12-31T23:59:59Z or @SECONDS
+  --ttl DURATION              lifetime from now: 45s, 90m, 8h, 2d12h, 1w, or
+                              seconds
+  --allow API[:METHOD,...]    what it opens, instead of what it did (repeatable)
   --add-allow API[:METHOD,...]
-                              what it opens besides (repeatable, not with --allow)
+                              what it opens besides (repeatable)
   --remove-allow API[:METHOD,...]
-                              what it no longer opens (repeatable, not with --allow)
+                              what it no longer opens (repeatable)
   --bind-sid SID              bind it to this login session; "" to none
   --extra JSON|@FILE          data of your own, a JSON object or a file of one
-  --note TEXT                 a note of yours, kept in the data; "" for none'
+  --note TEXT                 a note of yours, kept in the data; "" for none
+
+Examples:
+  vemo-access-token update - --ttl 30d --uses 5 <id
+  vemo-access-token update - --add-allow Backup:list,get <id'
     run_tool create --help
     [[ $output == *"
   --function TAG              its purpose (required)
@@ -138,14 +151,49 @@ Options:
     [[ $(tool init --help) != *Arguments* ]]
 }
 
+@test "help fits 80 columns" {
+    local command
+    for command in "" $COMMANDS; do
+        # shellcheck disable=SC2086
+        run_tool help $command
+        [ "$(grep -E '.{81}' <<<"$output")" = "" ]
+    done
+}
+
+@test "the two examples of each command's help do what they should" {
+    local command example
+    mkdir "$DIR/bin"
+    ln -s "$TOOL" "$DIR/bin/vemo-access-token"
+    PATH=$DIR/bin:$PATH
+    cd "$DIR"
+    tool init
+    for command in $COMMANDS; do
+        tool help "$command" | sed -n '/^Examples:$/,$s/^  //p' >examples
+        [ "$(grep -c "^vemo-access-token $command\( \|\$\)" examples)" -eq 2 ]
+        [ "$(wc -l <examples)" -eq 2 ]
+        while IFS= read -r example <&3; do
+            echo "$example"
+            tool revoke --all --yes
+            a_token --uses 10 --allow Backup:put >id
+            tool export tokens.jsonl
+            [ "$command" != import ] || tool revoke - <id
+            (eval "set -o pipefail; $example")
+        done 3<examples
+    done
+}
+
 @test "--version is the same everywhere" {
     run_tool --version
     [ "$status" -eq 0 ]
     [ "$stderr" = "" ]
     [[ $output =~ ^vemo-access-token\ [0-9]+\.[0-9]+\.[0-9]+$ ]]
     local version=$output
+    run_tool -V
+    expect 0 "$version"
     for command in $COMMANDS; do
         run_tool "$command" --version
+        expect 0 "$version"
+        run_tool "$command" -V
         expect 0 "$version"
     done
 }
@@ -170,8 +218,17 @@ create --unlimited=no|--unlimited: takes no value
 list bogus|unexpected argument "bogus"
 list --bogus|unknown option "--bogus"
 list --bogus=x|unknown option "--bogus"
-list --funct TAG|unknown option "--funct"
-list --verb|unknown option "--verb"
+list --funct TAG|unknown option "--funct"; did you mean "--function"?
+list --verb|unknown option "--verb"; did you mean "--verbose"?
+list --fucntion=TAG|unknown option "--fucntion"; did you mean "--function"?
+--hlep|unknown option "--hlep"; did you mean "--help"?
+lsit|unknown command "lsit"; did you mean "list"?
+hel list|unknown command "hel"; did you mean "help"?
+help craete|unknown command "craete"; did you mean "create"?
+help list show|unexpected argument "show"
+list --limit x --uid y --bogus|--limit: "x" is not a number from 1 to 9223372036854775807
+list --uid y --limit x|--uid: "y" is not a number from 0 to 4294967294
+list --uid y --limit|--uid: "y" is not a number from 0 to 4294967294
 list list|unexpected argument "list"
 list --help --bogus|unknown option "--bogus"
 purge -x|unknown option "-x"
@@ -204,7 +261,7 @@ list --uid 0 --user root|--uid excludes --user
 list --utc --epoch|--utc excludes --epoch
 list --output|--output: needs a value
 list -o xml|--output: "xml" is not a form: table, json, jsonl or csv
-update TID --ttl 1h --deadline 2999-01-01|--deadline excludes --ttl
+update TID --ttl 1h --deadline 2999-01-01|--ttl excludes --deadline
 update TID --allow A --add-allow B|--allow excludes --add-allow
 update TID --allow A --remove-allow B|--allow excludes --remove-allow
 stats --prometheus -o json|--prometheus excludes --output

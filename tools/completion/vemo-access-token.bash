@@ -16,6 +16,8 @@ _vemo_access_token()
         fi
     done
 
+    local commands='create generate list show check grant update rotate revoke purge stats
+        export import init doctor tune help'
     local selection='--uid --user --function --bind-sid --created-before --created-after --opens'
     selection+=' --no-owner --unlimited --expired --expiring'
     local uses='--uses --unlimited'
@@ -40,10 +42,8 @@ _vemo_access_token()
         tune) options='--wal --undo --dry-run --no-header' ;;
         import) options='--partial --skip-existing --in-steps' ;;
         export) options=$selection ;;
-        generate | init) options= ;;
+        generate | init | help) options= ;;
         '')
-            local commands='create generate list show check grant update rotate revoke purge stats
-                export import init doctor tune'
             [[ $cur == -* ]] && commands='--help --version'
             COMPREPLY=($(compgen -W "$commands" -- "$cur"))
             return
@@ -105,6 +105,8 @@ _vemo_access_token()
         COMPREPLY=($(compgen -W "$options" -- "$cur"))
     elif [[ $command == @(export|import) ]]; then
         _filedir
+    elif [[ $command == help ]]; then
+        COMPREPLY=($(compgen -W "$commands" -- "$cur"))
     fi
 } &&
     complete -F _vemo_access_token vemo-access-token

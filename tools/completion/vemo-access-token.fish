@@ -47,13 +47,15 @@ for command in \
     'import:Create the tokens of files that export wrote' \
     'init:Make the directory, the file and the table' \
     'doctor:Say what is wrong with the store, and what helps' \
-    'tune:Add indexes for a large store'
+    'tune:Add indexes for a large store' \
+    'help:Print what a command takes'
     set -l parts (string split -m 1 : $command)
     complete -c vemo-access-token -n __vemo_access_token_in -a $parts[1] -d $parts[2]
+    complete -c vemo-access-token -n '__vemo_access_token_in help' -a $parts[1] -d $parts[2]
     __vemo_access_token_option $parts[1] verbose "Show the library's log lines" -s v
 end
 complete -c vemo-access-token -s h -l help -d 'Print help and exit'
-complete -c vemo-access-token -l version -d 'Print the version and exit'
+complete -c vemo-access-token -s V -l version -d 'Print the version and exit'
 
 set -l fields tid bind_sid uid deadline count create_time function webapi_allow extra
 set -l forms 'table json jsonl'
