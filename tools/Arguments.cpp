@@ -3,6 +3,7 @@
 #include <set>
 
 #include "Console.h"
+#include "Masking.h"
 #include "Steps.h"
 
 namespace {
@@ -54,6 +55,27 @@ void addAllowances(Command& command, const std::string& strName, std::vector<All
         strName, "API[:METHOD,...]",
         [&allowances](const std::string& strText) { allowances.push_back(parseAllowance(strText)); },
         strDescription);
+}
+
+std::vector<std::string> doubtsAbout(const std::string& strName, const std::vector<Allowance>& allowances)
+{
+    std::vector<std::string> strNames;
+    for (const Allowance& allowance : allowances) {
+        strNames.push_back(allowance.strApi);
+        strNames.insert(strNames.end(), allowance.strMethods.begin(), allowance.strMethods.end());
+    }
+    std::vector<std::string> strDoubts;
+    for (const std::string& strEach : strNames) {
+        if (strEach.find('*') != std::string::npos) {
+            strDoubts.push_back(strName + ": " + quoted(strEach) +
+                                " stands for this name alone: \"*\" is no wildcard");
+        }
+        if (strEach.find_first_of(" \t\n") != std::string::npos) {
+            strDoubts.push_back(strName + ": " + quoted(strEach) +
+                                " holds a blank, which is part of the name");
+        }
+    }
+    return strDoubts;
 }
 
 bool Selection::empty() const

@@ -24,6 +24,9 @@ Command::Take notEmptyInto(std::string& strTarget);
 void addAllowances(Command& command, const std::string& strName, std::vector<Allowance>& allowances,
                    const std::string& strDescription);
 
+// Names in them that are seldom meant, a sentence about each: they are compared byte by byte.
+std::vector<std::string> doubtsAbout(const std::string& strName, const std::vector<Allowance>& allowances);
+
 // Which tokens: those that fulfil all that is asked for.
 struct Selection {
     std::optional<unsigned int> nUid;

@@ -69,6 +69,15 @@ std::unique_ptr<tool::Store> prepare(const Json::Value& jToken)
     return pStore;
 }
 
+// What the caller may not have meant.
+std::vector<std::string> doubtsAbout(const Options& options)
+{
+    if (options.allowances.empty()) {
+        return {"the token opens nothing: there is no --allow"};
+    }
+    return tool::doubtsAbout("--allow", options.allowances);
+}
+
 int create(const Options& options)
 {
     if (!options.nUid) {
@@ -80,9 +89,13 @@ int create(const Options& options)
     const std::string strResult = tool::Layout::Form::Table == options.layout.form
                                       ? tool::resultLine(strTid)
                                       : tool::recordText(jToken, options.layout.form);
+    const std::vector<std::string> strDoubts = doubtsAbout(options);
     tool::handOver(prepare(jToken), strResult, [&strTid](tool::Store& store) {
         return 0 == store.removeTid(strTid) ? "" : "the token was taken back";
     });
+    for (const std::string& strDoubt : strDoubts) {
+        tool::complain(strDoubt);
+    }
     return tool::EXIT_STATUS_DONE;
 }
 

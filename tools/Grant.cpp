@@ -2,6 +2,7 @@
 
 #include <memory>
 
+#include "AccessTokenDefine.h"
 #include "Arguments.h"
 #include "Commands.h"
 #include "Console.h"
@@ -115,12 +116,16 @@ int printOutcome(const Outcome& outcome, const Options& options)
 
 int grantCall(const Options& options)
 {
-    const Outcome outcome = spendUse(tool::readTid("TID", options.strTid), options);
+    const std::string strTid = tool::readTid("TID", options.strTid);
+    const Outcome outcome = spendUse(strTid, options);
     if (tool::Layout::Form::Table != options.layout.form) {
         return printOutcome(outcome, options);
     }
     if (grant::Verdict::Granted != outcome.verdict) {
-        throw tool::Failure(tool::EXIT_STATUS_REFUSED, std::string("refused: ") + reasonOf(outcome.verdict));
+        const bool blPart =
+            grant::Verdict::Unknown == outcome.verdict && strTid.size() < VEMO_ATOKEN_LENGTH_MIN;
+        throw tool::Failure(tool::EXIT_STATUS_REFUSED, std::string("refused: ") + reasonOf(outcome.verdict),
+                            blPart ? "a grant needs the whole id" : "");
     }
     if (options.blPrintUser) {
         tool::printLine(owner(outcome.nUid));

@@ -204,6 +204,12 @@ int update(const Options& options)
     const Json::Value jToken = updateToken(tool::readTid("TID", options.strTid), options, jChange);
     updateAgain(jToken, jChange);
     tool::print("1 token updated\n");
+    for (const auto& [szName, pAllowances] :
+         {std::pair("--allow", &options.allow), std::pair("--add-allow", &options.addAllow)}) {
+        for (const std::string& strDoubt : tool::doubtsAbout(szName, *pAllowances)) {
+            tool::complain(strDoubt);
+        }
+    }
     if (jChange.get("deadline", jToken["deadline"]).asInt64() < time(nullptr)) {
         tool::complain(
             "the token has expired; the next call of a program purges it, unless --ttl or --deadline "

@@ -14,12 +14,12 @@ OWN=own-$(printf '%0123d' 0)
 
 @test "create prints the id alone, and the library's defaults hold" {
     tool init
-    run_tool create --uid 1000 --function VPN
+    run_tool create --uid 1000 --function VPN --allow Api
     [ "$status" -eq 0 ]
     [ "$stderr" = "" ]
     [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
     [ "$(sql "SELECT bind_sid, uid, deadline - create_time, count, function, webapi_allow, extra FROM token
-              WHERE tid = '$output'")" = "|1000|86400|1|VPN|{}|{}" ]
+              WHERE tid = '$output'")" = '|1000|86400|1|VPN|{"Api":{"method":[]}}|{}' ]
 }
 
 @test "create stores what its options say" {
@@ -125,6 +125,32 @@ END
 END
 }
 
+@test "what is seldom meant is told, and done" {
+    local arguments doubt
+    tool init
+    while IFS='|' read -r arguments doubt; do
+        echo "$arguments"
+        eval "run_tool create --uid 0 --function VPN $arguments"
+        [ "$status" -eq 0 ]
+        [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
+        [ "$stderr" = "${doubt:+vemo-access-token: $doubt}" ]
+    done <<'END'
+|the token opens nothing: there is no --allow
+--allow Api|
+--allow Api:get --allow '*'|--allow: "*" stands for this name alone: "*" is no wildcard
+--allow 'Api:get,put*'|--allow: "put*" stands for this name alone: "*" is no wildcard
+--allow 'Api:get, put'|--allow: " put" holds a blank, which is part of the name
+--allow $'A\tB'|--allow: "A\x09B" holds a blank, which is part of the name
+END
+    run_tool create --uid 0 --function VPN --allow 'A *:b,c d'
+    [ "$stderr" = 'vemo-access-token: --allow: "A *" stands for this name alone: "*" is no wildcard
+vemo-access-token: --allow: "A *" holds a blank, which is part of the name
+vemo-access-token: --allow: "c d" holds a blank, which is part of the name' ]
+    # Not of a token that is not there.
+    run_tool create --uid 0 --function VPN --tid "$(sql "SELECT tid FROM token LIMIT 1")"
+    expect 2 "" "vemo-access-token: --tid: there is a token with this id already"
+}
+
 @test "an allowance without an API or with an empty method is refused" {
     tool init
     for allow in '' : :m; do
@@ -225,16 +251,16 @@ END
 
 @test "create takes an id of the caller's own" {
     tool init
-    run_tool create --uid 0 --function VPN --tid "$OWN"
+    run_tool create --uid 0 --function VPN --allow Api --tid "$OWN"
     expect 0 "$OWN"
-    run_tool create --uid 0 --function VPN --tid - <<<"${OWN/own/two}"
+    run_tool create --uid 0 --function VPN --allow Api --tid - <<<"${OWN/own/two}"
     expect 0 "${OWN/own/two}"
     # Lines that hold nothing count for nothing; neither does a missing line break.
-    run_tool create --uid 0 --function VPN --tid - < <(printf '\n\n%s' "${OWN/own/tre}")
+    run_tool create --uid 0 --function VPN --allow Api --tid - < <(printf '\n\n%s' "${OWN/own/tre}")
     expect 0 "${OWN/own/tre}"
     # What it may hold, and how long it may be, is the caller's business.
     odd="' \"Ä\\$(printf '%010000d' 0)"
-    run_tool create --uid 0 --function VPN --tid - <<<"$odd"
+    run_tool create --uid 0 --function VPN --allow Api --tid - <<<"$odd"
     expect 0 "$odd"
     tool generate | tool create --uid 0 --function VPN --tid - >"$DIR/tid"
     [ "$(sql "SELECT tid FROM token ORDER BY rowid")" = "$OWN
@@ -286,7 +312,7 @@ END
     expired=$(a_token)
     lasting=$(a_token)
     sql "UPDATE token SET deadline = 1 WHERE tid IN ('$OWN', '$expired')"
-    run_tool create --uid 0 --function VPN --tid "$OWN"
+    run_tool create --uid 0 --function VPN --allow Api --tid "$OWN"
     expect 0 "$OWN"
     [ "$(sql "SELECT tid, count FROM token ORDER BY rowid")" = "$lasting|1
 $OWN|1" ]
@@ -304,7 +330,7 @@ $OWN|1" ]
 
 @test "create makes the file and the table where only they are missing" {
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
-    run_tool create --uid 0 --function VPN
+    run_tool create --uid 0 --function VPN --allow Api
     [ "$status" -eq 0 ]
     [ "$stderr" = "" ]
     [ "$(sql "SELECT tid FROM token")" = "$output" ]

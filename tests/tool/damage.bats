@@ -288,8 +288,8 @@ create --uid 0 --function TAG"
         doctor_looks "$REAL_DB is $finding"
         rm -d "$DB"
     done <<'TABLE'
-mkfifo|no regular file
-mkdir|no regular file
+mkfifo|not a regular file
+mkdir|not a regular file
 ln -s /|a symbolic link
 ln -s /dev/zero|a symbolic link
 TABLE

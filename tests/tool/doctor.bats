@@ -217,8 +217,8 @@ error: there is no database $REAL_DB
                 "find out who made it; remove it while no program runs"
             rm -d "$DB-$suffix"
         done <<'TABLE'
-mkfifo|no regular file
-mkdir|no regular file
+mkfifo|not a regular file
+mkdir|not a regular file
 ln -s nowhere|a symbolic link
 TABLE
     done

@@ -107,12 +107,20 @@ entry---$ZEROS|4|{\"n\":[0.5,\"ü\"]}" ]
 @test "a grant needs the whole id" {
     row token---
     before=$(rows)
-    for tid in token--- "token---${ZEROS%0}" "token---${ZEROS}0" t "TOKEN---$ZEROS" "token---%"; do
+    local tid hint
+    while IFS='|' read -r tid hint; do
         run_tool grant "$tid" Api get
-        expect 1 "" "vemo-access-token: refused: unknown token"
+        expect 1 "" "vemo-access-token: refused: unknown token$hint"
         run_tool grant - Api get <<<"$tid"
-        expect 1 "" "vemo-access-token: refused: unknown token"
-    done
+        expect 1 "" "vemo-access-token: refused: unknown token$hint"
+    done <<END
+token---|; a grant needs the whole id
+token---${ZEROS%0}|; a grant needs the whole id
+token---${ZEROS}0|
+t|; a grant needs the whole id
+TOKEN---$ZEROS|
+token---%|; a grant needs the whole id
+END
     [ "$(rows)" = "$before" ]
 }
 

@@ -145,7 +145,7 @@ TABLE
     local kind
     for kind in EXCLUSIVE READING; do
         lock "${!kind}"
-        run_waiting 1 create --uid 0 --function VPN
+        run_waiting 1 create --uid 0 --function VPN --allow Api
         [ "$status" -eq 0 ]
         [ "$stderr" = "" ]
         [ "$(sql "SELECT tid FROM token")" = "$output" ]
@@ -154,14 +154,14 @@ TABLE
     # What its caller ignores does not interrupt it.
     lock "$READING"
     trap '' HUP
-    SIGNAL=HUP run_waiting 1 create --uid 0 --function VPN
+    SIGNAL=HUP run_waiting 1 create --uid 0 --function VPN --allow Api
     trap - HUP
     [ "$status" -eq 0 ]
     [ "$(sql "SELECT tid FROM token")" = "$output" ]
     # What does interrupt it leaves no token whose id nobody got to know.
     sql "DELETE FROM token"
     lock "$READING"
-    SIGNAL=TERM run_waiting 1 create --uid 0 --function VPN
+    SIGNAL=TERM run_waiting 1 create --uid 0 --function VPN --allow Api
     expect 143 "" "vemo-access-token: interrupted; the token was taken back"
     [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }
@@ -350,7 +350,7 @@ TABLE
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
     local i pids=()
     for i in 1 2 3 4 5 6; do
-        "$TOOL" create --uid 0 --function VPN >"$DIR/out$i" 2>"$DIR/err$i" 3>&- &
+        "$TOOL" create --uid 0 --function VPN --allow Api >"$DIR/out$i" 2>"$DIR/err$i" 3>&- &
         pids+=($!)
     done
     for i in "${pids[@]}"; do
@@ -384,7 +384,7 @@ TABLE
         pids+=($!)
     done
     for i in 5 6 7 8; do
-        "$TOOL" create --uid 0 --function VPN >"$DIR/out$i" 2>&1 3>&- &
+        "$TOOL" create --uid 0 --function VPN --allow Api >"$DIR/out$i" 2>&1 3>&- &
         pids+=($!)
     done
     for i in "${pids[@]}"; do
@@ -616,7 +616,7 @@ TABLE
         pids+=($!)
         i=$((i + 1))
     done <<TABLE
-create --uid 0 --function VPN
+create --uid 0 --function VPN --allow Api
 grant $second Api
 update $second --uses 2
 revoke $second

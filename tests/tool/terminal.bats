@@ -76,7 +76,7 @@ grant - Api|granted
 update - --bind-sid s|1 token updated
 revoke -|1 token revoked
 TABLE
-    on_terminal --answer "Token id: " "$id"$'\r' -- create --uid 0 --function TAG --tid -
+    on_terminal --answer "Token id: " "$id"$'\r' -- create --uid 0 --function TAG --allow Api --tid -
     expect 0 "Token id: 
 $id" # the result
     [ "$(sql "SELECT tid, function FROM token")" = "$id|TAG" ]

@@ -49,6 +49,15 @@ rows()
 END
 }
 
+@test "names that are seldom meant are told, and taken" {
+    row token---
+    run_tool update token--- --allow 'Api:*'
+    expect 0 "1 token updated" 'vemo-access-token: --allow: "*" stands for this name alone: "*" is no wildcard'
+    run_tool update token--- --add-allow 'B c'
+    expect 0 "1 token updated" 'vemo-access-token: --add-allow: "B c" holds a blank, which is part of the name'
+    [ "$(sql "SELECT webapi_allow FROM token")" = '{"Api":{"method":["*"]},"B c":{"method":[]}}' ]
+}
+
 @test "--ttl counts from now" {
     row token---
     while read -r ttl seconds; do
@@ -240,7 +249,8 @@ END
     row token---
     text=$'a\'b"c\\d\ne\tf\e[31mÄ漢\xff;--'
     run_tool update token--- --bind-sid "$text" --add-allow "$text:$text"
-    expect 0 "1 token updated"
+    [ "$status" -eq 0 ]
+    [ "$output" = "1 token updated" ]
     [ "$(sql "SELECT lower(hex(bind_sid)) FROM token")" = "$(printf %s "$text" | od -An -v -tx1 | tr -d ' \n')" ]
     json=$'a\'b\\"c\\\\d\\ne\\tf\\u001b[31mÄ漢\xff;--'
     [ "$(sql "SELECT webapi_allow FROM token")" = \
