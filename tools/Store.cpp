@@ -1,6 +1,7 @@
 #include "Store.h"
 
 #include <sqlite3.h>
+#include <unistd.h>
 
 #include <cerrno>
 #include <condition_variable>
@@ -58,6 +59,12 @@ std::pair<std::string, std::string> explained(const std::string& strErr)
     }
     if (contains(strErr, "file is not a database")) {
         return {"is not a token database, or is damaged (" + strErr + ")", ""};
+    }
+    if (contains(strErr, "readonly database")) {
+        if (0 != access(tool::databaseDirectory().c_str(), W_OK) && EROFS == errno) {
+            return {"is on a file system that is read-only", "\"mount -o remount,rw\" makes that writable"};
+        }
+        return {"cannot be written to (" + strErr + ")", "\"vemo-access-token doctor\" says why"};
     }
     if (contains(strErr, "malformed")) {
         return {"is damaged (" + strErr + ")", "\"vemo-access-token doctor\" says how badly"};

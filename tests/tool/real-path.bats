@@ -213,7 +213,7 @@ while 0 == rename(-100, sys.argv[1].encode(), -100, sys.argv[2].encode(), 2): # 
     expect 0 1
     inside mount -o remount,ro "$SESSION"
     run_inside grant "$id" Api get
-    expect 4 "" "vemo-access-token: $REAL_DB failed: attempt to write a readonly database"
+    expect 4 "" "vemo-access-token: $REAL_DB is on a file system that is read-only; \"mount -o remount,rw\" makes that writable"
     run_inside show "$id" --field count
     expect 0 1
 }
