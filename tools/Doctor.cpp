@@ -21,7 +21,22 @@ struct Options {
 
 const char* severityText(const Finding& finding)
 {
-    return Finding::Severity::Error == finding.severity ? "error" : "warning";
+    switch (finding.severity) {
+    case Finding::Severity::Error: return "error";
+    case Finding::Severity::Warning: return "warning";
+    case Finding::Severity::Note: break;
+    }
+    return "note";
+}
+
+const char* colourOf(const Finding& finding)
+{
+    switch (finding.severity) {
+    case Finding::Severity::Error: return "\x1b[31m";
+    case Finding::Severity::Warning: return "\x1b[33m";
+    case Finding::Severity::Note: break;
+    }
+    return "\x1b[36m";
 }
 
 Json::Value jsonOf(const Finding& finding, bool blRepaired)
@@ -37,8 +52,7 @@ Json::Value jsonOf(const Finding& finding, bool blRepaired)
 
 void printText(const Finding& finding, bool blRepaired)
 {
-    const bool blError = Finding::Severity::Error == finding.severity;
-    const char* szColour = blRepaired ? "\x1b[32m" : blError ? "\x1b[31m" : "\x1b[33m";
+    const char* szColour = blRepaired ? "\x1b[32m" : colourOf(finding);
     const bool blColoured = tool::isColoured(tool::resultStream());
     const std::string strMark = blRepaired ? "repaired" : severityText(finding);
     tool::print((blColoured ? szColour + strMark + "\x1b[0m" : strMark) + ": " +
@@ -68,7 +82,7 @@ void report(const tool::Findings& repaired, const tool::Findings& left, const to
     }
     if (tool::Layout::Form::Json == layout.form) {
         tool::print(tool::styledJson(jFindings) + "\n");
-    } else if (tool::Layout::Form::Table == layout.form && left.empty()) {
+    } else if (tool::Layout::Form::Table == layout.form && tool::areNotes(left)) {
         tool::print("no findings\n");
     }
 }
@@ -124,7 +138,7 @@ int doctor(const Options& options)
         // What a repair lets doctor look at can need the next.
     }
     report(repaired, left, options.layout);
-    return left.empty() ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_FINDINGS;
+    return tool::areNotes(left) ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_FINDINGS;
 }
 
 } // namespace

@@ -2,6 +2,8 @@
 
 #include <unistd.h>
 
+#include <algorithm>
+
 #include "Failure.h"
 #include "Masking.h"
 #include "Values.h"
@@ -30,6 +32,12 @@ void TokenNames::add(const std::optional<std::string>& strTid)
 std::string TokenNames::text() const
 {
     return countText(m_nTokens, "token") + " (" + m_strNames + (NAMED_MAX < m_nTokens ? ", ..." : "") + ")";
+}
+
+bool areNotes(const Findings& findings)
+{
+    return std::all_of(findings.begin(), findings.end(),
+                       [](const Finding& each) { return Finding::Severity::Note == each.severity; });
 }
 
 Findings examine()

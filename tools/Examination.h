@@ -12,7 +12,11 @@
 namespace tool {
 
 struct Finding {
-    enum class Severity { Error, Warning };
+    enum class Severity {
+        Error,   // makes calls fail, or do something else than they report
+        Warning, // can do so
+        Note,    // is worth knowing, and nothing wrong
+    };
 
     Severity severity;
     std::string strWhat;
@@ -22,6 +26,9 @@ struct Finding {
 };
 
 typedef std::vector<Finding> Findings;
+
+// Whether there are none but notes.
+bool areNotes(const Findings& findings);
 
 // What helps where a database cannot stay. Its journals belong to it, so it goes with its directory.
 extern const char* const REMEDY_REPLACE;
@@ -55,6 +62,9 @@ void examineFileSystem(Findings& findings);
 // can be read; the second repairs only those of a sound table.
 bool examineSchema(Findings& findings);
 void examineTokens(bool blTableSound, Findings& findings);
+
+// Notes about the tokens.
+void examineUse(Findings& findings);
 
 } // namespace tool
 

@@ -3,9 +3,11 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
+#include <iterator>
 
 #include "AccessTokenDefine.h"
 #include "Descriptor.h"
@@ -137,9 +139,9 @@ bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings
     const std::function<void()> none;
     switch (errno) {
     case ENOENT:
-        findings.push_back({Finding::Severity::Error, "there is no directory " + tool::databaseDirectory(),
-                            "no token can be created, and every call fails", "vemo-access-token init",
-                            [] { tool::makeDirectory(); }});
+        findings.push_back({Finding::Severity::Note, "there is no directory " + tool::databaseDirectory(),
+                            "there is no store yet: no token can be created, and every call fails",
+                            "vemo-access-token init", [] { tool::makeDirectory(); }});
         return false;
     case ELOOP:
         findings.push_back({Finding::Severity::Error, strPath + " is a symbolic link",
@@ -246,7 +248,11 @@ bool examineFile(bool blMake, Findings& findings)
     const std::string strPath = VEMO_ATOKEN_DB_PATH;
     const auto status = tool::statusOf(strPath);
     if (!status) {
-        findings.push_back({Finding::Severity::Error,
+        // A journal without its database is the rest of one that was there.
+        const bool blFirst = std::none_of(
+            std::begin(tool::JOURNAL_SUFFIXES), std::end(tool::JOURNAL_SUFFIXES),
+            [&strPath](const char* szSuffix) { return tool::statusOf(strPath + szSuffix).has_value(); });
+        findings.push_back({blFirst ? Finding::Severity::Note : Finding::Severity::Error,
                             "there is no database " + strPath,
                             "there are no tokens; the first call that needs it makes it",
                             "vemo-access-token init",

@@ -149,6 +149,9 @@ void examineStore(Findings& findings)
     if (blWhole && blReadable) {
         examineTokens(findings.size() == nBefore, findings);
     }
+    if (areNotes(findings)) { // what is wrong comes first
+        examineUse(findings);
+    }
 }
 
 } // namespace tool

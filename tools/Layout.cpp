@@ -14,20 +14,6 @@ namespace {
 using tool::Layout;
 typedef tool::Table::Kind Kind;
 
-Layout::Form parseForm(const std::string& strText, const char* szForms)
-{
-    if (strText == "table") {
-        return Layout::Form::Table;
-    }
-    if (strText == "json") {
-        return Layout::Form::Json;
-    }
-    if (strText == "jsonl") {
-        return Layout::Form::JsonLines;
-    }
-    throw tool::BadValue(tool::quoted(strText) + " is not a form: " + szForms);
-}
-
 std::string timeIn(const Json::Value& jTime, const Layout& layout)
 {
     return layout.blEpoch ? jTime.asString() : tool::timeText(jTime.asInt64(), layout.blUtc);
@@ -230,15 +216,28 @@ std::string parseField(const std::string& strText)
     return strText;
 }
 
+Layout::Form parseForm(const std::string& strText, const char* szForms)
+{
+    if (strText == "table") {
+        return Layout::Form::Table;
+    }
+    if (strText == "json") {
+        return Layout::Form::Json;
+    }
+    if (strText == "jsonl") {
+        return Layout::Form::JsonLines;
+    }
+    throw BadValue(quoted(strText) + " is not a form: " + szForms);
+}
+
 void addForm(Command& command, Layout& layout)
 {
     const auto parse = [](const std::string& strText) { return parseForm(strText, "table, json or jsonl"); };
     addParsed(command, "-o,--output", "FORM", layout.form, parse, "table (the default), json or jsonl");
 }
 
-void addFormOptions(Command& command, Layout& layout)
+void addNoHeader(Command& command, Layout& layout)
 {
-    addForm(command, layout);
     command.flag("--no-header", layout.blNoHeader, "no line of titles above a table");
 }
 

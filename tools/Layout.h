@@ -30,9 +30,12 @@ struct Layout {
 // The name of a field, if it is one. Throws BadValue.
 std::string parseField(const std::string& strText);
 
-// Adds -o to a command; the second, --no-header too.
+// The form of a name. Throws BadValue, which lists the names that a command has.
+Layout::Form parseForm(const std::string& strText, const char* szForms);
+
+// Adds -o to a command, or --no-header.
 void addForm(Command& command, Layout& layout);
-void addFormOptions(Command& command, Layout& layout);
+void addNoHeader(Command& command, Layout& layout);
 
 // Adds what commands that show tokens have besides: CSV, --field, --columns, --utc, --epoch.
 void addTokenOptions(Command& command, Layout& layout);

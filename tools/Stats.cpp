@@ -1,6 +1,5 @@
 // stats: what the store holds, in numbers.
 
-#include <algorithm>
 #include <map>
 #include <memory>
 
@@ -9,8 +8,7 @@
 #include "Failure.h"
 #include "Json.h"
 #include "Layout.h"
-#include "Place.h"
-#include "Steps.h"
+#include "Statistics.h"
 #include "Table.h"
 #include "Values.h"
 
@@ -24,73 +22,9 @@ struct Options {
     tool::Layout layout;
 };
 
-struct Group {
-    std::string strName;
-    uint64_t nTokens;
-};
-
-struct UserGroup {
-    std::optional<Json::Int64> nUid; // nothing for a NULL
-    uint64_t nTokens;
-};
-
-struct Statistics {
-    uint64_t nTokens;
-    uint64_t nExpired;
-    uint64_t nUnlimited;
-    std::vector<Group> functions;
-    std::vector<UserGroup> users;
-    uint64_t nFileBytes;
-    uint64_t nFreePages;
-    uint64_t nPageBytes;
-};
-
-Json::Int64 numberOf(const std::optional<std::string>& strText)
-{
-    return strtoll(strText.value_or("").c_str(), nullptr, 10);
-}
-
-// Those of a name, with the most tokens first.
-template <typename Group, typename Name>
-std::vector<Group> groupsOf(const std::map<Name, uint64_t>& counts)
-{
-    std::vector<Group> groups;
-    for (const auto& [name, nTokens] : counts) {
-        groups.push_back({name, nTokens});
-    }
-    std::stable_sort(groups.begin(), groups.end(),
-                     [](const Group& left, const Group& right) { return left.nTokens > right.nTokens; });
-    return groups;
-}
-
-Statistics collect()
-{
-    Statistics statistics = {};
-    std::map<std::string, uint64_t> functions;
-    std::map<std::optional<Json::Int64>, uint64_t> users;
-    const std::string strSelect = std::string("SELECT function, CAST(uid AS INTEGER), count(*), "
-                                              "total(count < 0), total(") +
-                                  grant::SQL_EXPIRED + ") FROM token WHERE ";
-    tool::Steps steps(tool::Store::Access::Glance);
-    while (steps.next([&](tool::Store& store, const std::string& strThose) {
-        store.eachRow(strSelect + strThose + " GROUP BY 1, 2", [&](const tool::Row& row) {
-            const auto nTokens = static_cast<uint64_t>(numberOf(row[2]));
-            statistics.nTokens += nTokens;
-            statistics.nUnlimited += static_cast<uint64_t>(numberOf(row[3]));
-            statistics.nExpired += static_cast<uint64_t>(numberOf(row[4]));
-            functions[row[0].value_or("")] += nTokens;
-            users[row[1] ? std::optional(numberOf(row[1])) : std::nullopt] += nTokens;
-        });
-        statistics.nFreePages = store.number("PRAGMA freelist_count");
-        statistics.nPageBytes = store.number("PRAGMA page_size");
-    })) {
-    }
-    statistics.functions = groupsOf<Group>(functions);
-    statistics.users = groupsOf<UserGroup>(users);
-    const auto status = tool::statusOf(VEMO_ATOKEN_DB_PATH);
-    statistics.nFileBytes = status ? static_cast<uint64_t>(status->st_size) : 0;
-    return statistics;
-}
+using tool::Group;
+using tool::Statistics;
+using tool::UserGroup;
 
 std::string numberText(const UserGroup& group)
 {
@@ -199,11 +133,21 @@ void printMetrics(const Statistics& statistics)
         tool::printLine(strPrefix + "user_tokens{uid=\"" + numberText(group) +
                         "\",user=" + label(nameOf(group)) + "} " + std::to_string(group.nTokens));
     }
+    printFamily(strPrefix + "expiring_tokens", "Tokens that expire within this time.");
+    tool::print(strPrefix + "expiring_tokens{within=\"day\"} " + std::to_string(statistics.nExpiringInDay) +
+                "\n");
+    tool::print(strPrefix + "expiring_tokens{within=\"week\"} " + std::to_string(statistics.nExpiringInWeek) +
+                "\n");
+    printMetric(strPrefix + "no_owner_tokens", "Tokens whose owner is not a user of this machine.",
+                tool::countWithoutOwner(statistics));
+    printMetric(strPrefix + "no_api_tokens", "Tokens that open nothing.", statistics.nOpeningNothing);
+    printMetric(strPrefix + "old_unlimited_tokens",
+                "Tokens with any number of uses that are older than a year.", statistics.nOldUnlimited);
 }
 
 int stats(const Options& options)
 {
-    const Statistics statistics = collect();
+    const Statistics statistics = tool::collectStatistics();
     if (options.blPrometheus) {
         printMetrics(statistics);
         return tool::EXIT_STATUS_DONE;
@@ -229,10 +173,17 @@ void addStats(Commands& commands)
                                     [pOptions] { return stats(*pOptions); });
     command.flag("--prometheus", pOptions->blPrometheus,
                  "as metrics for the textfile collector of Prometheus' node exporter");
-    addFormOptions(command, pOptions->layout);
+    const auto takeForm = [pOptions](const std::string& strText) {
+        pOptions->blPrometheus = strText == "metrics";
+        pOptions->layout.form =
+            pOptions->blPrometheus ? Form::Table : parseForm(strText, "table, json, jsonl or metrics");
+    };
+    command.option("-o,--output", "FORM", takeForm,
+                   "table (the default), json, jsonl, or metrics, as --prometheus does");
+    addNoHeader(command, pOptions->layout);
     command.exclude("--output", "--prometheus");
     command.example("");
-    command.example("-o json");
+    command.example("-o metrics >tokens.prom");
 }
 
 } // namespace tool

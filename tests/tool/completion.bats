@@ -202,7 +202,7 @@ vemo-access-token create --extra
 vemo-access-token show 
 END
     not_called
-    expect 0 "vemo-access-token,stats,--output|json|jsonl|table
+    expect 0 "vemo-access-token,stats,--output|json|jsonl|metrics|table
 vemo-access-token,list,--field|bind_sid|count|create_time|deadline|extra|function|tid|uid|webapi_allow
 vemo-access-token,list,--sort,uid|uid|uid:desc
 vemo-access-token,create,--extra,@|@
@@ -229,7 +229,7 @@ vemo-access-token tune --wal --
 vemo-access-token update x --allow A --ttl 1h --
 END
     not_called
-    expect 0 "vemo-access-token,stats,--output|json|jsonl|table
+    expect 0 "vemo-access-token,stats,--output|json|jsonl|metrics|table
 vemo-access-token,list,--field|bind_sid|count|create_time|deadline|extra|function|tid|uid|webapi_allow
 vemo-access-token,list,--sort,uid|uid|uid:desc
 vemo-access-token,create,--extra,@|@
@@ -275,7 +275,7 @@ END
     expect 0 "vemo-access-token li|list
 vemo-access-token list --user roo|root
 vemo-access-token create --user=roo|--user=root
-vemo-access-token stats --output |json|jsonl|table
+vemo-access-token stats --output |json|jsonl|metrics|table
 vemo-access-token check -o ta|table
 vemo-access-token list --output |csv|json|jsonl|table
 vemo-access-token list --columns tid,no|tid,note

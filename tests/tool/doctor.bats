@@ -14,7 +14,7 @@ a_row()
 {
     [ -e "$DB" ] || tool init >/dev/null
     sql "INSERT INTO token VALUES (substr('$1$ZEROS$ZEROS', 1, 127), '', ${uid-0}, ${deadline-9999999999},
-         ${count-1}, ${create_time-0}, 'VPN', ${webapi_allow-"'{}'"}, ${extra-"'{}'"})"
+         ${count-1}, ${create_time-0}, 'VPN', ${webapi_allow-"'{\"Api\":{\"method\":[\"get\"]}}'"}, ${extra-"'{}'"})"
 }
 
 # expect_left NAME...: the tokens that are there still, in order
@@ -30,6 +30,16 @@ expect_finding()
     expect 5 "$1: $2
     meaning: $3
     remedy: $4"
+}
+
+# expect_note WHAT MEANING REMEDY: doctor tells that, and finds nothing
+expect_note()
+{
+    run_tool doctor
+    expect 0 "note: $1
+    meaning: $2
+    remedy: $3
+no findings"
 }
 
 # expect_repair WHAT MEANING: doctor repairs that, and then there is nothing left
@@ -68,9 +78,9 @@ never_hang()
 }
 
 @test "a sound store gives no findings, and stays as it is" {
-    a_token --allow Example.File:get --extra '{"a":Infinity}'
+    a_token --ttl 30d --allow Example.File:get --extra '{"a":Infinity}'
     deadline="strftime('%s', 'now') - 3000" a_row expired-just-now
-    count=-1 uid=4294967294 a_row unlimited
+    count=-1 create_time="strftime('%s', 'now')" a_row unlimited
     cp "$DB" "$DIR/before"
     run_tool doctor
     expect 0 "no findings"
@@ -81,6 +91,49 @@ never_hang()
     run_tool doctor -o jsonl
     expect 0 ""
     cmp "$DB" "$DIR/before"
+}
+
+@test "what is worth knowing of a sound store is told in numbers, and is no finding" {
+    local now="strftime('%s', 'now')" i
+    a_row plain
+    for i in 1 2 3; do
+        deadline="$now + 86000 * $i" a_row "soon$i" # of them, one within a day
+    done
+    deadline="$now + 7 * 86400 + 60" a_row later
+    uid=4000000000 a_row ownerless
+    webapi_allow="'{}'" a_row closed
+    count=-1 create_time="$now - 365 * 86400 - 60" a_row old
+    count=-2 create_time="$now - 365 * 86400 + 60" a_row younger
+    run_tool doctor
+    expect 0 "note: expiring within a day: 1 token
+    meaning: who uses them is refused then
+    remedy: \"vemo-access-token list --expiring 1d\" tells which; update --ttl gives them time
+note: expiring within a week: 3 tokens
+    meaning: who uses them is refused then
+    remedy: \"vemo-access-token list --expiring 7d\" tells which; update --ttl gives them time
+note: without an owner who is a user of this machine: 1 token
+    meaning: they are granted on behalf of a number that another user can get
+    remedy: \"vemo-access-token list --no-owner\" tells which; revoke --no-owner deletes them
+note: opening nothing: 1 token
+    meaning: every call with them is refused
+    remedy: update --add-allow lets them open calls; or revoke them
+note: of unlimited uses, and older than a year: 1 token
+    meaning: whoever has got hold of one in all that time can use it
+    remedy: revoke them, and create others
+no findings"
+    local notes=$output
+    run_tool doctor --repair
+    expect 0 "$notes"
+    run_tool doctor -o jsonl
+    [ "$status" -eq 0 ]
+    [ "${lines[3]}" = '{"finding":"opening nothing: 1 token","meaning":"every call with them is refused","remedy":"update --add-allow lets them open calls; or revoke them","repaired":false,"severity":"note"}' ]
+    # An owner whom nobody could look up may be there.
+    VEMO_TEST_LOOKUP=5 run_tool doctor
+    [[ $output != *"without an owner"* ]]
+    # What is wrong comes first, and alone.
+    sql "UPDATE token SET function = '' WHERE tid LIKE 'plain%'"
+    expect_finding warning "an empty purpose in 1 token (plain000)" "no call deletes such a token by its purpose" \
+        "revoke them, and create others"
 }
 
 @test "not being root is a finding, and the only one" {
@@ -98,12 +151,12 @@ never_hang()
 }
 
 @test "a missing directory, and then the file, are made" {
-    expect_finding error "there is no directory $DIRECTORY" "no token can be created, and every call fails" \
-        "vemo-access-token init"
+    local meaning="there is no store yet: no token can be created, and every call fails"
+    expect_note "there is no directory $DIRECTORY" "$meaning" "vemo-access-token init"
     [ ! -e "$VEMO_REDIRECT_DIR" ]
     run_tool doctor --repair
     expect 0 "repaired: there is no directory $DIRECTORY
-    meaning: no token can be created, and every call fails
+    meaning: $meaning
 repaired: there is no database $REAL_DB
     meaning: there are no tokens; the first call that needs it makes it
 no findings"
@@ -113,9 +166,14 @@ no findings"
 
 @test "a missing file is made, with its table" {
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
-    expect_finding error "there is no database $REAL_DB" "there are no tokens; the first call that needs it makes it" \
+    expect_note "there is no database $REAL_DB" "there are no tokens; the first call that needs it makes it" \
         "vemo-access-token init"
     [ ! -e "$DB" ]
+    # With a journal there was one.
+    install -m 0600 /dev/null "$DB-journal"
+    expect_finding error "there is no database $REAL_DB" "there are no tokens; the first call that needs it makes it" \
+        "vemo-access-token init"
+    rm "$DB-journal"
     expect_repair "there is no database $REAL_DB" "there are no tokens; the first call that needs it makes it"
     [ "$(stat -c %a "$DB")" = 700 ]
     [ "$(sql "PRAGMA auto_vacuum; SELECT count(*) FROM token" | xargs)" = "1 0" ]
@@ -174,7 +232,7 @@ no findings"
     expect 5 "error: $DIRECTORY is a symbolic link
     meaning: the tokens stand elsewhere, or nowhere
     remedy: find out who made it; move the database to a directory of that name
-error: there is no database $REAL_DB
+note: there is no database $REAL_DB
     meaning: there are no tokens; the first call that needs it makes it
     remedy: vemo-access-token init"
 }
@@ -834,7 +892,7 @@ warning: a deadline of 0 or less in 1 token (meant-to)
 @test "a large table without an index on the deadline is a finding" {
     tool init
     sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 10001)
-         INSERT INTO token SELECT printf('%0127d', i), '', 0, 9999999999, 1, 0, 'VPN', '{}', '{}' FROM n"
+         INSERT INTO token SELECT printf('%0127d', i), '', 0, 9999999999, 1, 0, 'VPN', '{\"A\":{\"method\":[]}}', '{}' FROM n"
     expect_no_repair warning "10001 tokens, and no index on their deadline" \
         "every call reads the whole table for expired tokens" "vemo-access-token tune"
     sql "CREATE INDEX of_another_column ON token (function, deadline)"
@@ -853,7 +911,7 @@ a_half_change()
 {
     tool init
     sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 40)
-         INSERT INTO token SELECT printf('%0127d', i), '', 0, 9999999999, 1, 0, 'VPN', '{}',
+         INSERT INTO token SELECT printf('%0127d', i), '', 0, 9999999999, 1, 0, 'VPN', '{\"A\":{\"method\":[]}}',
          json_object('data', hex(zeroblob(1000))) FROM n"
     # What does not fit into the cache is written before the end of the change.
     sqlite3 "$DB" >/dev/null <<SQL

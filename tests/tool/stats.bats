@@ -120,8 +120,34 @@ vemo_access_token_function_tokens{function="Web"} 1
 # HELP vemo_access_token_user_tokens Tokens by the user who owns them.
 # TYPE vemo_access_token_user_tokens gauge
 vemo_access_token_user_tokens{uid="0",user="root"} 3
-vemo_access_token_user_tokens{uid="4000000000",user=""} 1'
+vemo_access_token_user_tokens{uid="4000000000",user=""} 1
+# HELP vemo_access_token_expiring_tokens Tokens that expire within this time.
+# TYPE vemo_access_token_expiring_tokens gauge
+vemo_access_token_expiring_tokens{within="day"} 0
+vemo_access_token_expiring_tokens{within="week"} 0
+# HELP vemo_access_token_no_owner_tokens Tokens whose owner is not a user of this machine.
+# TYPE vemo_access_token_no_owner_tokens gauge
+vemo_access_token_no_owner_tokens 1
+# HELP vemo_access_token_no_api_tokens Tokens that open nothing.
+# TYPE vemo_access_token_no_api_tokens gauge
+vemo_access_token_no_api_tokens 4
+# HELP vemo_access_token_old_unlimited_tokens Tokens with any number of uses that are older than a year.
+# TYPE vemo_access_token_old_unlimited_tokens gauge
+vemo_access_token_old_unlimited_tokens 2'
     tool stats --prometheus | check_metrics
+    local metrics=$output
+    run_tool stats -o metrics
+    expect 0 "$metrics"
+    # Those that have expired do not expire soon.
+    sql "UPDATE token SET webapi_allow = '{\"Api\":{\"method\":[]}}', create_time = strftime('%s', 'now') WHERE tid < 'c';
+         UPDATE token SET deadline = strftime('%s', 'now') + iif(tid = 'a', 86000, 7 * 86400 - 60) WHERE tid IN ('a', 'd');
+         UPDATE token SET uid = 4000000001 WHERE tid = 'a'"
+    run_tool stats -o metrics
+    [ "$(grep -A 99 'TYPE vemo_access_token_expiring' <<<"$output" | grep -v '#')" = 'vemo_access_token_expiring_tokens{within="day"} 1
+vemo_access_token_expiring_tokens{within="week"} 2
+vemo_access_token_no_owner_tokens 2
+vemo_access_token_no_api_tokens 2
+vemo_access_token_old_unlimited_tokens 0' ]
 }
 
 @test "what a purpose may hold is escaped in each form" {
@@ -198,8 +224,9 @@ free pages of 4096 bytes       0"
         run_tool stats $arguments
         expect 2 "" "vemo-access-token: $sentence"
     done <<'TABLE'
--o xml|--output: "xml" is not a form: table, json or jsonl
+-o xml|--output: "xml" is not a form: table, json, jsonl or metrics
 --prometheus -o json|--prometheus excludes --output
+--prometheus -o metrics|--prometheus excludes --output
 VPN|unexpected argument "VPN"
 TABLE
 }

@@ -69,6 +69,7 @@ _vemo_access_token()
             --output)
                 local forms='table json jsonl'
                 [[ $command == @(list|show) ]] && forms+=' csv'
+                [[ $command == stats ]] && forms+=' metrics'
                 COMPREPLY=($(compgen -W "$forms" -- "$cur"))
                 return
                 ;;

@@ -88,10 +88,11 @@ __vemo_access_token_option list limit 'The first of them' -x
 __vemo_access_token_option list count 'How many there are, no more'
 __vemo_access_token_option list show-ids 'Whole ids, not their first 8 characters'
 
-__vemo_access_token_option 'create check grant stats doctor' output 'The form of the output' -s o -x -a $forms
+__vemo_access_token_option 'create check grant doctor' output 'The form of the output' -s o -x -a $forms
 __vemo_access_token_option 'list show' output 'The form of the output' -s o -x -a "$forms csv"
 __vemo_access_token_option 'list show' columns 'These columns of a table or CSV' -x \
     -a "(__fish_append , $columns)"
+__vemo_access_token_option stats output 'The form of the output' -s o -x -a "$forms metrics"
 __vemo_access_token_option 'list show stats tune' no-header 'No line of titles above a table'
 __vemo_access_token_option 'list show' field 'This field only, as it is stored' -x -a "$fields"
 __vemo_access_token_option 'list show' utc 'Times in UTC instead of local time'
