@@ -1,8 +1,10 @@
 #!/bin/bash
 # The life of access tokens, as the administrator of a machine sees and steers it: each step shows
 # commands and what they print. Ends with status 1 when one does not end as the step is meant to show.
-# Needs vemo-access-token in the PATH. Tokens of other programs are neither shown nor used.
+# Needs vemo-access-token in the PATH. Tokens of other programs are counted, but neither shown nor used.
 set -uo pipefail
+dir=$(mktemp -d)
+trap 'rm -rf "$dir"' EXIT
 
 tool=vemo-access-token
 step=0
@@ -45,6 +47,18 @@ create()
     id=$("$tool" create "$@") || as_expected=
 }
 
+cat <<END
+Who hands the id of a token to whom:
+
+   who lets somebody in           who makes the calls          who is called
+   (a login page, a share)        (a browser, a job)           (a web API)
+     create  --- the id --->        keeps it      --- the id ---->  grant
+                                                   with each call
+   All that is secret of a token is its id: whoever has that is let in. So it travels on ways that nobody
+   else can read, and is shown whole once, when it is made.
+
+END
+
 step "Before the first program needs them: the private directory, the file and the table."
 call 0 init
 
@@ -76,5 +90,18 @@ call 0 list --bind-sid demo-login-1
 call 0 revoke --bind-sid demo-login-1 --dry-run
 call 0 revoke --bind-sid demo-login-1 --yes
 call 0 list --bind-sid demo-login-1
+
+step "What does the store hold, and is anything wrong with it? Doctor's notes are no findings: it ends with 0."
+create nightly --uid 0 --function demo-nightly --ttl 30d --unlimited --allow Demo.Backup:put
+call 0 stats
+call 0 doctor
+
+step "A backup, of these tokens alone. It holds the whole ids, so its file is root's alone."
+call 0 export --function demo-nightly "$dir/tokens.jsonl"
+echo "   \$ stat -c '%A %U' $dir/tokens.jsonl"
+stat -c '     %A %U' "$dir/tokens.jsonl"
+call 0 revoke --function demo-nightly --yes
+call 0 import "$dir/tokens.jsonl"
+call 0 revoke --function demo-nightly --yes
 
 [ -n "$as_expected" ]

@@ -122,6 +122,9 @@ void refuse(std::string& strTid)
          "   library logs stands between call and result.)");
     CALL(-1, VemoAccessTokenGrantEx(strTid, "Demo.File", "delete", jToken));
     CALL(-1, VemoAccessTokenGrantEx(strTid, "Demo.User", "get", jToken));
+    printf("   A line of the log tells where in the library a check was met, the error that\n"
+           "   the system gave last, which need not belong to it, and the check itself. That of\n"
+           "   \"0 > (err = checkPermission(...))\" is the refusal: the token does not list this call.\n");
     showTable();
 }
 

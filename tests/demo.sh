@@ -41,6 +41,12 @@ for line in \
     "there is no such token" \
     "2 tokens would be revoked" \
     "2 tokens revoked" \
+    'Who hands the id of a token to whom' \
+    'unlimited uses                 1' \
+    'no findings' \
+    '1 token exported' \
+    '1 token imported' \
+    '"0 > (err = checkPermission(...))" is the refusal' \
     'VemoAccessTokenCreate(uid, strFunction, jOption, strTid)' \
     'VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid)' \
     'VemoAccessTokenGenerate(strTid)' \
