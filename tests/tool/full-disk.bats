@@ -15,7 +15,7 @@ on_full_disk()
     run --separate-stderr unshare --mount --propagation private bash -c '
         mount -t tmpfs -o size=256k tmpfs disk
         "$TOOL" init >/dev/null
-        ID=$("$TOOL" create --uid 0 --function VPN --uses 5 --allow Api:get)
+        ID=$("$TOOL" create --uid 0 --function VPN --uses 5 --ttl 30d --allow Api:get)
         echo old >disk/file
         cat /dev/zero >disk/filler 2>/dev/null
         stored() { sqlite3 disk/session/vemo-access-token.db "PRAGMA integrity_check; SELECT count FROM token"; }
