@@ -47,7 +47,7 @@ std::string damageOfParts()
     }
     tool::Rows rows;
     std::string strErr;
-    tool::Steps steps(Store::Access::Glance);
+    tool::Steps steps(Store::Access::Glance, "Reading");
     while (strErr.empty() && steps.next([&](Store& store, const std::string& strThose) {
         strErr = store.queryAsFarAsItGoes(strRead + " FROM token WHERE " + strThose, rows);
     })) {

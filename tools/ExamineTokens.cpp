@@ -213,7 +213,7 @@ void examineRows(bool blTableSound, Findings& findings)
         strSql += (strSql.empty() ? "SELECT max(" : ", max(") + check.strWhere + ")";
     }
     std::vector<TokenNames> names(checks.size());
-    tool::Steps steps(Store::Access::Glance);
+    tool::Steps steps(Store::Access::Glance, "Examining");
     while (steps.next([&](Store& store, const std::string& strThose) {
         const tool::Row isThere = store.query(strSql + " FROM token WHERE " + strThose)[0];
         for (size_t i = 0; i < checks.size(); ++i) {
@@ -277,7 +277,7 @@ void examineObjects(Findings& findings)
 {
     const tool::ObjectReader reader;
     Objects objects;
-    tool::Steps steps(Store::Access::Glance);
+    tool::Steps steps(Store::Access::Glance, "Examining");
     tool::Rows rows;
     while (steps.next([&](Store& store, const std::string& strThose) {
         rows = store.query("SELECT tid, webapi_allow, extra FROM token WHERE " + strThose +

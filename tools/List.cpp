@@ -13,6 +13,8 @@
 
 namespace {
 
+const uint64_t MANY = 10000; // tokens, for which there is a bar
+
 // A field to sort by, and whether downwards.
 struct Order {
     std::string strField;
@@ -63,7 +65,7 @@ uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
                    ", rowid LIMIT " + std::to_string(*options.nLimit);
     }
     uint64_t nTokens = 0;
-    for (tool::Steps steps(tool::Store::Access::Glance);;) {
+    for (tool::Steps steps(tool::Store::Access::Glance, "Sorting");;) {
         tool::Rows rows;
         const auto read = [&](tool::Store& store, const std::string& strThose) {
             const std::string strFrom = " FROM token WHERE " + strThose + " AND " + strSelected;
@@ -119,8 +121,17 @@ int list(const ListOptions& options)
     if (printer.measures()) {
         eachOf(ids, options, [&printer](Json::Value& jToken) { printer.measure(jToken); });
     }
-    eachOf(ids, options, [&printer](Json::Value& jToken) { printer.print(jToken); });
-    printer.end();
+    {
+        // On one terminal the two would get mixed.
+        const bool blProgress = nTokens >= MANY && !tool::isTerminal(tool::resultStream());
+        tool::Progress progress(
+            "Listing", [nTokens] { return nTokens; }, blProgress);
+        eachOf(ids, options, [&](Json::Value& jToken) {
+            printer.print(jToken);
+            progress.step();
+        });
+        printer.end();
+    }
     if (0 == nTokens) {
         tool::complain("no token matches");
     }

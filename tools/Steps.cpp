@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <thread>
 
+#include "Console.h"
 #include "Place.h"
 
 namespace {
@@ -13,6 +14,7 @@ const std::chrono::milliseconds READING(20);
 const std::chrono::milliseconds WRITING(100);
 const size_t TOKENS_FIRST = 250;
 const size_t TOKENS_MAX = 64000;
+const uint64_t MANY = 10000; // for which there is a bar
 
 // Programs that wait for the database try each 10 ms; in between, one of them has it.
 const std::chrono::milliseconds PAUSE(12);
@@ -21,8 +23,20 @@ const std::chrono::milliseconds PAUSE(12);
 
 namespace tool {
 
-Steps::Steps(Store::Access access) : m_access(access), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
+Steps::Steps(Store::Access access, const std::string& strTitle)
+    : m_access(access), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
 {
+    if (!strTitle.empty() && isTerminal(stderr)) {
+        uint64_t nTokens = 0;
+        Steps steps(Store::Access::Glance);
+        while (steps.next([&nTokens](Store& store, const std::string& strThose) {
+            nTokens += store.number("SELECT count(*) FROM token WHERE " + strThose);
+        })) {
+        }
+        if (nTokens >= MANY) {
+            m_progress.emplace(strTitle, [nTokens] { return nTokens; });
+        }
+    }
 }
 
 bool Steps::next(const Use& use)
@@ -50,6 +64,9 @@ bool Steps::next(const Use& use)
     m_ended = Clock::now();
     if (Store::Access::Write != m_access) {
         syncDirectory("a power cut can undo what others changed last");
+    }
+    if (m_progress) {
+        m_progress->step(m_nTokens);
     }
     const std::chrono::milliseconds wanted = Store::Access::Write == m_access ? WRITING : READING;
     if (m_ended - start > 2 * wanted) {

@@ -9,8 +9,10 @@
 
 #include <chrono>
 #include <functional>
+#include <optional>
 #include <string>
 
+#include "Progress.h"
 #include "Store.h"
 
 namespace tool {
@@ -18,8 +20,9 @@ namespace tool {
 // Members throw Failure.
 class Steps {
 public:
-    // access: Glance, or Write where something is to change.
-    explicit Steps(Store::Access access);
+    // access: Glance, or Write where something is to change. With a title, a bar shows how far they are where
+    // there are many tokens.
+    explicit Steps(Store::Access access, const std::string& strTitle = "");
 
     // Looks at the next tokens, in the order of their ids, which fulfil a condition in SQL. The transaction
     // ends, with what was changed on the disk, when the function returns.
@@ -32,6 +35,7 @@ public:
 private:
     typedef std::chrono::steady_clock Clock;
 
+    std::optional<Progress> m_progress;
     const Store::Access m_access;
     size_t m_nTokens;      // of a step
     std::string m_strLast; // the id that the last step ended with, as SQL
