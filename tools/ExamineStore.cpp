@@ -128,7 +128,9 @@ bool examineIntegrity(Findings& findings)
 bool examineDatabase(Findings& findings)
 {
     const bool blLeftBehind = isJournalFull() && isJournalOld();
-    Store(Store::Access::Read);
+    {
+        const Store opened(Store::Access::Read); // which undoes a half change
+    }
     if (blLeftBehind) {
         findings.push_back({Finding::Severity::Warning, VEMO_ATOKEN_DB_PATH "-journal was left behind",
                             "a program or the machine stopped in the middle of a change",
