@@ -116,12 +116,8 @@ namespace fuzz {
 Reading readingOf(const tool::Command& command)
 {
     Reading reading;
-    for (const auto* pParameters : {&command.options(), &command.arguments()}) {
-        for (const Parameter& each : *pParameters) {
-            if (!each.strTexts.empty()) {
-                reading[each.strName] = each.strTexts;
-            }
-        }
+    for (const tool::Command::Word& word : command.words()) {
+        reading[word.pParameter->strName].push_back(word.strText);
     }
     return reading;
 }

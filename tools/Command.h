@@ -42,6 +42,12 @@ public:
         bool blGiven = false; // on the command line
     };
 
+    // A text of the command line; "" of a flag.
+    struct Word {
+        Parameter* pParameter;
+        std::string strText;
+    };
+
     void option(const std::string& strName, const std::string& strType, Take take,
                 const std::string& strDescription);
     void repeatedOption(const std::string& strName, const std::string& strType, Take take,
@@ -69,6 +75,9 @@ public:
     // where it cannot be read, or about what stands before that; what is missing or excluded is for take().
     void read(int nArguments, char** rgArguments);
 
+    // What was read, in its order.
+    const std::vector<Word>& words() const { return m_words; }
+
     // Whether an option was read.
     bool has(const std::string& strName) const;
 
@@ -79,12 +88,6 @@ public:
     int run() const { return m_run(); }
 
 private:
-    // A text of the command line; "" of a flag.
-    struct Word {
-        Parameter* pParameter;
-        std::string strText;
-    };
-
     Parameter* find(const std::string& strName); // nullptr: there is none
     void addOption(const std::string& strNames, Parameter parameter);
     void addWord(Parameter& parameter, const char* szText);
