@@ -30,9 +30,10 @@ const std::map<std::string, void (*)(tool::Commands&)> COMMANDS = {
     {"show", tool::addShow},     {"check", tool::addCheck},       {"grant", tool::addGrant},
     {"update", tool::addUpdate}, {"revoke", tool::addRevoke},     {"purge", tool::addPurge},
     {"stats", tool::addStats},   {"export", tool::addExport},     {"import", tool::addImport},
-    {"init", tool::addInit},     {"doctor", tool::addDoctor},     {"tune", tool::addTune}};
+    {"init", tool::addInit},     {"doctor", tool::addDoctor},     {"tune", tool::addTune},
+    {"rotate", tool::addRotate}, {"help", tool::addHelp}};
 
-const std::set<std::string> READERS = {"list", "show", "check", "stats", "export", "generate", ""};
+const std::set<std::string> READERS = {"list", "show", "check", "stats", "export", "generate", "help", ""};
 
 Texts argumentsOf(std::string_view strLines)
 {
@@ -171,7 +172,7 @@ void checkComplaint(const Texts& strArguments, int nStatus, const std::string& s
 {
     const std::string strStart = "vemo-access-token: ";
     const bool blSilent = tool::EXIT_STATUS_DONE == nStatus || tool::EXIT_STATUS_FINDINGS == nStatus ||
-                          (tool::EXIT_STATUS_REFUSED == nStatus && commandOf(strArguments) == "check");
+                          tool::EXIT_STATUS_REFUSED == nStatus;
     if (blSilent) {
         return;
     }

@@ -22,7 +22,8 @@ sqlite3* opened()
         sqlite3_temp_directory = sqlite3_mprintf("%s", strDirectory.c_str());
     }
     sqlite3* pDb = nullptr;
-    if (SQLITE_OK != sqlite3_open(blFile ? "" : ":memory:", &pDb)) {
+    const int nFlags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
+    if (SQLITE_OK != sqlite3_open_v2(blFile ? "" : ":memory:", &pDb, nFlags, nullptr)) {
         sqlite3_close(pDb);
         throw std::bad_alloc(); // no file is opened yet
     }
