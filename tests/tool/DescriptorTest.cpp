@@ -32,7 +32,8 @@ TEST(IsSame, ComparesFileSystemAndNumber)
 
 TEST(CanOthersWrite, TakesWhatIsRootsOrTheCallersForTheirs)
 {
-    if (0 == geteuid()) {
+    const uid_t uidBefore = geteuid();
+    if (0 == uidBefore) {
         ASSERT_EQ(0, seteuid(1));
     }
     for (const uid_t uid : {uid_t{0}, geteuid()}) {
@@ -41,4 +42,5 @@ TEST(CanOthersWrite, TakesWhatIsRootsOrTheCallersForTheirs)
         EXPECT_TRUE(tool::canOthersWrite(statusOfDirectory(uid, 0702)));
     }
     EXPECT_TRUE(tool::canOthersWrite(statusOfDirectory(geteuid() + 1, 0700)));
+    EXPECT_EQ(0, seteuid(uidBefore));
 }
