@@ -2,6 +2,7 @@
 
 #include <sys/eventfd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <system_error>
 #include <thread>
@@ -11,9 +12,12 @@
 
 namespace {
 
-// Of the time, others have one part in fifty for themselves, long enough for one who sleeps to wake up in.
-const int64_t PAUSE_EACH = 25 * gate::MILLISECOND;
+// Of the time, others have one part in fifty for themselves, long enough for one who sleeps to wake up in; or
+// one in two hundred where none has been met for a second, since each pause is one that clients wait for.
 const int64_t PAUSE = gate::MILLISECOND / 2;
+const int64_t PAUSE_EACH = 25 * gate::MILLISECOND;
+const int64_t PAUSE_EACH_ALONE = 100 * gate::MILLISECOND;
+const int64_t ALONE_AFTER = gate::SECOND;
 
 } // namespace
 
@@ -54,6 +58,8 @@ bool Turn::take()
             throw;
         }
     }
+    m_nMet = now();
+    m_nPauseAt = std::min(m_nPauseAt, m_nMet + PAUSE_EACH);
     m_blWanted = true;
     m_wanted.notify_one();
     return false;
@@ -69,7 +75,8 @@ void Turn::give()
     const int64_t nNow = now();
     if (nNow >= m_nPauseAt) {
         m_nPauseUntil = nNow + PAUSE;
-        m_nPauseAt = m_nPauseUntil + PAUSE_EACH;
+        const bool blAlone = nNow - m_nMet > ALONE_AFTER;
+        m_nPauseAt = m_nPauseUntil + (blAlone ? PAUSE_EACH_ALONE : PAUSE_EACH);
     }
 }
 

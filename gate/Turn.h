@@ -41,6 +41,7 @@ private:
     int m_nError = 0;        // why it could not have it
     int64_t m_nPauseAt;      // when to leave the lock alone
     int64_t m_nPauseUntil = 0;
+    int64_t m_nMet = 0; // when another had the lock
 };
 
 } // namespace gate
