@@ -324,7 +324,12 @@ TABLE
         VEMO_TEST_HASTE=1 "$TOOL" import "$DIR/other" - <"$DIR/lines" >"$DIR/out" 2>&1 3>&- &
         importer=$!
         exec 9>"$DIR/lines"
-        until_sql 1 "SELECT count(*) FROM token"
+        # Without a lock, which the import in its haste would not wait for.
+        until [ "$(sqlite3 "file:$DB?immutable=1" "SELECT count(*) FROM token" 2>/dev/null)" = 1 ] &&
+            [ ! -e "$DB-journal" ]; do
+            sleep 0.01
+        done
+        sleep 0.1 # the commit is made; now the lock goes, too
         if [ "$kind" = database ]; then
             lock "$EXCLUSIVE"
         else
