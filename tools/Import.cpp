@@ -8,6 +8,7 @@
 #include <iostream>
 #include <map>
 #include <memory>
+#include <optional>
 #include <thread>
 
 #include "AccessTokenUtil.h"
@@ -94,11 +95,6 @@ std::string lineText(size_t nLine, const std::string& strText)
     return "line " + std::to_string(nLine) + " " + strText;
 }
 
-tool::Failure badLine(const std::string& strFile, size_t nLine, const std::string& strReason)
-{
-    return badFile(strFile, lineText(nLine, strReason), "");
-}
-
 Json::Value objectOf(const std::string& strText)
 {
     return tool::parseObject(strText, tool::NESTED_MAX + 1); // objects in a record
@@ -115,7 +111,8 @@ bool isCutOff(const std::string& strText)
     }
 }
 
-Contents readLines(std::istream& stream, const std::string& strFile, const Take& take)
+// Throws BadValue at a bad line.
+Contents readLines(std::istream& stream, const Take& take)
 {
     Contents contents;
     tool::ExportEnd end;
@@ -147,7 +144,7 @@ Contents readLines(std::istream& stream, const std::string& strFile, const Take&
             }
             end.add(strText + "\n");
         } catch (const tool::BadValue& bad) {
-            throw badLine(strFile, nLine, bad.what());
+            throw tool::BadValue(lineText(nLine, bad.what()));
         }
     }
     return contents;
@@ -157,7 +154,7 @@ Contents readStream(std::istream& stream, const std::string& strFile, const Take
 {
     try {
         stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts a line short
-        const Contents contents = readLines(stream, strFile, take);
+        const Contents contents = readLines(stream, take);
         if (!ferror(stdin)) {
             return contents;
         }
@@ -176,11 +173,26 @@ Contents readFile(const std::string& strFile, const Take& take)
     if (strFile == "-") {
         return readStream(std::cin, nameOf(strFile), take);
     }
+    std::optional<tool::InputFile> file;
     try {
-        tool::InputFile file(strFile);
-        return readStream(file, nameOf(strFile), take);
+        file.emplace(strFile);
     } catch (const tool::BadValue& bad) {
         throw tool::Failure(tool::EXIT_STATUS_USAGE, bad.what());
+    }
+    return readStream(*file, nameOf(strFile), take);
+}
+
+// The same where nothing of the file is imported yet.
+Contents readAhead(const std::string& strFile, const Options& options, const Take& take)
+{
+    try {
+        const Contents contents = readFile(strFile, take);
+        if (!contents.strFlaw.empty() && !options.blPartial) {
+            throw badFile(nameOf(strFile), contents.strFlaw, "--partial imports what is there");
+        }
+        return contents;
+    } catch (const tool::BadValue& bad) {
+        throw badFile(nameOf(strFile), bad.what(), "");
     }
 }
 
@@ -205,7 +217,8 @@ void createTokens(const std::vector<Line>& lines, const std::string& strFile, bo
         } else if (blSkip) {
             ++now.nSkipped;
         } else {
-            throw badLine(nameOf(strFile), line.nNumber, "has the id of a token that is there already");
+            throw badFile(nameOf(strFile),
+                          lineText(line.nNumber, "has the id of a token that is there already"), "");
         }
         progress.step();
     }
@@ -215,18 +228,11 @@ void createTokens(const std::vector<Line>& lines, const std::string& strFile, bo
     imported.nExpired += now.nExpired;
 }
 
-void requireWhole(const Contents& contents, const std::string& strFile, const Options& options)
-{
-    if (!contents.strFlaw.empty() && !options.blPartial) {
-        throw badFile(nameOf(strFile), contents.strFlaw, "--partial imports what is there");
-    }
-}
-
 Contents importAtOnce(const std::string& strFile, const Options& options, Imported& imported)
 {
     std::vector<Line> lines;
     std::map<std::string, size_t> lineOf;
-    const Contents contents = readFile(strFile, [&](Line line) {
+    const Contents contents = readAhead(strFile, options, [&](Line line) {
         const auto [pFirst, blNew] = lineOf.emplace(line.jToken["tid"].asString(), line.nNumber);
         if (!blNew) {
             throw tool::BadValue("has the id of line " + std::to_string(pFirst->second));
@@ -239,7 +245,6 @@ Contents importAtOnce(const std::string& strFile, const Options& options, Import
         }
         lines.push_back(std::move(line));
     });
-    requireWhole(contents, strFile, options);
     tool::Progress progress("Importing", [&lines] { return lines.size(); });
     createTokens(lines, strFile, options.blSkipExisting, progress, imported);
     return contents;
@@ -251,9 +256,7 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
 {
     uint64_t nTokens = 0;
     if (strFile != "-") {
-        const Contents ahead = readFile(strFile, [](const Line&) {});
-        requireWhole(ahead, strFile, options);
-        nTokens = ahead.nTokens;
+        nTokens = readAhead(strFile, options, [](const Line&) {}).nTokens;
     }
     tool::Progress progress(
         "Importing", [nTokens] { return nTokens; }, strFile != "-");
@@ -262,6 +265,11 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
         createTokens(lines, strFile, true, progress, imported);
         lines.clear();
         std::this_thread::sleep_for(BETWEEN_STEPS);
+    };
+    const auto stopped = [&imported](tool::ExitStatus status, const std::string& strFact) {
+        return tool::Failure(status, strFact,
+                             tool::countText(imported.nCreated, "token") +
+                                 " imported; the command can be repeated without harm");
     };
     try {
         const Contents contents = readFile(strFile, [&](Line line) {
@@ -272,13 +280,13 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
         });
         create();
         if (!contents.strFlaw.empty() && !options.blPartial) {
-            throw tool::Failure(tool::EXIT_STATUS_USAGE, nameOf(strFile) + ": " + contents.strFlaw);
+            throw tool::BadValue(contents.strFlaw);
         }
         return contents;
+    } catch (const tool::BadValue& bad) {
+        throw stopped(tool::EXIT_STATUS_USAGE, nameOf(strFile) + ": " + bad.what());
     } catch (const tool::Failure& failure) {
-        throw tool::Failure(failure.status(), failure.fact(),
-                            tool::countText(imported.nCreated, "token") +
-                                " imported; the command can be repeated without harm");
+        throw stopped(failure.status(), failure.fact());
     }
 }
 

@@ -150,6 +150,13 @@ std::vector<tool::Table::Column> titlesOf(const Layout& layout)
     return titles;
 }
 
+void requireTableForColumns(const Layout& layout)
+{
+    if (!layout.nColumns.empty() && (Layout::Form::Table != layout.form || !layout.strField.empty())) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE, "--columns is for tables and CSV");
+    }
+}
+
 // As RFC 4180 has it, but that lines end with a line feed alone.
 std::string csvLine(const std::vector<std::string>& strCells)
 {
@@ -264,6 +271,7 @@ TokenPrinter::TokenPrinter(const Layout& layout)
       m_nColumns(columnsOf(layout)),
       m_table(titlesOf(layout), !layout.blNoHeader)
 {
+    requireTableForColumns(layout);
 }
 
 bool TokenPrinter::measures() const
@@ -362,6 +370,7 @@ std::string recordText(const Json::Value& jToken, Layout::Form form)
 
 void printToken(const Json::Value& jToken, const Layout& layout)
 {
+    requireTableForColumns(layout);
     if (!layout.strField.empty()) {
         printField(jToken, layout.strField);
     } else if (Layout::Form::Table == layout.form && (layout.blCsv || !layout.nColumns.empty())) {

@@ -13,8 +13,6 @@
 
 namespace {
 
-const uint64_t MANY = 10000; // tokens, for which there is a bar
-
 // A field to sort by, and whether downwards.
 struct Order {
     std::string strField;
@@ -94,7 +92,7 @@ void eachOf(tool::SortedIds& ids, const ListOptions& options, Use use)
                      strList += (strList.empty() ? "" : ",") + strTid;
                  }
                  std::multimap<std::string, Json::Value> tokens;
-                 tool::Store(tool::Store::Access::Glance)
+                 tool::Store(tool::Store::Access::Read)
                      .eachToken("tid IN (" + strList + ")", std::string(", ") + tool::SQL_QUOTED_TID,
                                 [&tokens](Json::Value jToken, const tool::Row& columns) {
                                     tokens.emplace(*columns[0], std::move(jToken));
@@ -115,17 +113,17 @@ int list(const ListOptions& options)
         tool::print(std::to_string(tool::countSelected(options.selection)) + "\n");
         return tool::EXIT_STATUS_DONE;
     }
+    tool::TokenPrinter printer(options.layout);
     tool::SortedIds ids(options.order.blDescending);
     const uint64_t nTokens = sort(options, ids);
-    tool::TokenPrinter printer(options.layout);
     if (printer.measures()) {
         eachOf(ids, options, [&printer](Json::Value& jToken) { printer.measure(jToken); });
     }
     {
         // On one terminal the two would get mixed.
-        const bool blProgress = nTokens >= MANY && !tool::isTerminal(tool::resultStream());
+        const bool blProgress = !tool::isTerminal(tool::resultStream());
         tool::Progress progress(
-            "Listing", [nTokens] { return nTokens; }, blProgress);
+            "Listing", [nTokens] { return nTokens; }, blProgress, tool::MANY);
         eachOf(ids, options, [&](Json::Value& jToken) {
             printer.print(jToken);
             progress.step();

@@ -16,8 +16,12 @@ const std::chrono::milliseconds DRAW_AGAIN_AFTER(50);
 
 namespace tool {
 
-Progress::Progress(const std::string& strTitle, const std::function<uint64_t()>& count, bool blWanted)
-    : m_strTitle(strTitle), m_blShown(blWanted && isTerminal(stderr)), m_nTotal(m_blShown ? count() : 0)
+Progress::Progress(const std::string& strTitle, const std::function<uint64_t()>& count, bool blWanted,
+                   uint64_t nLeast)
+    : m_strTitle(strTitle),
+      m_blCounted(blWanted && isTerminal(stderr)),
+      m_nTotal(m_blCounted ? count() : 0),
+      m_blShown(m_blCounted && m_nTotal >= nLeast)
 {
     if (!m_blShown) {
         return;

@@ -28,8 +28,6 @@ struct PurgeOptions {
     bool blDryRun = false;
 };
 
-const uint64_t MANY = 1000; // tokens, for which there is a bar
-
 void report(uint64_t nTokens, const std::string& strDone, bool blDryRun)
 {
     tool::print(tool::countText(nTokens, "token") + (blDryRun ? " would be " : " ") + strDone + "\n");
@@ -128,9 +126,7 @@ uint64_t removeInSteps(const std::string& strTitle, const std::string& strWhere,
                        const std::function<uint64_t()>& count,
                        const std::function<void(const std::string&)>& gone)
 {
-    const uint64_t nTokens = tool::isTerminal(stderr) ? count() : 0;
-    tool::Progress progress(
-        strTitle, [nTokens] { return nTokens; }, nTokens >= MANY);
+    tool::Progress progress(strTitle, count, true, tool::MANY);
     uint64_t nRemoved = 0;
     try {
         tool::Steps steps(tool::Store::Access::Write);

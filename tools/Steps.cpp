@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <thread>
 
-#include "Console.h"
 #include "Place.h"
 
 namespace {
@@ -14,10 +13,20 @@ const std::chrono::milliseconds READING(20);
 const std::chrono::milliseconds WRITING(100);
 const size_t TOKENS_FIRST = 250;
 const size_t TOKENS_MAX = 64000;
-const uint64_t MANY = 10000; // for which there is a bar
 
 // Programs that wait for the database try each 10 ms; in between, one of them has it.
 const std::chrono::milliseconds PAUSE(12);
+
+uint64_t countAll()
+{
+    uint64_t nTokens = 0;
+    tool::Steps steps(tool::Store::Access::Glance);
+    while (steps.next([&nTokens](tool::Store& store, const std::string& strThose) {
+        nTokens += store.number("SELECT count(*) FROM token WHERE " + strThose);
+    })) {
+    }
+    return nTokens;
+}
 
 } // namespace
 
@@ -26,16 +35,8 @@ namespace tool {
 Steps::Steps(Store::Access access, const std::string& strTitle)
     : m_access(access), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
 {
-    if (!strTitle.empty() && isTerminal(stderr)) {
-        uint64_t nTokens = 0;
-        Steps steps(Store::Access::Glance);
-        while (steps.next([&nTokens](Store& store, const std::string& strThose) {
-            nTokens += store.number("SELECT count(*) FROM token WHERE " + strThose);
-        })) {
-        }
-        if (nTokens >= MANY) {
-            m_progress.emplace(strTitle, [nTokens] { return nTokens; });
-        }
+    if (!strTitle.empty()) {
+        m_progress.emplace(strTitle, countAll, true, MANY);
     }
 }
 
