@@ -2,7 +2,6 @@
 
 #include <chrono>
 #include <ctime>
-#include <thread>
 
 #include "AccessTokenDefine.h"
 #include "Console.h"
@@ -17,9 +16,7 @@ using tool::Findings;
 using tool::Store;
 
 const std::chrono::milliseconds CHECK_MAX(500);
-const int ROWS_OF_A_LOOK = 4000;
-const std::chrono::milliseconds BETWEEN_LOOKS(12); // programs that wait try each 10 ms
-const time_t JOURNAL_AGE_MAX = 10;                 // seconds; a change takes far less
+const time_t JOURNAL_AGE_MAX = 10; // seconds; a change takes far less
 
 // Whether a journal stands there that holds half a change: one that was carried out is removed, or its
 // beginning wiped.
@@ -53,29 +50,22 @@ std::string damageOfParts()
     })) {
     }
     // ids lead to all rows
-    for (std::string strLast = std::to_string(INT64_MIN); strErr.empty() && !strLast.empty();) {
-        {
-            Store store(Store::Access::Glance);
-            const std::string strIndex = store.text("SELECT " + std::string(INDEX_OF_IDS));
-            const std::string strRows = "FROM token NOT INDEXED WHERE rowid > " + strLast;
-            const std::string strBound =
-                store.text("SELECT rowid " + strRows + " ORDER BY rowid LIMIT 1 OFFSET " +
-                           std::to_string(ROWS_OF_A_LOOK));
-            const std::string strTo = strBound.empty() ? "" : " AND rowid <= " + strBound;
-            rows.clear();
-            strErr = strIndex.empty() ? ""
-                                      : store.queryAsFarAsItGoes(
-                                            "SELECT count(*) " + strRows + strTo +
-                                                " AND NOT EXISTS (SELECT 1 FROM token AS other INDEXED BY " +
-                                                tool::sqlText("\"%w\"", strIndex.c_str()) +
-                                                " WHERE other.tid = token.tid AND other.rowid = token.rowid)",
-                                            rows);
-            if (!rows.empty() && rows[0][0] != "0") {
-                strErr = rows[0][0].value_or("") + " rows are missing in the index of the ids";
-            }
-            strLast = strBound;
+    tool::Steps byRow(Store::Access::Glance, "Comparing", tool::Steps::Order::ByRow);
+    while (strErr.empty() && byRow.next([&](Store& store, const std::string& strThose) {
+        const std::string strIndex = store.text("SELECT " + std::string(INDEX_OF_IDS));
+        if (strIndex.empty()) {
+            return;
         }
-        std::this_thread::sleep_for(BETWEEN_LOOKS);
+        rows.clear();
+        strErr = store.queryAsFarAsItGoes("SELECT count(*) FROM token NOT INDEXED WHERE " + strThose +
+                                              " AND NOT EXISTS (SELECT 1 FROM token AS other INDEXED BY " +
+                                              tool::sqlText("\"%w\"", strIndex.c_str()) +
+                                              " WHERE other.tid = token.tid AND other.rowid = token.rowid)",
+                                          rows);
+        if (!rows.empty() && rows[0][0] != "0") {
+            strErr = rows[0][0].value_or("") + " rows are missing in the index of the ids";
+        }
+    })) {
     }
     return strErr;
 }

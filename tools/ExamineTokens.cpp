@@ -8,6 +8,7 @@
 #include "Examination.h"
 #include "Failure.h"
 #include "Json.h"
+#include "Memo.h"
 #include "Steps.h"
 
 namespace {
@@ -213,7 +214,7 @@ void examineRows(bool blTableSound, Findings& findings)
         strSql += (strSql.empty() ? "SELECT max(" : ", max(") + check.strWhere + ")";
     }
     std::vector<TokenNames> names(checks.size());
-    tool::Steps steps(Store::Access::Glance, "Examining");
+    tool::Steps steps(Store::Access::Glance, "Examining", tool::Steps::Order::ByRow);
     while (steps.next([&](Store& store, const std::string& strThose) {
         const tool::Row isThere = store.query(strSql + " FROM token WHERE " + strThose)[0];
         for (size_t i = 0; i < checks.size(); ++i) {
@@ -231,14 +232,6 @@ void examineRows(bool blTableSound, Findings& findings)
     }
 }
 
-// What the objects of tokens can be, and should not.
-struct Objects {
-    TokenNames broken;
-    TokenNames odd;
-    TokenNames throwing;
-    TokenNames deep;
-};
-
 // Whether an API's entry is one that opens calls that name a method.
 bool isEntry(const Json::Value& jEntry)
 {
@@ -252,39 +245,55 @@ bool holdsNoMethod(const Json::Value& jEntry)
     return isEntry(jEntry) && std::any_of(jEntry["method"].begin(), jEntry["method"].end(), isNone);
 }
 
-void judge(const tool::ObjectReader& reader, const tool::Row& row, Objects& objects)
+// What a text can be, and should not.
+struct Flaws {
+    bool blDeep = false;
+    bool blBroken = false;
+    bool blOdd = false; // this and the next as what a token opens
+    bool blThrowing = false;
+};
+
+Flaws flawsOf(const tool::ObjectReader& reader, const std::string& strText)
 {
-    const std::string& strAllow = *row[1];
-    const std::string& strExtra = *row[2];
-    if (std::max(tool::nestingOf(strAllow), tool::nestingOf(strExtra)) > NESTING_MAX) {
-        objects.deep.add(row[0]);
-    }
+    Flaws flaws;
+    flaws.blDeep = tool::nestingOf(strText) > NESTING_MAX;
     try {
-        const Json::Value jAllow = reader.read(strAllow);
-        reader.read(strExtra);
-        if (!std::all_of(jAllow.begin(), jAllow.end(), isEntry)) {
-            objects.odd.add(row[0]);
-        }
-        if (std::any_of(jAllow.begin(), jAllow.end(), holdsNoMethod)) {
-            objects.throwing.add(row[0]);
-        }
+        const Json::Value jValue = reader.read(strText);
+        flaws.blOdd = !std::all_of(jValue.begin(), jValue.end(), isEntry);
+        flaws.blThrowing = std::any_of(jValue.begin(), jValue.end(), holdsNoMethod);
     } catch (const tool::BadValue&) {
-        objects.broken.add(row[0]);
+        flaws.blBroken = true;
     }
+    return flaws;
 }
 
 void examineObjects(Findings& findings)
 {
+    TokenNames broken;
+    TokenNames odd;
+    TokenNames throwing;
+    TokenNames deep;
     const tool::ObjectReader reader;
-    Objects objects;
-    tool::Steps steps(Store::Access::Glance, "Examining");
+    tool::Memo<Flaws> flaws([&reader](const std::string& strText) { return flawsOf(reader, strText); });
+    tool::Steps steps(Store::Access::Glance, "Examining", tool::Steps::Order::ByRow);
     tool::Rows rows;
     while (steps.next([&](Store& store, const std::string& strThose) {
         rows = store.query("SELECT tid, webapi_allow, extra FROM token WHERE " + strThose +
                            " AND (webapi_allow <> '{}' OR extra <> '{}') AND NOT " + anyNull());
     })) {
         for (const tool::Row& row : rows) {
-            judge(reader, row, objects);
+            const auto addIf = [&row](bool blFlawed, TokenNames& names) {
+                if (blFlawed) {
+                    names.add(row[0]);
+                }
+            };
+            const Flaws allow = flaws.of(*row[1]);
+            const Flaws extra = flaws.of(*row[2]);
+            const bool blBroken = allow.blBroken || extra.blBroken;
+            addIf(blBroken, broken);
+            addIf(!blBroken && allow.blOdd, odd);
+            addIf(!blBroken && allow.blThrowing, throwing);
+            addIf(allow.blDeep || extra.blDeep, deep);
         }
     }
     const auto add = [&](const TokenNames& names, Finding::Severity severity, const std::string& strWhat,
@@ -293,18 +302,17 @@ void examineObjects(Findings& findings)
             findings.push_back({severity, strWhat + names.text(), strMeaning, strRemedy, {}});
         }
     };
-    add(objects.broken, Finding::Severity::Error, "no JSON object where there should be one in ",
+    add(broken, Finding::Severity::Error, "no JSON object where there should be one in ",
         "such a token opens nothing, or only what stands before the fault, or cannot be saved with a use "
         "less",
         "revoke them, or update --allow and --extra");
-    add(objects.throwing, Finding::Severity::Error, "lists of methods that hold an array or an object in ",
+    add(throwing, Finding::Severity::Error, "lists of methods that hold an array or an object in ",
         "the library throws an exception where it should grant or refuse, which ends a program that does not "
         "catch it",
         "revoke them, or update --allow");
-    add(objects.odd, Finding::Severity::Warning, "an API without a list of methods in ",
+    add(odd, Finding::Severity::Warning, "an API without a list of methods in ",
         "it is open to calls that name no method, and to no others", "revoke them, or update --allow");
-    add(objects.deep, Finding::Severity::Warning,
-        "JSON of more than " + std::to_string(NESTING_MAX) + " levels in ",
+    add(deep, Finding::Severity::Warning, "JSON of more than " + std::to_string(NESTING_MAX) + " levels in ",
         "a program that reads such a token in a thread of a small stack crashes: 64 KiB have room for that "
         "many "
         "levels, 128 KiB for twice as many",

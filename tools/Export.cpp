@@ -10,6 +10,7 @@
 #include "ExportEnd.h"
 #include "Json.h"
 #include "Masking.h"
+#include "Memo.h"
 #include "NewFile.h"
 #include "Progress.h"
 #include "Steps.h"
@@ -80,10 +81,11 @@ Exported writeLines(const tool::Selection& selection, bool blProgress, Write wri
     tool::ExportEnd end;
     Exported exported;
     std::vector<Token> tokens;
+    tool::Memo<std::string> flaws(tool::flawOfStored);
     const auto take = [&](Json::Value jToken, const tool::Row& columns) {
         std::string strFlaw = *columns[0];
         for (size_t i = 0; strFlaw.empty() && i < strObjects.size(); ++i) {
-            const std::string strText = tool::flawOfStored(*columns[i + 1]);
+            const std::string& strText = flaws.of(*columns[i + 1]);
             strFlaw = strText.empty() ? "" : "\"" + strObjects[i] + "\" " + strText;
         }
         tokens.push_back({std::move(jToken), strFlaw});

@@ -12,24 +12,33 @@
 
 namespace {
 
-std::unique_ptr<Json::StreamWriter> makeWriter(const char* szIndentation)
-{
-    Json::StreamWriterBuilder builder;
-    builder["indentation"] = szIndentation;
-    // What the store can hold comes out as it is: doubles that JSON has no name for, and bytes that are not
-    // valid UTF-8. All digits of doubles come in any case.
-    builder["useSpecialFloats"] = true;
-    builder["emitUTF8"] = true;
-    return std::unique_ptr<Json::StreamWriter>(builder.newStreamWriter());
-}
+class Writer {
+public:
+    explicit Writer(const char* szIndentation)
+    {
+        Json::StreamWriterBuilder builder;
+        builder["indentation"] = szIndentation;
+        // What the store can hold comes out as it is: doubles that JSON has no name for, and bytes that are
+        // not valid UTF-8. All digits of doubles come in any case.
+        builder["useSpecialFloats"] = true;
+        builder["emitUTF8"] = true;
+        m_pWriter.reset(builder.newStreamWriter());
+        m_stream.exceptions(
+            std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
+    }
 
-std::string write(const Json::Value& jValue, Json::StreamWriter& writer)
-{
-    std::ostringstream stream;
-    stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
-    writer.write(jValue, &stream);
-    return tool::visibleJson(stream.str());
-}
+    std::string write(const Json::Value& jValue)
+    {
+        m_stream.clear();
+        m_stream.str(std::string());
+        m_pWriter->write(jValue, &m_stream);
+        return tool::visibleJson(m_stream.str());
+    }
+
+private:
+    std::unique_ptr<Json::StreamWriter> m_pWriter;
+    std::ostringstream m_stream; // one for all texts: it takes as long to make as a token to write
+};
 
 std::unique_ptr<Json::CharReader> makeReader(int nNestedMax)
 {
@@ -135,14 +144,14 @@ int nestingOf(const std::string& strText)
 
 std::string compactJson(const Json::Value& jValue)
 {
-    static const std::unique_ptr<Json::StreamWriter> pWriter = makeWriter("");
-    return write(jValue, *pWriter);
+    static Writer writer("");
+    return writer.write(jValue);
 }
 
 std::string styledJson(const Json::Value& jValue)
 {
-    static const std::unique_ptr<Json::StreamWriter> pWriter = makeWriter("  ");
-    return write(jValue, *pWriter);
+    static Writer writer("  ");
+    return writer.write(jValue);
 }
 
 } // namespace tool

@@ -64,7 +64,7 @@ Statistics collectStatistics()
                                   grant::SQL_EXPIRED + "), total(" + expiringWithin(DAY) + "), total(" +
                                   expiringWithin(7 * DAY) + "), total(webapi_allow = '{}'), total(" +
                                   oldAndUnlimited() + ") FROM token WHERE ";
-    Steps steps(Store::Access::Glance, "Counting");
+    Steps steps(Store::Access::Glance, "Counting", Steps::Order::ByRow);
     while (steps.next([&](Store& store, const std::string& strThose) {
         store.eachRow(strSelect + strThose + " GROUP BY 1, 2", [&](const Row& row) {
             const auto nTokens = static_cast<uint64_t>(numberOf(row[2]));

@@ -9,7 +9,7 @@ namespace {
 
 // How long a step is to take, and how many tokens it has at first and at most. What is written must get to
 // the disk each time, so there are fewer steps for that.
-const std::chrono::milliseconds READING(20);
+const std::chrono::milliseconds READING(50);
 const std::chrono::milliseconds WRITING(100);
 const size_t TOKENS_FIRST = 250;
 const size_t TOKENS_MAX = 64000;
@@ -32,8 +32,8 @@ uint64_t countAll()
 
 namespace tool {
 
-Steps::Steps(Store::Access access, const std::string& strTitle)
-    : m_access(access), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
+Steps::Steps(Store::Access access, const std::string& strTitle, Order order)
+    : m_access(access), m_order(order), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
 {
     if (!strTitle.empty()) {
         m_progress.emplace(strTitle, countAll, true, MANY);
@@ -49,14 +49,20 @@ bool Steps::next(const Use& use)
     const Clock::time_point start = Clock::now();
     {
         Store store(m_access);
-        const std::string strFrom = m_strLast.empty() ? "tid IS NULL OR " : "tid > " + m_strLast + " AND ";
+        // A table that a stranger made can be one WITHOUT ROWID.
+        const bool blIds =
+            Order::ById == m_order || store.number("SELECT wr FROM pragma_table_list('token')");
+        const std::string strKey = blIds ? "tid" : "rowid";
+        const std::string strBehind = m_strLast.empty() ? "true" : strKey + " > " + m_strLast;
         const std::string strBound =
-            store.text(std::string("SELECT ") + SQL_QUOTED_TID + " FROM token" +
-                       (m_strLast.empty() ? "" : " WHERE tid > " + m_strLast) +
-                       " ORDER BY tid LIMIT 1 OFFSET " + std::to_string(m_nTokens - 1));
+            store.text("SELECT " + (blIds ? SQL_QUOTED_TID : strKey) + " FROM token WHERE " + strBehind +
+                       " ORDER BY " + strKey + " LIMIT 1 OFFSET " + std::to_string(m_nTokens - 1));
         m_blEnd = strBound.empty();
-        const std::string strTo = m_blEnd ? "true" : "tid <= " + strBound;
-        use(store, "(" + strFrom + strTo + ")");
+        const std::string strUpTo = m_blEnd ? "true" : strKey + " <= " + strBound;
+        // An id that is NULL comes before all others.
+        use(store,
+            "(" + (blIds && m_strLast.empty() ? "tid IS NULL OR " + strUpTo : strBehind + " AND " + strUpTo) +
+                ")");
         m_strLast = strBound;
         if (Store::Access::Write == m_access) {
             store.commit();

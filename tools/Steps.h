@@ -1,8 +1,8 @@
 // All tokens, some at a time.
 //
 // Between two steps others can change tokens, and nobody waits long for one. Tokens do not depend on each
-// other, so this is as good as one look at all of them: a token that is there throughout comes exactly once,
-// and one that comes or goes meanwhile once or not at all.
+// other, so steps in the order of the ids are as good as one look at all tokens: one that is there throughout
+// comes exactly once, and one that comes or goes meanwhile once or not at all.
 
 #ifndef TOOLS_STEPS_H
 #define TOOLS_STEPS_H
@@ -20,12 +20,19 @@ namespace tool {
 // Members throw Failure.
 class Steps {
 public:
+    enum class Order {
+        ById,
+        // As the table lies on the disk, which is several times as fast. But a token that another program
+        // changes meanwhile moves, and can come twice or not at all.
+        ByRow,
+    };
+
     // access: Glance, or Write where something is to change. With a title, a bar shows how far they are where
     // there are many tokens.
-    explicit Steps(Store::Access access, const std::string& strTitle = "");
+    explicit Steps(Store::Access access, const std::string& strTitle = "", Order order = Order::ById);
 
-    // Looks at the next tokens, in the order of their ids, which fulfil a condition in SQL. The transaction
-    // ends, with what was changed on the disk, when the function returns.
+    // Looks at the next tokens, which fulfil a condition in SQL. The transaction ends, with what was changed
+    // on the disk, when the function returns.
     typedef std::function<void(Store&, const std::string& strThose)> Use;
 
     // Returns false, and calls nothing, when there are no more. What it returns true for outlasts a power
@@ -37,8 +44,9 @@ private:
 
     std::optional<Progress> m_progress;
     const Store::Access m_access;
+    const Order m_order;
     size_t m_nTokens;      // of a step
-    std::string m_strLast; // the id that the last step ended with, as SQL
+    std::string m_strLast; // the id or row that the last step ended with, as SQL
     bool m_blEnd = false;
     Clock::time_point m_ended; // the last step
 };

@@ -17,6 +17,7 @@
 
 #include "AccessTokenUtil.h"
 #include "Failure.h"
+#include "Memo.h"
 #include "Place.h"
 #include "Processes.h"
 #include "Signals.h"
@@ -301,6 +302,15 @@ Json::Value Store::tokens(const Json::Value& jFilter)
 void Store::eachToken(const std::string& strWhere, const std::string& strColumns, const TakeToken& take)
 {
     const std::vector<std::string> strNames = fieldNames();
+    std::vector<Json::ValueType> types;
+    for (const std::string& strName : strNames) {
+        types.push_back(VEMO_ACCESS_TOKEN::tokenType()[strName][1].type());
+    }
+    Memo<Json::Value> objects([](const std::string& strText) {
+        Json::Value jValue;
+        VEMO_ACCESS_TOKEN::fromString(strText, jValue);
+        return jValue;
+    });
     std::string strFields;
     m_db.SqlExpandMemberName(strFields);
     eachRow("SELECT " + strFields + strColumns + " FROM token WHERE " + strWhere, [&](Row row) {
@@ -309,14 +319,11 @@ void Store::eachToken(const std::string& strWhere, const std::string& strColumns
             if (!row[i]) {
                 fail("query aborted"); // as the library, which cannot read such a token
             }
-            const Json::Value& jDefault = VEMO_ACCESS_TOKEN::tokenType()[strNames[i]][1];
             Json::Value& jValue = jToken[strNames[i]];
-            if (jDefault.isIntegral()) {
-                jValue = Json::Int64{strtoll(row[i]->c_str(), nullptr, 10)};
-            } else if (jDefault.isString()) {
-                jValue = *row[i];
-            } else {
-                VEMO_ACCESS_TOKEN::fromString(*row[i], jValue);
+            switch (types[i]) {
+            case Json::stringValue: jValue = *row[i]; break;
+            case Json::objectValue: jValue = objects.of(*row[i]); break;
+            default: jValue = Json::Int64{strtoll(row[i]->c_str(), nullptr, 10)};
             }
         }
         row.erase(row.begin(), row.begin() + static_cast<std::ptrdiff_t>(strNames.size()));

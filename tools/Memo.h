@@ -1,0 +1,41 @@
+// What a function makes of a text, remembered for texts that come again, as those of many tokens do.
+
+#ifndef TOOLS_MEMO_H
+#define TOOLS_MEMO_H
+
+#include <functional>
+#include <string>
+#include <unordered_map>
+#include <utility>
+
+namespace tool {
+
+template <typename Value>
+class Memo {
+public:
+    explicit Memo(std::function<Value(const std::string&)> make) : m_make(std::move(make)) {}
+
+    // Valid until the next call.
+    const Value& of(const std::string& strText)
+    {
+        const auto pKnown = m_known.find(strText);
+        if (pKnown != m_known.end()) {
+            return pKnown->second;
+        }
+        Value value = m_make(strText);
+        if (m_known.size() >= TEXTS_MAX) {
+            m_known.clear();
+        }
+        return m_known.emplace(strText, std::move(value)).first->second;
+    }
+
+private:
+    static constexpr size_t TEXTS_MAX = 1000;
+
+    const std::function<Value(const std::string&)> m_make;
+    std::unordered_map<std::string, Value> m_known;
+};
+
+} // namespace tool
+
+#endif
