@@ -1,6 +1,7 @@
 #!/bin/bash
 # The manual pages: mandoc has nothing to say against them, they leave nothing of the interface and no log line out
 # and invent none, and their examples compile and print what the pages say.
+# They make HTML as CONTRIBUTING says.
 # usage: manual-pages.sh SOURCE-DIRECTORY BUILD-DIRECTORY JSONCPP-INCLUDE-DIRECTORY COMPILER
 # Exit status 77: skipped, for the reason printed.
 set -euo pipefail
@@ -54,6 +55,14 @@ while read -r name number; do
         status=1
     fi
 done < <(grep -hoE '\bXr [^ ]+ [1-9]' "${pages[@]}" | cut -d ' ' -f 2- | grep -i '^vemo\|^AccessToken' | sort -u)
+
+echo "Pages that make no HTML by the command in CONTRIBUTING, and links between pages of ours that leave it:"
+(mkdir "$dir/clone" && cd "$dir/clone" && cp -a "$source/man" . &&
+    eval "$(sed -n '/^    mkdir -p build\/html/,/^    done/p' "$source/CONTRIBUTING.md")")
+for page in *.[1-9]; do
+    grep -q '</html>' "$dir/clone/build/html/$page.html" || { echo "$page"; status=1; }
+done
+grep -lE 'manpages\.debian\.org/(vemo|Vemo|VEMO|AccessToken)' "$dir"/clone/build/html/*.html && status=1
 
 echo "Functions (< exported, or of the class that programs compile themselves; > in a SYNOPSIS):"
 {
