@@ -275,7 +275,7 @@ void Command::check() const
 void Command::takeWords() const
 {
     for (const Word& word : m_words) {
-        tool::argument(word.pParameter->strName, [&word] { word.pParameter->take(word.strText); });
+        convertArgument(word.pParameter->strName, [&word] { word.pParameter->take(word.strText); });
     }
 }
 

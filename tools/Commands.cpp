@@ -4,12 +4,12 @@
 
 #include "Arguments.h"
 #include "Audit.h"
+#include "Change.h"
 #include "Console.h"
 #include "LogLines.h"
 #include "Masking.h"
 #include "Nearest.h"
 #include "Place.h"
-#include "Store.h"
 
 namespace {
 
@@ -113,7 +113,7 @@ int Commands::run(int nArguments, char** rgArguments)
     try {
         flushResult();
     } catch (const Failure& failure) {
-        throw Failure(failure.status(), failure.fact(), Store::hasChanged() ? "the change was made" : "");
+        throw Failure(failure.status(), failure.fact(), hasChanged() ? "the change was made" : "");
     }
     return nStatus;
 }

@@ -10,8 +10,8 @@
 #include <cstring>
 #include <iostream>
 
+#include "Change.h"
 #include "Failure.h"
-#include "Store.h"
 
 namespace {
 
@@ -100,7 +100,7 @@ void complain(const std::string& strSentence)
 void complainOfMemory()
 {
     fputs("vemo-access-token: out of memory", stderr);
-    fputs(Store::hasChanged() ? "; the change was made\n" : "\n", stderr);
+    fputs(hasChanged() ? "; the change was made\n" : "\n", stderr);
 }
 
 void flushResult()

@@ -51,7 +51,7 @@ void printLine(const std::string& strText);
 // The lines of standard input; on a terminal one line, asked for and not shown.
 std::vector<std::string> readSecrets(const std::string& strPrompt);
 
-// Asks on the terminal. Fails where standard input or standard error is none.
+// Asks on the terminal, which standard input and standard error must be.
 bool confirm(const std::string& strQuestion);
 
 } // namespace tool

@@ -10,6 +10,7 @@
 #include <iterator>
 
 #include "AccessTokenDefine.h"
+#include "Change.h"
 #include "Descriptor.h"
 #include "Examination.h"
 #include "Failure.h"
@@ -99,7 +100,7 @@ void makePrivate(const std::string& strPath, const Open& open)
     const Descriptor file = open();
     requireCall(0 == fchown(file.get(), 0, static_cast<gid_t>(-1)), strPath);
     requireCall(0 == fchmod(file.get(), PRIVATE_MODE), strPath);
-    Store::settleChange();
+    tool::settleChange();
 }
 
 // The repair of owner and mode of the database, or of a journal with this suffix. Only in a directory that is
@@ -326,7 +327,7 @@ void examineRemains(Findings& findings)
                  tool::databaseDirectory() + "/" + tool::shownPath(strName) + " was left behind",
                  "an export was cut off; the file can hold whole ids", "remove it", [strName] {
                      requireCall(tool::removeRemains(openTrustedDirectory(), strName), strName);
-                     Store::settleChange();
+                     tool::settleChange();
                  }});
         }
     }

@@ -46,7 +46,7 @@ class BadValue : public std::runtime_error {
 
 // What convert() gives; a BadValue in it becomes a usage failure that names the argument.
 template <typename Convert>
-auto argument(const std::string& strName, Convert convert)
+auto convertArgument(const std::string& strName, Convert convert)
 {
     try {
         return convert();

@@ -3,6 +3,7 @@
 #include <csignal>
 
 #include "AccessTokenUtil.h"
+#include "Change.h"
 #include "Console.h"
 #include "Failure.h"
 #include "Signals.h"
@@ -19,7 +20,7 @@ void noteSignal(int nSignal)
 // Returns what to say of it.
 std::string takeBack(const tool::Undo& undo)
 {
-    const std::string strChange = tool::Store::hasChanged() ? "was made" : "may have been made";
+    const std::string strChange = tool::hasChanged() ? "was made" : "may have been made";
     try {
         tool::Store store(tool::Store::Access::Write);
         const std::string strDone = undo(store);

@@ -18,6 +18,7 @@
 #include "ExportEnd.h"
 #include "InputFile.h"
 #include "Json.h"
+#include "Masking.h"
 #include "Progress.h"
 #include "Store.h"
 #include "Values.h"

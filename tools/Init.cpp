@@ -1,6 +1,7 @@
 // init: makes the directory, the file and the table before programs need them.
 
 #include "AccessTokenDefine.h"
+#include "Change.h"
 #include "Commands.h"
 #include "Console.h"
 #include "Failure.h"
@@ -25,7 +26,7 @@ int init()
 {
     const bool blDirectory = tool::makeDirectory();
     if (blDirectory) {
-        tool::Store::settleChange();
+        tool::settleChange();
         tool::print("made the directory " + tool::databaseDirectory() + "\n");
     }
     const Made made = makeStore();

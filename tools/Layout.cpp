@@ -6,6 +6,7 @@
 #include "Arguments.h"
 #include "Console.h"
 #include "Json.h"
+#include "Masking.h"
 #include "Store.h"
 #include "Values.h"
 

@@ -5,7 +5,6 @@
 
 #include <cerrno>
 #include <condition_variable>
-#include <cstdarg>
 #include <cstdlib>
 #include <cstring>
 #include <exception>
@@ -16,7 +15,9 @@
 #include <thread>
 
 #include "AccessTokenUtil.h"
+#include "Change.h"
 #include "Failure.h"
+#include "Masking.h"
 #include "Memo.h"
 #include "Place.h"
 #include "Processes.h"
@@ -97,8 +98,6 @@ void opens(sqlite3_context* pContext, int, sqlite3_value** rgValue)
     }
 }
 
-bool g_blChanged = false; // what stays when the process fails now
-
 // What sorts behind all texts that begin with a prefix, as SQL. Any bytes may follow that.
 std::string sqlBehind(std::string strPrefix)
 {
@@ -116,7 +115,7 @@ const std::chrono::seconds LOCK_WAIT(5);
 // What it means that a command which changes something did not get a lock.
 const char* meaningOfLocked()
 {
-    return g_blChanged ? "" : "nothing was changed";
+    return tool::hasChanged() ? "" : "nothing was changed";
 }
 
 [[noreturn]] void failOnLock(int nError)
@@ -140,36 +139,6 @@ const char* meaningOfLocked()
 } // namespace
 
 namespace tool {
-
-std::string sqlText(const char* szFormat, ...)
-{
-    va_list args;
-    va_start(args, szFormat);
-    const std::unique_ptr<char, decltype(&sqlite3_free)> szText(sqlite3_vmprintf(szFormat, args),
-                                                                &sqlite3_free);
-    va_end(args);
-    if (!szText) {
-        throw std::bad_alloc();
-    }
-    return szText.get();
-}
-
-const char* const SQL_QUOTED_TID = "iif(typeof(tid) = 'text' AND instr(tid, char(0)), "
-                                   "'CAST(x''' || hex(tid) || ''' AS TEXT)', quote(tid))";
-
-std::vector<std::string> fieldNames()
-{
-    std::string strList;
-    AccessTokenDbApi().SqlExpandMemberName(strList);
-    std::vector<std::string> strNames;
-    size_t nStart = 0;
-    for (size_t nEnd = strList.find(','); nEnd != std::string::npos; nEnd = strList.find(',', nStart)) {
-        strNames.push_back(strList.substr(nStart, nEnd - nStart));
-        nStart = nEnd + 1;
-    }
-    strNames.push_back(strList.substr(nStart));
-    return strNames;
-}
 
 Store::Store(Access access, Missing missing) : m_access(access)
 {
@@ -221,18 +190,6 @@ void Store::lock()
     } catch (const std::system_error& error) {
         failOnLock(error.code().value());
     }
-}
-
-void Store::settleChange()
-{
-    g_blChanged = true;
-    audit::made();
-    syncDirectory("the change was made, but a power cut can undo it");
-}
-
-bool Store::hasChanged()
-{
-    return g_blChanged;
 }
 
 void Store::fail(const std::string& strErr)

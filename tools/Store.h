@@ -20,24 +20,11 @@
 
 #include "Audit.h"
 #include "CallLock.h"
-#include "Masking.h"
+#include "Sql.h"
 #include "grant/Tokens.h"
 #include "internal/AccessTokenDbApi.h"
 
 namespace tool {
-
-// A row's columns as texts; nothing where it is NULL.
-typedef std::vector<std::optional<std::string>> Row;
-typedef std::vector<Row> Rows;
-
-// The SQL that sqlite3_mprintf makes of a format: %Q quotes and escapes a text.
-std::string sqlText(const char* szFormat, ...);
-
-// The fields of a token, in their order.
-std::vector<std::string> fieldNames();
-
-// In a statement, an id as SQL has it, whatever it is; one that can be compared with "tid".
-extern const char* const SQL_QUOTED_TID;
 
 class Store {
 public:
@@ -64,8 +51,7 @@ public:
     Json::Value tokens(const Json::Value& jFilter);
 
     // The tokens that a condition in SQL selects, one by one, with the columns behind them that are asked
-    // for:
-    // ", COLUMN, ...".
+    // for (", COLUMN, ...").
     typedef std::function<void(Json::Value jToken, const Row& columns)> TakeToken;
     void eachToken(const std::string& strWhere, const std::string& strColumns, const TakeToken& take);
 
@@ -128,14 +114,6 @@ public:
     // The first column of a query's first row, as text and as a number of 0 or more.
     std::string text(const std::string& strSql);
     uint64_t number(const std::string& strSql);
-
-    // To be called after a change that stays, made by another way than commit(). Failures tell from then on
-    // that there is one, and once this returns no power cut undoes it: the end of the journal, which is what
-    // makes a change, is on the disk only when the directory is.
-    static void settleChange();
-
-    // Whether this process has made changes that stay.
-    static bool hasChanged();
 
 private:
     void beginWriting(Missing missing);

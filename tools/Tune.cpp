@@ -4,6 +4,7 @@
 #include <chrono>
 #include <memory>
 
+#include "Change.h"
 #include "Commands.h"
 #include "Console.h"
 #include "Failure.h"
@@ -104,7 +105,7 @@ void execute(Store& store, const Options& options, tool::Progress& progress)
                                 "the journal cannot be made \"" + strJournal + "\" here");
         }
         if (!strResult.empty() || strStatement == "COMMIT") {
-            Store::settleChange();
+            tool::settleChange();
         }
         progress.step();
     }

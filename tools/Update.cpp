@@ -9,6 +9,7 @@
 #include "Commands.h"
 #include "Console.h"
 #include "Json.h"
+#include "Masking.h"
 #include "Store.h"
 
 namespace {

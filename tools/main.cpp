@@ -1,5 +1,4 @@
-// vemo-access-token: what the administrator of a machine does with its access tokens. It works through
-// the library alone and never opens the database on its own.
+// vemo-access-token: what the administrator of a machine does with its access tokens.
 
 #include <json/value.h>
 #include <unistd.h>
