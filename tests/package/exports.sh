@@ -4,7 +4,7 @@
 # usage: exports.sh LIBRARY EXPORTED-SYMBOLS.TXT
 set -euo pipefail
 # shellcheck source=scripts/releases.sh
-. "$(dirname "$0")/../scripts/releases.sh"
+. "$(dirname "$0")/../../scripts/releases.sh"
 library=$1
 list=$2
 status=0

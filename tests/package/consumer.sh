@@ -31,18 +31,18 @@ pkg-config --print-errors --exists 'vemo-access-token >= 6'
 flags=$(pkg-config --cflags --libs vemo-access-token)
 echo "$flags"
 # shellcheck disable=SC2086 # several flags
-"$compiler" -std=c++17 "$source/tests/consumer/main.cpp" -o "$dir/by-pkg-config" $flags
+"$compiler" -std=c++17 "$source/tests/package/consumer/main.cpp" -o "$dir/by-pkg-config" $flags
 run "$dir/by-pkg-config"
 
 echo "Found by CMake:"
-cmake -S "$source/tests/consumer" -B "$dir/consumer" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" \
+cmake -S "$source/tests/package/consumer" -B "$dir/consumer" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" \
     -DCMAKE_PREFIX_PATH="$dir/usr" >"$dir/log"
 grep -q "VemoAccessToken_DIR:PATH=$dir/usr" "$dir/consumer/CMakeCache.txt"
 cmake --build "$dir/consumer" -- --quiet
 run "$dir/consumer/consumer"
 
 echo "Another major version is refused:"
-sed 's/VemoAccessToken 6/VemoAccessToken 7/' "$source/tests/consumer/CMakeLists.txt" >"$dir/CMakeLists.txt"
+sed 's/VemoAccessToken 6/VemoAccessToken 7/' "$source/tests/package/consumer/CMakeLists.txt" >"$dir/CMakeLists.txt"
 if cmake -S "$dir" -B "$dir/refused" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" -DCMAKE_PREFIX_PATH="$dir/usr" \
     >"$dir/log" 2>&1
 then
