@@ -22,51 +22,13 @@ using VEMO_ACCESS_TOKEN::ErrnoKeeper;
 
 namespace {
 
-struct Range {
-    const char* szLibrary;
-    uintptr_t nBegin = 0;
-    uintptr_t nEnd = 0;
-
-    bool holds(const void* pAddress)
-    {
-        if (0 == nEnd) {
-            dl_iterate_phdr(&Range::find, this);
-        }
-        const uintptr_t nAddress = reinterpret_cast<uintptr_t>(pAddress);
-        return nBegin <= nAddress && nAddress < nEnd;
-    }
-
-    static int find(struct dl_phdr_info* pInfo, size_t, void* pArgument)
-    {
-        Range* pRange = static_cast<Range*>(pArgument);
-        if (!strstr(pInfo->dlpi_name, pRange->szLibrary)) {
-            return 0;
-        }
-        pRange->nBegin = pInfo->dlpi_addr;
-        for (int i = 0; i < pInfo->dlpi_phnum; ++i) {
-            const ElfW(Phdr)& header = pInfo->dlpi_phdr[i];
-            if (PT_LOAD == header.p_type) {
-                pRange->nEnd =
-                    std::max<uintptr_t>(pRange->nEnd, pInfo->dlpi_addr + header.p_vaddr + header.p_memsz);
-            }
-        }
-        return 1;
-    }
-};
-
-bool isLibrary(const void* pCaller)
+bool isIn(const char* szLibrary, void* pCode)
 {
-    static Range range{"libvemoaccesstoken.so"};
-    return range.holds(pCaller);
+    struct dl_find_object object;
+    return 0 == _dl_find_object(pCode, &object) && strstr(object.dlfo_link_map->l_name, szLibrary);
 }
 
-bool isSqlite(const void* pCaller)
-{
-    static Range range{"libsqlite3.so"};
-    return range.holds(pCaller);
-}
-
-// Records a call; true, with errno set, when this one is to fail.
+// Records a call. Returns true, with errno set, when this one is to fail; otherwise errno stays.
 bool fails(const std::string& strName, const std::string& strArguments = "")
 {
     const int nErrno = errno;
@@ -77,11 +39,6 @@ bool fails(const std::string& strName, const std::string& strArguments = "")
         seam().failures.end() != failure && failure->second.nFirst <= nCall && nCall <= failure->second.nLast;
     errno = blFails ? failure->second.nErrno : nErrno;
     return blFails;
-}
-
-void record(const std::string& strName, const std::string& strArguments = "")
-{
-    fails(strName, strArguments);
 }
 
 // "util.cpp:123" becomes "util.cpp:#".
@@ -97,16 +54,16 @@ std::string withoutLineNumbers(std::string strText)
     return strText;
 }
 
-void logged(Destination destination, const char* szFormat, va_list args)
+// Writes a line down. szFormat may contain "%m".
+void logged(const std::string& strPriority, const char* szFormat, va_list args)
 {
-    const int nErrno = errno;
+    const ErrnoKeeper keeper;
     char* szText = nullptr;
     if (0 > vasprintf(&szText, szFormat, args)) {
         throw std::bad_alloc();
     }
-    seam().lines.push_back({destination, withoutLineNumbers(szText)});
+    seam().lines.push_back(strPriority + withoutLineNumbers(szText));
     free(szText);
-    errno = nErrno;
 }
 
 std::string octal(mode_t mode)
@@ -150,7 +107,7 @@ Function* next(const char* szName, Function* /* of this type */)
 
 // The next definition of a function, and whether the caller of the one we are in is the library.
 #define NEXT(name) next(#name, &name)
-#define CALLED_BY_LIBRARY isLibrary(__builtin_return_address(0))
+#define CALLED_BY_LIBRARY isIn("libvemoaccesstoken.so", __builtin_return_address(0))
 
 Seam& seam()
 {
@@ -167,6 +124,15 @@ std::vector<std::string> Seam::callsOf(const std::vector<std::string>& names) co
         if (names.end() != std::find(names.begin(), names.end(), strName)) {
             found.push_back(strCall);
         }
+    }
+    return found;
+}
+
+std::vector<std::string> Seam::statements() const
+{
+    std::vector<std::string> found = callsOf({"sqlite3_exec"});
+    for (std::string& strCall : found) {
+        strCall.erase(0, strlen("sqlite3_exec "));
     }
     return found;
 }
@@ -234,7 +200,7 @@ int usleep(useconds_t nMicroseconds)
     if (!CALLED_BY_LIBRARY) {
         return NEXT(usleep)(nMicroseconds);
     }
-    record("usleep", std::to_string(nMicroseconds));
+    fails("usleep", std::to_string(nMicroseconds));
     if (seam().sleep) {
         seam().sleep();
     }
@@ -247,7 +213,7 @@ time_t time(time_t* pTime) noexcept
     if (!CALLED_BY_LIBRARY) {
         return NEXT(time)(pTime);
     }
-    record("time");
+    fails("time");
     const time_t now = seam().clock ? *seam().clock : NEXT(time)(nullptr);
     if (pTime) {
         *pTime = now;
@@ -257,7 +223,7 @@ time_t time(time_t* pTime) noexcept
 
 int gettimeofday(struct timeval* pTime, void* pZone) noexcept
 {
-    if (isSqlite(__builtin_return_address(0)) && seam().clock) {
+    if (seam().clock && isIn("libsqlite3.so", __builtin_return_address(0))) {
         pTime->tv_sec = *seam().clock;
         pTime->tv_usec = 0;
         return 0;
@@ -272,8 +238,7 @@ int printf(const char* szFormat, ...)
     va_list args;
     va_start(args, szFormat);
     if (blLibrary) {
-        logged(Destination::Stdout, szFormat, args);
-        record("printf");
+        logged("", szFormat, args);
     } else {
         nResult = vprintf(szFormat, args);
     }
@@ -287,8 +252,7 @@ void syslog(int nPriority, const char* szFormat, ...)
     va_list args;
     va_start(args, szFormat);
     if (blLibrary) {
-        logged(Destination::Syslog, szFormat, args);
-        record("syslog", std::to_string(nPriority));
+        logged("<" + std::to_string(nPriority) + ">", szFormat, args);
         errno = EDESTADDRREQ; // as a system without a log daemon leaves some error behind
     } else {
         vsyslog(nPriority, szFormat, args);
@@ -320,7 +284,7 @@ int sqlite3_open(const char* szPath, sqlite3** ppDb)
     if (!CALLED_BY_LIBRARY) {
         return NEXT(sqlite3_open)(szPath, ppDb);
     }
-    record("sqlite3_open", szPath);
+    fails("sqlite3_open", szPath);
     if (seam().sqliteOpen) {
         return seam().sqliteOpen(szPath, ppDb);
     }
@@ -333,7 +297,7 @@ int sqlite3_exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pA
     if (!CALLED_BY_LIBRARY) {
         return NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
     }
-    record("sqlite3_exec", szSql);
+    fails("sqlite3_exec", szSql);
     return seam().sqliteExec ? seam().sqliteExec(pDb, szSql, callback, pArgument, pszError)
                              : Seam::exec(pDb, szSql, callback, pArgument, pszError);
 }
@@ -341,7 +305,7 @@ int sqlite3_exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pA
 int sqlite3_changes(sqlite3* pDb)
 {
     if (CALLED_BY_LIBRARY) {
-        record("sqlite3_changes");
+        fails("sqlite3_changes");
     }
     return NEXT(sqlite3_changes)(pDb);
 }
@@ -351,7 +315,7 @@ int sqlite3_close(sqlite3* pDb)
     if (!CALLED_BY_LIBRARY) {
         return NEXT(sqlite3_close)(pDb);
     }
-    record("sqlite3_close");
+    fails("sqlite3_close");
     if (seam().sqliteClose) {
         return seam().sqliteClose(pDb);
     }

@@ -1,11 +1,10 @@
-// The seam between the library and the system. The test programs define the C functions that the
-// library calls (Seam.cpp), so the shared object that ships calls them here instead. The seam
-// records each call, writes the log lines down, fails what a test wants failed, and otherwise goes
-// on to the real function; the fixed database path is led elsewhere by examples/redirect.cpp.
+// The seam between the library and the system. The test programs define the C functions that the library
+// calls (Seam.cpp), so the shared object that ships calls these. They record each call, write the log lines
+// down, fail where a test wants that, and otherwise call the real function.
 //
-// Only calls that come from the library are treated so; those of SQLite and of the test itself go
-// straight to the real function. The clock is shared with SQLite; and getrandom, getpwuid_r and the
-// allocation of arrays are the seam's whoever calls, for tests that have the callers linked in.
+// Only calls by the library are treated so; those of SQLite and of the test itself go straight to the real
+// function. The clock is shared with SQLite. getrandom, getpwuid_r and the allocation of arrays are the
+// seam's whoever calls, for tests that have the callers linked in.
 
 #ifndef TESTS_SEAM_H
 #define TESTS_SEAM_H
@@ -20,34 +19,25 @@
 #include <string>
 #include <vector>
 
-enum class Destination { Stdout, Syslog };
-
 typedef int (*SqlCallback)(void*, int, char**, char**);
-
-// One log line, expanded. Line numbers of source files are no part of the design and read '#':
-// "util.cpp:# ..."; those of the field list stay.
-struct LogLine {
-    Destination destination;
-    std::string strText;
-};
 
 struct Seam {
     // The calls in order: "geteuid", "seteuid 0", "access PATH", "open PATH", "chmod PATH 0700",
     // "sqlite3_open PATH", "sqlite3_exec SQL", "sqlite3_changes", "sqlite3_close", "usleep 10000",
-    // "time", "sqlite3_mprintf FORMAT", "getrandom", "getpwuid_r UID", "operator new", "operator
-    // new[]", "syslog PRIORITY", "printf".
+    // "time", "sqlite3_mprintf FORMAT", "getrandom", "getpwuid_r UID", "operator new", "operator new[]".
     std::vector<std::string> calls;
 
-    // The calls whose first word is one of the names.
+    // The calls whose first word is one of the names, and the SQL that was run.
     std::vector<std::string> callsOf(const std::vector<std::string>& names) const;
+    std::vector<std::string> statements() const;
 
-    // What the library logged.
-    std::vector<LogLine> lines;
+    // What the library logged, with the line numbers of source files as '#', since they may change:
+    // "util.cpp:# ...". A line in the system log begins with its priority: "<3>util.cpp:# ...".
+    std::vector<std::string> lines;
 
-    // Functions that fail: name, then the numbers (from 1) of the calls that do, and the errno they
-    // leave. Functions: geteuid (answers (uid_t)-1), seteuid, access, open, chmod, sqlite3_mprintf
-    // (no memory), getrandom, getpwuid_r (returns the errno), "operator new" and "operator new[]" (the
-    // non-throwing ones).
+    // Functions that fail: the numbers (from 1) of the calls that do, and the errno they leave. They are
+    // geteuid (answers (uid_t)-1), seteuid, access, open, chmod, sqlite3_mprintf (no memory), getrandom,
+    // getpwuid_r (returns the errno), "operator new" and "operator new[]" (the non-throwing ones).
     struct Failure {
         int nFirst;
         int nLast;

@@ -1,6 +1,5 @@
 #include "StoreTest.h"
 
-#include <cerrno>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
@@ -12,11 +11,11 @@ namespace {
 
 int appendRow(void* pRows, int nColumns, char** szValues, char**)
 {
-    std::string strRow;
+    Texts columns;
     for (int i = 0; i < nColumns; ++i) {
-        strRow.append(0 == i ? "" : "|").append(szValues[i] ? szValues[i] : "NULL");
+        columns.push_back(szValues[i] ? szValues[i] : "NULL");
     }
-    static_cast<Texts*>(pRows)->push_back(strRow);
+    static_cast<Texts*>(pRows)->push_back(joined(columns, "|"));
     return 0;
 }
 
@@ -43,8 +42,19 @@ int main(int nArguments, char** szArguments)
 
 void SeamTest::SetUp()
 {
-    VEMO_ACCESS_TOKEN::logToStdout(Destination::Stdout == m_destination);
+    VEMO_ACCESS_TOKEN::logToStdout(m_blStdout);
+    reset();
+}
+
+void SeamTest::TearDown()
+{
+    EXPECT_EQ(Texts{}, takeLines()) << "the test expects no such lines";
+}
+
+void SeamTest::reset()
+{
     seam() = Seam();
+    seam().clock = NOW;
     errno = 0;
 }
 
@@ -62,6 +72,7 @@ void StoreTest::TearDown()
     if (!m_strDirectory.empty()) {
         std::filesystem::remove_all(m_strDirectory);
     }
+    SeamTest::TearDown();
 }
 
 Texts StoreTest::query(const std::string& strSql) const
@@ -79,16 +90,13 @@ Texts StoreTest::query(const std::string& strSql) const
 
 std::string StoreTest::countOf(const std::string& strTid) const
 {
-    const Texts rows = query("SELECT count FROM token WHERE tid = '" + strTid + "'");
-    return rows.empty() ? "" : rows[0];
+    return joined(query("SELECT count FROM token WHERE tid = '" + strTid + "'"), " ");
 }
 
-void StoreTest::makeDatabase() const
+void TableTest::SetUp()
 {
-    query(SCHEMA);
-}
-
-void StoreTest::insert(const std::string& strTid, const std::string& strValues) const
-{
-    query("INSERT INTO token VALUES ('" + strTid + "'," + strValues + ")");
+    StoreTest::SetUp();
+    makeTable();
+    m_api.emplace();
+    reset();
 }

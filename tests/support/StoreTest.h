@@ -5,29 +5,43 @@
 
 #include <gtest/gtest.h>
 
-#include "Texts.h"
+#include <optional>
 
-// The calls whose order the design fixes around the opening of the database.
+#include "AccessTokenApi.h"
+#include "Tokens.h"
+#include "internal/AccessTokenDbApi.h"
+
+// The calls around the opening of the database, whose order is fixed. The caller's uid is 1000.
+const uid_t UID_CALLER = 1000;
+const char* const UID = "geteuid";
+const char* const RAISE = "seteuid 0";
+const char* const ACCESS = "access " VEMO_ATOKEN_DB_PATH;
+const char* const TOUCH = "open " VEMO_ATOKEN_DB_PATH;
+const char* const CHMOD = "chmod " VEMO_ATOKEN_DB_PATH " 0700";
+const char* const OPEN = "sqlite3_open " VEMO_ATOKEN_DB_PATH;
+const std::string CREATE = "sqlite3_exec " + SCHEMA;
+const char* const CHANGES = "sqlite3_changes";
+const char* const BACK = "seteuid 1000";
+const char* const CLOSE = "sqlite3_close";
 const Texts OPENING_CALLS = {"geteuid",      "seteuid",      "access",          "open",         "chmod",
                              "sqlite3_open", "sqlite3_exec", "sqlite3_changes", "sqlite3_close"};
 
-// Tests that need no database: errno is 0, the seam is clean and the library logs to the destination.
-// (Logging to standard output, once on, stays on.)
+// Tests that need no database. The library logs to standard output, and does so for the rest of the process.
+// A line that a test does not take is an error.
 class SeamTest : public ::testing::Test {
 protected:
-    explicit SeamTest(Destination destination = Destination::Stdout) : m_destination(destination) {}
     void SetUp() override;
+    void TearDown() override;
 
-    Destination destination() const { return m_destination; }
+    // Nothing fails any more, nothing is recorded yet, errno is 0 and the clock shows NOW.
+    static void reset();
 
-private:
-    const Destination m_destination;
+    bool m_blStdout = true; // a constructor may set it to false: the library logs to the system log then
 };
 
-// Tests with a database of their own in a fresh directory, which the library takes for the real one.
+// Tests with a fresh directory, which the library takes for that of the database. There is no file yet.
 class StoreTest : public SeamTest {
 protected:
-    using SeamTest::SeamTest;
     void SetUp() override;
     void TearDown() override;
 
@@ -38,17 +52,32 @@ protected:
     // '|'; NULL reads "NULL".
     Texts query(const std::string& strSql) const;
 
-    // The count of a token in the table, "" when it is not there.
-    std::string countOf(const std::string& strTid) const;
+    // The rows of the table, in the order of their ids; these ids, with blanks between; and the count of a
+    // token, "" when it is not there.
+    Texts rows() const { return query("SELECT * FROM token ORDER BY tid"); }
+    std::string tids() const { return joined(query("SELECT tid FROM token ORDER BY tid"), " "); }
+    std::string countOf(const std::string& strTid = "t") const;
 
-    // Makes the database with its table, as the library would have.
-    void makeDatabase() const;
-
-    // Writes a row; values in SQL, in the columns' order.
-    void insert(const std::string& strTid, const std::string& strValues) const;
+    // Makes the database with its table, as the library would have; and a token in it, with the members of
+    // token(strChanges).
+    void makeTable() const { query(SCHEMA); }
+    void insert(const std::string& strChanges = "{}") const { query(saveSql("INSERT", token(strChanges))); }
 
 private:
     std::string m_strDirectory;
+};
+
+// Tests with a table, without tokens at first, and with a store and a service for it.
+class TableTest : public StoreTest {
+protected:
+    void SetUp() override;
+
+    AccessTokenApi& api() { return *m_api; }
+
+    AccessTokenDbApi m_db; // not yet open
+
+private:
+    std::optional<AccessTokenApi> m_api; // open
 };
 
 #endif

@@ -4,10 +4,11 @@
 
 #include <cstring>
 #include <memory>
+#include <utility>
 
 namespace {
 
-// "util.cpp" stands for all its lines; the field list's are told.
+// "util.cpp" stands for all its lines; those of the field list are told.
 std::string location(const std::string& strFile)
 {
     return std::string::npos == strFile.find(':') ? strFile + ":#" : strFile;
@@ -21,13 +22,22 @@ Texts operator+(Texts left, const Texts& right)
     return left;
 }
 
+std::string joined(const Texts& texts, const char* szSeparator)
+{
+    std::string strJoined;
+    for (const std::string& strText : texts) {
+        strJoined.append(&strText == &texts.front() ? "" : szSeparator).append(strText);
+    }
+    return strJoined;
+}
+
 Json::Value json(const std::string& strText)
 {
     const std::unique_ptr<Json::CharReader> pReader(Json::CharReaderBuilder().newCharReader());
     Json::Value jValue;
     std::string strErrors;
     EXPECT_TRUE(pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, &strErrors))
-        << strErrors;
+        << strErrors << strText;
     return jValue;
 }
 
@@ -38,16 +48,9 @@ std::string text(const Json::Value& jValue)
     return Json::writeString(builder, jValue);
 }
 
-std::string tid(const std::string& strStart)
-{
-    std::string strTid = strStart;
-    strTid.resize(127, 'x');
-    return strTid;
-}
-
 std::string fieldList(int nLine)
 {
-    return FIELD_LIST + (":" + std::to_string(nLine));
+    return "include/internal/vemo-access-token-data-member:" + std::to_string(nLine);
 }
 
 std::string selectSql(const std::string& strTid)
@@ -84,35 +87,22 @@ Texts allFailed(const std::string& strFile, const Texts& conditions, int nErrno)
     return lines;
 }
 
-Texts inSystemLog(Texts lines, int nErrno)
-{
-    const std::string strErrno = 0 == nErrno ? "" : std::string("(") + strerror(nErrno) + ")";
-    for (std::string& strLine : lines) {
-        strLine.insert(strLine.find(' ') + 1, strErrno);
-    }
-    return lines;
-}
-
 Texts failureOf(const std::string& strSql, const std::string& strError, int nErrno)
 {
     return {ordinary(STORE, "i=0,run sql failed, error=" + strError + ", sql=" + strSql),
             fail(STORE, "run sql failed, sql=" + strSql, nErrno)};
 }
 
-Texts takeLines()
+Texts inSystemLog(Texts lines, int nErrno)
 {
-    Texts texts;
-    for (const LogLine& line : seam().lines) {
-        texts.push_back(line.strText);
+    const std::string strErrno = 0 == nErrno ? "" : std::string("(") + strerror(nErrno) + ")";
+    for (std::string& strLine : lines) {
+        strLine = "<3>" + strLine.insert(strLine.find(' ') + 1, strErrno);
     }
-    seam().lines.clear();
-    return texts;
+    return lines;
 }
 
-Texts takeLines(Destination destination)
+Texts takeLines()
 {
-    for (const LogLine& line : seam().lines) {
-        EXPECT_EQ(destination, line.destination) << line.strText;
-    }
-    return takeLines();
+    return std::exchange(seam().lines, {});
 }

@@ -1,4 +1,4 @@
-// Creating the database, keeping it open, closing it, and the schema.
+// The connection to the database: in which order of calls it is opened, how that fails, and how it is closed.
 
 #include <sys/stat.h>
 #include <unistd.h>
@@ -6,77 +6,143 @@
 #include <cstddef>
 #include <filesystem>
 #include <fstream>
-#include <new>
+#include <functional>
 #include <type_traits>
 
-#include "BothLogs.h"
-#include "StandIns.h"
 #include "Statements.h"
+#include "StoreTest.h"
 
-// Compiled callers hold these objects by value and call these members by their mangled names.
+// Compiled callers hold these objects by value.
 static_assert(std::is_standard_layout_v<AccessTokenDbApi>);
 static_assert(0 == offsetof(AccessTokenDbApi, m_pDb));
 static_assert(sizeof(sqlite3*) == offsetof(AccessTokenDbApi, m_strSql));
 static_assert(sizeof(sqlite3*) + sizeof(std::string) == offsetof(AccessTokenDbApi, m_strErr));
 static_assert(sizeof(sqlite3*) + 2 * sizeof(std::string) == sizeof(AccessTokenDbApi));
 static_assert(std::is_same_v<decltype(AccessTokenDbApi::m_pDb), sqlite3*>);
-static_assert(std::is_same_v<decltype(&AccessTokenDbApi::runSqlEx),
-                             int (AccessTokenDbApi::*)(std::string, SqlCallback, void*)>);
-static_assert(std::is_same_v<decltype(&AccessTokenDbApi::cleanExpireToken), int (AccessTokenDbApi::*)(bool)>);
 
 namespace {
 
+const std::string UPDATE = "UPDATE token SET uid = 1";
+const std::string OPEN_FAILED = "open sqlite failed, path=" VEMO_ATOKEN_DB_PATH ", errno=";
+
+// What an opening leaves.
+struct Outcome {
+    int nResult;
+    bool blHandle;
+    uid_t uidAfter;
+};
+
+const Outcome OPENED = {0, true, UID_CALLER};
+const Outcome REFUSED = {-1, false, UID_CALLER};
+
 class Connection : public StoreTest {
 protected:
+    void SetUp() override
+    {
+        StoreTest::SetUp();
+        ASSERT_EQ(0, seteuid(UID_CALLER));
+    }
+
     mode_t mode() const
     {
         struct stat status;
         EXPECT_EQ(0, stat(path().c_str(), &status));
         return status.st_mode & 07777;
     }
+
+    // SQLite refuses a directory, and leaves a handle that can only be closed.
+    static void refuseOpening()
+    {
+        seam().sqliteOpen = [](const char*, sqlite3** ppDb) {
+            const int nResult = sqlite3_open("/", ppDb);
+            errno = EACCES;
+            return nResult;
+        };
+    }
+
+    static void openWithoutHandle(int nResult)
+    {
+        seam().sqliteOpen = [=](const char*, sqlite3**) { return errno = ENOMEM, nResult; };
+    }
 };
+
+TEST_F(Connection, OpensInAFixedOrderOfCallsAndPutsTheUidBack)
+{
+    const Texts touched = {UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN};
+    const Texts created = touched + Texts{CREATE, CHANGES};
+    const Texts back = {BACK};
+    const auto opens = [&](const auto& prepare, const Outcome& outcome, const Texts& calls,
+                           const Texts& lines) {
+        SCOPED_TRACE(joined(calls, ", "));
+        std::filesystem::remove(path());
+        reset();
+        prepare();
+        ASSERT_EQ(0, seteuid(UID_CALLER));
+        AccessTokenDbApi db;
+        EXPECT_EQ(outcome.nResult, db.initDb());
+        EXPECT_EQ(calls, seam().callsOf(OPENING_CALLS));
+        EXPECT_EQ(outcome.blHandle, nullptr != db.m_pDb);
+        EXPECT_EQ(outcome.uidAfter, geteuid());
+        EXPECT_EQ("", db.m_strSql);
+        EXPECT_LINES(lines);
+        EXPECT_FALSE(std::filesystem::exists(path() + ".elsewhere"));
+    };
+    opens([] {}, OPENED, created + back, {});
+    opens([&] { std::ofstream{path()}; }, OPENED, {UID, RAISE, ACCESS, OPEN, BACK}, {});
+    // What cannot be looked at is treated as missing, which does the file no harm.
+    opens([&] { std::ofstream{path()}, seam().fail("access", EACCES); }, OPENED, created + back, {});
+    opens([] { seam().fail("seteuid", EPERM); }, REFUSED, {UID, RAISE, BACK}, {NOT_ROOT});
+    opens([] { seam().fail("open", EROFS); }, REFUSED, {UID, RAISE, ACCESS, TOUCH, BACK},
+          {failed(STORE, "0 > PLIBCFileTouch(VEMO_ATOKEN_DB_PATH)", EROFS)});
+    opens([&] { std::filesystem::create_symlink(path() + ".elsewhere", path()); }, REFUSED,
+          {UID, RAISE, ACCESS, TOUCH, BACK},
+          {failed(STORE, "0 > PLIBCFileTouch(VEMO_ATOKEN_DB_PATH)", ENOENT)});
+    opens([] { seam().fail("chmod", EPERM); }, REFUSED, {UID, RAISE, ACCESS, TOUCH, CHMOD, BACK},
+          {failed(STORE, "-1 == chmod(VEMO_ATOKEN_DB_PATH, 0700)", EPERM)});
+    // The effective uid stays 0 after a failed opening, and only then.
+    opens(refuseOpening, {-1, true, 0}, touched, {fail(STORE, OPEN_FAILED + "14", EACCES)});
+    opens([] { openWithoutHandle(SQLITE_NOMEM); }, {-1, false, 0}, touched,
+          {fail(STORE, OPEN_FAILED + "7", ENOMEM)});
+    opens([] { openWithoutHandle(SQLITE_OK); }, {0, false, UID_CALLER}, touched + back,
+          {failed(STORE, "!m_pDb", ENOMEM)});
+    opens([] { failStatements(SCHEMA, DISK_ERROR); }, OPENED, touched + Texts{CREATE} + back,
+          {ordinary(STORE, "i=0,run sql failed, error=disk I/O error, sql=" + SCHEMA),
+           fail(STORE, "create table failed, sql=" + SCHEMA, EIO)});
+    // Nobody knows what to put back.
+    opens([] { seam().fail("geteuid", EPERM); }, {0, true, 0}, created, {});
+    opens([] { seam().fail("geteuid", 0), seam().fail("seteuid", EPERM); }, REFUSED, {UID, RAISE},
+          {NOT_ROOT});
+    opens([] { seam().fail("seteuid", EAGAIN, 2, 2); }, {0, true, 0}, created + back, {});
+}
 
 TEST_F(Connection, OpensAndClosesNothingUnasked)
 {
     {
         const AccessTokenDbApi db;
         EXPECT_EQ(nullptr, db.m_pDb);
-        EXPECT_EQ("", db.m_strSql);
-        EXPECT_EQ("", db.m_strErr);
+        EXPECT_EQ("", db.m_strSql + db.m_strErr);
     }
-
     EXPECT_EQ(Texts{}, seam().calls);
     EXPECT_FALSE(std::filesystem::exists(path()));
 }
 
-TEST_F(Connection, CreatesPrivateFileWithTableOnFirstUse)
+TEST_F(Connection, CreatesAPrivateFileWithTheTableWhateverTheUmask)
 {
-    AccessTokenDbApi db;
-
-    EXPECT_EQ(0, db.initDb());
-
-    EXPECT_EQ(0700u, mode());
-    EXPECT_EQ((Texts{"1"}), query("PRAGMA auto_vacuum"));
-    EXPECT_EQ(
-        (Texts{"tid|TEXT|1|NULL|1", "bind_sid|TEXT|0|NULL|0", "uid|INTEGER|0|NULL|0",
-               "deadline|INTEGER|0|-1|0", "count|INTEGER|0|1|0", "create_time|INTEGER|0|CURRENT_TIMESTAMP|0",
-               "function|TEXT|1|NULL|0", "webapi_allow|TEXT|0|NULL|0", "extra|TEXT|0|NULL|0"}),
-        query("SELECT name, type, \"notnull\", dflt_value, pk FROM pragma_table_info('token')"));
-    EXPECT_EQ("", db.m_strErr);
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Connection, MakesTheModeWhateverTheUmask)
-{
+    std::string strColumns;
+    for (const Field& field : fields()) {
+        strColumns.append(strColumns.empty() ? "" : ",").append(field.szColumn);
+    }
     for (const mode_t mask : {0000u, 0022u, 0077u, 0777u}) {
         SCOPED_TRACE(mask);
-        AccessTokenDbApi db;
+        std::filesystem::remove(path());
         const mode_t maskBefore = umask(mask);
-        EXPECT_EQ(0, db.initDb());
+        EXPECT_EQ(0, AccessTokenDbApi().initDb());
         umask(maskBefore);
         EXPECT_EQ(0700u, mode());
-        std::filesystem::remove(path());
     }
+    EXPECT_EQ((Texts{"1"}), query("PRAGMA auto_vacuum"));
+    EXPECT_EQ((Texts{"CREATE TABLE token (" + strColumns + ")"}),
+              query("SELECT sql FROM sqlite_schema WHERE sql <> ''"));
 }
 
 TEST_F(Connection, DoesNothingWhenOpen)
@@ -84,52 +150,32 @@ TEST_F(Connection, DoesNothingWhenOpen)
     AccessTokenDbApi db;
     ASSERT_EQ(0, db.initDb());
     std::filesystem::remove(path());
-    seam() = Seam();
+    reset();
     seam().fail("seteuid", EPERM);
-
     EXPECT_EQ(0, db.initDb());
-
     EXPECT_EQ(Texts{}, seam().calls);
 }
 
 // The file's existence counts, not the table's.
-TEST_F(Connection, LeavesAnEmptyFileWithoutTable)
+TEST_F(Connection, LeavesFilesThatExistAlone)
 {
-    std::ofstream{path()};
-    ASSERT_EQ(0, chmod(path().c_str(), 0640));
-    AccessTokenDbApi db;
-    db.m_strSql = UPDATE;
-
-    EXPECT_EQ(-1, db.runSql());
-
-    EXPECT_EQ("no such table: token", db.m_strErr);
-    EXPECT_EQ(0640u, mode());
-    EXPECT_EQ((Texts{"sqlite3_exec " + UPDATE}),
-              seam().callsOf({"sqlite3_exec", "usleep", "sqlite3_changes"}));
-    EXPECT_EQ(failureOf(UPDATE, "no such table: token"), takeLines());
-
-    EXPECT_EQ(0, db.createTable());
-
-    EXPECT_EQ(SCHEMA, db.m_strSql);
-    EXPECT_EQ("", db.m_strErr);
-    EXPECT_EQ((Texts{COLUMNS}), query("SELECT group_concat(name) FROM pragma_table_info('token')"));
-}
-
-TEST_F(Connection, LeavesAForeignFileAlone)
-{
-    const std::string strContent(4096, 'x');
-    std::ofstream{path()} << strContent;
-    AccessTokenDbApi db;
-
-    EXPECT_EQ(0, db.initDb());
-    db.m_strSql = UPDATE;
-    EXPECT_EQ(-1, db.runSql());
-
-    EXPECT_EQ(failureOf(UPDATE, "file is not a database"), takeLines());
-    EXPECT_EQ("file is not a database", db.m_strErr);
-    std::string strAfter;
-    std::ifstream{path()} >> strAfter;
-    EXPECT_EQ(strContent, strAfter);
+    const std::string strForeign(4096, 'x');
+    for (const auto& [strContent, strError] :
+         {std::pair<std::string, std::string>{"", "no such table: token"},
+          {strForeign, "file is not a database"}}) {
+        std::ofstream{path()} << strContent;
+        ASSERT_EQ(0, chmod(path().c_str(), 0640));
+        AccessTokenDbApi db;
+        db.m_strSql = UPDATE;
+        EXPECT_EQ(-1, db.runSql());
+        EXPECT_EQ(strError, db.m_strErr);
+        EXPECT_LINES(failureOf(UPDATE, strError));
+        EXPECT_EQ(0640u, mode());
+        std::string strAfter;
+        std::ifstream{path()} >> strAfter;
+        EXPECT_EQ(strContent, strAfter);
+    }
+    EXPECT_EQ((Texts{UPDATE, UPDATE}), seam().statements());
 }
 
 TEST_F(Connection, PutsTheUidBackWhenAnExceptionPasses)
@@ -137,232 +183,128 @@ TEST_F(Connection, PutsTheUidBackWhenAnExceptionPasses)
     seam().sqliteExec = [](sqlite3*, const char*, SqlCallback, void*, char**) -> int {
         throw std::bad_alloc();
     };
-    ASSERT_EQ(0, seteuid(UID_CALLER));
     AccessTokenDbApi db;
-
     EXPECT_THROW(db.initDb(), std::bad_alloc);
-
     EXPECT_EQ(UID_CALLER, geteuid());
     EXPECT_EQ((Texts{UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN, CREATE, BACK}), seam().callsOf(OPENING_CALLS));
     EXPECT_NE(nullptr, db.m_pDb);
-    EXPECT_EQ(0, db.freeDb());
 }
 
 TEST_F(Connection, KeepsTheUselessHandleOfARefusedOpening)
 {
-    seam().sqliteOpen = refuseOpening;
+    refuseOpening();
     AccessTokenDbApi db;
     db.m_strSql = UPDATE;
     db.m_strErr = "stale";
-
     EXPECT_EQ(-1, db.runSql());
-
     EXPECT_EQ("stale", db.m_strErr); // nothing was run
-    EXPECT_EQ((Texts{fail(STORE, "open sqlite failed, path=" VEMO_ATOKEN_DB_PATH ", errno=14", EACCES),
-                     failed(STORE, "0 > initDb()", EACCES)}),
-              takeLines());
+    EXPECT_LINES(fail(STORE, OPEN_FAILED + "14", EACCES), failed(STORE, "0 > initDb()", EACCES));
 
     errno = 0;
     EXPECT_EQ(-1, db.runSql());
-
-    EXPECT_EQ(UNKNOWN, db.m_strErr);
-    EXPECT_EQ(failureOf(UPDATE, "(null)"), takeLines());
+    EXPECT_EQ("Unknow Error!!", db.m_strErr);
+    EXPECT_LINES(failureOf(UPDATE, "(null)"));
     EXPECT_EQ((Texts{OPEN}), seam().callsOf({"sqlite3_open"}));
 
     EXPECT_EQ(0, db.freeDb());
-    seam() = Seam();
+    reset();
     EXPECT_EQ(-1, db.runSql()); // the empty file that the first try made is there by now
-    EXPECT_EQ("no such table: token", db.m_strErr);
+    EXPECT_LINES(failureOf(UPDATE, "no such table: token"));
 }
 
 // No handle counts as closed, so each statement opens anew.
 TEST_F(Connection, RunsStatementsOverNoHandleInVain)
 {
-    openingWithoutHandle(SQLITE_OK, 0)(path());
+    openWithoutHandle(SQLITE_OK);
     AccessTokenDbApi db;
     db.m_strSql = UPDATE;
-
     for (int i = 0; i < 2; ++i) {
         EXPECT_EQ(-1, db.runSql());
-        EXPECT_EQ(UNKNOWN, db.m_strErr);
-        EXPECT_EQ((Texts{failed(STORE, "!m_pDb"),
-                         ordinary(STORE, "i=0,run sql failed, error=(null), sql=" + UPDATE),
-                         fail(STORE, "run sql failed, sql=" + UPDATE)}),
-                  takeLines());
+        EXPECT_EQ("Unknow Error!!", db.m_strErr);
+        EXPECT_LINES(Texts{failed(STORE, "!m_pDb", ENOMEM)} + failureOf(UPDATE, "(null)", ENOMEM));
     }
-    EXPECT_EQ((Texts{OPEN, OPEN}), seam().callsOf({"sqlite3_open"}));
     EXPECT_EQ(0, db.freeDb());
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_close"}));
+    EXPECT_EQ((Texts{OPEN, OPEN}), seam().callsOf({"sqlite3_open", "sqlite3_close"}));
 }
 
-// The uid that cannot be put back must not hide why the opening failed.
+// The uid that cannot be put back does not hide why the opening failed.
 TEST_F(Connection, TellsErrnoOfTheFailedCallUpToTheStatement)
 {
     seam().fail("open", EROFS);
     seam().fail("seteuid", EAGAIN, 2, 2);
-    AccessTokenDbApi db;
+    EXPECT_EQ(-1, AccessTokenDbApi().createTable());
+    EXPECT_LINES(
+        allFailed(STORE, {"0 > PLIBCFileTouch(VEMO_ATOKEN_DB_PATH)", "0 > initDb()", "0 > runSql()"}, EROFS));
+}
 
+TEST_F(Connection, CreatesTheTableWhereItIsMissing)
+{
+    std::ofstream{path()};
+    AccessTokenDbApi db;
+    for (const char* szTids : {"", "t"}) {
+        db.m_strErr = "stale";
+        EXPECT_EQ(0, db.createTable());
+        EXPECT_EQ(SCHEMA, db.m_strSql);
+        EXPECT_EQ("", db.m_strErr);
+        EXPECT_EQ(szTids, tids());
+        if (!szTids[0]) {
+            insert();
+        }
+    }
+    failStatements(SCHEMA, DISK_ERROR);
     EXPECT_EQ(-1, db.createTable());
+    EXPECT_EQ("disk I/O error", db.m_strErr);
+    EXPECT_LINES(failureOf(SCHEMA, "disk I/O error", EIO) + Texts{failed(STORE, "0 > runSql()", EIO)});
 
-    EXPECT_EQ((Texts{failed(STORE, "0 > PLIBCFileTouch(VEMO_ATOKEN_DB_PATH)", EROFS),
-                     failed(STORE, "0 > initDb()", EROFS), failed(STORE, "0 > runSql()", EROFS)}),
-              takeLines());
+    std::string strSql = "replaced";
+    EXPECT_EQ(0, db.SqlExpandCreateTable(strSql));
+    EXPECT_EQ(SCHEMA, strSql);
 }
 
-TEST_F(Connection, ReopensAfterFree)
+TEST_F(Connection, ClosesAndOpensAgain)
 {
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-
-    EXPECT_EQ(0, db.freeDb());
-    EXPECT_EQ(nullptr, db.m_pDb);
-    EXPECT_EQ(0, db.freeDb());
-    EXPECT_EQ((Texts{"sqlite3_close"}), seam().calls);
-    ASSERT_EQ(0, seteuid(UID_CALLER));
-    seam() = Seam();
-
-    db.m_strSql = UPDATE;
-    EXPECT_EQ(2, db.runSql());
-
-    EXPECT_EQ((Texts{UID, RAISE, ACCESS, OPEN, BACK, "sqlite3_exec " + UPDATE, CHANGES}),
-              seam().callsOf(OPENING_CALLS));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Connection, DestructorCloses)
-{
+    makeTable();
+    insert();
     {
         AccessTokenDbApi db;
         ASSERT_EQ(0, db.initDb());
-        seam() = Seam();
+        reset();
+        EXPECT_EQ(0, db.freeDb());
+        EXPECT_EQ(nullptr, db.m_pDb);
+        EXPECT_EQ(0, db.freeDb());
+        EXPECT_EQ((Texts{CLOSE}), seam().calls);
+        reset();
+        db.m_strSql = UPDATE;
+        EXPECT_EQ(1, db.runSql());
+        EXPECT_EQ((Texts{UID, RAISE, ACCESS, OPEN, BACK, "sqlite3_exec " + UPDATE, CHANGES}),
+                  seam().callsOf(OPENING_CALLS));
+        reset();
     }
-
-    EXPECT_EQ((Texts{"sqlite3_close"}), seam().calls);
+    EXPECT_EQ((Texts{CLOSE}), seam().calls); // by the destructor
 }
 
-TEST_F(Connection, StaysOpenWhileAStatementIsUnfinished)
+TEST_F(Connection, StaysOpenWhenItCannotBeClosed)
 {
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-    sqlite3_stmt* pStatement = nullptr;
-    ASSERT_EQ(SQLITE_OK, sqlite3_prepare_v2(db.m_pDb, "SELECT tid FROM token", -1, &pStatement, nullptr));
-    sqlite3* const pDb = db.m_pDb;
-
-    EXPECT_EQ(0, db.freeDb());
-    EXPECT_EQ(pDb, db.m_pDb);
-    EXPECT_EQ((Texts{failed(STORE, "SQLITE_OK != sqlite3_close(m_pDb)")}), takeLines());
-
-    sqlite3_finalize(pStatement);
-    EXPECT_EQ(0, db.freeDb());
-    EXPECT_EQ(nullptr, db.m_pDb);
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-struct ErrnoCase {
-    const char* szName;
-    int nErrno;
-};
-
-class WithErrno : public InBothLogs<ErrnoCase> {};
-
-TEST_P(WithErrno, RefusedClosingIsLogged)
-{
+    const std::string strLine = failed(STORE, "SQLITE_OK != sqlite3_close(m_pDb)", EINTR);
+    makeTable();
+    insert();
     sqlite3* pDb = nullptr;
     {
         AccessTokenDbApi db;
         ASSERT_EQ(0, db.initDb());
         pDb = db.m_pDb;
-        seam().sqliteClose = [this](sqlite3*) {
-            errno = theCase().nErrno;
-            return SQLITE_BUSY;
-        };
+        sqlite3_stmt* pUnfinished = nullptr;
+        ASSERT_EQ(SQLITE_OK, sqlite3_prepare_v2(pDb, "SELECT tid FROM token", -1, &pUnfinished, nullptr));
+        errno = EINTR;
         EXPECT_EQ(0, db.freeDb());
         EXPECT_EQ(pDb, db.m_pDb);
+        EXPECT_LINES(strLine);
+        sqlite3_finalize(pUnfinished);
+        seam().sqliteClose = [](sqlite3*) { return SQLITE_BUSY; };
+        errno = EINTR;
     }
-
-    const Line line = failedLine("SQLITE_OK != sqlite3_close(m_pDb)", theCase().nErrno);
-    expectLines({line, line}); // the second by the destructor
+    EXPECT_LINES(strLine); // by the destructor
     EXPECT_EQ(SQLITE_OK, sqlite3_close(pDb));
-}
-
-TEST_P(WithErrno, EmptyStatementIsRefusedTwice)
-{
-    AccessTokenDbApi db;
-    db.m_strErr = "stale";
-    errno = theCase().nErrno;
-
-    EXPECT_EQ(-1, db.runSql());
-    EXPECT_EQ(-1, db.runSql(countRow, nullptr));
-    EXPECT_EQ("stale", db.m_strErr);
-    EXPECT_EQ(-1, db.runSqlEx("", nullptr, nullptr));
-    EXPECT_EQ(UNKNOWN, db.m_strErr);
-
-    const Line line = failLine("no correct sql", theCase().nErrno);
-    expectLines({line, line, failedLine("0 >= strSql.length()", theCase().nErrno)});
-    EXPECT_EQ(nullptr, db.m_pDb);
-    EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
-}
-
-INSTANTIATE_TEST_SUITE_P(All, WithErrno, inBothLogs<ErrnoCase>({{"Zero", 0}, {"Set", EINTR}}),
-                         ::testing::PrintToStringParamName());
-
-// The schema
-
-TEST_F(Connection, SchemaReplacesTheText)
-{
-    std::string strSql = "anything";
-    AccessTokenDbApi db;
-
-    EXPECT_EQ(0, db.SqlExpandCreateTable(strSql));
-
-    EXPECT_EQ(SCHEMA, strSql);
-    EXPECT_EQ("", db.m_strSql);
-}
-
-TEST_F(Connection, CreateTableKeepsATableThatIsThere)
-{
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-
-    EXPECT_EQ(0, db.createTable());
-
-    EXPECT_EQ(SCHEMA, db.m_strSql);
-    EXPECT_EQ((Texts{"2"}), query("SELECT count(*) FROM token"));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Connection, CreateTableReportsItsFailure)
-{
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-    failStatements(SCHEMA, {SQLITE_CORRUPT, "database disk image is malformed"});
-
-    EXPECT_EQ(-1, db.createTable());
-
-    EXPECT_EQ(SCHEMA, db.m_strSql);
-    EXPECT_EQ("database disk image is malformed", db.m_strErr);
-    EXPECT_EQ(failureOf(SCHEMA, "database disk image is malformed", EIO) +
-                  Texts{failed(STORE, "0 > runSql()", EIO)},
-              takeLines());
-}
-
-TEST_F(Connection, LogsASchemaThatCannotBeBuilt)
-{
-    standIns().sqlExpandCreateTable = [](std::string&) {
-        errno = ENOMEM;
-        return -1;
-    };
-    AccessTokenDbApi db;
-    db.m_strSql = UPDATE;
-
-    EXPECT_EQ(0, db.initDb());
-    EXPECT_EQ((Texts{failed(STORE, "0 > SqlExpandCreateTable(strSql)", ENOMEM)}), takeLines());
-    EXPECT_EQ((Texts{UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN, RAISE}), seam().callsOf(OPENING_CALLS));
-
-    EXPECT_EQ(-1, db.createTable());
-    EXPECT_EQ((Texts{failed(STORE, "0 > AccessTokenDbApi::SqlExpandCreateTable(strSql)", ENOMEM)}),
-              takeLines());
-    EXPECT_EQ(UPDATE, db.m_strSql);
 }
 
 } // namespace

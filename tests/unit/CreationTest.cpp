@@ -1,42 +1,24 @@
-// Creating tokens, with ids of the caller's and with generated ones.
+// Creating tokens, with ids that the caller chooses and with generated ones.
 
 #include <climits>
-#include <memory>
 #include <type_traits>
 
-#include "AccessTokenApi.h"
 #include "AccessTokenUtil.h"
-#include "StandIns.h"
 #include "Statements.h"
 #include "StoreTest.h"
 
-// Compiled callers link to these very signatures.
-typedef int (AccessTokenApi::*CreateFunction)(unsigned int&, std::string&, Json::Value&, std::string&);
-static_assert(std::is_same_v<CreateFunction, decltype(&AccessTokenApi::tokenCreateByTid)>);
-static_assert(std::is_same_v<CreateFunction, decltype(&AccessTokenApi::tokenCreate)>);
 static_assert(UID_ERR == 4294967295U && std::is_unsigned_v<decltype(UID_ERR)>);
 static_assert(VEMO_ATOKEN_LENGTH_MIN == 127);
 
 namespace {
 
-const time_t NOW = 1700000000;
-const char* const OPTION_TYPE_FAILED =
-    "jTokenOption.type() != Json::objectValue && jTokenOption.type() != Json::nullValue";
+typedef int (AccessTokenApi::*CreateFunction)(unsigned int&, std::string&, Json::Value&, std::string&);
 
-// Creation in an empty database, at a fixed time.
-class Creation : public StoreTest {
+const char* const SHORT_TID = "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN";
+const std::string CREATE_FAILED = "0 > m_pDb->tokenCreate(jParam)";
+
+class Creation : public TableTest {
 protected:
-    using StoreTest::StoreTest;
-
-    void SetUp() override
-    {
-        StoreTest::SetUp();
-        makeDatabase();
-        seam().clock = NOW;
-        m_pApi = std::make_unique<AccessTokenApi>();
-        seam().calls.clear();
-    }
-
     // The operations, which only read what they are given.
     int createByTid() { return create(&AccessTokenApi::tokenCreateByTid, m_strTid); }
     int createGenerated()
@@ -53,7 +35,7 @@ protected:
                                      ", strFunction=" + m_strFunction + ", jTokenOption=" + text(m_jOption));
     }
 
-    // The record that the option makes, in its JSON form.
+    // The record that the option makes.
     Json::Value record() const
     {
         Json::Value jRecord = json(R"({"bind_sid":"","count":1,"create_time":1700000000,"deadline":1700086400,
@@ -65,17 +47,10 @@ protected:
         return jRecord;
     }
 
-    std::string insertion() const
-    {
-        return std::string("INSERT INTO token (") + COLUMNS + ") VALUES ('" + m_strTid +
-               "','',1026,1700086400,1,1700000000,'VPN','{}','{}')";
-    }
-
     Texts duplicateLines() const
     {
-        return failureOf(insertion(), "UNIQUE constraint failed: token.tid") +
-               Texts{failed(STORE, "0 > runSql()"), failed(SERVICE, "0 > m_pDb->tokenCreate(jParam)"),
-                     summary()};
+        return failureOf(saveSql("INSERT", record()), "UNIQUE constraint failed: token.tid") +
+               Texts{failed(STORE, "0 > runSql()"), failed(SERVICE, CREATE_FAILED), summary()};
     }
 
     unsigned int m_uid = 1026;
@@ -83,7 +58,6 @@ protected:
     std::string m_strTid = tid();
     Json::Value m_jOption;
     std::string m_strOut = "before";
-    std::unique_ptr<AccessTokenApi> m_pApi;
 
 private:
     int create(CreateFunction operation, std::string& strTid)
@@ -92,8 +66,7 @@ private:
         const std::string strFunction = m_strFunction;
         const std::string strTidIn = m_strTid;
         const Json::Value jOption = m_jOption;
-        errno = 0;
-        const int rv = (*m_pApi.*operation)(m_uid, m_strFunction, m_jOption, strTid);
+        const int rv = (api().*operation)(m_uid, m_strFunction, m_jOption, strTid);
         EXPECT_EQ(uid, m_uid);
         EXPECT_EQ(strFunction, m_strFunction);
         EXPECT_EQ(strTidIn, m_strTid);
@@ -102,36 +75,37 @@ private:
     }
 };
 
-TEST_F(Creation, NullOptionMeansDefaults)
+TEST_F(Creation, TakesWhatTheOptionLacksFromTheDefaults)
 {
-    EXPECT_EQ(0, createByTid());
-    EXPECT_EQ((Texts{"sqlite3_exec " + insertion()}), seam().callsOf({"sqlite3_exec"}));
-    EXPECT_EQ((Texts{m_strTid + "||1026|1700086400|1|1700000000|VPN|{}|{}"}), query("SELECT * FROM token"));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Creation, EmptyOptionMeansDefaultsToo)
-{
-    m_jOption = Json::Value(Json::objectValue);
-    EXPECT_EQ(0, createByTid());
-    EXPECT_EQ((Texts{"sqlite3_exec " + insertion()}), seam().callsOf({"sqlite3_exec"}));
+    for (const Json::ValueType type : {Json::nullValue, Json::objectValue}) {
+        query("DELETE FROM token");
+        seam().calls.clear();
+        m_jOption = Json::Value(type);
+        EXPECT_EQ(0, createByTid());
+        EXPECT_EQ(
+            (Texts{
+                "INSERT INTO token (tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra)"
+                " VALUES ('" +
+                m_strTid + "','',1026,1700086400,1,1700000000,'VPN','{}','{}')"}),
+            seam().statements());
+        EXPECT_EQ((Texts{row(record())}), rows());
+    }
 }
 
 TEST_F(Creation, CarriesOptionsAndDropsWhatIsNoField)
 {
-    m_jOption = json(R"({"bind_sid":"S'1","count":-1,"deadline":60,"webapi_allow":{"A":{"method":["get"]}},
+    m_jOption = json(R"({"bind_sid":"S'1","count":-1,"webapi_allow":{"A":{"method":["get"]}},
                          "extra":{"b":[1,null],"a":"it's"},"Count":9,"colour":"red"})");
     EXPECT_EQ(0, createByTid());
-    EXPECT_EQ((Texts{m_strTid + R"(|S'1|1026|1700000060|-1|1700000000|VPN|{"A":{"method":["get"]}}|)"
-                                R"({"a":"it's","b":[1,null]})"}),
-              query("SELECT * FROM token"));
-    EXPECT_EQ(Texts{}, takeLines());
+    EXPECT_EQ((Texts{row(record())}), rows());
 }
 
-TEST_F(Creation, ArgumentsAndClockOverrideTheOption)
+TEST_F(Creation, TakesArgumentsAndClockBeforeTheOption)
 {
+    const std::string strRow = row(record());
     m_jOption = json(R"({"tid":"other","uid":1,"function":"other","create_time":5})");
     EXPECT_EQ(0, createByTid());
+    EXPECT_EQ((Texts{strRow}), rows());
     m_jOption = json(R"({"tid":[],"uid":"1","function":null,"create_time":"now"})");
     m_strTid = tid("second");
     EXPECT_EQ(0, createByTid());
@@ -139,21 +113,19 @@ TEST_F(Creation, ArgumentsAndClockOverrideTheOption)
               query("SELECT uid,create_time,function,deadline FROM token"));
 }
 
-TEST_F(Creation, DeadlineCountsFromCreationIn64Bits)
+TEST_F(Creation, CountsTheDeadlineFromNowIn64Bits)
 {
-    struct Case {
+    const struct {
         const char* szOption;
         time_t now;
         const char* szDeadline;
-    };
-    const std::vector<Case> cases = {
+    } rows[] = {
         {"{}", NOW, "1700086400"},
         {R"({"deadline":3600})", NOW, "1700003600"},
         {R"({"deadline":-1})", NOW, "1699999999"},
         {R"({"deadline":0})", NOW, "1700000000"},
         {R"({"deadline":null})", NOW, "1700000000"},
         {R"({"deadline":true})", NOW, "1700000001"},
-        {R"({"deadline":false})", NOW, "1700000000"},
         {R"({"deadline":1.9})", NOW, "1700000001"},
         {R"({"deadline":-1.9})", NOW, "1699999999"},
         {R"({"deadline":2147483647})", NOW, "3847483647"},
@@ -163,130 +135,94 @@ TEST_F(Creation, DeadlineCountsFromCreationIn64Bits)
         {"{}", INT_MAX, "2147570047"},
         {"{}", static_cast<time_t>(INT_MAX) + 1, "2147570048"},
     };
-    for (const Case& testCase : cases) {
-        SCOPED_TRACE(testing::Message() << testCase.szOption << " at " << testCase.now);
+    for (const auto& row : rows) {
+        SCOPED_TRACE(::testing::Message() << row.szOption << " at " << row.now);
         query("DELETE FROM token");
-        seam().clock = testCase.now;
-        m_jOption = json(testCase.szOption);
+        seam().clock = row.now;
+        m_jOption = json(row.szOption);
         EXPECT_EQ(0, createByTid());
-        EXPECT_EQ((Texts{std::string("integer|") + testCase.szDeadline + "|" + std::to_string(testCase.now)}),
+        EXPECT_EQ((Texts{std::string("integer|") + row.szDeadline + "|" + std::to_string(row.now)}),
                   query("SELECT typeof(deadline),deadline,create_time FROM token"));
     }
-    EXPECT_EQ(Texts{}, takeLines());
 }
 
-TEST_F(Creation, DeadlineThatIsNo32BitNumberThrowsAndLeavesNothing)
+TEST_F(Creation, ThrowsAtNumbersThatDoNotFitAndLeavesNothing)
 {
-    for (const char* szDeadline : {"2147483648", "-2147483649", "4294967295", "1e300", "18446744073709551615",
-                                   R"("3600")", R"("")", "[]", "{}"}) {
-        SCOPED_TRACE(szDeadline);
-        m_jOption["deadline"] = json(szDeadline);
-        const Json::Value jOption = m_jOption;
+    for (const char* szOption :
+         {R"({"deadline":2147483648})", R"({"deadline":-2147483649})", R"({"deadline":4294967295})",
+          R"({"deadline":1e300})", R"({"deadline":18446744073709551615})", R"({"deadline":"3600"})",
+          R"({"deadline":""})", R"({"deadline":[]})", R"({"deadline":{}})",
+          R"({"count":18446744073709551615})"}) {
+        SCOPED_TRACE(szOption);
+        m_jOption = json(szOption);
         EXPECT_THROW(createByTid(), Json::LogicError);
         EXPECT_THROW(createGenerated(), Json::LogicError);
-        EXPECT_EQ(jOption, m_jOption);
+        EXPECT_EQ(json(szOption), m_jOption);
     }
     // Without an option, a clock beyond 32 bits is fine; added to one, it is not.
     seam().clock = static_cast<time_t>(INT_MAX) + 1;
-    m_jOption["deadline"] = 0;
+    m_jOption = json(R"({"deadline":0})");
     EXPECT_THROW(createByTid(), Json::LogicError);
-
     EXPECT_EQ("before", m_strOut);
-    EXPECT_EQ(Texts{}, takeLines());
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
-}
-
-TEST_F(Creation, CountBeyond64BitsThrowsAndLeavesNothing)
-{
-    m_jOption = json(R"({"count":18446744073709551615})");
-    EXPECT_THROW(createByTid(), Json::LogicError);
-    EXPECT_THROW(createGenerated(), Json::LogicError);
-    EXPECT_EQ("before", m_strOut);
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
-    m_jOption = json(R"({"count":9223372036854775807})");
-    EXPECT_EQ(0, createByTid());
-    EXPECT_EQ((Texts{"9223372036854775807"}), query("SELECT count FROM token"));
-}
-
-TEST_F(Creation, LooksAtUidFunctionAndIdBeforeTheOption)
-{
-    m_jOption = json("[]");
-    m_uid = UID_ERR;
-    m_strFunction = "";
-    m_strTid = "short";
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ((Texts{failed(SERVICE, "uid == UID_ERR"), summary()}), takeLines());
-    m_uid = 1026;
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ((Texts{failed(SERVICE, "strFunction.empty()"), summary()}), takeLines());
-    m_strFunction = "VPN";
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ((Texts{failed(SERVICE, "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN"), summary()}), takeLines());
-}
-
-TEST_F(Creation, RefusesOptionThatIsNoObject)
-{
-    for (const char* szOption : {"[]", "[{}]", R"("")", R"("text")", "5", "-5", "1.5", "true", "false"}) {
-        SCOPED_TRACE(szOption);
-        m_jOption = json(szOption);
-        EXPECT_EQ(-1, createByTid());
-        EXPECT_EQ((Texts{failed(SERVICE, OPTION_TYPE_FAILED), summary()}), takeLines());
-        EXPECT_EQ(-1, createGenerated());
-        takeLines(); // they hold a random id
-    }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
+    EXPECT_EQ(Texts{}, seam().statements());
 }
 
 TEST_F(Creation, RefusesArgumentsInOrder)
 {
-    struct Case {
+    const std::string strOption =
+        "jTokenOption.type() != Json::objectValue && jTokenOption.type() != Json::nullValue";
+    const struct {
         unsigned int uid;
         const char* szFunction;
         std::string strTid;
-        const char* szCondition;
+        const char* szOption;
+        std::string strCondition;
         const char* szPrintedUid;
+    } rows[] = {
+        {4294967295U, "", "", "[]", "uid == UID_ERR", "-1"},
+        {4294967295U, "VPN", tid(), "{}", "uid == UID_ERR", "-1"},
+        {2147483648U, "", "short", "[]", "strFunction.empty()", "-2147483648"},
+        {1026, "", tid(), "{}", "strFunction.empty()", "1026"},
+        {1026, "VPN", std::string(126, 'x'), "{}", SHORT_TID, "1026"},
+        {4294967294U, "VPN", "", "[]", SHORT_TID, "-2"},
+        {0, "VPN", tid(), "[]", strOption, "0"},
+        {0, "VPN", tid(), "[{}]", strOption, "0"},
+        {0, "VPN", tid(), R"("")", strOption, "0"},
+        {0, "VPN", tid(), "5", strOption, "0"},
+        {0, "VPN", tid(), "1.5", strOption, "0"},
+        {0, "VPN", tid(), "false", strOption, "0"},
     };
-    const char* szShort = "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN";
-    for (const Case& testCase : std::vector<Case>{
-             {4294967295U, "VPN", tid(), "uid == UID_ERR", "-1"},
-             {1026, "", tid(), "strFunction.empty()", "1026"},
-             {1026, "VPN", std::string(126, 'x'), szShort, "1026"},
-             {4294967294U, "VPN", "", szShort, "-2"},
-             {4294967295U, "", "", "uid == UID_ERR", "-1"},
-             {2147483648U, "", "", "strFunction.empty()", "-2147483648"},
-         }) {
-        SCOPED_TRACE(testCase.szCondition);
-        m_uid = testCase.uid;
-        m_strFunction = testCase.szFunction;
-        m_strTid = testCase.strTid;
-        m_jOption = json(R"({"deadline":60})");
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.strCondition + row.szOption);
+        m_uid = row.uid;
+        m_strFunction = row.szFunction;
+        m_strTid = row.strTid;
+        m_jOption = json(row.szOption);
+        errno = EACCES;
         EXPECT_EQ(-1, createByTid());
-        EXPECT_EQ((Texts{failed(SERVICE, testCase.szCondition),
-                         ordinary(SERVICE, "tokenCreate failed, tid=" + testCase.strTid +
-                                               ", uid=" + testCase.szPrintedUid + ", strFunction=" +
-                                               testCase.szFunction + R"(, jTokenOption={"deadline":60})")}),
-                  takeLines());
+        EXPECT_LINES(failed(SERVICE, row.strCondition, EACCES),
+                     ordinary(SERVICE, "tokenCreate failed, tid=" + row.strTid + ", uid=" + row.szPrintedUid +
+                                           ", strFunction=" + row.szFunction +
+                                           ", jTokenOption=" + row.szOption));
+        // No id is generated for a uid or a function that is refused.
+        EXPECT_EQ(row.strCondition == SHORT_TID && row.szOption[0] == '{' ? 0 : -1, createGenerated());
+        const bool blBeforeId =
+            row.strCondition == "uid == UID_ERR" || row.strCondition == "strFunction.empty()";
+        EXPECT_EQ(blBeforeId, seam().callsOf({"getrandom"}).empty());
+        const Texts lines = takeLines();
+        if (blBeforeId) {
+            EXPECT_EQ((Texts{failed(SERVICE, row.strCondition, EACCES)}), lines);
+        }
+        m_strOut = "before";
+        seam().calls.clear();
     }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
-}
-
-TEST_F(Creation, GeneratesNoIdForRefusedArguments)
-{
-    m_uid = UID_ERR;
-    m_strFunction = "";
-    EXPECT_EQ(-1, createGenerated());
-    EXPECT_EQ((Texts{failed(SERVICE, "uid == UID_ERR")}), takeLines());
-    m_uid = 0;
-    EXPECT_EQ(-1, createGenerated());
-    EXPECT_EQ((Texts{failed(SERVICE, "strFunction.empty()")}), takeLines());
-    EXPECT_EQ(Texts{}, seam().callsOf({"getrandom", "time", "sqlite3_exec"}));
 }
 
 TEST_F(Creation, AcceptsTheBoundsOfItsArguments)
 {
     for (const unsigned int uid : {0U, 1U, 2147483648U, 4294967294U}) {
         for (const size_t cchTid : {size_t{127}, size_t{128}, size_t{255}, size_t{100000}}) {
-            SCOPED_TRACE(testing::Message() << uid << " " << cchTid);
+            SCOPED_TRACE(::testing::Message() << uid << " " << cchTid);
             query("DELETE FROM token");
             m_uid = uid;
             m_strFunction = "x";
@@ -296,7 +232,10 @@ TEST_F(Creation, AcceptsTheBoundsOfItsArguments)
                       query("SELECT tid,uid,function FROM token"));
         }
     }
-    EXPECT_EQ(Texts{}, takeLines());
+    m_strTid = tid();
+    m_jOption = json(R"({"count":9223372036854775807})");
+    EXPECT_EQ(0, createByTid());
+    EXPECT_EQ("9223372036854775807", countOf(m_strTid));
 }
 
 TEST_F(Creation, RefusesMembersOfAWrongType)
@@ -307,88 +246,56 @@ TEST_F(Creation, RefusesMembersOfAWrongType)
         SCOPED_TRACE(szOption);
         m_jOption = json(szOption);
         EXPECT_EQ(-1, createByTid());
-        EXPECT_EQ((Texts{fail(UTIL, "type failed, jmList[i]=" + m_jOption.getMemberNames()[0] +
-                                        ", jTokenParam=" + text(record())),
-                         failed(SERVICE, "0 > checkJsonType(jParam)"), summary()}),
-                  takeLines());
+        EXPECT_LINES(fail(UTIL, "type failed, jmList[i]=" + m_jOption.getMemberNames()[0] +
+                                    ", jTokenParam=" + text(record())),
+                     failed(SERVICE, "0 > checkJsonType(jParam)"), summary());
     }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
+    EXPECT_EQ(Texts{}, seam().statements());
 }
 
-TEST_F(Creation, FailsWhenTheRecordCannotBeCompleted)
+TEST_F(Creation, RefusesAnIdThatExistsWithItsStepsInDebugMode)
 {
-    standIns().fillDefaultValue = [](Json::Value&, bool) { return -1; };
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ((Texts{failed(SERVICE, "0 > fillDefaultValue(jParam, false)"), summary()}), takeLines());
-}
-
-TEST_F(Creation, RefusesAnIdThatExists)
-{
+    const Texts begin = {ordinary(SERVICE, "create token ok, token=" + text(record())),
+                         ordinary(STORE, "tokenSave, blCreate=1, jParam=" + text(record())),
+                         ordinary(STORE, "run sql=" + saveSql("INSERT", record())),  // by tokenSave
+                         ordinary(STORE, "run sql=" + saveSql("INSERT", record()))}; // by runSqlEx
     EXPECT_EQ(0, createByTid());
-    m_jOption = json(R"({"extra":{"colour":"red"}})");
-    const Texts rows = query("SELECT * FROM token");
     EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ(rows, query("SELECT * FROM token"));
-    m_jOption = Json::Value();
-    takeLines();
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ(duplicateLines(), takeLines());
-    EXPECT_EQ((Texts{"1"}), query("SELECT count(*) FROM token"));
-}
-
-TEST_F(Creation, TracesItsStepsInDebugMode)
-{
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    const Texts begin = {
-        ordinary(SERVICE, "create token ok, token=" + text(record())),
-        ordinary(STORE, "tokenSave, blCreate=1, jParam=" + text(record())),
-        ordinary(STORE, "run sql=" + insertion()), // by tokenSave
-        ordinary(STORE, "run sql=" + insertion()), // by runSqlEx
-    };
-    EXPECT_EQ(0, createByTid());
-    EXPECT_EQ((begin + Texts{ordinary(STORE, "change rv=1, run sql=" + insertion())}), takeLines());
-
+    EXPECT_LINES(duplicateLines());
+    EXPECT_EQ((Texts{row(record())}), rows());
     // A creation that the store refuses was announced all the same.
+    VEMO_ACCESS_TOKEN::debugInfo(true);
     EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ(begin + duplicateLines(), takeLines());
-
-    m_uid = UID_ERR;
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ((Texts{failed(SERVICE, "uid == UID_ERR"), summary()}), takeLines());
+    EXPECT_LINES(begin + duplicateLines());
+    query("DELETE FROM token");
+    EXPECT_EQ(0, createByTid());
+    EXPECT_LINES(begin + Texts{ordinary(STORE, "change rv=1, run sql=" + saveSql("INSERT", record()))});
 }
 
 TEST_F(Creation, GeneratesAnId)
 {
     EXPECT_EQ(0, createGenerated());
+    EXPECT_LE(127u, m_strOut.size());
+    EXPECT_GE(255u, m_strOut.size());
+    EXPECT_EQ((Texts{m_strOut + "||1026|1700086400|1|1700000000|VPN|{}|{}"}), rows());
     const std::string strFirst = m_strOut;
-    EXPECT_LE(127u, strFirst.size());
-    EXPECT_GE(255u, strFirst.size());
-    EXPECT_EQ(std::string::npos,
-              strFirst.find_first_not_of("0123456789abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ"));
-    EXPECT_EQ((Texts{strFirst + "||1026|1700086400|1|1700000000|VPN|{}|{}"}), query("SELECT * FROM token"));
-    EXPECT_EQ(1u, seam().callsOf({"sqlite3_exec"}).size());
-
-    m_uid = 0;
     EXPECT_EQ(0, createGenerated());
     EXPECT_NE(strFirst, m_strOut);
-    EXPECT_EQ((Texts{"2"}), query("SELECT count(*) FROM token"));
-    EXPECT_EQ(Texts{}, takeLines());
+    EXPECT_EQ(2u, rows().size());
 }
 
 TEST_F(Creation, ReportsAFailedRandomSource)
 {
-    // The first draw is for the length, the second for the id.
-    for (int nDraw : {1, 2}) {
-        SCOPED_TRACE(nDraw);
+    for (const int nDraw : {1, 2}) { // the first is for the length, the second for the id
         seam().counts.clear();
         seam().fail("getrandom", EIO, nDraw, nDraw);
         EXPECT_EQ(-1, createGenerated());
-        EXPECT_EQ((Texts{failed(SERVICE, "0 > tokenGenerate(strTid)", EIO)}), takeLines());
+        EXPECT_LINES(failed(SERVICE, "0 > tokenGenerate(strTid)", EIO));
     }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
+    EXPECT_EQ(Texts{}, seam().statements());
 }
 
-TEST_F(Creation, DoesNotTryAnotherIdWhenTheGeneratedOneExists)
+TEST_F(Creation, TriesNoOtherIdWhenTheGeneratedOneExists)
 {
     seam().sqliteExec = [](sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument,
                            char** pszError) {
@@ -396,58 +303,23 @@ TEST_F(Creation, DoesNotTryAnotherIdWhenTheGeneratedOneExists)
         return Seam::exec(pDb, szSql, callback, pArgument, pszError);
     };
     EXPECT_EQ(-1, createGenerated());
-    const Texts tids = query("SELECT tid FROM token");
-    ASSERT_EQ(1u, tids.size());
-    m_strTid = tids[0];
-    EXPECT_EQ(duplicateLines() +
-                  Texts{failed(SERVICE, "0 > tokenCreateByTid(uid, strFunction, jTokenOption, strTid)")},
-              takeLines());
-    EXPECT_EQ(1u, seam().callsOf({"sqlite3_exec"}).size());
+    m_strTid = tids();
+    EXPECT_LINES(duplicateLines() +
+                 Texts{failed(SERVICE, "0 > tokenCreateByTid(uid, strFunction, jTokenOption, strTid)")});
+    EXPECT_EQ(1u, seam().statements().size());
 }
 
 TEST_F(Creation, ReportsFailureAfterWaitingForALockAlthoughTheTokenIsThere)
 {
-    const Texts lines = {fail(STORE, "sql error, sql=" + insertion(), EIO),
-                         failed(SERVICE, "0 > m_pDb->tokenCreate(jParam)", EIO), summary()};
     failStatements("INSERT", LOCKED);
     EXPECT_EQ(-1, createByTid());
-    EXPECT_EQ(lines, takeLines());
+    EXPECT_LINES(fail(STORE, "sql error, sql=" + saveSql("INSERT", record()), EIO),
+                 failed(SERVICE, CREATE_FAILED, EIO), summary());
+    EXPECT_EQ((Texts{row(record())}), rows());
     failStatements("INSERT", LOCKED);
     EXPECT_EQ(-1, createGenerated());
-    EXPECT_EQ((Texts{"2"}), query("SELECT count(*) FROM token"));
-    EXPECT_EQ((Texts{"usleep 10000", "usleep 10000"}), seam().callsOf({"usleep"}));
-}
-
-TEST_F(Creation, FailureLinesTellErrno)
-{
-    errno = EACCES;
-    m_strTid = "short";
-    EXPECT_EQ(-1, m_pApi->tokenCreateByTid(m_uid, m_strFunction, m_jOption, m_strTid));
-    EXPECT_EQ((Texts{failed(SERVICE, "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN", EACCES), summary()}),
-              takeLines(Destination::Stdout));
-}
-
-class CreationSystemLog : public Creation {
-protected:
-    CreationSystemLog() : Creation(Destination::Syslog) {}
-};
-
-TEST_F(CreationSystemLog, TellsErrnoInFrontOfEachLineWhenThereIsOne)
-{
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    seam().fail("seteuid", EPERM, 1, INT_MAX); // the store never gets as far as the database
-    m_pApi = std::make_unique<AccessTokenApi>();
-    EXPECT_EQ(inSystemLog({NOT_ROOT}, EPERM), takeLines(Destination::Syslog));
-
-    EXPECT_EQ(-1, createByTid());
-
-    const Texts steps = {ordinary(SERVICE, "create token ok, token=" + text(record())),
-                         ordinary(STORE, "tokenSave, blCreate=1, jParam=" + text(record())),
-                         ordinary(STORE, "run sql=" + insertion())};
-    const Texts failures = {failed(STORE, "0 > runSql()", EPERM),
-                            failed(SERVICE, "0 > m_pDb->tokenCreate(jParam)", EPERM), summary()};
-    EXPECT_EQ(steps + inSystemLog(NOT_OPENED + failures, EPERM), takeLines(Destination::Syslog));
-    EXPECT_EQ(Texts(9, "syslog 3"), seam().callsOf({"syslog"})); // LOG_ERR
+    EXPECT_EQ(4u, takeLines().size());
+    EXPECT_EQ(2u, rows().size());
 }
 
 } // namespace

@@ -3,17 +3,16 @@
 #include <functional>
 
 #include "AccessTokenUtil.h"
-#include "FourTokens.h"
-#include "StandIns.h"
 #include "Statements.h"
+#include "StoreTest.h"
 
 namespace {
 
-// What the store writes when SQLite refuses a deletion.
-Texts diskErrorLines(const std::string& strSql)
-{
-    return failureOf(strSql, DISK_ERROR.szError, EIO) + Texts{failed(STORE, "0 > (err = runSql())", EIO)};
-}
+typedef std::function<int(AccessTokenApi&)> Removal;
+
+const std::string STORE_FAILED = "0 > (err = m_pDb->tokenDelete(jParam))";
+const std::string ARRAY_FAILED = "0 > (err = tokenDeleteByArray(strVector, szName))";
+const std::string NO_STRING = "jType[szName][0].asString() != \"string\"";
 
 std::string arraySummary(const std::string& strName, const std::string& strList)
 {
@@ -25,29 +24,32 @@ std::string nameSummary(const std::string& strName, const std::string& strValue)
     return ordinary(SERVICE, "tokenDeleteByName failed, name=" + strName + ", strValue=" + strValue);
 }
 
-const char* const ALL_TIDS = "a a'b b c";
-
-typedef std::function<int(AccessTokenApi&)> Removal;
-
 Removal byValue(int (AccessTokenApi::*pRemove)(std::string&), std::string strValue)
 {
     return [=](AccessTokenApi& api) mutable { return (api.*pRemove)(strValue); };
 }
 
-const auto byTid = [](const char* szTid) { return byValue(&AccessTokenApi::tokenDeleteByTid, szTid); };
-const auto byBindSid = [](const char* szSid) {
+Removal byTid(const char* szTid)
+{
+    return byValue(&AccessTokenApi::tokenDeleteByTid, szTid);
+}
+
+Removal bySid(const char* szSid)
+{
     return byValue(&AccessTokenApi::tokenDeleteByBindSid, szSid);
-};
-const auto byFunction = [](const char* szTag) {
+}
+
+Removal byFunction(const char* szTag)
+{
     return byValue(&AccessTokenApi::tokenDeleteByFunction, szTag);
-};
+}
 
 Removal byName(std::string strValue, const char* szName)
 {
     return [=](AccessTokenApi& api) mutable { return api.tokenDeleteByName(strValue, szName); };
 }
 
-Removal byTidArray(Texts values)
+Removal byTids(Texts values)
 {
     return [=](AccessTokenApi& api) mutable { return api.tokenDeleteByTidArray(values); };
 }
@@ -57,263 +59,152 @@ Removal byArray(Texts values, const char* szName)
     return [=](AccessTokenApi& api) mutable { return api.tokenDeleteByArray(values, szName); };
 }
 
-struct DeletionCase {
-    const char* szName;
-    Removal remove;
-    const char* szCondition;
-    int nDeleted;
-    const char* szLeft;
+// Four tokens: a, b, a'b and c.
+class Deletion : public TableTest {
+protected:
+    void SetUp() override
+    {
+        TableTest::SetUp();
+        fill();
+    }
+
+    void fill() const
+    {
+        query("DELETE FROM token");
+        insert(R"({"tid":"a"})");
+        insert(R"({"tid":"b","function":"MAIL"})");
+        insert(R"({"tid":"a'b","bind_sid":""})");
+        insert(R"({"tid":"c","bind_sid":"S2","function":"O'Brien"})");
+    }
 };
 
-void PrintTo(const DeletionCase& deletion, std::ostream* pStream)
+TEST_F(Deletion, RunsOneStatementAndCounts)
 {
-    *pStream << deletion.szName;
-}
-
-const DeletionCase DELETIONS[] = {
-    {"Tid", byTid("a"), "tid in ('a' )", 1, "a'b b c"},
-    {"UnknownTid", byTid("zz"), "tid in ('zz' )", 0, ALL_TIDS},
-    {"TidOfOtherCase", byTid("A"), "tid in ('A' )", 0, ALL_TIDS},
-    {"TidThatIsSql", byTid("' OR '1'='1"), "tid in (''' OR ''1''=''1' )", 0, ALL_TIDS},
-    {"TidThatIsAPattern", byTid("%"), "tid in ('%' )", 0, ALL_TIDS},
-    {"BindSid", byBindSid("S1"), "bind_sid in ('S1' )", 2, "a'b c"},
-    {"Function", byFunction("VPN"), "function in ('VPN' )", 2, "b c"},
-    {"FunctionWithQuote", byFunction("O'Brien"), "function in ('O''Brien' )", 1, "a a'b b"},
-    {"NameTid", byName("a", "tid"), "tid in ('a' )", 1, "a'b b c"},
-    {"NameBindSid", byName("S2", "bind_sid"), "bind_sid in ('S2' )", 1, "a a'b b"},
-    {"NameFunction", byName("MAIL", "function"), "function in ('MAIL' )", 1, "a a'b c"},
-    {"TidArrayOfOne", byTidArray({"c"}), "tid in ('c' )", 1, "a a'b b"},
-    // No separator stands between the elements, so several values are one text.
-    {"TidArrayOfThree", byTidArray({"a", "b", "zz"}), "tid in ('a''b''zz' )", 0, ALL_TIDS},
-    {"TidArrayThatTogetherIsATid", byTidArray({"a", "b"}), "tid in ('a''b' )", 1, "a b c"},
-    {"TidArrayWithDuplicate", byTidArray({"a", "a"}), "tid in ('a''a' )", 0, ALL_TIDS},
-    // Only the list itself must not be empty: an empty element selects the unbound tokens.
-    {"ArrayOfEmptyText", byArray({""}, "bind_sid"), "bind_sid in ('' )", 1, "a b c"},
-    {"ArrayOfFunctions", byArray({"VPN"}, "function"), "function in ('VPN' )", 2, "b c"},
-};
-
-class Deletion : public FourTokens {};
-
-class DeletionBy : public FourTokens, public ::testing::WithParamInterface<DeletionCase> {};
-
-TEST_P(DeletionBy, RunsOneStatementAndCounts)
-{
-    EXPECT_EQ(GetParam().nDeleted, GetParam().remove(api()));
-
-    EXPECT_EQ((Texts{std::string("sqlite3_exec DELETE FROM token WHERE  (") + GetParam().szCondition + " );",
-                     "sqlite3_changes"}),
-              seam().callsOf(OPENING_CALLS));
-    EXPECT_EQ(GetParam().szLeft, tids());
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-INSTANTIATE_TEST_SUITE_P(Values, DeletionBy, ::testing::ValuesIn(DELETIONS),
-                         [](const auto& test) { return std::string(test.param.szName); });
-
-TEST_F(Deletion, OfAllEmptiesTheTable)
-{
-    EXPECT_EQ(4, api().tokenDeleteAll());
+    const char* const szAll = "a a'b b c";
+    const struct {
+        Removal remove;
+        const char* szCondition;
+        int nDeleted;
+        const char* szLeft;
+    } rows[] = {
+        {byTid("a"), "tid in ('a' )", 1, "a'b b c"},
+        {byTid("zz"), "tid in ('zz' )", 0, szAll},
+        {byTid("A"), "tid in ('A' )", 0, szAll},
+        {byTid("' OR '1'='1"), "tid in (''' OR ''1''=''1' )", 0, szAll},
+        {byTid("%"), "tid in ('%' )", 0, szAll},
+        {bySid("S1"), "bind_sid in ('S1' )", 2, "a'b c"},
+        {byFunction("VPN"), "function in ('VPN' )", 2, "b c"},
+        {byFunction("O'Brien"), "function in ('O''Brien' )", 1, "a a'b b"},
+        {byName("a", "tid"), "tid in ('a' )", 1, "a'b b c"},
+        {byName("S2", "bind_sid"), "bind_sid in ('S2' )", 1, "a a'b b"},
+        {byName("MAIL", "function"), "function in ('MAIL' )", 1, "a a'b c"},
+        {byTids({"c"}), "tid in ('c' )", 1, "a a'b b"},
+        // No separator stands between the elements, so several values are one text.
+        {byTids({"a", "b", "zz"}), "tid in ('a''b''zz' )", 0, szAll},
+        {byTids({"a", "b"}), "tid in ('a''b' )", 1, "a b c"},
+        // Only the list itself must not be empty: an empty element selects the unbound tokens.
+        {byArray({""}, "bind_sid"), "bind_sid in ('' )", 1, "a b c"},
+        {byArray({"VPN"}, "function"), "function in ('VPN' )", 2, "b c"},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.szCondition);
+        fill();
+        seam().calls.clear();
+        EXPECT_EQ(row.nDeleted, row.remove(api()));
+        EXPECT_EQ((Texts{std::string("sqlite3_exec DELETE FROM token WHERE  (") + row.szCondition + " );",
+                         CHANGES}),
+                  seam().callsOf(OPENING_CALLS));
+        EXPECT_EQ(row.szLeft, tids());
+    }
+    EXPECT_EQ(2, api().tokenDeleteAll());
     EXPECT_EQ(0, api().tokenDeleteAll());
-
-    EXPECT_EQ((Texts{"sqlite3_exec DELETE FROM token;", "sqlite3_exec DELETE FROM token;"}),
-              seam().callsOf({"sqlite3_exec"}));
-    EXPECT_EQ("NULL", tids());
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Deletion, TracesStatementAndNumberInDebugMode)
-{
-    const std::string strSql = deleteSql("bind_sid", "S1");
-    std::string strSid = "S1";
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-
-    EXPECT_EQ(2, api().tokenDeleteByBindSid(strSid));
-
-    EXPECT_EQ((Texts{ordinary(STORE, "run sql=" + strSql), ordinary(STORE, "change rv=2, run sql=" + strSql),
-                     ordinary(STORE, "delete token number=2")}),
-              takeLines());
+    EXPECT_EQ("DELETE FROM token;", seam().statements().back());
+    EXPECT_EQ("", tids());
 }
 
 // Whatever the table of types says now, decides.
 TEST_F(Deletion, FollowsTheTypeTable)
 {
     VEMO_ACCESS_TOKEN::tokenType()["uid"][0] = "string";
-
     EXPECT_EQ(4, byName("1000", "uid")(api()));
-
-    EXPECT_EQ("NULL", tids());
-    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(Deletion, RefusesListsValuesAndNames)
 {
-    const char* const szType = "jType[szName][0].asString() != \"string\"";
-    const char* const szField = "!jType.isMember(szName)";
-    const char* const szNoName = "!szName || !szName[0]";
+    const std::string strField = "!jType.isMember(szName)";
+    const std::string strNoName = "!szName || !szName[0]";
+    const std::string strEmpty = "strValue.empty()";
     const struct {
         Removal remove;
-        const char* szCondition;
+        std::string strCondition;
         std::string strSummary;
-    } refusals[] = {
-        {byTidArray({}), "0 >= strVector.size()", arraySummary("tid", "")},
+    } rows[] = {
+        {byTids({}), "0 >= strVector.size()", arraySummary("tid", "")},
         {byArray({}, nullptr), "0 >= strVector.size()", arraySummary("(null)", "")},
-        {byArray({"a", "b", "c"}, nullptr), szNoName, arraySummary("(null)", "a,b,c")},
-        {byArray({"a", "b", "c"}, ""), szNoName, arraySummary("", "a,b,c")},
-        {byArray({"a"}, "foo"), szField, arraySummary("foo", "a")},
-        {byArray({"a"}, "Tid"), szField, arraySummary("Tid", "a")},
-        {byArray({"a"}, "sort_by"), szField, arraySummary("sort_by", "a")},
-        {byArray({"1000", "1001"}, "uid"), szType, arraySummary("uid", "1000,1001")},
-        {byArray({"", "", ""}, "deadline"), szType, arraySummary("deadline", ",,")},
-        {byArray({""}, "count"), szType, arraySummary("count", "")},
-        {byArray({"a,b", "%s%n"}, "create_time"), szType, arraySummary("create_time", "a,b,%s%n")},
-        {byArray({"{}"}, "webapi_allow"), szType, arraySummary("webapi_allow", "{}")},
-        {byArray({"{}"}, "extra"), szType, arraySummary("extra", "{}")},
-        {byTid(""), "strValue.empty()", nameSummary("tid", "")},
-        {byBindSid(""), "strValue.empty()", nameSummary("bind_sid", "")},
-        {byFunction(""), "strValue.empty()", nameSummary("function", "")},
-        {byName("", nullptr), "strValue.empty()", nameSummary("(null)", "")},
-        {byName("", "foo"), "strValue.empty()", nameSummary("foo", "")},
-        {byName("a", nullptr), szNoName, nameSummary("(null)", "a")},
-        {byName("a", ""), szNoName, nameSummary("", "a")},
-        {byName("a", "foo"), szField, nameSummary("foo", "a")},
-        {byName("%s", "tid "), szField, nameSummary("tid ", "%s")}};
-    for (const auto& refusal : refusals) {
-        for (const int nErrno : {0, EACCES}) {
-            SCOPED_TRACE(refusal.strSummary);
-            errno = nErrno;
-
-            EXPECT_EQ(-1, refusal.remove(api()));
-
-            EXPECT_EQ((Texts{failed(SERVICE, refusal.szCondition, nErrno), refusal.strSummary}), takeLines());
-        }
+        {byArray({"a", "b", "c"}, nullptr), strNoName, arraySummary("(null)", "a,b,c")},
+        {byArray({"a", "b", "c"}, ""), strNoName, arraySummary("", "a,b,c")},
+        {byArray({"a"}, "foo"), strField, arraySummary("foo", "a")},
+        {byArray({"a"}, "Tid"), strField, arraySummary("Tid", "a")},
+        {byArray({"a"}, "sort_by"), strField, arraySummary("sort_by", "a")},
+        {byArray({"1000", "1001"}, "uid"), NO_STRING, arraySummary("uid", "1000,1001")},
+        {byArray({"", "", ""}, "deadline"), NO_STRING, arraySummary("deadline", ",,")},
+        {byArray({""}, "count"), NO_STRING, arraySummary("count", "")},
+        {byArray({"a,b", "%s%n"}, "create_time"), NO_STRING, arraySummary("create_time", "a,b,%s%n")},
+        {byArray({"{}"}, "webapi_allow"), NO_STRING, arraySummary("webapi_allow", "{}")},
+        {byArray({"{}"}, "extra"), NO_STRING, arraySummary("extra", "{}")},
+        {byTid(""), strEmpty, nameSummary("tid", "")},
+        {bySid(""), strEmpty, nameSummary("bind_sid", "")},
+        {byFunction(""), strEmpty, nameSummary("function", "")},
+        {byName("", nullptr), strEmpty, nameSummary("(null)", "")},
+        {byName("", "foo"), strEmpty, nameSummary("foo", "")},
+        {byName("a", nullptr), strNoName, nameSummary("(null)", "a")},
+        {byName("a", ""), strNoName, nameSummary("", "a")},
+        {byName("a", "foo"), strField, nameSummary("foo", "a")},
+        {byName("%s", "tid "), strField, nameSummary("tid ", "%s")},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.strSummary);
+        errno = EACCES;
+        EXPECT_EQ(-1, row.remove(api()));
+        EXPECT_LINES(failed(SERVICE, row.strCondition, EACCES), row.strSummary);
     }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
+    // tokenDeleteByName leaves the test of the type to tokenDeleteByArray, and both tell.
+    EXPECT_EQ(-1, byName("1000", "uid")(api()));
+    EXPECT_LINES(failed(SERVICE, NO_STRING, EACCES), arraySummary("uid", "1000"),
+                 failed(SERVICE, ARRAY_FAILED, EACCES), nameSummary("uid", "1000"));
+    EXPECT_EQ(Texts{}, seam().statements());
 }
 
-// tokenDeleteByName leaves the test of the type to tokenDeleteByArray, and both tell.
-TEST_F(Deletion, ByNameRefusesFieldsThatAreNoStrings)
+TEST_F(Deletion, TellsEachStepOfAFailure)
 {
-    for (const char* szName : {"uid", "deadline", "count", "create_time", "webapi_allow", "extra"}) {
-        SCOPED_TRACE(szName);
-
-        EXPECT_EQ(-1, byName("1000", szName)(api()));
-
-        EXPECT_EQ(
-            (Texts{failed(SERVICE, "jType[szName][0].asString() != \"string\""), arraySummary(szName, "1000"),
-                   failed(SERVICE, "0 > (err = tokenDeleteByArray(strVector, szName))"),
-                   nameSummary(szName, "1000")}),
-            takeLines());
-    }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
-}
-
-TEST_F(Deletion, TellsOfAListThatCannotBecomeAFilter)
-{
-    standIns().vectorParamToJson = [](Texts&, const char*, Json::Value&) { return -1; };
-
-    EXPECT_EQ(-1, byArray({"a", "b"}, "tid")(api()));
-
-    EXPECT_EQ((Texts{failed(SERVICE, "0 > VectorParamToJson(strVector, szName, jParam)"),
-                     arraySummary("tid", "a,b")}),
-              takeLines());
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
-}
-
-// Whatever may go wrong with the filter, a deletion by value never empties the table.
-TEST_F(Deletion, ByArrayNeverRunsWithoutACondition)
-{
-    standIns().vectorParamToJson = [](Texts&, const char*, Json::Value&) { return 0; };
-
-    EXPECT_EQ(-1, byArray({"a"}, "tid")(api()));
-
-    EXPECT_EQ((Texts{failed(STORE, "strSql.empty()"),
-                     failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))"), arraySummary("tid", "a")}),
-              takeLines());
-    EXPECT_EQ(ALL_TIDS, tids());
-}
-
-const std::string BY_TID = deleteSql("tid", "a");
-
-// The lines of tokenDeleteByName above those of the store.
-const Texts ABOVE_STORE = {
-    failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))", EIO), arraySummary("tid", "a"),
-    failed(SERVICE, "0 > (err = tokenDeleteByArray(strVector, szName))", EIO), nameSummary("tid", "a")};
-
-TEST_F(Deletion, TellsEachStepOfAStoreFailure)
-{
-    failStatements("DELETE", DISK_ERROR);
-
+    const auto refused = [](const std::string& strSql) {
+        return failureOf(strSql, DISK_ERROR.szError, EIO) + Texts{failed(STORE, "0 > (err = runSql())", EIO)};
+    };
+    const Texts above = {failed(SERVICE, STORE_FAILED, EIO), arraySummary("tid", "a"),
+                         failed(SERVICE, ARRAY_FAILED, EIO), nameSummary("tid", "a")};
+    failStatements("DELETE", DISK_ERROR, 3);
     EXPECT_EQ(-1, byTid("a")(api()));
-
-    EXPECT_EQ(diskErrorLines(BY_TID) + ABOVE_STORE, takeLines());
-    EXPECT_EQ(ALL_TIDS, tids());
-}
-
-// The statement took effect all the same.
-TEST_F(Deletion, ReportsFailureAfterWaitingForALock)
-{
+    EXPECT_LINES(refused(deleteSql("tid", "a")) + above);
+    EXPECT_EQ(-1, byTids({"a", "b", "c"})(api()));
+    EXPECT_LINES(refused(deleteSql("tid", "a''b''c")) +
+                 Texts{failed(SERVICE, STORE_FAILED, EIO), arraySummary("tid", "a,b,c")});
+    EXPECT_EQ(-1, api().tokenDeleteAll());
+    EXPECT_LINES(refused("DELETE FROM token;"));
+    EXPECT_EQ("a a'b b c", tids());
+    // A statement that had to wait took effect all the same.
     failStatements("DELETE", LOCKED);
-
     EXPECT_EQ(-1, byTid("a")(api()));
-
-    EXPECT_EQ(Texts{fail(STORE, "sql error, sql=" + BY_TID, EIO)} + ABOVE_STORE, takeLines());
+    EXPECT_LINES(Texts{fail(STORE, "sql error, sql=" + deleteSql("tid", "a"), EIO)} + above);
     EXPECT_EQ("a'b b c", tids());
 }
 
-TEST_F(Deletion, OfAListTellsItsValuesWhenTheStoreFails)
+TEST_F(Deletion, TracesStatementAndNumberInDebugMode)
 {
-    failStatements("DELETE", DISK_ERROR);
-
-    EXPECT_EQ(-1, byTidArray({"a", "b", "c"})(api()));
-
-    EXPECT_EQ(diskErrorLines(deleteSql("tid", "a''b''c")) +
-                  (Texts{failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))", EIO),
-                         arraySummary("tid", "a,b,c")}),
-              takeLines());
-}
-
-TEST_F(Deletion, OfAllHasOnlyTheStoresLines)
-{
-    failStatements("DELETE", DISK_ERROR);
-
-    EXPECT_EQ(-1, api().tokenDeleteAll());
-
-    EXPECT_EQ(diskErrorLines("DELETE FROM token;"), takeLines());
-    EXPECT_EQ(ALL_TIDS, tids());
-}
-
-TEST_F(Deletion, FailsWithoutAStore)
-{
-    seam().fail("operator new", 0, 2, 2); // the fixture's own service was the first
-    AccessTokenApi apiWithoutStore;
-    EXPECT_EQ((Texts{ordinary(SERVICE, "new AccessTokenDbApi failed")}), takeLines());
-
-    for (const DeletionCase& deletion : DELETIONS) {
-        SCOPED_TRACE(deletion.szName);
-        EXPECT_EQ(-1, deletion.remove(apiWithoutStore));
-    }
-    EXPECT_EQ(-1, apiWithoutStore.tokenDeleteAll());
-    EXPECT_EQ(-1, apiWithoutStore.cleanExpireToken(true));
-    EXPECT_EQ(-1, apiWithoutStore.cleanExpireToken(false));
-    EXPECT_EQ(ALL_TIDS, tids());
-}
-
-class DeletionToSystemLog : public FourTokens {
-protected:
-    DeletionToSystemLog() : FourTokens(Destination::Syslog) {}
-};
-
-TEST_F(DeletionToSystemLog, TellsErrnoInFrontOfEachLine)
-{
-    for (const int nErrno : {0, EACCES}) {
-        errno = nErrno;
-
-        EXPECT_EQ(-1, byTid("")(api()));
-
-        EXPECT_EQ(inSystemLog({failed(SERVICE, "strValue.empty()", nErrno), nameSummary("tid", "")}, nErrno),
-                  takeLines(Destination::Syslog));
-    }
-    EXPECT_EQ((Texts{"syslog 3", "syslog 3", "syslog 3", "syslog 3"}), seam().callsOf({"syslog"}));
+    const std::string strSql = deleteSql("bind_sid", "S1");
+    VEMO_ACCESS_TOKEN::debugInfo(true);
+    EXPECT_EQ(2, bySid("S1")(api()));
+    EXPECT_LINES(ordinary(STORE, "run sql=" + strSql), ordinary(STORE, "change rv=2, run sql=" + strSql),
+                 ordinary(STORE, "delete token number=2"));
 }
 
 } // namespace

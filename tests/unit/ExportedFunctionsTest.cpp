@@ -1,44 +1,49 @@
-// The eight exported functions: what each runs, and what it returns.
+// The eight exported functions: what each runs and returns, until the end of a thread and of the process.
 
 #include <dlfcn.h>
+#include <malloc.h>
+#include <pthread.h>
+#include <unistd.h>
 
 #include <climits>
+#include <cstdlib>
+#include <cstring>
 #include <filesystem>
 #include <functional>
+#include <thread>
 
-#include "ExportedTest.h"
 #include "Statements.h"
+#include "StoreTest.h"
 #include "vemo-access-token.h"
 
 namespace {
 
 const Json::Value UNTOUCHED = "what the caller had";
 const std::string SELECT_T = selectSql("t");
-const std::string REPLACE_T = std::string("REPLACE INTO token (") + COLUMNS +
-                              ") VALUES ('t','S1',1000,1700000100,1,1700000000,'VPN','" + ALLOW + "','{}')";
+const std::string GRANT_REFUSED =
+    failed(WRAPPER, "0 > VemoAccessTokenGrantEx(strTid, szWebapiName, szWebapiMethod, jToken)");
+const std::string NOT_PERMITTED =
+    failed(SERVICE, "0 > (err = checkPermission(jToken, szWebapiName, szWebapiMethod))");
 
-std::string insertSql(const std::string& strTid)
+Json::Value created(const std::string& strTid)
 {
-    return std::string("INSERT INTO token (") + COLUMNS + ") VALUES ('" + strTid +
-           "','',1000,1700086400,1,1700000000,'VPN','{}','{}')";
+    Json::Value jToken =
+        json(R"({"bind_sid":"","uid":1000,"deadline":1700086400,"count":1,"create_time":1700000000,
+                                  "function":"VPN","webapi_allow":{},"extra":{}})");
+    jToken["tid"] = strTid;
+    return jToken;
 }
 
 // The functions with their arguments kept.
 typedef std::function<int()> Call;
 
-Call create(unsigned int uid, std::string strFunction, const char* szOption, std::string strTid)
+Call create(unsigned int uid, const char* szOption, std::string strTid = "")
 {
     return [=]() mutable {
         Json::Value jOption = json(szOption);
-        return VemoAccessTokenCreate(uid, strFunction, jOption, strTid);
-    };
-}
-
-Call createByTid(unsigned int uid, std::string strFunction, const char* szOption, std::string strTid)
-{
-    return [=]() mutable {
-        Json::Value jOption = json(szOption);
-        return VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid);
+        std::string strFunction = "VPN";
+        return strTid.empty() ? VemoAccessTokenCreate(uid, strFunction, jOption, strTid)
+                              : VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid);
     };
 }
 
@@ -70,160 +75,130 @@ Call deleteByBindSid(const char* szSid)
     return [=] { return VemoAccessTokenDeleteByBindSid(szSid); };
 }
 
-struct CallCase {
-    const char* szName;
-    Call call;
-    int nResult;
-    Texts statements; // after those of the purge
-    Texts lines;
-};
-
-void PrintTo(const CallCase& callCase, std::ostream* pStream)
-{
-    *pStream << callCase.szName;
-}
-
-const Texts SHORT_TID = {
-    failed(SERVICE, "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN"),
-    ordinary(SERVICE, "tokenCreate failed, tid=short, uid=1000, strFunction=VPN, jTokenOption=null")};
-const Texts NO_SID = {failed(WRAPPER, "!szSid || !szSid[0]")};
-
-Texts emptyValue(const std::string& strField)
-{
-    return {failed(SERVICE, "strValue.empty()"),
-            ordinary(SERVICE, "tokenDeleteByName failed, name=" + strField + ", strValue=")};
-}
-
-const CallCase PURGING_CALLS[] = {
-    {"CreateRefused", create(UID_ERR, "VPN", "null", ""), -1, {}, {failed(SERVICE, "uid == UID_ERR")}},
-    {"CreateByTid", createByTid(1000, "VPN", "null", tid("n")), 0, {insertSql(tid("n"))}, {}},
-    {"CreateByTidRefused", createByTid(1000, "VPN", "null", "short"), -1, {}, SHORT_TID},
-    {"GrantEx", grantEx("t", "Api", "get"), 0, {SELECT_T, REPLACE_T}, {}},
-    {"GrantExRefused", grantEx("t", "api", "get"), -1, {SELECT_T}, {NOT_PERMITTED}},
-    {"Grant", grant("t", "Api", "get"), 0, {SELECT_T, REPLACE_T}, {}},
-    {"GrantRefused", grant("t", "Api", "put"), -1, {SELECT_T}, {GRANT_REFUSED}},
-    {"DeleteByTid", deleteByTid("t"), 1, {deleteSql("tid", "t")}, {}},
-    {"DeleteByUnknownTid", deleteByTid("z"), 0, {deleteSql("tid", "z")}, {}},
-    {"DeleteByTidRefused", deleteByTid(""), -1, {}, emptyValue("tid")},
-    {"DeleteByFunction", deleteByFunction("MAIL"), 1, {deleteSql("function", "MAIL")}, {}},
-    {"DeleteByFunctionRefused", deleteByFunction(""), -1, {}, emptyValue("function")}};
-
-const CallCase BIND_SID_CALLS[] = {
-    // Two: the expired token is still there.
-    {"Sid", deleteByBindSid("S1"), 2, {deleteSql("bind_sid", "S1")}, {}},
-    {"UnknownSid", deleteByBindSid("S9"), 0, {deleteSql("bind_sid", "S9")}, {}},
-    {"NullSid", deleteByBindSid(nullptr), -1, {}, NO_SID},
-    {"EmptySid", deleteByBindSid(""), -1, {}, NO_SID}};
-
-// Every call opens the database, runs the statements and closes it; in this order.
+// Each call opens the database, runs the statements and closes it, in this order.
 void expectCalls(const Texts& statements)
 {
     Texts expected = {UID, RAISE, ACCESS, OPEN, BACK};
     for (const std::string& strStatement : statements) {
         expected.push_back("sqlite3_exec " + strStatement);
     }
-    expected.push_back("sqlite3_close");
-    EXPECT_EQ(expected, seam().callsOf({"geteuid", "seteuid", "access", "sqlite3_open", "sqlite3_exec",
-                                        "sqlite3_close"}));
+    EXPECT_EQ(expected + Texts{CLOSE}, seam().callsOf({"geteuid", "seteuid", "access", "sqlite3_open",
+                                                       "sqlite3_exec", "sqlite3_close"}));
     EXPECT_EQ(UID_CALLER, geteuid());
 }
 
-std::string caseName(const ::testing::TestParamInfo<CallCase>& test)
-{
-    return test.param.szName;
-}
-
-class PurgingFunction : public ExportedTest, public ::testing::WithParamInterface<CallCase> {
+// Three tokens, one of them expired, and a caller who is not root.
+class Exported : public StoreTest {
 protected:
-    Texts statements() const { return Texts{PURGE} + GetParam().statements; }
+    void SetUp() override
+    {
+        StoreTest::SetUp();
+        makeTable();
+        fill();
+        ASSERT_EQ(0, seteuid(UID_CALLER));
+    }
+
+    void fill() const
+    {
+        query("DELETE FROM token");
+        insert(R"({"count":2})");
+        insert(R"({"tid":"u","bind_sid":"S2","function":"MAIL"})");
+        insert(R"({"tid":"old","deadline":1699999999})");
+    }
 };
 
-TEST_P(PurgingFunction, PurgesThenOperates)
+TEST_F(Exported, PurgeThenOperateAndDoSoAfterAFailedPurge)
 {
-    EXPECT_EQ(GetParam().nResult, GetParam().call());
-
-    expectCalls(statements());
-    EXPECT_EQ(GetParam().lines, takeLines());
-    EXPECT_EQ(Texts{}, query("SELECT tid FROM token WHERE tid = 'old'"));
+    const auto emptyValue = [](const std::string& strField) {
+        return Texts{failed(SERVICE, "strValue.empty()"),
+                     ordinary(SERVICE, "tokenDeleteByName failed, name=" + strField + ", strValue=")};
+    };
+    const std::string strInsert = saveSql("INSERT", created(tid("n")));
+    const std::string strReplace = saveSql("REPLACE", token(R"({"count":1})"));
+    const Texts shortTid = {
+        failed(SERVICE, "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN"),
+        ordinary(SERVICE, "tokenCreate failed, tid=short, uid=1000, strFunction=VPN, jTokenOption=null")};
+    const struct {
+        const char* szName;
+        Call call;
+        int nResult;
+        Texts statements; // after those of the purge
+        Texts lines;
+    } rows[] = {
+        {"create refused", create(UID_ERR, "null"), -1, {}, {failed(SERVICE, "uid == UID_ERR")}},
+        {"create by tid", create(1000, "null", tid("n")), 0, {strInsert}, {}},
+        {"create by tid refused", create(1000, "null", "short"), -1, {}, shortTid},
+        {"grant ex", grantEx("t", "Api", "get"), 0, {SELECT_T, strReplace}, {}},
+        {"grant ex refused", grantEx("t", "api", "get"), -1, {SELECT_T}, {NOT_PERMITTED}},
+        {"grant", grant("t", "Api", "get"), 0, {SELECT_T, strReplace}, {}},
+        {"grant refused", grant("t", "Api", "put"), -1, {SELECT_T}, {GRANT_REFUSED}},
+        {"delete by tid", deleteByTid("t"), 1, {deleteSql("tid", "t")}, {}},
+        {"delete by unknown tid", deleteByTid("z"), 0, {deleteSql("tid", "z")}, {}},
+        {"delete by tid refused", deleteByTid(""), -1, {}, emptyValue("tid")},
+        {"delete by function", deleteByFunction("MAIL"), 1, {deleteSql("function", "MAIL")}, {}},
+        {"delete by function refused", deleteByFunction(""), -1, {}, emptyValue("function")},
+    };
+    for (const auto& row : rows) {
+        for (const bool blPurged : {true, false}) {
+            SCOPED_TRACE(row.szName);
+            fill();
+            reset();
+            failStatements(PURGE, {SQLITE_IOERR, "disk I/O error", 0}, blPurged ? 0 : 1);
+            EXPECT_EQ(row.nResult, row.call());
+            expectCalls(Texts{PURGE} + row.statements);
+            // The store tells of the statement; the failed purge itself is kept quiet.
+            EXPECT_LINES((blPurged ? Texts{} : failureOf(PURGE, "disk I/O error")) + row.lines);
+            EXPECT_EQ(blPurged ? "" : "3", countOf("old"));
+        }
+    }
 }
 
-// The store tells of the statement; the failed purge itself is kept quiet.
-TEST_P(PurgingFunction, OperatesAfterAFailedPurge)
+TEST_F(Exported, DeleteByBindSidDoesNotPurge)
 {
-    failStatements(PURGE, {SQLITE_IOERR, "disk I/O error", 0});
-
-    EXPECT_EQ(GetParam().nResult, GetParam().call());
-
-    expectCalls(statements());
-    EXPECT_EQ(failureOf(PURGE, "disk I/O error") + GetParam().lines, takeLines());
-    EXPECT_EQ((Texts{"old"}), query("SELECT tid FROM token WHERE tid = 'old'"));
+    const std::string strNoSid = failed(WRAPPER, "!szSid || !szSid[0]");
+    const struct {
+        const char* szSid;
+        int nResult;
+        Texts statements, lines;
+    } rows[] = {
+        {"S1", 2, {deleteSql("bind_sid", "S1")}, {}}, // two: the expired token is still there
+        {"S9", 0, {deleteSql("bind_sid", "S9")}, {}},
+        {nullptr, -1, {}, {strNoSid}},
+        {"", -1, {}, {strNoSid}},
+    };
+    for (const auto& row : rows) {
+        seam().calls.clear();
+        EXPECT_EQ(row.nResult, deleteByBindSid(row.szSid)());
+        expectCalls(row.statements);
+        EXPECT_LINES(row.lines);
+    }
 }
 
-INSTANTIATE_TEST_SUITE_P(Calls, PurgingFunction, ::testing::ValuesIn(PURGING_CALLS), caseName);
-
-class DeleteByBindSid : public ExportedTest, public ::testing::WithParamInterface<CallCase> {};
-
-TEST_P(DeleteByBindSid, DoesNotPurge)
+TEST_F(Exported, CreateMakesTheDatabaseOnFirstUseAndReturnsTheNewId)
 {
-    EXPECT_EQ(GetParam().nResult, GetParam().call());
-
-    expectCalls(GetParam().statements);
-    EXPECT_EQ(GetParam().lines, takeLines());
-}
-
-INSTANTIATE_TEST_SUITE_P(Calls, DeleteByBindSid, ::testing::ValuesIn(BIND_SID_CALLS), caseName);
-
-class Exported : public ExportedTest {};
-
-TEST_F(Exported, CreateReturnsTheNewId)
-{
+    std::filesystem::remove(path());
     unsigned int uid = 1000;
     std::string strFunction = "VPN";
     Json::Value jOption;
     std::string strTid = "overwritten";
-
     EXPECT_EQ(0, VemoAccessTokenCreate(uid, strFunction, jOption, strTid));
-
-    expectCalls({PURGE, insertSql(strTid)});
     EXPECT_LE(127u, strTid.size());
-    EXPECT_EQ((Texts{strTid}), query("SELECT tid FROM token WHERE tid NOT IN ('t','u')"));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Exported, CreateMakesTheDatabaseOnFirstUse)
-{
-    std::filesystem::remove(path());
-
-    EXPECT_EQ(0, createByTid(1000, "VPN", "null", tid())());
-
-    const Texts statements = seam().callsOf({"sqlite3_exec"});
-    ASSERT_EQ(3u, statements.size());
-    EXPECT_EQ(0u, statements[0].find("sqlite3_exec PRAGMA auto_vacuum = FULL; CREATE TABLE"));
-    EXPECT_EQ("sqlite3_exec " + PURGE, statements[1]);
-    EXPECT_EQ("sqlite3_exec " + insertSql(tid()), statements[2]);
-    EXPECT_EQ((Texts{tid()}), query("SELECT tid FROM token"));
+    EXPECT_EQ((Texts{SCHEMA, PURGE, saveSql("INSERT", created(strTid))}), seam().statements());
+    EXPECT_EQ((Texts{row(created(strTid))}), rows());
 }
 
 TEST_F(Exported, GenerateNeverTouchesTheDatabase)
 {
     std::string strTid;
-
     EXPECT_EQ(0, VemoAccessTokenGenerate(strTid));
-
-    EXPECT_EQ(seam().callsOf({"getrandom"}), seam().calls);
     EXPECT_LE(127u, strTid.size());
     EXPECT_GE(255u, strTid.size());
-}
-
-TEST_F(Exported, GeneratePassesTheFailureOn)
-{
+    EXPECT_EQ(seam().callsOf({"getrandom"}), seam().calls);
+    seam().counts.clear();
     seam().fail("getrandom", ENOSYS);
-    std::string strTid = "untouched";
-
-    EXPECT_EQ(-1, VemoAccessTokenGenerate(strTid));
-
-    EXPECT_EQ("untouched", strTid);
-    EXPECT_EQ((Texts{"getrandom"}), seam().calls);
+    std::string strUntouched = "untouched";
+    EXPECT_EQ(-1, VemoAccessTokenGenerate(strUntouched));
+    EXPECT_EQ("untouched", strUntouched);
 }
 
 TEST_F(Exported, GrantExHandsTheRecordBackOrLeavesItAlone)
@@ -231,43 +206,37 @@ TEST_F(Exported, GrantExHandsTheRecordBackOrLeavesItAlone)
     std::string strTid = "t";
     std::string strExpired = "old";
     Json::Value jToken = UNTOUCHED;
-
     EXPECT_EQ(-1, VemoAccessTokenGrantEx(strExpired, "Api", "get", jToken));
     EXPECT_EQ(UNTOUCHED, jToken);
-
     EXPECT_EQ(0, VemoAccessTokenGrantEx(strTid, "Api", "get", jToken));
-    EXPECT_EQ(json(R"({"bind_sid":"S1","count":1,"create_time":1700000000,"deadline":1700000100,"extra":{},)"
-                   R"("function":"VPN","tid":"t","uid":1000,"webapi_allow":)" +
-                   ALLOW + "}"),
-              jToken);
+    EXPECT_EQ(token(R"({"count":1})"), jToken);
 }
 
 TEST_F(Exported, LetExceptionsPassOnceTheDatabaseIsClosed)
 {
     const std::pair<Call, Texts> throwing[] = {
-        {create(1000, "VPN", R"({"deadline":"soon"})", ""), {PURGE}},
-        {createByTid(1000, "VPN", R"({"deadline":"soon"})", tid()), {PURGE}},
-        {createByTid(1000, "VPN", R"({"deadline":4294967296})", tid()), {PURGE}},
+        {create(1000, R"({"deadline":"soon"})"), {PURGE}},
+        {create(1000, R"({"deadline":"soon"})", tid()), {PURGE}},
+        {create(1000, R"({"deadline":4294967296})", tid()), {PURGE}},
         {grantEx("t", "Odd", "get"), {PURGE, SELECT_T}},
-        {grant("t", "Odd", "get"), {PURGE, SELECT_T}}};
+        {grant("t", "Odd", "get"), {PURGE, SELECT_T}},
+    };
     for (const auto& [call, statements] : throwing) {
         seam().calls.clear();
-
         EXPECT_THROW(call(), Json::LogicError);
-
         expectCalls(statements);
     }
-    EXPECT_EQ("2", countOf("t"));
-    EXPECT_EQ(Texts{}, takeLines());
+    EXPECT_EQ("2", countOf());
 }
 
 TEST_F(Exported, FailWhenTheDatabaseCannotBeOpened)
 {
     seam().fail("seteuid", EPERM, 1, INT_MAX);
-    for (const Call& call : {create(1000, "VPN", "null", ""), createByTid(1000, "VPN", "null", tid()),
-                             grantEx("t", "Api", "get"), grant("t", "Api", "get"), deleteByTid("t"),
-                             deleteByBindSid("S1"), deleteByFunction("VPN")}) {
+    for (const Call& call :
+         {create(1000, "null"), create(1000, "null", tid()), grantEx("t", "Api", "get"),
+          grant("t", "Api", "get"), deleteByTid("t"), deleteByBindSid("S1"), deleteByFunction("VPN")}) {
         EXPECT_EQ(-1, call());
+        EXPECT_EQ(NOT_ROOT, takeLines().front());
     }
     EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_open", "sqlite3_exec", "sqlite3_close"}));
 }
@@ -276,33 +245,237 @@ TEST_F(Exported, HavePlainNames)
 {
     void* const pLibrary = dlopen("libvemoaccesstoken.so.6", RTLD_NOW | RTLD_NOLOAD);
     ASSERT_NE(nullptr, pLibrary) << dlerror();
-    for (const char* szName :
-         {"VemoAccessTokenCreate", "VemoAccessTokenCreateByTid", "VemoAccessTokenGenerate",
-          "VemoAccessTokenGrant", "VemoAccessTokenGrantEx", "VemoAccessTokenDeleteByTid",
-          "VemoAccessTokenDeleteByBindSid", "VemoAccessTokenDeleteByFunction"}) {
-        void* const pFunction = dlsym(pLibrary, szName);
-        EXPECT_NE(nullptr, pFunction) << szName;
-    }
     typedef int Generate(std::string&);
     std::string strTid;
     EXPECT_EQ(0, reinterpret_cast<Generate*>(dlsym(pLibrary, "VemoAccessTokenGenerate"))(strTid));
     dlclose(pLibrary);
 }
 
-class ExportedToSystemLog : public ExportedTest {
+// The grant that tells the name of the token's user
+
+class GrantWithName : public Exported {
 protected:
-    ExportedToSystemLog() : ExportedTest(Destination::Syslog) {}
+    void SetUp() override
+    {
+        Exported::SetUp();
+        setUser("alice");
+        memset(m_szUser, '#', sizeof(m_szUser) - 1);
+    }
+
+    // The user database: one user, of any uid.
+    static void setUser(const std::string& strName)
+    {
+        seam().getUser = [strName](uid_t, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+                                   struct passwd** ppEntry) {
+            *ppEntry = nullptr;
+            if (cbBuffer <= strName.size()) {
+                return ERANGE;
+            }
+            *pEntry = {};
+            pEntry->pw_name = strcpy(szBuffer, strName.c_str());
+            *ppEntry = pEntry;
+            return 0;
+        };
+    }
+
+    int grant(std::string strTid = "t", const char* szApi = "Api", const char* szMethod = "get",
+              size_t cbUser = sizeof(m_szUser))
+    {
+        return VemoAccessTokenGrant(strTid, szApi, szMethod, m_szUser, cbUser);
+    }
+
+    char m_szUser[17] = "";
+    const std::string m_strUntouched = std::string(16, '#');
 };
 
-TEST_F(ExportedToSystemLog, TellErrnoInFrontOfEachLine)
+TEST_F(GrantWithName, LooksTheUserUpAfterTheDatabaseIsClosed)
 {
-    seam().fail("seteuid", EPERM);
+    EXPECT_EQ(0, grant());
+    EXPECT_STREQ("alice", m_szUser);
+    EXPECT_EQ((Texts{CLOSE, "getpwuid_r 1000"}), seam().callsOf({CLOSE, "getpwuid_r"}));
+    EXPECT_EQ("1", countOf());
+}
 
-    EXPECT_EQ(-1, VemoAccessTokenDeleteByBindSid(nullptr));
+TEST_F(GrantWithName, NarrowsTheUid)
+{
+    const std::pair<const char*, const char*> uids[] = {{"4294968296", "1000"},
+                                                        {"-1", "4294967295"},
+                                                        {"4294967295", "4294967295"},
+                                                        {"-9223372036854775808", "0"}};
+    for (const auto& [szStored, szLookedUp] : uids) {
+        query(std::string("UPDATE token SET count = -1, uid = ") + szStored);
+        seam().calls.clear();
+        EXPECT_EQ(0, grant());
+        EXPECT_EQ((Texts{std::string("getpwuid_r ") + szLookedUp}), seam().callsOf({"getpwuid_r"}));
+    }
+    seam().getUser = nullptr; // the real one
+    EXPECT_EQ(0, grant());
+    EXPECT_STREQ("root", m_szUser);
+}
 
-    EXPECT_EQ(inSystemLog({NOT_ROOT, failed(WRAPPER, "!szSid || !szSid[0]", EPERM)}, EPERM),
-              takeLines(Destination::Syslog));
-    EXPECT_EQ((Texts{"syslog 3", "syslog 3"}), seam().callsOf({"syslog"}));
+TEST_F(GrantWithName, LooksNobodyUpWithoutABuffer)
+{
+    std::string strTid = "t";
+    EXPECT_EQ(0, VemoAccessTokenGrant(strTid, "Api", "get", nullptr, sizeof(m_szUser)));
+    EXPECT_EQ("1", countOf());
+    EXPECT_EQ(0, grant("t", "Api", "get", 0));
+    EXPECT_EQ("", countOf());
+    EXPECT_EQ(m_strUntouched, m_szUser);
+    EXPECT_EQ(Texts{}, seam().callsOf({"getpwuid_r"}));
+}
+
+TEST_F(GrantWithName, WritesWhatFits)
+{
+    const size_t cbHuge = static_cast<size_t>(UINT_MAX) + 1;
+    const struct {
+        const char* szName;
+        size_t cbUser;
+        int nResult;
+        const char* szWritten;
+    } rows[] = {
+        {"alice", 6, 0, "alice"},
+        {"alice", 5, -1, "alic"},
+        {"alice", 2, -1, "a"},
+        {"alice", 1, -1, ""},
+        {"alice", 17, 0, "alice"},
+        {"", 1, 0, ""},
+        {"%s%n%d", 17, 0, "%s%n%d"},
+        // The size counts as an int, whatever was written by then.
+        {"alice", static_cast<size_t>(INT_MAX), 0, "alice"},
+        {"alice", static_cast<size_t>(INT_MAX) + 1, -1, "alice"},
+        {"alice", cbHuge + 5, -1, "alice"},
+        {"alice", cbHuge + 6, 0, "alice"},
+    };
+    query("UPDATE token SET count = -1");
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.cbUser);
+        setUser(row.szName);
+        memset(m_szUser, '#', 16);
+        errno = 0;
+        EXPECT_EQ(row.nResult, grant("t", "Api", "get", row.cbUser));
+        EXPECT_STREQ(row.szWritten, m_szUser);
+        EXPECT_EQ('#', m_szUser[strlen(row.szWritten) + 1]);
+        const std::string strLine =
+            failed(WRAPPER, "(int)cbUser <= snprintf(szUser,cbUser, \"%s\", pUser->szName)");
+        EXPECT_LINES(0 == row.nResult ? Texts{} : Texts{strLine});
+    }
+}
+
+TEST_F(GrantWithName, LeavesTheNameAloneWhenRefused)
+{
+    const struct {
+        const char *szTid, *szApi, *szMethod;
+        Texts lines;
+    } rows[] = {
+        {"", "Api", "get", {failed(SERVICE, "strTid.empty()")}},
+        {"t", nullptr, "get", {failed(SERVICE, "!szWebapiName || !szWebapiName[0]")}},
+        {"unknown", "Api", "get", {}},
+        {"old", "Api", "get", {}},
+        {"t", "api", "get", {NOT_PERMITTED}},
+        {"t", "Api", "put", {}},
+    };
+    for (const auto& row : rows) {
+        EXPECT_EQ(-1, grant(row.szTid, row.szApi, row.szMethod));
+        EXPECT_LINES(row.lines + Texts{GRANT_REFUSED});
+        EXPECT_EQ(m_strUntouched, m_szUser);
+    }
+    EXPECT_EQ("2", countOf());
+    EXPECT_EQ(Texts{}, seam().callsOf({"getpwuid_r"}));
+}
+
+// The use is spent by then, and nothing gives it back.
+TEST_F(GrantWithName, FailsForUsersThatCannotBeFound)
+{
+    // What getpwuid_r returns, and the errno that is logged; -1: there is no memory.
+    const std::pair<int, int> answers[] = {{0, ENOENT}, {ESRCH, ESRCH}, {EIO, EIO}, {-1, ENOMEM}};
+    for (const auto& [nResult, nErrno] : answers) {
+        SCOPED_TRACE(nResult);
+        query("UPDATE token SET count = 2");
+        seam().getUser = [n = nResult](uid_t, struct passwd*, char*, size_t, struct passwd** ppEntry) {
+            *ppEntry = nullptr;
+            return n;
+        };
+        if (0 > nResult) {
+            seam().counts.clear();
+            seam().fail("operator new[]", ENOMEM);
+        }
+        EXPECT_EQ(-1, grant());
+        EXPECT_LINES(failed(WRAPPER, "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)", nErrno));
+        EXPECT_EQ(m_strUntouched, m_szUser);
+        EXPECT_EQ("1", countOf());
+    }
+}
+
+// Whether the name fits or not. (Under a sanitizer, which has an allocator of its own, its own report
+// at exit tells.)
+TEST_F(GrantWithName, FreesTheUser)
+{
+    const size_t cbName = 50000;
+    setUser(std::string(cbName, 'x'));
+    query("UPDATE token SET count = -1");
+    std::string strTid = "t";
+    std::vector<char> user(cbName + 1);
+    const auto grantTwice = [&] {
+        seam().calls.clear(); // whose memory would count
+        seam().lines.clear();
+        EXPECT_EQ(-1, VemoAccessTokenGrant(strTid, "Api", "get", user.data(), cbName));
+        EXPECT_EQ(0, VemoAccessTokenGrant(strTid, "Api", "get", user.data(), cbName + 1));
+    };
+    grantTwice();
+    const size_t cbBefore = mallinfo2().uordblks;
+    for (int i = 0; i < 10; ++i) {
+        grantTwice();
+    }
+    EXPECT_GT(cbBefore + cbName, mallinfo2().uordblks);
+    seam().lines.clear();
+}
+
+// The end of a thread and of the process, and a thread that can keep nothing for the library
+
+bool isGranted()
+{
+    std::string strTid = "t";
+    Json::Value jToken;
+    return 0 == VemoAccessTokenGrantEx(strTid, "Api", nullptr, jToken) &&
+           token()["webapi_allow"] == jToken["webapi_allow"];
+}
+
+TEST_F(Exported, GrantInHandlersAtTheEndOfTheProcess)
+{
+    EXPECT_EXIT(
+        {
+            isGranted();
+            atexit([] { _exit(isGranted() ? 0 : 1); });
+            exit(2);
+        },
+        ::testing::ExitedWithCode(0), "");
+}
+
+// Grants when it is destroyed.
+struct LastGrant {
+    bool* pGranted = nullptr;
+    ~LastGrant() { *pGranted = isGranted(); }
+};
+
+TEST_F(Exported, GrantAtTheEndOfAThread)
+{
+    bool blGranted = false;
+    std::thread([&] {
+        // Made ahead of what the library keeps for the thread, so destroyed after it.
+        static thread_local LastGrant lastGrant;
+        lastGrant.pGranted = &blGranted;
+        isGranted();
+    }).join();
+    EXPECT_TRUE(blGranted);
+}
+
+// The library keeps something for each thread under a key, of which a process has so many.
+TEST_F(Exported, GrantThoughTheProcessHasNoKeyLeft)
+{
+    pthread_key_t key;
+    while (0 == pthread_key_create(&key, nullptr)) {
+    }
+    EXPECT_TRUE(isGranted());
 }
 
 } // namespace

@@ -1,6 +1,9 @@
-// Filters as SQL conditions.
+// Filters as SQL: conditions, order and paging.
 
-#include "FilterTest.h"
+#include <limits>
+
+#include "AccessTokenUtil.h"
+#include "StoreTest.h"
 
 using VEMO_ACCESS_TOKEN::tokenType;
 
@@ -13,12 +16,52 @@ const std::string LIST_JSON_FAILED = "NULL == (szSql = sqlite3_mprintf(\"%q\", j
 const std::string MATCH_FAILED = "0 > SqlMakeByMatchField(jmFieldName[i], jTmp, strSqlWhereOut)";
 const std::string LIST_FAILED = "0 > SqlMakeByListField(jmFieldName[i].c_str(), jTmp, strSqlWhereOut)";
 
-class Filter : public FilterTest {};
-class FilterWhere : public FilterTest {};
-class FilterMatch : public FilterTest {};
-class FilterList : public FilterTest {};
+// The builders append their text to m_strOut, and change nothing else.
+class Filter : public SeamTest {
+protected:
+    int where(const std::string& strFilter, bool bAnd = true)
+    {
+        return builds(json(strFilter),
+                      [&](Json::Value& j) { return m_db.SqlWhereFromJson(j, m_strOut, bAnd); });
+    }
+    int match(std::string strName, const Json::Value& jParam)
+    {
+        return builds(jParam, [&](Json::Value& j) { return m_db.SqlMakeByMatchField(strName, j, m_strOut); });
+    }
+    int list(const char* szField, const Json::Value& jList)
+    {
+        return builds(jList, [&](Json::Value& j) { return m_db.SqlMakeByListField(szField, j, m_strOut); });
+    }
+    int condition(const Json::Value& jFilter)
+    {
+        return builds(jFilter, [&](Json::Value& j) { return m_db.SqlFilterConditionFromJson(j, m_strOut); });
+    }
 
-TEST_F(FilterWhere, MakesOneConditionOfTheFields)
+    // Lets the text for SQL fail: the nCall-th from now on.
+    static void failText(int nCall = 1)
+    {
+        seam().counts.clear();
+        seam().fail("sqlite3_mprintf", ENOMEM, nCall, nCall);
+    }
+
+    AccessTokenDbApi m_db;
+    std::string m_strOut = "held";
+
+private:
+    template <typename Builder>
+    int builds(const Json::Value& jInput, Builder builder)
+    {
+        const Json::Value jTypes = tokenType();
+        Json::Value jCopy = jInput;
+        const int nResult = builder(jCopy);
+        EXPECT_EQ(jInput, jCopy);
+        EXPECT_EQ(jTypes, tokenType());
+        EXPECT_EQ("", m_db.m_strSql);
+        return nResult;
+    }
+};
+
+TEST_F(Filter, MakesOneConditionOfTheFields)
 {
     const struct {
         const char* szFilter;
@@ -33,97 +76,70 @@ TEST_F(FilterWhere, MakesOneConditionOfTheFields)
         {R"({"tid":["Ab12"]})", true, " (tid in ('Ab12' ) )", 0},
         {R"({"tid":["a","b"],"count":0})", true, " (count=0 and tid in ('a''b' ) )", 0},
         {R"({"uid":[1,2]})", true, " (uid in (12 ) )", 0},
-        {R"({"uid":[]})", true, " ( )", 0},
-        {R"({"sort_by":"uid","limit":5})", true, "", 1},
-        // Nothing but what names no field.
-        {"{}", true, "", 1},
-        {"{}", false, "", 1},
-        {R"({"sort_by":"uid","sort_direction":"desc","limit":1,"offset":2})", true, "", 1},
-        {R"({"foo":{"a":1},"":[1],"Tid":"x","tid ":"x","tid\u0000":"x","TID":null})", true, "", 1},
-        // Such names beside fields, of whatever type their values are.
-        {R"({"foo":{},"uid":1,"limit":{},"zzz":[[]]})", true, " (uid=1 )", 0},
-        // An empty list leaves the joining words.
-        {R"({"count":1,"uid":[]})", true, " (count=1 and  )", 0},
-        {R"({"count":[],"uid":1})", true, " ( and uid=1 )", 0},
-        {R"({"count":[],"deadline":[],"uid":[]})", false, " ( or  or  )", 0},
-        {R"({"bind_sid":"s","tid":[],"uid":1})", true, " (bind_sid='s' and  and uid=1 )", 0},
         {R"({"tid":null,"uid":null})", true, " (tid='' and uid= )", 0},
         {R"({"extra":[{"a":1}],"webapi_allow":"x"})", true,
          R"( (extra in ('{"a":1}' ) and webapi_allow='"x"' ))", 0},
         {R"({"tid":"x' OR '1'='1"})", true, " (tid='x'' OR ''1''=''1' )", 0},
         {R"({"uid":"7 or 1=1"})", true, " (uid=7 or 1=1 )", 0},
+        // Nothing but what names no field, and such names beside fields, of whatever type their values are.
+        {"{}", true, "", 1},
+        {"{}", false, "", 1},
+        {R"({"sort_by":"uid","sort_direction":"desc","limit":1,"offset":2})", true, "", 1},
+        {R"({"foo":{"a":1},"":[1],"Tid":"x","tid ":"x","tid\u0000":"x","TID":null})", true, "", 1},
+        {R"({"foo":{},"uid":1,"limit":{},"zzz":[[]]})", true, " (uid=1 )", 0},
+        // An empty list leaves the joining words.
+        {R"({"uid":[]})", true, " ( )", 0},
+        {R"({"count":1,"uid":[]})", true, " (count=1 and  )", 0},
+        {R"({"count":[],"uid":1})", true, " ( and uid=1 )", 0},
+        {R"({"count":[],"deadline":[],"uid":[]})", false, " ( or  or  )", 0},
+        {R"({"bind_sid":"s","tid":[],"uid":1})", true, " (bind_sid='s' and  and uid=1 )", 0},
     };
-
     for (const auto& row : rows) {
         for (const std::string strBefore : {"", "held (before"}) {
             SCOPED_TRACE(std::string(row.szFilter) + " after '" + strBefore + "'");
             m_strOut = strBefore;
             EXPECT_EQ(row.nResult, where(row.szFilter, row.bAnd));
             EXPECT_EQ(strBefore + row.szOutput, m_strOut);
-            EXPECT_EQ(Texts{}, takeLines());
         }
     }
 }
 
-TEST_F(FilterWhere, VisitsFieldsInAscendingOrderOfTheirBytes)
+TEST_F(Filter, VisitsFieldsInAscendingOrderOfTheirBytes)
 {
-    tokenType()["Z"].append("string");
-    tokenType()["tid2"].append("string");
-    tokenType()["\xc3\xa9"].append("string");
-
+    for (const char* szName : {"Z", "tid2", "\xc3\xa9"}) {
+        tokenType()[szName].append("string");
+    }
     EXPECT_EQ(0, where("{\"\xc3\xa9\":1,\"webapi_allow\":1,\"uid\":1,\"tid2\":1,\"tid\":1,\"function\":1,"
                        "\"extra\":1,\"deadline\":1,\"create_time\":1,\"count\":1,\"bind_sid\":1,\"Z\":1}"));
-
-    EXPECT_EQ(" (Z='1' and bind_sid='1' and count=1 and create_time=1 and deadline=1 and extra='1' and "
+    EXPECT_EQ("held (Z='1' and bind_sid='1' and count=1 and create_time=1 and deadline=1 and extra='1' and "
               "function='1' and tid='1' and tid2='1' and uid=1 and webapi_allow='1' and \xc3\xa9='1' )",
               m_strOut);
 }
 
-TEST_F(FilterWhere, RefusesWhatIsNoObject)
+TEST_F(Filter, RefusesWhatIsNoObject)
 {
     for (const char* szFilter : {"null", "[1,2]", "[]", R"("tid")", "5", "1.5", "true"}) {
         SCOPED_TRACE(szFilter);
-        m_strOut = "held";
         EXPECT_EQ(-1, where(szFilter));
-        EXPECT_EQ((Texts{failed(STORE, "jTokenParam.type() != Json::objectValue")}), takeLines());
         EXPECT_EQ(-1, condition(json(szFilter)));
-        EXPECT_EQ((Texts{failed(STORE, "jFilter.type() != Json::objectValue")}), takeLines());
-        EXPECT_EQ("held", m_strOut);
+        EXPECT_LINES(allFailed(
+            STORE, {"jTokenParam.type() != Json::objectValue", "jFilter.type() != Json::objectValue"}));
     }
+    EXPECT_EQ("held", m_strOut);
 }
 
-TEST_F(FilterWhere, RefusesObjectAsValueAndKeepsWhatItWrote)
+TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
 {
     const struct {
         const char* szFilter;
-        const char* szOutput;
-    } rows[] = {
-        {R"({"extra":{"a":1}})", " ("},
-        {R"({"webapi_allow":{}})", " ("},
-        {R"({"tid":{}})", " ("},
-        {R"({"count":1,"uid":{"a":1},"webapi_allow":{}})", " (count=1 and "},
-    };
-
-    for (const auto& row : rows) {
-        for (const int nErrno : {0, EIO}) {
-            SCOPED_TRACE(row.szFilter);
-            m_strOut = "held";
-            m_nErrno = nErrno;
-            EXPECT_EQ(-1, where(row.szFilter));
-            EXPECT_EQ(std::string("held") + row.szOutput, m_strOut);
-            EXPECT_EQ((Texts{fail(STORE, "err input type, jTokenParam=(null)", nErrno)}), takeLines());
-        }
-    }
-}
-
-TEST_F(FilterWhere, ReportsLackOfMemoryForEachKindOfText)
-{
-    const struct {
-        const char* szFilter;
-        int nCall; // the one that finds no memory
+        int nCall; // the text that finds no memory; 0: the filter is at fault
         const char* szKept;
         std::string strInner, strOuter;
     } rows[] = {
+        {R"({"extra":{"a":1}})", 0, "held (", "", ""},
+        {R"({"webapi_allow":{}})", 0, "held (", "", ""},
+        {R"({"tid":{}})", 0, "held (", "", ""},
+        {R"({"count":1,"uid":{"a":1},"webapi_allow":{}})", 0, "held (count=1 and ", "", ""},
         {R"({"tid":"a"})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED},
         {R"({"uid":7})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED},
         {R"({"extra":7})", 1, "held (", MATCH_JSON_FAILED, MATCH_FAILED},
@@ -134,115 +150,93 @@ TEST_F(FilterWhere, ReportsLackOfMemoryForEachKindOfText)
         {R"({"tid":["a","b"]})", 2, "held (", LIST_TEXT_FAILED, LIST_FAILED},
         {R"({"count":[1],"uid":[1,2,3]})", 4, "held (count in (1 ) and ", LIST_TEXT_FAILED, LIST_FAILED},
     };
-
     for (const auto& row : rows) {
         SCOPED_TRACE(row.szFilter);
         m_strOut = "held";
-        seam().counts.clear();
-        seam().fail("sqlite3_mprintf", ENOMEM, row.nCall, row.nCall);
+        errno = EIO;
+        failText(row.nCall);
         EXPECT_EQ(-1, where(row.szFilter));
         EXPECT_EQ(row.szKept, m_strOut);
-        EXPECT_EQ((Texts{failed(STORE, row.strInner, ENOMEM), failed(STORE, row.strOuter, ENOMEM)}),
-                  takeLines());
+        EXPECT_LINES(row.nCall ? allFailed(STORE, {row.strInner, row.strOuter}, ENOMEM)
+                               : Texts{fail(STORE, "err input type, jTokenParam=(null)", EIO)});
     }
 }
 
-// How a value is written, in a condition of its own and as an element of a list.
-enum Class { TEXT, JSON, NUMBER };
-
+// How a value is written in a condition of its own and as an element of a list: for a field of text, of JSON
+// and of a number.
 const struct {
     const char* szValue;
-    const char* rendered[3];
+    std::string strText, strJson, strNumber;
 } VALUES[] = {
-    {"null", {"''", "'null'", ""}},
-    {"true", {"'true'", "'true'", "true"}},
-    {"false", {"'false'", "'false'", "false"}},
-    {"0", {"'0'", "'0'", "0"}},
-    {"-7", {"'-7'", "'-7'", "-7"}},
-    {"-9223372036854775808", {"'-9223372036854775808'", "'-9223372036854775808'", "-9223372036854775808"}},
-    {"18446744073709551615", {"'18446744073709551615'", "'18446744073709551615'", "18446744073709551615"}},
-    {"1.5", {"'1.5'", "'1.5'", "1.5"}},
-    {"2.0", {"'2.0'", "'2.0'", "2.0"}},
-    {R"("")", {"''", R"('""')", ""}},
-    {R"("7")", {"'7'", R"('"7"')", "7"}},
-    {R"("it's")", {"'it''s'", R"('"it''s"')", "it''s"}},
-    {R"("''")", {"''''''", R"('"''''"')", "''''"}},
-    {R"("x'; DROP TABLE token; --")",
-     {"'x''; DROP TABLE token; --'", R"('"x''; DROP TABLE token; --"')", "x''; DROP TABLE token; --"}},
-    {R"("%s%n%q%Q")", {"'%s%n%q%Q'", R"('"%s%n%q%Q"')", "%s%n%q%Q"}},
-    {R"("a\"b\\c")", {R"('a"b\c')", R"('"a\"b\\c"')", R"(a"b\c)"}},
-    {R"("a\nb")", {"'a\nb'", R"('"a\nb"')", "a\nb"}},
-    {"\"gr\xc3\xbc\xc3\x9f\"", {"'gr\xc3\xbc\xc3\x9f'", "'\"gr\xc3\xbc\xc3\x9f\"'", "gr\xc3\xbc\xc3\x9f"}},
-    // Text ends at its first zero byte.
-    {R"("a\u0000b")", {"'a'", R"('"a\u0000b"')", "a"}},
+    {"null", "''", "'null'", ""},
+    {"true", "'true'", "'true'", "true"},
+    {"false", "'false'", "'false'", "false"},
+    {"0", "'0'", "'0'", "0"},
+    {"-7", "'-7'", "'-7'", "-7"},
+    {"-9223372036854775808", "'-9223372036854775808'", "'-9223372036854775808'", "-9223372036854775808"},
+    {"18446744073709551615", "'18446744073709551615'", "'18446744073709551615'", "18446744073709551615"},
+    {"1.5", "'1.5'", "'1.5'", "1.5"},
+    {"2.0", "'2.0'", "'2.0'", "2.0"},
+    {R"("")", "''", R"('""')", ""},
+    {R"("7")", "'7'", R"('"7"')", "7"},
+    {R"("it's")", "'it''s'", R"('"it''s"')", "it''s"},
+    {R"("''")", "''''''", R"('"''''"')", "''''"},
+    {R"("x'; DROP TABLE token; --")", "'x''; DROP TABLE token; --'", R"('"x''; DROP TABLE token; --"')",
+     "x''; DROP TABLE token; --"},
+    {R"("%s%n%q%Q")", "'%s%n%q%Q'", R"('"%s%n%q%Q"')", "%s%n%q%Q"},
+    {R"("a\"b\\c")", R"('a"b\c')", R"('"a\"b\\c"')", R"(a"b\c)"},
+    {R"("a\nb")", "'a\nb'", R"('"a\nb"')", "a\nb"},
+    {"\"gr\xc3\xbc\xc3\x9f\"", "'gr\xc3\xbc\xc3\x9f'", "'\"gr\xc3\xbc\xc3\x9f\"'", "gr\xc3\xbc\xc3\x9f"},
+    {R"("a\u0000b")", "'a'", R"('"a\u0000b"')", "a"}, // text ends at its first zero byte
 };
 
-const std::pair<const char*, Class> FIELDS[] = {
-    {"tid", TEXT},        {"bind_sid", TEXT},     {"uid", NUMBER},
-    {"deadline", NUMBER}, {"count", NUMBER},      {"create_time", NUMBER},
-    {"function", TEXT},   {"webapi_allow", JSON}, {"extra", JSON},
-};
-
-TEST_F(FilterMatch, WritesEachKindOfValueAsItsFieldDemands)
+TEST_F(Filter, WritesEachValueAsItsFieldDemands)
 {
-    for (const auto& [szField, fieldClass] : FIELDS) {
+    for (const Field& field : fields()) {
         for (const auto& value : VALUES) {
-            SCOPED_TRACE(std::string(szField) + "=" + value.szValue);
-            m_strOut = "held ";
-            EXPECT_EQ(0, match(szField, json(value.szValue)));
-            EXPECT_EQ(std::string("held ") + szField + "=" + value.rendered[fieldClass], m_strOut);
-        }
-    }
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(FilterList, WritesEachKindOfElementAsItsFieldDemands)
-{
-    for (const auto& [szField, fieldClass] : FIELDS) {
-        for (const auto& value : VALUES) {
-            SCOPED_TRACE(std::string(szField) + "=" + value.szValue);
+            SCOPED_TRACE(std::string(field.szName) + "=" + value.szValue);
             const std::string strValue = value.szValue;
-            const std::string strRendered = value.rendered[fieldClass];
+            const std::string strType = field.szType;
+            const std::string& strSql = "string" == strType      ? value.strText
+                                        : "long long" == strType ? value.strNumber
+                                                                 : value.strJson;
             m_strOut = "held ";
-            EXPECT_EQ(0, list(szField, json("[" + strValue + "]")));
-            EXPECT_EQ(std::string("held ") + szField + " in (" + strRendered + " )", m_strOut);
-
+            EXPECT_EQ(0, match(field.szName, json(strValue)));
+            EXPECT_EQ(std::string("held ") + field.szName + "=" + strSql, m_strOut);
+            m_strOut = "held ";
+            EXPECT_EQ(0, list(field.szName, json("[" + strValue + "]")));
+            EXPECT_EQ(std::string("held ") + field.szName + " in (" + strSql + " )", m_strOut);
             // Nothing separates elements.
             m_strOut.clear();
-            EXPECT_EQ(0, list(szField, json("[" + strValue + "," + strValue + "," + strValue + "]")));
-            EXPECT_EQ(szField + (" in (" + strRendered + strRendered + strRendered + " )"), m_strOut);
+            EXPECT_EQ(0, list(field.szName, json("[" + strValue + "," + strValue + "," + strValue + "]")));
+            EXPECT_EQ(field.szName + (" in (" + strSql + strSql + strSql + " )"), m_strOut);
         }
     }
-    EXPECT_EQ(Texts{}, takeLines());
 }
 
-TEST_F(FilterMatch, WritesTextThatIsNotUtf8AsItIs)
+TEST_F(Filter, WritesTextThatIsNotUtf8AsItIs)
 {
     EXPECT_EQ(0, match("tid", "\xff\xc3'"));
     EXPECT_EQ(0, match("extra", "\xff\xc3'"));
-    EXPECT_EQ("tid='\xff\xc3'''extra='\"\xff\xc3''\"'", m_strOut);
+    EXPECT_EQ("heldtid='\xff\xc3'''extra='\"\xff\xc3''\"'", m_strOut);
 }
 
-TEST_F(FilterMatch, TakesNestedValuesForJsonFieldsOnly)
+TEST_F(Filter, TakesNestedValuesForJsonFieldsOnly)
 {
     const std::pair<const char*, const char*> values[] = {
         {"{}", "{}"},
         {"[]", "[]"},
         {R"({ "b" : [1, null], "a" : "it's" })", R"({"a":"it''s","b":[1,null]})"},
     };
-
     for (const auto& [szValue, szText] : values) {
         SCOPED_TRACE(szValue);
         const Json::Value jValue = json(szValue);
         Json::Value jList;
         jList.append(jValue);
-
         m_strOut.clear();
         EXPECT_EQ(0, match("extra", jValue));
-        EXPECT_EQ(std::string("extra='") + szText + "'", m_strOut);
-        m_strOut.clear();
         EXPECT_EQ(0, list("webapi_allow", jList));
-        EXPECT_EQ(std::string("webapi_allow in ('") + szText + "' )", m_strOut);
+        EXPECT_EQ(std::string("extra='") + szText + "'webapi_allow in ('" + szText + "' )", m_strOut);
         for (const char* szField : {"tid", "uid"}) {
             EXPECT_THROW(match(szField, jValue), Json::Exception);
             EXPECT_THROW(list(szField, jList), Json::Exception);
@@ -250,66 +244,37 @@ TEST_F(FilterMatch, TakesNestedValuesForJsonFieldsOnly)
     }
     EXPECT_THROW(where(R"({"tid":[["a"]]})"), Json::Exception);
     EXPECT_THROW(where(R"({"uid":[1,{}]})"), Json::Exception);
-    EXPECT_EQ(Texts{}, takeLines());
 }
 
-TEST_F(FilterMatch, ClassifiesByTheTypeThatTheTableHoldsNow)
+TEST_F(Filter, FollowsTheTypeThatTheTableHoldsNow)
 {
-    const std::pair<Class, Texts> types[] = {
-        {TEXT, {"string"}},
-        {JSON, {"Json::Value", "Json::objectValue", "Json::arrayValue"}},
-        {NUMBER, {"long long", "int", "bool", "uid_t", "time_t", "", "String", "string ", "Json::", "Json"}},
+    const std::pair<std::string, Texts> types[] = {
+        {"'it''s'", {"string"}},
+        {R"('"it''s"')", {"Json::Value", "Json::objectValue", "Json::arrayValue"}},
+        {"it''s", {"long long", "int", "bool", "uid_t", "time_t", "", "String", "string ", "Json::", "Json"}},
     };
-    const char* const rendered[] = {"'it''s'", R"('"it''s"')", "it''s"};
-
     EXPECT_EQ(1, where(R"({"colour":"it's"})"));
-    for (const auto& [fieldClass, names] : types) {
+    for (const auto& [strSql, names] : types) {
         for (const std::string& strType : names) {
             SCOPED_TRACE(strType);
-            tokenType()["colour"] = Json::Value(Json::arrayValue);
-            tokenType()["colour"].append(strType);
+            tokenType()["colour"][0] = strType;
             m_strOut.clear();
             EXPECT_EQ(0, where(R"({"colour":"it's"})"));
             EXPECT_EQ(0, where(R"({"colour":["it's"]})"));
-            const std::string strRendered = rendered[fieldClass];
-            EXPECT_EQ(" (colour=" + strRendered + " ) (colour in (" + strRendered + " ) )", m_strOut);
+            EXPECT_EQ(" (colour=" + strSql + " ) (colour in (" + strSql + " ) )", m_strOut);
         }
     }
-
     // The library's own fields are no exception.
-    tokenType()["uid"][0U] = "string";
+    tokenType()["uid"][0] = "string";
     tokenType().removeMember("tid");
     m_strOut.clear();
     EXPECT_EQ(0, where(R"({"tid":"a","uid":7})"));
     EXPECT_EQ(" (uid='7' )", m_strOut);
     EXPECT_EQ(-1, match("tid", "a"));
-    EXPECT_EQ((Texts{failed(STORE, "!jTokenType.isMember(strField)")}), takeLines());
+    EXPECT_LINES(failed(STORE, "!jTokenType.isMember(strField)"));
 }
 
-TEST_F(FilterMatch, RefusesWhatIsNoField)
-{
-    m_strOut = "held";
-    for (const std::string& strField : {std::string(""), std::string("foo"), std::string("TID"),
-                                        std::string("limit"), std::string("tid\0", 4)}) {
-        SCOPED_TRACE(strField);
-        EXPECT_EQ(-1, match(strField, "a"));
-        EXPECT_EQ((Texts{failed(STORE, "!jTokenType.isMember(strField)")}), takeLines());
-    }
-    EXPECT_EQ("held", m_strOut);
-}
-
-TEST_F(FilterMatch, FailsWhenMemoryRunsOut)
-{
-    m_strOut = "held";
-    seam().fail("sqlite3_mprintf", ENOMEM);
-
-    EXPECT_EQ(-1, match("tid", "a"));
-
-    EXPECT_EQ("held", m_strOut);
-    EXPECT_EQ((Texts{failed(STORE, MATCH_TEXT_FAILED, ENOMEM)}), takeLines());
-}
-
-TEST_F(FilterList, RefusesWhatIsNoFieldOrNoList)
+TEST_F(Filter, RefusesWhatIsNoFieldOrNoList)
 {
     const std::string NO_NAME = "!szField || !szField[0]";
     const std::string NO_FIELD = "!jTokenType.isMember(szField)";
@@ -323,73 +288,134 @@ TEST_F(FilterList, RefusesWhatIsNoFieldOrNoList)
         {"tid", R"("a")", NO_LIST},     {"tid", R"({"a":1})", NO_LIST}, {"tid", "null", NO_LIST},
         {"extra", "{}", NO_LIST},       {"uid", "7", NO_LIST},
     };
-
-    m_strOut = "held";
     for (const auto& row : rows) {
         SCOPED_TRACE(row.szField ? row.szField : "(null)");
         EXPECT_EQ(-1, list(row.szField, json(row.szList)));
-        EXPECT_EQ((Texts{failed(STORE, row.strCondition)}), takeLines());
+        EXPECT_LINES(failed(STORE, row.strCondition));
+    }
+    for (const std::string& strField : {std::string(), std::string("foo"), std::string("TID"),
+                                        std::string("limit"), std::string("tid\0", 4)}) {
+        SCOPED_TRACE(strField);
+        EXPECT_EQ(-1, match(strField, "a"));
+        EXPECT_LINES(failed(STORE, "!jTokenType.isMember(strField)"));
     }
     EXPECT_EQ("held", m_strOut);
 }
 
-TEST_F(FilterList, ReadsGapsAsNullAndLeavesThem)
+TEST_F(Filter, ReadsGapsInListsAsNullAndLeavesThem)
 {
     Json::Value jList;
     jList[2] = "a";
     EXPECT_EQ(0, list("tid", jList));
     EXPECT_EQ(0, list("extra", jList));
-    EXPECT_EQ("tid in ('''''a' )extra in ('null''null''\"a\"' )", m_strOut);
+    EXPECT_EQ("heldtid in ('''''a' )extra in ('null''null''\"a\"' )", m_strOut);
 }
 
-TEST_F(FilterList, ReachesTheOutputWholeOrNotAtAll)
+TEST_F(Filter, AppendsAConditionWholeOrNotAtAll)
 {
-    m_strOut = "held";
-    EXPECT_EQ(0, list("tid", Json::Value(Json::arrayValue)));
-    seam().fail("sqlite3_mprintf", ENOMEM, 3, 3);
+    failText(3);
     EXPECT_EQ(-1, list("tid", json(R"(["a","b","c"])")));
+    failText();
+    EXPECT_EQ(-1, match("tid", "a"));
+    failText();
+    EXPECT_EQ(-1, condition(json(R"({"sort_by":"uid","sort_direction":"desc","limit":0})")));
+    EXPECT_LINES(allFailed(STORE, {LIST_TEXT_FAILED, MATCH_TEXT_FAILED, "!szSql"}, ENOMEM));
+    EXPECT_EQ(0, list("tid", Json::Value(Json::arrayValue)));
     EXPECT_EQ("held", m_strOut);
-    EXPECT_EQ((Texts{failed(STORE, LIST_TEXT_FAILED, ENOMEM)}), takeLines());
-
     EXPECT_EQ(0, list("tid", json(R"(["a","b","c"])")));
     EXPECT_EQ("heldtid in ('a''b''c' )", m_strOut);
 }
 
-TEST_F(Filter, TracesNothingInDebugModeAndReleasesItsTexts)
+TEST_F(Filter, ReleasesItsTextsAndTracesNothingInDebugMode)
 {
     VEMO_ACCESS_TOKEN::debugInfo(true);
     sqlite3_initialize();
     const sqlite3_int64 nUsed = sqlite3_memory_used();
-
     EXPECT_EQ(0, where(R"({"extra":[{},1],"tid":"a","uid":[1,2]})"));
     EXPECT_EQ(0, condition(json(R"({"sort_by":"uid"})")));
-
-    EXPECT_EQ((Texts{"sqlite3_mprintf %q", "sqlite3_mprintf %q", "sqlite3_mprintf %q", "sqlite3_mprintf %q",
-                     "sqlite3_mprintf %q", "sqlite3_mprintf  order by '%q'"}),
-              seam().callsOf({"sqlite3_mprintf", "sqlite3_exec", "printf"}));
+    EXPECT_EQ(Texts(5, "sqlite3_mprintf %q") + Texts{"sqlite3_mprintf  order by '%q'"},
+              seam().callsOf({"sqlite3_mprintf", "sqlite3_exec"}));
     EXPECT_EQ(nUsed, sqlite3_memory_used());
-    EXPECT_EQ(Texts{}, takeLines());
 }
 
-class FilterInSystemLog : public FilterTest {
-protected:
-    FilterInSystemLog() : FilterTest(Destination::Syslog) {}
-};
-
-TEST_F(FilterInSystemLog, TellsTheErrorInFrontWhenThereIsOne)
+TEST_F(Filter, SortsByATextAndInOneOfTwoDirections)
 {
-    for (const int nErrno : {0, ENOMEM}) {
-        seam().counts.clear();
-        seam().fail("sqlite3_mprintf", nErrno);
-        m_nErrno = nErrno;
+    const std::pair<const char*, const char*> rows[] = {
+        {R"({"sort_by":"create_time"})", " order by 'create_time'"},
+        {R"({"sort_by":"create_time","sort_direction":"desc"})", " order by 'create_time' DESC"},
+        {R"({"sort_by":"uid","sort_direction":"asc"})", " order by 'uid' ASC"},
+        {R"({"sort_by":"uid","sort_direction":"DESC"})", " order by 'uid' ASC"},
+        {R"({"sort_by":"uid","sort_direction":"desc "})", " order by 'uid' ASC"},
+        {R"({"sort_by":"uid","sort_direction":"desc\u0000"})", " order by 'uid' ASC"},
+        {R"({"sort_by":"uid","sort_direction":null})", " order by 'uid' ASC"},
+        {R"({"sort_by":"uid","sort_direction":1})", " order by 'uid' ASC"},
+        {R"({"sort_by":""})", " order by ''"},
+        {R"({"sort_by":"x'; DROP TABLE token; --"})", " order by 'x''; DROP TABLE token; --'"},
+        {R"({"sort_by":"%s%n%q"})", " order by '%s%n%q'"},
+        {R"({"sort_by":"a\u0000b"})", " order by 'a'"},
+        {R"({"sort_by":"uid","sort_direction":"desc","limit":0,"offset":1})",
+         " order by 'uid' DESC LIMIT OFFSET "},
+        {R"({"sort_by":"uid","limit":7})", " order by 'uid'"},
+        {R"({"limit":0,"offset":0})", " LIMIT  OFFSET "},
+        {R"({"offset":3})", ""},
+        {R"({"tid":"a","foo":1})", ""},
+        {R"({"sort_direction":{},"offset":"x"})", ""}, // what is not read does not matter
+    };
+    for (const auto& [szFilter, szAppended] : rows) {
+        SCOPED_TRACE(szFilter);
+        m_strOut = "held";
+        EXPECT_EQ(0, condition(json(szFilter)));
+        EXPECT_EQ(std::string("held") + szAppended, m_strOut);
+    }
+}
 
-        EXPECT_EQ(-1, where(R"({"tid":"a"})"));
-        EXPECT_EQ(-1, where(R"({"tid":{}})"));
+TEST_F(Filter, WritesTheTailOfTheKeywordThatTheNumberPointsTo)
+{
+    const Json::Int64 nMin = std::numeric_limits<Json::Int64>::min();
+    const Json::Int64 nMax = std::numeric_limits<Json::Int64>::max();
+    const Json::Int64 n2To32 = Json::Int64(1) << 32;
+    // The numbers by the position that they point to: they count modulo 2^32. What is not a number is read as
+    // one, and a fraction is cut off.
+    const std::map<size_t, std::vector<Json::Value>> numbers = {
+        {0, {0, n2To32, -n2To32, nMin, Json::Value(), false, -0.9}},
+        {1, {1, true, 1.9}},
+        {2, {2}},
+        {3, {3U}},
+        {4, {4}},
+        {5, {5, nMin + 5}},
+        {6, {6, 6 - n2To32}},
+        {7, {7, n2To32 + 7}},
+        {8, {8}},
+        {9, {9, 16, 1000000, -1, -7, n2To32 / 2, n2To32 - 1, nMax, Json::UInt64(nMax)}}}; // or more
+    const auto tail = [](const std::string& strKeyword, size_t nFirst) {
+        return nFirst < strKeyword.size() ? strKeyword.substr(nFirst) : "";
+    };
+    for (const auto& [nFirst, numbersOfFirst] : numbers) {
+        for (const Json::Value& jNumber : numbersOfFirst) {
+            SCOPED_TRACE(jNumber.asString());
+            Json::Value jFilter;
+            jFilter["limit"] = jNumber;
+            m_strOut.clear();
+            EXPECT_EQ(0, condition(jFilter));
+            EXPECT_EQ(tail(" LIMIT ", nFirst), m_strOut);
+            jFilter["limit"] = 8;
+            jFilter["offset"] = jNumber;
+            m_strOut.clear();
+            EXPECT_EQ(0, condition(jFilter));
+            EXPECT_EQ(tail(" OFFSET ", nFirst), m_strOut);
+        }
+    }
+}
 
-        EXPECT_EQ(inSystemLog({failed(STORE, MATCH_TEXT_FAILED, nErrno), failed(STORE, MATCH_FAILED, nErrno),
-                               fail(STORE, "err input type, jTokenParam=(null)", nErrno)},
-                              nErrno),
-                  takeLines(Destination::Syslog));
+TEST_F(Filter, LetsTheJsonLibraryRefuseOrdersAndLimitsOfAWrongType)
+{
+    for (const char* szFilter :
+         {R"({"sort_by":5})", R"({"sort_by":null})", R"({"sort_by":[]})",
+          R"({"sort_by":"uid","sort_direction":[]})", R"({"limit":"5"})", R"({"limit":[]})",
+          R"({"limit":{}})", R"({"limit":1e30})", R"({"limit":18446744073709551615})",
+          R"({"limit":0,"offset":"5"})", R"({"limit":9,"offset":{}})"}) {
+        SCOPED_TRACE(szFilter);
+        EXPECT_THROW(condition(json(szFilter)), Json::Exception);
     }
 }
 

@@ -1,380 +1,343 @@
-// Granting tokens: who is granted what, and how the store's failures show.
+// Granting tokens: who is granted what, how the uses are counted, and how the store's failures show.
+
+#include <cstring>
+#include <functional>
 
 #include "AccessTokenUtil.h"
-#include "OneGrant.h"
-#include "StandIns.h"
 #include "Statements.h"
+#include "StoreTest.h"
+
+using VEMO_ACCESS_TOKEN::debugInfo;
 
 namespace {
 
-// A line, and whether only debug mode has it.
-struct Line {
-    std::string strText;
-    bool blDebug = false;
+const Json::Value UNTOUCHED = "what the caller had";
+const std::string SELECT_T = selectSql("t");
+const std::string DELETE_T = deleteSql("tid", "t");
+const std::string NOT_PERMITTED =
+    failed(SERVICE, "0 > (err = checkPermission(jToken, szWebapiName, szWebapiMethod))");
+
+Json::Value counted(Json::Int64 nCount)
+{
+    Json::Value jToken = token();
+    jToken["count"] = nCount;
+    return jToken;
+}
+
+std::string refused(const std::string& strTid, const std::string& strApi, const std::string& strMethod)
+{
+    return ordinary(SERVICE, "token grant failed!!, strTid=" + strTid + ", szWebapiName=" + strApi +
+                                 ", szWebapiMethod=" + strMethod);
+}
+
+class Grant : public TableTest {
+protected:
+    int grant(std::string strTid = "t", const char* szApi = "Api", const char* szMethod = "get")
+    {
+        m_jToken = UNTOUCHED;
+        return api().tokenGrant(strTid, szApi, szMethod, m_jToken);
+    }
+
+    Json::Value m_jToken;
 };
 
-Line debug(const std::string& strFile, const std::string& strMessage)
+TEST_F(Grant, SpendsOneUse)
 {
-    return {ordinary(strFile, strMessage), true};
-}
-
-Line refused(const std::string& strTid, const std::string& strApi, const std::string& strMethod)
-{
-    return debug(SERVICE, "token grant failed!!, strTid=" + strTid + ", szWebapiName=" + strApi +
-                              ", szWebapiMethod=" + strMethod);
-}
-
-Texts texts(const std::vector<Line>& lines, bool blDebug)
-{
-    Texts found;
-    for (const Line& line : lines) {
-        if (blDebug || !line.blDebug) {
-            found.push_back(line.strText);
-        }
+    const struct {
+        Json::Int64 nCount;
+        const char* szStored; // after the grant
+        Json::Int64 nHandedBack;
+        std::string strStatement; // besides the SELECT
+    } rows[] = {
+        {3, "2", 2, saveSql("REPLACE", counted(2))},
+        {2, "1", 1, saveSql("REPLACE", counted(1))},
+        {1, "", 1, DELETE_T},
+        {0, "", 0, DELETE_T},
+        {-1, "-1", -1, ""},
+        {INT64_MIN, "-9223372036854775808", INT64_MIN, ""},
+        {INT64_MAX, "9223372036854775806", INT64_MAX - 1, saveSql("REPLACE", counted(INT64_MAX - 1))},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.nCount);
+        query("DELETE FROM token");
+        insert(text(counted(row.nCount)));
+        seam().calls.clear();
+        EXPECT_EQ(0, grant());
+        EXPECT_EQ(row.szStored, countOf());
+        EXPECT_EQ(counted(row.nHandedBack), m_jToken);
+        EXPECT_EQ(Texts{SELECT_T} + (row.strStatement.empty() ? Texts{} : Texts{row.strStatement}),
+                  seam().statements());
     }
-    return found;
-}
-
-class Grant : public OneGrant {};
-
-TEST_F(Grant, OfThreeUsesSucceedsThreeTimes)
-{
-    insertToken("3");
-    for (const char* szStored : {"2", "1", ""}) {
-        EXPECT_EQ(0, grant("t", "Api", "get"));
-        EXPECT_EQ(szStored, countOf("t"));
-    }
-    m_jToken = UNTOUCHED;
-
-    EXPECT_EQ(-1, grant("t", "Api", "get"));
-
-    EXPECT_EQ(UNTOUCHED, m_jToken);
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Grant, OfUnlimitedTokenNeverEnds)
-{
-    insertToken("-1");
-    for (int i = 0; i < 10; ++i) {
-        EXPECT_EQ(0, grant("t", "Api", "get"));
-        EXPECT_EQ(json(recordText(-1)), m_jToken);
-        EXPECT_EQ("-1", countOf("t"));
-    }
-}
-
-TEST_F(Grant, OfTokenWithDefaultCountSucceedsOnce)
-{
-    unsigned int uid = 1000;
-    std::string strFunction = "VPN";
-    std::string strTid = tid();
-    Json::Value jOption = json(R"({"webapi_allow": {"Api": {}}})");
-    ASSERT_EQ(0, api().tokenCreateByTid(uid, strFunction, jOption, strTid));
-
-    EXPECT_EQ(0, grant(strTid, "Api", nullptr));
-    EXPECT_EQ(Json::Value(1), m_jToken["count"]);
-    EXPECT_EQ(-1, grant(strTid, "Api", nullptr));
-
-    EXPECT_EQ(Texts{}, query("SELECT tid FROM token"));
 }
 
 // Expired tokens fall to the purge before the grant, and to nothing else.
-TEST_F(Grant, DoesNotLookAtTheDeadline)
+TEST_F(Grant, AllowsListedMethodsAndTheApiAloneWhateverTheDeadline)
 {
-    insertToken("2");
-    query("UPDATE token SET deadline = -1");
-
-    EXPECT_EQ(0, grant("t", "Api", "get"));
-
-    EXPECT_EQ(Json::Value(-1), m_jToken["deadline"]);
-}
-
-TEST_F(Grant, AllowsListedMethodsAndTheApiAlone)
-{
-    insertToken("-1");
+    insert(R"({"count":-1,"deadline":-1})");
     const std::pair<const char*, const char*> allowed[] = {
         {"Api", "get"}, {"Api", "post"}, {"Api", ""}, {"Api", nullptr}, {"Odd", ""}, {"Odd", nullptr}};
     for (const auto& [szApi, szMethod] : allowed) {
         SCOPED_TRACE(szApi);
         EXPECT_EQ(0, grant("t", szApi, szMethod));
+        EXPECT_EQ(Json::Value(-1), m_jToken["deadline"]);
     }
-    EXPECT_EQ(Texts{}, takeLines());
 }
 
 TEST_F(Grant, IsTracedInDebugMode)
 {
-    insertToken("2");
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-
-    EXPECT_EQ(0, grant("t", "Api", "get"));
-    const std::string strReplace = replaceSql(1);
-    EXPECT_EQ((Texts{ordinary(STORE, "run sql=" + SELECT_T), ordinary(SERVICE, "get token tid=t"),
-                     ordinary(STORE, "tokenSave, blCreate=0, jParam=" + recordText(1)),
-                     ordinary(STORE, "run sql=" + strReplace), ordinary(STORE, "run sql=" + strReplace),
-                     ordinary(STORE, "change rv=1, run sql=" + strReplace),
-                     ordinary(SERVICE, "token grant success!!")}),
-              takeLines());
-
-    EXPECT_EQ(0, grant("t", "Api", nullptr));
-    EXPECT_EQ(
-        (Texts{ordinary(STORE, "run sql=" + SELECT_T), ordinary(SERVICE, "get token tid=t"),
-               ordinary(STORE, "run sql=" + DELETE_T), ordinary(STORE, "change rv=1, run sql=" + DELETE_T),
-               ordinary(STORE, "delete token number=1"), ordinary(SERVICE, "token grant success!!")}),
-        takeLines());
+    const std::string strReplace = saveSql("REPLACE", counted(1));
+    const Texts found = {ordinary(STORE, "run sql=" + SELECT_T), ordinary(SERVICE, "get token tid=t")};
+    insert(R"({"count":2})");
+    debugInfo(true);
+    EXPECT_EQ(0, grant());
+    EXPECT_LINES(found + Texts{ordinary(STORE, "tokenSave, blCreate=0, jParam=" + text(counted(1))),
+                               ordinary(STORE, "run sql=" + strReplace),
+                               ordinary(STORE, "run sql=" + strReplace),
+                               ordinary(STORE, "change rv=1, run sql=" + strReplace),
+                               ordinary(SERVICE, "token grant success!!")});
+    EXPECT_EQ(0, grant());
+    EXPECT_LINES(found + Texts{ordinary(STORE, "run sql=" + DELETE_T),
+                               ordinary(STORE, "change rv=1, run sql=" + DELETE_T),
+                               ordinary(STORE, "delete token number=1"),
+                               ordinary(SERVICE, "token grant success!!")});
 }
 
-const Line FOUND = debug(SERVICE, "get token tid=t");
-const Line NO_API = {failed(SERVICE, "!szWebapiName || !szWebapiName[0]")};
-const Line NO_TID = {failed(SERVICE, "strTid.empty()")};
-const Line NOT_PERMITTED = {
-    failed(SERVICE, "0 > (err = checkPermission(jToken, szWebapiName, szWebapiMethod))")};
-const Line RECORD = debug(UTIL, "jToken=" + recordText(2));
-const Line UNLISTED_API = debug(UTIL, "webapi=api not in allow list, jToken=" + recordText(2));
-const Line MALFORMED_API = {
-    failed(UTIL, "jToken[\"webapi_allow\"][szWebapiName].type() != Json::objectValue")};
-
-Line lookup(const std::string& strTidInSql)
+TEST_F(Grant, RefusesAndSpendsNothing)
 {
-    return debug(STORE, "run sql=" + selectSql(strTidInSql));
-}
-
-std::vector<Line> unknownTid(const std::string& strTid, const std::string& strTidInSql)
-{
-    return {lookup(strTidInSql), refused(strTid, "Api", "get")};
-}
-
-std::vector<Line> deniedApi(const Line& reason, const std::string& strApi, const std::string& strMethod)
-{
-    return {lookup("t"), FOUND, reason, RECORD, NOT_PERMITTED, refused("t", strApi, strMethod)};
-}
-
-std::vector<Line> unlistedMethod(const std::string& strMethod)
-{
-    const std::string strReason =
-        "webapi=Api , method=" + strMethod + ", not in allow list, jToken=" + recordText(2);
-    return {lookup("t"), FOUND, debug(UTIL, strReason), refused("t", "Api", strMethod)};
-}
-
-struct Refusal {
-    const char* szName;
-    const char* szTid;
-    const char* szApi;
-    const char* szMethod;
-    std::vector<Line> lines;
-};
-
-void PrintTo(const Refusal& refusal, std::ostream* pStream)
-{
-    *pStream << refusal.szName;
-}
-
-const Refusal REFUSALS[] = {
-    {"EmptyTid", "", "Api", "get", {NO_TID, refused("", "Api", "get")}},
-    {"EmptyTidBeforeApi", "", nullptr, nullptr, {NO_TID, refused("", "(null)", "(null)")}},
-    {"NullApi", "t", nullptr, "get", {NO_API, refused("t", "(null)", "get")}},
-    {"EmptyApi", "t", "", "", {NO_API, refused("t", "", "")}},
-    {"UnknownTid", "z", "Api", "get", unknownTid("z", "z")},
-    {"TidThatIsSql", "' or ''='", "Api", "get", unknownTid("' or ''='", "'' or ''''=''")},
-    {"UnlistedApi", "t", "api", nullptr, deniedApi(UNLISTED_API, "api", "(null)")},
-    {"MalformedApi", "t", "Odd", "get", deniedApi(MALFORMED_API, "Odd", "get")},
-    {"UnlistedMethod", "t", "Api", "put", unlistedMethod("put")},
-    {"MethodOfOtherCase", "t", "Api", "Get", unlistedMethod("Get")},
-    {"MethodThatOnlyStartsSo", "t", "Api", "ge", unlistedMethod("ge")}};
-
-class GrantRefuses : public OneGrant, public ::testing::WithParamInterface<std::tuple<Refusal, bool>> {};
-
-TEST_P(GrantRefuses, AndSpendsNothing)
-{
-    const auto& [refusal, blDebug] = GetParam();
-    insertToken("2");
-    VEMO_ACCESS_TOKEN::debugInfo(blDebug);
-
-    EXPECT_EQ(-1, grant(refusal.szTid, refusal.szApi, refusal.szMethod));
-
-    EXPECT_EQ(texts(refusal.lines, blDebug), takeLines());
-    EXPECT_EQ(UNTOUCHED, m_jToken);
-    EXPECT_EQ("2", countOf("t"));
+    const std::string strNoTid = failed(SERVICE, "strTid.empty()");
+    const std::string strNoApi = failed(SERVICE, "!szWebapiName || !szWebapiName[0]");
+    const std::string strRecord = ordinary(UTIL, "jToken=" + text(token()));
+    const Texts found = {ordinary(STORE, "run sql=" + SELECT_T), ordinary(SERVICE, "get token tid=t")};
+    const Texts unlistedApi = {ordinary(UTIL, "webapi=api not in allow list, jToken=" + text(token())),
+                               strRecord};
+    const auto unlisted = [&](const std::string& strMethod) {
+        return found + Texts{ordinary(UTIL, "webapi=Api , method=" + strMethod +
+                                                ", not in allow list, jToken=" + text(token())),
+                             refused("t", "Api", strMethod)};
+    };
+    const struct {
+        const char *szTid, *szApi, *szMethod;
+        Texts lines, debugLines;
+    } rows[] = {
+        {"", "Api", "get", {strNoTid}, {strNoTid, refused("", "Api", "get")}},
+        {"", nullptr, nullptr, {strNoTid}, {strNoTid, refused("", "(null)", "(null)")}},
+        {"t", nullptr, "get", {strNoApi}, {strNoApi, refused("t", "(null)", "get")}},
+        {"t", "", "", {strNoApi}, {strNoApi, refused("t", "", "")}},
+        {"z", "Api", "get", {}, {ordinary(STORE, "run sql=" + selectSql("z")), refused("z", "Api", "get")}},
+        {"' or ''='",
+         "Api",
+         "get",
+         {},
+         {ordinary(STORE, "run sql=" + selectSql("'' or ''''=''")), refused("' or ''='", "Api", "get")}},
+        {"t",
+         "api",
+         nullptr,
+         {NOT_PERMITTED},
+         found + unlistedApi + Texts{NOT_PERMITTED, refused("t", "api", "(null)")}},
+        {"t", "Api", "put", {}, unlisted("put")},
+        {"t", "Api", "Get", {}, unlisted("Get")},
+        {"t", "Api", "ge", {}, unlisted("ge")},
+    };
+    insert();
+    for (const bool blDebug : {false, true}) {
+        debugInfo(blDebug);
+        for (const auto& row : rows) {
+            SCOPED_TRACE(::testing::Message() << row.szTid << (row.szMethod ? row.szMethod : "") << blDebug);
+            EXPECT_EQ(-1, grant(row.szTid, row.szApi, row.szMethod));
+            EXPECT_LINES(blDebug ? row.debugLines : row.lines);
+            EXPECT_EQ(UNTOUCHED, m_jToken);
+        }
+    }
+    EXPECT_EQ((Texts{row(token())}), query("SELECT * FROM token"));
     EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_changes"})); // nothing but a SELECT was run
 }
 
-INSTANTIATE_TEST_SUITE_P(Calls, GrantRefuses,
-                         ::testing::Combine(::testing::ValuesIn(REFUSALS), ::testing::Bool()),
-                         [](const auto& test) {
-                             return std::string(std::get<0>(test.param).szName) +
-                                    (std::get<1>(test.param) ? "Debug" : "");
-                         });
-
-TEST_F(Grant, RefusesAllowListsThatAreNoObjects)
+TEST_F(Grant, RefusesRecordsThatAreMalformed)
 {
-    insertToken("2");
+    insert();
     for (const char* szAllow : {"[]", "[\"Api\"]", "\"Api\"", "7", "null", "true"}) {
-        SCOPED_TRACE(szAllow);
         query(std::string("UPDATE token SET webapi_allow = '") + szAllow + "'");
-
         EXPECT_EQ(-1, grant("t", "Api", nullptr));
-
-        EXPECT_EQ((Texts{failed(UTIL, "jToken[\"webapi_allow\"].type() != Json::objectValue"),
-                         NOT_PERMITTED.strText}),
-                  takeLines());
-        EXPECT_EQ("2", countOf("t"));
+        EXPECT_LINES(failed(UTIL, "jToken[\"webapi_allow\"].type() != Json::objectValue"), NOT_PERMITTED);
     }
-}
-
-TEST_F(Grant, LetsTheExceptionOfAMalformedMethodPass)
-{
-    insertToken("2", R"({"Api":{"method":[{}]}})");
-
-    EXPECT_THROW(grant("t", "Api", "get"), Json::LogicError);
-
+    query(R"(UPDATE token SET webapi_allow = '{"Api":{"method":[{}]}}')");
+    EXPECT_THROW(grant(), Json::LogicError);
     EXPECT_EQ(UNTOUCHED, m_jToken);
-    EXPECT_EQ("2", countOf("t"));
-    EXPECT_EQ(Texts{}, takeLines());
-}
+    EXPECT_EQ("3", countOf());
 
-struct StoreFailure {
-    const char* szName;
-    const char* szStatement; // the one that fails: how it starts
-    Answer failure;
-    const char* szCount;
-    const char* szStored;
-    Texts lines;
-};
-
-void PrintTo(const StoreFailure& failure, std::ostream* pStream)
-{
-    *pStream << failure.szName;
-}
-
-Texts inStore(const Texts& conditions)
-{
-    return allFailed(STORE, conditions, EIO);
-}
-
-Texts inService(const Texts& conditions)
-{
-    return allFailed(SERVICE, conditions, EIO);
-}
-
-Texts refusedBySqlite(const std::string& strSql)
-{
-    return failureOf(strSql, DISK_ERROR.szError, EIO);
-}
-
-Texts lockedBefore(const std::string& strSql)
-{
-    return {fail(STORE, "sql error, sql=" + strSql, EIO)};
-}
-
-const Texts LOOKUP_FAILED = inStore({"0 > tokenGet(jParam, jTokenArray)"}) +
-                            inService({"0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))",
-                                       "0 > (err = tokenGetByTid(strTid, jToken))"});
-const Texts SAVE_FAILED = inService({"0 > m_pDb->tokenUpdate(jToken)"}) +
-                          Texts{ordinary(SERVICE, "tokenSaveByOverwrite failed, jToken=" + recordText(1))} +
-                          inService({"0 > tokenSaveByOverwrite(jToken)", "0 > tokenCountDegrade(jToken)"});
-const Texts DELETE_FAILED = inService({"0 > (err = m_pDb->tokenDelete(jParam))"}) +
-                            Texts{ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=t")} +
-                            inService({"0 > (err = tokenDeleteByArray(strVector, szName))"}) +
-                            Texts{ordinary(SERVICE, "tokenDeleteByName failed, name=tid, strValue=t")} +
-                            inService({"0 > tokenDeleteByTid(strTid)", "0 > tokenCountDegrade(jToken)"});
-
-// After a lock that was waited out the statement has taken effect, and the grant is refused.
-const StoreFailure STORE_FAILURES[] = {
-    {"InLookup", "SELECT", DISK_ERROR, "2", "2",
-     refusedBySqlite(SELECT_T) + inStore({"0 > runSql(FillList, &jTokenArrayOut)"}) + LOOKUP_FAILED},
-    {"InLookupAfterLock", "SELECT", LOCKED, "2", "2", lockedBefore(SELECT_T) + LOOKUP_FAILED},
-    {"InSave", "REPLACE", DISK_ERROR, "2", "2",
-     refusedBySqlite(replaceSql(1)) + inStore({"0 > runSql()"}) + SAVE_FAILED},
-    {"InSaveAfterLock", "REPLACE", LOCKED, "2", "1", lockedBefore(replaceSql(1)) + SAVE_FAILED},
-    {"InDelete", "DELETE", DISK_ERROR, "1", "1",
-     refusedBySqlite(DELETE_T) + inStore({"0 > (err = runSql())"}) + DELETE_FAILED},
-    {"InDeleteAfterLock", "DELETE", LOCKED, "1", "", lockedBefore(DELETE_T) + DELETE_FAILED}};
-
-class GrantFails : public OneGrant, public ::testing::WithParamInterface<StoreFailure> {};
-
-TEST_P(GrantFails, AndLeavesTheCallersRecordAlone)
-{
-    insertToken(GetParam().szCount);
-    failStatements(GetParam().szStatement, GetParam().failure);
-
-    EXPECT_EQ(-1, grant("t", "Api", "get"));
-
-    EXPECT_EQ(GetParam().lines, takeLines());
-    EXPECT_EQ(UNTOUCHED, m_jToken);
-    EXPECT_EQ(GetParam().szStored, countOf("t"));
-}
-
-INSTANTIATE_TEST_SUITE_P(Store, GrantFails, ::testing::ValuesIn(STORE_FAILURES),
-                         [](const auto& test) { return std::string(test.param.szName); });
-
-// The record that the table yields, reduced to some columns, as an older table may have them.
-class GrantOfPart : public OneGrant {
-protected:
-    void answer(std::vector<const char*> names, std::vector<const char*> values)
-    {
-        seam().sqliteExec = [names, values](sqlite3*, const char*, auto callback, void* pArgument, char**) {
-            std::vector<char*> columns, texts;
-            for (size_t i = 0; i < names.size(); ++i) {
-                columns.push_back(const_cast<char*>(names[i]));
-                texts.push_back(const_cast<char*>(values[i]));
-            }
-            return callback(pArgument, static_cast<int>(names.size()), texts.data(), columns.data());
-        };
-    }
-};
-
-TEST_F(GrantOfPart, NamesWhatIsMissing)
-{
-    const char* const szAllow = R"({"Api":{}})";
+    // A table of another maker may lack columns.
     const std::string strDegrade = failed(SERVICE, "0 > tokenCountDegrade(jToken)");
-    const struct {
-        std::vector<const char*> names;
-        std::vector<const char*> values;
-        Texts lines;
-    } parts[] = {
-        {{"uid"}, {"7"}, {failed(UTIL, "!jToken.isMember(\"webapi_allow\")"), NOT_PERMITTED.strText}},
-        {{"webapi_allow"}, {"{}"}, {NOT_PERMITTED.strText}},
-        {{"webapi_allow"}, {szAllow}, {failed(SERVICE, "!jToken.isMember(\"uid\")")}},
-        {{"webapi_allow", "uid"},
-         {szAllow, "7"},
-         {failed(SERVICE, "!jToken.isMember(\"count\")"), strDegrade}},
-        {{"webapi_allow", "uid", "count"},
-         {szAllow, "7", "1"},
-         {failed(SERVICE, "!jToken.isMember(\"tid\")"), strDegrade}}};
+    const std::pair<const char*, Texts> parts[] = {
+        {"uid", {failed(UTIL, "!jToken.isMember(\"webapi_allow\")"), NOT_PERMITTED}},
+        {"'{}' AS webapi_allow", {NOT_PERMITTED}},
+        {"'{\"Api\":{}}' AS webapi_allow", {failed(SERVICE, "!jToken.isMember(\"uid\")")}},
+        {"'{\"Api\":{}}' AS webapi_allow, uid", {failed(SERVICE, "!jToken.isMember(\"count\")"), strDegrade}},
+        {"'{\"Api\":{}}' AS webapi_allow, uid, 1 AS count",
+         {failed(SERVICE, "!jToken.isMember(\"tid\")"), strDegrade}},
+    };
     for (const auto& part : parts) {
-        SCOPED_TRACE(part.names.size());
-        answer(part.names, part.values);
-
+        SCOPED_TRACE(part.first);
+        seam().sqliteExec = [&](sqlite3* pDb, const char*, SqlCallback callback, void* pArgument,
+                                char** pszError) {
+            return Seam::exec(pDb, ("SELECT " + std::string(part.first) + " FROM token").c_str(), callback,
+                              pArgument, pszError);
+        };
         EXPECT_EQ(-1, grant("t", "Api", nullptr));
-
-        EXPECT_EQ(part.lines, takeLines());
+        EXPECT_LINES(part.second);
         EXPECT_EQ(UNTOUCHED, m_jToken);
     }
 }
 
-class GrantInSystemLog : public StoreTest {
-protected:
-    GrantInSystemLog() : StoreTest(Destination::Syslog) {}
-};
-
-TEST_F(GrantInSystemLog, TellsErrnoInFrontOfEachLineWhenThereIsOne)
+// After a lock that was waited out the statement has taken effect, and the grant is refused all the same.
+TEST_F(Grant, FailsWithTheStoreAndLeavesTheCallersRecordAlone)
 {
-    // The lookup finds a token, and at the next grant none.
-    int nFound = 0;
-    standIns().tokenGetOne = [&](const char*, std::string&, Json::Value& jToken) {
-        jToken = json(recordText(-1));
-        return nFound = 1 - nFound;
+    const Texts lookup = {failed(STORE, "0 > tokenGet(jParam, jTokenArray)", EIO),
+                          failed(SERVICE, "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))", EIO),
+                          failed(SERVICE, "0 > (err = tokenGetByTid(strTid, jToken))", EIO)};
+    const Texts save = {failed(SERVICE, "0 > m_pDb->tokenUpdate(jToken)", EIO),
+                        ordinary(SERVICE, "tokenSaveByOverwrite failed, jToken=" + text(counted(1))),
+                        failed(SERVICE, "0 > tokenSaveByOverwrite(jToken)", EIO),
+                        failed(SERVICE, "0 > tokenCountDegrade(jToken)", EIO)};
+    const Texts remove = {failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))", EIO),
+                          ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=t"),
+                          failed(SERVICE, "0 > (err = tokenDeleteByArray(strVector, szName))", EIO),
+                          ordinary(SERVICE, "tokenDeleteByName failed, name=tid, strValue=t"),
+                          failed(SERVICE, "0 > tokenDeleteByTid(strTid)", EIO),
+                          failed(SERVICE, "0 > tokenCountDegrade(jToken)", EIO)};
+    const struct {
+        const char* szStart; // of the statement that fails
+        std::string strSql, strCondition;
+        int nCount;
+        const char* szAfterLock; // the count
+        Texts lines;
+    } rows[] = {
+        {"SELECT", SELECT_T, "0 > runSql(FillList, &jTokenArrayOut)", 2, "2", lookup},
+        {"REPLACE", saveSql("REPLACE", counted(1)), "0 > runSql()", 2, "1", save},
+        {"DELETE", DELETE_T, "0 > (err = runSql())", 1, "", remove},
     };
-    AccessTokenApi api;
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    std::string strTid = "t";
-    Json::Value jToken;
-    for (const int nErrno : {0, EACCES}) {
-        errno = nErrno;
-        EXPECT_EQ(0, api.tokenGrant(strTid, "Api", "get", jToken));
-        EXPECT_EQ(-1, api.tokenGrant(strTid, "Api", "get", jToken));
-        EXPECT_EQ(inSystemLog({FOUND.strText, ordinary(SERVICE, "token grant success!!"),
-                               refused("t", "Api", "get").strText},
-                              nErrno),
-                  takeLines(Destination::Syslog));
+    for (const auto& row : rows) {
+        for (const bool blLock : {false, true}) {
+            SCOPED_TRACE(row.szStart);
+            query("DELETE FROM token");
+            insert(text(counted(row.nCount)));
+            failStatements(row.szStart, blLock ? LOCKED : DISK_ERROR);
+            EXPECT_EQ(-1, grant());
+            EXPECT_LINES((blLock ? Texts{fail(STORE, "sql error, sql=" + row.strSql, EIO)}
+                                 : failureOf(row.strSql, "disk I/O error", EIO) +
+                                       Texts{failed(STORE, row.strCondition, EIO)}) +
+                         row.lines);
+            EXPECT_EQ(UNTOUCHED, m_jToken);
+            EXPECT_EQ(blLock ? row.szAfterLock : std::to_string(row.nCount), countOf());
+        }
+    }
+}
+
+// Nothing is locked between the lookup and the change: another process may come in between.
+TEST_F(Grant, OverlapsWithOthersAndLosesWhatTheyDid)
+{
+    const auto grantElsewhere = [] {
+        std::string strTid = "t";
+        Json::Value jToken;
+        EXPECT_EQ(0, AccessTokenApi().tokenGrant(strTid, "Api", "get", jToken));
+    };
+    const struct {
+        int nCount;
+        std::function<void()> meanwhile;
+        const char* szStored;
+        int nHandedBack;
+    } rows[] = {
+        {3, grantElsewhere, "2", 2}, // two grants spend one use
+        {1, grantElsewhere, "", 1},  // both spend the last use
+        {3, [&] { query("DELETE FROM token"); }, "2", 2},
+    };
+    for (const auto& row : rows) {
+        query("DELETE FROM token");
+        insert(text(counted(row.nCount)));
+        seam().sqliteExec = [run = row.meanwhile](sqlite3* pDb, const char* szSql, SqlCallback callback,
+                                                  void* pArgument, char** pszError) mutable {
+            if (0 != strncmp(szSql, "SELECT", 6)) {
+                std::exchange(run, [] {})();
+            }
+            return Seam::exec(pDb, szSql, callback, pArgument, pszError);
+        };
+        EXPECT_EQ(0, grant());
+        EXPECT_EQ(row.szStored, countOf());
+        EXPECT_EQ(counted(row.nHandedBack), m_jToken);
+    }
+}
+
+// Counting by itself: what a record may be that no table yielded
+
+TEST_F(Grant, CountRefusesMalformedRecords)
+{
+    const std::string strCount = failed(SERVICE, "!jToken.isMember(\"count\")");
+    const std::string strObject = failed(SERVICE, "jToken.type() != Json::objectValue");
+    const std::string strTid = failed(SERVICE, "!jToken.isMember(\"tid\")");
+    const std::string strString = failed(SERVICE, "jToken[\"tid\"].type() != Json::stringValue");
+    const std::pair<const char*, Texts> rows[] = {
+        {"null", {strObject}},
+        {"[1]", {strObject}},
+        {"\"count\"", {strObject}},
+        {"{}", {strCount}},
+        {R"({"tid":"t"})", {strCount}},
+        {R"({"count":1})", {strTid}},
+        {R"({"count":0})", {strTid}},
+        {R"({"count":1,"tid":7})", {strString}},
+        {R"({"count":null,"tid":null})", {strString}},
+        {R"({"count":1,"tid":""})",
+         {failed(SERVICE, "strValue.empty()"),
+          ordinary(SERVICE, "tokenDeleteByName failed, name=tid, strValue="),
+          failed(SERVICE, "0 > tokenDeleteByTid(strTid)")}},
+    };
+    for (const bool blDebug : {false, true}) {
+        debugInfo(blDebug);
+        for (const auto& [szRecord, lines] : rows) {
+            SCOPED_TRACE(szRecord);
+            Json::Value jToken = json(szRecord);
+            EXPECT_EQ(-1, api().tokenCountDegrade(jToken));
+            const Texts debug = {
+                ordinary(SERVICE, std::string("tokenCountDegrade failed, jToken=") + szRecord)};
+            EXPECT_LINES(lines + (blDebug ? debug : Texts{}));
+            EXPECT_EQ(json(szRecord), jToken);
+        }
+    }
+    for (const char* szRecord :
+         {R"({"count":"2","tid":"t"})", R"({"count":18446744073709551615,"tid":"t"})"}) {
+        Json::Value jToken = json(szRecord);
+        EXPECT_THROW(api().tokenCountDegrade(jToken), Json::LogicError);
+        EXPECT_EQ(json(szRecord), jToken);
+    }
+    // The count is lowered before the record is saved, and stays so when the save refuses the record.
+    Json::Value jToken = json(R"({"count":2,"tid":"t"})");
+    EXPECT_EQ(-1, api().tokenCountDegrade(jToken));
+    EXPECT_EQ(json(R"({"count":1,"tid":"t"})"), jToken);
+    EXPECT_LINES(ordinary(fieldList(4), "lost data member=bind_sid"),
+                 failed(SERVICE, "0 > fillDefaultValue(jToken, true)"),
+                 ordinary(SERVICE, R"(tokenSaveByOverwrite failed, jToken={"count":1,"tid":"t"})"),
+                 failed(SERVICE, "0 > tokenSaveByOverwrite(jToken)"),
+                 ordinary(SERVICE, R"(tokenCountDegrade failed, jToken={"count":1,"tid":"t"})"));
+    EXPECT_EQ(Texts{}, seam().statements());
+}
+
+TEST_F(Grant, CountLooksAtTidAndCountAlone)
+{
+    insert();
+    Json::Value jWhole = counted(3);
+    EXPECT_EQ(0, api().tokenCountDegrade(jWhole));
+    EXPECT_EQ(counted(2), jWhole);
+    EXPECT_EQ("2", countOf());
+    seam().calls.clear();
+    for (const char* szRecord : {R"({"count":-1})", R"({"count":-9223372036854775808,"tid":7})"}) {
+        Json::Value jToken = json(szRecord);
+        EXPECT_EQ(0, api().tokenCountDegrade(jToken));
+        EXPECT_EQ(json(szRecord), jToken);
+    }
+    EXPECT_EQ(Texts{}, seam().statements());
+    for (int i = 0; i < 2; ++i) { // a token that has gone already is no failure
+        Json::Value jToken = json(R"({"count":1,"tid":"t"})");
+        EXPECT_EQ(0, api().tokenCountDegrade(jToken));
+        EXPECT_EQ("", tids());
+        EXPECT_EQ(json(R"({"count":1,"tid":"t"})"), jToken);
     }
 }
 

@@ -1,52 +1,112 @@
-// Reading tokens of the store.
+// Reading and deleting the tokens of the store that a filter selects.
 
-#include "QueryTest.h"
 #include "AccessTokenUtil.h"
-#include "StandIns.h"
 #include "Statements.h"
+#include "StoreTest.h"
+
+using VEMO_ACCESS_TOKEN::debugInfo;
 
 namespace {
 
-class Query : public QueryTest {};
-class QueryOne : public QueryTest {};
+const std::string RUN_QUERY_FAILED = "0 > runSql(FillList, &jTokenArrayOut)";
+const std::string RUN_DELETE_FAILED = "0 > (err = runSql())";
+const std::string GET_FAILED = "0 > tokenGet(jParam, jTokenArray)";
+const std::string NO_FILTER = "jTokenParam.type() != Json::objectValue";
+const std::string ALL = "Ab12 Cd34 Ef56";
+
+class Query : public TableTest {
+protected:
+    void SetUp() override
+    {
+        TableTest::SetUp();
+        fill();
+    }
+
+    // Three tokens: Ab12 and Cd34 of user 1024, Ef56 of user 7.
+    void fill() const
+    {
+        query("DELETE FROM token");
+        insert(R"({"tid":"Ab12","uid":1024,"create_time":100})");
+        insert(
+            R"({"tid":"Cd34","uid":1024,"create_time":300,"bind_sid":"S2","webapi_allow":{"a":{}},"extra":{}})");
+        insert(R"({"tid":"Ef56","uid":7,"create_time":200,"function":"FTP"})");
+    }
+
+    // The operations, given their filter as text, which they leave as it is.
+    int get(const std::string& strFilter, const char* szOut = "null")
+    {
+        m_jOut = json(szOut);
+        return keeps(strFilter, [&](Json::Value& jFilter) { return m_db.tokenGet(jFilter, m_jOut); });
+    }
+    int remove(const std::string& strFilter, bool bAll = false)
+    {
+        return keeps(strFilter, [&](Json::Value& jFilter) { return m_db.tokenDelete(jFilter, bAll); });
+    }
+    int getOne(const char* szName, std::string strValue)
+    {
+        m_jOut = json(R"({"old":1})");
+        return m_db.tokenGetOne(szName, strValue, m_jOut);
+    }
+
+    // The ids in m_jOut, with blanks between.
+    std::string found() const
+    {
+        Texts ids;
+        for (const Json::Value& jToken : m_jOut) {
+            ids.push_back(jToken["tid"].asString());
+        }
+        return joined(ids, " ");
+    }
+
+    Json::Value m_jOut;
+
+private:
+    template <typename Operation>
+    static int keeps(const std::string& strFilter, Operation operation)
+    {
+        Json::Value jFilter = json(strFilter);
+        const int nResult = operation(jFilter);
+        EXPECT_EQ(json(strFilter), jFilter);
+        return nResult;
+    }
+};
 
 TEST_F(Query, RunsTheStatementThatTheFilterMakes)
 {
     const struct {
         const char* szFilter;
         std::string strCondition;
-        const char* szFound;
+        std::string strFound;
     } rows[] = {
-        {"{}", "", "Ab12 Cd34 Ef56 "},
-        {R"({"tid":"Ab12"})", " WHERE  (tid='Ab12' )", "Ab12 "},
+        {"{}", "", ALL},
+        {R"({"tid":"Ab12"})", " WHERE  (tid='Ab12' )", "Ab12"},
         {R"({"uid":1024,"sort_by":"create_time","sort_direction":"desc"})",
-         " WHERE  (uid=1024 ) order by 'create_time' DESC", "Ab12 Cd34 "}, // sorted by a constant
+         " WHERE  (uid=1024 ) order by 'create_time' DESC", "Ab12 Cd34"}, // sorted by a constant
         {R"({"tid":"nobody"})", " WHERE  (tid='nobody' )", ""},
-        {R"({"foo":"x","offset":3,"sort_direction":"desc"})", "", "Ab12 Cd34 Ef56 "},
-        {R"({"limit":7,"offset":8})", "", "Ab12 Cd34 Ef56 "},
-        {R"({"uid":7,"limit":6})", " WHERE  (uid=7 ) ", "Ef56 "},
-        {R"({"function":"VPN","bind_sid":"S1"})", " WHERE  (bind_sid='S1' and function='VPN' )", "Ab12 "},
-        {R"({"uid":"7"})", " WHERE  (uid=7 )", "Ef56 "},
-        {R"({"uid":"7 or 1"})", " WHERE  (uid=7 or 1 )", "Ab12 Cd34 Ef56 "},
+        {R"({"foo":"x","offset":3,"sort_direction":"desc"})", "", ALL},
+        {R"({"limit":7,"offset":8})", "", ALL},
+        {R"({"uid":7,"limit":6})", " WHERE  (uid=7 ) ", "Ef56"},
+        {R"({"function":"VPN","bind_sid":"S1"})", " WHERE  (bind_sid='S1' and function='VPN' )", "Ab12"},
+        {R"({"uid":"7"})", " WHERE  (uid=7 )", "Ef56"},
+        {R"({"uid":"7 or 1"})", " WHERE  (uid=7 or 1 )", ALL},
         {R"({"tid":"x' OR '1'='1"})", " WHERE  (tid='x'' OR ''1''=''1' )", ""},
         {R"({"tid":"'; DELETE FROM token; --"})", " WHERE  (tid='''; DELETE FROM token; --' )", ""},
-        {R"({"tid":["Cd34"]})", " WHERE  (tid in ('Cd34' ) )", "Cd34 "},
-        {R"({"extra":[{"a":"it's"}]})", R"( WHERE  (extra in ('{"a":"it''s"}' ) ))", "Ab12 "},
-        {R"({"webapi_allow":[{"api":{"method":["get"]}}]})",
-         R"( WHERE  (webapi_allow in ('{"api":{"method":["get"]}}' ) ))", "Cd34 "},
+        {R"({"tid":["Cd34"]})", " WHERE  (tid in ('Cd34' ) )", "Cd34"},
+        {R"({"tid":["Ab12","Cd34"]})", " WHERE  (tid in ('Ab12''Cd34' ) )", ""}, // one value
+        {R"({"uid":[10,24]})", " WHERE  (uid in (1024 ) )", "Ab12 Cd34"},
+        {R"({"extra":[{"note":"it's mine"}]})", R"( WHERE  (extra in ('{"note":"it''s mine"}' ) ))",
+         "Ab12 Ef56"},
+        {R"({"webapi_allow":[{"a":{}}]})", R"( WHERE  (webapi_allow in ('{"a":{}}' ) ))", "Cd34"},
     };
-
-    fill();
     for (const auto& row : rows) {
         SCOPED_TRACE(row.szFilter);
         EXPECT_EQ(0, get(row.szFilter));
         EXPECT_EQ(SELECT + row.strCondition + ";", m_db.m_strSql);
         EXPECT_EQ("", m_db.m_strErr);
-        EXPECT_EQ(row.szFound, found());
-        EXPECT_EQ(!row.szFound[0], m_jOut.isNull());
-        EXPECT_EQ(Texts{}, takeLines());
+        EXPECT_EQ(row.strFound, found());
+        EXPECT_EQ(row.strFound.empty(), m_jOut.isNull());
     }
-    EXPECT_EQ("Ab12 Cd34 Ef56 ", left());
+    EXPECT_EQ(ALL, tids());
 }
 
 TEST_F(Query, FailsWhereSqliteRefusesTheStatement)
@@ -66,40 +126,28 @@ TEST_F(Query, FailsWhereSqliteRefusesTheStatement)
         {R"({"uid":null})", " (uid= )", "near \")\": syntax error"},
         {R"({"uid":"x"})", " (uid=x )", "no such column: x"},
     };
-
-    fill();
     for (const auto& row : rows) {
-        for (const int nErrno : {0, EIO}) {
-            SCOPED_TRACE(row.szFilter);
-            const std::string strSql = SELECT + " WHERE " + row.strCondition + ";";
-            m_nErrno = nErrno;
-            EXPECT_EQ(-1, get(row.szFilter));
-            EXPECT_EQ(strSql, m_db.m_strSql);
-            EXPECT_EQ(row.strError, m_db.m_strErr);
-            EXPECT_TRUE(m_jOut.isNull());
-            EXPECT_EQ(refused(row.strError, strSql, RUN_QUERY_FAILED), takeLines());
-        }
+        SCOPED_TRACE(row.szFilter);
+        const std::string strSql = SELECT + " WHERE " + row.strCondition + ";";
+        errno = EIO;
+        EXPECT_EQ(-1, get(row.szFilter));
+        EXPECT_EQ(strSql, m_db.m_strSql);
+        EXPECT_EQ(row.strError, m_db.m_strErr);
+        EXPECT_TRUE(m_jOut.isNull());
+        EXPECT_LINES(failureOf(strSql, row.strError, EIO) + Texts{failed(STORE, RUN_QUERY_FAILED, EIO)});
     }
-
-    // Nothing of a failure outlives it.
-    m_nErrno = 0;
     EXPECT_EQ(0, get("{}"));
     EXPECT_EQ("", m_db.m_strErr);
 }
 
-TEST_F(Query, AppendsDecodedRecordsToTheOutput)
+TEST_F(Query, AppendsRecordsToTheOutput)
 {
-    fill();
-    m_jOut = json(R"(["held"])");
-    EXPECT_EQ(0, get(R"({"tid":"Cd34"})", m_jOut));
-    EXPECT_EQ(0, get(R"({"tid":"nobody"})", m_jOut));
-    EXPECT_EQ(0, get(R"({"tid":"Ab12"})", m_jOut));
-    EXPECT_EQ(json(R"(["held",
-        {"tid":"Cd34","bind_sid":"S2","uid":1024,"deadline":4000000000,"count":-1,"create_time":300,
-         "function":"VPN","webapi_allow":{"api":{"method":["get"]}},"extra":{}},
-        {"tid":"Ab12","bind_sid":"S1","uid":1024,"deadline":4000000000,"count":1,"create_time":100,
-         "function":"VPN","webapi_allow":{},"extra":{"a":"it's"}}])"),
-              m_jOut);
+    EXPECT_EQ(0, get(R"({"tid":"nobody"})", R"(["held"])"));
+    EXPECT_EQ(json(R"(["held"])"), m_jOut);
+    EXPECT_EQ(0, get(R"({"uid":7})", R"(["held"])"));
+    EXPECT_EQ(2u, m_jOut.size());
+    EXPECT_EQ(Json::Value("held"), m_jOut[0]);
+    EXPECT_EQ(token(R"({"tid":"Ef56","uid":7,"create_time":200,"function":"FTP"})"), m_jOut[1]);
 }
 
 TEST_F(Query, FindsWhatWasSavedByTheValuesThatWereSaved)
@@ -107,8 +155,8 @@ TEST_F(Query, FindsWhatWasSavedByTheValuesThatWereSaved)
     Json::Value jSaved = json(R"({"tid":"t'1","bind_sid":"\u00e9","uid":7,"deadline":-1,"count":-1,
         "create_time":9007199254740993,"function":"it's","webapi_allow":{"b":{"method":["a"]},"a":{}},
         "extra":{"n":0.1,"u":"\u00fc\u0001","q":"'\"","big":18446744073709551615}})");
+    query("DELETE FROM token");
     ASSERT_EQ(0, m_db.tokenCreate(jSaved));
-
     for (const std::string& strName : jSaved.getMemberNames()) {
         SCOPED_TRACE(strName);
         Json::Value jFilter;
@@ -120,50 +168,34 @@ TEST_F(Query, FindsWhatWasSavedByTheValuesThatWereSaved)
     }
 }
 
-TEST_F(Query, ReadsListsAsOneValue)
-{
-    makeDatabase();
-    for (const char* szTid : {"a", "b", "ab", "a''b"}) {
-        insert(szTid, "'',12,0,0,0,'','{}','{}'");
-    }
-    query("UPDATE token SET uid = 1 WHERE tid = 'a'; UPDATE token SET uid = 2 WHERE tid = 'b'");
-
-    EXPECT_EQ(0, get(R"({"tid":["a","b"]})"));
-    EXPECT_EQ("a'b ", found());
-    EXPECT_EQ(0, get(R"({"uid":[1,2]})"));
-    EXPECT_EQ("ab a'b ", found());
-    EXPECT_EQ(1, remove(R"({"tid":["a","b"]})"));
-    EXPECT_EQ(1, remove(R"({"uid":[1,2]})"));
-    EXPECT_EQ("a b ", left());
-}
-
 TEST_F(Query, RefusesWhatItCannotUseAndRunsNothing)
 {
-    const std::string NO_FILTER = "jTokenParam.type() != Json::objectValue";
-    const std::string NO_OUTPUT =
-        "jTokenArrayOut.type() != Json::nullValue && jTokenArrayOut.type() != Json::arrayValue";
-    const struct {
-        const char *szFilter, *szOut;
-        std::string strCondition;
-    } rows[] = {
-        {"null", "null", NO_FILTER},     {"[1,2]", "[]", NO_FILTER}, {R"("x")", "null", NO_FILTER},
-        {"5", "null", NO_FILTER},        {"true", "{}", NO_FILTER},  {"{}", "{}", NO_OUTPUT},
-        {"{}", R"({"a":1})", NO_OUTPUT}, {"{}", R"("")", NO_OUTPUT}, {"{}", "0", NO_OUTPUT},
-        {"{}", "false", NO_OUTPUT},      {"{}", "1.5", NO_OUTPUT},
-    };
-
     m_db.m_strSql = "earlier";
-    for (const auto& row : rows) {
-        SCOPED_TRACE(std::string(row.szFilter) + " to " + row.szOut);
-        m_jOut = json(row.szOut);
-        EXPECT_EQ(-1, get(row.szFilter, m_jOut));
-        EXPECT_EQ(json(row.szOut), m_jOut);
-        EXPECT_EQ((Texts{failed(STORE, row.strCondition)}), takeLines());
-    }
     for (const char* szFilter : {"null", "[1,2]", R"("x")", "5", "true"}) {
         SCOPED_TRACE(szFilter);
+        EXPECT_EQ(-1, get(szFilter));
+        EXPECT_EQ(-1, get(szFilter, "{}"));
         EXPECT_EQ(-1, remove(szFilter, true));
-        EXPECT_EQ((Texts{failed(STORE, NO_FILTER)}), takeLines());
+        EXPECT_LINES(allFailed(STORE, {NO_FILTER, NO_FILTER, NO_FILTER}));
+    }
+    for (const char* szOut : {"{}", R"({"a":1})", R"("")", "0", "false", "1.5"}) {
+        SCOPED_TRACE(szOut);
+        EXPECT_EQ(-1, get("{}", szOut));
+        EXPECT_EQ(json(szOut), m_jOut);
+        EXPECT_LINES(failed(STORE, "jTokenArrayOut.type() != Json::nullValue && "
+                                   "jTokenArrayOut.type() != Json::arrayValue"));
+    }
+    const struct {
+        const char *szName, *szValue, *szCondition;
+    } rows[] = {
+        {nullptr, "x", "!szName || !szName[0]"}, {"", "x", "!szName || !szName[0]"},
+        {nullptr, "", "!szName || !szName[0]"},  {"tid", "", "strValue.empty()"},
+        {"foo", "", "strValue.empty()"},
+    };
+    for (const auto& row : rows) {
+        EXPECT_EQ(-1, getOne(row.szName, row.szValue));
+        EXPECT_EQ(json(R"({"old":1})"), m_jOut);
+        EXPECT_LINES(failed(STORE, row.szCondition));
     }
     EXPECT_EQ("earlier", m_db.m_strSql);
     EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
@@ -171,104 +203,73 @@ TEST_F(Query, RefusesWhatItCannotUseAndRunsNothing)
 
 TEST_F(Query, PassesOnTheFailuresOfTheFilter)
 {
-    const std::string OBJECT_LINE = fail(STORE, "err input type, jTokenParam=(null)");
-
+    const Texts nested = {fail(STORE, "err input type, jTokenParam=(null)"),
+                          failed(STORE, "0 > SqlWhereFromJson(jTokenParam, strSql, true)")};
     m_db.m_strSql = "earlier";
     EXPECT_EQ(-1, get(R"({"tid":{"a":1}})"));
-    EXPECT_EQ((Texts{OBJECT_LINE, failed(STORE, WHERE_FAILED)}), takeLines());
+    EXPECT_LINES(nested);
     EXPECT_EQ(-1, remove(R"({"tid":{"a":1}})", true));
-    EXPECT_EQ((Texts{OBJECT_LINE, failed(STORE, WHERE_FAILED)}), takeLines());
-
+    EXPECT_LINES(nested);
     // The text of the field is the first, that of the order the second.
     seam().fail("sqlite3_mprintf", ENOMEM, 2, 2);
     EXPECT_EQ(-1, get(R"({"uid":7,"sort_by":"uid"})"));
-    EXPECT_EQ((Texts{failed(STORE, "!szSql", ENOMEM),
-                     failed(STORE, "0 > SqlFilterConditionFromJson(jTokenParam, strSql)", ENOMEM)}),
-              takeLines());
+    EXPECT_LINES(allFailed(STORE, {"!szSql", "0 > SqlFilterConditionFromJson(jTokenParam, strSql)"}, ENOMEM));
 
     EXPECT_THROW(get(R"({"sort_by":5})"), Json::Exception);
-    EXPECT_THROW(get(R"({"limit":"5"})"), Json::Exception);
     EXPECT_THROW(get(R"({"tid":[[]]})"), Json::Exception);
     EXPECT_THROW(remove(R"({"uid":[{}]})", true), Json::Exception);
     EXPECT_EQ("earlier", m_db.m_strSql);
     EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Query, FailsWithoutItsColumns)
-{
-    fill();
-    standIns().sqlExpandMemberName = [](std::string&) { return -1; };
-    m_db.m_strSql = "earlier";
-    EXPECT_EQ(-1, get("{}"));
-    EXPECT_EQ((Texts{failed(STORE, "0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)")}), takeLines());
-    EXPECT_EQ("earlier", m_db.m_strSql);
 }
 
 TEST_F(Query, KeepsTheRowsBeforeOneThatCannotBeDecoded)
 {
-    fill();
     query("UPDATE token SET extra = NULL WHERE tid = 'Cd34'");
-    for (const int nErrno : {0, EIO}) {
-        m_nErrno = nErrno;
-        const Texts decoding = {
-            failed(STORE, "NULL == column_name[i] || NULL == column_value[i]", nErrno),
-            failed(STORE, "0 > FillToken(&jTmp, n_column, column_value, column_name)", nErrno)};
-        EXPECT_EQ(-1, get("{}"));
-        EXPECT_EQ("Ab12 ", found());
-        EXPECT_EQ(sqlite3_errstr(SQLITE_ABORT), m_db.m_strErr);
-        EXPECT_EQ(decoding + refused(sqlite3_errstr(SQLITE_ABORT), SELECT + ";", RUN_QUERY_FAILED),
-                  takeLines());
-    }
-
+    EXPECT_EQ(-1, get("{}"));
+    EXPECT_EQ("Ab12", found());
+    const Texts lines = allFailed(STORE, {"NULL == column_name[i] || NULL == column_value[i]",
+                                          "0 > FillToken(&jTmp, n_column, column_value, column_name)"});
+    EXPECT_LINES(lines + failureOf(SELECT + ";", "query aborted") + Texts{failed(STORE, RUN_QUERY_FAILED)});
     EXPECT_EQ(-1, getOne("tid", "Cd34"));
+    EXPECT_LINES(lines + failureOf(selectSql("Cd34"), "query aborted") +
+                 allFailed(STORE, {RUN_QUERY_FAILED, GET_FAILED}));
     EXPECT_EQ(json("{}"), m_jOut);
 }
 
 TEST_F(Query, OpensTheDatabaseOnceAndWhenItIsNeeded)
 {
-    EXPECT_EQ(0, get("{}"));
-    EXPECT_EQ(0, remove("{}", true));
-    EXPECT_EQ(0, getOne("tid", "a"));
-
-    EXPECT_EQ((Texts{"sqlite3_open " VEMO_ATOKEN_DB_PATH}), seam().callsOf({"sqlite3_open"}));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(Query, FailsWhereTheDatabaseCannotBeOpened)
-{
-    const Texts reading = NOT_OPENED + Texts{failed(STORE, RUN_QUERY_FAILED, EPERM)};
-    seam().fail("seteuid", EPERM, 1, 99);
-
-    EXPECT_EQ(-1, get(R"({"uid":7})"));
-    EXPECT_EQ(reading, takeLines());
-    EXPECT_EQ(SELECT + " WHERE  (uid=7 );", m_db.m_strSql);
-
-    EXPECT_EQ(-1, getOne("uid", "8"));
-    EXPECT_EQ(reading + Texts{failed(STORE, "0 > tokenGet(jParam, jTokenArray)", EPERM)}, takeLines());
+    seam().fail("seteuid", EPERM, 1, 6); // each opening raises and puts back
+    EXPECT_EQ(-1, get("{}"));
+    EXPECT_LINES(NOT_OPENED + Texts{failed(STORE, RUN_QUERY_FAILED, EPERM)});
+    EXPECT_EQ(-1, getOne("tid", "8"));
+    EXPECT_LINES(NOT_OPENED + allFailed(STORE, {RUN_QUERY_FAILED, GET_FAILED}, EPERM));
     EXPECT_EQ(json("{}"), m_jOut);
-    EXPECT_EQ(SELECT + " WHERE  (uid=8 );", m_db.m_strSql);
-
     EXPECT_EQ(-1, remove(R"({"uid":9})"));
-    EXPECT_EQ(NOT_OPENED + Texts{failed(STORE, RUN_DELETE_FAILED, EPERM)}, takeLines());
+    EXPECT_LINES(NOT_OPENED + Texts{failed(STORE, RUN_DELETE_FAILED, EPERM)});
     EXPECT_EQ("DELETE FROM token WHERE  (uid=9 );", m_db.m_strSql);
+
+    EXPECT_EQ(0, get("{}"));
+    EXPECT_EQ(1, getOne("tid", "Ab12"));
+    EXPECT_EQ(3, remove("{}", true));
+    EXPECT_EQ((Texts{OPEN}), seam().callsOf({"sqlite3_open"}));
 }
 
 TEST_F(Query, ReportsFailureAfterALockThatItWaitedOut)
 {
-    fill();
     const Lock lock(path(), 2);
     EXPECT_EQ(-1, get(R"({"uid":1024})"));
-    EXPECT_EQ("Ab12 Cd34 ", found());
+    EXPECT_EQ("Ab12 Cd34", found());
     EXPECT_EQ("database is locked", m_db.m_strErr);
-    EXPECT_EQ((Texts{"usleep 10000", "usleep 10000"}), seam().callsOf({"usleep"}));
-    EXPECT_EQ((Texts{fail(STORE, "sql error, sql=" + SELECT + " WHERE  (uid=1024 );")}), takeLines());
-
+    EXPECT_LINES(fail(STORE, "sql error, sql=" + SELECT + " WHERE  (uid=1024 );"));
+    failStatements("SELECT", LOCKED);
+    EXPECT_EQ(-1, getOne("tid", "Ab12"));
+    EXPECT_EQ(json("{}"), m_jOut);
+    EXPECT_LINES(fail(STORE, "sql error, sql=" + selectSql("Ab12"), EIO), failed(STORE, GET_FAILED, EIO));
     EXPECT_EQ(0, get(R"({"uid":1024})"));
     EXPECT_EQ("", m_db.m_strErr);
 }
 
-TEST_F(QueryOne, TakesTheFirstRowWhoseFieldMatches)
+TEST_F(Query, OfOneTakesTheFirstRowWhoseFieldMatches)
 {
     const struct {
         const char *szName, *szValue;
@@ -282,111 +283,119 @@ TEST_F(QueryOne, TakesTheFirstRowWhoseFieldMatches)
         {"bind_sid", "S1", " WHERE  (bind_sid='S1' )", "Ab12"},
         {"bind_sid", "s'1", " WHERE  (bind_sid='s''1' )", nullptr},
         {"tid", "nobody", " WHERE  (tid='nobody' )", nullptr},
-        {"uid", "8", " WHERE  (uid=8 )", nullptr},
-        // The value is a text, in JSON too.
-        {"extra", "{}", " WHERE  (extra='\"{}\"' )", nullptr},
+        {"extra", "{}", " WHERE  (extra='\"{}\"' )", nullptr}, // the value is a text, in JSON too
         // What is no field selects the whole table.
         {"foo", "x", "", "Ab12"},
         {"Tid", "Ef56", "", "Ab12"},
         {"offset", "3", "", "Ab12"},
         {"sort_direction", "desc", "", "Ab12"},
     };
-
-    fill();
     for (const auto& row : rows) {
         SCOPED_TRACE(std::string(row.szName) + "=" + row.szValue);
         EXPECT_EQ(row.szTid ? 1 : 0, getOne(row.szName, row.szValue));
         EXPECT_EQ(SELECT + row.strCondition + ";", m_db.m_strSql);
-        if (row.szTid) {
-            EXPECT_EQ(row.szTid, m_jOut["tid"].asString());
-            EXPECT_EQ(9u, m_jOut.size());
-        } else {
-            EXPECT_EQ(json("{}"), m_jOut);
-        }
-        EXPECT_EQ(Texts{}, takeLines());
+        EXPECT_EQ(row.szTid ? 9u : 0u, m_jOut.size());
+        EXPECT_EQ(row.szTid ? row.szTid : "", m_jOut["tid"].asString());
     }
-
+    // The name of an ordering key is one as well.
+    EXPECT_EQ(-1, getOne("sort_by", "uid"));
+    EXPECT_EQ(json("{}"), m_jOut);
+    EXPECT_LINES(failureOf(SELECT + " WHERE  order by 'uid';", "near \"order\": syntax error") +
+                 allFailed(STORE, {RUN_QUERY_FAILED, GET_FAILED}));
+    EXPECT_THROW(getOne("limit", "0"), Json::Exception);
+    EXPECT_EQ(json("{}"), m_jOut);
     query("DELETE FROM token");
     EXPECT_EQ(0, getOne("foo", "x"));
     EXPECT_EQ(json("{}"), m_jOut);
 }
 
-TEST_F(QueryOne, RefusesEmptyNameAndEmptyValueAndRunsNothing)
+TEST_F(Query, DeletesWhatTheFilterSelects)
 {
-    const std::string NO_NAME = "!szName || !szName[0]";
     const struct {
-        const char *szName, *szValue;
-        std::string strCondition;
+        const char* szFilter;
+        bool bAll;
+        const char* szSql;
+        int nResult;
+        std::string strLeft;
     } rows[] = {
-        {nullptr, "x", NO_NAME},         {"", "x", NO_NAME},
-        {nullptr, "", NO_NAME},          {"tid", "", "strValue.empty()"},
-        {"foo", "", "strValue.empty()"},
+        {R"({"tid":"Ab12"})", false, "DELETE FROM token WHERE  (tid='Ab12' );", 1, "Cd34 Ef56"},
+        {R"({"bind_sid":"S1","function":"VPN"})", false,
+         "DELETE FROM token WHERE  (bind_sid='S1' and function='VPN' );", 1, "Cd34 Ef56"},
+        {"{}", true, "DELETE FROM token;", 3, ""},
+        {"{}", false, "earlier", -1, ALL},
+        {R"({"limit":3})", false, "earlier", -1, ALL},
+        {R"({"limit":3})", true, "DELETE FROM token;", 3, ""},
+        {R"({"foo":"x"})", false, "earlier", -1, ALL},
+        {R"({"foo":{},"sort_by":5,"limit":"x"})", true, "DELETE FROM token;", 3, ""},
+        // A condition counts whatever bAll says; no row is no failure.
+        {R"({"uid":7})", true, "DELETE FROM token WHERE  (uid=7 );", 1, "Ab12 Cd34"},
+        {R"({"uid":[10,24]})", false, "DELETE FROM token WHERE  (uid in (1024 ) );", 2, "Ef56"},
+        {R"({"tid":"nobody"})", false, "DELETE FROM token WHERE  (tid='nobody' );", 0, ALL},
+        {R"({"uid":1024,"limit":0,"offset":0,"sort_by":"uid"})", false,
+         "DELETE FROM token WHERE  (uid=1024 );", 2, "Ef56"},
+        {R"({"tid":"' OR 1; --"})", true, "DELETE FROM token WHERE  (tid=''' OR 1; --' );", 0, ALL},
     };
-
-    m_db.m_strSql = "earlier";
     for (const auto& row : rows) {
-        EXPECT_EQ(-1, getOne(row.szName, row.szValue));
-        EXPECT_EQ(json(R"({"old":1})"), m_jOut);
-        EXPECT_EQ((Texts{failed(STORE, row.strCondition)}), takeLines());
+        SCOPED_TRACE(std::string(row.szFilter) + (row.bAll ? " all" : ""));
+        fill();
+        m_db.m_strSql = "earlier";
+        EXPECT_EQ(row.nResult, remove(row.szFilter, row.bAll));
+        EXPECT_EQ(row.szSql, m_db.m_strSql);
+        EXPECT_EQ(row.strLeft, tids());
+        EXPECT_EQ("", m_db.m_strErr);
+        EXPECT_LINES(0 > row.nResult ? Texts{failed(STORE, "strSql.empty()")} : Texts{});
     }
-    EXPECT_EQ("earlier", m_db.m_strSql);
-    EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
 }
 
-TEST_F(QueryOne, LeavesAnEmptyObjectAfterAFailedQuery)
+TEST_F(Query, DeletesNothingWhereSqliteRefusesTheStatement)
 {
-    const std::string SQL = SELECT + " WHERE  order by 'uid';";
-    fill();
-    // The name of an ordering key is one as well.
-    EXPECT_EQ(-1, getOne("sort_by", "uid"));
-    EXPECT_EQ(json("{}"), m_jOut);
-    EXPECT_EQ(refused("near \"order\": syntax error", SQL, RUN_QUERY_FAILED) +
-                  Texts{failed(STORE, "0 > tokenGet(jParam, jTokenArray)")},
-              takeLines());
-
-    EXPECT_THROW(getOne("limit", "0"), Json::Exception);
-    EXPECT_EQ(json("{}"), m_jOut);
-
-    const Lock lock(path(), 2);
-    EXPECT_EQ(-1, getOne("tid", "Ab12"));
-    EXPECT_EQ(json("{}"), m_jOut);
-    EXPECT_EQ((Texts{fail(STORE, "sql error, sql=" + SELECT + " WHERE  (tid='Ab12' );"),
-                     failed(STORE, "0 > tokenGet(jParam, jTokenArray)")}),
-              takeLines());
+    for (const bool bAll : {false, true}) {
+        const std::string strSql = "DELETE FROM token WHERE  ( );";
+        errno = EIO;
+        EXPECT_EQ(-1, remove(R"({"uid":[]})", bAll));
+        EXPECT_EQ("near \")\": syntax error", m_db.m_strErr);
+        EXPECT_LINES(failureOf(strSql, m_db.m_strErr, EIO) + Texts{failed(STORE, RUN_DELETE_FAILED, EIO)});
+    }
+    const Lock lock(path());
+    errno = 0;
+    EXPECT_EQ(-1, remove("{}", true));
+    EXPECT_EQ(500u, seam().callsOf({"usleep"}).size());
+    EXPECT_EQ("database is locked", m_db.m_strErr);
+    EXPECT_LINES(ordinary(STORE, "i=500,run sql failed, error=database is locked, sql=DELETE FROM token;"),
+                 fail(STORE, "run sql failed, sql=DELETE FROM token;"), failed(STORE, RUN_DELETE_FAILED));
 }
 
-class QueryInSystemLog : public QueryTest {
-protected:
-    QueryInSystemLog() : QueryTest(Destination::Syslog) {}
-};
-
-TEST_F(QueryInSystemLog, TellsTheErrorInFrontWhenThereIsOne)
+TEST_F(Query, DeletesAfterALockThatItWaitedOutAndReportsFailure)
 {
-    const std::string SQL = "DELETE FROM token WHERE  (uid=7 );";
-    const std::string SORTED = SELECT + " WHERE  order by 'uid';";
-    const std::string SYNTAX_ERROR = "near \"order\": syntax error";
-    makeDatabase();
-    ASSERT_EQ(0, m_db.initDb());
-
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    for (const int nErrno : {0, EIO}) {
-        m_nErrno = nErrno;
-        failStatements("DELETE", {SQLITE_BUSY, "database is locked", nErrno});
-        EXPECT_EQ(-1, remove(R"({"uid":7})"));
-        EXPECT_EQ(0, remove(R"({"uid":7})"));
-        EXPECT_EQ(-1, get(R"({"sort_by":"uid"})"));
-
-        EXPECT_EQ(inSystemLog(
-                      Texts{ordinary(STORE, "run sql=" + SQL),
-                            ordinary(STORE, "i=0,run sql failed, error=database is locked, sql=" + SQL),
-                            ordinary(STORE, "run sql=" + SQL), ordinary(STORE, "change rv=0, run sql=" + SQL),
-                            fail(STORE, "sql error, sql=" + SQL, nErrno), ordinary(STORE, "run sql=" + SQL),
-                            ordinary(STORE, "change rv=0, run sql=" + SQL),
-                            ordinary(STORE, "delete token number=0"), ordinary(STORE, "run sql=" + SORTED)} +
-                          refused(SYNTAX_ERROR, SORTED, RUN_QUERY_FAILED),
-                      nErrno),
-                  takeLines(Destination::Syslog));
+    const std::string strSql = "DELETE FROM token WHERE  (uid=1024 );";
+    const std::string strRun = ordinary(STORE, "run sql=" + strSql);
+    const Texts debug = {
+        strRun, ordinary(STORE, "i=0,run sql failed, error=database is locked, sql=" + strSql),
+        strRun, ordinary(STORE, "i=1,run sql failed, error=database is locked, sql=" + strSql),
+        strRun, ordinary(STORE, "change rv=2, run sql=" + strSql)};
+    for (const bool blDebug : {false, true}) {
+        debugInfo(blDebug);
+        fill();
+        const Lock lock(path(), 2);
+        EXPECT_EQ(-1, remove(R"({"uid":1024})"));
+        EXPECT_EQ("Ef56", tids());
+        EXPECT_EQ("database is locked", m_db.m_strErr);
+        EXPECT_LINES((blDebug ? debug : Texts{}) + Texts{fail(STORE, "sql error, sql=" + strSql)});
     }
+}
+
+TEST_F(Query, TellsTheNumberOfDeletedTokensInDebugMode)
+{
+    debugInfo(true);
+    for (const std::string strNumber : {"2", "0"}) {
+        const std::string strSql = "DELETE FROM token WHERE  (function='VPN' );";
+        EXPECT_EQ(std::stoi(strNumber), remove(R"({"function":"VPN"})"));
+        EXPECT_LINES(ordinary(STORE, "run sql=" + strSql),
+                     ordinary(STORE, "change rv=" + strNumber + ", run sql=" + strSql),
+                     ordinary(STORE, "delete token number=" + strNumber));
+    }
+    EXPECT_EQ(0, get("{}"));
+    EXPECT_LINES(ordinary(STORE, "run sql=" + SELECT + ";"));
 }
 
 } // namespace

@@ -1,94 +1,121 @@
-// Running statements and waiting for locks.
+// Running statements, waiting for locks, and the purge of expired tokens.
 
 #include <unistd.h>
 
-#include "BothLogs.h"
+#include "AccessTokenUtil.h"
 #include "Statements.h"
+#include "StoreTest.h"
+
+using VEMO_ACCESS_TOKEN::debugInfo;
 
 namespace {
+
+const std::string UPDATE = "UPDATE token SET extra = '%n%s';"; // of as many rows as there are
+const std::string UNKNOWN = "Unknow Error!!";
+const std::string RUN_LINE = ordinary(STORE, "run sql=" + UPDATE);
+
+int countRow(void* pnRows, int, char**, char**)
+{
+    ++*static_cast<int*>(pnRows);
+    return 0;
+}
 
 int stop(void*, int, char**, char**)
 {
     return 1;
 }
 
-class RunSql : public StoreTest {};
-
-TEST_F(RunSql, FirstStatementOpens)
+// The line that a try was in vain.
+std::string tryLine(int nTry, const std::string& strError, const std::string& strSql = UPDATE)
 {
-    ASSERT_EQ(0, seteuid(UID_CALLER));
-    AccessTokenDbApi db;
-    db.m_strSql = UPDATE;
-
-    EXPECT_EQ(0, db.runSql());
-
-    EXPECT_EQ((Texts{UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN, CREATE, CHANGES, BACK, "sqlite3_exec " + UPDATE,
-                     CHANGES}),
-              seam().callsOf(OPENING_CALLS));
-    EXPECT_EQ(UPDATE, db.m_strSql);
-    EXPECT_EQ(Texts{}, takeLines());
+    return ordinary(STORE,
+                    "i=" + std::to_string(nTry) + ",run sql failed, error=" + strError + ", sql=" + strSql);
 }
 
-TEST_F(RunSql, NeverOpensAsRunSqlEx)
+// A store that is open on a table of two tokens.
+class RunSql : public TableTest {
+protected:
+    void SetUp() override
+    {
+        TableTest::SetUp();
+        insert(R"({"tid":"a","deadline":-1})");
+        insert(R"({"tid":"b"})");
+        ASSERT_EQ(0, m_db.initDb());
+        reset();
+    }
+
+    int run(const std::string& strSql, SqlCallback pCallback = nullptr, void* pArgument = nullptr)
+    {
+        m_db.m_strSql = strSql;
+        m_db.m_strErr = "stale";
+        const int nResult = m_db.runSql(pCallback, pArgument);
+        EXPECT_EQ(strSql, m_db.m_strSql);
+        return nResult;
+    }
+};
+
+TEST_F(RunSql, OpensTheDatabaseWhichRunSqlExDoesNot)
 {
     AccessTokenDbApi db;
-
     EXPECT_EQ(-1, db.runSqlEx(UPDATE, nullptr, nullptr));
-
-    EXPECT_EQ(14u, db.m_strErr.size());
     EXPECT_EQ(UNKNOWN, db.m_strErr);
     EXPECT_EQ("", db.m_strSql);
+    EXPECT_LINES(tryLine(0, "(null)"));
     EXPECT_EQ((Texts{"sqlite3_exec " + UPDATE}), seam().callsOf(OPENING_CALLS));
-    EXPECT_EQ((Texts{ordinary(STORE, "i=0,run sql failed, error=(null), sql=" + UPDATE)}), takeLines());
+    db.m_strSql = UPDATE;
+    EXPECT_EQ(2, db.runSql());
+    EXPECT_EQ((Texts{OPEN}), seam().callsOf({"sqlite3_open"}));
+}
+
+TEST_F(RunSql, RefusesAnEmptyStatement)
+{
+    AccessTokenDbApi db;
+    db.m_strErr = "stale";
+    errno = EINTR;
+    EXPECT_EQ(-1, db.runSql());
+    EXPECT_EQ(-1, db.runSql(countRow, nullptr));
+    EXPECT_EQ("stale", db.m_strErr);
+    EXPECT_EQ(-1, db.runSqlEx("", nullptr, nullptr));
+    EXPECT_EQ(UNKNOWN, db.m_strErr);
+    const std::string strLine = fail(STORE, "no correct sql", EINTR);
+    EXPECT_LINES(strLine, strLine, failed(STORE, "0 >= strSql.length()", EINTR));
+    EXPECT_EQ(Texts{}, seam().calls);
 }
 
 TEST_F(RunSql, PassesConnectionStatementCallbackAndArgument)
 {
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-    db.m_strSql = "SELECT tid FROM token";
     int nRows = 0;
-
-    EXPECT_EQ(0, db.runSql(countRow, &nRows));
+    EXPECT_EQ(0, run("SELECT tid FROM token", countRow, &nRows));
     EXPECT_EQ(2, nRows);
-    EXPECT_EQ(0, db.runSqlEx("SELECT 1", countRow, &nRows));
+    EXPECT_EQ(0, m_db.runSqlEx("SELECT 1", countRow, &nRows));
     EXPECT_EQ(3, nRows);
+    EXPECT_EQ("SELECT tid FROM token", m_db.m_strSql);
     EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_changes"}));
 
-    seam().sqliteExec = [&](sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument,
+    seam().sqliteExec = [&](sqlite3* pDb, const char* szSql, SqlCallback pCallback, void* pArgument,
                             char** pszError) {
-        EXPECT_EQ(db.m_pDb, pDb);
+        EXPECT_EQ(m_db.m_pDb, pDb);
         EXPECT_STREQ("SELECT 2", szSql);
-        EXPECT_EQ(&countRow, callback);
+        EXPECT_EQ(&countRow, pCallback);
         EXPECT_EQ(&nRows, pArgument);
-        EXPECT_NE(nullptr, pszError);
         EXPECT_EQ(nullptr, *pszError);
         return SQLITE_OK;
     };
-    EXPECT_EQ(0, db.runSqlEx("SELECT 2", countRow, &nRows));
-    EXPECT_EQ("SELECT tid FROM token", db.m_strSql);
+    EXPECT_EQ(0, m_db.runSqlEx("SELECT 2", countRow, &nRows));
 }
 
-TEST_F(RunSql, CallbackThatStopsFailsTheStatement)
+TEST_F(RunSql, FailsWhenTheCallbackStopsIt)
 {
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-    db.m_strSql = "SELECT tid FROM token";
-
-    EXPECT_EQ(-1, db.runSql(stop, nullptr));
-
-    EXPECT_EQ("query aborted", db.m_strErr);
-    EXPECT_EQ((Texts{"sqlite3_exec SELECT tid FROM token"}), seam().callsOf({"sqlite3_exec", "usleep"}));
-    EXPECT_EQ(failureOf(db.m_strSql, "query aborted"), takeLines());
+    EXPECT_EQ(-1, run("SELECT tid FROM token", stop));
+    EXPECT_EQ("query aborted", m_db.m_strErr);
+    EXPECT_EQ((Texts{"SELECT tid FROM token"}), seam().statements());
+    EXPECT_LINES(failureOf(m_db.m_strSql, "query aborted"));
 }
 
 // The number is SQLite's own, which outlives statements that change no row.
 TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
 {
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-
-    const std::pair<const char*, int> cases[] = {
+    const std::pair<const char*, int> rows[] = {
         {"UPDATE token SET uid = 1", 2},
         {"SELECT tid FROM token", 2},
         {"DELETE FROM token WHERE tid = 'c'", 0},
@@ -96,189 +123,201 @@ TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
         {" ", 1},
         {"-- nothing", 1},
     };
-    for (const auto& [szSql, nChanges] : cases) {
+    for (const auto& [szSql, nChanges] : rows) {
         SCOPED_TRACE(szSql);
-        db.m_strSql = szSql;
-        EXPECT_EQ(nChanges, db.runSql());
-        EXPECT_EQ("", db.m_strErr);
+        EXPECT_EQ(nChanges, run(szSql));
+        EXPECT_EQ("", m_db.m_strErr);
+        m_db.m_strErr = "stale";
+        EXPECT_LE(0, m_db.runSqlEx("SELECT 1", nullptr, nullptr));
+        EXPECT_EQ("stale", m_db.m_strErr);
     }
-    EXPECT_EQ(Texts{}, takeLines());
 }
 
-TEST_F(RunSql, EmptiesTheErrorTextWhichRunSqlExDoesNot)
+// The text of the error decides whether a statement is tried again, not the code.
+TEST_F(RunSql, TriesAgainOnlyAfterLocks)
 {
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-    db.m_strSql = UPDATE;
-
-    db.m_strErr = "stale";
-    EXPECT_EQ(2, db.runSqlEx(UPDATE, nullptr, nullptr));
-    EXPECT_EQ("stale", db.m_strErr);
-    EXPECT_EQ(2, db.runSql());
-    EXPECT_EQ("", db.m_strErr);
-}
-
-// Locks
-
-struct StatementCase {
-    const char* szName;
-    std::vector<Answer> answers; // one for each try
-    bool blSuccess;
-    std::string strErrAfter;
-    const char* szLine; // of the failure, up to the statement
-};
-
-const std::vector<StatementCase> STATEMENTS = {
-    {"Success", {RUN}, true, "", ""},
-    {"SuccessWithText", {{SQLITE_OK, "no matter"}}, true, "", ""},
-    {"LockEndsAfterTwoTries",
-     {LOCKED, {SQLITE_BUSY, "(2) database is locked"}, RUN},
-     true,
-     "(2) database is locked",
-     ""},
-    {"LockTextOfAnotherCode",
-     {{SQLITE_ERROR, "cannot commit: database is locked, somehow"}, RUN},
-     true,
-     "cannot commit: database is locked, somehow",
-     ""},
-    {"LockThenError",
-     {LOCKED, DISK_ERROR},
-     false,
-     "disk I/O error",
-     "i=1,run sql failed, error=disk I/O error"},
-    {"LockThenNoText",
-     {LOCKED, {SQLITE_MISUSE, nullptr}},
-     false,
-     UNKNOWN,
-     "i=1,run sql failed, error=(null)"},
-    {"BusyWithoutTheText", {{SQLITE_BUSY, "busy"}}, false, "busy", "i=0,run sql failed, error=busy"},
-    {"BusyWithoutText", {{SQLITE_BUSY, nullptr}}, false, UNKNOWN, "i=0,run sql failed, error=(null)"},
-    {"LockedTable",
-     {{SQLITE_LOCKED, "database table is locked: token"}},
-     false,
-     "database table is locked: token",
-     "i=0,run sql failed, error=database table is locked: token"},
-    {"OtherSpelling",
-     {{SQLITE_BUSY, "Database is locked"}},
-     false,
-     "Database is locked",
-     "i=0,run sql failed, error=Database is locked"},
-    {"EmptyText", {{SQLITE_ERROR, ""}}, false, "", "i=0,run sql failed, error="},
-    {"TextWithDirectives",
-     {{SQLITE_ERROR, "near \"%n%s\""}},
-     false,
-     "near \"%n%s\"",
-     "i=0,run sql failed, error=near \"%n%s\""},
-};
-
-class RunSqlAnswered : public InBothLogs<StatementCase> {
-protected:
-    Texts calls(bool blCallback) const
-    {
-        Texts calls(1, "sqlite3_exec " + UPDATE);
-        for (size_t i = 1; i < theCase().answers.size(); ++i) {
-            calls.insert(calls.end(), {"usleep 10000", "sqlite3_exec " + UPDATE});
+    const struct {
+        const char* szName;
+        std::vector<Answer> answers; // one for each try
+        const char* szErrAfter;
+        const char* szError; // of the failure line; null when the statement succeeds
+    } rows[] = {
+        {"success", {RUN}, "", nullptr},
+        {"success with a text", {{SQLITE_OK, "no matter"}}, "", nullptr},
+        {"lock", {LOCKED, {SQLITE_BUSY, "(2) database is locked"}, RUN}, "(2) database is locked", nullptr},
+        {"lock of another code",
+         {{SQLITE_ERROR, "cannot: database is locked!"}, RUN},
+         "cannot: database is locked!",
+         nullptr},
+        {"lock, then error", {LOCKED, DISK_ERROR}, "disk I/O error", "disk I/O error"},
+        {"lock, then no text", {LOCKED, {SQLITE_MISUSE, nullptr}}, "Unknow Error!!", "(null)"},
+        {"busy with another text", {{SQLITE_BUSY, "busy"}}, "busy", "busy"},
+        {"busy without text", {{SQLITE_BUSY, nullptr}}, "Unknow Error!!", "(null)"},
+        {"locked table",
+         {{SQLITE_LOCKED, "database table is locked: a"}},
+         "database table is locked: a",
+         "database table is locked: a"},
+        {"other spelling", {{SQLITE_BUSY, "Database is locked"}}, "Database is locked", "Database is locked"},
+        {"empty text", {{SQLITE_ERROR, ""}}, "", ""},
+        {"directives", {{SQLITE_ERROR, "near \"%n%s\""}}, "near \"%n%s\"", "near \"%n%s\""},
+    };
+    for (const auto& row : rows) {
+        for (const bool blCallback : {false, true}) {
+            SCOPED_TRACE(::testing::Message() << row.szName << " " << blCallback);
+            const int nWaits = static_cast<int>(row.answers.size()) - 1;
+            reset();
+            answerStatements(UPDATE, row.answers);
+            EXPECT_EQ(row.szError ? -1 : blCallback ? 0 : 2, run(UPDATE, blCallback ? countRow : nullptr));
+            EXPECT_EQ(row.szErrAfter, m_db.m_strErr);
+            Texts calls = {"sqlite3_exec " + UPDATE};
+            for (int i = 0; i < nWaits; ++i) {
+                calls = calls + Texts{"usleep 10000", calls[0]};
+            }
+            EXPECT_EQ(calls + (row.szError || blCallback ? Texts{} : Texts{CHANGES}), seam().calls);
+            EXPECT_LINES(row.szError ? Texts{tryLine(nWaits, row.szError),
+                                             fail(STORE, "run sql failed, sql=" + UPDATE, EIO)}
+                                     : Texts{});
         }
-        if (theCase().blSuccess && !blCallback) {
-            calls.push_back("sqlite3_changes");
-        }
-        return calls;
-    }
-};
-
-TEST_P(RunSqlAnswered, RetriesOnlyLocks)
-{
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
-    db.m_strSql = UPDATE;
-    std::vector<Line> lines;
-    if (!theCase().blSuccess) {
-        lines = {ordinaryLine(theCase().szLine + (", sql=" + UPDATE), EIO),
-                 failLine("run sql failed, sql=" + UPDATE, EIO)};
-    }
-
-    for (const bool blCallback : {false, true}) {
-        SCOPED_TRACE(blCallback);
-        seam().calls.clear();
-        errno = 0;
-        answerStatements(UPDATE, theCase().answers);
-        db.m_strErr = "stale";
-        EXPECT_EQ(theCase().blSuccess ? (blCallback ? 0 : 2) : -1,
-                  db.runSql(blCallback ? countRow : nullptr, nullptr));
-        EXPECT_EQ(theCase().strErrAfter, db.m_strErr);
-        EXPECT_EQ(calls(blCallback), seam().callsOf({"sqlite3_exec", "usleep", "sqlite3_changes"}));
-        expectLines(lines);
     }
 }
-
-INSTANTIATE_TEST_SUITE_P(All, RunSqlAnswered, inBothLogs(STATEMENTS), ::testing::PrintToStringParamName());
 
 TEST_F(RunSql, WaitsForAnotherConnection)
 {
-    AccessTokenDbApi db;
-    openWithTwoRows(db);
     const Lock lock(path(), 3, "DELETE FROM token WHERE tid = 'a'");
-    db.m_strSql = UPDATE;
-
-    EXPECT_EQ(1, db.runSql());
-
-    EXPECT_EQ("database is locked", db.m_strErr);
-    EXPECT_EQ((Texts{"usleep 10000", "usleep 10000", "usleep 10000"}), seam().callsOf({"usleep"}));
+    EXPECT_EQ(1, run(UPDATE));
+    EXPECT_EQ("database is locked", m_db.m_strErr);
+    EXPECT_EQ(Texts(3, "usleep 10000"), seam().callsOf({"usleep"}));
     EXPECT_EQ((Texts{"b|%n%s"}), query("SELECT tid, extra FROM token"));
-    EXPECT_EQ(Texts{}, takeLines());
 }
 
-class RunSqlLocked : public WithSwitches {};
-
-TEST_P(RunSqlLocked, TellsStatementTriesAndChangesInDebugMode)
+TEST_F(RunSql, TellsEachTryAndTheChangesInDebugMode)
 {
-    const std::string strTail = ",run sql failed, error=database is locked, sql=" + UPDATE;
-    sayInDebug(ordinaryLine("run sql=" + UPDATE, 0));
-    sayInDebug(ordinaryLine("i=0" + strTail, EIO));
-    sayInDebug(ordinaryLine("run sql=" + UPDATE, EIO));
-    sayInDebug(ordinaryLine("i=1" + strTail, EIO));
-    sayInDebug(ordinaryLine("run sql=" + UPDATE, EIO));
-    const std::vector<Line> linesOfTries = m_lines;
-    sayInDebug(ordinaryLine("change rv=2, run sql=" + UPDATE, EIO));
-
+    const Texts tries = {RUN_LINE, tryLine(0, "database is locked"), RUN_LINE,
+                         tryLine(1, "database is locked"), RUN_LINE};
+    debugInfo(true);
     failStatements(UPDATE, LOCKED, 2);
     EXPECT_EQ(2, m_db.runSqlEx(UPDATE, nullptr, nullptr));
-    expectLines(m_lines);
-
+    EXPECT_LINES(tries + Texts{ordinary(STORE, "change rv=2, run sql=" + UPDATE)});
     failStatements(UPDATE, LOCKED, 2);
-    errno = 0;
     EXPECT_EQ(0, m_db.runSqlEx(UPDATE, countRow, nullptr));
-    expectLines(linesOfTries);
+    EXPECT_LINES(tries);
 }
 
-TEST_P(RunSqlLocked, GivesUpAfter500Tries)
+TEST_F(RunSql, GivesUpAfter500Tries)
 {
-    Texts calls;
-    Texts errors;
-    for (int i = 0; i < 500; ++i) {
-        calls.insert(calls.end(), {"sqlite3_exec " + UPDATE, "usleep 10000"});
-        errors.push_back("database is locked (" + std::to_string(i) + ")");
-        sayInDebug(ordinaryLine("run sql=" + UPDATE, 0 == i ? 0 : EIO));
-        sayInDebug(ordinaryLine(
-            "i=" + std::to_string(i) + ",run sql failed, error=" + errors.back() + ", sql=" + UPDATE, EIO));
+    for (const bool blDebug : {false, true}) {
+        debugInfo(blDebug);
+        Texts calls, errors, lines;
+        std::vector<Answer> answers;
+        for (int i = 0; i < 500; ++i) {
+            calls.insert(calls.end(), {"sqlite3_exec " + UPDATE, "usleep 10000"});
+            errors.push_back("database is locked (" + std::to_string(i) + ")");
+            lines.insert(lines.end(), {RUN_LINE, tryLine(i, errors.back())});
+        }
+        for (const std::string& strError : errors) {
+            answers.push_back({SQLITE_BUSY, strError.c_str()});
+        }
+        answerStatements(UPDATE, answers);
+        seam().calls.clear();
+        EXPECT_EQ(-1, run(UPDATE));
+        EXPECT_EQ(errors.back(), m_db.m_strErr);
+        EXPECT_EQ(calls, seam().calls);
+        EXPECT_LINES((blDebug ? lines : Texts{}) +
+                     Texts{tryLine(500, errors.back()), fail(STORE, "run sql failed, sql=" + UPDATE, EIO)});
     }
-    say(ordinaryLine("i=500,run sql failed, error=database is locked (499), sql=" + UPDATE, EIO));
-    say(failLine("run sql failed, sql=" + UPDATE, EIO));
-    std::vector<Answer> answers;
-    for (const std::string& strError : errors) {
-        answers.push_back({SQLITE_BUSY, strError.c_str()});
-    }
-    answerStatements(UPDATE, answers);
-    m_db.m_strSql = UPDATE;
-
-    EXPECT_EQ(-1, m_db.runSql());
-
-    EXPECT_EQ("database is locked (499)", m_db.m_strErr);
-    EXPECT_EQ(calls, seam().callsOf({"sqlite3_exec", "usleep", "sqlite3_changes"}));
-    expectLines(m_lines);
 }
 
-INSTANTIATE_TEST_SUITE_P(All, RunSqlLocked, inBothLogs<Switches>({QUIET, DEBUG}),
-                         ::testing::PrintToStringParamName());
+// The purge
+
+TEST_F(RunSql, PurgeTakesDeadlinesBeforeNow)
+{
+    for (const time_t now : {time_t(0), NOW, time_t(4102444800)}) {
+        SCOPED_TRACE(now);
+        const std::string strNow = std::to_string(now);
+        const std::string strBefore = std::to_string(now - 1);
+        const std::string strAfter = std::to_string(now + 1);
+        // Nothing protects -1. A text that is no number comes after all numbers.
+        const Texts kept = {"NULL", strNow, strNow, strAfter, "9223372036854775807", "'never'"};
+        query("DELETE FROM token");
+        int nTid = 0;
+        for (const std::string& strDeadline :
+             {std::string("-1"), std::string("-9223372036854775808"), strBefore, strBefore + ".5",
+              "'" + strBefore + "'", kept[0], strNow, "'" + strNow + "'", kept[3], kept[4], kept[5]}) {
+            query("INSERT INTO token (tid, deadline, function) VALUES (" + std::to_string(nTid++) + ", " +
+                  strDeadline + ", '')");
+        }
+        seam().clock = now;
+        m_db.m_strErr = "stale";
+        EXPECT_EQ(0, m_db.cleanExpireToken(true)); // no number
+        EXPECT_EQ("", m_db.m_strErr);
+        EXPECT_EQ(PURGE, m_db.m_strSql);
+        EXPECT_EQ(kept, query("SELECT quote(deadline) FROM token ORDER BY rowid"));
+        EXPECT_EQ(0, m_db.cleanExpireToken(false)); // with none to delete
+        for (const bool blLog : {false, true}) {
+            insert(R"({"tid":"old","deadline":-1})");
+            EXPECT_EQ(0, api().cleanExpireToken(blLog));
+            EXPECT_EQ("", countOf("old"));
+        }
+    }
+}
+
+// The purge's own lines can be kept quiet; those that the store writes for any statement cannot. After a lock
+// that was waited out the purge has taken effect, and yet reports failure.
+TEST_F(RunSql, PurgeFailsWithTheLinesThatWereAskedFor)
+{
+    const std::string strRun = ordinary(STORE, "run sql=" + PURGE);
+    const std::string strLocked = tryLine(0, "database is locked", PURGE);
+    const Texts refused = failureOf(PURGE, "disk I/O error", EIO);
+    const struct {
+        Answer answer;
+        Texts always, debug; // the store's lines
+        std::string strOwn;
+        const char* szLeft;
+    } rows[] = {
+        {DISK_ERROR, refused, Texts{strRun} + refused, "run sql failed", "a b"},
+        {LOCKED,
+         {},
+         {strRun, strLocked, strRun, ordinary(STORE, "change rv=1, run sql=" + PURGE)},
+         "sql error, sql=" + PURGE,
+         "b"},
+    };
+    for (const bool blDebug : {false, true}) {
+        debugInfo(blDebug);
+        for (const bool blLog : {false, true}) {
+            for (const auto& row : rows) {
+                SCOPED_TRACE(::testing::Message() << row.strOwn << blLog << blDebug);
+                const Texts lines = (blDebug ? row.debug : row.always) +
+                                    (blLog || blDebug ? Texts{fail(STORE, row.strOwn, EIO)} : Texts{});
+                const auto fail_ = [&](auto purge) {
+                    query("DELETE FROM token WHERE tid = 'a'");
+                    insert(R"({"tid":"a","deadline":-1})");
+                    reset();
+                    failStatements(PURGE, row.answer);
+                    EXPECT_EQ(-1, purge());
+                    EXPECT_EQ(row.szLeft, tids());
+                };
+                fail_([&] { return m_db.cleanExpireToken(blLog); });
+                EXPECT_LINES(lines);
+                fail_([&] { return api().cleanExpireToken(blLog); });
+                Texts service;
+                if (blLog) {
+                    service = {failed(SERVICE, "0 > m_pDb->cleanExpireToken(blLogErr)", EIO)};
+                } else if (blDebug) {
+                    service = {fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)", EIO)};
+                }
+                EXPECT_LINES(lines + service);
+            }
+        }
+    }
+}
+
+TEST_F(RunSql, PurgeFailsWhereTheDatabaseCannotBeOpened)
+{
+    AccessTokenDbApi db;
+    seam().fail("seteuid", EPERM, 1, 2);
+    EXPECT_EQ(-1, db.cleanExpireToken(true));
+    EXPECT_LINES(NOT_OPENED + Texts{fail(STORE, "run sql failed", EPERM)});
+    EXPECT_EQ("a b", tids());
+}
 
 } // namespace

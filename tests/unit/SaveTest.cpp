@@ -1,41 +1,14 @@
-// Saving records: the statements, and what is refused.
+// Saving records: the statements, what is refused, and that what was saved comes back as it was.
 
+#include <cmath>
 #include <cstring>
-#include <functional>
+#include <limits>
 
 #include "AccessTokenUtil.h"
-#include "SaveTest.h"
-#include "StandIns.h"
 #include "Statements.h"
+#include "StoreTest.h"
 
 namespace {
-
-const char* const DIRECTIVES = "%Q,%Q,%lld,%lld,%lld,%lld,%Q,%Q,%Q";
-const char* const FIELDS[] = {"tid",         "bind_sid", "uid",          "deadline", "count",
-                              "create_time", "function", "webapi_allow", "extra"};
-
-// The values of record() in SQL.
-const Texts VALUES = {"'a'",
-                      "'sid'",
-                      "1026",
-                      "-1",
-                      "1",
-                      "1700000000",
-                      "'f'",
-                      R"('{"Example.Api":{"method":["get","list"]}}')",
-                      R"('{"b":[1,null]}')"};
-const char* const RECORD_TEXT =
-    R"({"bind_sid":"sid","count":1,"create_time":1700000000,"deadline":-1,"extra":{"b":[1,null]},)"
-    R"("function":"f","tid":"a","uid":1026,"webapi_allow":{"Example.Api":{"method":["get","list"]}}})";
-
-std::string statement(const std::string& strVerb, const Texts& values = VALUES)
-{
-    std::string strValues;
-    for (const std::string& strValue : values) {
-        strValues.append(strValues.empty() ? "" : ",").append(strValue);
-    }
-    return strVerb + " INTO token (" + COLUMNS + ") VALUES (" + strValues + ")";
-}
 
 // What is logged of a save whose statement failed.
 Texts failureLines(const std::string& strSql, const std::string& strError)
@@ -43,41 +16,93 @@ Texts failureLines(const std::string& strSql, const std::string& strError)
     return failureOf(strSql, strError) + Texts{failed(STORE, "0 > runSql()")};
 }
 
-class Save : public SaveTest {};
+std::string bytesFrom(int nFirst)
+{
+    std::string strBytes;
+    for (int nByte = nFirst; nByte < 256; ++nByte) {
+        strBytes += static_cast<char>(nByte);
+    }
+    return strBytes;
+}
+
+class Save : public TableTest {
+protected:
+    void SetUp() override
+    {
+        TableTest::SetUp();
+        ASSERT_EQ(0, m_db.initDb());
+        reset();
+    }
+
+    // Saves a record, which stays as it is.
+    int save(Json::Value jToken, bool blCreate = false)
+    {
+        const Json::Value jBefore = jToken;
+        const int nResult = m_db.tokenSave(jToken, blCreate);
+        EXPECT_EQ(jBefore, jToken);
+        return nResult;
+    }
+
+    // The record of a token, as it comes back.
+    Json::Value stored(std::string strTid = "t")
+    {
+        Json::Value jToken;
+        EXPECT_EQ(1, m_db.tokenGetOne("tid", strTid, jToken));
+        return jToken;
+    }
+
+    // What is saved comes back equal, and once more when that is saved again.
+    void expectSame(const Json::Value& jToken)
+    {
+        EXPECT_EQ(0, save(jToken));
+        Json::Value jStored = stored(jToken["tid"].asString());
+        EXPECT_EQ(jToken, jStored);
+        EXPECT_EQ(0, save(jStored));
+        EXPECT_EQ(jToken, stored(jToken["tid"].asString()));
+    }
+
+    void expectSameJson(const Json::Value& jValue)
+    {
+        Json::Value jToken = token();
+        jToken["extra"] = jToken["webapi_allow"] = jValue;
+        expectSame(jToken);
+    }
+};
 
 TEST_F(Save, RunsOneStatement)
 {
     const struct {
-        const char* szTrace;
-        int (*pSave)(AccessTokenDbApi&, Json::Value&);
         const char* szVerb;
-    } cases[] = {
-        {"tokenCreate", [](AccessTokenDbApi& db, Json::Value& j) { return db.tokenCreate(j); }, "INSERT"},
-        {"tokenUpdate", [](AccessTokenDbApi& db, Json::Value& j) { return db.tokenUpdate(j); }, "REPLACE"},
-        {"tokenSave false", [](AccessTokenDbApi& db, Json::Value& j) { return db.tokenSave(j, false); },
-         "REPLACE"},
-        {"tokenSave true", [](AccessTokenDbApi& db, Json::Value& j) { return db.tokenSave(j, true); },
-         "INSERT"},
+        int (*pSave)(AccessTokenDbApi&, Json::Value&);
+    } rows[] = {
+        {"INSERT", [](AccessTokenDbApi& db, Json::Value& j) { return db.tokenCreate(j); }},
+        {"INSERT", [](AccessTokenDbApi& db, Json::Value& j) { return db.tokenSave(j, true); }},
+        {"REPLACE", [](AccessTokenDbApi& db, Json::Value& j) { return db.tokenUpdate(j); }},
+        {"REPLACE", [](AccessTokenDbApi& db, Json::Value& j) { return db.tokenSave(j, false); }},
     };
-    for (const auto& [szTrace, pSave, szVerb] : cases) {
-        SCOPED_TRACE(szTrace);
+    const std::string strValues =
+        " INTO token (tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra) VALUES (";
+    for (const auto& row : rows) {
+        const std::string strSql =
+            row.szVerb + strValues +
+            R"('t','S1',1000,9999999999,3,1690000000,'VPN',)"
+            R"('{"Api":{"method":["get","post"]},"Odd":{"method":[{}]}}','{"note":"it''s mine"}'))";
+        SCOPED_TRACE(row.szVerb);
         query("DELETE FROM token");
         seam().calls.clear();
-        m_db.m_strErr = "left over";
-        Json::Value jToken = record();
-
-        EXPECT_EQ(0, pSave(m_db, jToken));
-
-        EXPECT_EQ((Texts{statement(std::string("sqlite3_mprintf ") + szVerb, {DIRECTIVES}),
-                         "sqlite3_exec " + statement(szVerb), "sqlite3_changes"}),
-                  seam().calls);
-        EXPECT_EQ(statement(szVerb), m_db.m_strSql);
+        m_db.m_strErr = "stale";
+        Json::Value jToken = token();
+        EXPECT_EQ(0, row.pSave(m_db, jToken));
+        EXPECT_EQ(
+            (Texts{"sqlite3_mprintf " + (row.szVerb + strValues) + "%Q,%Q,%lld,%lld,%lld,%lld,%Q,%Q,%Q)",
+                   "sqlite3_exec " + strSql, "sqlite3_changes"}),
+            seam().calls);
+        EXPECT_EQ(strSql, m_db.m_strSql);
         EXPECT_EQ("", m_db.m_strErr);
-        EXPECT_EQ(record(), jToken);
-        EXPECT_EQ(Texts{}, takeLines());
-        EXPECT_EQ((Texts{R"(a|sid|1026|-1|1|1700000000|f|{"Example.Api":{"method":["get","list"]}}|)"
-                         R"({"b":[1,null]})"}),
-                  query("SELECT * FROM token"));
+        EXPECT_EQ(token(), jToken);
+        EXPECT_EQ((Texts{R"(t|S1|1000|9999999999|3|1690000000|VPN|)"
+                         R"({"Api":{"method":["get","post"]},"Odd":{"method":[{}]}}|{"note":"it's mine"})"}),
+                  TableTest::rows());
     }
     EXPECT_EQ((Texts{"text|text|integer|integer|integer|integer|text|text|text"}),
               query("SELECT typeof(tid),typeof(bind_sid),typeof(uid),typeof(deadline),typeof(count),"
@@ -86,279 +111,274 @@ TEST_F(Save, RunsOneStatement)
 
 TEST_F(Save, ExpandersAppend)
 {
-    std::string strSql;
+    std::string strSql = "SELECT ";
     EXPECT_EQ(0, m_db.SqlExpandMemberName(strSql));
-    EXPECT_EQ(COLUMNS, strSql);
-    EXPECT_EQ(0, m_db.SqlExpandMemberSymbol(strSql));
-    EXPECT_EQ(0, m_db.SqlExpandMemberName(strSql));
-    EXPECT_EQ(std::string(COLUMNS) + DIRECTIVES + ")" + COLUMNS, strSql);
+    EXPECT_EQ(SELECT, strSql + " FROM token ");
+    EXPECT_EQ(0, m_db.SqlExpandMemberSymbol(strSql = "("));
+    EXPECT_EQ("(%Q,%Q,%lld,%lld,%lld,%lld,%Q,%Q,%Q)", strSql);
 }
 
-// Types are the caller's business; what the JSON library converts is written so.
+// Types are the caller's business: what the JSON library converts is written so.
 TEST_F(Save, RendersEachField)
 {
     const struct {
-        size_t nField;
-        const char* szMember;
+        const char* szField;
+        const char* szValue;
         const char* szSql;
-    } cases[] = {
-        {0, R"("it's")", "'it''s'"},
-        {0, R"("''")", "''''''"},
-        {0, R"("%Q %s %n %%")", "'%Q %s %n %%'"},
-        {0, R"("a\\\"\n;--")", "'a\\\"\n;--'"},
-        {0, R"("x'); DROP TABLE token; --")", "'x''); DROP TABLE token; --'"},
-        {1, R"("")", "''"},
-        {1, R"("NULL")", "'NULL'"},
-        {1, R"("cut\u0000here")", "'cut'"},
-        {2, "4294967295", "4294967295"},
-        {2, "null", "0"},
-        {3, "-9223372036854775808", "-9223372036854775808"},
-        {3, "9223372036854775807", "9223372036854775807"},
-        {3, "true", "1"},
-        {4, "0", "0"},
-        {4, "2.9", "2"},
-        {5, "null", "0"},
-        {6, R"("'")", "''''"},
-        {7, "{}", "'{}'"},
-        {7, "null", "'null'"},
-        {7, R"({"it's":["'"]})", R"('{"it''s":["''"]}')"},
-        {8, "[]", "'[]'"},
-        {8, R"("text")", R"('"text"')"},
-        {8, "-1", "'-1'"},
-        {8, R"({"b":1, "a" : {"c":true}})", R"('{"a":{"c":true},"b":1}')"},
-        {8, R"("\u0000\u001f\n\u007fü")", "'\"\\u0000\\u001f\\n\x7fü\"'"},
+    } rows[] = {
+        {"tid", R"("it's")", "'it''s'"},
+        {"tid", R"("''")", "''''''"},
+        {"tid", R"("%Q %s %n %%")", "'%Q %s %n %%'"},
+        {"tid", R"("a\\\"\n;--")", "'a\\\"\n;--'"},
+        {"tid", R"("x'); DROP TABLE token; --")", "'x''); DROP TABLE token; --'"},
+        {"bind_sid", R"("")", "''"},
+        {"bind_sid", R"("NULL")", "'NULL'"},
+        {"bind_sid", R"("cut\u0000here")", "'cut'"},
+        {"uid", "4294967295", "4294967295"},
+        {"uid", "null", "0"},
+        {"deadline", "-9223372036854775808", "-9223372036854775808"},
+        {"deadline", "9223372036854775807", "9223372036854775807"},
+        {"deadline", "true", "1"},
+        {"count", "0", "0"},
+        {"count", "2.9", "2"},
+        {"create_time", "null", "0"},
+        {"function", R"("'")", "''''"},
+        {"webapi_allow", "{}", "'{}'"},
+        {"webapi_allow", "null", "'null'"},
+        {"webapi_allow", R"({"it's":["'"]})", R"('{"it''s":["''"]}')"},
+        {"extra", "[]", "'[]'"},
+        {"extra", R"("text")", R"('"text"')"},
+        {"extra", "-1", "'-1'"},
+        {"extra", R"({"b":1, "a" : {"c":true}})", R"('{"a":{"c":true},"b":1}')"},
+        {"extra", R"("\u0000\u001f\n\u007fü")", "'\"\\u0000\\u001f\\n\x7fü\"'"},
     };
     seam().sqliteExec = [](sqlite3*, const char*, auto, void*, char**) { return SQLITE_OK; };
-    for (const auto& [nField, szMember, szSql] : cases) {
-        SCOPED_TRACE(std::string(FIELDS[nField]) + " " + szMember);
-        Json::Value jToken = record();
-        jToken[FIELDS[nField]] = json(szMember);
-        Texts values = VALUES;
-        values[nField] = szSql;
-        EXPECT_EQ(0, m_db.tokenCreate(jToken));
-        EXPECT_EQ(statement("INSERT", values), m_db.m_strSql);
+    for (const auto& row : rows) {
+        SCOPED_TRACE(std::string(row.szField) + " " + row.szValue);
+        // The statement of a record that has a mark in the place of the value.
+        Json::Value jToken = token();
+        const bool blNumber = jToken[row.szField].isNumeric();
+        jToken[row.szField] = blNumber ? Json::Value(77777) : "MARK";
+        std::string strSql = saveSql("INSERT", jToken);
+        const std::string strMark = blNumber ? "77777" : "'MARK'";
+        strSql.replace(strSql.find(strMark), strMark.size(), row.szSql);
+        jToken[row.szField] = json(row.szValue);
+        EXPECT_EQ(0, save(jToken, true));
+        EXPECT_EQ(strSql, m_db.m_strSql);
     }
 }
 
 // What the JSON library cannot convert, it throws at; nothing is run.
 TEST_F(Save, ThrowsAtMembersThatDoNotConvert)
 {
-    const struct {
-        const char* szField;
-        const char* szMember;
-    } cases[] = {{"tid", "null"},      {"tid", "1"},      {"bind_sid", "null"},
-                 {"function", "{}"},   {"uid", R"("1")"}, {"deadline", "18446744073709551615"},
-                 {"deadline", "1e30"}, {"count", "[]"}};
     m_db.m_strSql = "before";
-    for (const auto& [szField, szMember] : cases) {
-        SCOPED_TRACE(std::string(szField) + " " + szMember);
-        Json::Value jToken = record();
-        jToken[szField] = json(szMember);
-        EXPECT_THROW(m_db.tokenUpdate(jToken), Json::LogicError);
+    for (const char* szChange :
+         {R"({"tid":null})", R"({"tid":1})", R"({"bind_sid":null})", R"({"function":{}})", R"({"uid":"1"})",
+          R"({"deadline":18446744073709551615})", R"({"deadline":1e30})", R"({"count":[]})"}) {
+        SCOPED_TRACE(szChange);
+        EXPECT_THROW(save(token(szChange)), Json::LogicError);
     }
-    Json::Value jArray(Json::arrayValue);
-    EXPECT_THROW(m_db.tokenUpdate(jArray), Json::LogicError);
+    EXPECT_THROW(save(Json::Value(Json::arrayValue)), Json::LogicError);
     EXPECT_EQ(Texts{}, seam().calls);
     EXPECT_EQ("before", m_db.m_strSql);
 }
 
-TEST_F(Save, RefusesMissingMember)
+TEST_F(Save, RefusesARecordThatLacksAField)
 {
-    const struct {
-        const char* szField;
-        int nLine;
-    } cases[] = {{"tid", 2},          {"bind_sid", 4},  {"uid", 6},           {"deadline", 8}, {"count", 10},
-                 {"create_time", 14}, {"function", 16}, {"webapi_allow", 18}, {"extra", 22}};
-    m_db.m_strSql = "before";
-    for (const auto& [szField, nLine] : cases) {
-        for (const int nErrno : {0, EACCES}) {
-            SCOPED_TRACE(std::string(szField) + " " + strerror(nErrno));
-            Json::Value jToken = record();
-            jToken.removeMember(szField);
-            errno = nErrno;
-            EXPECT_EQ(-1, m_db.tokenSave(jToken, 0 == nErrno));
-            EXPECT_EQ((Texts{failed(fieldList(nLine), std::string("!jParam.isMember(\"") + szField + "\")",
-                                    nErrno)}),
-                      takeLines());
+    AccessTokenDbApi db;
+    Json::Value jRest = token();
+    for (auto field = fields().rbegin(); fields().rend() != field; ++field) {
+        jRest.removeMember(field->szName); // and all that follow are gone already
+        for (Json::Value jToken : {without(field->szName), jRest}) {
+            for (const bool blCreate : {false, true}) {
+                SCOPED_TRACE(text(jToken));
+                errno = EACCES;
+                EXPECT_EQ(-1, db.tokenSave(jToken, blCreate));
+                EXPECT_LINES(failed(fieldList(field->nLine),
+                                    std::string("!jParam.isMember(\"") + field->szName + "\")", EACCES));
+            }
         }
     }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_mprintf", "sqlite3_exec"}));
-    EXPECT_EQ("before", m_db.m_strSql);
+    Json::Value jNull;
+    EXPECT_EQ(-1, db.tokenCreate(jNull));
+    EXPECT_EQ(1u, takeLines().size());
+    EXPECT_EQ("", db.m_strSql);
+    EXPECT_EQ(Texts{}, seam().calls);
 }
 
-TEST_F(Save, StopsAtFirstMissingMember)
+TEST_F(Save, FailsWithoutMemoryForTheStatement)
 {
-    for (const char* szToken : {"null", "{}", R"({"bind_sid":"","TID":"a"})"}) {
-        SCOPED_TRACE(szToken);
-        Json::Value jToken = json(szToken);
-        EXPECT_EQ(-1, m_db.tokenCreate(jToken));
-        EXPECT_EQ((Texts{failed(fieldList(2), "!jParam.isMember(\"tid\")")}), takeLines());
-        EXPECT_EQ(json(szToken), jToken);
-    }
+    seam().fail("sqlite3_mprintf", ENOMEM);
+    EXPECT_EQ(-1, save(token()));
+    EXPECT_LINES(failed(STORE, "!szSql || !szSql[0]", ENOMEM));
+    EXPECT_EQ("", m_db.m_strSql);
+    EXPECT_EQ(Texts{}, seam().statements());
 }
 
-TEST_F(Save, RefusesStatementThatCannotBeComposed)
+TEST_F(Save, CreatesOnceAndReplacesWholeRows)
 {
-    typedef std::function<int(std::string&)> Expand;
-    const Expand fails = [](std::string&) { return -1; };
-    const Expand clears = [](std::string& strSql) {
-        strSql.clear();
-        return 0;
-    };
-    const struct {
-        Expand name;
-        Expand symbol;
-        int nErrno; // of an allocation that fails
-        const char* szCondition;
-    } cases[] = {{fails, fails, 0, "0 > SqlExpandMemberName(strSqlPrefix)"},
-                 {nullptr, fails, 0, "0 > SqlExpandMemberSymbol(strSqlPrefix)"},
-                 {nullptr, clears, 0, "!szSql || !szSql[0]"},
-                 {nullptr, nullptr, ENOMEM, "!szSql || !szSql[0]"}};
-    m_db.m_strSql = "before";
-    for (const auto& [name, symbol, nErrno, szCondition] : cases) {
-        SCOPED_TRACE(szCondition);
-        standIns().sqlExpandMemberName = name;
-        standIns().sqlExpandMemberSymbol = symbol;
-        if (nErrno) {
-            seam().fail("sqlite3_mprintf", nErrno, 1, 100);
-        }
-        Json::Value jToken = record();
-        EXPECT_EQ(-1, m_db.tokenUpdate(jToken));
-        EXPECT_EQ((Texts{failed(STORE, szCondition, nErrno)}), takeLines());
-    }
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec"}));
-    EXPECT_EQ("before", m_db.m_strSql);
-}
-
-TEST_F(Save, CreateRefusesTakenTid)
-{
-    Json::Value jToken = record();
-    EXPECT_EQ(0, m_db.tokenCreate(jToken));
-    jToken["count"] = 5;
-    EXPECT_EQ(-1, m_db.tokenCreate(jToken));
-    EXPECT_EQ(failureLines(m_db.m_strSql, "UNIQUE constraint failed: token.tid"), takeLines());
+    const Json::Value jOther =
+        json(R"({"tid":"t","bind_sid":"","uid":0,"deadline":1,"count":2,"create_time":3,
+                                        "function":"","webapi_allow":{},"extra":{}})");
+    EXPECT_EQ(0, save(token()));
+    EXPECT_EQ(-1, save(jOther, true));
+    EXPECT_LINES(failureLines(m_db.m_strSql, "UNIQUE constraint failed: token.tid"));
     EXPECT_EQ("UNIQUE constraint failed: token.tid", m_db.m_strErr);
-    EXPECT_EQ(record(), stored());
-}
-
-TEST_F(Save, UpdateInsertsThenReplacesWholeRow)
-{
-    Json::Value jToken = record();
-    EXPECT_EQ(0, m_db.tokenUpdate(jToken));
-    EXPECT_EQ(record(), stored());
-    jToken = json(R"({"tid":"a","bind_sid":"","uid":0,"deadline":1,"count":2,"create_time":3,"function":"",
-                      "webapi_allow":{},"extra":{}})");
-    EXPECT_EQ(0, m_db.tokenUpdate(jToken));
-    EXPECT_EQ(jToken, stored());
-    EXPECT_EQ((Texts{"1"}), query("SELECT count(*) FROM token"));
-    EXPECT_EQ(Texts{}, takeLines());
+    EXPECT_EQ((Texts{row(token())}), rows());
+    EXPECT_EQ(0, save(jOther));
+    EXPECT_EQ((Texts{row(jOther)}), rows());
 }
 
 // Callers see a failure although the row is there; that stays.
-TEST_F(Save, FailsAfterLockThatWasWaitedOut)
+TEST_F(Save, FailsAfterALockThatWasWaitedOut)
 {
     const Lock lock(path(), 2);
-    Json::Value jToken = record();
-
-    EXPECT_EQ(-1, m_db.tokenCreate(jToken));
-
-    const std::string strExec = "sqlite3_exec " + statement("INSERT");
-    EXPECT_EQ((Texts{strExec, "usleep 10000", strExec, "usleep 10000", strExec}),
-              seam().callsOf({"sqlite3_exec", "usleep"}));
-    EXPECT_EQ((Texts{fail(STORE, "sql error, sql=" + statement("INSERT"))}), takeLines());
+    EXPECT_EQ(-1, save(token(), true));
+    const std::string strSql = saveSql("INSERT", token());
+    EXPECT_LINES(fail(STORE, "sql error, sql=" + strSql));
+    EXPECT_EQ(Texts(3, strSql), seam().statements());
     EXPECT_EQ("database is locked", m_db.m_strErr);
-    EXPECT_EQ(statement("INSERT"), m_db.m_strSql);
-    EXPECT_EQ(record(), stored());
+    EXPECT_EQ(strSql, m_db.m_strSql);
+    EXPECT_EQ(token(), stored());
 }
 
-TEST_F(Save, FailsWhenLockNeverEnds)
+TEST_F(Save, FailsWithItsStatement)
 {
-    Json::Value jToken = record();
+    const std::string strSql = saveSql("REPLACE", token());
     {
         const Lock lock(path());
-        EXPECT_EQ(-1, m_db.tokenUpdate(jToken));
+        EXPECT_EQ(-1, save(token()));
     }
-    EXPECT_EQ(
-        (Texts{ordinary(STORE, "i=500,run sql failed, error=database is locked, sql=" + statement("REPLACE")),
-               fail(STORE, "run sql failed, sql=" + statement("REPLACE")), failed(STORE, "0 > runSql()")}),
-        takeLines());
-    EXPECT_EQ(Texts{}, query("SELECT * FROM token"));
-}
-
-TEST_F(Save, FailsWithoutTable)
-{
+    EXPECT_LINES(ordinary(STORE, "i=500,run sql failed, error=database is locked, sql=" + strSql),
+                 fail(STORE, "run sql failed, sql=" + strSql), failed(STORE, "0 > runSql()"));
+    EXPECT_EQ(Texts{}, rows());
     query("DROP TABLE token");
-    Json::Value jToken = record();
-    EXPECT_EQ(-1, m_db.tokenCreate(jToken));
-    EXPECT_EQ(failureLines(statement("INSERT"), "no such table: token"), takeLines());
-}
+    EXPECT_EQ(-1, save(token()));
+    EXPECT_LINES(failureLines(strSql, "no such table: token"));
 
-TEST_F(Save, FailsWhenDatabaseDoesNotOpen)
-{
-    AccessTokenDbApi db;
-    Json::Value jToken = record();
+    EXPECT_EQ(0, m_db.freeDb());
     seam().fail("seteuid", EPERM);
-    EXPECT_EQ(-1, db.tokenCreate(jToken));
-    EXPECT_EQ(NOT_OPENED + Texts{failed(STORE, "0 > runSql()", EPERM)}, takeLines());
-    EXPECT_EQ(statement("INSERT"), db.m_strSql);
+    EXPECT_EQ(-1, save(token()));
+    EXPECT_LINES(NOT_OPENED + Texts{failed(STORE, "0 > runSql()", EPERM)});
 }
 
 TEST_F(Save, TracesInDebugMode)
 {
     VEMO_ACCESS_TOKEN::debugInfo(true);
     for (const bool blCreate : {true, false}) {
-        const std::string strSql = statement(blCreate ? "INSERT" : "REPLACE");
-        const std::string strFlag = blCreate ? "1" : "0";
-        Json::Value jToken = record();
-        EXPECT_EQ(0, m_db.tokenSave(jToken, blCreate));
-        EXPECT_EQ((Texts{ordinary(STORE, "tokenSave, blCreate=" + strFlag + ", jParam=" + RECORD_TEXT),
-                         ordinary(STORE, "run sql=" + strSql), ordinary(STORE, "run sql=" + strSql),
-                         ordinary(STORE, "change rv=1, run sql=" + strSql)}),
-                  takeLines());
+        const std::string strSql = saveSql(blCreate ? "INSERT" : "REPLACE", token());
+        EXPECT_EQ(0, save(token(), blCreate));
+        EXPECT_LINES(ordinary(STORE, std::string("tokenSave, blCreate=") + (blCreate ? "1" : "0") +
+                                         ", jParam=" + text(token())),
+                     ordinary(STORE, "run sql=" + strSql), ordinary(STORE, "run sql=" + strSql),
+                     ordinary(STORE, "change rv=1, run sql=" + strSql));
     }
     Json::Value jNull;
-    errno = EACCES;
     EXPECT_EQ(-1, m_db.tokenCreate(jNull));
-    EXPECT_EQ((Texts{ordinary(STORE, "tokenSave, blCreate=1, jParam=null"),
-                     failed(fieldList(2), "!jParam.isMember(\"tid\")", EACCES)}),
-              takeLines());
+    EXPECT_LINES(ordinary(STORE, "tokenSave, blCreate=1, jParam=null"),
+                 failed(fieldList(2), "!jParam.isMember(\"tid\")"));
 }
 
-class SaveSystemLog : public SaveTest {
-protected:
-    SaveSystemLog() : SaveTest(Destination::Syslog) {}
-};
+// What was saved comes back
 
-// Neither the lines nor what stands in them may change errno.
-TEST_F(SaveSystemLog, TellsErrnoAsTheFailureLeftIt)
+TEST_F(Save, KeepsJsonValues)
 {
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    seam().sqliteExec = [](sqlite3*, const char*, SqlCallback, void*, char**) {
-        errno = EIO;
-        return SQLITE_OK;
-    };
-    const std::string strTrace = ordinary(STORE, std::string("tokenSave, blCreate=1, jParam=") + RECORD_TEXT);
-    const std::string strRun = "run sql=" + statement("INSERT");
-    Json::Value jToken = record();
+    for (const char* szValue :
+         {"{}", R"({"":""})", R"({"a":{},"b":[],"c":null,"d":[[],{},[{}]],"e":[null,true,false]})",
+          R"({"it's":"it''s","\"":"\\\"/"})", R"({"größe":"日本語 😀","\u0001":"\u2028\ud83d\ude00"})",
+          R"({"min":-9223372036854775808,"max":9223372036854775807,"unsigned":18446744073709551615})",
+          R"({"limits":[-2147483649,-2147483648,2147483647,2147483648,4294967295,9223372036854775808]})",
+          R"({"text":["null","1","{}","// no comment","/* none */","%Q%lld"]})"}) {
+        SCOPED_TRACE(szValue);
+        expectSameJson(json(szValue));
+    }
+}
 
-    errno = EACCES;
-    EXPECT_EQ(0, m_db.tokenCreate(jToken));
-    EXPECT_EQ(inSystemLog({strTrace, ordinary(STORE, strRun), ordinary(STORE, strRun)}, EACCES) +
-                  inSystemLog({ordinary(STORE, "change rv=0, " + strRun)}, EIO),
-              takeLines(Destination::Syslog));
+// Byte for byte, as text and as name: valid UTF-8 or not, NUL and other control characters too.
+TEST_F(Save, KeepsBytesInJson)
+{
+    Json::Value jValue;
+    for (const std::string& strBytes :
+         {bytesFrom(0), std::string("a\0b", 3), std::string("a\0c", 3), std::string("\0", 1),
+          std::string("a"), std::string("\xff\xfe"), std::string("\xc3"), std::string("\xc0\x80"),
+          std::string("\xed\xa0\x80"), std::string("\xf4\x90\x80\x80"), std::string("\xe2\x82"),
+          std::string("\x7f\x80\xbf")}) {
+        jValue[strBytes] = strBytes;
+    }
+    for (int nByte = 0; nByte < 256; ++nByte) {
+        const std::string strByte(1, static_cast<char>(nByte));
+        jValue["bytes"].append(strByte);
+        jValue[strByte] = nByte;
+    }
+    expectSameJson(jValue);
+}
 
-    errno = 0;
-    seam().fail("sqlite3_mprintf", ENOMEM, 1, 100);
-    EXPECT_EQ(-1, m_db.tokenCreate(jToken));
-    EXPECT_EQ(Texts{strTrace} + inSystemLog({failed(STORE, "!szSql || !szSql[0]", ENOMEM)}, ENOMEM),
-              takeLines(Destination::Syslog));
+TEST_F(Save, KeepsSizeAndDepth)
+{
+    Json::Value jDeep(Json::objectValue);
+    for (int nLevel = 1; nLevel < 1000; ++nLevel) { // as deep as the reader goes
+        Json::Value jOuter;
+        jOuter["a"].swap(jDeep);
+        jDeep.swap(jOuter);
+    }
+    expectSameJson(jDeep);
+    Json::Value jLarge;
+    jLarge["a"] = std::string(1 << 20, '\'');
+    expectSameJson(jLarge);
+}
 
-    errno = EACCES;
-    jToken.removeMember("extra");
-    EXPECT_EQ(-1, m_db.tokenCreate(jToken));
-    seam().lines.erase(seam().lines.begin());
-    EXPECT_EQ(inSystemLog({failed(fieldList(22), "!jParam.isMember(\"extra\")", EACCES)}, EACCES),
-              takeLines(Destination::Syslog));
+TEST_F(Save, KeepsDoublesToTheBit)
+{
+    typedef std::numeric_limits<double> Limits;
+    Json::Value jToken = token();
+    std::vector<double> values = {0.0,  -0.0, 0.1,  0.1 + 0.2, 1.0 / 3, 1.0,     -1.0,   100.0, 1e15,   1e16,
+                                  1e17, 1e22, 1e23, 0x1p53,    0x1p63,  -0x1p63, 0x1p64, 1e300, -1e-300};
+    values.insert(values.end(), {Limits::max(), Limits::lowest(), Limits::min(), Limits::denorm_min(),
+                                 -Limits::denorm_min(), Limits::min() / 3, Limits::infinity(),
+                                 -Limits::infinity(), Limits::quiet_NaN()});
+    for (const double value : values) {
+        SCOPED_TRACE(value);
+        jToken["extra"]["d"] = value;
+        jToken["webapi_allow"]["d"][0] = value;
+        EXPECT_EQ(0, m_db.tokenUpdate(jToken));
+        const Json::Value jStored = stored();
+        for (const Json::Value& jDouble : {jStored["extra"]["d"], jStored["webapi_allow"]["d"][0]}) {
+            ASSERT_EQ(Json::realValue, jDouble.type());
+            EXPECT_TRUE(value == jDouble.asDouble() || (std::isnan(value) && std::isnan(jDouble.asDouble())));
+            EXPECT_TRUE(std::isnan(value) || std::signbit(value) == std::signbit(jDouble.asDouble()));
+        }
+    }
+}
+
+TEST_F(Save, KeepsNumbersAndTexts)
+{
+    for (const char* szField : {"uid", "deadline", "count", "create_time"}) {
+        for (const Json::Int64 nValue : {Json::Value::minInt64, Json::Int64(-1), Json::Int64(0),
+                                         Json::Int64(4294967295LL), Json::Value::maxInt64}) {
+            SCOPED_TRACE(std::string(szField) + " " + std::to_string(nValue));
+            Json::Value jToken = token();
+            jToken[szField] = nValue;
+            expectSame(jToken);
+        }
+    }
+    for (const std::string& strText :
+         Texts{bytesFrom(1), "it's", "''", "\"", "\\", "%q", " ", "x'); DROP TABLE token; --", "größe"}) {
+        SCOPED_TRACE(strText);
+        Json::Value jToken = token();
+        jToken["tid"] = jToken["bind_sid"] = jToken["function"] = strText;
+        expectSame(jToken);
+    }
+}
+
+// Conditions compare texts, so a value must always become the same one.
+TEST_F(Save, DropsCommentsOtherMembersAndWhatFollowsANul)
+{
+    Json::Value jToken = token(R"({"extra":[1],"more":"text","TID":1,"sort_by":"tid"})");
+    jToken["tid"] = std::string("t\0b", 3);
+    jToken["extra"][0].setComment(std::string("// a comment"), Json::commentBefore);
+    EXPECT_EQ(0, save(jToken));
+    EXPECT_EQ((Texts{"t|1|[1]"}), query("SELECT tid, length(CAST(tid AS BLOB)), extra FROM token"));
+    EXPECT_EQ(token(R"({"extra":[1]})"), stored());
 }
 
 } // namespace

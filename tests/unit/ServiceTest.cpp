@@ -1,275 +1,319 @@
-// The service object: its database, and what it does without one.
+// The service object: its database, what it does without one, and how it looks tokens up.
 
 #include <climits>
 #include <functional>
-#include <memory>
 #include <type_traits>
 
-#include "AccessTokenApi.h"
 #include "AccessTokenUtil.h"
-#include "Opening.h"
+#include "Statements.h"
+#include "StoreTest.h"
 
 // Compiled callers hold the object in a pointer's room.
 static_assert(sizeof(AccessTokenApi) == sizeof(void*));
 static_assert(!std::is_polymorphic_v<AccessTokenApi>);
 static_assert(!std::is_copy_constructible_v<AccessTokenApi> && !std::is_copy_assignable_v<AccessTokenApi>);
-static_assert(!std::is_move_constructible_v<AccessTokenApi> && !std::is_move_assignable_v<AccessTokenApi>);
 
 namespace {
 
-// The line with its token id, which is random, as "TID".
-std::string withoutTid(std::string strLine)
-{
-    const size_t nEnd = strLine.find(", uid=");
-    if (std::string::npos != nEnd) {
-        const size_t nTid = strLine.find("tid=") + 4;
-        strLine.replace(nTid, nEnd - nTid, "TID");
-    }
-    return strLine;
-}
+const std::string RUN_FAILED = "0 > runSql(FillList, &jTokenArrayOut)";
 
 class ServiceObject : public StoreTest {};
 
-TEST_F(ServiceObject, CreatesTheDatabaseAndClosesItAtItsEnd)
+TEST_F(ServiceObject, OpensTheDatabaseOfItsOwnAndClosesItAtItsEnd)
 {
-    {
-        AccessTokenApi api;
-        const Texts calls = seam().callsOf(
-            {"operator", "geteuid", "seteuid", "access", "open", "chmod", "sqlite3_open", "sqlite3_close"});
-        EXPECT_EQ((Texts{"operator new", UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN, RAISE}), calls);
-        EXPECT_EQ(1u, seam().callsOf({"sqlite3_exec"}).size());
+    for (const bool blNew : {true, false}) {
         seam().calls.clear();
+        {
+            AccessTokenApi api;
+            EXPECT_EQ((Texts{"operator new", UID, RAISE, ACCESS}) +
+                          (blNew ? Texts{TOUCH, CHMOD, OPEN, CREATE, CHANGES} : Texts{OPEN}) + Texts{RAISE},
+                      seam().calls);
+            seam().calls.clear();
+            AccessTokenApi another;
+            EXPECT_EQ((Texts{OPEN}), seam().callsOf({"sqlite3_open"}));
+            seam().calls.clear();
+        }
+        EXPECT_EQ((Texts{CLOSE, CLOSE}), seam().calls);
     }
-    EXPECT_EQ((Texts{"sqlite3_close"}), seam().calls);
-    EXPECT_EQ((Texts{"0"}), query("SELECT count(*) FROM token"));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(ServiceObject, OpensAnExistingDatabaseAsItsConstructorsLastAction)
-{
-    makeDatabase();
-    {
-        AccessTokenApi api;
-        EXPECT_EQ((Texts{"operator new", UID, RAISE, ACCESS, OPEN, RAISE}), seam().calls);
-        seam().calls.clear();
-    }
-    EXPECT_EQ((Texts{"sqlite3_close"}), seam().calls);
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(ServiceObject, EachObjectHasAConnectionOfItsOwn)
-{
-    {
-        AccessTokenApi apiFirst;
-        AccessTokenApi apiSecond;
-    }
-    EXPECT_EQ(2u, seam().callsOf({"sqlite3_open"}).size());
-    EXPECT_EQ(2u, seam().callsOf({"sqlite3_close"}).size());
+    EXPECT_EQ(Texts{}, rows());
 }
 
 TEST_F(ServiceObject, OpensAgainAfterAFailedOpening)
 {
-    makeDatabase();
-    seam().fail("seteuid", EPERM);
-    AccessTokenApi api;
-    EXPECT_EQ((Texts{NOT_ROOT}), takeLines());
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_open"}));
-
     Json::Value jFilter;
     Json::Value jTokens(Json::arrayValue);
+    seam().fail("seteuid", EPERM, 1, 4); // each opening raises and puts back
+    AccessTokenApi api;
+    EXPECT_LINES(NOT_ROOT);
+    EXPECT_EQ(-1, api.tokenList(jFilter, jTokens));
+    EXPECT_LINES(NOT_OPENED + Texts{failed(STORE, RUN_FAILED, EPERM),
+                                    failed(SERVICE, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)", EPERM)});
+    EXPECT_EQ(Texts{}, seam().callsOf({"access", "sqlite3_open"}));
     EXPECT_EQ(0, api.tokenList(jFilter, jTokens));
-    EXPECT_EQ(1u, seam().callsOf({"sqlite3_open"}).size());
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(ServiceObject, ReportsALastingFailureOfTheOpeningInItsOperations)
-{
-    seam().fail("seteuid", EPERM, 1, INT_MAX);
-    {
-        AccessTokenApi api;
-        Json::Value jFilter;
-        Json::Value jTokens(Json::arrayValue);
-        EXPECT_EQ(-1, api.tokenList(jFilter, jTokens));
-    }
-    EXPECT_EQ(Texts{NOT_ROOT} + NOT_OPENED +
-                  (Texts{failed(STORE, "0 > runSql(FillList, &jTokenArrayOut)", EPERM),
-                         failed(SERVICE, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)", EPERM)}),
-              takeLines());
-    EXPECT_EQ(Texts{}, seam().callsOf({"access", "sqlite3_open", "sqlite3_close"}));
+    EXPECT_EQ((Texts{OPEN}), seam().callsOf({"sqlite3_open"}));
 }
 
 // A caller may have a failure of its last operation still to report.
-TEST_F(ServiceObject, ItsEndKeepsErrno)
+TEST_F(ServiceObject, KeepsErrnoAtItsEndAndTriesTwiceToClose)
 {
     seam().sqliteClose = [](sqlite3* pDb) {
-        const int nResult = sqlite3_close(pDb);
-        errno = EIO;
-        return nResult;
+        const bool blFirst = 1 == seam().counts["sqlite3_close"];
+        errno = blFirst ? EIO : errno;
+        return blFirst ? SQLITE_BUSY : sqlite3_close(pDb);
     };
     {
         AccessTokenApi api;
         errno = EACCES;
     }
     EXPECT_EQ(EACCES, errno);
-    EXPECT_EQ((Texts{"sqlite3_close"}), seam().callsOf({"sqlite3_close"}));
-}
-
-TEST_F(ServiceObject, ClosingThatFailsIsTriedAgainByTheStoresEnd)
-{
-    seam().sqliteClose = [](sqlite3* pDb) {
-        errno = 0;
-        return 1 == seam().counts["sqlite3_close"] ? SQLITE_BUSY : sqlite3_close(pDb);
-    };
-    {
-        AccessTokenApi api;
-    }
-    EXPECT_EQ((Texts{"sqlite3_close", "sqlite3_close"}), seam().callsOf({"sqlite3_close"}));
-    EXPECT_EQ((Texts{failed(STORE, "SQLITE_OK != sqlite3_close(m_pDb)")}), takeLines());
+    EXPECT_EQ((Texts{CLOSE, CLOSE}), seam().callsOf({CLOSE}));
+    EXPECT_LINES(failed(STORE, "SQLITE_OK != sqlite3_close(m_pDb)", EIO));
 }
 
 // An object whose store could not be allocated.
-class WithoutStore : public StoreTest {
-protected:
-    void SetUp() override
-    {
-        StoreTest::SetUp();
-        seam().fail("operator new", ENOMEM);
-        m_pApi = std::make_unique<AccessTokenApi>();
-        m_linesOfConstructor = takeLines();
-    }
-
-    std::unique_ptr<AccessTokenApi> m_pApi;
-    Texts m_linesOfConstructor;
-};
-
-TEST_F(WithoutStore, IsLoggedByTheConstructorWhichTouchesNothing)
+TEST_F(ServiceObject, FailsInEachOperationThatNeedsAStoreWithoutOne)
 {
-    m_pApi.reset();
-    EXPECT_EQ((Texts{ordinary(SERVICE, "new AccessTokenDbApi failed")}), m_linesOfConstructor);
-    EXPECT_EQ((Texts{"operator new", "printf"}), seam().calls);
-    EXPECT_EQ(Texts{}, takeLines());
-}
+    seam().fail("operator new", 0);
+    AccessTokenApi api;
+    EXPECT_EQ((Texts{"operator new"}), seam().calls);
+    EXPECT_LINES(ordinary(SERVICE, "new AccessTokenDbApi failed"));
 
-TEST_F(WithoutStore, EveryOperationThatNeedsItFails)
-{
     unsigned int uid = 1026;
     std::string strTid = tid();
-    std::string strValue = "a";
+    std::string strA = "a";
     Texts strVector{"a"};
     Json::Value jNull;
     Json::Value jObject(Json::objectValue);
     Json::Value jArray(Json::arrayValue);
-    Json::Value jSpent = json(R"({"tid":"a","bind_sid":"","uid":1,"deadline":1,"count":1,"create_time":1,
-                                  "function":"f","webapi_allow":{},"extra":{}})");
-    Json::Value jToken = jSpent;
-    jToken["count"] = 2;
-    AccessTokenApi& api = *m_pApi;
-
-    const std::string strCreate = "tokenCreate failed, tid=TID, uid=1026, strFunction=a, jTokenOption=null";
-    const std::string strSave = "tokenSaveByOverwrite failed, jToken=" + text(jSpent);
+    Json::Value jLastUse = token(R"({"tid":"a","count":1})");
+    Json::Value jToken = token(R"({"tid":"a","count":2})");
+    const std::string strCreate =
+        "tokenCreate failed, tid=" + strTid + ", uid=1026, strFunction=a, jTokenOption=null";
+    const std::string strSave = "tokenSaveByOverwrite failed, jToken=" + text(jLastUse);
     const auto byArray = [](const std::string& strName) {
         return Texts{"!m_pDb", "tokenDeleteByArray failed, name=" + strName + ", strVector=a"};
     };
-    const auto byName = [&](const std::string& strName, const Texts& more = {}) {
-        Texts messages = byArray(strName);
-        messages.push_back("0 > (err = tokenDeleteByArray(strVector, szName))");
-        messages.push_back("tokenDeleteByName failed, name=" + strName + ", strValue=a");
-        messages.insert(messages.end(), more.begin(), more.end());
-        return messages;
+    const auto byName = [&](const std::string& strName) {
+        return byArray(strName) + Texts{"0 > (err = tokenDeleteByArray(strVector, szName))",
+                                        "tokenDeleteByName failed, name=" + strName + ", strValue=a"};
     };
-    struct Case {
+    const struct {
         const char* szOperation;
         std::function<int()> operation;
         Texts messages; // conditions, and the operations' own lines, which say "failed"
-    };
-    const std::vector<Case> cases = {
-        {"tokenCreateByTid",
-         [&] { return api.tokenCreateByTid(uid, strValue, jNull, strTid); },
+    } rows[] = {
+        {"create by tid",
+         [&] { return api.tokenCreateByTid(uid, strA, jNull, strTid); },
          {"!m_pDb", strCreate}},
-        {"tokenCreate",
-         [&] { return api.tokenCreate(uid, strValue, jNull, strValue); },
-         {"!m_pDb", strCreate, "0 > tokenCreateByTid(uid, strFunction, jTokenOption, strTid)"}},
-        {"tokenList", [&] { return api.tokenList(jObject, jArray); }, {"!m_pDb"}},
-        {"tokenGetByTid", [&] { return api.tokenGetByTid(strValue, jNull); }, {"!m_pDb"}},
-        {"tokenGetByTidArray", [&] { return api.tokenGetByTidArray(strVector, jArray); }, {"!m_pDb"}},
-        {"tokenUpdateByTid",
-         [&] { return api.tokenUpdateByTid(strValue, jObject); },
+        {"list", [&] { return api.tokenList(jObject, jArray); }, {"!m_pDb"}},
+        {"get", [&] { return api.tokenGetByTid(strA, jNull); }, {"!m_pDb"}},
+        {"get by array", [&] { return api.tokenGetByTidArray(strVector, jArray); }, {"!m_pDb"}},
+        {"update",
+         [&] { return api.tokenUpdateByTid(strA, jObject); },
          {"!m_pDb", "0 > (nCount = tokenGetByTid(strTid, jToken))"}},
-        {"tokenSaveByOverwrite", [&] { return api.tokenSaveByOverwrite(jSpent); }, {"!m_pDb", strSave}},
-        {"tokenDeleteByArray", [&] { return api.tokenDeleteByArray(strVector, "tid"); }, byArray("tid")},
-        {"tokenDeleteByName", [&] { return api.tokenDeleteByName(strValue, "tid"); }, byName("tid")},
-        {"tokenDeleteByTid", [&] { return api.tokenDeleteByTid(strValue); }, byName("tid")},
-        {"tokenDeleteByBindSid", [&] { return api.tokenDeleteByBindSid(strValue); }, byName("bind_sid")},
-        {"tokenDeleteByFunction", [&] { return api.tokenDeleteByFunction(strValue); }, byName("function")},
-        {"tokenDeleteByTidArray", [&] { return api.tokenDeleteByTidArray(strVector); }, byArray("tid")},
-        {"tokenDeleteAll", [&] { return api.tokenDeleteAll(); }, {"!m_pDb"}},
-        {"cleanExpireToken", [&] { return api.cleanExpireToken(true); }, {"!m_pDb"}},
-        {"quiet cleanExpireToken", [&] { return api.cleanExpireToken(false); }, {}},
-        {"tokenGrant",
-         [&] { return api.tokenGrant(strValue, "Example.Api", "get", jNull); },
+        {"save", [&] { return api.tokenSaveByOverwrite(jLastUse); }, {"!m_pDb", strSave}},
+        {"delete by array", [&] { return api.tokenDeleteByArray(strVector, "tid"); }, byArray("tid")},
+        {"delete by name", [&] { return api.tokenDeleteByName(strA, "tid"); }, byName("tid")},
+        {"delete by tid", [&] { return api.tokenDeleteByTid(strA); }, byName("tid")},
+        {"delete by session", [&] { return api.tokenDeleteByBindSid(strA); }, byName("bind_sid")},
+        {"delete by function", [&] { return api.tokenDeleteByFunction(strA); }, byName("function")},
+        {"delete by tids", [&] { return api.tokenDeleteByTidArray(strVector); }, byArray("tid")},
+        {"delete all", [&] { return api.tokenDeleteAll(); }, {"!m_pDb"}},
+        {"purge", [&] { return api.cleanExpireToken(true); }, {"!m_pDb"}},
+        {"quiet purge", [&] { return api.cleanExpireToken(false); }, {}},
+        {"grant",
+         [&] { return api.tokenGrant(strA, "Api", "get", jNull); },
          {"!m_pDb", "0 > (err = tokenGetByTid(strTid, jToken))"}},
-        {"tokenCountDegrade",
+        {"degrade",
          [&] { return api.tokenCountDegrade(jToken); },
          {"!m_pDb", strSave, "0 > tokenSaveByOverwrite(jToken)"}},
-        {"tokenCountDegrade of the last use", [&] { return api.tokenCountDegrade(jSpent); },
-         byName("tid", {"0 > tokenDeleteByTid(strTid)"})},
+        {"degrade to none", [&] { return api.tokenCountDegrade(jLastUse); },
+         byName("tid") + Texts{"0 > tokenDeleteByTid(strTid)"}},
     };
-    for (const Case& testCase : cases) {
-        SCOPED_TRACE(testCase.szOperation);
-        Texts expected;
-        for (const std::string& strMessage : testCase.messages) {
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.szOperation);
+        Texts lines;
+        for (const std::string& strMessage : row.messages) {
             const bool blOwnLine = std::string::npos != strMessage.find(" failed, ");
-            expected.push_back(blOwnLine ? ordinary(SERVICE, strMessage) : failed(SERVICE, strMessage));
+            lines.push_back(blOwnLine ? ordinary(SERVICE, strMessage) : failed(SERVICE, strMessage));
         }
         errno = 0;
-        EXPECT_EQ(-1, testCase.operation());
-        Texts lines;
-        for (const std::string& strLine : takeLines()) {
-            lines.push_back(withoutTid(strLine));
-        }
-        EXPECT_EQ(expected, lines);
+        EXPECT_EQ(-1, row.operation());
+        EXPECT_LINES(lines);
     }
-    EXPECT_EQ("a", strValue);
+    EXPECT_EQ(-1, api.tokenCreate(uid, strA, jNull, strA));
+    EXPECT_EQ(3u, takeLines().size()); // they hold a random id
+    EXPECT_EQ("a", strA);
     EXPECT_EQ(Json::Value(), jNull);
     EXPECT_EQ(Json::Value(Json::arrayValue), jArray);
+
+    VEMO_ACCESS_TOKEN::debugInfo(true);
+    errno = 0;
+    EXPECT_EQ(-1, api.cleanExpireToken(false));
+    EXPECT_LINES(fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)"));
+    // Some operations need none.
+    EXPECT_EQ(0, api.VectorParamToJson(strVector, "tid", jNull));
+    Json::Value jUnlimited = json(R"({"count":-1})");
+    EXPECT_EQ(0, api.tokenCountDegrade(jUnlimited));
     EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
 }
 
-TEST_F(WithoutStore, OperationsThatNeedNoneWork)
-{
-    Texts strVector{"a"};
-    Json::Value jParam;
-    EXPECT_EQ(0, m_pApi->VectorParamToJson(strVector, "tid", jParam));
-    Json::Value jUnlimited = json(R"({"count":-1})");
-    EXPECT_EQ(0, m_pApi->tokenCountDegrade(jUnlimited));
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(WithoutStore, AFailedPurgeIsToldInDebugMode)
-{
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    errno = 0;
-    EXPECT_EQ(-1, m_pApi->cleanExpireToken(false));
-    EXPECT_EQ((Texts{fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)")}), takeLines());
-}
-
-class ServiceSystemLog : public StoreTest {
+// Looking tokens up. How filters become statements is the store's (QueryTest).
+class Lookup : public TableTest {
 protected:
-    ServiceSystemLog() : StoreTest(Destination::Syslog) {}
+    void SetUp() override
+    {
+        TableTest::SetUp();
+        insert();
+        insert(R"({"tid":"a'b","deadline":1})"); // no lookup cares about deadlines
+    }
+
+    // What is logged of a statement that failed at its first try.
+    static Texts broken(const std::string& strSql, const Texts& inStore, const std::string& strInService)
+    {
+        return failureOf(strSql, DISK_ERROR.szError, EIO) + allFailed(STORE, inStore, EIO) +
+               Texts{failed(SERVICE, strInService, EIO)};
+    }
+
+    Json::Value m_jOut = json(R"({"left":"over"})");
+    Json::Value m_jArray = json("[5]");
 };
 
-TEST_F(ServiceSystemLog, GetsTheLinesOfAServiceWithoutStore)
+TEST_F(Lookup, ListsWhatTheFilterSelects)
 {
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    for (int nErrno : {0, ENOMEM}) {
-        seam().counts.clear();
-        seam().fail("operator new", nErrno);
-        AccessTokenApi api;
-        EXPECT_EQ(-1, api.cleanExpireToken(false));
-        EXPECT_EQ(inSystemLog({ordinary(SERVICE, "new AccessTokenDbApi failed"),
-                               fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)", nErrno)},
-                              nErrno),
-                  takeLines(Destination::Syslog));
+    const std::pair<const char*, std::string> rows[] = {
+        {"null", SELECT},
+        {"{}", SELECT},
+        {R"({"tid":"t","sort_by":"uid"})", SELECT + " WHERE  (tid='t' ) order by 'uid'"}};
+    for (const auto& [szFilter, strSql] : rows) {
+        Json::Value jFilter = json(szFilter);
+        m_jArray = json("[5]");
+        EXPECT_EQ(0, api().tokenList(jFilter, m_jArray));
+        EXPECT_EQ(json(szFilter), jFilter);
+        EXPECT_EQ(Json::Value(5), m_jArray[0]);
+        EXPECT_EQ(token(), m_jArray[1]);
+        EXPECT_EQ(strSql + ";", seam().statements().back());
+        failStatements("SELECT", DISK_ERROR);
+        EXPECT_EQ(-1, api().tokenList(jFilter, m_jArray));
+        EXPECT_LINES(broken(strSql + ";", {RUN_FAILED}, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)"));
+    }
+}
+
+TEST_F(Lookup, ListRefusesArgumentsOfAWrongType)
+{
+    const char* szFilter = "jFilter.type() != Json::objectValue && jFilter.type() != Json::nullValue";
+    const char* szArray = "jTokenArrayOut.type() != Json::arrayValue";
+    const struct {
+        const char *szFilter, *szArray, *szCondition;
+    } rows[] = {{R"("tid")", "[]", szFilter}, {R"("")", "[]", szFilter}, {"[]", "[]", szFilter},
+                {"0", "[]", szFilter},        {"false", "[]", szFilter}, {"5", "null", szFilter},
+                {"null", "null", szArray},    {"null", "{}", szArray},   {"{}", "null", szArray},
+                {"{}", R"("[]")", szArray}};
+    for (const auto& row : rows) {
+        SCOPED_TRACE(std::string(row.szFilter) + " " + row.szArray);
+        Json::Value jFilter = json(row.szFilter);
+        Json::Value jTokens = json(row.szArray);
+        EXPECT_EQ(-1, api().tokenList(jFilter, jTokens));
+        EXPECT_EQ(json(row.szFilter), jFilter);
+        EXPECT_EQ(json(row.szArray), jTokens);
+        EXPECT_LINES(failed(SERVICE, row.szCondition));
+    }
+    EXPECT_EQ(Texts{}, seam().statements());
+}
+
+TEST_F(Lookup, GetsATokenByItsId)
+{
+    std::string strTid = "t";
+    EXPECT_EQ(1, api().tokenGetByTid(strTid, m_jOut));
+    EXPECT_EQ(token(), m_jOut);
+    for (std::string strUnknown : {"two", "T", "t ", "%", "x' OR '1'='1", "t'--"}) {
+        m_jOut = json(R"({"left":"over"})");
+        EXPECT_EQ(0, api().tokenGetByTid(strUnknown, m_jOut)) << strUnknown;
+        EXPECT_EQ(json("{}"), m_jOut);
+    }
+    failStatements("SELECT", DISK_ERROR);
+    m_jOut = json(R"({"left":"over"})");
+    EXPECT_EQ(-1, api().tokenGetByTid(strTid, m_jOut));
+    EXPECT_EQ(json("{}"), m_jOut);
+    EXPECT_LINES(broken(selectSql("t"), {RUN_FAILED, "0 > tokenGet(jParam, jTokenArray)"},
+                        "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))"));
+    errno = 0;
+    m_jOut = json(R"({"left":"over"})");
+    EXPECT_EQ(-1, api().tokenGetByTid(strTid = "", m_jOut));
+    EXPECT_EQ(json(R"({"left":"over"})"), m_jOut);
+    EXPECT_LINES(failed(SERVICE, "strTid.empty()"));
+}
+
+// A list of several ids is one text, without separators.
+TEST_F(Lookup, GetsOneTokenByAListOfIds)
+{
+    const struct {
+        Texts ids;
+        const char *szList, *szFound;
+    } rows[] = {{{"t"}, "'t'", "t"},
+                {{"unknown"}, "'unknown'", ""},
+                {{"t", "a'b"}, "'t''a''b'", ""},
+                {{"a", "b"}, "'a''b'", "a'b"},
+                {{""}, "''", ""}};
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.szList);
+        Texts ids = row.ids;
+        m_jArray = json("[5]");
+        EXPECT_EQ(0, api().tokenGetByTidArray(ids, m_jArray));
+        EXPECT_EQ(Json::Value(5), m_jArray[0]);
+        EXPECT_EQ(row.szFound[0] ? 2u : 1u, m_jArray.size());
+        EXPECT_EQ(row.szFound, m_jArray.get(1U, Json::Value(Json::objectValue))["tid"].asString());
+        EXPECT_EQ(row.ids, ids);
+        EXPECT_EQ(SELECT + " WHERE  (tid in (" + row.szList + " ) );", seam().statements().back());
+    }
+    seam().calls.clear();
+    Texts none;
+    for (const char* szArray : {"null", "{}", R"("")", "0"}) {
+        Json::Value jTokens = json(szArray);
+        EXPECT_EQ(-1, api().tokenGetByTidArray(none, jTokens));
+        EXPECT_EQ(json(szArray), jTokens);
+        EXPECT_LINES(failed(SERVICE, "jTokenArrayOut.type() != Json::arrayValue"));
+    }
+    EXPECT_EQ(-1, api().tokenGetByTidArray(none, m_jArray));
+    EXPECT_LINES(failed(SERVICE, "0 >= strTidVector.size()"));
+    EXPECT_EQ(Texts{}, seam().calls);
+    failStatements("SELECT", DISK_ERROR);
+    EXPECT_EQ(-1, api().tokenGetByTidArray(none = {"t"}, m_jArray));
+    EXPECT_LINES(broken(SELECT + " WHERE  (tid in ('t' ) );", {RUN_FAILED},
+                        "0 > m_pDb->tokenGet(jParam, jTokenArrayOut)"));
+    EXPECT_EQ(json("[5]"), m_jArray);
+}
+
+TEST_F(Lookup, MakesListsForFilters)
+{
+    const std::string strType =
+        "jParamOut.type() != Json::objectValue && jParamOut.type() != Json::nullValue";
+    const std::string strName = "!szField || !szField[0]";
+    const struct {
+        Texts values;
+        const char *szField, *szParam, *szResult;
+        std::string strCondition; // "": it is made
+    } rows[] = {
+        {{"a"}, "tid", "null", R"({"tid":["a"]})", ""},
+        {{"b", "a", "b", ""}, "bind_sid", "{}", R"({"bind_sid":["b","a","b",""]})", ""},
+        {{}, "tid", R"({"tid":["old"]})", R"({"tid":[]})", ""},
+        {{"1"}, "tid", R"({"tid":"old","uid":5})", R"({"tid":["1"],"uid":5})", ""},
+        {{"it's \""}, "no field", R"({"tid":"t"})", R"({"no field":["it's \""],"tid":"t"})", ""},
+        {{"a"}, nullptr, "{}", "{}", strName},
+        {{"a"}, "", "null", "null", strName},
+        {{"a"}, "tid", "[]", "[]", strType},
+        {{"a"}, "tid", R"("")", R"("")", strType},
+        {{"a"}, "tid", "0", "0", strType},
+        {{"a"}, nullptr, "[]", "[]", strType},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.szResult);
+        Texts values = row.values;
+        Json::Value jParam = json(row.szParam);
+        EXPECT_EQ(row.strCondition.empty() ? 0 : -1, api().VectorParamToJson(values, row.szField, jParam));
+        EXPECT_EQ(json(row.szResult), jParam);
+        EXPECT_EQ(row.values, values);
+        EXPECT_LINES(row.strCondition.empty() ? Texts{} : Texts{failed(SERVICE, row.strCondition)});
     }
 }
 

@@ -4,12 +4,9 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <cerrno>
 #include <filesystem>
 
-#include "AccessTokenApi.h"
 #include "StoreTest.h"
-#include "internal/AccessTokenDbApi.h"
 #include "vemo-access-token.h"
 
 namespace {
@@ -41,14 +38,23 @@ protected:
             EXPECT_EQ(0, seteuid(0));
             std::filesystem::remove_all(TREE);
         }
+        SeamTest::TearDown();
     }
 
-    int create(std::string& strTid)
+    static int create(std::string& strTid)
     {
         unsigned int uid = 0;
         std::string strFunction = "VPN";
         Json::Value jOption = json(R"({"webapi_allow": {"Api": {}}})");
         return VemoAccessTokenCreate(uid, strFunction, jOption, strTid);
+    }
+
+    static void expectPrivateFileOfRoot()
+    {
+        struct stat status;
+        ASSERT_EQ(0, stat(VEMO_ATOKEN_DB_PATH, &status));
+        EXPECT_EQ(S_IFREG | 0700u, status.st_mode);
+        EXPECT_EQ(0u, status.st_uid);
     }
 
 private:
@@ -59,60 +65,36 @@ TEST_F(System, KeepsTokensInAPrivateFileOfRoot)
 {
     std::string strTid;
     char szUser[16] = "";
-
     EXPECT_EQ(0, create(strTid));
     EXPECT_EQ(0, VemoAccessTokenGrant(strTid, "Api", nullptr, szUser, sizeof(szUser)));
-
     EXPECT_STREQ("root", szUser);
-    struct stat status;
-    ASSERT_EQ(0, stat(VEMO_ATOKEN_DB_PATH, &status));
-    EXPECT_EQ(S_IFREG | 0700u, status.st_mode);
-    EXPECT_EQ(0u, status.st_uid);
-    EXPECT_EQ(Texts{}, takeLines());
-}
-
-TEST_F(System, OpensAsRootAndPutsTheEffectiveUidBack)
-{
-    ASSERT_EQ(0, seteuid(UID_NOBODY));
-    AccessTokenDbApi db;
-
-    EXPECT_EQ(0, db.initDb());
-
-    EXPECT_EQ(UID_NOBODY, geteuid());
-    ASSERT_EQ(0, seteuid(0));
-    struct stat status;
-    ASSERT_EQ(0, stat(VEMO_ATOKEN_DB_PATH, &status));
-    EXPECT_EQ(S_IFREG | 0700u, status.st_mode);
-    EXPECT_EQ(0u, status.st_uid);
+    expectPrivateFileOfRoot();
 }
 
 // Why a process should stay at effective uid 0: SQLite opens the journal for each change anew.
-TEST_F(System, CannotWriteAtAnotherEffectiveUid)
+TEST_F(System, OpensAsRootButCannotWriteAtAnotherEffectiveUid)
 {
-    std::string strTid;
-    ASSERT_EQ(0, create(strTid));
-    ASSERT_EQ(0, seteuid(UID_NOBODY));
-    AccessTokenDbApi db;
     Json::Value jTokens;
     Json::Value jAll(Json::objectValue);
-
-    EXPECT_EQ(0, db.tokenGet(jAll, jTokens));
-    EXPECT_EQ(1u, jTokens.size());
-    EXPECT_EQ(-1, db.tokenDelete(jAll, true));
-
-    EXPECT_EQ("attempt to write a readonly database", db.m_strErr);
+    ASSERT_EQ(0, seteuid(UID_NOBODY));
+    AccessTokenDbApi db;
+    EXPECT_EQ(0, db.initDb());
     EXPECT_EQ(UID_NOBODY, geteuid());
+    EXPECT_EQ(0, db.tokenGet(jAll, jTokens));
+    EXPECT_EQ(-1, db.tokenDelete(jAll, true));
+    EXPECT_EQ("attempt to write a readonly database", db.m_strErr);
+    EXPECT_EQ(3u, takeLines().size());
+    ASSERT_EQ(0, seteuid(0));
+    expectPrivateFileOfRoot();
 }
 
 TEST_F(System, FailedOpeningLeavesTheEffectiveUidAtRoot)
 {
     ASSERT_EQ(0, mkdir(VEMO_ATOKEN_DB_PATH, 0700));
     ASSERT_EQ(0, seteuid(UID_NOBODY));
-    AccessTokenDbApi db;
-
-    EXPECT_EQ(-1, db.initDb());
-
+    EXPECT_EQ(-1, AccessTokenDbApi().initDb());
     EXPECT_EQ(0u, geteuid());
+    EXPECT_EQ(1u, takeLines().size());
 }
 
 TEST_F(System, NeedsTheRightToBecomeRoot)
@@ -126,7 +108,6 @@ TEST_F(System, NeedsTheRightToBecomeRoot)
     }
     int nStatus = -1;
     ASSERT_EQ(nChild, waitpid(nChild, &nStatus, 0));
-
     EXPECT_EQ(0, nStatus);
     EXPECT_FALSE(std::filesystem::exists(VEMO_ATOKEN_DB_PATH));
 }

@@ -1,0 +1,427 @@
+// Rows of the database as records.
+
+#include <climits>
+#include <new>
+
+#include "AccessTokenUtil.h"
+#include "StoreTest.h"
+
+using VEMO_ACCESS_TOKEN::tokenType;
+
+namespace {
+
+const std::string FIELD_FAILED = "0 > (iTmp = FillField(*pjToken, column_name, column_value, i))";
+const std::string TOKEN_FAILED = "0 > FillToken(&jTmp, n_column, column_value, column_name)";
+const std::string NULL_ROW = "NULL == column_name || NULL == column_value";
+const std::string NULL_COLUMN = "NULL == column_name[i] || NULL == column_value[i]";
+const std::string NO_FIELD = "!jTokenType.isMember(strName)";
+const std::string WRONG_ARRAY = "pjTokenArray->type() != Json::arrayValue && "
+                                "pjTokenArray->type() != Json::nullValue";
+
+int g_nAllocationThatFails = 0;  // counted from now, 1 is the next; 0: none
+bool g_blJsoncppTellsIt = false; // by an exception of its own, as it does where it calls malloc
+
+void allocate()
+{
+    if (0 < g_nAllocationThatFails && 0 == --g_nAllocationThatFails) {
+        errno = ENOMEM;
+        if (g_blJsoncppTellsIt) {
+            throw Json::RuntimeError("no memory");
+        }
+        throw std::bad_alloc();
+    }
+}
+
+// What the JSON library says when the type name of such an entry is read.
+std::string errorOf(const Json::Value& jEntry)
+{
+    try {
+        return "no error: " + jEntry[0U].asString();
+    } catch (const Json::LogicError& error) {
+        return error.what();
+    }
+}
+
+// What is logged when a column of a row is refused.
+Texts columnLines(const std::string& strLine, int nErrno = 0)
+{
+    return Texts{strLine} + allFailed(STORE, {FIELD_FAILED, TOKEN_FAILED}, nErrno);
+}
+
+// Names and texts, as many as the row has columns.
+struct Row {
+    std::vector<const char*> names;
+    std::vector<const char*> values;
+};
+
+// The decoder, as the library hands it to SQLite. A row that is refused leaves the array as it was.
+class Decoding : public TableTest {
+protected:
+    void SetUp() override
+    {
+        TableTest::SetUp();
+        seam().sqliteExec = [&](sqlite3*, const char*, SqlCallback pCallback, void*, char**) {
+            m_pDecoder = pCallback;
+            return SQLITE_OK;
+        };
+        Json::Value jAll(Json::objectValue);
+        EXPECT_EQ(0, m_db.tokenGet(jAll, m_jArray));
+        reset();
+    }
+
+    int decode(const Row& row)
+    {
+        return m_pDecoder(&m_jArray, static_cast<int>(row.names.size()),
+                          const_cast<char**>(row.values.data()), const_cast<char**>(row.names.data()));
+    }
+
+    // The member that one column becomes.
+    Json::Value member(const char* szName, const std::string& strValue)
+    {
+        m_jArray = Json::Value();
+        EXPECT_EQ(0, decode({{szName}, {strValue.c_str()}}));
+        EXPECT_EQ(1u, m_jArray.size());
+        EXPECT_EQ((Texts{szName}), m_jArray[0].getMemberNames());
+        return m_jArray[0][szName];
+    }
+
+    void expectRefused(const Row& row, const Texts& lines)
+    {
+        m_jArray = Json::Value();
+        EXPECT_NO_THROW(EXPECT_EQ(-1, decode(row)));
+        EXPECT_LINES(lines);
+        EXPECT_TRUE(m_jArray.isNull());
+    }
+
+    // Decodes what a query yields.
+    int run(const std::string& strSql)
+    {
+        m_db.m_strSql = strSql;
+        return m_db.runSql(m_pDecoder, &m_jArray);
+    }
+
+    // The lines of a query that ends at a refused row.
+    Texts queryLines(const Texts& linesOfRow) const
+    {
+        return linesOfRow + failureOf(m_db.m_strSql, "query aborted");
+    }
+
+    SqlCallback m_pDecoder = nullptr;
+    Json::Value m_jArray;
+};
+
+TEST_F(Decoding, KeepsTextUnchanged)
+{
+    std::string strBytes;
+    for (int nByte = 1; nByte < 256; ++nByte) {
+        strBytes += static_cast<char>(nByte);
+    }
+    for (const std::string& strText : Texts{"", "  a\t\n", "12", "null", "{\"a\":1}", strBytes}) {
+        SCOPED_TRACE(strText);
+        for (const char* szField : {"tid", "bind_sid", "function"}) {
+            EXPECT_EQ(Json::Value(strText), member(szField, strText));
+        }
+    }
+}
+
+TEST_F(Decoding, ReadsNumbersLeniently)
+{
+    // An int is the low half of what strtol reads.
+    const struct {
+        const char* szText;
+        Json::Int64 nLongLong;
+        Json::Int nInt;
+    } rows[] = {{"0", 0, 0},
+                {"-1", -1, -1},
+                {"1026", 1026, 1026},
+                {"+7", 7, 7},
+                {" \t\n -5", -5, -5},
+                {"", 0, 0},
+                {"abc", 0, 0},
+                {"12abc", 12, 12},
+                {"3.9", 3, 3},
+                {"1e3", 1, 1},
+                {"010", 10, 10},
+                {"0x10", 0, 0},
+                {"2026-01-02 13:00:00", 2026, 2026},
+                {"2147483648", 2147483648LL, INT_MIN},
+                {"4294967295", 4294967295LL, -1},
+                {"9223372036854775807", INT64_MAX, -1},
+                {"-9223372036854775808", INT64_MIN, 0},
+                {"9223372036854775808", INT64_MAX, -1},
+                {"-99999999999999999999", INT64_MIN, 0}};
+    tokenType()["small"] = json("[\"int\",0]");
+    for (const auto& [szText, nLongLong, nInt] : rows) {
+        SCOPED_TRACE(szText);
+        for (const char* szField : {"uid", "deadline", "count", "create_time"}) {
+            EXPECT_EQ(Json::Value(nLongLong), member(szField, szText));
+        }
+        EXPECT_EQ(Json::Value(nInt), member("small", szText));
+    }
+    // The table of types is read for each row.
+    tokenType()["deadline"][0] = "int";
+    EXPECT_EQ(Json::Value(0), member("deadline", "4294967296"));
+    tokenType()["deadline"][0] = "string";
+    EXPECT_EQ(Json::Value("-1"), member("deadline", "-1"));
+}
+
+// The text decides what the member becomes, the type name does not. Of bad JSON stays what was read.
+TEST_F(Decoding, ParsesJsonOfAnyKind)
+{
+    const std::pair<const char*, const char*> rows[] = {
+        {"{}", "{}"},
+        {"[]", "[]"},
+        {"null", "null"},
+        {"true", "true"},
+        {"-1", "-1"},
+        {"9223372036854775807", "9223372036854775807"},
+        {"18446744073709551615", "18446744073709551615"},
+        {"0.1", "0.1"},
+        {R"("")", R"("")"},
+        {R"("a\"\u0001")", R"("a\"\u0001")"},
+        {" {\"Example.Api\" : {\"method\" : [\"get\", \"list\"]}}\n",
+         R"({"Example.Api":{"method":["get","list"]}})"},
+        {R"([1,[2,{"a":{}}]])", R"([1,[2,{"a":{}}]])"},
+        {"", "null"},
+        {" ", "null"},
+        {"nonsense", "null"},
+        {"'single'", "null"},
+        {"\"open", "null"},
+        {"{", "{}"},
+        {R"({"a":1)", R"({"a":1})"},
+        {R"({"a":1,"b":x})", R"({"a":1,"b":null})"},
+        {"[1,2", "[1,2]"},
+        {R"({"a":1} and more)", R"({"a":1})"},
+        {"2026-01-02", "2026"},
+    };
+    tokenType()["any"] = json(R"(["Json::Value",0])");
+    tokenType()["list"] = json(R"(["Json::arrayValue",0])");
+    for (const auto& [szText, szRead] : rows) {
+        SCOPED_TRACE(szText);
+        for (const char* szField : {"any", "list", "webapi_allow", "extra"}) {
+            EXPECT_EQ(json(szRead), member(szField, szText));
+        }
+    }
+    const Json::Value jExtra = member("extra", "// a comment\n{\"a\":1}");
+    EXPECT_EQ(json(R"({"a":1})"), jExtra);
+    EXPECT_FALSE(jExtra.hasComment(Json::commentBefore));
+}
+
+TEST_F(Decoding, NeverThrowsOnDeepNesting)
+{
+    const auto nested = [](size_t nLevels, const char* szInnermost) {
+        return std::string(nLevels, '[') + szInnermost + std::string(nLevels, ']');
+    };
+    EXPECT_TRUE(json(nested(1000, "")) == member("extra", nested(1000, "")));
+    // What was read down to the limit stands.
+    Json::Value jLeft;
+    for (int nLevel = 0; nLevel < 1000; ++nLevel) {
+        Json::Value jOuter;
+        jOuter.append(jLeft);
+        jLeft.swap(jOuter);
+    }
+    for (const std::string& strText : {nested(1001, ""), nested(100000, "1"), std::string(100000, '[')}) {
+        EXPECT_TRUE(jLeft == member("extra", strText)) << strText.size();
+    }
+    EXPECT_EQ(json("{\"a\":1}"), member("extra", "{\"a\":1}")) << "the reader is as before";
+}
+
+TEST_F(Decoding, RefusesUnknownTypeNames)
+{
+    const std::pair<const char*, const char*> rows[] = {{R"(["bool",false])", "bool"},
+                                                        {R"(["uid_t",0])", "uid_t"},
+                                                        {R"(["time_t",0])", "time_t"},
+                                                        {R"(["double"])", "double"},
+                                                        {R"(["String"])", "String"},
+                                                        {R"(["string "])", "string "},
+                                                        {R"(["%s%n"])", "%s%n"},
+                                                        {R"([""])", ""},
+                                                        {"null", ""},
+                                                        {"[]", ""},
+                                                        {"[null]", ""},
+                                                        {"[5]", "5"},
+                                                        {"[true,\"string\"]", "true"},
+                                                        {R"(["json::value"])", "json::value"}};
+    for (const auto& [szEntry, szType] : rows) {
+        SCOPED_TRACE(szEntry);
+        tokenType()["odd"] = json(szEntry);
+        errno = EACCES;
+        expectRefused({{"odd"}, {"1"}},
+                      columnLines(fail(STORE, std::string("type error, strType=") + szType, EACCES), EACCES));
+    }
+}
+
+// SQLite is C and cannot be thrown through.
+TEST_F(Decoding, TurnsExceptionsIntoFailure)
+{
+    for (const char* szEntry : {R"("string")", "{}", R"({"0":"string"})", "5", R"([["string"]])", "[{}]"}) {
+        SCOPED_TRACE(szEntry);
+        tokenType()["odd"] = json(szEntry);
+        expectRefused({{"count", "odd"}, {"1", "1"}},
+                      {fail(STORE, "decode row failed, error=" + errorOf(json(szEntry)))});
+    }
+}
+
+// The reader takes a long number for none when the allocation in it fails, and is asked again.
+TEST_F(Decoding, YieldsTheWholeRecordOrNoneWhenAnAllocationFails)
+{
+    const std::string strTid(1000, 'x');
+    const std::string strExtra =
+        R"({"a":[1,{"b":0.12345678901234567,"c":")" + std::string(100, 'x') + "\"}]}";
+    const Row row = {{"tid", "deadline", "extra"}, {strTid.c_str(), "-1", strExtra.c_str()}};
+    for (const bool blWarm : {false, true}) { // at first the thread's reader is made as well
+        for (const char* szError : {"std::bad_alloc", "no memory"}) {
+            SCOPED_TRACE(szError);
+            int nWhole = 0;
+            int nNone = 0;
+            bool blFailed = true;
+            g_blJsoncppTellsIt = std::string("no memory") == szError;
+            while (blFailed) {
+                m_jArray = Json::Value();
+                errno = 0;
+                g_pAllocation = allocate;
+                g_nAllocationThatFails = nWhole + nNone + 1;
+                int nResult = 0;
+                EXPECT_NO_THROW(nResult = decode(row));
+                blFailed = 0 == g_nAllocationThatFails;
+                g_nAllocationThatFails = 0;
+                if (0 == nResult) {
+                    ++nWhole;
+                    ASSERT_EQ(json(strExtra), m_jArray[0]["extra"]);
+                } else {
+                    ++nNone;
+                    ASSERT_TRUE(m_jArray.empty());
+                    ASSERT_EQ(
+                        (Texts{fail(STORE, std::string("decode row failed, error=") + szError, ENOMEM)}),
+                        takeLines());
+                }
+            }
+            EXPECT_LT(blWarm ? 1 : 0, nWhole); // one of them without a failure
+            EXPECT_LT(3, nNone);
+        }
+    }
+}
+
+TEST_F(Decoding, RefusesColumnsThatAreNoFields)
+{
+    for (const char* szName : {"nonsense", "", "TID", "tid ", "count(*)", "token.tid", "sort_by"}) {
+        SCOPED_TRACE(szName);
+        expectRefused({{"tid", szName}, {"a", "1"}}, columnLines(failed(STORE, NO_FIELD)));
+    }
+    insert();
+    for (const char* szSql : {"SELECT count(*) FROM token", "SELECT tid, uid + 1 FROM token",
+                              "SELECT tid AS name FROM token", "SELECT rowid FROM token"}) {
+        SCOPED_TRACE(szSql);
+        EXPECT_EQ(-1, run(szSql));
+        EXPECT_LINES(queryLines(columnLines(failed(STORE, NO_FIELD))));
+    }
+    EXPECT_EQ(0, run("SELECT tid, uid + 1 AS uid, 'x' AS function, bind_sid AS count FROM token"));
+    EXPECT_EQ(json(R"([{"tid":"t","uid":1001,"function":"x","count":0}])"), m_jArray);
+}
+
+TEST_F(Decoding, RefusesWhatIsMissing)
+{
+    char* pointers[] = {nullptr};
+    for (const int nColumns : {1, 0, -1}) {
+        for (const auto& [szValues, szNames] :
+             {std::pair<char**, char**>{pointers, nullptr}, {nullptr, pointers}}) {
+            EXPECT_EQ(-1, m_pDecoder(&m_jArray, nColumns, szValues, szNames));
+            EXPECT_LINES(allFailed(STORE, {NULL_ROW, TOKEN_FAILED}));
+        }
+        EXPECT_EQ(-1, m_pDecoder(nullptr, nColumns, nullptr, nullptr)); // before all else
+        EXPECT_LINES(failed(STORE, "!pjTokenArray"));
+    }
+    const Row rows[] = {{{"tid"}, {nullptr}},
+                        {{nullptr}, {"a"}},
+                        {{"tid", "uid"}, {"a", nullptr}},
+                        {{"tid", nullptr}, {"a", nullptr}},
+                        {{"extra", "uid", "nonsense"}, {"{", nullptr, "1"}}}; // the first bad column decides
+    for (const Row& row : rows) {
+        errno = EACCES;
+        expectRefused(row, allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED}, EACCES));
+    }
+    errno = EACCES;
+    expectRefused({{"tid", "nonsense", "uid"}, {"a", "1", nullptr}},
+                  columnLines(failed(STORE, NO_FIELD, EACCES), EACCES));
+}
+
+TEST_F(Decoding, RefusesOutputThatIsNoArray)
+{
+    insert();
+    for (const char* szOutput : {"{}", R"({"a":1})", R"("text")", "0", "1.5", "true"}) {
+        SCOPED_TRACE(szOutput);
+        m_jArray = json(szOutput);
+        EXPECT_EQ(-1, decode({{"tid"}, {"a"}}));
+        EXPECT_LINES(failed(STORE, WRONG_ARRAY));
+        EXPECT_EQ(0, run("SELECT * FROM token WHERE tid = 'u'")) << "nobody looks before the first row";
+        EXPECT_EQ(-1, run("SELECT * FROM token"));
+        EXPECT_LINES(queryLines({failed(STORE, WRONG_ARRAY)}));
+        EXPECT_EQ(json(szOutput), m_jArray);
+    }
+}
+
+TEST_F(Decoding, AppendsEachRowAsAFreshRecord)
+{
+    char* noColumns[] = {nullptr};
+    m_jArray.append("first");
+    EXPECT_EQ(0, decode({{"tid", "count"}, {"a", "2"}}));
+    EXPECT_EQ(0, decode({{"uid"}, {"3"}}));
+    EXPECT_EQ(-1, decode({{"bind_sid", "uid"}, {"b", nullptr}}));
+    EXPECT_EQ(2u, takeLines().size());
+    for (const int nColumns : {0, -1, INT_MIN}) {
+        EXPECT_EQ(0, m_pDecoder(&m_jArray, nColumns, noColumns, noColumns));
+    }
+    // A later column replaces an earlier one of the same name.
+    EXPECT_EQ(0, decode({{"count", "extra", "count", "extra"}, {"1", R"({"a":[1]})", "2", "{"}}));
+    EXPECT_EQ(0, decode({{"extra", "extra"}, {"{}", ""}}));
+    EXPECT_EQ(
+        json(R"(["first",{"tid":"a","count":2},{"uid":3},{},{},{},{"count":2,"extra":{}},{"extra":null}])"),
+        m_jArray);
+}
+
+// A row of another maker: any value in any column, and the column's own default time, which is text.
+TEST_F(Decoding, ReadsForeignRowsLeniently)
+{
+    query("INSERT INTO token (tid,bind_sid,uid,deadline,function,webapi_allow,extra) "
+          "VALUES (x'610062', 2.5, 'nobody', 1.9, 7, 5, 'none')");
+    query("UPDATE token SET create_time = '2026-01-02 13:00:00'");
+    EXPECT_EQ(0, run("SELECT * FROM token"));
+    EXPECT_EQ(json(R"([{"tid":"a","bind_sid":"2.5","uid":0,"deadline":1,"count":1,"create_time":2026,
+                        "function":"7","webapi_allow":5,"extra":null}])"),
+              m_jArray);
+}
+
+TEST_F(Decoding, KeepsTheRowsBeforeOneThatHoldsNull)
+{
+    for (const char* szTid : {"a", "b", "c"}) {
+        query("INSERT INTO token VALUES ('" + std::string(szTid) + "','',1,2,3,4,'f','{}','{}')");
+    }
+    for (const Field& field : fields()) {
+        SCOPED_TRACE(field.szName);
+        if (std::string::npos != std::string(field.szColumn).find("NOT NULL")) {
+            continue;
+        }
+        query(std::string("UPDATE token SET ") + field.szName + " = NULL WHERE tid = 'b'");
+        m_jArray = Json::Value();
+        EXPECT_EQ(-1, run("SELECT tid, " + std::string(field.szName) + " FROM token"));
+        EXPECT_LINES(queryLines(allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED})));
+        ASSERT_EQ(1u, m_jArray.size());
+        EXPECT_EQ(Json::Value("a"), m_jArray[0]["tid"]);
+    }
+}
+
+TEST_F(Decoding, LeavesTheConnectionUsableAfterAnException)
+{
+    insert();
+    const Json::Value jEntry = tokenType()["extra"];
+    tokenType()["extra"] = "no array";
+    EXPECT_NO_THROW(EXPECT_EQ(-1, run("SELECT * FROM token")));
+    EXPECT_LINES(queryLines({fail(STORE, "decode row failed, error=" + errorOf("no array"))}));
+    tokenType()["extra"] = jEntry;
+    EXPECT_EQ(0, run("SELECT tid FROM token"));
+    EXPECT_EQ(json(R"([{"tid":"t"}])"), m_jArray);
+    EXPECT_EQ(0, m_db.freeDb());
+    EXPECT_EQ(nullptr, m_db.m_pDb) << "no statement is left open";
+}
+
+} // namespace

@@ -1,0 +1,220 @@
+// Functions that a program puts in front of exported ones: the library calls these, from within as well, and
+// passes on what they fail with. Nothing else brings such failures about.
+
+#include <dlfcn.h>
+
+#include <functional>
+
+#include "AccessTokenUtil.h"
+#include "StoreTest.h"
+#include "vemo-access-token.h"
+
+#define STRING "NSt7__cxx1112basic_stringIcSt11char_traitsIcESaIcEEE"
+
+namespace {
+
+// What each function does instead of the library's own, when that is set.
+struct {
+    std::function<int(std::string&)> names, symbols, table;
+    std::function<int()> fillDefaultValue, getTimeAfterNow, getOne, toJson, grantEx;
+    std::function<Json::ValueType()> typeOfObjects;
+} g_instead;
+
+// The definition that would be found if that of this file were not here.
+template <typename Function>
+Function* next(const char* szMangledName)
+{
+    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szMangledName));
+}
+
+int expand(const std::function<int(std::string&)>& instead, const char* szMangledName, AccessTokenDbApi* pDb,
+           std::string& strSql)
+{
+    return instead ? instead(strSql) : next<int(AccessTokenDbApi*, std::string&)>(szMangledName)(pDb, strSql);
+}
+
+} // namespace
+
+int VEMO_ACCESS_TOKEN::fillDefaultValue(Json::Value& jToken, bool blCheck)
+{
+    const char* const szName = "_ZN17VEMO_ACCESS_TOKEN16fillDefaultValueERN4Json5ValueEb";
+    return g_instead.fillDefaultValue ? g_instead.fillDefaultValue()
+                                      : next<int(Json::Value&, bool)>(szName)(jToken, blCheck);
+}
+
+int VEMO_ACCESS_TOKEN::getTimeAfterNow(int offsetSecond, long& now)
+{
+    const char* const szName = "_ZN17VEMO_ACCESS_TOKEN15getTimeAfterNowEiRl";
+    return g_instead.getTimeAfterNow ? g_instead.getTimeAfterNow()
+                                     : next<int(int, long&)>(szName)(offsetSecond, now);
+}
+
+int AccessTokenDbApi::SqlExpandMemberName(std::string& strSql)
+{
+    return expand(g_instead.names, "_ZN16AccessTokenDbApi19SqlExpandMemberNameER" STRING, this, strSql);
+}
+
+int AccessTokenDbApi::SqlExpandMemberSymbol(std::string& strSql)
+{
+    return expand(g_instead.symbols, "_ZN16AccessTokenDbApi21SqlExpandMemberSymbolER" STRING, this, strSql);
+}
+
+int AccessTokenDbApi::SqlExpandCreateTable(std::string& strSql)
+{
+    return expand(g_instead.table, "_ZN16AccessTokenDbApi20SqlExpandCreateTableER" STRING, this, strSql);
+}
+
+int AccessTokenDbApi::tokenGetOne(const char*, std::string&, Json::Value&)
+{
+    return g_instead.getOne();
+}
+
+int AccessTokenApi::VectorParamToJson(std::vector<std::string>&, const char*, Json::Value&)
+{
+    return g_instead.toJson();
+}
+
+int VemoAccessTokenGrantEx(std::string&, const char*, const char*, Json::Value&)
+{
+    return g_instead.grantEx();
+}
+
+__attribute__((visibility("default"))) Json::ValueType Json::Value::type() const
+{
+    static auto* const pType = next<Json::ValueType(const Json::Value*)>("_ZNK4Json5Value4typeEv");
+    const Json::ValueType type = pType(this);
+    return Json::objectValue == type && g_instead.typeOfObjects ? g_instead.typeOfObjects() : type;
+}
+
+namespace {
+
+const auto FAILS = [] { return -1; };
+const auto FAILS_TO_EXPAND = [](std::string&) { return -1; };
+
+class Interposed : public TableTest {};
+
+TEST_F(Interposed, TheTextOfATimeFailsWithTheTime)
+{
+    std::string strTime = "before";
+    g_instead.getTimeAfterNow = FAILS;
+    errno = EACCES;
+    EXPECT_EQ(-1, VEMO_ACCESS_TOKEN::getTimeAfterNow(3600, strTime));
+    EXPECT_EQ("before", strTime);
+    EXPECT_LINES(failed(UTIL, "0 > getTimeAfterNow(offsetSecond, now)", EACCES));
+}
+
+TEST_F(Interposed, StatementsFailWithTheirParts)
+{
+    Json::Value jToken = token();
+    Json::Value jAll(Json::objectValue);
+    Json::Value jOut;
+    m_db.m_strSql = "earlier";
+    g_instead.table = FAILS_TO_EXPAND;
+    EXPECT_EQ(-1, m_db.createTable());
+    EXPECT_LINES(failed(STORE, "0 > AccessTokenDbApi::SqlExpandCreateTable(strSql)"));
+    g_instead.names = FAILS_TO_EXPAND;
+    EXPECT_EQ(-1, m_db.tokenGet(jAll, jOut));
+    EXPECT_EQ(-1, m_db.tokenSave(jToken, true));
+    EXPECT_LINES(allFailed(
+        STORE, {"0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)", "0 > SqlExpandMemberName(strSqlPrefix)"}));
+    g_instead.names = nullptr;
+    g_instead.symbols = FAILS_TO_EXPAND;
+    EXPECT_EQ(-1, m_db.tokenSave(jToken, true));
+    g_instead.symbols = [](std::string& strSql) { return strSql.clear(), 0; };
+    EXPECT_EQ(-1, m_db.tokenSave(jToken, true));
+    EXPECT_LINES(allFailed(STORE, {"0 > SqlExpandMemberSymbol(strSqlPrefix)", "!szSql || !szSql[0]"}));
+    EXPECT_EQ("earlier", m_db.m_strSql);
+    EXPECT_EQ(Texts{}, seam().statements());
+}
+
+TEST_F(Interposed, OpeningSucceedsWithoutATable)
+{
+    query("DROP TABLE token");
+    ASSERT_EQ(0, unlink(path().c_str()));
+    g_instead.table = FAILS_TO_EXPAND;
+    EXPECT_EQ(0, m_db.initDb());
+    EXPECT_LINES(failed(STORE, "0 > SqlExpandCreateTable(strSql)", ENOENT));
+    EXPECT_EQ((Texts{UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN, RAISE}), seam().callsOf(OPENING_CALLS));
+}
+
+TEST_F(Interposed, CreationsFailWithTheDefaults)
+{
+    unsigned int uid = 1000;
+    std::string strFunction = "VPN", strTid = tid();
+    Json::Value jOption;
+    g_instead.fillDefaultValue = FAILS;
+    EXPECT_EQ(-1, api().tokenCreateByTid(uid, strFunction, jOption, strTid));
+    EXPECT_LINES(failed(SERVICE, "0 > fillDefaultValue(jParam, false)"),
+                 ordinary(SERVICE, "tokenCreate failed, tid=" + strTid +
+                                       ", uid=1000, strFunction=VPN, jTokenOption=null"));
+}
+
+TEST_F(Interposed, LookupsHandNegativeResultsOnWhichUpdatesDoNot)
+{
+    const std::string strGetOne = "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))";
+    std::string strTid = "t";
+    Json::Value jToken(Json::objectValue);
+    g_instead.getOne = [] { return -7; };
+    EXPECT_EQ(-7, api().tokenGetByTid(strTid, jToken));
+    EXPECT_EQ(-1, api().tokenUpdateByTid(strTid, jToken));
+    EXPECT_LINES(allFailed(SERVICE, {strGetOne, strGetOne, "0 > (nCount = tokenGetByTid(strTid, jToken))"}));
+}
+
+// Whatever may go wrong with the filter, a deletion by value never empties the table.
+TEST_F(Interposed, ListsThatBecomeNoFilterSelectNothing)
+{
+    Texts values{"a", "b"};
+    Json::Value jArray(Json::arrayValue);
+    insert();
+    g_instead.toJson = FAILS;
+    EXPECT_EQ(-1, api().tokenGetByTidArray(values, jArray));
+    EXPECT_LINES(failed(SERVICE, "0 > VectorParamToJson(strTidVector, \"tid\", jParam)"));
+    const std::string strSummary = ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=a,b");
+    EXPECT_EQ(-1, api().tokenDeleteByArray(values, "tid"));
+    EXPECT_LINES(failed(SERVICE, "0 > VectorParamToJson(strVector, szName, jParam)"), strSummary);
+    g_instead.toJson = [] { return 0; };
+    EXPECT_EQ(-1, api().tokenDeleteByArray(values, "tid"));
+    EXPECT_LINES(failed(STORE, "strSql.empty()"), failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))"),
+                 strSummary);
+    EXPECT_EQ(Texts{}, seam().statements());
+    EXPECT_EQ("t", tids());
+}
+
+TEST_F(Interposed, NoNameIsToldOfARecordWithoutUid)
+{
+    std::string strTid = "t";
+    char szUser[] = "before";
+    g_instead.grantEx = [] { return 0; };
+    EXPECT_EQ(-1, VemoAccessTokenGrant(strTid, "Api", "get", szUser, sizeof(szUser)));
+    EXPECT_LINES(failed(WRAPPER, "!jToken.isMember(\"uid\")"));
+    EXPECT_STREQ("before", szUser);
+    EXPECT_EQ(Texts{}, seam().callsOf({"getpwuid_r"}));
+}
+
+// A fresh record is always an object; only a lie reaches the check, which asks up to twice.
+TEST_F(Interposed, RowsBecomeRecordsThatAreObjectsOrNull)
+{
+    Json::Value jAll(Json::objectValue);
+    SqlCallback pDecoder = nullptr;
+    seam().sqliteExec = [&](sqlite3*, const char*, SqlCallback pCallback, void*, char**) {
+        pDecoder = pCallback;
+        return SQLITE_OK;
+    };
+    Json::Value jArray;
+    ASSERT_EQ(0, m_db.tokenGet(jAll, jArray));
+    char szName[] = "tid", szValue[] = "a";
+    char *names[] = {szName}, *values[] = {szValue};
+    for (const Json::ValueType type : {Json::arrayValue, Json::nullValue}) {
+        g_instead.typeOfObjects = [type, nLies = 2]() mutable {
+            return 0 < nLies-- ? type : Json::objectValue;
+        };
+        EXPECT_EQ(Json::nullValue == type ? 0 : -1, pDecoder(&jArray, 1, values, names));
+        g_instead.typeOfObjects = nullptr;
+    }
+    EXPECT_EQ(json(R"([{"tid":"a"}])"), jArray);
+    EXPECT_LINES(allFailed(STORE, {"jToken.type() != Json::objectValue && jToken.type() != Json::nullValue",
+                                   "0 > (iTmp = FillField(*pjToken, column_name, column_value, i))",
+                                   "0 > FillToken(&jTmp, n_column, column_value, column_name)"}));
+}
+
+} // namespace

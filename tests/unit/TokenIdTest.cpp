@@ -1,0 +1,124 @@
+// Generated token ids, and times as text.
+
+#include <climits>
+#include <set>
+
+#include "AccessTokenUtil.h"
+#include "StoreTest.h"
+
+using VEMO_ACCESS_TOKEN::getTimeAfterNow;
+using VEMO_ACCESS_TOKEN::tokenGenerate;
+
+namespace {
+
+class TokenId : public SeamTest {};
+
+// With so many ids, a length or character that can occur and yet does not is no chance: for a length
+// it is about one in 10^20.
+TEST_F(TokenId, HasEveryLengthFrom127To255AndEveryLetterAndDigit)
+{
+    const int nIds = 6000;
+    std::set<std::string> ids;
+    std::set<size_t> lengths;
+    std::set<char> letters;
+    for (int i = 0; i < nIds; ++i) {
+        std::string strTid(1000, '#');
+        ASSERT_LE(0, tokenGenerate(strTid));
+        ids.insert(strTid);
+        lengths.insert(strTid.size());
+        letters.insert(strTid.begin(), strTid.end());
+    }
+    EXPECT_EQ(static_cast<size_t>(nIds), ids.size());
+    EXPECT_EQ(255u - 127u + 1u, lengths.size());
+    EXPECT_EQ(127u, *lengths.begin());
+    EXPECT_EQ(255u, *lengths.rbegin());
+    EXPECT_EQ("0123456789ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz",
+              std::string(letters.begin(), letters.end()));
+}
+
+// Eight bytes, least significant first, choose the length; then each byte chooses a character, 62
+// different ones in turn. The last 8 of the 256 bytes would favour the first characters and are passed
+// over.
+TEST_F(TokenId, TakesCharactersInTheOrderOfTheAlphabet)
+{
+    const std::string strAlphabet = "0987654321abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ";
+    const struct {
+        unsigned char nLength; // of 129
+        unsigned char nFirst;  // of the bytes that follow, each one greater than the one before it
+        std::string strTid;
+    } rows[] = {
+        {0, 0, strAlphabet + strAlphabet + "098"},
+        {61, 0, strAlphabet + strAlphabet + strAlphabet + "09"},
+        {128, 0, strAlphabet + strAlphabet + strAlphabet + strAlphabet + "0987654"},
+        {0, 61, "Z" + strAlphabet + strAlphabet + "09"},
+        {0, 246, "YZ" + strAlphabet + strAlphabet + "0"},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.strTid);
+        seam().calls.clear();
+        seam().random = [&row, nByte = row.nFirst](void* pBuffer, size_t cbBuffer, unsigned int) mutable {
+            unsigned char* const pBytes = static_cast<unsigned char*>(pBuffer);
+            const bool blLength = 1 == seam().calls.size();
+            for (size_t i = 0; i < cbBuffer; ++i) {
+                pBytes[i] = blLength ? (0 == i ? row.nLength : 0) : nByte++;
+            }
+            return static_cast<ssize_t>(cbBuffer);
+        };
+        std::string strTid;
+        EXPECT_LE(0, tokenGenerate(strTid));
+        EXPECT_EQ(row.strTid, strTid);
+    }
+}
+
+TEST_F(TokenId, FailsWithTheRandomSourceUnlessThatWasInterrupted)
+{
+    std::string strTid = "before";
+    VEMO_ACCESS_TOKEN::debugInfo(true);
+    for (const int nCall : {1, 2}) { // the length, and the characters
+        reset();
+        seam().fail("getrandom", ENOSYS, nCall, INT_MAX);
+        EXPECT_GT(0, tokenGenerate(strTid));
+        EXPECT_EQ(ENOSYS, errno);
+        EXPECT_EQ("before", strTid);
+        EXPECT_EQ(Texts(static_cast<size_t>(nCall), "getrandom"), seam().calls);
+    }
+    reset();
+    seam().fail("getrandom", EINTR, 1, 3);
+    EXPECT_LE(0, tokenGenerate(strTid));
+    EXPECT_LE(127u, strTid.size());
+}
+
+class TimeAfterNow : public SeamTest {};
+
+TEST_F(TimeAfterNow, IsANumberOrADateOfTheInternet)
+{
+    // The text is in UTC, wherever the process lives.
+    setenv("TZ", "XXX-05:30", 1);
+    tzset();
+    const time_t noon = 1767355200;
+    const struct {
+        time_t now;
+        int nOffset;
+        const char* szText;
+    } rows[] = {
+        {noon, 3600, "Fri, 02 Jan 2026 13:00:00 GMT"},    {noon, 0, "Fri, 02 Jan 2026 12:00:00 GMT"},
+        {noon, -129600, "Thu, 01 Jan 2026 00:00:00 GMT"}, {noon, -129601, "Wed, 31 Dec 2025 23:59:59 GMT"},
+        {noon, INT_MAX, "Wed, 20 Jan 2094 15:14:07 GMT"}, {noon, INT_MIN, "Sun, 15 Dec 1957 08:45:52 GMT"},
+        {951782399, 1, "Tue, 29 Feb 2000 00:00:00 GMT"},  {INT_MAX, 1, "Tue, 19 Jan 2038 03:14:08 GMT"},
+        {0, 0, "Thu, 01 Jan 1970 00:00:00 GMT"},          {0, -1, "Wed, 31 Dec 1969 23:59:59 GMT"},
+    };
+    for (const auto& row : rows) {
+        SCOPED_TRACE(row.szText);
+        seam().calls.clear();
+        seam().clock = row.now;
+        long nTime = 7;
+        std::string strTime = "replaced";
+        EXPECT_EQ(0, getTimeAfterNow(row.nOffset, nTime));
+        EXPECT_EQ(0, getTimeAfterNow(row.nOffset, strTime));
+        EXPECT_EQ(static_cast<long>(row.now) + row.nOffset, nTime);
+        EXPECT_EQ(row.szText, strTime);
+        EXPECT_EQ((Texts{"time", "time"}), seam().calls);
+    }
+}
+
+} // namespace
