@@ -34,33 +34,17 @@ grep -q 'On the real path, as root' "$dir/transcript" || [ -z "$mode" ]
 for line in \
     "made the table of tokens" \
     "share=\$(vemo-access-token create --user root --function demo-share --ttl 1h --uses 2" \
-    "refused: method not listed" \
-    "refused: API not listed" \
-    "1 token updated" \
-    "refused: unknown token" \
-    "there is no such token" \
-    "2 tokens would be revoked" \
-    "2 tokens revoked" \
-    'Who hands the id of a token to whom' \
-    'unlimited uses                 1' \
-    'no findings' \
-    '1 token exported' \
-    '1 token imported' \
-    '"0 > (err = checkPermission(...))" is the refusal' \
-    'VemoAccessTokenCreate(uid, strFunction, jOption, strTid)' \
-    'VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid)' \
-    'VemoAccessTokenGenerate(strTid)' \
+    "refused: method not listed" "refused: API not listed" "1 token updated" "refused: unknown token" \
+    "there is no such token" "2 tokens would be revoked" "2 tokens revoked" 'Who hands the id of a token to whom' \
+    'unlimited uses                 1' 'no findings' '1 token exported' '1 token imported' \
+    '"0 > (err = checkPermission(...))" is the refusal' 'VemoAccessTokenCreate(uid, strFunction, jOption, strTid)' \
+    'VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid)' 'VemoAccessTokenGenerate(strTid)' \
     'VemoAccessTokenGrantEx(strTid, "Demo.File", "delete", jToken)' \
     'VemoAccessTokenGrantEx(strTid, "Demo.User", "get", jToken)' \
-    'VemoAccessTokenGrant(strTid, "Demo.File", "get", szUser, sizeof(szUser))' \
-    'szUser = root' \
-    'VemoAccessTokenDeleteByTid(strUnknown)' \
-    'VemoAccessTokenDeleteByBindSid("demo-login-1")' \
+    'VemoAccessTokenGrant(strTid, "Demo.File", "get", szUser, sizeof(szUser))' 'szUser = root' \
+    'VemoAccessTokenDeleteByTid(strUnknown)' 'VemoAccessTokenDeleteByBindSid("demo-login-1")' \
     'VemoAccessTokenDeleteByFunction(strFunction)' \
-    'Answer::Granted == tokens.grant(strTid, "Demo.File", "get", &jToken)' \
-    'The table: no tokens' \
-    'HTTP/1.1 200 OK' \
-    'X-Token-User: root' \
-    'Refused, granted on behalf of its owner, and spent.'; do
+    'Answer::Granted == tokens.grant(strTid, "Demo.File", "get", &jToken)' 'The table: no tokens' 'HTTP/1.1 200 OK' \
+    'X-Token-User: root' 'Refused, granted on behalf of its owner, and spent.'; do
     grep -qF "$line" "$dir/transcript"
 done

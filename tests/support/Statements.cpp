@@ -33,6 +33,15 @@ void failStatements(const std::string& strStart, const Answer& failure, int nTim
     answerStatements(strStart, std::vector<Answer>(static_cast<size_t>(nTimes), failure));
 }
 
+void beforeStatements(const std::function<void(const std::string& strSql)>& call)
+{
+    seam().sqliteExec = [call](sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument,
+                               char** pszError) {
+        call(szSql);
+        return Seam::exec(pDb, szSql, callback, pArgument, pszError);
+    };
+}
+
 Lock::Lock(const std::string& strPath, int nWaits, const std::string& strChange) : m_nWaits(nWaits)
 {
     const ErrnoKeeper keeper;

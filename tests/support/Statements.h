@@ -27,6 +27,9 @@ void answerStatements(const std::string& strStart, const std::vector<Answer>& an
 // Answers so many of them alike.
 void failStatements(const std::string& strStart, const Answer& failure, int nTimes = 1);
 
+// Calls something ahead of each of the library's statements, which is then run.
+void beforeStatements(const std::function<void(const std::string& strSql)>& call);
+
 // Another connection, which holds the database locked until the library has waited nWaits times; with
 // 0, and at the latest, until it ends. What it changes comes into effect then.
 class Lock {

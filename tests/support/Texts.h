@@ -61,8 +61,15 @@ Texts inSystemLog(Texts lines, int nErrno);
 const std::string NOT_ROOT = failed(STORE, "0 > seteuid(0)", EPERM);
 const Texts NOT_OPENED = {NOT_ROOT, failed(STORE, "0 > initDb()", EPERM)};
 
-// The lines logged since the last call; and that they are these: texts, or one list of them.
+// The lines logged since the last call.
 Texts takeLines();
+
+// Expects these lines, texts or one list of them; and that a call returns -1 and logs them.
 #define EXPECT_LINES(...) EXPECT_EQ((Texts{__VA_ARGS__}), takeLines())
+#define EXPECT_FAILURE(call, ...)                                                                            \
+    do {                                                                                                     \
+        EXPECT_EQ(-1, call);                                                                                 \
+        EXPECT_LINES(__VA_ARGS__);                                                                           \
+    } while (0)
 
 #endif

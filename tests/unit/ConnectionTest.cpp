@@ -232,8 +232,8 @@ TEST_F(Connection, TellsErrnoOfTheFailedCallUpToTheStatement)
 {
     seam().fail("open", EROFS);
     seam().fail("seteuid", EAGAIN, 2, 2);
-    EXPECT_EQ(-1, AccessTokenDbApi().createTable());
-    EXPECT_LINES(
+    EXPECT_FAILURE(
+        AccessTokenDbApi().createTable(),
         allFailed(STORE, {"0 > PLIBCFileTouch(VEMO_ATOKEN_DB_PATH)", "0 > initDb()", "0 > runSql()"}, EROFS));
 }
 

@@ -199,11 +199,10 @@ TEST_F(Creation, RefusesArgumentsInOrder)
         m_strTid = row.strTid;
         m_jOption = json(row.szOption);
         errno = EACCES;
-        EXPECT_EQ(-1, createByTid());
-        EXPECT_LINES(failed(SERVICE, row.strCondition, EACCES),
-                     ordinary(SERVICE, "tokenCreate failed, tid=" + row.strTid + ", uid=" + row.szPrintedUid +
-                                           ", strFunction=" + row.szFunction +
-                                           ", jTokenOption=" + row.szOption));
+        EXPECT_FAILURE(createByTid(), failed(SERVICE, row.strCondition, EACCES),
+                       ordinary(SERVICE, "tokenCreate failed, tid=" + row.strTid +
+                                             ", uid=" + row.szPrintedUid + ", strFunction=" + row.szFunction +
+                                             ", jTokenOption=" + row.szOption));
         // No id is generated for a uid or a function that is refused.
         EXPECT_EQ(row.strCondition == SHORT_TID && row.szOption[0] == '{' ? 0 : -1, createGenerated());
         const bool blBeforeId =
@@ -245,10 +244,10 @@ TEST_F(Creation, RefusesMembersOfAWrongType)
                                  R"({"webapi_allow":"{}"})", R"({"extra":null})", R"({"extra":[1]})"}) {
         SCOPED_TRACE(szOption);
         m_jOption = json(szOption);
-        EXPECT_EQ(-1, createByTid());
-        EXPECT_LINES(fail(UTIL, "type failed, jmList[i]=" + m_jOption.getMemberNames()[0] +
-                                    ", jTokenParam=" + text(record())),
-                     failed(SERVICE, "0 > checkJsonType(jParam)"), summary());
+        EXPECT_FAILURE(createByTid(),
+                       fail(UTIL, "type failed, jmList[i]=" + m_jOption.getMemberNames()[0] +
+                                      ", jTokenParam=" + text(record())),
+                       failed(SERVICE, "0 > checkJsonType(jParam)"), summary());
     }
     EXPECT_EQ(Texts{}, seam().statements());
 }
@@ -260,13 +259,11 @@ TEST_F(Creation, RefusesAnIdThatExistsWithItsStepsInDebugMode)
                          ordinary(STORE, "run sql=" + saveSql("INSERT", record())),  // by tokenSave
                          ordinary(STORE, "run sql=" + saveSql("INSERT", record()))}; // by runSqlEx
     EXPECT_EQ(0, createByTid());
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_LINES(duplicateLines());
+    EXPECT_FAILURE(createByTid(), duplicateLines());
     EXPECT_EQ((Texts{row(record())}), rows());
     // A creation that the store refuses was announced all the same.
     VEMO_ACCESS_TOKEN::debugInfo(true);
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_LINES(begin + duplicateLines());
+    EXPECT_FAILURE(createByTid(), begin + duplicateLines());
     query("DELETE FROM token");
     EXPECT_EQ(0, createByTid());
     EXPECT_LINES(begin + Texts{ordinary(STORE, "change rv=1, run sql=" + saveSql("INSERT", record()))});
@@ -289,19 +286,14 @@ TEST_F(Creation, ReportsAFailedRandomSource)
     for (const int nDraw : {1, 2}) { // the first is for the length, the second for the id
         seam().counts.clear();
         seam().fail("getrandom", EIO, nDraw, nDraw);
-        EXPECT_EQ(-1, createGenerated());
-        EXPECT_LINES(failed(SERVICE, "0 > tokenGenerate(strTid)", EIO));
+        EXPECT_FAILURE(createGenerated(), failed(SERVICE, "0 > tokenGenerate(strTid)", EIO));
     }
     EXPECT_EQ(Texts{}, seam().statements());
 }
 
 TEST_F(Creation, TriesNoOtherIdWhenTheGeneratedOneExists)
 {
-    seam().sqliteExec = [](sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument,
-                           char** pszError) {
-        Seam::exec(pDb, szSql, nullptr, nullptr, nullptr); // someone else had the same luck
-        return Seam::exec(pDb, szSql, callback, pArgument, pszError);
-    };
+    beforeStatements([this](const std::string& strSql) { query(strSql); }); // someone else had the same luck
     EXPECT_EQ(-1, createGenerated());
     m_strTid = tids();
     EXPECT_LINES(duplicateLines() +
@@ -312,9 +304,8 @@ TEST_F(Creation, TriesNoOtherIdWhenTheGeneratedOneExists)
 TEST_F(Creation, ReportsFailureAfterWaitingForALockAlthoughTheTokenIsThere)
 {
     failStatements("INSERT", LOCKED);
-    EXPECT_EQ(-1, createByTid());
-    EXPECT_LINES(fail(STORE, "sql error, sql=" + saveSql("INSERT", record()), EIO),
-                 failed(SERVICE, CREATE_FAILED, EIO), summary());
+    EXPECT_FAILURE(createByTid(), fail(STORE, "sql error, sql=" + saveSql("INSERT", record()), EIO),
+                   failed(SERVICE, CREATE_FAILED, EIO), summary());
     EXPECT_EQ((Texts{row(record())}), rows());
     failStatements("INSERT", LOCKED);
     EXPECT_EQ(-1, createGenerated());

@@ -312,8 +312,7 @@ TEST_F(Decoding, RefusesColumnsThatAreNoFields)
     for (const char* szSql : {"SELECT count(*) FROM token", "SELECT tid, uid + 1 FROM token",
                               "SELECT tid AS name FROM token", "SELECT rowid FROM token"}) {
         SCOPED_TRACE(szSql);
-        EXPECT_EQ(-1, run(szSql));
-        EXPECT_LINES(queryLines(columnLines(failed(STORE, NO_FIELD))));
+        EXPECT_FAILURE(run(szSql), queryLines(columnLines(failed(STORE, NO_FIELD))));
     }
     EXPECT_EQ(0, run("SELECT tid, uid + 1 AS uid, 'x' AS function, bind_sid AS count FROM token"));
     EXPECT_EQ(json(R"([{"tid":"t","uid":1001,"function":"x","count":0}])"), m_jArray);
@@ -325,8 +324,8 @@ TEST_F(Decoding, RefusesWhatIsMissing)
     for (const int nColumns : {1, 0, -1}) {
         for (const auto& [szValues, szNames] :
              {std::pair<char**, char**>{pointers, nullptr}, {nullptr, pointers}}) {
-            EXPECT_EQ(-1, m_pDecoder(&m_jArray, nColumns, szValues, szNames));
-            EXPECT_LINES(allFailed(STORE, {NULL_ROW, TOKEN_FAILED}));
+            EXPECT_FAILURE(m_pDecoder(&m_jArray, nColumns, szValues, szNames),
+                           allFailed(STORE, {NULL_ROW, TOKEN_FAILED}));
         }
         EXPECT_EQ(-1, m_pDecoder(nullptr, nColumns, nullptr, nullptr)); // before all else
         EXPECT_LINES(failed(STORE, "!pjTokenArray"));
@@ -351,11 +350,9 @@ TEST_F(Decoding, RefusesOutputThatIsNoArray)
     for (const char* szOutput : {"{}", R"({"a":1})", R"("text")", "0", "1.5", "true"}) {
         SCOPED_TRACE(szOutput);
         m_jArray = json(szOutput);
-        EXPECT_EQ(-1, decode({{"tid"}, {"a"}}));
-        EXPECT_LINES(failed(STORE, WRONG_ARRAY));
+        EXPECT_FAILURE(decode({{"tid"}, {"a"}}), failed(STORE, WRONG_ARRAY));
         EXPECT_EQ(0, run("SELECT * FROM token WHERE tid = 'u'")) << "nobody looks before the first row";
-        EXPECT_EQ(-1, run("SELECT * FROM token"));
-        EXPECT_LINES(queryLines({failed(STORE, WRONG_ARRAY)}));
+        EXPECT_FAILURE(run("SELECT * FROM token"), queryLines({failed(STORE, WRONG_ARRAY)}));
         EXPECT_EQ(json(szOutput), m_jArray);
     }
 }
@@ -403,8 +400,8 @@ TEST_F(Decoding, KeepsTheRowsBeforeOneThatHoldsNull)
         }
         query(std::string("UPDATE token SET ") + field.szName + " = NULL WHERE tid = 'b'");
         m_jArray = Json::Value();
-        EXPECT_EQ(-1, run("SELECT tid, " + std::string(field.szName) + " FROM token"));
-        EXPECT_LINES(queryLines(allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED})));
+        EXPECT_FAILURE(run("SELECT tid, " + std::string(field.szName) + " FROM token"),
+                       queryLines(allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED})));
         ASSERT_EQ(1u, m_jArray.size());
         EXPECT_EQ(Json::Value("a"), m_jArray[0]["tid"]);
     }

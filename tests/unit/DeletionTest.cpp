@@ -165,13 +165,12 @@ TEST_F(Deletion, RefusesListsValuesAndNames)
     for (const auto& row : rows) {
         SCOPED_TRACE(row.strSummary);
         errno = EACCES;
-        EXPECT_EQ(-1, row.remove(api()));
-        EXPECT_LINES(failed(SERVICE, row.strCondition, EACCES), row.strSummary);
+        EXPECT_FAILURE(row.remove(api()), failed(SERVICE, row.strCondition, EACCES), row.strSummary);
     }
     // tokenDeleteByName leaves the test of the type to tokenDeleteByArray, and both tell.
-    EXPECT_EQ(-1, byName("1000", "uid")(api()));
-    EXPECT_LINES(failed(SERVICE, NO_STRING, EACCES), arraySummary("uid", "1000"),
-                 failed(SERVICE, ARRAY_FAILED, EACCES), nameSummary("uid", "1000"));
+    EXPECT_FAILURE(byName("1000", "uid")(api()), failed(SERVICE, NO_STRING, EACCES),
+                   arraySummary("uid", "1000"), failed(SERVICE, ARRAY_FAILED, EACCES),
+                   nameSummary("uid", "1000"));
     EXPECT_EQ(Texts{}, seam().statements());
 }
 
@@ -183,28 +182,17 @@ TEST_F(Deletion, TellsEachStepOfAFailure)
     const Texts above = {failed(SERVICE, STORE_FAILED, EIO), arraySummary("tid", "a"),
                          failed(SERVICE, ARRAY_FAILED, EIO), nameSummary("tid", "a")};
     failStatements("DELETE", DISK_ERROR, 3);
-    EXPECT_EQ(-1, byTid("a")(api()));
-    EXPECT_LINES(refused(deleteSql("tid", "a")) + above);
-    EXPECT_EQ(-1, byTids({"a", "b", "c"})(api()));
-    EXPECT_LINES(refused(deleteSql("tid", "a''b''c")) +
-                 Texts{failed(SERVICE, STORE_FAILED, EIO), arraySummary("tid", "a,b,c")});
-    EXPECT_EQ(-1, api().tokenDeleteAll());
-    EXPECT_LINES(refused("DELETE FROM token;"));
+    EXPECT_FAILURE(byTid("a")(api()), refused(deleteSql("tid", "a")) + above);
+    EXPECT_FAILURE(byTids({"a", "b", "c"})(api()),
+                   refused(deleteSql("tid", "a''b''c")) +
+                       Texts{failed(SERVICE, STORE_FAILED, EIO), arraySummary("tid", "a,b,c")});
+    EXPECT_FAILURE(api().tokenDeleteAll(), refused("DELETE FROM token;"));
     EXPECT_EQ("a a'b b c", tids());
     // A statement that had to wait took effect all the same.
     failStatements("DELETE", LOCKED);
-    EXPECT_EQ(-1, byTid("a")(api()));
-    EXPECT_LINES(Texts{fail(STORE, "sql error, sql=" + deleteSql("tid", "a"), EIO)} + above);
+    EXPECT_FAILURE(byTid("a")(api()),
+                   Texts{fail(STORE, "sql error, sql=" + deleteSql("tid", "a"), EIO)} + above);
     EXPECT_EQ("a'b b c", tids());
-}
-
-TEST_F(Deletion, TracesStatementAndNumberInDebugMode)
-{
-    const std::string strSql = deleteSql("bind_sid", "S1");
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    EXPECT_EQ(2, bySid("S1")(api()));
-    EXPECT_LINES(ordinary(STORE, "run sql=" + strSql), ordinary(STORE, "change rv=2, run sql=" + strSql),
-                 ordinary(STORE, "delete token number=2"));
 }
 
 } // namespace

@@ -375,8 +375,7 @@ TEST_F(GrantWithName, LeavesTheNameAloneWhenRefused)
         {"t", "Api", "put", {}},
     };
     for (const auto& row : rows) {
-        EXPECT_EQ(-1, grant(row.szTid, row.szApi, row.szMethod));
-        EXPECT_LINES(row.lines + Texts{GRANT_REFUSED});
+        EXPECT_FAILURE(grant(row.szTid, row.szApi, row.szMethod), row.lines + Texts{GRANT_REFUSED});
         EXPECT_EQ(m_strUntouched, m_szUser);
     }
     EXPECT_EQ("2", countOf());
@@ -399,8 +398,8 @@ TEST_F(GrantWithName, FailsForUsersThatCannotBeFound)
             seam().counts.clear();
             seam().fail("operator new[]", ENOMEM);
         }
-        EXPECT_EQ(-1, grant());
-        EXPECT_LINES(failed(WRAPPER, "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)", nErrno));
+        EXPECT_FAILURE(grant(),
+                       failed(WRAPPER, "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)", nErrno));
         EXPECT_EQ(m_strUntouched, m_szUser);
         EXPECT_EQ("1", countOf());
     }

@@ -121,9 +121,8 @@ TEST_F(Filter, RefusesWhatIsNoObject)
     for (const char* szFilter : {"null", "[1,2]", "[]", R"("tid")", "5", "1.5", "true"}) {
         SCOPED_TRACE(szFilter);
         EXPECT_EQ(-1, where(szFilter));
-        EXPECT_EQ(-1, condition(json(szFilter)));
-        EXPECT_LINES(allFailed(
-            STORE, {"jTokenParam.type() != Json::objectValue", "jFilter.type() != Json::objectValue"}));
+        EXPECT_FAILURE(condition(json(szFilter)), allFailed(STORE, {"jTokenParam.type() != Json::objectValue",
+                                                                    "jFilter.type() != Json::objectValue"}));
     }
     EXPECT_EQ("held", m_strOut);
 }
@@ -270,8 +269,7 @@ TEST_F(Filter, FollowsTheTypeThatTheTableHoldsNow)
     m_strOut.clear();
     EXPECT_EQ(0, where(R"({"tid":"a","uid":7})"));
     EXPECT_EQ(" (uid='7' )", m_strOut);
-    EXPECT_EQ(-1, match("tid", "a"));
-    EXPECT_LINES(failed(STORE, "!jTokenType.isMember(strField)"));
+    EXPECT_FAILURE(match("tid", "a"), failed(STORE, "!jTokenType.isMember(strField)"));
 }
 
 TEST_F(Filter, RefusesWhatIsNoFieldOrNoList)
@@ -290,14 +288,12 @@ TEST_F(Filter, RefusesWhatIsNoFieldOrNoList)
     };
     for (const auto& row : rows) {
         SCOPED_TRACE(row.szField ? row.szField : "(null)");
-        EXPECT_EQ(-1, list(row.szField, json(row.szList)));
-        EXPECT_LINES(failed(STORE, row.strCondition));
+        EXPECT_FAILURE(list(row.szField, json(row.szList)), failed(STORE, row.strCondition));
     }
     for (const std::string& strField : {std::string(), std::string("foo"), std::string("TID"),
                                         std::string("limit"), std::string("tid\0", 4)}) {
         SCOPED_TRACE(strField);
-        EXPECT_EQ(-1, match(strField, "a"));
-        EXPECT_LINES(failed(STORE, "!jTokenType.isMember(strField)"));
+        EXPECT_FAILURE(match(strField, "a"), failed(STORE, "!jTokenType.isMember(strField)"));
     }
     EXPECT_EQ("held", m_strOut);
 }
@@ -318,8 +314,8 @@ TEST_F(Filter, AppendsAConditionWholeOrNotAtAll)
     failText();
     EXPECT_EQ(-1, match("tid", "a"));
     failText();
-    EXPECT_EQ(-1, condition(json(R"({"sort_by":"uid","sort_direction":"desc","limit":0})")));
-    EXPECT_LINES(allFailed(STORE, {LIST_TEXT_FAILED, MATCH_TEXT_FAILED, "!szSql"}, ENOMEM));
+    EXPECT_FAILURE(condition(json(R"({"sort_by":"uid","sort_direction":"desc","limit":0})")),
+                   allFailed(STORE, {LIST_TEXT_FAILED, MATCH_TEXT_FAILED, "!szSql"}, ENOMEM));
     EXPECT_EQ(0, list("tid", Json::Value(Json::arrayValue)));
     EXPECT_EQ("held", m_strOut);
     EXPECT_EQ(0, list("tid", json(R"(["a","b","c"])")));

@@ -115,37 +115,27 @@ TEST_F(Grant, RefusesAndSpendsNothing)
                                                 ", not in allow list, jToken=" + text(token())),
                              refused("t", "Api", strMethod)};
     };
-    const struct {
-        const char *szTid, *szApi, *szMethod;
-        Texts lines, debugLines;
-    } rows[] = {
-        {"", "Api", "get", {strNoTid}, {strNoTid, refused("", "Api", "get")}},
-        {"", nullptr, nullptr, {strNoTid}, {strNoTid, refused("", "(null)", "(null)")}},
-        {"t", nullptr, "get", {strNoApi}, {strNoApi, refused("t", "(null)", "get")}},
-        {"t", "", "", {strNoApi}, {strNoApi, refused("t", "", "")}},
-        {"z", "Api", "get", {}, {ordinary(STORE, "run sql=" + selectSql("z")), refused("z", "Api", "get")}},
-        {"' or ''='",
-         "Api",
-         "get",
-         {},
-         {ordinary(STORE, "run sql=" + selectSql("'' or ''''=''")), refused("' or ''='", "Api", "get")}},
-        {"t",
-         "api",
-         nullptr,
-         {NOT_PERMITTED},
-         found + unlistedApi + Texts{NOT_PERMITTED, refused("t", "api", "(null)")}},
-        {"t", "Api", "put", {}, unlisted("put")},
-        {"t", "Api", "Get", {}, unlisted("Get")},
-        {"t", "Api", "ge", {}, unlisted("ge")},
-    };
     insert();
     for (const bool blDebug : {false, true}) {
         debugInfo(blDebug);
-        for (const auto& row : rows) {
-            SCOPED_TRACE(::testing::Message() << row.szTid << (row.szMethod ? row.szMethod : "") << blDebug);
-            EXPECT_EQ(-1, grant(row.szTid, row.szApi, row.szMethod));
-            EXPECT_LINES(blDebug ? row.debugLines : row.lines);
+        const auto refuses = [&](const char* szTid, const char* szApi, const char* szMethod,
+                                 const Texts& lines, const Texts& debugLines) {
+            EXPECT_FAILURE(grant(szTid, szApi, szMethod), blDebug ? debugLines : lines);
             EXPECT_EQ(UNTOUCHED, m_jToken);
+        };
+        refuses("", "Api", "get", {strNoTid}, {strNoTid, refused("", "Api", "get")});
+        refuses("", nullptr, nullptr, {strNoTid}, {strNoTid, refused("", "(null)", "(null)")});
+        refuses("t", nullptr, "get", {strNoApi}, {strNoApi, refused("t", "(null)", "get")});
+        refuses("t", "", "", {strNoApi}, {strNoApi, refused("t", "", "")});
+        refuses("z", "Api", "get", {},
+                {ordinary(STORE, "run sql=" + selectSql("z")), refused("z", "Api", "get")});
+        refuses(
+            "' or ''='", "Api", "get", {},
+            {ordinary(STORE, "run sql=" + selectSql("'' or ''''=''")), refused("' or ''='", "Api", "get")});
+        refuses("t", "api", nullptr, {NOT_PERMITTED},
+                found + unlistedApi + Texts{NOT_PERMITTED, refused("t", "api", "(null)")});
+        for (const char* szMethod : {"put", "Get", "ge"}) {
+            refuses("t", "Api", szMethod, {}, unlisted(szMethod));
         }
     }
     EXPECT_EQ((Texts{row(token())}), query("SELECT * FROM token"));
@@ -157,8 +147,8 @@ TEST_F(Grant, RefusesRecordsThatAreMalformed)
     insert();
     for (const char* szAllow : {"[]", "[\"Api\"]", "\"Api\"", "7", "null", "true"}) {
         query(std::string("UPDATE token SET webapi_allow = '") + szAllow + "'");
-        EXPECT_EQ(-1, grant("t", "Api", nullptr));
-        EXPECT_LINES(failed(UTIL, "jToken[\"webapi_allow\"].type() != Json::objectValue"), NOT_PERMITTED);
+        EXPECT_FAILURE(grant("t", "Api", nullptr),
+                       failed(UTIL, "jToken[\"webapi_allow\"].type() != Json::objectValue"), NOT_PERMITTED);
     }
     query(R"(UPDATE token SET webapi_allow = '{"Api":{"method":[{}]}}')");
     EXPECT_THROW(grant(), Json::LogicError);
@@ -182,8 +172,7 @@ TEST_F(Grant, RefusesRecordsThatAreMalformed)
             return Seam::exec(pDb, ("SELECT " + std::string(part.first) + " FROM token").c_str(), callback,
                               pArgument, pszError);
         };
-        EXPECT_EQ(-1, grant("t", "Api", nullptr));
-        EXPECT_LINES(part.second);
+        EXPECT_FAILURE(grant("t", "Api", nullptr), part.second);
         EXPECT_EQ(UNTOUCHED, m_jToken);
     }
 }
@@ -221,11 +210,10 @@ TEST_F(Grant, FailsWithTheStoreAndLeavesTheCallersRecordAlone)
             query("DELETE FROM token");
             insert(text(counted(row.nCount)));
             failStatements(row.szStart, blLock ? LOCKED : DISK_ERROR);
-            EXPECT_EQ(-1, grant());
-            EXPECT_LINES((blLock ? Texts{fail(STORE, "sql error, sql=" + row.strSql, EIO)}
-                                 : failureOf(row.strSql, "disk I/O error", EIO) +
-                                       Texts{failed(STORE, row.strCondition, EIO)}) +
-                         row.lines);
+            EXPECT_FAILURE(grant(), (blLock ? Texts{fail(STORE, "sql error, sql=" + row.strSql, EIO)}
+                                            : failureOf(row.strSql, "disk I/O error", EIO) +
+                                                  Texts{failed(STORE, row.strCondition, EIO)}) +
+                                        row.lines);
             EXPECT_EQ(UNTOUCHED, m_jToken);
             EXPECT_EQ(blLock ? row.szAfterLock : std::to_string(row.nCount), countOf());
         }
@@ -240,30 +228,23 @@ TEST_F(Grant, OverlapsWithOthersAndLosesWhatTheyDid)
         Json::Value jToken;
         EXPECT_EQ(0, AccessTokenApi().tokenGrant(strTid, "Api", "get", jToken));
     };
-    const struct {
-        int nCount;
-        std::function<void()> meanwhile;
-        const char* szStored;
-        int nHandedBack;
-    } rows[] = {
-        {3, grantElsewhere, "2", 2}, // two grants spend one use
-        {1, grantElsewhere, "", 1},  // both spend the last use
-        {3, [&] { query("DELETE FROM token"); }, "2", 2},
-    };
-    for (const auto& row : rows) {
+    const auto overlaps = [&](int nCount, const std::function<void()>& meanwhile, const char* szStored,
+                              int nHandedBack) {
         query("DELETE FROM token");
-        insert(text(counted(row.nCount)));
-        seam().sqliteExec = [run = row.meanwhile](sqlite3* pDb, const char* szSql, SqlCallback callback,
-                                                  void* pArgument, char** pszError) mutable {
-            if (0 != strncmp(szSql, "SELECT", 6)) {
+        insert(text(counted(nCount)));
+        beforeStatements([run = meanwhile](const std::string& strSql) mutable {
+            if (0 != strSql.find("SELECT")) {
                 std::exchange(run, [] {})();
             }
-            return Seam::exec(pDb, szSql, callback, pArgument, pszError);
-        };
+        });
         EXPECT_EQ(0, grant());
-        EXPECT_EQ(row.szStored, countOf());
-        EXPECT_EQ(counted(row.nHandedBack), m_jToken);
-    }
+        EXPECT_EQ(szStored, countOf());
+        EXPECT_EQ(counted(nHandedBack), m_jToken);
+    };
+    overlaps(3, grantElsewhere, "2", 2); // two grants spend one use
+    overlaps(1, grantElsewhere, "", 1);  // both spend the last use
+    overlaps(
+        3, [&] { query("DELETE FROM token"); }, "2", 2);
 }
 
 // Counting by itself: what a record may be that no table yielded

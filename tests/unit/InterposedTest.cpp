@@ -110,19 +110,18 @@ TEST_F(Interposed, StatementsFailWithTheirParts)
     Json::Value jOut;
     m_db.m_strSql = "earlier";
     g_instead.table = FAILS_TO_EXPAND;
-    EXPECT_EQ(-1, m_db.createTable());
-    EXPECT_LINES(failed(STORE, "0 > AccessTokenDbApi::SqlExpandCreateTable(strSql)"));
+    EXPECT_FAILURE(m_db.createTable(), failed(STORE, "0 > AccessTokenDbApi::SqlExpandCreateTable(strSql)"));
     g_instead.names = FAILS_TO_EXPAND;
     EXPECT_EQ(-1, m_db.tokenGet(jAll, jOut));
-    EXPECT_EQ(-1, m_db.tokenSave(jToken, true));
-    EXPECT_LINES(allFailed(
-        STORE, {"0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)", "0 > SqlExpandMemberName(strSqlPrefix)"}));
+    EXPECT_FAILURE(m_db.tokenSave(jToken, true),
+                   allFailed(STORE, {"0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)",
+                                     "0 > SqlExpandMemberName(strSqlPrefix)"}));
     g_instead.names = nullptr;
     g_instead.symbols = FAILS_TO_EXPAND;
     EXPECT_EQ(-1, m_db.tokenSave(jToken, true));
     g_instead.symbols = [](std::string& strSql) { return strSql.clear(), 0; };
-    EXPECT_EQ(-1, m_db.tokenSave(jToken, true));
-    EXPECT_LINES(allFailed(STORE, {"0 > SqlExpandMemberSymbol(strSqlPrefix)", "!szSql || !szSql[0]"}));
+    EXPECT_FAILURE(m_db.tokenSave(jToken, true),
+                   allFailed(STORE, {"0 > SqlExpandMemberSymbol(strSqlPrefix)", "!szSql || !szSql[0]"}));
     EXPECT_EQ("earlier", m_db.m_strSql);
     EXPECT_EQ(Texts{}, seam().statements());
 }
@@ -143,10 +142,10 @@ TEST_F(Interposed, CreationsFailWithTheDefaults)
     std::string strFunction = "VPN", strTid = tid();
     Json::Value jOption;
     g_instead.fillDefaultValue = FAILS;
-    EXPECT_EQ(-1, api().tokenCreateByTid(uid, strFunction, jOption, strTid));
-    EXPECT_LINES(failed(SERVICE, "0 > fillDefaultValue(jParam, false)"),
-                 ordinary(SERVICE, "tokenCreate failed, tid=" + strTid +
-                                       ", uid=1000, strFunction=VPN, jTokenOption=null"));
+    EXPECT_FAILURE(api().tokenCreateByTid(uid, strFunction, jOption, strTid),
+                   failed(SERVICE, "0 > fillDefaultValue(jParam, false)"),
+                   ordinary(SERVICE, "tokenCreate failed, tid=" + strTid +
+                                         ", uid=1000, strFunction=VPN, jTokenOption=null"));
 }
 
 TEST_F(Interposed, LookupsHandNegativeResultsOnWhichUpdatesDoNot)
@@ -156,8 +155,9 @@ TEST_F(Interposed, LookupsHandNegativeResultsOnWhichUpdatesDoNot)
     Json::Value jToken(Json::objectValue);
     g_instead.getOne = [] { return -7; };
     EXPECT_EQ(-7, api().tokenGetByTid(strTid, jToken));
-    EXPECT_EQ(-1, api().tokenUpdateByTid(strTid, jToken));
-    EXPECT_LINES(allFailed(SERVICE, {strGetOne, strGetOne, "0 > (nCount = tokenGetByTid(strTid, jToken))"}));
+    EXPECT_FAILURE(
+        api().tokenUpdateByTid(strTid, jToken),
+        allFailed(SERVICE, {strGetOne, strGetOne, "0 > (nCount = tokenGetByTid(strTid, jToken))"}));
 }
 
 // Whatever may go wrong with the filter, a deletion by value never empties the table.
@@ -167,15 +167,14 @@ TEST_F(Interposed, ListsThatBecomeNoFilterSelectNothing)
     Json::Value jArray(Json::arrayValue);
     insert();
     g_instead.toJson = FAILS;
-    EXPECT_EQ(-1, api().tokenGetByTidArray(values, jArray));
-    EXPECT_LINES(failed(SERVICE, "0 > VectorParamToJson(strTidVector, \"tid\", jParam)"));
+    EXPECT_FAILURE(api().tokenGetByTidArray(values, jArray),
+                   failed(SERVICE, "0 > VectorParamToJson(strTidVector, \"tid\", jParam)"));
     const std::string strSummary = ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=a,b");
-    EXPECT_EQ(-1, api().tokenDeleteByArray(values, "tid"));
-    EXPECT_LINES(failed(SERVICE, "0 > VectorParamToJson(strVector, szName, jParam)"), strSummary);
+    EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"),
+                   failed(SERVICE, "0 > VectorParamToJson(strVector, szName, jParam)"), strSummary);
     g_instead.toJson = [] { return 0; };
-    EXPECT_EQ(-1, api().tokenDeleteByArray(values, "tid"));
-    EXPECT_LINES(failed(STORE, "strSql.empty()"), failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))"),
-                 strSummary);
+    EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"), failed(STORE, "strSql.empty()"),
+                   failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))"), strSummary);
     EXPECT_EQ(Texts{}, seam().statements());
     EXPECT_EQ("t", tids());
 }
@@ -185,8 +184,8 @@ TEST_F(Interposed, NoNameIsToldOfARecordWithoutUid)
     std::string strTid = "t";
     char szUser[] = "before";
     g_instead.grantEx = [] { return 0; };
-    EXPECT_EQ(-1, VemoAccessTokenGrant(strTid, "Api", "get", szUser, sizeof(szUser)));
-    EXPECT_LINES(failed(WRAPPER, "!jToken.isMember(\"uid\")"));
+    EXPECT_FAILURE(VemoAccessTokenGrant(strTid, "Api", "get", szUser, sizeof(szUser)),
+                   failed(WRAPPER, "!jToken.isMember(\"uid\")"));
     EXPECT_STREQ("before", szUser);
     EXPECT_EQ(Texts{}, seam().callsOf({"getpwuid_r"}));
 }

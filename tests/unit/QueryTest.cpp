@@ -175,8 +175,7 @@ TEST_F(Query, RefusesWhatItCannotUseAndRunsNothing)
         SCOPED_TRACE(szFilter);
         EXPECT_EQ(-1, get(szFilter));
         EXPECT_EQ(-1, get(szFilter, "{}"));
-        EXPECT_EQ(-1, remove(szFilter, true));
-        EXPECT_LINES(allFailed(STORE, {NO_FILTER, NO_FILTER, NO_FILTER}));
+        EXPECT_FAILURE(remove(szFilter, true), allFailed(STORE, {NO_FILTER, NO_FILTER, NO_FILTER}));
     }
     for (const char* szOut : {"{}", R"({"a":1})", R"("")", "0", "false", "1.5"}) {
         SCOPED_TRACE(szOut);
@@ -206,14 +205,13 @@ TEST_F(Query, PassesOnTheFailuresOfTheFilter)
     const Texts nested = {fail(STORE, "err input type, jTokenParam=(null)"),
                           failed(STORE, "0 > SqlWhereFromJson(jTokenParam, strSql, true)")};
     m_db.m_strSql = "earlier";
-    EXPECT_EQ(-1, get(R"({"tid":{"a":1}})"));
-    EXPECT_LINES(nested);
-    EXPECT_EQ(-1, remove(R"({"tid":{"a":1}})", true));
-    EXPECT_LINES(nested);
+    EXPECT_FAILURE(get(R"({"tid":{"a":1}})"), nested);
+    EXPECT_FAILURE(remove(R"({"tid":{"a":1}})", true), nested);
     // The text of the field is the first, that of the order the second.
     seam().fail("sqlite3_mprintf", ENOMEM, 2, 2);
-    EXPECT_EQ(-1, get(R"({"uid":7,"sort_by":"uid"})"));
-    EXPECT_LINES(allFailed(STORE, {"!szSql", "0 > SqlFilterConditionFromJson(jTokenParam, strSql)"}, ENOMEM));
+    EXPECT_FAILURE(
+        get(R"({"uid":7,"sort_by":"uid"})"),
+        allFailed(STORE, {"!szSql", "0 > SqlFilterConditionFromJson(jTokenParam, strSql)"}, ENOMEM));
 
     EXPECT_THROW(get(R"({"sort_by":5})"), Json::Exception);
     EXPECT_THROW(get(R"({"tid":[[]]})"), Json::Exception);
@@ -230,22 +228,18 @@ TEST_F(Query, KeepsTheRowsBeforeOneThatCannotBeDecoded)
     const Texts lines = allFailed(STORE, {"NULL == column_name[i] || NULL == column_value[i]",
                                           "0 > FillToken(&jTmp, n_column, column_value, column_name)"});
     EXPECT_LINES(lines + failureOf(SELECT + ";", "query aborted") + Texts{failed(STORE, RUN_QUERY_FAILED)});
-    EXPECT_EQ(-1, getOne("tid", "Cd34"));
-    EXPECT_LINES(lines + failureOf(selectSql("Cd34"), "query aborted") +
-                 allFailed(STORE, {RUN_QUERY_FAILED, GET_FAILED}));
+    EXPECT_FAILURE(getOne("tid", "Cd34"), lines + failureOf(selectSql("Cd34"), "query aborted") +
+                                              allFailed(STORE, {RUN_QUERY_FAILED, GET_FAILED}));
     EXPECT_EQ(json("{}"), m_jOut);
 }
 
 TEST_F(Query, OpensTheDatabaseOnceAndWhenItIsNeeded)
 {
     seam().fail("seteuid", EPERM, 1, 6); // each opening raises and puts back
-    EXPECT_EQ(-1, get("{}"));
-    EXPECT_LINES(NOT_OPENED + Texts{failed(STORE, RUN_QUERY_FAILED, EPERM)});
-    EXPECT_EQ(-1, getOne("tid", "8"));
-    EXPECT_LINES(NOT_OPENED + allFailed(STORE, {RUN_QUERY_FAILED, GET_FAILED}, EPERM));
+    EXPECT_FAILURE(get("{}"), NOT_OPENED + Texts{failed(STORE, RUN_QUERY_FAILED, EPERM)});
+    EXPECT_FAILURE(getOne("tid", "8"), NOT_OPENED + allFailed(STORE, {RUN_QUERY_FAILED, GET_FAILED}, EPERM));
     EXPECT_EQ(json("{}"), m_jOut);
-    EXPECT_EQ(-1, remove(R"({"uid":9})"));
-    EXPECT_LINES(NOT_OPENED + Texts{failed(STORE, RUN_DELETE_FAILED, EPERM)});
+    EXPECT_FAILURE(remove(R"({"uid":9})"), NOT_OPENED + Texts{failed(STORE, RUN_DELETE_FAILED, EPERM)});
     EXPECT_EQ("DELETE FROM token WHERE  (uid=9 );", m_db.m_strSql);
 
     EXPECT_EQ(0, get("{}"));

@@ -107,8 +107,7 @@ TEST_F(Defaults, CheckTellsTheFirstMissingFieldAndAddsNothing)
         }
     }
     Json::Value jNull;
-    EXPECT_EQ(-1, fillDefaultValue(jNull, true));
-    EXPECT_LINES(ordinary(fieldList(2), "lost data member=tid"));
+    EXPECT_FAILURE(fillDefaultValue(jNull, true), ordinary(fieldList(2), "lost data member=tid"));
     EXPECT_TRUE(jNull.isNull());
 }
 

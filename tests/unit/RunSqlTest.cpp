@@ -315,8 +315,7 @@ TEST_F(RunSql, PurgeFailsWhereTheDatabaseCannotBeOpened)
 {
     AccessTokenDbApi db;
     seam().fail("seteuid", EPERM, 1, 2);
-    EXPECT_EQ(-1, db.cleanExpireToken(true));
-    EXPECT_LINES(NOT_OPENED + Texts{fail(STORE, "run sql failed", EPERM)});
+    EXPECT_FAILURE(db.cleanExpireToken(true), NOT_OPENED + Texts{fail(STORE, "run sql failed", EPERM)});
     EXPECT_EQ("a b", tids());
 }
 

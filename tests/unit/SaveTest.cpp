@@ -193,9 +193,9 @@ TEST_F(Save, RefusesARecordThatLacksAField)
             for (const bool blCreate : {false, true}) {
                 SCOPED_TRACE(text(jToken));
                 errno = EACCES;
-                EXPECT_EQ(-1, db.tokenSave(jToken, blCreate));
-                EXPECT_LINES(failed(fieldList(field->nLine),
-                                    std::string("!jParam.isMember(\"") + field->szName + "\")", EACCES));
+                EXPECT_FAILURE(db.tokenSave(jToken, blCreate),
+                               failed(fieldList(field->nLine),
+                                      std::string("!jParam.isMember(\"") + field->szName + "\")", EACCES));
             }
         }
     }
@@ -209,8 +209,7 @@ TEST_F(Save, RefusesARecordThatLacksAField)
 TEST_F(Save, FailsWithoutMemoryForTheStatement)
 {
     seam().fail("sqlite3_mprintf", ENOMEM);
-    EXPECT_EQ(-1, save(token()));
-    EXPECT_LINES(failed(STORE, "!szSql || !szSql[0]", ENOMEM));
+    EXPECT_FAILURE(save(token()), failed(STORE, "!szSql || !szSql[0]", ENOMEM));
     EXPECT_EQ("", m_db.m_strSql);
     EXPECT_EQ(Texts{}, seam().statements());
 }
@@ -221,8 +220,7 @@ TEST_F(Save, CreatesOnceAndReplacesWholeRows)
         json(R"({"tid":"t","bind_sid":"","uid":0,"deadline":1,"count":2,"create_time":3,
                                         "function":"","webapi_allow":{},"extra":{}})");
     EXPECT_EQ(0, save(token()));
-    EXPECT_EQ(-1, save(jOther, true));
-    EXPECT_LINES(failureLines(m_db.m_strSql, "UNIQUE constraint failed: token.tid"));
+    EXPECT_FAILURE(save(jOther, true), failureLines(m_db.m_strSql, "UNIQUE constraint failed: token.tid"));
     EXPECT_EQ("UNIQUE constraint failed: token.tid", m_db.m_strErr);
     EXPECT_EQ((Texts{row(token())}), rows());
     EXPECT_EQ(0, save(jOther));
@@ -253,13 +251,11 @@ TEST_F(Save, FailsWithItsStatement)
                  fail(STORE, "run sql failed, sql=" + strSql), failed(STORE, "0 > runSql()"));
     EXPECT_EQ(Texts{}, rows());
     query("DROP TABLE token");
-    EXPECT_EQ(-1, save(token()));
-    EXPECT_LINES(failureLines(strSql, "no such table: token"));
+    EXPECT_FAILURE(save(token()), failureLines(strSql, "no such table: token"));
 
     EXPECT_EQ(0, m_db.freeDb());
     seam().fail("seteuid", EPERM);
-    EXPECT_EQ(-1, save(token()));
-    EXPECT_LINES(NOT_OPENED + Texts{failed(STORE, "0 > runSql()", EPERM)});
+    EXPECT_FAILURE(save(token()), NOT_OPENED + Texts{failed(STORE, "0 > runSql()", EPERM)});
 }
 
 TEST_F(Save, TracesInDebugMode)
@@ -274,9 +270,8 @@ TEST_F(Save, TracesInDebugMode)
                      ordinary(STORE, "change rv=1, run sql=" + strSql));
     }
     Json::Value jNull;
-    EXPECT_EQ(-1, m_db.tokenCreate(jNull));
-    EXPECT_LINES(ordinary(STORE, "tokenSave, blCreate=1, jParam=null"),
-                 failed(fieldList(2), "!jParam.isMember(\"tid\")"));
+    EXPECT_FAILURE(m_db.tokenCreate(jNull), ordinary(STORE, "tokenSave, blCreate=1, jParam=null"),
+                   failed(fieldList(2), "!jParam.isMember(\"tid\")"));
 }
 
 // What was saved comes back

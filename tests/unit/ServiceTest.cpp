@@ -1,7 +1,6 @@
 // The service object: its database, what it does without one, and how it looks tokens up.
 
 #include <climits>
-#include <functional>
 #include <type_traits>
 
 #include "AccessTokenUtil.h"
@@ -45,9 +44,10 @@ TEST_F(ServiceObject, OpensAgainAfterAFailedOpening)
     seam().fail("seteuid", EPERM, 1, 4); // each opening raises and puts back
     AccessTokenApi api;
     EXPECT_LINES(NOT_ROOT);
-    EXPECT_EQ(-1, api.tokenList(jFilter, jTokens));
-    EXPECT_LINES(NOT_OPENED + Texts{failed(STORE, RUN_FAILED, EPERM),
-                                    failed(SERVICE, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)", EPERM)});
+    EXPECT_FAILURE(api.tokenList(jFilter, jTokens),
+                   NOT_OPENED +
+                       Texts{failed(STORE, RUN_FAILED, EPERM),
+                             failed(SERVICE, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)", EPERM)});
     EXPECT_EQ(Texts{}, seam().callsOf({"access", "sqlite3_open"}));
     EXPECT_EQ(0, api.tokenList(jFilter, jTokens));
     EXPECT_EQ((Texts{OPEN}), seam().callsOf({"sqlite3_open"}));
@@ -97,50 +97,35 @@ TEST_F(ServiceObject, FailsInEachOperationThatNeedsAStoreWithoutOne)
         return byArray(strName) + Texts{"0 > (err = tokenDeleteByArray(strVector, szName))",
                                         "tokenDeleteByName failed, name=" + strName + ", strValue=a"};
     };
-    const struct {
-        const char* szOperation;
-        std::function<int()> operation;
-        Texts messages; // conditions, and the operations' own lines, which say "failed"
-    } rows[] = {
-        {"create by tid",
-         [&] { return api.tokenCreateByTid(uid, strA, jNull, strTid); },
-         {"!m_pDb", strCreate}},
-        {"list", [&] { return api.tokenList(jObject, jArray); }, {"!m_pDb"}},
-        {"get", [&] { return api.tokenGetByTid(strA, jNull); }, {"!m_pDb"}},
-        {"get by array", [&] { return api.tokenGetByTidArray(strVector, jArray); }, {"!m_pDb"}},
-        {"update",
-         [&] { return api.tokenUpdateByTid(strA, jObject); },
-         {"!m_pDb", "0 > (nCount = tokenGetByTid(strTid, jToken))"}},
-        {"save", [&] { return api.tokenSaveByOverwrite(jLastUse); }, {"!m_pDb", strSave}},
-        {"delete by array", [&] { return api.tokenDeleteByArray(strVector, "tid"); }, byArray("tid")},
-        {"delete by name", [&] { return api.tokenDeleteByName(strA, "tid"); }, byName("tid")},
-        {"delete by tid", [&] { return api.tokenDeleteByTid(strA); }, byName("tid")},
-        {"delete by session", [&] { return api.tokenDeleteByBindSid(strA); }, byName("bind_sid")},
-        {"delete by function", [&] { return api.tokenDeleteByFunction(strA); }, byName("function")},
-        {"delete by tids", [&] { return api.tokenDeleteByTidArray(strVector); }, byArray("tid")},
-        {"delete all", [&] { return api.tokenDeleteAll(); }, {"!m_pDb"}},
-        {"purge", [&] { return api.cleanExpireToken(true); }, {"!m_pDb"}},
-        {"quiet purge", [&] { return api.cleanExpireToken(false); }, {}},
-        {"grant",
-         [&] { return api.tokenGrant(strA, "Api", "get", jNull); },
-         {"!m_pDb", "0 > (err = tokenGetByTid(strTid, jToken))"}},
-        {"degrade",
-         [&] { return api.tokenCountDegrade(jToken); },
-         {"!m_pDb", strSave, "0 > tokenSaveByOverwrite(jToken)"}},
-        {"degrade to none", [&] { return api.tokenCountDegrade(jLastUse); },
-         byName("tid") + Texts{"0 > tokenDeleteByTid(strTid)"}},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.szOperation);
+    // Conditions, and the operations' own lines, which say "failed".
+    const auto fails = [](int nResult, const Texts& messages) {
+        EXPECT_EQ(-1, nResult);
         Texts lines;
-        for (const std::string& strMessage : row.messages) {
+        for (const std::string& strMessage : messages) {
             const bool blOwnLine = std::string::npos != strMessage.find(" failed, ");
             lines.push_back(blOwnLine ? ordinary(SERVICE, strMessage) : failed(SERVICE, strMessage));
         }
-        errno = 0;
-        EXPECT_EQ(-1, row.operation());
         EXPECT_LINES(lines);
-    }
+    };
+    errno = 0;
+    fails(api.tokenCreateByTid(uid, strA, jNull, strTid), {"!m_pDb", strCreate});
+    fails(api.tokenList(jObject, jArray), {"!m_pDb"});
+    fails(api.tokenGetByTid(strA, jNull), {"!m_pDb"});
+    fails(api.tokenGetByTidArray(strVector, jArray), {"!m_pDb"});
+    fails(api.tokenUpdateByTid(strA, jObject), {"!m_pDb", "0 > (nCount = tokenGetByTid(strTid, jToken))"});
+    fails(api.tokenSaveByOverwrite(jLastUse), {"!m_pDb", strSave});
+    fails(api.tokenDeleteByArray(strVector, "tid"), byArray("tid"));
+    fails(api.tokenDeleteByName(strA, "tid"), byName("tid"));
+    fails(api.tokenDeleteByTid(strA), byName("tid"));
+    fails(api.tokenDeleteByBindSid(strA), byName("bind_sid"));
+    fails(api.tokenDeleteByFunction(strA), byName("function"));
+    fails(api.tokenDeleteByTidArray(strVector), byArray("tid"));
+    fails(api.tokenDeleteAll(), {"!m_pDb"});
+    fails(api.cleanExpireToken(true), {"!m_pDb"});
+    fails(api.cleanExpireToken(false), {});
+    fails(api.tokenGrant(strA, "Api", "get", jNull), {"!m_pDb", "0 > (err = tokenGetByTid(strTid, jToken))"});
+    fails(api.tokenCountDegrade(jToken), {"!m_pDb", strSave, "0 > tokenSaveByOverwrite(jToken)"});
+    fails(api.tokenCountDegrade(jLastUse), byName("tid") + Texts{"0 > tokenDeleteByTid(strTid)"});
     EXPECT_EQ(-1, api.tokenCreate(uid, strA, jNull, strA));
     EXPECT_EQ(3u, takeLines().size()); // they hold a random id
     EXPECT_EQ("a", strA);
@@ -149,8 +134,8 @@ TEST_F(ServiceObject, FailsInEachOperationThatNeedsAStoreWithoutOne)
 
     VEMO_ACCESS_TOKEN::debugInfo(true);
     errno = 0;
-    EXPECT_EQ(-1, api.cleanExpireToken(false));
-    EXPECT_LINES(fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)"));
+    EXPECT_FAILURE(api.cleanExpireToken(false),
+                   fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)"));
     // Some operations need none.
     EXPECT_EQ(0, api.VectorParamToJson(strVector, "tid", jNull));
     Json::Value jUnlimited = json(R"({"count":-1})");
@@ -194,8 +179,8 @@ TEST_F(Lookup, ListsWhatTheFilterSelects)
         EXPECT_EQ(token(), m_jArray[1]);
         EXPECT_EQ(strSql + ";", seam().statements().back());
         failStatements("SELECT", DISK_ERROR);
-        EXPECT_EQ(-1, api().tokenList(jFilter, m_jArray));
-        EXPECT_LINES(broken(strSql + ";", {RUN_FAILED}, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)"));
+        EXPECT_FAILURE(api().tokenList(jFilter, m_jArray),
+                       broken(strSql + ";", {RUN_FAILED}, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)"));
     }
 }
 
@@ -274,13 +259,12 @@ TEST_F(Lookup, GetsOneTokenByAListOfIds)
         EXPECT_EQ(json(szArray), jTokens);
         EXPECT_LINES(failed(SERVICE, "jTokenArrayOut.type() != Json::arrayValue"));
     }
-    EXPECT_EQ(-1, api().tokenGetByTidArray(none, m_jArray));
-    EXPECT_LINES(failed(SERVICE, "0 >= strTidVector.size()"));
+    EXPECT_FAILURE(api().tokenGetByTidArray(none, m_jArray), failed(SERVICE, "0 >= strTidVector.size()"));
     EXPECT_EQ(Texts{}, seam().calls);
     failStatements("SELECT", DISK_ERROR);
-    EXPECT_EQ(-1, api().tokenGetByTidArray(none = {"t"}, m_jArray));
-    EXPECT_LINES(broken(SELECT + " WHERE  (tid in ('t' ) );", {RUN_FAILED},
-                        "0 > m_pDb->tokenGet(jParam, jTokenArrayOut)"));
+    EXPECT_FAILURE(api().tokenGetByTidArray(none = {"t"}, m_jArray),
+                   broken(SELECT + " WHERE  (tid in ('t' ) );", {RUN_FAILED},
+                          "0 > m_pDb->tokenGet(jParam, jTokenArrayOut)"));
     EXPECT_EQ(json("[5]"), m_jArray);
 }
 

@@ -129,11 +129,9 @@ TEST_F(Update, ToAnotherTokensTidOverwritesThatToken)
 
 TEST_F(Update, RefusesBadArguments)
 {
-    EXPECT_EQ(-1, update("null", ""));
-    EXPECT_LINES(failed(SERVICE, "strTid.empty()"));
+    EXPECT_FAILURE(update("null", ""), failed(SERVICE, "strTid.empty()"));
     for (const char* szChange : {"null", "[]", R"("{}")", "0", "true"}) {
-        EXPECT_EQ(-1, update(szChange));
-        EXPECT_LINES(failed(SERVICE, "jParam.type() != Json::objectValue"));
+        EXPECT_FAILURE(update(szChange), failed(SERVICE, "jParam.type() != Json::objectValue"));
     }
     EXPECT_EQ(Texts{}, seam().statements());
     for (const Field& field : fields()) {
@@ -142,8 +140,7 @@ TEST_F(Update, RefusesBadArguments)
         jChange[field.szName] = json(field.szWrong);
         Json::Value jToken = token();
         jToken[field.szName] = json(field.szWrong);
-        EXPECT_EQ(-1, update(jChange));
-        EXPECT_LINES(wrongType(field, jToken) + Texts{failed(SERVICE, SAVE_FAILED)});
+        EXPECT_FAILURE(update(jChange), wrongType(field, jToken) + Texts{failed(SERVICE, SAVE_FAILED)});
     }
     EXPECT_THROW(update(R"({"count":18446744073709551615})"), Json::LogicError);
     EXPECT_EQ((Texts{row(token())}), rows());
@@ -157,18 +154,17 @@ TEST_F(Update, ReportsAFailedStore)
                         failed(SERVICE, SAVE_FAILED, EIO)};
     const std::string strReplace = saveSql("REPLACE", token());
     failStatements("SELECT", DISK_ERROR);
-    EXPECT_EQ(-1, update("{}"));
-    EXPECT_LINES(failureOf(selectSql("t"), "disk I/O error", EIO) +
-                 Texts{failed(STORE, "0 > runSql(FillList, &jTokenArrayOut)", EIO)} + lookup);
+    EXPECT_FAILURE(update("{}"), failureOf(selectSql("t"), "disk I/O error", EIO) +
+                                     Texts{failed(STORE, "0 > runSql(FillList, &jTokenArrayOut)", EIO)} +
+                                     lookup);
     failStatements("REPLACE", DISK_ERROR);
-    EXPECT_EQ(-1, update("{}"));
-    EXPECT_LINES(failureOf(strReplace, "disk I/O error", EIO) + Texts{failed(STORE, "0 > runSql()", EIO)} +
-                 save);
+    EXPECT_FAILURE(update("{}"), failureOf(strReplace, "disk I/O error", EIO) +
+                                     Texts{failed(STORE, "0 > runSql()", EIO)} + save);
     EXPECT_EQ((Texts{row(token())}), rows());
     // Nothing is written after a read that had to wait; a write that had to wait has been made.
     failStatements("SELECT", LOCKED);
-    EXPECT_EQ(-1, update(R"({"count":5})"));
-    EXPECT_LINES(Texts{fail(STORE, "sql error, sql=" + selectSql("t"), EIO)} + lookup);
+    EXPECT_FAILURE(update(R"({"count":5})"),
+                   Texts{fail(STORE, "sql error, sql=" + selectSql("t"), EIO)} + lookup);
     EXPECT_EQ("3", countOf());
     failStatements("REPLACE", LOCKED);
     EXPECT_EQ(-1, update(R"({"count":5})"));
@@ -181,13 +177,8 @@ TEST_F(Update, WinsOverWhatOthersDidSinceItsRead)
 {
     for (const char* szOthers : {"UPDATE token SET uid = 7, count = 8", "DELETE FROM token"}) {
         SCOPED_TRACE(szOthers);
-        seam().sqliteExec = [&](sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument,
-                                char** pszError) {
-            if (0 == std::string(szSql).find("REPLACE")) {
-                query(szOthers);
-            }
-            return Seam::exec(pDb, szSql, callback, pArgument, pszError);
-        };
+        beforeStatements(
+            [&](const std::string& strSql) { query(0 == strSql.find("REPLACE") ? szOthers : ""); });
         EXPECT_EQ(0, update(R"({"count":5})"));
         EXPECT_EQ((Texts{row(token(R"({"count":5})"))}), rows());
     }
@@ -217,14 +208,13 @@ TEST_F(Update, OverwriteRefusesWhatIsNoWholeRecord)
     errno = 0;
     for (const Field& field : fields()) {
         SCOPED_TRACE(field.szName);
-        EXPECT_EQ(-1, overwrite(without(field.szName)));
-        EXPECT_LINES(ordinary(fieldList(field.nLine), std::string("lost data member=") + field.szName),
-                     failed(SERVICE, "0 > fillDefaultValue(jToken, true)"),
-                     overwriteFailed(without(field.szName)));
+        EXPECT_FAILURE(overwrite(without(field.szName)),
+                       ordinary(fieldList(field.nLine), std::string("lost data member=") + field.szName),
+                       failed(SERVICE, "0 > fillDefaultValue(jToken, true)"),
+                       overwriteFailed(without(field.szName)));
         Json::Value jToken = token();
         jToken[field.szName] = json(field.szWrong);
-        EXPECT_EQ(-1, overwrite(jToken));
-        EXPECT_LINES(wrongType(field, jToken));
+        EXPECT_FAILURE(overwrite(jToken), wrongType(field, jToken));
     }
     EXPECT_EQ(Texts{}, seam().statements());
 }
