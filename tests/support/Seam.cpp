@@ -41,6 +41,11 @@ bool fails(const std::string& strName, const std::string& strArguments = "")
     return blFails;
 }
 
+void record(const std::string& strName, const std::string& strArguments = "")
+{
+    fails(strName, strArguments);
+}
+
 // "util.cpp:123" becomes "util.cpp:#".
 std::string withoutLineNumbers(std::string strText)
 {
@@ -153,34 +158,24 @@ extern "C" {
 
 uid_t geteuid() noexcept
 {
-    if (CALLED_BY_LIBRARY && fails("geteuid")) {
-        return static_cast<uid_t>(-1);
-    }
-    return NEXT(geteuid)();
+    return CALLED_BY_LIBRARY && fails("geteuid") ? static_cast<uid_t>(-1) : NEXT(geteuid)();
 }
 
 int seteuid(uid_t uid) noexcept
 {
-    if (CALLED_BY_LIBRARY && fails("seteuid", std::to_string(uid))) {
-        return -1;
-    }
-    return NEXT(seteuid)(uid);
+    return CALLED_BY_LIBRARY && fails("seteuid", std::to_string(uid)) ? -1 : NEXT(seteuid)(uid);
 }
 
 int access(const char* szPath, int nMode) noexcept
 {
-    if (CALLED_BY_LIBRARY && fails("access", szPath)) {
-        return -1;
-    }
-    return NEXT(access)(szPath, nMode);
+    return CALLED_BY_LIBRARY && fails("access", szPath) ? -1 : NEXT(access)(szPath, nMode);
 }
 
 int chmod(const char* szPath, mode_t mode) noexcept
 {
-    if (CALLED_BY_LIBRARY && fails("chmod", std::string(szPath) + " " + octal(mode))) {
-        return -1;
-    }
-    return NEXT(chmod)(szPath, mode);
+    return CALLED_BY_LIBRARY && fails("chmod", std::string(szPath) + " " + octal(mode))
+               ? -1
+               : NEXT(chmod)(szPath, mode);
 }
 
 int open(const char* szPath, int nFlags, ...)
@@ -189,10 +184,7 @@ int open(const char* szPath, int nFlags, ...)
     va_start(args, nFlags);
     const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
     va_end(args);
-    if (CALLED_BY_LIBRARY && fails("open", szPath)) {
-        return -1;
-    }
-    return NEXT(open)(szPath, nFlags, mode);
+    return CALLED_BY_LIBRARY && fails("open", szPath) ? -1 : NEXT(open)(szPath, nFlags, mode);
 }
 
 int usleep(useconds_t nMicroseconds)
@@ -200,7 +192,7 @@ int usleep(useconds_t nMicroseconds)
     if (!CALLED_BY_LIBRARY) {
         return NEXT(usleep)(nMicroseconds);
     }
-    fails("usleep", std::to_string(nMicroseconds));
+    record("usleep", std::to_string(nMicroseconds));
     if (seam().sleep) {
         seam().sleep();
     }
@@ -213,7 +205,7 @@ time_t time(time_t* pTime) noexcept
     if (!CALLED_BY_LIBRARY) {
         return NEXT(time)(pTime);
     }
-    fails("time");
+    record("time");
     const time_t now = seam().clock ? *seam().clock : NEXT(time)(nullptr);
     if (pTime) {
         *pTime = now;
@@ -284,7 +276,7 @@ int sqlite3_open(const char* szPath, sqlite3** ppDb)
     if (!CALLED_BY_LIBRARY) {
         return NEXT(sqlite3_open)(szPath, ppDb);
     }
-    fails("sqlite3_open", szPath);
+    record("sqlite3_open", szPath);
     if (seam().sqliteOpen) {
         return seam().sqliteOpen(szPath, ppDb);
     }
@@ -297,7 +289,7 @@ int sqlite3_exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pA
     if (!CALLED_BY_LIBRARY) {
         return NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
     }
-    fails("sqlite3_exec", szSql);
+    record("sqlite3_exec", szSql);
     return seam().sqliteExec ? seam().sqliteExec(pDb, szSql, callback, pArgument, pszError)
                              : Seam::exec(pDb, szSql, callback, pArgument, pszError);
 }
@@ -305,7 +297,7 @@ int sqlite3_exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pA
 int sqlite3_changes(sqlite3* pDb)
 {
     if (CALLED_BY_LIBRARY) {
-        fails("sqlite3_changes");
+        record("sqlite3_changes");
     }
     return NEXT(sqlite3_changes)(pDb);
 }
@@ -315,7 +307,7 @@ int sqlite3_close(sqlite3* pDb)
     if (!CALLED_BY_LIBRARY) {
         return NEXT(sqlite3_close)(pDb);
     }
-    fails("sqlite3_close");
+    record("sqlite3_close");
     if (seam().sqliteClose) {
         return seam().sqliteClose(pDb);
     }
