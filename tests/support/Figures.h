@@ -1,8 +1,7 @@
 // How much a test does, and what it measured.
 //
-// Tests that draw at random or repeat themselves do so much every day, and much more when
-// VEMO_TEST_FACTOR, a whole number, says so. VEMO_TEST_SEED, another, starts their draws elsewhere. Both are
-// 1 when they are not set.
+// Tests that draw at random or repeat themselves do VEMO_TEST_FACTOR times as much. VEMO_TEST_SEED changes
+// what they draw. Both are whole numbers, 1 when they are not set.
 
 #ifndef TESTS_FIGURES_H
 #define TESTS_FIGURES_H

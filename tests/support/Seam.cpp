@@ -116,7 +116,7 @@ Function* next(const char* szName, Function* /* of this type */)
 
 Seam& seam()
 {
-    // Never destroyed: the library may be called, and call, until the very end of the process.
+    // Never destroyed, since the library is used until the very end of the process.
     static Seam& theSeam = *new Seam;
     return theSeam;
 }
@@ -196,7 +196,7 @@ int usleep(useconds_t nMicroseconds)
     if (seam().sleep) {
         seam().sleep();
     }
-    errno = EINTR; // an interrupted sleep is a wait none the less, and its errno nobody's concern
+    errno = EINTR; // the library ignores the result and the errno of its sleep
     return -1;
 }
 
@@ -245,7 +245,7 @@ void syslog(int nPriority, const char* szFormat, ...)
     va_start(args, szFormat);
     if (blLibrary) {
         logged("<" + std::to_string(nPriority) + ">", szFormat, args);
-        errno = EDESTADDRREQ; // as a system without a log daemon leaves some error behind
+        errno = EDESTADDRREQ; // as on a system without a log daemon
     } else {
         vsyslog(nPriority, szFormat, args);
     }

@@ -2,9 +2,9 @@
 // calls (Seam.cpp), so the shared object that ships calls these. They record each call, write the log lines
 // down, fail where a test wants that, and otherwise call the real function.
 //
-// Only calls by the library are treated so; those of SQLite and of the test itself go straight to the real
-// function. The clock is shared with SQLite. getrandom, getpwuid_r and the allocation of arrays are the
-// seam's whoever calls, for tests that have the callers linked in.
+// Calls by SQLite and by the test itself go straight to the real function. The clock is shared with SQLite.
+// getrandom, getpwuid_r and the allocation of arrays are the seam's whoever calls, for tests that have the
+// callers linked in.
 
 #ifndef TESTS_SEAM_H
 #define TESTS_SEAM_H
@@ -46,17 +46,16 @@ struct Seam {
     std::map<std::string, Failure> failures;
     void fail(const std::string& strName, int nErrno, int nFirst = 1, int nLast = 1);
 
-    // Stand-ins, when set, for whole functions. They may call the real ones.
+    // What is called instead of whole functions, when set. It may call the real ones.
     std::function<int(const char*, sqlite3**)> sqliteOpen;
     std::function<int(sqlite3*, const char*, SqlCallback, void*, char**)> sqliteExec;
     std::function<int(sqlite3*)> sqliteClose;
-    std::function<void()> sleep; // nobody really sleeps; this is told instead
+    std::function<void()> sleep; // called for usleep, which never really sleeps
     std::function<int(uid_t, struct passwd*, char*, size_t, struct passwd**)> getUser;
     std::function<ssize_t(void*, size_t, unsigned int)> random; // getrandom
 
-    // sqlite3_exec as the library sees it when there is no stand-in: errno stays as it was, in the
-    // callback too, and so it does with sqlite3_open and sqlite3_close. (What SQLite really leaves there
-    // is its own affair, and differs between systems.)
+    // The real sqlite3_exec, but errno stays as it was, in the callback too. sqlite3_open and sqlite3_close
+    // do the same. (SQLite itself may leave any errno, which differs between systems.)
     static int exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument, char** pszError);
 
     // The time that the library and SQLite see, when set; seconds since the epoch.
@@ -67,8 +66,7 @@ struct Seam {
 
 Seam& seam();
 
-// When set, called ahead of each allocation by operator new, whoever asks for it. It may throw, and errno
-// stays as it leaves it.
+// When set, called ahead of each allocation by operator new. It may throw, and may change errno.
 extern void (*g_pAllocation)();
 
 #endif

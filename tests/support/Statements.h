@@ -9,29 +9,29 @@
 
 #include "Seam.h"
 
-// What one try of a statement is answered instead of being run; SQLITE_OK runs it.
+// The answer to one try of a statement, which is then not run. SQLITE_OK runs it.
 struct Answer {
     int nResult;
     const char* szError; // null: no text
-    int nErrno = EIO;    // left behind by what was not run
+    int nErrno = EIO;    // as the statement would leave it
 };
 
 const Answer RUN = {SQLITE_OK, nullptr};
 const Answer DISK_ERROR = {SQLITE_IOERR, "disk I/O error"};
 const Answer LOCKED = {SQLITE_BUSY, "database is locked"};
 
-// Answers the tries of the library's statements that start with strStart, in turn. All other
-// statements are run, and so are these when no answer is left.
+// Answers, in turn, the tries of the library's statements that start with strStart. Other statements are run,
+// and these too when no answer is left.
 void answerStatements(const std::string& strStart, const std::vector<Answer>& answers);
 
-// Answers so many of them alike.
+// Answers nTimes of them with a failure.
 void failStatements(const std::string& strStart, const Answer& failure, int nTimes = 1);
 
 // Calls something ahead of each of the library's statements, which is then run.
 void beforeStatements(const std::function<void(const std::string& strSql)>& call);
 
-// Another connection, which holds the database locked until the library has waited nWaits times; with
-// 0, and at the latest, until it ends. What it changes comes into effect then.
+// Another connection, which locks the database until the library has waited nWaits times, or (0) until this
+// object is destroyed. Then strChange takes effect.
 class Lock {
 public:
     explicit Lock(const std::string& strPath, int nWaits = 0, const std::string& strChange = "");

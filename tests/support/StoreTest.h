@@ -27,19 +27,19 @@ const Texts OPENING_CALLS = {"geteuid",      "seteuid",      "access",          
                              "sqlite3_open", "sqlite3_exec", "sqlite3_changes", "sqlite3_close"};
 
 // Tests that need no database. The library logs to standard output, and does so for the rest of the process.
-// A line that a test does not take is an error.
+// A line that a test does not expect is an error.
 class SeamTest : public ::testing::Test {
 protected:
     void SetUp() override;
     void TearDown() override;
 
-    // Nothing fails any more, nothing is recorded yet, errno is 0 and the clock shows NOW.
+    // Forgets all failures and records. errno is 0 and the clock shows NOW.
     static void reset();
 
-    bool m_blStdout = true; // a constructor may set it to false: the library logs to the system log then
+    bool m_blStdout = true; // a constructor may set it to false, for the system log
 };
 
-// Tests with a fresh directory, which the library takes for that of the database. There is no file yet.
+// Tests with a fresh directory, which the library uses for its database. There is no file yet.
 class StoreTest : public SeamTest {
 protected:
     void SetUp() override;

@@ -8,7 +8,7 @@
 
 namespace {
 
-// "util.cpp" stands for all its lines; those of the field list are told.
+// A source file stands for all its lines; the field list comes with its line.
 std::string location(const std::string& strFile)
 {
     return std::string::npos == strFile.find(':') ? strFile + ":#" : strFile;

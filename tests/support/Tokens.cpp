@@ -37,7 +37,7 @@ Json::Value without(const char* szMember, Json::Value jToken)
     return jToken;
 }
 
-// The texts of the fields' values; of those that are quoted in SQL, what quote() makes of them.
+// The values of the fields as text; those that SQL quotes are passed through quote().
 template <typename Quote>
 static Texts values(const Json::Value& jToken, Quote quote)
 {

@@ -9,7 +9,7 @@
 
 const time_t NOW = 1700000000; // what the library's clock shows
 
-// What is known of a field.
+// A field, and values for tests of it.
 struct Field {
     const char* szName;
     int nLine; // in the field list

@@ -15,13 +15,13 @@ const AccessTokens::Answer GRANTED = AccessTokens::Answer::Granted;
 const AccessTokens::Answer REFUSED = AccessTokens::Answer::Refused;
 const AccessTokens::Answer FAILED = AccessTokens::Answer::Failed;
 
-// The lines that the library logs on the way are other tests' business.
+// The lines that the library logs are other tests' subject, and are dropped.
 class TokensTest : public TableTest {
 protected:
     void SetUp() override
     {
         TableTest::SetUp();
-        seam().clock.reset(); // the class looks at the real one
+        seam().clock.reset(); // the class uses the real clock
     }
 
     void TearDown() override
@@ -76,7 +76,7 @@ TEST_F(TokensTest, AreRevokedBySessionAndByPurpose)
     EXPECT_EQ("b c d", tids());
     m_tokens.revokeFunction("VPN");
     EXPECT_EQ("c d", tids());
-    // The library would take it for "no session", and delete those that are bound to none.
+    // The library would read it as "no session", and delete the tokens that are bound to none.
     EXPECT_THROW(m_tokens.revokeSession(std::string("\0S2", 3)), std::runtime_error);
     EXPECT_EQ("c d", tids());
 }
@@ -100,7 +100,7 @@ TEST_F(TokensTest, SayWhatHappenedToAGrant)
         {"2", "", {}, GRANTED, "1"},
         {"2", REPLACE, {LOCKED, LOCKED}, GRANTED, "1"},
         {"1", DELETE_T, {LOCKED}, GRANTED, ""},
-        {"0", DELETE_T, {LOCKED}, GRANTED, ""}, // zero is a last use
+        {"0", DELETE_T, {LOCKED}, GRANTED, ""}, // 0 is one last use
         {"2", SELECT, {LOCKED}, GRANTED, "1"},
         {"2", REPLACE, {DISK_ERROR}, FAILED, "2"},
         {"1", DELETE_T, {DISK_ERROR}, FAILED, "1"},
@@ -137,7 +137,7 @@ TEST_F(TokensTest, RefuseWhatATokenDoesNotOpen)
     EXPECT_EQ("3", countOf());
 }
 
-TEST_F(TokensTest, TakeWhatHasExpiredForGoneThoughItCannotBePurged)
+TEST_F(TokensTest, TreatExpiredTokensAsGoneWhenThePurgeFails)
 {
     insert(R"({"deadline":1700000000})");
     failStatements(PURGE, DISK_ERROR, 3);

@@ -1,4 +1,4 @@
-// The connection to the database: in which order of calls it is opened, how that fails, and how it is closed.
+// The connection to the database: the calls that open it, how opening fails, and how it is closed.
 
 #include <sys/stat.h>
 #include <unistd.h>
@@ -89,7 +89,7 @@ TEST_F(Connection, OpensInAFixedOrderOfCallsAndPutsTheUidBack)
     };
     opens([] {}, OPENED, created + back, {});
     opens([&] { std::ofstream{path()}; }, OPENED, {UID, RAISE, ACCESS, OPEN, BACK}, {});
-    // What cannot be looked at is treated as missing, which does the file no harm.
+    // A file that cannot be looked at is treated as missing, which does it no harm.
     opens([&] { std::ofstream{path()}, seam().fail("access", EACCES); }, OPENED, created + back, {});
     opens([] { seam().fail("seteuid", EPERM); }, REFUSED, {UID, RAISE, BACK}, {NOT_ROOT});
     opens([] { seam().fail("open", EROFS); }, REFUSED, {UID, RAISE, ACCESS, TOUCH, BACK},
@@ -108,7 +108,7 @@ TEST_F(Connection, OpensInAFixedOrderOfCallsAndPutsTheUidBack)
     opens([] { failStatements(SCHEMA, DISK_ERROR); }, OPENED, touched + Texts{CREATE} + back,
           {ordinary(STORE, "i=0,run sql failed, error=disk I/O error, sql=" + SCHEMA),
            fail(STORE, "create table failed, sql=" + SCHEMA, EIO)});
-    // Nobody knows what to put back.
+    // Without the uid of before, none is put back.
     opens([] { seam().fail("geteuid", EPERM); }, {0, true, 0}, created, {});
     opens([] { seam().fail("geteuid", 0), seam().fail("seteuid", EPERM); }, REFUSED, {UID, RAISE},
           {NOT_ROOT});
@@ -156,7 +156,7 @@ TEST_F(Connection, DoesNothingWhenOpen)
     EXPECT_EQ(Texts{}, seam().calls);
 }
 
-// The file's existence counts, not the table's.
+// The table is created only with the file.
 TEST_F(Connection, LeavesFilesThatExistAlone)
 {
     const std::string strForeign(4096, 'x');
@@ -212,8 +212,8 @@ TEST_F(Connection, KeepsTheUselessHandleOfARefusedOpening)
     EXPECT_LINES(failureOf(UPDATE, "no such table: token"));
 }
 
-// No handle counts as closed, so each statement opens anew.
-TEST_F(Connection, RunsStatementsOverNoHandleInVain)
+// Without a handle the connection counts as closed, so each statement opens it again.
+TEST_F(Connection, FailsStatementsWithoutAHandle)
 {
     openWithoutHandle(SQLITE_OK);
     AccessTokenDbApi db;
@@ -227,7 +227,7 @@ TEST_F(Connection, RunsStatementsOverNoHandleInVain)
     EXPECT_EQ((Texts{OPEN, OPEN}), seam().callsOf({"sqlite3_open", "sqlite3_close"}));
 }
 
-// The uid that cannot be put back does not hide why the opening failed.
+// A failure to put the uid back does not hide why the opening failed.
 TEST_F(Connection, TellsErrnoOfTheFailedCallUpToTheStatement)
 {
     seam().fail("open", EROFS);

@@ -19,7 +19,7 @@ const std::string CREATE_FAILED = "0 > m_pDb->tokenCreate(jParam)";
 
 class Creation : public TableTest {
 protected:
-    // The operations, which only read what they are given.
+    // The operations, which leave their arguments as they are.
     int createByTid() { return create(&AccessTokenApi::tokenCreateByTid, m_strTid); }
     int createGenerated()
     {
@@ -75,7 +75,7 @@ private:
     }
 };
 
-TEST_F(Creation, TakesWhatTheOptionLacksFromTheDefaults)
+TEST_F(Creation, UsesDefaultsForWhatTheOptionLacks)
 {
     for (const Json::ValueType type : {Json::nullValue, Json::objectValue}) {
         query("DELETE FROM token");
@@ -92,7 +92,7 @@ TEST_F(Creation, TakesWhatTheOptionLacksFromTheDefaults)
     }
 }
 
-TEST_F(Creation, CarriesOptionsAndDropsWhatIsNoField)
+TEST_F(Creation, KeepsOptionsAndDropsWhatIsNoField)
 {
     m_jOption = json(R"({"bind_sid":"S'1","count":-1,"webapi_allow":{"A":{"method":["get"]}},
                          "extra":{"b":[1,null],"a":"it's"},"Count":9,"colour":"red"})");
@@ -100,7 +100,7 @@ TEST_F(Creation, CarriesOptionsAndDropsWhatIsNoField)
     EXPECT_EQ((Texts{row(record())}), rows());
 }
 
-TEST_F(Creation, TakesArgumentsAndClockBeforeTheOption)
+TEST_F(Creation, PrefersArgumentsAndClockToTheOption)
 {
     const std::string strRow = row(record());
     m_jOption = json(R"({"tid":"other","uid":1,"function":"other","create_time":5})");
@@ -159,7 +159,7 @@ TEST_F(Creation, ThrowsAtNumbersThatDoNotFitAndLeavesNothing)
         EXPECT_THROW(createGenerated(), Json::LogicError);
         EXPECT_EQ(json(szOption), m_jOption);
     }
-    // Without an option, a clock beyond 32 bits is fine; added to one, it is not.
+    // A clock beyond 32 bits is fine without an option, and throws with one.
     seam().clock = static_cast<time_t>(INT_MAX) + 1;
     m_jOption = json(R"({"deadline":0})");
     EXPECT_THROW(createByTid(), Json::LogicError);
@@ -261,7 +261,7 @@ TEST_F(Creation, RefusesAnIdThatExistsWithItsStepsInDebugMode)
     EXPECT_EQ(0, createByTid());
     EXPECT_FAILURE(createByTid(), duplicateLines());
     EXPECT_EQ((Texts{row(record())}), rows());
-    // A creation that the store refuses was announced all the same.
+    // The debug line comes before the store is asked, so also when it refuses.
     VEMO_ACCESS_TOKEN::debugInfo(true);
     EXPECT_FAILURE(createByTid(), begin + duplicateLines());
     query("DELETE FROM token");
@@ -293,7 +293,8 @@ TEST_F(Creation, ReportsAFailedRandomSource)
 
 TEST_F(Creation, TriesNoOtherIdWhenTheGeneratedOneExists)
 {
-    beforeStatements([this](const std::string& strSql) { query(strSql); }); // someone else had the same luck
+    beforeStatements(
+        [this](const std::string& strSql) { query(strSql); }); // another process creates the same id first
     EXPECT_EQ(-1, createGenerated());
     m_strTid = tids();
     EXPECT_LINES(duplicateLines() +

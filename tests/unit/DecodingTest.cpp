@@ -18,8 +18,8 @@ const std::string NO_FIELD = "!jTokenType.isMember(strName)";
 const std::string WRONG_ARRAY = "pjTokenArray->type() != Json::arrayValue && "
                                 "pjTokenArray->type() != Json::nullValue";
 
-int g_nAllocationThatFails = 0;  // counted from now, 1 is the next; 0: none
-bool g_blJsoncppTellsIt = false; // by an exception of its own, as it does where it calls malloc
+int g_nAllocationThatFails = 0;  // 1 is the next one; 0: none
+bool g_blJsoncppTellsIt = false; // jsoncpp reports it by an exception of its own, as where it calls malloc
 
 void allocate()
 {
@@ -32,7 +32,7 @@ void allocate()
     }
 }
 
-// What the JSON library says when the type name of such an entry is read.
+// The error of the JSON library when the type name of such an entry is read.
 std::string errorOf(const Json::Value& jEntry)
 {
     try {
@@ -165,7 +165,7 @@ TEST_F(Decoding, ReadsNumbersLeniently)
     EXPECT_EQ(Json::Value("-1"), member("deadline", "-1"));
 }
 
-// The text decides what the member becomes, the type name does not. Of bad JSON stays what was read.
+// The text decides what the member becomes, not the type name. Of bad JSON, what was read stays.
 TEST_F(Decoding, ParsesJsonOfAnyKind)
 {
     const std::pair<const char*, const char*> rows[] = {
@@ -251,7 +251,7 @@ TEST_F(Decoding, RefusesUnknownTypeNames)
     }
 }
 
-// SQLite is C and cannot be thrown through.
+// SQLite is C: no exception may pass through it.
 TEST_F(Decoding, TurnsExceptionsIntoFailure)
 {
     for (const char* szEntry : {R"("string")", "{}", R"({"0":"string"})", "5", R"([["string"]])", "[{}]"}) {
@@ -262,14 +262,14 @@ TEST_F(Decoding, TurnsExceptionsIntoFailure)
     }
 }
 
-// The reader takes a long number for none when the allocation in it fails, and is asked again.
+// When an allocation fails, the reader can call a long number invalid. So it is asked twice.
 TEST_F(Decoding, YieldsTheWholeRecordOrNoneWhenAnAllocationFails)
 {
     const std::string strTid(1000, 'x');
     const std::string strExtra =
         R"({"a":[1,{"b":0.12345678901234567,"c":")" + std::string(100, 'x') + "\"}]}";
     const Row row = {{"tid", "deadline", "extra"}, {strTid.c_str(), "-1", strExtra.c_str()}};
-    for (const bool blWarm : {false, true}) { // at first the thread's reader is made as well
+    for (const bool blWarm : {false, true}) { // the first time, the thread's reader is made as well
         for (const char* szError : {"std::bad_alloc", "no memory"}) {
             SCOPED_TRACE(szError);
             int nWhole = 0;
@@ -376,7 +376,7 @@ TEST_F(Decoding, AppendsEachRowAsAFreshRecord)
         m_jArray);
 }
 
-// A row of another maker: any value in any column, and the column's own default time, which is text.
+// A row that another program made: any value in any column, and the column's default time, which is text.
 TEST_F(Decoding, ReadsForeignRowsLeniently)
 {
     query("INSERT INTO token (tid,bind_sid,uid,deadline,function,webapi_allow,extra) "

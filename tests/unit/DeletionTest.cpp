@@ -122,7 +122,7 @@ TEST_F(Deletion, RunsOneStatementAndCounts)
     EXPECT_EQ("", tids());
 }
 
-// Whatever the table of types says now, decides.
+// The table of types decides, as it is now.
 TEST_F(Deletion, FollowsTheTypeTable)
 {
     VEMO_ACCESS_TOKEN::tokenType()["uid"][0] = "string";
@@ -167,7 +167,7 @@ TEST_F(Deletion, RefusesListsValuesAndNames)
         errno = EACCES;
         EXPECT_FAILURE(row.remove(api()), failed(SERVICE, row.strCondition, EACCES), row.strSummary);
     }
-    // tokenDeleteByName leaves the test of the type to tokenDeleteByArray, and both tell.
+    // tokenDeleteByName leaves the check of the type to tokenDeleteByArray, and both log.
     EXPECT_FAILURE(byName("1000", "uid")(api()), failed(SERVICE, NO_STRING, EACCES),
                    arraySummary("uid", "1000"), failed(SERVICE, ARRAY_FAILED, EACCES),
                    nameSummary("uid", "1000"));
@@ -188,7 +188,7 @@ TEST_F(Deletion, TellsEachStepOfAFailure)
                        Texts{failed(SERVICE, STORE_FAILED, EIO), arraySummary("tid", "a,b,c")});
     EXPECT_FAILURE(api().tokenDeleteAll(), refused("DELETE FROM token;"));
     EXPECT_EQ("a a'b b c", tids());
-    // A statement that had to wait took effect all the same.
+    // A statement that had to wait has taken effect.
     failStatements("DELETE", LOCKED);
     EXPECT_FAILURE(byTid("a")(api()),
                    Texts{fail(STORE, "sql error, sql=" + deleteSql("tid", "a"), EIO)} + above);

@@ -34,7 +34,7 @@ Json::Value created(const std::string& strTid)
     return jToken;
 }
 
-// The functions with their arguments kept.
+// The functions, bound to their arguments.
 typedef std::function<int()> Call;
 
 Call create(unsigned int uid, const char* szOption, std::string strTid = "")
@@ -146,7 +146,7 @@ TEST_F(Exported, PurgeThenOperateAndDoSoAfterAFailedPurge)
             failStatements(PURGE, {SQLITE_IOERR, "disk I/O error", 0}, blPurged ? 0 : 1);
             EXPECT_EQ(row.nResult, row.call());
             expectCalls(Texts{PURGE} + row.statements);
-            // The store tells of the statement; the failed purge itself is kept quiet.
+            // The store logs its statement; the purge itself logs nothing.
             EXPECT_LINES((blPurged ? Texts{} : failureOf(PURGE, "disk I/O error")) + row.lines);
             EXPECT_EQ(blPurged ? "" : "3", countOf("old"));
         }
@@ -313,7 +313,7 @@ TEST_F(GrantWithName, NarrowsTheUid)
     EXPECT_STREQ("root", m_szUser);
 }
 
-TEST_F(GrantWithName, LooksNobodyUpWithoutABuffer)
+TEST_F(GrantWithName, LooksUpNoUserWithoutABuffer)
 {
     std::string strTid = "t";
     EXPECT_EQ(0, VemoAccessTokenGrant(strTid, "Api", "get", nullptr, sizeof(m_szUser)));
@@ -340,7 +340,7 @@ TEST_F(GrantWithName, WritesWhatFits)
         {"alice", 17, 0, "alice"},
         {"", 1, 0, ""},
         {"%s%n%d", 17, 0, "%s%n%d"},
-        // The size counts as an int, whatever was written by then.
+        // The size counts as an int, after the name was written.
         {"alice", static_cast<size_t>(INT_MAX), 0, "alice"},
         {"alice", static_cast<size_t>(INT_MAX) + 1, -1, "alice"},
         {"alice", cbHuge + 5, -1, "alice"},
@@ -382,7 +382,7 @@ TEST_F(GrantWithName, LeavesTheNameAloneWhenRefused)
     EXPECT_EQ(Texts{}, seam().callsOf({"getpwuid_r"}));
 }
 
-// The use is spent by then, and nothing gives it back.
+// The use is spent then, and stays spent.
 TEST_F(GrantWithName, FailsForUsersThatCannotBeFound)
 {
     // What getpwuid_r returns, and the errno that is logged; -1: there is no memory.
@@ -405,8 +405,7 @@ TEST_F(GrantWithName, FailsForUsersThatCannotBeFound)
     }
 }
 
-// Whether the name fits or not. (Under a sanitizer, which has an allocator of its own, its own report
-// at exit tells.)
+// Whether the name fits or not. (A sanitizer has its own allocator, and reports leaks at exit.)
 TEST_F(GrantWithName, FreesTheUser)
 {
     const size_t cbName = 50000;
@@ -415,7 +414,7 @@ TEST_F(GrantWithName, FreesTheUser)
     std::string strTid = "t";
     std::vector<char> user(cbName + 1);
     const auto grantTwice = [&] {
-        seam().calls.clear(); // whose memory would count
+        seam().calls.clear(); // their memory would count
         seam().lines.clear();
         EXPECT_EQ(-1, VemoAccessTokenGrant(strTid, "Api", "get", user.data(), cbName));
         EXPECT_EQ(0, VemoAccessTokenGrant(strTid, "Api", "get", user.data(), cbName + 1));
@@ -429,7 +428,7 @@ TEST_F(GrantWithName, FreesTheUser)
     seam().lines.clear();
 }
 
-// The end of a thread and of the process, and a thread that can keep nothing for the library
+// The end of a thread and of the process, and a thread that can keep nothing
 
 bool isGranted()
 {
@@ -468,7 +467,7 @@ TEST_F(Exported, GrantAtTheEndOfAThread)
     EXPECT_TRUE(blGranted);
 }
 
-// The library keeps something for each thread under a key, of which a process has so many.
+// The library keeps an object for each thread under a key. A process has only so many keys.
 TEST_F(Exported, GrantThoughTheProcessHasNoKeyLeft)
 {
     pthread_key_t key;

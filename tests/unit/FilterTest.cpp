@@ -37,7 +37,7 @@ protected:
         return builds(jFilter, [&](Json::Value& j) { return m_db.SqlFilterConditionFromJson(j, m_strOut); });
     }
 
-    // Lets the text for SQL fail: the nCall-th from now on.
+    // Lets the nCall-th text for SQL, from now on, fail.
     static void failText(int nCall = 1)
     {
         seam().counts.clear();
@@ -81,7 +81,7 @@ TEST_F(Filter, MakesOneConditionOfTheFields)
          R"( (extra in ('{"a":1}' ) and webapi_allow='"x"' ))", 0},
         {R"({"tid":"x' OR '1'='1"})", true, " (tid='x'' OR ''1''=''1' )", 0},
         {R"({"uid":"7 or 1=1"})", true, " (uid=7 or 1=1 )", 0},
-        // Nothing but what names no field, and such names beside fields, of whatever type their values are.
+        // Names that are no fields are passed over, whatever their values are.
         {"{}", true, "", 1},
         {"{}", false, "", 1},
         {R"({"sort_by":"uid","sort_direction":"desc","limit":1,"offset":2})", true, "", 1},
@@ -131,7 +131,7 @@ TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
 {
     const struct {
         const char* szFilter;
-        int nCall; // the text that finds no memory; 0: the filter is at fault
+        int nCall; // the text that gets no memory; 0: the filter is wrong
         const char* szKept;
         std::string strInner, strOuter;
     } rows[] = {
@@ -245,7 +245,7 @@ TEST_F(Filter, TakesNestedValuesForJsonFieldsOnly)
     EXPECT_THROW(where(R"({"uid":[1,{}]})"), Json::Exception);
 }
 
-TEST_F(Filter, FollowsTheTypeThatTheTableHoldsNow)
+TEST_F(Filter, FollowsTheTypeTable)
 {
     const std::pair<std::string, Texts> types[] = {
         {"'it''s'", {"string"}},
@@ -370,8 +370,8 @@ TEST_F(Filter, WritesTheTailOfTheKeywordThatTheNumberPointsTo)
     const Json::Int64 nMin = std::numeric_limits<Json::Int64>::min();
     const Json::Int64 nMax = std::numeric_limits<Json::Int64>::max();
     const Json::Int64 n2To32 = Json::Int64(1) << 32;
-    // The numbers by the position that they point to: they count modulo 2^32. What is not a number is read as
-    // one, and a fraction is cut off.
+    // The numbers by the position that they point to, modulo 2^32. Other values are read as numbers, and a
+    // fraction is cut off.
     const std::map<size_t, std::vector<Json::Value>> numbers = {
         {0, {0, n2To32, -n2To32, nMin, Json::Value(), false, -0.9}},
         {1, {1, true, 1.9}},
@@ -403,7 +403,7 @@ TEST_F(Filter, WritesTheTailOfTheKeywordThatTheNumberPointsTo)
     }
 }
 
-TEST_F(Filter, LetsTheJsonLibraryRefuseOrdersAndLimitsOfAWrongType)
+TEST_F(Filter, ThrowsForOrdersAndLimitsOfAWrongType)
 {
     for (const char* szFilter :
          {R"({"sort_by":5})", R"({"sort_by":null})", R"({"sort_by":[]})",

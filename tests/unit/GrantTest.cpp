@@ -70,7 +70,7 @@ TEST_F(Grant, SpendsOneUse)
     }
 }
 
-// Expired tokens fall to the purge before the grant, and to nothing else.
+// The purge before the grant removes expired tokens; the grant does not look at the deadline.
 TEST_F(Grant, AllowsListedMethodsAndTheApiAloneWhateverTheDeadline)
 {
     insert(R"({"count":-1,"deadline":-1})");
@@ -155,7 +155,7 @@ TEST_F(Grant, RefusesRecordsThatAreMalformed)
     EXPECT_EQ(UNTOUCHED, m_jToken);
     EXPECT_EQ("3", countOf());
 
-    // A table of another maker may lack columns.
+    // A table that another program made may lack columns.
     const std::string strDegrade = failed(SERVICE, "0 > tokenCountDegrade(jToken)");
     const std::pair<const char*, Texts> parts[] = {
         {"uid", {failed(UTIL, "!jToken.isMember(\"webapi_allow\")"), NOT_PERMITTED}},
@@ -177,7 +177,7 @@ TEST_F(Grant, RefusesRecordsThatAreMalformed)
     }
 }
 
-// After a lock that was waited out the statement has taken effect, and the grant is refused all the same.
+// A statement that had to wait for a lock has taken effect, and yet the grant is refused.
 TEST_F(Grant, FailsWithTheStoreAndLeavesTheCallersRecordAlone)
 {
     const Texts lookup = {failed(STORE, "0 > tokenGet(jParam, jTokenArray)", EIO),
@@ -247,7 +247,7 @@ TEST_F(Grant, OverlapsWithOthersAndLosesWhatTheyDid)
         3, [&] { query("DELETE FROM token"); }, "2", 2);
 }
 
-// Counting by itself: what a record may be that no table yielded
+// Counting by itself, also of records that come from no table
 
 TEST_F(Grant, CountRefusesMalformedRecords)
 {
@@ -314,7 +314,7 @@ TEST_F(Grant, CountLooksAtTidAndCountAlone)
         EXPECT_EQ(json(szRecord), jToken);
     }
     EXPECT_EQ(Texts{}, seam().statements());
-    for (int i = 0; i < 2; ++i) { // a token that has gone already is no failure
+    for (int i = 0; i < 2; ++i) { // a token that is gone already is no failure
         Json::Value jToken = json(R"({"count":1,"tid":"t"})");
         EXPECT_EQ(0, api().tokenCountDegrade(jToken));
         EXPECT_EQ("", tids());

@@ -1,5 +1,5 @@
-// Functions that a program puts in front of exported ones: the library calls these, from within as well, and
-// passes on what they fail with. Nothing else brings such failures about.
+// Exported functions that a program replaces by its own: the library calls these, from within as well, and
+// passes their failures on. Nothing else causes such failures.
 
 #include <dlfcn.h>
 
@@ -20,7 +20,7 @@ struct {
     std::function<Json::ValueType()> typeOfObjects;
 } g_instead;
 
-// The definition that would be found if that of this file were not here.
+// The definition that this file's own hides.
 template <typename Function>
 Function* next(const char* szMangledName)
 {
@@ -148,7 +148,7 @@ TEST_F(Interposed, CreationsFailWithTheDefaults)
                                          ", uid=1000, strFunction=VPN, jTokenOption=null"));
 }
 
-TEST_F(Interposed, LookupsHandNegativeResultsOnWhichUpdatesDoNot)
+TEST_F(Interposed, LookupsReturnAnyNegativeResultOfTheStore)
 {
     const std::string strGetOne = "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))";
     std::string strTid = "t";
@@ -160,8 +160,8 @@ TEST_F(Interposed, LookupsHandNegativeResultsOnWhichUpdatesDoNot)
         allFailed(SERVICE, {strGetOne, strGetOne, "0 > (nCount = tokenGetByTid(strTid, jToken))"}));
 }
 
-// Whatever may go wrong with the filter, a deletion by value never empties the table.
-TEST_F(Interposed, ListsThatBecomeNoFilterSelectNothing)
+// Whatever goes wrong with the filter, a deletion by value never empties the table.
+TEST_F(Interposed, ListsThatFailSelectNothing)
 {
     Texts values{"a", "b"};
     Json::Value jArray(Json::arrayValue);
@@ -179,7 +179,7 @@ TEST_F(Interposed, ListsThatBecomeNoFilterSelectNothing)
     EXPECT_EQ("t", tids());
 }
 
-TEST_F(Interposed, NoNameIsToldOfARecordWithoutUid)
+TEST_F(Interposed, ARecordWithoutUidGivesNoName)
 {
     std::string strTid = "t";
     char szUser[] = "before";
@@ -190,7 +190,7 @@ TEST_F(Interposed, NoNameIsToldOfARecordWithoutUid)
     EXPECT_EQ(Texts{}, seam().callsOf({"getpwuid_r"}));
 }
 
-// A fresh record is always an object; only a lie reaches the check, which asks up to twice.
+// A fresh record is always an object, so only a wrong answer reaches the check, which asks up to twice.
 TEST_F(Interposed, RowsBecomeRecordsThatAreObjectsOrNull)
 {
     Json::Value jAll(Json::objectValue);

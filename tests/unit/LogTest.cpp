@@ -17,7 +17,7 @@ using VEMO_ACCESS_TOKEN::logToStdout;
 using VEMO_ACCESS_TOKEN::logToStdoutGet;
 using VEMO_ACCESS_TOKEN::tokenType;
 
-// The identity of the lines in the system log is the process's own affair.
+// The process decides the identity of its lines in the system log, not the library.
 extern "C" void openlog(const char*, int, int)
 {
     ADD_FAILURE() << "the library calls openlog";
@@ -43,7 +43,7 @@ void checkACountOfText()
     EXPECT_EQ(-1, checkJsonType(jToken));
 }
 
-// Logs as the library does when nobody has said anything.
+// The library logs as it does before any switch is set.
 class Log : public TableTest {
 protected:
     Log() { m_blStdout = false; }
@@ -110,7 +110,7 @@ TEST_F(Log, WritesEachFormOfLine)
                  [&] {
                      Json::Value jToken = json(R"({"tid":""})");
                      EXPECT_EQ(-1, db.tokenSave(jToken, true));
-                     seam().lines.erase(seam().lines.begin()); // that of debug mode
+                     seam().lines.erase(seam().lines.begin()); // the line of debug mode
                  }},
                 {"util.cpp:#",
                  "(util.cpp:#)(" + strError +
@@ -138,7 +138,7 @@ TEST_F(Log, TellsErrnoAlthoughTheArgumentsOfALineChangeIt)
     for (const bool blStdout : {false, true}) {
         logToStdout(blStdout);
         Json::Value jToken = json(R"({"count":"5"})");
-        g_pAllocation = [] { errno = EAGAIN; }; // and succeeds
+        g_pAllocation = [] { errno = EAGAIN; }; // the allocation succeeds
         errno = EACCES;
         const int nResult = checkJsonType(jToken);
         g_pAllocation = nullptr;
@@ -149,7 +149,7 @@ TEST_F(Log, TellsErrnoAlthoughTheArgumentsOfALineChangeIt)
     }
 }
 
-// Runs operations that together write every line that the library has, while errno is nErrno all the time.
+// Runs operations that together write every line of the library, while errno is nErrno.
 class EveryLine : public Log {
 protected:
     void SetUp() override
@@ -184,7 +184,7 @@ protected:
             },
             [&] {
                 std::filesystem::rename(path(), path() + ".aside");
-                seam().fail("access", nErrno, 1, 9); // as the missing file would, but for errno
+                seam().fail("access", nErrno, 1, 9); // the file is missing, but errno is ours
                 failStatements(SCHEMA, failure);
                 AccessTokenDbApi().initDb();
                 std::filesystem::rename(path() + ".aside", path());
@@ -209,8 +209,8 @@ protected:
             [&] { api().tokenGrant(strTid, "Else", "get", jToken); },
             [&] { failStatements("DELETE", locked), api().tokenDeleteAll(), api().tokenDeleteAll(); },
         };
-        // Of each field, that an update overwrites it and that it is missing: the token that is found has no
-        // field.
+        // For each field, the lines that it is overwritten and that it is missing: the token that is found
+        // has no field.
         for (const Field& field : fields()) {
             operations.push_back([&] {
                 char* noColumns[] = {nullptr};

@@ -70,7 +70,7 @@ TEST_F(Touch, ClosesItsDescriptorWhichNoChildInherits)
     EXPECT_EQ(0, PLIBCFileTouch(file("new").c_str()));
     EXPECT_EQ(0, PLIBCFileTouch(file("new").c_str()));
     EXPECT_EQ((std::vector<int>{FD_CLOEXEC}), g_rgClosedFlags);
-    // Nor when that is the first one of all.
+    // The same when it is the first descriptor of all.
     const int nInput = dup(STDIN_FILENO);
     close(STDIN_FILENO);
     g_rgClosedFlags.clear();
@@ -159,7 +159,7 @@ private:
 
 TEST(RandomNumber, HasBothBoundsAndNoBias)
 {
-    // How often 129 numbers fit into 64 bits; the draws above are one incomplete run more.
+    // 129 numbers fit so many times into 64 bits; greater draws would favour some and are drawn again.
     const uint64_t nLimit = UINT64_MAX / 129 * 129;
     const struct {
         int nMin, nMax;
@@ -279,7 +279,7 @@ TEST(RandomString, FailsForWrongAlphabetsAndWithItsSource)
 
 class KernelRandom : public SeamTest {};
 
-TEST_F(KernelRandom, GathersShortReadsAndEndsAtAFailure)
+TEST_F(KernelRandom, JoinsShortReadsAndStopsAtAFailure)
 {
     // What the calls of getrandom give: numbers of bytes, which count up from 0, or -errno.
     const struct {
@@ -322,7 +322,7 @@ TEST_F(KernelRandom, IsTheRealOne)
 
 // The user database
 
-// A name behind which nothing can be read.
+// A name at the end of a page, after which nothing can be read.
 char* nameAtTheEndOfMemory()
 {
     const size_t cbPage = static_cast<size_t>(sysconf(_SC_PAGESIZE));
@@ -335,7 +335,7 @@ char* nameAtTheEndOfMemory()
 
 class User : public SeamTest {
 protected:
-    void TearDown() override { VEMOUserFree(m_pUser); } // null, where none was found
+    void TearDown() override { VEMOUserFree(m_pUser); } // null where none was found
 
     VEMOUser* m_pUser = nullptr;
 };
@@ -372,7 +372,7 @@ TEST_F(User, IsFoundInTheRealDatabase)
     EXPECT_EQ(strRoot, m_pUser->szName);
 }
 
-TEST_F(User, WhoIsNotFoundIsAFailure)
+TEST_F(User, FailsForAnUnknownUser)
 {
     for (const int nError : {0, ENOENT, ESRCH, EIO, EMFILE}) {
         SCOPED_TRACE(nError);
@@ -387,7 +387,7 @@ TEST_F(User, WhoIsNotFoundIsAFailure)
     }
 }
 
-TEST_F(User, WithALongEntryIsAskedForWithALargerBuffer)
+TEST_F(User, WithALongEntryNeedsALargerBuffer)
 {
     std::vector<size_t> sizes;
     seam().getUser = [&](uid_t, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,

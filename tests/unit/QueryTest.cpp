@@ -263,7 +263,7 @@ TEST_F(Query, ReportsFailureAfterALockThatItWaitedOut)
     EXPECT_EQ("", m_db.m_strErr);
 }
 
-TEST_F(Query, OfOneTakesTheFirstRowWhoseFieldMatches)
+TEST_F(Query, GetsTheFirstRowWhoseFieldMatches)
 {
     const struct {
         const char *szName, *szValue;

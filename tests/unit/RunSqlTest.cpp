@@ -25,7 +25,7 @@ int stop(void*, int, char**, char**)
     return 1;
 }
 
-// The line that a try was in vain.
+// The line of a try that failed.
 std::string tryLine(int nTry, const std::string& strError, const std::string& strSql = UPDATE)
 {
     return ordinary(STORE,
@@ -112,7 +112,7 @@ TEST_F(RunSql, FailsWhenTheCallbackStopsIt)
     EXPECT_LINES(failureOf(m_db.m_strSql, "query aborted"));
 }
 
-// The number is SQLite's own, which outlives statements that change no row.
+// The number is SQLite's own, which statements that change no row leave as it is.
 TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
 {
     const std::pair<const char*, int> rows[] = {
@@ -261,8 +261,8 @@ TEST_F(RunSql, PurgeTakesDeadlinesBeforeNow)
     }
 }
 
-// The purge's own lines can be kept quiet; those that the store writes for any statement cannot. After a lock
-// that was waited out the purge has taken effect, and yet reports failure.
+// The purge's own lines can be switched off, those that the store writes for any statement cannot. A purge
+// that had to wait for a lock has taken effect, and yet reports failure.
 TEST_F(RunSql, PurgeFailsWithTheLinesThatWereAskedFor)
 {
     const std::string strRun = ordinary(STORE, "run sql=" + PURGE);

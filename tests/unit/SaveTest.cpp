@@ -113,7 +113,7 @@ TEST_F(Save, ExpandersAppend)
     EXPECT_EQ("(%Q,%Q,%lld,%lld,%lld,%lld,%Q,%Q,%Q)", strSql);
 }
 
-// Types are the caller's business: what the JSON library converts is written so.
+// The caller is responsible for types: a value is written as the JSON library converts it.
 TEST_F(Save, RendersEachField)
 {
     const struct {
@@ -150,7 +150,7 @@ TEST_F(Save, RendersEachField)
     seam().sqliteExec = [](sqlite3*, const char*, auto, void*, char**) { return SQLITE_OK; };
     for (const auto& row : rows) {
         SCOPED_TRACE(std::string(row.szField) + " " + row.szValue);
-        // The statement of a record that has a mark in the place of the value.
+        // The statement of a record with a mark in place of the value.
         Json::Value jToken = token();
         const bool blNumber = jToken[row.szField].isNumeric();
         jToken[row.szField] = blNumber ? Json::Value(77777) : "MARK";
@@ -163,8 +163,8 @@ TEST_F(Save, RendersEachField)
     }
 }
 
-// What the JSON library cannot convert, it throws at; nothing is run.
-TEST_F(Save, ThrowsAtMembersThatDoNotConvert)
+// For what the JSON library cannot convert, it throws; nothing is run.
+TEST_F(Save, ThrowsForMembersThatDoNotConvert)
 {
     m_db.m_strSql = "before";
     for (const char* szChange :
@@ -340,7 +340,7 @@ TEST_F(Save, KeepsDoublesToTheBit)
     }
 }
 
-// Conditions compare texts, so a value must always become the same one.
+// Conditions compare texts, so a value must always become the same text.
 TEST_F(Save, DropsCommentsOtherMembersAndWhatFollowsANul)
 {
     Json::Value jToken = token(R"({"extra":[1],"more":"text","TID":1,"sort_by":"tid"})");

@@ -7,7 +7,7 @@
 #include "Statements.h"
 #include "StoreTest.h"
 
-// Compiled callers hold the object in a pointer's room.
+// Compiled callers hold the object in the space of a pointer.
 static_assert(sizeof(AccessTokenApi) == sizeof(void*));
 static_assert(!std::is_polymorphic_v<AccessTokenApi>);
 static_assert(!std::is_copy_constructible_v<AccessTokenApi> && !std::is_copy_assignable_v<AccessTokenApi>);
@@ -97,7 +97,7 @@ TEST_F(ServiceObject, FailsInEachOperationThatNeedsAStoreWithoutOne)
         return byArray(strName) + Texts{"0 > (err = tokenDeleteByArray(strVector, szName))",
                                         "tokenDeleteByName failed, name=" + strName + ", strValue=a"};
     };
-    // Conditions, and the operations' own lines, which say "failed".
+    // The messages are conditions, and the operations' own lines, which say "failed".
     const auto fails = [](int nResult, const Texts& messages) {
         EXPECT_EQ(-1, nResult);
         Texts lines;
@@ -143,7 +143,7 @@ TEST_F(ServiceObject, FailsInEachOperationThatNeedsAStoreWithoutOne)
     EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
 }
 
-// Looking tokens up. How filters become statements is the store's (QueryTest).
+// Looking tokens up. QueryTest shows how filters become statements.
 class Lookup : public TableTest {
 protected:
     void SetUp() override
@@ -276,7 +276,7 @@ TEST_F(Lookup, MakesListsForFilters)
     const struct {
         Texts values;
         const char *szField, *szParam, *szResult;
-        std::string strCondition; // "": it is made
+        std::string strCondition; // of the failure; "": the list is made
     } rows[] = {
         {{"a"}, "tid", "null", R"({"tid":["a"]})", ""},
         {{"b", "a", "b", ""}, "bind_sid", "{}", R"({"bind_sid":["b","a","b",""]})", ""},

@@ -1,4 +1,4 @@
-// What only root can show: the real path, owner and mode, and the real effective uid.
+// What only root can test: the real path, owner and mode, and the real effective uid.
 
 #include <sys/stat.h>
 #include <sys/wait.h>

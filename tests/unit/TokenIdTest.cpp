@@ -13,8 +13,8 @@ namespace {
 
 class TokenId : public SeamTest {};
 
-// With so many ids, a length or character that can occur and yet does not is no chance: for a length
-// it is about one in 10^20.
+// Among so many ids each possible length and character occurs: a length is missing by chance once in 10^20
+// runs.
 TEST_F(TokenId, HasEveryLengthFrom127To255AndEveryLetterAndDigit)
 {
     const int nIds = 6000;
@@ -36,9 +36,8 @@ TEST_F(TokenId, HasEveryLengthFrom127To255AndEveryLetterAndDigit)
               std::string(letters.begin(), letters.end()));
 }
 
-// Eight bytes, least significant first, choose the length; then each byte chooses a character, 62
-// different ones in turn. The last 8 of the 256 bytes would favour the first characters and are passed
-// over.
+// Eight bytes, the least significant first, choose the length; then each byte chooses one of 62 characters.
+// The 8 greatest bytes would favour the first characters and are skipped.
 TEST_F(TokenId, TakesCharactersInTheOrderOfTheAlphabet)
 {
     const std::string strAlphabet = "0987654321abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ";
@@ -90,9 +89,9 @@ TEST_F(TokenId, FailsWithTheRandomSourceUnlessThatWasInterrupted)
 
 class TimeAfterNow : public SeamTest {};
 
-TEST_F(TimeAfterNow, IsANumberOrADateOfTheInternet)
+TEST_F(TimeAfterNow, IsANumberOrADateInUtc)
 {
-    // The text is in UTC, wherever the process lives.
+    // The time zone of the process does not matter.
     setenv("TZ", "XXX-05:30", 1);
     tzset();
     const time_t noon = 1767355200;

@@ -37,7 +37,7 @@ protected:
         insert();
     }
 
-    // The update, which only reads what it is given.
+    // The update, which leaves its argument as it is.
     int update(const Json::Value& jChange, std::string strTid = "t")
     {
         Json::Value jParam = jChange;
@@ -70,7 +70,7 @@ TEST_F(Update, ReplacesEachFieldAlone)
             Json::Value jExpected = token();
             jExpected[field.szName] = jChange[field.szName];
             EXPECT_EQ(0, update(jChange));
-            // The old row stays beside one of another tid.
+            // With another tid, the old row stays.
             const bool blCopy = std::string("tid") == field.szName;
             EXPECT_EQ((blCopy ? Texts{row(jExpected), row(token())} : Texts{row(jExpected)}), rows());
             const std::string strRun = ordinary(STORE, "run sql=" + saveSql("REPLACE", jExpected));
@@ -99,7 +99,7 @@ TEST_F(Update, ReplacesAllFieldsInTheListsOrder)
     const Texts all = takeLines();
     EXPECT_EQ(lines, Texts(all.begin() + 1, all.begin() + 10));
     EXPECT_EQ(0, update(R"({"count":5})", "unknown"));
-    EXPECT_LINES(ordinary(STORE, "run sql=" + selectSql("unknown"))); // none of a missing token
+    EXPECT_LINES(ordinary(STORE, "run sql=" + selectSql("unknown"))); // none for a missing token
 }
 
 TEST_F(Update, RewritesTheTokenUnchangedWhenNoFieldIsGiven)
