@@ -1,7 +1,7 @@
 #!/bin/bash
-# The life of access tokens, as the administrator of a machine sees and steers it: each step shows
-# commands and what they print. Ends with status 1 when one does not end as the step is meant to show.
-# Needs vemo-access-token in the PATH. Tokens of other programs are counted, but neither shown nor used.
+# The life of access tokens, as the administrator of a machine manages it. Each step shows commands and what
+# they print. Ends with status 1 when a command does not end as expected. Needs vemo-access-token in the PATH.
+# Tokens of other programs are counted, but neither shown nor used.
 set -uo pipefail
 dir=$(mktemp -d)
 trap 'rm -rf "$dir"' EXIT
@@ -17,7 +17,7 @@ step()
     printf '%s. %s\n\n' $step "$1"
 }
 
-# call STATUS ARGUMENTS...: shows a command, ids shortened, and runs it
+# call STATUS ARGUMENTS...: shows a command, with ids shortened, and runs it
 call()
 {
     local expected=$1 argument shown=() got
@@ -38,7 +38,7 @@ call()
     fi
 }
 
-# create VARIABLE ARGUMENTS...: shows the creation of a token and keeps its id in the variable
+# create VARIABLE ARGUMENTS...: shows the creation of a token, and sets the variable to its id
 create()
 {
     local -n id=$1
@@ -54,12 +54,12 @@ Who hands the id of a token to whom:
    (a login page, a share)        (a browser, a job)           (a web API)
      create  --- the id --->        keeps it      --- the id ---->  grant
                                                    with each call
-   All that is secret of a token is its id: whoever has that is let in. So it travels on ways that nobody
-   else can read, and is shown whole once, when it is made.
+   The id is the secret of a token: whoever knows it is let in. So it is only sent where nobody else can
+   read it, and it is shown in full only once, when it is made.
 
 END
 
-step "Before the first program needs them: the private directory, the file and the table."
+step "The private directory, the file and the table are made before the first program needs them."
 call 0 init
 
 step "A token for root: two uses, for an hour, of two methods of one API. The id is printed once."
@@ -68,12 +68,12 @@ create share --user root --function demo-share --ttl 1h --uses 2 --allow Demo.Fi
 echo "   (${share:0:8}..., ${#share} characters)"
 call 0 list --function demo-share
 
-step "Would it open this? Nothing is spent by asking. Eight characters of the id are enough for that."
+step "Would the token allow this call? Asking spends no use. Eight characters of the id are enough."
 call 0 check "${share:0:8}" Demo.File get
 call 1 check "${share:0:8}" Demo.File delete
 call 1 check "${share:0:8}" Demo.User get
 
-step "It gets another method and more time."
+step "The token gets another method and more time."
 call 0 update "${share:0:8}" --add-allow Demo.File:delete --ttl 2d
 call 0 list --function demo-share
 
@@ -83,7 +83,7 @@ call 0 grant "$share" Demo.File delete
 call 1 grant "$share" Demo.File get
 call 3 show "${share:0:8}"
 
-step "Two tokens of a login session; the session ends, and they are taken back."
+step "Two tokens of a login session; the session ends, and they are revoked."
 create sync --uid 0 --function demo-sync --unlimited --allow Demo.Sync --bind-sid demo-login-1
 create view --uid 0 --function demo-view --allow Demo.View:get --bind-sid demo-login-1
 call 0 list --bind-sid demo-login-1
@@ -91,12 +91,12 @@ call 0 revoke --bind-sid demo-login-1 --dry-run
 call 0 revoke --bind-sid demo-login-1 --yes
 call 0 list --bind-sid demo-login-1
 
-step "What does the store hold, and is anything wrong with it? Doctor's notes are no findings: it ends with 0."
+step "What does the store hold, and is anything wrong with it? Doctor's notes are not findings: it ends with 0."
 create nightly --uid 0 --function demo-nightly --ttl 30d --unlimited --allow Demo.Backup:put
 call 0 stats
 call 0 doctor
 
-step "A backup, of these tokens alone. It holds the whole ids, so its file is root's alone."
+step "A backup of these tokens only. It holds the whole ids, so only root can read the file."
 call 0 export --function demo-nightly "$dir/tokens.jsonl"
 echo "   \$ stat -c '%A %U' $dir/tokens.jsonl"
 stat -c '     %A %U' "$dir/tokens.jsonl"

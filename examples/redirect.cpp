@@ -1,9 +1,8 @@
-// Lets a program that uses the token library run without root and without the real database: preload
-// this shared object (or link it ahead of the library) and name a directory of your own in
-// VEMO_REDIRECT_DIR. It takes the place of the private directory that holds the database, and a file beside
-// it, whose name ends in ".lock", that of the lock of all programs. The effective uid that the process sees
-// and sets is a number kept here, 0 at first, and what belongs to the real user there belongs to root for the
-// process. Without the variable, everything goes through unchanged.
+// Lets a program that uses the token library run without root and without the real database. Preload this
+// shared object, or link it before the library, and set VEMO_REDIRECT_DIR to a directory of your own. This
+// directory then replaces the private directory of the database, and a file beside it, with ".lock" added to
+// its name, replaces the lock file of all programs. The effective uid is only a number kept here, 0 at first.
+// Files of the real user seem to belong to root. Without the variable, nothing changes.
 
 #include <dlfcn.h>
 #include <fcntl.h>
@@ -44,8 +43,8 @@ size_t privateLength()
     return static_cast<size_t>(strrchr(szDatabase, '/') - szDatabase);
 }
 
-// A path, led elsewhere if it is the private directory, lies in it, or is the lock. Takes nothing from the
-// heap, like the calls that it serves.
+// A path, redirected if it is the private directory, lies in it, or is the lock file. Uses no heap memory, as
+// the functions that it serves use none.
 class Redirected {
 public:
     explicit Redirected(const char* szPath) : m_szPath(szPath)
@@ -70,12 +69,13 @@ private:
     char m_szOwn[PATH_MAX];
 };
 
-// The directory above the private one that a walk has reached last: this machine need not have it, so "/" is
-// open in its place.
+// The last directory above the private one that a walk has opened. It may be missing on this machine, so "/"
+// is open in its place.
 int g_nAbove = -1;
 char g_szAbove[sizeof(VEMO_ATOKEN_DB_PATH)];
 
-// A descriptor that was just opened. If it has the number of that directory, that one has been closed.
+// Passes on a descriptor that was just opened. If it has the number of that directory, the directory has been
+// closed.
 int notAbove(int nFile)
 {
     if (nFile == g_nAbove) {
@@ -84,7 +84,7 @@ int notAbove(int nFile)
     return nFile;
 }
 
-// The path of a name in an open directory; the name itself where that is no matter.
+// The path of a name in an open directory; the name alone where no redirection depends on it.
 class Joined {
 public:
     Joined(int nDirectory, const char* szName) : m_szPath(szName)
@@ -119,7 +119,7 @@ private:
     char m_szJoined[2 * PATH_MAX] = "";
 };
 
-// What a path's status says when the real user is taken for root.
+// Shows the real user as root in a file's status.
 int redirectedStatus(int nResult, struct stat* pStatus)
 {
     if (0 == nResult && directory() && pStatus->st_uid == getuid()) {
@@ -130,7 +130,7 @@ int redirectedStatus(int nResult, struct stat* pStatus)
 
 } // namespace
 
-// The function of that name that would run if this object were not here; looked up once.
+// The function of that name that this object hides; looked up once.
 #define NEXT(name)                                                                                           \
     ([] {                                                                                                    \
         static const auto pNext = reinterpret_cast<decltype(&::name)>(dlsym(RTLD_NEXT, #name));              \

@@ -1,6 +1,6 @@
-// The life of access tokens, told by calling the library: each step shows a call, what the library
-// logged meanwhile, the result, and what the table then holds. Ends with status 1 when a result is
-// not the one that the step is meant to show. Tokens of other programs are neither shown nor used.
+// Shows the life of access tokens. Each step shows a call of the library, its log lines, its result, and
+// the table after it. Ends with status 1 when a result is not the expected one. Tokens of other programs
+// are neither shown nor used.
 
 #include <AccessTokenApi.h>
 #include <AccessTokenUtil.h>
@@ -34,7 +34,7 @@ std::string text(const Json::Value& jValue)
     return Json::writeString(builder, jValue);
 }
 
-// An id is a credential; its start is enough to tell tokens apart.
+// An id is a credential, so only its start is shown.
 std::string shortened(const std::string& strTid)
 {
     return strTid.substr(0, 8) + "...";
@@ -46,7 +46,7 @@ std::string lifetime(const Json::Value& jToken)
     return 0 > nLeft ? "expired" : "in " + std::to_string(nLeft) + " s";
 }
 
-// The tokens of this program, read through an object of the service, which purges nothing.
+// Shows the tokens of this program. An object of the service reads them, because it purges nothing.
 void showTable()
 {
     AccessTokenApi api;
@@ -93,7 +93,7 @@ void conclude(int nExpected, int nResult)
     g_blAsExpected = g_blAsExpected && nExpected == nResult;
 }
 
-// Prints a call as it is written here, makes it and prints its result.
+// Prints a call as it is written here, runs it and prints its result.
 #define CALL(expected, call)                                                                                 \
     do {                                                                                                     \
         announce(#call);                                                                                     \
@@ -118,12 +118,12 @@ void refuse(std::string& strTid)
 {
     Json::Value jToken;
 
-    step("A method and an API that the token does not list are refused, and cost no use. (What the\n"
-         "   library logs stands between call and result.)");
+    step("A method and an API that the token does not list are refused, and spend no use. (The log lines\n"
+         "   of the library are between call and result.)");
     CALL(-1, VemoAccessTokenGrantEx(strTid, "Demo.File", "delete", jToken));
     CALL(-1, VemoAccessTokenGrantEx(strTid, "Demo.User", "get", jToken));
-    printf("   A line of the log tells where in the library a check was met, the error that\n"
-           "   the system gave last, which need not belong to it, and the check itself. That of\n"
+    printf("   A log line shows where in the library a check failed, the last error of the system,\n"
+           "   which may have another cause, and the check itself. The line of\n"
            "   \"0 > (err = checkPermission(...))\" is the refusal: the token does not list this call.\n");
     showTable();
 }
@@ -171,8 +171,8 @@ void purge()
     std::string strUnknown = "unknown";
     Json::Value jOption = json(R"({"deadline": -1})");
 
-    step("A lifetime of -1 seconds makes a token that has expired already. It stands in the table\n"
-         "   until the next call purges it; here one that deletes a token that does not exist.");
+    step("A token with a lifetime of -1 seconds has already expired. It stays in the table until the next\n"
+         "   call purges it. Here that is a call that deletes a token that does not exist.");
     printf("   jOption = %s\n", text(jOption).c_str());
     CALL(0, VemoAccessTokenCreate(uid, strFunction, jOption, strTid));
     showTable();
@@ -187,7 +187,7 @@ void deleteTokens()
     std::string strTid;
     Json::Value jOption = json(R"({"bind_sid": "demo-login-2"})");
 
-    step("Two more tokens; then the first session ends, and its tokens go; then all of one purpose.");
+    step("Two more tokens; then the tokens of the first session are deleted; then all of one purpose.");
     CALL(0, VemoAccessTokenCreate(uid, strFunction, jOption, strTid));
     CALL(0, VemoAccessTokenCreate(uid, strFunction, jOption, strTid));
     showTable();
@@ -204,8 +204,8 @@ void withTheClass()
     Json::Value jToken;
     Json::Value jOption = json(R"({"webapi_allow": {"Demo.File": {"method": ["get"]}}})");
 
-    step("The same in C++17, by the class AccessTokens: it tells refusals from failures, and holds the\n"
-         "   lock of all programs meanwhile.");
+    step("The same in C++17, with the class AccessTokens: it distinguishes refusals from failures, and\n"
+         "   takes the lock of all programs for each call.");
     const std::string strTid = tokens.create(0, "demo-class", jOption);
     CALL(true, Answer::Refused == tokens.grant(strTid, "Demo.File", "delete"));
     CALL(true, Answer::Granted == tokens.grant(strTid, "Demo.File", "get", &jToken));

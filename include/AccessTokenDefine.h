@@ -9,11 +9,11 @@
 // The one database file. Every process of the machine that uses tokens uses this file.
 #define VEMO_ATOKEN_DB_PATH "/usr/vemo/etc/private/session/vemo-access-token.db"
 
-// The least length, in characters, of a token id that a caller brings along. Generated ids have
-// 127 to 255 characters, so they always pass.
+// The least length, in characters, of a token id that a caller chooses. Generated ids are long
+// enough: they have 127 to 255 characters.
 #define VEMO_ATOKEN_LENGTH_MIN 127
 
-// The uid that stands for no user, (uid_t)-1. No token is created for it.
+// The uid that means no user, (uid_t)-1. No token is created for it.
 #ifndef UID_ERR
 #define UID_ERR 4294967295U
 #endif

@@ -1,14 +1,14 @@
-// Utilities of the token model: the type table, validation, defaults, ids, times, the permission
-// test, and the two switches that say where log lines go.
+// Utilities for token records: the type table, validation, defaults, ids, times, the permission test,
+// and the two log switches.
 //
 // A token record is a Json::Value object with the nine fields tid, bind_sid, uid, deadline, count,
 // create_time, function, webapi_allow and extra (README has their table).
 //
-// Results: unless a function says otherwise, 0 is success and -1 is a failure that has written its
-// log line. Nothing throws but failed allocations (std::bad_alloc), unless said otherwise.
+// Results: 0 is success; -1 is a failure, which has written its log line. Functions with other results
+// or with exceptions other than std::bad_alloc say so.
 //
 // Threads: no function here takes a lock. All of them may run in several threads at once on
-// different records, provided that one call of tokenType() was made before the threads started.
+// different records. Call tokenType() once before the threads start.
 
 #ifndef VEMO_ACCESS_TOKEN_UTIL_H
 #define VEMO_ACCESS_TOKEN_UTIL_H
@@ -22,16 +22,16 @@
 namespace VEMO_ACCESS_TOKEN {
 
 // The process-wide type table: an object that maps each field to the array [type name, default].
-// Type names are "string", "long long" and "Json::objectValue". The table is built by the first
-// call, so its default of create_time is the time of that call for the rest of the process.
-// Never fails. The library owns the table, and callers only read it; it lives until the process
-// destroys its static objects: exit handlers registered ahead of the first call must not use it. The
-// very first call is not safe against another first call in a second thread.
+// Type names are "string", "long long" and "Json::objectValue". The first call builds the table, so
+// the default of create_time stays the time of that call.
+// Never fails. The library owns the table, and callers only read it. It is destroyed with the static
+// objects of the process, so exit handlers that were registered before the first call must not use it.
+// Two threads must not make the first call at the same time.
 VEMO_ATOKEN_EXPORT Json::Value& tokenType();
 
-// Checks the types of those members of jTokenParam that are token fields; members of other names
-// are accepted unseen, and missing ones are not missed. Stops at the first bad member.
-// Returns 0, or -1 when a member has a wrong type or jTokenParam is no object.
+// Checks the types of those members of jTokenParam that are token fields. Other members, and missing
+// fields, are fine. Stops at the first bad member.
+// Returns 0, or -1 when a member has a wrong type or jTokenParam is not an object.
 VEMO_ATOKEN_EXPORT int checkJsonType(Json::Value& jTokenParam);
 
 // Completes a record, or checks that it is complete. Members that are present are never changed,
@@ -42,9 +42,9 @@ VEMO_ATOKEN_EXPORT int checkJsonType(Json::Value& jTokenParam);
 VEMO_ATOKEN_EXPORT int fillDefaultValue(Json::Value& jToken, bool blCheck);
 
 // Makes a new token id of 127 to 255 characters, digits and ASCII letters, from the kernel's random
-// source. Uniqueness is not checked here; the table refuses a duplicate.
-// Returns 0 or more and replaces strTid, or a negative value with strTid unchanged (and no log
-// line) when the random source fails.
+// source. Uniqueness is not checked here; the database refuses a duplicate.
+// Returns 0 or more and sets strTid. When the random source fails, returns a negative value, leaves
+// strTid unchanged and writes no log line.
 VEMO_ATOKEN_EXPORT int tokenGenerate(std::string& strTid);
 
 // Sets now to the current time plus offsetSecond (which may be negative), in seconds since the
@@ -56,22 +56,22 @@ VEMO_ATOKEN_EXPORT int getTimeAfterNow(int offsetSecond, long& now);
 // Returns 0, or -1 with strTime unchanged.
 VEMO_ATOKEN_EXPORT int getTimeAfterNow(int offsetSecond, std::string& strTime);
 
-// Whether the record's webapi_allow lists a web API and its method. Names are compared byte by
-// byte. A null or empty szWebapiMethod asks for the API alone.
+// Decides whether the record's webapi_allow lists a web API and its method. Names are compared byte
+// by byte. A null or empty szWebapiMethod asks for the API alone.
 //   1   allowed
 //   0   the API is listed, the method is not
-//   -1  the API is not listed, szWebapiName is null or empty, or the record is malformed (only the
-//       last two write a log line outside debug mode)
+//   -1  the API is not listed, szWebapiName is null or empty, or the record is malformed (outside
+//       debug mode only the last two write a log line)
 // An element of a method array that cannot be read as a string throws Json::LogicError.
 VEMO_ATOKEN_EXPORT int checkPermission(Json::Value& jToken, const char* szWebapiName,
                                        const char* szWebapiMethod);
 
 // The log switches, both off when the library is loaded. true switches on, for the rest of the
-// process; false only reads, as the functions named ...Get do. All return the state after the call.
+// process; false changes nothing. The functions named ...Get only read. All return the current state.
 //   logToStdout: lines go to standard output instead of the system log (priority LOG_ERR).
-//   debugInfo: the lines that trace what is done are written as well. They carry whole records,
-//     token ids included.
-// Any thread may call them at any time; a thread that has not yet seen a switch logs the old way.
+//   debugInfo: lines that trace each step are written as well. They show whole records, token ids
+//     included.
+// Any thread may call them at any time; other threads may see the change a little later.
 VEMO_ATOKEN_EXPORT bool logToStdout(bool blOn);
 VEMO_ATOKEN_EXPORT bool logToStdoutGet();
 VEMO_ATOKEN_EXPORT bool debugInfo(bool blOn);

@@ -1,6 +1,5 @@
-// Access tokens, one call at a time: what most programs need, in C++17. The operations are the library's
-// (AccessTokenApi.h); each opens the database for itself, purges expired tokens first, and holds the lock of
-// all programs (CallLock.h) meanwhile.
+// Access tokens, one call at a time: what most programs need, in C++17. Each operation takes the lock that
+// all programs share (CallLock.h), opens the database, purges expired tokens, and calls AccessTokenApi.
 //
 //     const AccessTokens tokens;
 //     const std::string strTid = tokens.create(uid, "file-share", jOption);
@@ -12,26 +11,26 @@
 //     case AccessTokens::Answer::Failed: return askToTryAgain();
 //     }
 //
-// What an operation reports is what happened, also where it had to wait for the database. That holds as long
-// as all programs that share tokens take the lock, as those that use this class do. Beside one that does not,
-// a use can be granted twice, and a token can come back that was revoked (doc/concurrency.md).
+// The result of an operation is exact, also after a wait for the database, as long as all programs that share
+// tokens take the lock. A program that uses this class does. Beside one that does not, a use can be granted
+// twice, and a revoked token can come back (doc/concurrency.md).
 //
-// Arguments are only read. Texts count up to their first NUL.
+// Arguments are only read. Texts end at their first NUL.
 //
-// Errors: all operations but grant throw std::runtime_error when they did not do their work. It is a
-// std::system_error when the lock cannot be had; in any other case the library has written log lines that say
-// why. Besides, as AccessTokenApi.h says: Json::LogicError for a member of an argument that cannot be
-// converted, std::bad_alloc.
+// Errors: except for grant, an operation that did not do its work throws std::runtime_error. It is a
+// std::system_error when the lock was not available; otherwise the library's log lines say why. There are
+// also Json::LogicError, for a member of an argument that cannot be converted, and std::bad_alloc.
 //
-// Time: an operation waits for the lock as long as the object says, and then up to 5 seconds with each
-// statement for a database that a program without the lock keeps locked.
+// Time: an operation waits for the lock, at most as long as the constructor was told. Then each statement
+// waits up to 5 seconds for a database that a program without the lock keeps locked.
 //
 // Threads and processes: any number of threads may use an object at once, and take turns. The process needs
-// effective uid 0 during each operation, calls VEMO_ACCESS_TOKEN::tokenType() once before it starts threads,
-// and holds no CallLock of its own meanwhile: it would wait for itself. Nothing is kept between operations,
-// so a child of fork() may use the object too, unless its parent has several threads.
+// effective uid 0 during each operation. It calls VEMO_ACCESS_TOKEN::tokenType() once before it starts
+// threads. A thread that holds a CallLock must not call an operation: it would wait for itself. Nothing is
+// kept between operations, so a child of fork() may use the object too, unless its parent has several
+// threads.
 //
-// All of this is compiled into the program; the library exports nothing for it.
+// This class is compiled into the program; the library exports nothing for it.
 
 #ifndef VEMO_ACCESS_TOKENS_H
 #define VEMO_ACCESS_TOKENS_H
@@ -53,51 +52,50 @@
 
 class AccessTokens {
 public:
-    // What comes of a grant.
+    // The result of a grant.
     enum class Answer {
-        Granted, // the token opens the call, and one use of it is spent
-        Refused, // it does not, has expired, or there is none; nothing is spent
-        Failed,  // nobody knows, because the lock or the store failed; see grant
+        Granted, // the token allows the call, and one use of it is spent
+        Refused, // the token does not allow it, has expired, or does not exist; nothing is spent
+        Failed,  // undecided, because the lock or the database failed; see grant
     };
 
-    // wait: for the lock, at most.
+    // An operation waits for the lock as long as wait says, and then fails.
     explicit AccessTokens(std::chrono::milliseconds wait = std::chrono::seconds(5)) : m_wait(wait) {}
 
-    // Creates a token for the user uid (not UID_ERR) and the purpose strFunction (not empty), and returns its
-    // id: a credential. jOption is null or an object, as for AccessTokenApi::tokenCreateByTid; its deadline
-    // is in seconds from now.
+    // Creates a token for the user uid (not UID_ERR) and the purpose strFunction (not empty). Returns its id,
+    // which is a credential. jOption is null or an object, as for AccessTokenApi::tokenCreateByTid; its
+    // deadline is in seconds from now.
     std::string create(unsigned int uid, const std::string& strFunction,
                        const Json::Value& jOption = Json::Value()) const;
 
-    // Whether the bearer of strTid may call strMethod of the web API strApi; an empty method asks for the API
-    // alone. A grant spends one use, and the last use deletes the token.
+    // Decides whether the bearer of strTid may call strMethod of the web API strApi; an empty method asks for
+    // the API alone. A grant spends one use, and the last use deletes the token.
     //
-    // When granted, pToken, if not null, receives the record with the uses that are left (after the last use
-    // it still shows the count before it); otherwise it keeps what it holds.
+    // After a grant *pToken is the record with the uses that are left (after the last use it still shows the
+    // count before it). After any other answer it is unchanged. pToken may be null.
     //
-    // Failed never means that the token opens the call. It is logged. No use is spent, unless the store fails
-    // to be written and then also to be read.
+    // Failed is logged, and the call must not be allowed. No use is spent, unless the database could first
+    // not be written and then not be read either.
     Answer grant(const std::string& strTid, const std::string& strApi, const std::string& strMethod = "",
                  Json::Value* pToken = nullptr) const;
 
-    // The record of a token, or nothing where there is none. Spends nothing.
+    // Returns the record of a token, or nothing when there is no such token. Spends no use.
     std::optional<Json::Value> lookup(const std::string& strTid) const;
 
-    // Replaces those fields of a token that are members of the object jChange, each as a whole; the deadline
-    // is in seconds since the epoch here. Returns whether there is such a token. The id cannot be changed:
-    // std::invalid_argument.
+    // Replaces those fields of a token that are members of the object jChange, each as a whole. Here the
+    // deadline is in seconds since the epoch. Returns whether there is such a token. Throws
+    // std::invalid_argument when jChange has a tid: the id cannot be changed.
     bool update(const std::string& strTid, const Json::Value& jChange) const;
 
-    // Deletes a token. Returns whether there was one.
+    // Deletes a token. Returns whether it existed.
     bool revoke(const std::string& strTid) const;
 
-    // Delete the tokens of a login session or of a purpose, neither of which is empty. There is none left
-    // when they return.
+    // Delete all tokens of a login session, or of a purpose. The argument must not be empty.
     void revokeSession(const std::string& strSid) const;
     void revokeFunction(const std::string& strFunction) const;
 
 private:
-    // Calls use(AccessTokenApi&) under the lock, when expired tokens have been purged.
+    // Takes the lock, purges expired tokens, and calls use(AccessTokenApi&).
     template <typename Use>
     auto run(Use use) const
     {
@@ -107,8 +105,8 @@ private:
         return use(api);
     }
 
-    // The result of a call that may be made twice. The library reports a failure where a call had to wait for
-    // the database, although it took effect; the second one has nothing to wait for any more.
+    // Makes a call, and makes it again if it fails. After a wait for the database the library reports a
+    // failure although the call took effect; the second call no longer has to wait.
     template <typename Call>
     static int settled(Call call)
     {
@@ -123,7 +121,7 @@ private:
         }
     }
 
-    // The record of a token, or nothing where there is none. One that has expired is none, also where it
+    // Returns the record of a token, or nothing when there is no such token, or when it has expired but
     // could not be purged.
     static std::optional<Json::Value> find(AccessTokenApi& api, std::string& strTid)
     {
@@ -136,8 +134,8 @@ private:
         return jToken;
     }
 
-    // What is malformed opens nothing.
-    static bool opens(Json::Value& jToken, const char* szApi, const char* szMethod)
+    // Whether the token allows the call. A malformed token allows nothing.
+    static bool allows(Json::Value& jToken, const char* szApi, const char* szMethod)
     {
         try {
             return 0 < VEMO_ACCESS_TOKEN::checkPermission(jToken, szApi, szMethod);
@@ -146,8 +144,8 @@ private:
         }
     }
 
-    // Whether a grant that the library reports as failed has spent a use all the same: nobody else has
-    // written since jToken was read. Lowers the count in it, too.
+    // Whether a grant that the library reported as failed has spent a use after all. The count in the
+    // database tells, because nobody else has written since jToken was read. Lowers the count in jToken too.
     static bool isSpent(AccessTokenApi& api, std::string& strTid, Json::Value& jToken)
     {
         const Json::Int64 nBefore = jToken["count"].asInt64();
@@ -166,7 +164,7 @@ private:
                             Json::Value* pToken)
     {
         std::optional<Json::Value> jToken = find(api, strTid);
-        if (!jToken || !opens(*jToken, szApi, szMethod)) {
+        if (!jToken || !allows(*jToken, szApi, szMethod)) {
             return Answer::Refused;
         }
         require(0 == api.tokenGrant(strTid, szApi, szMethod, *jToken) || isSpent(api, strTid, *jToken),
@@ -177,7 +175,7 @@ private:
         return Answer::Granted;
     }
 
-    // Writes a line of the library's kind to where the library writes them.
+    // Writes a line in the library's form, to where the library writes its own.
     static void log(const char* szText)
     {
         if (VEMO_ACCESS_TOKEN::logToStdoutGet()) {
@@ -198,7 +196,7 @@ inline std::string AccessTokens::create(unsigned int uid, const std::string& str
     std::string strFunctionCopy = strFunction;
     Json::Value jOptionCopy = jOption;
     run([&](AccessTokenApi& api) {
-        // Nobody else knows the id, so a token under it is this one.
+        // Nobody else knows the id, so a token that has it is this one.
         Json::Value jToken;
         require(0 <= api.tokenCreateByTid(uid, strFunctionCopy, jOptionCopy, strTid) ||
                     0 < settled([&] { return api.tokenGetByTid(strTid, jToken); }),

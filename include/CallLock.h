@@ -3,9 +3,9 @@
 //     CallLock lock;
 //     const int nResult = VemoAccessTokenGrantEx(strTid, "Example.File", "get", jToken);
 //
-// All programs that share tokens must do so, with the same file. Then a token of N uses is granted exactly
-// N times, no call fails because of a lock, none fails and yet takes effect, and no deletion is undone.
-// vemo-access-token, the administrator's tool, does.
+// When all programs that share tokens do so, with the same file, a token of N uses is granted exactly N
+// times, no call fails because of another, and no deletion is undone. The administrator's tool takes this
+// lock too. doc/concurrency.md says what to observe with threads, fork() and log lines.
 
 #ifndef CALL_LOCK_H
 #define CALL_LOCK_H
@@ -21,15 +21,15 @@
 
 class CallLock {
 public:
-    // The one lock file. Every program of the machine that uses tokens takes this lock.
+    // The lock file for all programs of the machine that use tokens.
     static constexpr const char* FILE_OF_ALL = "/run/vemo-access-token.lock";
 
-    // Waits until no other object holds the lock, in this process or another: never hold two. Throws
-    // std::system_error when the lock cannot be had; then the call must not be made.
+    // Takes the lock, and waits while any other object holds it, in this process or another: a thread that
+    // takes it twice waits for ever. Throws std::system_error on failure; then the call must not be made.
     //
-    // The file stands in a directory that only root may write. It is made where it is missing. It must never
-    // be the database, and must never be deleted. A file that others than its owner may open, or that belongs
-    // to another than the effective user, is refused (EPERM): others could hold the lock for ever.
+    // A missing file is created. Its directory must be one that only root may write. The file must not be
+    // the database, and must never be deleted. A file that the effective user does not own, or that anybody
+    // else may open, is refused with EPERM: others could hold the lock for ever.
     explicit CallLock(const char* szFile = FILE_OF_ALL) : m_nFile(openFile(szFile))
     {
         while (0 != flock(m_nFile, LOCK_EX)) {
@@ -39,7 +39,7 @@ public:
         }
     }
 
-    // The same, but waits so long at most, and then throws ETIMEDOUT. Signals shorten the wait.
+    // Does the same, but throws ETIMEDOUT after waiting as long as wait says. Signals shorten the wait.
     CallLock(const char* szFile, std::chrono::milliseconds wait) : m_nFile(openFile(szFile))
     {
         for (auto left = wait; 0 != flock(m_nFile, LOCK_EX | LOCK_NB); left -= TRY_AGAIN_AFTER) {
@@ -53,8 +53,7 @@ public:
         }
     }
 
-    // Lets the next one have it. Unlocks by name: closing would leave the lock to a child that was forked
-    // meanwhile.
+    // Frees the lock. Closing the file is not enough: a child that was forked meanwhile would keep the lock.
     ~CallLock()
     {
         flock(m_nFile, LOCK_UN);
@@ -87,7 +86,7 @@ private:
     [[noreturn]] static void closeAndThrow(int nFile, const char* szFile)
     {
         const std::system_error error(errno, std::generic_category(), szFile);
-        close(nFile); // or nothing, of -1
+        close(nFile); // -1, of a file that could not be opened, does no harm
         throw error;
     }
 

@@ -25,7 +25,8 @@ int VEMORandomBase::random(int nMin, int nMax)
     if (0 > nMin || nMin > nMax) {
         return failInvalid();
     }
-    // A draw from the incomplete last run of nChoices would favour its first members.
+    // The range of a draw need not be a multiple of nChoices. A draw above the last multiple is made again:
+    // it would make the lowest numbers more likely.
     const uint64_t nChoices = static_cast<uint64_t>(nMax - nMin) + 1;
     const uint64_t nLimit = std::numeric_limits<uint64_t>::max() / nChoices * nChoices;
     uint64_t nDraw = 0;
@@ -43,7 +44,7 @@ int VEMORandomBase::getString(const std::string& strAlphabet, unsigned int cchLe
         return failInvalid();
     }
     const unsigned int nChoices = static_cast<unsigned int>(strAlphabet.size());
-    const unsigned int nLimit = 256 / nChoices * nChoices; // as in random(), one byte a draw
+    const unsigned int nLimit = 256 / nChoices * nChoices; // as in random(); a draw is one byte here
     std::string strResult;
     strResult.reserve(cchLength);
     unsigned char rgDraw[256];

@@ -9,25 +9,25 @@
 namespace VEMO {
 namespace RANDOM {
 
-// Random numbers and strings from any source of random bytes; every outcome equally likely.
+// Random numbers and strings from any source of random bytes. All results are equally likely.
 class VEMORandomBase {
 public:
     virtual ~VEMORandomBase() = default;
 
-    // A number from nMin to nMax, both included, 0 <= nMin <= nMax. Returns -1 with errno set when
+    // Returns a number from nMin to nMax, both included, 0 <= nMin <= nMax; or -1 with errno set when
     // the source fails or the bounds are wrong.
     int random(int nMin, int nMax);
 
-    // Sets strOut to cchLength characters of strAlphabet (1 to 256 characters, each as likely as it
-    // is frequent there). Returns 0; or -1 with errno set, when strOut is as it was.
+    // Sets strOut to cchLength characters of strAlphabet, which has 1 to 256 characters. Returns 0; or -1
+    // with errno set, and leaves strOut unchanged.
     int getString(const std::string& strAlphabet, unsigned int cchLength, std::string& strOut);
 
 protected:
-    // Fills a buffer with random bytes. Returns false, with errno set, when there are none.
+    // Fills a buffer with random bytes. Returns false, with errno set, on failure.
     virtual bool fill(void* pBuffer, size_t cbBuffer) = 0;
 };
 
-// The kernel's random source. Objects share nothing and may be used by one thread each.
+// The kernel's random source. One thread at a time may use an object.
 class VEMORandom : public VEMORandomBase {
 protected:
     bool fill(void* pBuffer, size_t cbBuffer) override;

@@ -35,7 +35,7 @@ int VEMOUserGetByUID(uid_t uid, VEMOUser** ppUser)
         return fail(0 == nError ? ENOENT : nError);
     }
 
-    // The name stands behind its record, in one piece of memory.
+    // One piece of memory holds the record and, after it, the name.
     const size_t cbName = strlen(pEntry->pw_name) + 1;
     char* pMemory = new (std::nothrow) char[sizeof(VEMOUser) + cbName];
     if (!pMemory) {

@@ -10,12 +10,11 @@ struct VEMOUser {
 };
 
 // Looks up the user of a uid. *ppUser receives a new record, to be released with VEMOUserFree.
-// Returns 0; or -1 with errno set, and *ppUser as it was. errno is the error of getpwuid_r; where that
-// tells no error, and finds no user either, it is ENOENT.
-// Threads: may run in several threads at once.
+// Returns 0; or -1 with errno set, and leaves *ppUser unchanged. errno is the error of getpwuid_r, or
+// ENOENT when there is no such user. May run in several threads at once.
 int VEMOUserGetByUID(uid_t uid, VEMOUser** ppUser);
 
-// Releases a record; null is fine.
+// Releases a record, or nothing for null.
 void VEMOUserFree(VEMOUser* pUser);
 
 #endif

@@ -41,13 +41,13 @@ AccessTokenApi::AccessTokenApi() : m_pDb(new (std::nothrow) AccessTokenDbApi())
         VEMO_ATOKEN_LOG("new AccessTokenDbApi failed", VEMO_ATOKEN_HERE);
         return;
     }
-    // A failure is reported by the first operation, which tries again if there is no handle yet.
+    // The first operation reports a failure. It tries again when there is no handle yet.
     m_pDb->initDb();
 }
 
 AccessTokenApi::~AccessTokenApi()
 {
-    // A caller may have a failure of its last operation still to report.
+    // The caller may still have to report errno of its last operation.
     const ErrnoKeeper keeper;
     if (m_pDb) {
         m_pDb->freeDb();
@@ -69,7 +69,7 @@ int AccessTokenApi::tokenCreateByTid(unsigned int& uid, std::string& strFunction
     jParam["uid"] = uid;
     jParam["function"] = strFunction;
     jParam["create_time"] = static_cast<Json::Int64>(time(nullptr));
-    // The option is a lifetime, and no value of it is spared the addition: -1 has already expired.
+    // The option is a lifetime in seconds. -1 is not special: the token has already expired.
     if (jParam.isMember("deadline")) {
         jParam["deadline"] =
             static_cast<Json::Int64>(jParam["deadline"].asInt()) + jParam["create_time"].asInt();
@@ -80,7 +80,7 @@ int AccessTokenApi::tokenCreateByTid(unsigned int& uid, std::string& strFunction
     VEMO_ATOKEN_CHECK_GOTO(0 > fillDefaultValue(jParam, false), Error);
     VEMO_ATOKEN_CHECK_GOTO(0 > checkJsonType(jParam), Error);
     VEMO_ATOKEN_CHECK_GOTO(!m_pDb, Error);
-    // Written before the store is asked, so also ahead of a creation that the store then refuses.
+    // Written before the store is called, so also when the store then refuses the token.
     VEMO_ATOKEN_DEBUG("create token ok, token=%s", VEMO_ATOKEN_HERE, toString(jParam).c_str());
     VEMO_ATOKEN_CHECK_GOTO(0 > m_pDb->tokenCreate(jParam), Error);
     return 0;
@@ -109,7 +109,7 @@ int AccessTokenApi::tokenList(Json::Value& jFilter, Json::Value& jTokenArrayOut)
 {
     VEMO_ATOKEN_CHECK_RETURN(jFilter.type() != Json::objectValue && jFilter.type() != Json::nullValue, -1);
     if (jFilter.isNull()) {
-        // The store takes objects only, and the caller's filter stays null.
+        // The store accepts objects only. The caller's filter stays null.
         Json::Value jAll(Json::objectValue);
         return tokenList(jAll, jTokenArrayOut);
     }
@@ -168,7 +168,7 @@ int AccessTokenApi::tokenUpdateByTid(std::string& strTid, Json::Value& jParam)
         return 0;
     }
 
-    // The tid is a field like any other: with a new one, a copy is saved and the old row stays.
+    // The tid is a field like any other: a new one saves a copy, and the old row stays.
 #define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
     if (jParam.isMember(#name)) {                                                                            \
         VEMO_ATOKEN_DEBUG("overwrite token[%s]", VEMO_ATOKEN_HERE_IN_LIST, #name);                           \
@@ -324,7 +324,7 @@ int AccessTokenApi::tokenCountDegrade(Json::Value& jToken)
         VEMO_ATOKEN_CHECK_GOTO(0 > tokenSaveByOverwrite(jToken), Error);
         return 0;
     }
-    // A count of 0 is one last use, like 1.
+    // Both 0 and 1 mean one last use.
     VEMO_ATOKEN_CHECK_GOTO(!jToken.isMember("tid"), Error);
     VEMO_ATOKEN_CHECK_GOTO(jToken["tid"].type() != Json::stringValue, Error);
     strTid = jToken["tid"].asString();

@@ -44,7 +44,7 @@ int VemoAccessTokenGrantEx(std::string& strTid, const char* szWebapiName, const 
     return api.tokenGrant(strTid, szWebapiName, szWebapiMethod, jToken);
 }
 
-// The grant comes first: a name that cannot be had or does not fit gives no use back.
+// The grant comes first: when the name is unknown or does not fit, the use stays spent.
 int VemoAccessTokenGrant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
                          char* szUser, size_t cbUser)
 {
@@ -60,7 +60,7 @@ int VemoAccessTokenGrant(std::string& strTid, const char* szWebapiName, const ch
     const int nLookup = VEMOUserGetByUID(static_cast<uid_t>(jToken["uid"].asInt64()), &pUser);
     const std::unique_ptr<VEMOUser, UserDeleter> pOwner(pUser);
     VEMO_ATOKEN_CHECK_RETURN_AS(0 > nLookup, "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)", -1);
-    VEMO_ATOKEN_CHECK_RETURN(!pUser, -1); // a platform may answer so for an unknown user
+    VEMO_ATOKEN_CHECK_RETURN(!pUser, -1); // a platform's way to say that the user is unknown
     // clang-format off
     VEMO_ATOKEN_CHECK_RETURN((int)cbUser <= snprintf(szUser,cbUser, "%s", pUser->szName), -1);
     // clang-format on
@@ -74,7 +74,7 @@ int VemoAccessTokenDeleteByTid(std::string& strTid)
     return api.tokenDeleteByTid(strTid);
 }
 
-// The one operation that leaves expired tokens to the next call.
+// The only operation that does not purge expired tokens first.
 int VemoAccessTokenDeleteByBindSid(const char* szSid)
 {
     AccessTokenApi api;

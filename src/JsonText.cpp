@@ -36,12 +36,12 @@ std::unique_ptr<Json::CharReader> makeReader()
 std::unique_ptr<std::ostringstream> makeStream()
 {
     auto pStream = std::make_unique<std::ostringstream>();
-    // A stream would hide that its memory ran out, and the text would be cut short.
+    // Without this the stream would cut the text short when memory runs out, and report nothing.
     pStream->exceptions(std::ios_base::badbit);
     return pStream;
 }
 
-// A writer and a reader, which cost more to make than a token's texts to write and to read.
+// A writer and a reader. To make them costs more than to write and to read a token.
 class Codec {
 public:
     Codec() : m_pWriter(makeWriter()), m_pReader(makeReader()) {}
@@ -62,11 +62,11 @@ public:
     void read(std::string_view strText, Json::Value& jValue)
     {
         try {
-            // A text is bad when it is so twice: the reader takes a number for none when memory runs out.
+            // Parsed twice before it counts as bad: when memory runs out, the reader rejects valid numbers.
             parse(strText, jValue) || parse(strText, jValue);
         } catch (const Json::RuntimeError& error) {
-            // Nested beyond the reader's limit: what was read stands, as after any other bad text. The
-            // same exception says that memory ran out, and then half a value must not pass for the whole.
+            // A text with too many levels is bad, and what was read of it is kept. The same exception can
+            // mean that memory ran out, and then half a value must not pass for the whole one.
             if (!strstr(error.what(), "stackLimit")) {
                 throw;
             }
@@ -87,19 +87,19 @@ private:
     std::unique_ptr<std::ostringstream> m_pStream;
 };
 
-// What threads keep their codecs under. (A thread_local object has to be registered for its destruction, and
-// when there is no memory for that the C library ends the process.)
+// The key of the per-thread codec. (For a thread_local object the C library registers a destructor, and ends
+// the process when there is no memory for that.)
 pthread_key_t codecKey()
 {
     static const pthread_key_t key = [] {
-        pthread_key_t made = PTHREAD_KEYS_MAX; // what it stays when the process has no key left: none
+        pthread_key_t made = PTHREAD_KEYS_MAX; // not a key, and stays so when the process has no key left
         pthread_key_create(&made, [](void* pCodec) { delete static_cast<Codec*>(pCodec); });
         return made;
     }();
     return key;
 }
 
-// The codec of this thread, made at its first use; where a thread cannot keep one, a codec for this use.
+// This thread's codec, made at its first use. When the thread cannot keep it, each use has its own codec.
 class ThreadCodec {
 public:
     ThreadCodec() : m_pCodec(static_cast<Codec*>(pthread_getspecific(codecKey())))
@@ -126,7 +126,7 @@ namespace VEMO_ACCESS_TOKEN {
 std::string toString(const Json::Value& jValue)
 {
     if (jValue.isObject() && jValue.empty()) {
-        return "{}"; // what most tokens hold in a field
+        return "{}"; // the most frequent value
     }
     const ErrnoKeeper keeper;
     return ThreadCodec()->write(jValue);

@@ -19,7 +19,7 @@ struct TypeCheck {
     bool (Json::Value::*pAccepts)() const;
 };
 
-// More types than the field list uses today, so that a field of any of them can be added to it.
+// These are more types than the fields have today, so that fields of any of them can be added.
 const TypeCheck g_rgTypeCheck[] = {
     {"int", &Json::Value::isIntegral},
     {"long long", &Json::Value::isIntegral},
@@ -187,7 +187,7 @@ int checkPermission(Json::Value& jToken, const char* szWebapiName, const char* s
         goto Error;
     }
 
-    // An API that is listed allows every method to a caller who names none, whatever its entry is.
+    // A caller who names no method only asks whether the API is listed, whatever its entry is.
     if (!szWebapiMethod || !szWebapiMethod[0]) {
         return 1;
     }

@@ -1,7 +1,7 @@
 #!/usr/bin/python3
 """Asks the gate: grant.py API METHOD, with the token's id on standard input.
 
-Prints the user whom the token belongs to, and ends with 0; with 1 when it is refused, 2 when there is no answer.
+Prints the token's user, and ends with 0; with 1 when the call is refused, and with 2 when there is no answer.
 """
 import http.client
 import os

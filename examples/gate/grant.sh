@@ -1,7 +1,7 @@
 #!/bin/sh
-# Asks the gate: grant.sh API METHOD, with the token's id on standard input. Prints the user whom the token belongs to,
-# as the header has it, and ends with 0; with 1 when it is refused, and with 2 when there is no answer.
-# The id comes by standard input all the way: command lines are there for all to read.
+# Asks the gate: grant.sh API METHOD, with the token's id on standard input. Prints the token's user, as in the header,
+# and ends with 0; with 1 when the call is refused, and with 2 when there is no answer.
+# curl gets the id on standard input too, because everybody can read command lines.
 socket=${GATE_SOCKET:-/run/vemo-access-token-gate/calls.sock}
 read -r id
 answer=$(printf 'Authorization: Bearer %s\n' "$id" | curl --silent --max-time 3 --unix-socket "$socket" \

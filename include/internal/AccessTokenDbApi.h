@@ -1,18 +1,17 @@
-// The token store: one SQLite connection and the statements that are run over it. The service
-// (AccessTokenApi.h) is the ordinary way in; this class is for what the service lacks.
+// The token store: one SQLite connection and the statements that run on it. Most callers use the
+// service (AccessTokenApi.h); this class is for what the service does not offer.
 //
-// Results: 0 or more is success and -1 a failure that has written its log lines, unless a member
-// says otherwise. Filters are described in README. The arguments named ...Out are results; all
-// others are only read.
+// Results: 0 or more is success; -1 is a failure, which has written its log lines. Members with other
+// results say so. README describes filters. Arguments named ...Out are results; all others are only
+// read.
 //
 // A statement that succeeds after waiting for a lock leaves "database is locked" in m_strErr. The
-// operations on tokens then report -1 although the statement took effect; that is how this store
-// has always answered, and callers rely on it.
+// operations on tokens then report -1 although the statement took effect. Callers depend on it.
 //
-// Exceptions: Json::LogicError for a filter or record member of a type that its use cannot convert,
+// Exceptions: Json::LogicError for a member of a filter or record that cannot be converted, and
 // std::bad_alloc.
 //
-// Threads and processes: an object serves one thread at a time. initDb changes the effective uid of
+// Threads and processes: one thread at a time may use an object. initDb changes the effective uid of
 // the whole process for a moment. Processes share the database file through SQLite's file locks.
 
 #ifndef VEMO_ACCESS_TOKEN_DB_API_H
@@ -40,41 +39,42 @@ public:
 
     // Connection and statements
 
-    // Opens the database file with effective uid 0 and puts the effective uid back; creates the file
-    // with mode 0700 and the table when there is no file. Does nothing when open.
-    // Returns -1 when effective uid 0, the file, its mode or the opening fails. A table that could
-    // not be created is logged and returns 0. After a failed opening by SQLite the effective uid
-    // stays 0, and the object counts as open: its statements then fail.
+    // Opens the database file with effective uid 0, and then restores the effective uid. Creates the
+    // file, with mode 0700, and the table when there is no file. Does nothing when open.
+    // Returns -1 when the uid cannot be set, or the file cannot be created or opened. A table that
+    // cannot be created is logged, and the result is 0. After a failed opening by SQLite the effective
+    // uid stays 0, and the object counts as open: its statements then fail.
     int initDb();
 
     // Sets strSql to the statement that creates the table. Returns 0.
     int SqlExpandCreateTable(std::string& strSql);
 
-    // Creates the table if it is missing, for a file that was made without it. Returns 0 or -1.
+    // Creates the table in a database that lacks it. Returns 0 or -1.
     int createTable();
 
-    // Runs a statement on the open connection. While the database is locked by others it tries
-    // again, 500 times with 10 ms between. callback is sqlite3_exec's, called for each row with arg;
-    // it must not throw.
-    // Returns 0 with a callback, the number of changed rows without; or -1 with the reason in
+    // Runs a statement on the open connection. While others lock the database it tries again, 500
+    // times in all, 10 ms apart. callback is that of sqlite3_exec, called with arg for each row; it
+    // must not throw.
+    // Returns 0 with a callback, the number of changed rows without; or -1, with the reason in
     // m_strErr.
     int runSqlEx(std::string strSql, int (*callback)(void*, int, char**, char**), void* arg);
 
-    // Opens the database if need be, empties m_strErr and runs m_strSql as runSqlEx does.
+    // Opens the database if it is closed, empties m_strErr and runs m_strSql as runSqlEx does.
     int runSql(int (*callback)(void*, int, char**, char**), void* arg);
     int runSql();
 
-    // Closes the connection. Returns 0 always; if SQLite refuses, the connection stays open.
+    // Closes the connection. If SQLite refuses, the connection stays open. Returns 0 always.
     int freeDb();
 
-    // Deletes the tokens whose deadline lies before now; a deadline of -1 does. blLog false leaves
-    // this operation's own failure line to debug mode. Returns 0, not a number, or -1.
+    // Deletes the tokens whose deadline lies before now, as a deadline of -1 does. With blLog false the
+    // operation writes its own failure line in debug mode only. Returns 0 whatever the number of
+    // tokens deleted, or -1.
     int cleanExpireToken(bool blLog);
 
     // Saving
 
     // Writes a record that has all nine fields: blCreate true inserts it and fails when the tid
-    // exists, false replaces the row of that tid or inserts it. Types are the caller's business.
+    // exists, false replaces the row of that tid or inserts it. The caller has checked the types.
     // Returns 0 or -1.
     int tokenSave(Json::Value& jParam, bool blCreate);
     int tokenCreate(Json::Value& jParam); // the same as tokenSave(jParam, true)
@@ -87,40 +87,40 @@ public:
     // Filters as SQL
     //
     // All append to strSqlWhereOut; what they appended before a failure stays.
-    // Values of text and JSON fields are quoted and escaped. Those of number fields are not quoted,
-    // whatever their type: a string there becomes part of the statement.
+    // Values of text and JSON fields are quoted and escaped. Values of number fields are not quoted,
+    // whatever their type, so a string becomes part of the statement.
 
-    // The condition made of the filter's token fields, joined by "and" or "or". Returns 0, 1 when
-    // the filter names no token field (nothing is appended), or -1.
+    // Appends the condition made of the filter's token fields, joined by "and" or "or". Returns 0; 1
+    // when the filter names no token field (nothing is appended); or -1.
     int SqlWhereFromJson(Json::Value& jTokenParam, std::string& strSqlWhereOut, bool bAnd);
 
-    // One field's condition: equality with the value jParam, or membership of the array jList, where an
-    // empty one appends nothing. Return 0, or -1, also when the name is that of no token field.
+    // Append one field's condition: equal to jParam, or one of the array jList (nothing for an empty
+    // one). Return 0, or -1, also when no token field has that name.
     int SqlMakeByMatchField(std::string& strField, Json::Value& jParam, std::string& strSqlWhereOut);
     int SqlMakeByListField(const char* szField, Json::Value& jList, std::string& strSqlWhereOut);
 
-    // The filter's sort_by, sort_direction, limit and offset. Returns 0 or -1.
+    // Appends the filter's sort_by, sort_direction, limit and offset. Returns 0 or -1.
     int SqlFilterConditionFromJson(Json::Value& jFilter, std::string& strSqlWhereOut);
 
     // Reading and deleting
 
-    // Appends the records that the filter selects to jTokenArrayOut, an array or null. Returns 0;
-    // or -1, when jTokenArrayOut may hold some of them and must not be used.
+    // Appends the records that the filter selects to jTokenArrayOut, an array or null. Returns 0; or -1,
+    // and then jTokenArrayOut may hold some of the records and must not be used.
     int tokenGet(Json::Value& jTokenParam, Json::Value& jTokenArrayOut);
 
-    // Sets jTokenOut to the first record whose field szName equals strValue and returns 1, or to an
-    // empty object and returns 0 when there is none, -1 when the query fails. Without a name or a
-    // value it returns -1 and leaves jTokenOut. A szName that is no token field selects every token.
+    // Looks for a record whose field szName equals strValue. Returns 1 and sets jTokenOut to the first
+    // one; 0 and sets jTokenOut to an empty object when there is none; or -1, also for an empty name or
+    // value, when jTokenOut is unchanged. A szName that is not a token field selects every token.
     int tokenGetOne(const char* szName, std::string& strValue, Json::Value& jTokenOut);
 
-    // Deletes what the filter's fields select; sort_by, limit and so on have no effect. A filter
-    // without fields deletes all when bAll is true and is refused when it is false.
+    // Deletes the tokens that the filter's fields select; sort_by, limit and so on have no effect. A
+    // filter without fields deletes all tokens when bAll is true, and fails when it is false.
     // Returns the number of tokens deleted, or -1.
     int tokenDelete(Json::Value& jTokenParam, bool bAll);
 
     // State
     //
-    // For callers to read, but for m_strSql, which is set ahead of runSql.
+    // Callers only read it, except that they set m_strSql before runSql.
 
     sqlite3* m_pDb;       // the connection; null when closed
     std::string m_strSql; // the statement that runSql runs, or ran last

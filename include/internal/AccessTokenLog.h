@@ -6,16 +6,16 @@
 //   VEMO_ATOKEN_FAILED(szCondition, location)      the failure line of a condition that held
 //   VEMO_ATOKEN_CHECK_RETURN(condition, result)    if it holds: failure line, return result
 //   VEMO_ATOKEN_CHECK_GOTO(condition, label)       if it holds: failure line, jump to label
-//   VEMO_ATOKEN_CHECK_RETURN_AS, ..._GOTO_AS       the same with the text of the condition as second
-//                                                  argument, where the log has always shown another
+//   VEMO_ATOKEN_CHECK_RETURN_AS, ..._GOTO_AS       the same; the second argument is the text of the
+//                                                  condition in the log, where it differs from the code
 //
-// message is a literal without the closing newline; location is VEMO_ATOKEN_HERE or, in code
+// message is a literal without the newline at its end; location is VEMO_ATOKEN_HERE or, in code
 // expanded from the field list, VEMO_ATOKEN_HERE_IN_LIST. Conditions are evaluated once, in every
-// build, and are logged exactly as they are written; so their blanks are part of the log. Arguments
-// are evaluated only when the line is written.
+// build, and are logged exactly as they are written, blanks included. Arguments are evaluated only
+// when the line is written.
 //
-// A failure line tells errno as the failed call left it: writing a line preserves errno, and so must
-// whatever stands among a line's arguments or between a failure and its line.
+// A failure line shows errno as the failed call left it. So writing a line preserves errno, and so must
+// the arguments of a line, and all code between a failure and its line.
 
 #ifndef VEMO_ACCESS_TOKEN_LOG_H
 #define VEMO_ACCESS_TOKEN_LOG_H
@@ -29,16 +29,16 @@
 
 namespace VEMO_ACCESS_TOKEN {
 
-// printf and syslog themselves: the system headers of a hardened build would replace them by
-// __printf_chk and __syslog_chk, and callers who interpose the plain names would miss the lines.
+// printf and syslog by their plain names. The system headers of a hardened build would call __printf_chk
+// and __syslog_chk instead, and a caller who interposes the plain names would miss the lines.
 extern "C" int logPrintf(const char* szFormat, ...) __asm__("printf") __attribute__((cold));
 extern "C" void logSyslog(int nPriority, const char* szFormat, ...) __asm__("syslog") __attribute__((cold));
 
-// Never defined: lets the compiler compare a message with its arguments. (logPrintf cannot carry
-// the attribute, since ISO C++ knows no "%m".)
+// Never defined: it only lets the compiler check a message against its arguments. (logPrintf cannot have
+// the attribute, because ISO C++ has no "%m".)
 int checkFormat(const char* szFormat, ...) __attribute__((format(printf, 1, 2)));
 
-// The format of a line in the system log, which shows errno in front of the message when there is one.
+// The format of a line in the system log. When errno is set, it stands in front of the message.
 inline const char* syslogFormat(const char* szWithErrno, const char* szWithoutErrno)
 {
     return 0 != errno ? szWithErrno : szWithoutErrno;
@@ -47,7 +47,7 @@ inline const char* syslogFormat(const char* szWithErrno, const char* szWithoutEr
 // Writes the line of VEMO_ATOKEN_FAILED.
 void logFailed(const char* szCondition, const char* szFile, int nLine) __attribute__((cold));
 
-// What stands in a log line for text that may be missing.
+// A text for a log line, or "(null)" when there is none.
 inline const char* textOrNull(const char* szText)
 {
     return szText ? szText : "(null)";
@@ -87,7 +87,7 @@ inline const char* textOrNull(const char* szText)
         }                                                                                                    \
     } while (0)
 
-// Failure lines carry the location twice and end in two newlines.
+// A failure line shows the location twice and ends in two newlines.
 #define VEMO_ATOKEN_FAIL(message, ...)                                                                       \
     do {                                                                                                     \
         VEMO_ATOKEN_CHECK_FORMAT(message, __VA_ARGS__);                                                      \
@@ -96,8 +96,8 @@ inline const char* textOrNull(const char* szText)
 
 #define VEMO_ATOKEN_FAILED(szCondition, ...) VEMO_ACCESS_TOKEN::logFailed(szCondition, __VA_ARGS__)
 
-// The text of a condition is made here, not further on: passed on to another macro, the condition
-// would have its own macros (UID_ERR, SQLITE_OK) expanded first.
+// These turn the condition into text themselves: passed to another macro first, it would have its own
+// macros (UID_ERR, SQLITE_OK) expanded.
 #define VEMO_ATOKEN_CHECK_RETURN(condition, result) VEMO_ATOKEN_CHECK_RETURN_AS(condition, #condition, result)
 #define VEMO_ATOKEN_CHECK_GOTO(condition, label) VEMO_ATOKEN_CHECK_GOTO_AS(condition, #condition, label)
 

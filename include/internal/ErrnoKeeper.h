@@ -1,4 +1,4 @@
-// Puts errno back as it was, at the end of a scope.
+// Restores errno at the end of a scope.
 
 #ifndef VEMO_ACCESS_TOKEN_ERRNO_KEEPER_H
 #define VEMO_ACCESS_TOKEN_ERRNO_KEEPER_H

@@ -1,4 +1,4 @@
-// What the type table says of one field.
+// The type of one field in the type table.
 
 #ifndef VEMO_ACCESS_TOKEN_FIELD_TYPE_H
 #define VEMO_ACCESS_TOKEN_FIELD_TYPE_H
@@ -9,7 +9,7 @@
 
 namespace VEMO_ACCESS_TOKEN {
 
-// The field's type name, or null when tokenType() has no such field. It belongs to the table.
+// Returns the field's type name, or null when tokenType() has no such field. The table owns it.
 const Json::Value* fieldType(std::string_view strField);
 
 } // namespace VEMO_ACCESS_TOKEN

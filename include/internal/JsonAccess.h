@@ -1,5 +1,4 @@
-// JSON values read in place, without the copies and second look-ups of isMember, operator[] and
-// asString.
+// Reads JSON values in place: isMember, operator[] and asString would look up twice, or copy.
 
 #ifndef VEMO_ACCESS_TOKEN_JSON_ACCESS_H
 #define VEMO_ACCESS_TOKEN_JSON_ACCESS_H
@@ -10,13 +9,13 @@
 
 namespace VEMO_ACCESS_TOKEN {
 
-// The member, or null when the object has none of that name. It belongs to the object.
+// Returns the member of an object, or null when it has none of that name. The object owns it.
 inline const Json::Value* findMember(const Json::Value& jObject, std::string_view strName)
 {
     return jObject.find(strName.data(), strName.data() + strName.size());
 }
 
-// A string's text, which belongs to the value; empty for any other value.
+// Returns the text of a string, or an empty text for any other value. The value owns it.
 inline std::string_view textOf(const Json::Value& jValue)
 {
     const char* szBegin = nullptr;

@@ -1,4 +1,4 @@
-// JSON values as text and back, in the one form that the database stores and conditions compare.
+// Converts JSON values to text and back, in the form that the database stores and conditions compare.
 //
 // Threads: both may run in several threads at once.
 
@@ -12,14 +12,13 @@
 
 namespace VEMO_ACCESS_TOKEN {
 
-// The value as compact text on one line. Strings come out byte for byte (but for the escapes that
-// JSON demands), valid UTF-8 or not. Integers of 64 bits and doubles, infinities included, are read
-// back equal. Preserves errno, so that it may stand among the arguments of a log line.
+// Returns the value as compact text on one line. Apart from the escapes that JSON demands, strings are
+// written byte for byte, valid UTF-8 or not. 64-bit integers and doubles, infinities included, are read
+// back equal. Preserves errno, so that it can be an argument of a log line.
 std::string toString(const Json::Value& jValue);
 
-// Parses text into jValue. Never throws on bad text, and reports nothing: text that does not parse,
-// or is nested deeper than the reader allows (1000 levels), leaves in jValue what was read up to
-// there.
+// Parses text into jValue. Bad text, and text with more than 1000 levels, is neither reported nor thrown:
+// jValue then holds what was read before the error.
 void fromString(std::string_view strText, Json::Value& jValue);
 
 } // namespace VEMO_ACCESS_TOKEN
