@@ -3,26 +3,33 @@
 #include <sys/types.h>
 #include <unistd.h>
 
-#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <exception>
-#include <memory>
 #include <string_view>
 
 #include "AccessTokenUtil.h"
 #include "internal/AccessTokenDbApi.h"
 #include "internal/AccessTokenLog.h"
+#include "internal/EffectiveUidKeeper.h"
 #include "internal/FieldType.h"
 #include "internal/JsonAccess.h"
 #include "internal/JsonText.h"
+#include "internal/SqlText.h"
 #include "plibc.h"
 
+using VEMO_ACCESS_TOKEN::appendTail;
+using VEMO_ACCESS_TOKEN::appendValue;
 using VEMO_ACCESS_TOKEN::debugInfoGet;
+using VEMO_ACCESS_TOKEN::EffectiveUidKeeper;
 using VEMO_ACCESS_TOKEN::ErrnoKeeper;
 using VEMO_ACCESS_TOKEN::fieldType;
 using VEMO_ACCESS_TOKEN::findMember;
 using VEMO_ACCESS_TOKEN::fromString;
+using VEMO_ACCESS_TOKEN::Rendering;
+using VEMO_ACCESS_TOKEN::renderingOf;
+using VEMO_ACCESS_TOKEN::SqlArgument;
+using VEMO_ACCESS_TOKEN::SqliteText;
 using VEMO_ACCESS_TOKEN::textOf;
 using VEMO_ACCESS_TOKEN::textOrNull;
 using VEMO_ACCESS_TOKEN::tokenType;
@@ -33,123 +40,14 @@ namespace {
 const int LOCK_TRIES = 500;
 const useconds_t LOCK_WAIT_USEC = 10000;
 
-struct SqliteDeleter {
-    void operator()(char* szText) const { sqlite3_free(szText); }
-};
-
-// Text that SQLite allocated.
-typedef std::unique_ptr<char[], SqliteDeleter> SqliteText;
-
-// Puts the effective uid back at the end of a scope.
-class EffectiveUidKeeper {
-public:
-    EffectiveUidKeeper() : m_uid(geteuid()) {}
-    ~EffectiveUidKeeper()
-    {
-        if (UID_NONE != m_uid) {
-            const ErrnoKeeper errnoKeeper;
-            // Nothing can be done about a failure.
-            [[maybe_unused]] const int nIgnored = seteuid(m_uid);
-        }
-    }
-    EffectiveUidKeeper(const EffectiveUidKeeper&) = delete;
-    EffectiveUidKeeper& operator=(const EffectiveUidKeeper&) = delete;
-    void forget() { m_uid = UID_NONE; }
-
-private:
-    static constexpr uid_t UID_NONE = static_cast<uid_t>(-1);
-    uid_t m_uid;
-};
-
 void waitForLock()
 {
     const ErrnoKeeper keeper;
     usleep(LOCK_WAIT_USEC);
 }
 
-// How a field's value is written in SQL; its type name decides.
-enum class Rendering { Text, Json, Number };
-
-constexpr Rendering renderingOf(std::string_view strType)
-{
-    if (strType == "string") {
-        return Rendering::Text;
-    }
-    if (strType == "Json::Value" || strType == "Json::objectValue" || strType == "Json::arrayValue") {
-        return Rendering::Json;
-    }
-    return Rendering::Number;
-}
-
-// A member as an argument of sqlite3_mprintf, and the directive that formats it. get() is valid as
-// long as the object.
-template <Rendering rendering>
-class SqlArgument;
-
-template <>
-class SqlArgument<Rendering::Text> {
-public:
-    static constexpr const char* DIRECTIVE = "%Q";
-    explicit SqlArgument(const Json::Value& jMember) : m_szText(jMember.asCString()) {}
-    const char* get() const { return m_szText; }
-
-private:
-    const char* m_szText;
-};
-
-template <>
-class SqlArgument<Rendering::Json> {
-public:
-    static constexpr const char* DIRECTIVE = "%Q";
-    explicit SqlArgument(const Json::Value& jMember) : m_strText(toString(jMember)) {}
-    const char* get() const { return m_strText.c_str(); }
-
-private:
-    std::string m_strText;
-};
-
-template <>
-class SqlArgument<Rendering::Number> {
-public:
-    static constexpr const char* DIRECTIVE = "%lld";
-    explicit SqlArgument(const Json::Value& jMember) : m_nNumber(jMember.asInt64()) {}
-    sqlite3_int64 get() const { return m_nNumber; }
-
-private:
-    sqlite3_int64 m_nNumber;
-};
-
-// Appends a filter's value, escaped and quoted as its field demands. Number fields take the value
-// without quotes whatever its type, so a string in their place becomes part of the statement. The two
-// conditions are the caller's, for the log line of a failed allocation.
-int appendValue(Rendering rendering, const Json::Value& jValue, const char* szAsStringFailed,
-                const char* szToStringFailed, std::string& strSqlOut)
-{
-    const bool blJson = Rendering::Json == rendering;
-    const std::string strText = blJson ? toString(jValue) : jValue.asString();
-    const SqliteText szSql(sqlite3_mprintf("%q", strText.c_str()));
-    if (!szSql) {
-        VEMO_ATOKEN_FAILED(blJson ? szToStringFailed : szAsStringFailed, VEMO_ATOKEN_HERE);
-        return -1;
-    }
-    const char* szQuote = Rendering::Number == rendering ? "" : "'";
-    strSqlOut.append(szQuote).append(szSql.get()).append(szQuote);
-    return 0;
-}
-
-// The rule of "limit" and "offset": the number is a position in the keyword's text, of which the
-// tail is appended; the number itself is never written. So 0 gives " LIMIT ", without a number, and
-// a position past the end gives nothing. Callers have always seen this, and it stays.
-void appendTail(std::string_view strKeyword, Json::Int64 nValue, std::string& strSqlOut)
-{
-    const uint32_t nPosition = static_cast<uint32_t>(nValue);
-    if (nPosition < strKeyword.size()) {
-        strSqlOut.append(strKeyword.substr(nPosition));
-    }
-}
-
-// The record's member, made if it is missing. A field's name is not copied into each record: records
-// point at the names in the library, which for that reason is never unloaded.
+// Returns the record's member, and adds a missing one. Names of fields are not copied: records point at the
+// names in the library, which is therefore never unloaded.
 Json::Value& recordMember(Json::Value& jToken, const char* szName)
 {
     static const Json::StaticString rgFieldName[] = {
@@ -162,7 +60,7 @@ Json::Value& recordMember(Json::Value& jToken, const char* szName)
             return jToken[fieldName];
         }
     }
-    return jToken[szName]; // a field that has been added to tokenType() meanwhile
+    return jToken[szName]; // a field that a caller has added to tokenType()
 }
 
 int FillField(Json::Value& jToken, char** column_name, char** column_value, int idx)
@@ -214,7 +112,7 @@ int appendRow(Json::Value* pjTokenArray, int n_column, char** column_value, char
     return 0;
 }
 
-// The callback of sqlite3_exec, a C function that no exception may cross.
+// The callback of sqlite3_exec. Exceptions must not pass through that C function.
 int FillList(void* pjTokenArray, int n_column, char** column_value, char** column_name)
 {
     try {
@@ -255,13 +153,12 @@ int AccessTokenDbApi::initDb()
     if (SQLITE_OK != nOpen) {
         VEMO_ATOKEN_FAIL("open sqlite failed, path=%s, errno=%d", VEMO_ATOKEN_HERE, VEMO_ATOKEN_DB_PATH,
                          nOpen);
-        // The one way out that leaves the process at effective uid 0; callers know it so.
+        // Only this failure leaves the process at effective uid 0. Callers depend on it.
         uidKeeper.forget();
         return -1;
     }
 
-    // From here on the result is success: a missing handle or table is logged, and shows in the
-    // statements that follow.
+    // From here on the result is success: a missing handle or table is logged, and later statements fail.
     VEMO_ATOKEN_CHECK_RETURN(!m_pDb, 0);
     if (blNew) {
         VEMO_ATOKEN_CHECK_RETURN(0 > SqlExpandCreateTable(strSql), 0);
@@ -309,7 +206,7 @@ int AccessTokenDbApi::runSqlEx(std::string strSql, int (*callback)(void*, int, c
         if (SQLITE_OK == nResult) {
             break;
         }
-        // The text decides, not the code: nothing else is worth waiting for.
+        // Only this text means a lock that is worth waiting for, whatever the result code.
         if (!szErr || !strstr(szErr.get(), "database is locked")) {
             VEMO_ATOKEN_LOG("i=%d,run sql failed, error=%s, sql=%s", VEMO_ATOKEN_HERE, i,
                             textOrNull(szErr.get()), strSql.c_str());
@@ -326,8 +223,8 @@ int AccessTokenDbApi::runSqlEx(std::string strSql, int (*callback)(void*, int, c
         m_strErr = szErr.get();
     }
 
-    // m_strErr is not cleared: after a lock that was waited out it still tells of the lock, and the
-    // operations on tokens report failure although the statement took effect. That is kept.
+    // m_strErr is not cleared: after a wait for a lock it still names the lock, and the operations on
+    // tokens report failure although the statement took effect. Callers depend on it.
     if (!callback) {
         const int nChanges = sqlite3_changes(m_pDb);
         VEMO_ATOKEN_DEBUG("change rv=%d, run sql=%s", VEMO_ATOKEN_HERE, nChanges, strSql.c_str());
@@ -377,7 +274,7 @@ int AccessTokenDbApi::cleanExpireToken(bool blLog)
 {
     const bool blLogFailure = blLog || debugInfoGet();
 
-    // Nothing protects a deadline of -1: it lies before now, and such a token is purged.
+    // A deadline of -1 is not special: it lies before now, so the token is purged.
     m_strSql = "DELETE FROM token where deadline < strftime('%s', 'now');";
     if (0 > runSql()) {
         if (blLogFailure) {
@@ -476,7 +373,7 @@ int AccessTokenDbApi::SqlWhereFromJson(Json::Value& jTokenParam, std::string& st
     VEMO_ATOKEN_CHECK_RETURN(jTokenParam.type() != Json::objectValue, -1);
     Json::Value::Members jmFieldName = jTokenParam.getMemberNames();
     for (size_t i = 0; i < jmFieldName.size(); ++i) {
-        // Whatever is no field passes: paging keys, and misspelt ones too.
+        // Names that are not fields are skipped: paging keys, and misspelt fields too.
         if (!jTokenType.isMember(jmFieldName[i])) {
             continue;
         }
@@ -489,7 +386,7 @@ int AccessTokenDbApi::SqlWhereFromJson(Json::Value& jTokenParam, std::string& st
             VEMO_ATOKEN_CHECK_RETURN(0 > SqlMakeByListField(jmFieldName[i].c_str(), jTmp, strSqlWhereOut),
                                      -1);
         } else if (jTmp.isObject()) {
-            // The message shows the whole filter read as a string, which an object never is.
+            // The message has a place for the filter as a string. An object is none, so it says "(null)".
             VEMO_ATOKEN_FAIL("err input type, jTokenParam=%s", VEMO_ATOKEN_HERE, textOrNull(nullptr));
             return -1;
         } else {
@@ -510,10 +407,12 @@ int AccessTokenDbApi::SqlMakeByMatchField(std::string& strField, Json::Value& jP
 
     const Json::Value* pType = fieldType(strField);
     VEMO_ATOKEN_CHECK_RETURN_AS(!pType, "!jTokenType.isMember(strField)", -1);
-    if (0 > appendValue(renderingOf(textOf(*pType)), jParam,
-                        "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.asString().c_str()))",
-                        "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.toString().c_str()))",
-                        strCondition)) {
+    const Rendering rendering = renderingOf(textOf(*pType));
+    if (!appendValue(rendering, jParam, strCondition)) {
+        VEMO_ATOKEN_FAILED(Rendering::Json == rendering
+                               ? "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.toString().c_str()))"
+                               : "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.asString().c_str()))",
+                           VEMO_ATOKEN_HERE);
         return -1;
     }
     strSqlWhereOut.append(strCondition);
@@ -522,7 +421,7 @@ int AccessTokenDbApi::SqlMakeByMatchField(std::string& strField, Json::Value& jP
 
 int AccessTokenDbApi::SqlMakeByListField(const char* szField, Json::Value& jList, std::string& strSqlWhereOut)
 {
-    const Json::Value& jElements = jList; // reading through it adds no element where there is a gap
+    const Json::Value& jElements = jList; // its operator[] does not add missing elements
     std::string strList;
 
     VEMO_ATOKEN_CHECK_RETURN(!szField || !szField[0], -1);
@@ -531,13 +430,14 @@ int AccessTokenDbApi::SqlMakeByListField(const char* szField, Json::Value& jList
     const Rendering rendering = renderingOf(textOf(*pType));
     VEMO_ATOKEN_CHECK_RETURN(jList.type() != Json::arrayValue, -1);
 
-    // No separator stands between the elements: 'a''b' is the one text a'b, and 12 the one number.
-    // So a list matches as intended only with one element. Callers have always seen this.
+    // There is no separator between the elements: 'a''b' is one text, a'b, and 12 one number. So only a
+    // list of one element matches as intended. Callers depend on it.
     for (Json::ArrayIndex i = 0; i < jElements.size(); ++i) {
-        if (0 > appendValue(rendering, jElements[i],
-                            "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].asString().c_str()))",
-                            "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].toString().c_str()))",
-                            strList)) {
+        if (!appendValue(rendering, jElements[i], strList)) {
+            VEMO_ATOKEN_FAILED(Rendering::Json == rendering
+                                   ? "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].toString().c_str()))"
+                                   : "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].asString().c_str()))",
+                               VEMO_ATOKEN_HERE);
             return -1;
         }
     }
@@ -551,7 +451,7 @@ int AccessTokenDbApi::SqlFilterConditionFromJson(Json::Value& jFilter, std::stri
 {
     VEMO_ATOKEN_CHECK_RETURN(jFilter.type() != Json::objectValue, -1);
     if (jFilter.isMember("sort_by")) {
-        // A string literal, no column: SQLite sorts by a constant, and the rows keep their order.
+        // This is a string literal, not a column: SQLite sorts by a constant, and the order does not change.
         const SqliteText szSql(sqlite3_mprintf(" order by '%q'", jFilter["sort_by"].asCString()));
         VEMO_ATOKEN_CHECK_RETURN(!szSql, -1);
         strSqlWhereOut.append(szSql.get());
@@ -581,7 +481,7 @@ int AccessTokenDbApi::tokenGet(Json::Value& jTokenParam, Json::Value& jTokenArra
     VEMO_ATOKEN_CHECK_RETURN_AS(0 > SqlExpandMemberName(strStatement),
                                 "0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)", -1);
     strStatement.append(" FROM token ");
-    // Ordering without a field condition gives "WHERE  order by", which SQLite refuses; that stays.
+    // Ordering without a field condition gives "WHERE  order by", which SQLite refuses. Callers depend on it.
     if (!strSql.empty()) {
         strStatement.append(" WHERE ").append(strSql);
     }
