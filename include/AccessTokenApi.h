@@ -18,8 +18,9 @@
 // Threads and processes: one thread at a time may use an object; several objects, in any threads and
 // processes, may use the database at once. The constructor, or the first operation after a failed
 // opening, changes the effective uid of the whole process for a moment. The process should have
-// effective uid 0 as long as the object lives (README says why). No transaction spans reading and
-// writing a token: overlapping updates, grants and deletions of one token can overwrite each other.
+// effective uid 0 as long as the object lives. No transaction spans reading and writing a token:
+// overlapping updates, grants and deletions of one token can overwrite each other. vemo-access-token(7)
+// says more about both.
 
 #ifndef VEMO_ACCESS_TOKEN_API_H
 #define VEMO_ACCESS_TOKEN_API_H
@@ -67,7 +68,7 @@ public:
                     std::string& strTidOut);
 
     // Appends the tokens that jFilter selects to jTokenArrayOut, which must be an array. A null
-    // filter selects all. README describes filters and their oddities.
+    // filter selects all. vemo-access-token(7) describes filters and their oddities.
     // After a failure jTokenArrayOut may hold some of the tokens and must not be used.
     int tokenList(Json::Value& jFilter, Json::Value& jTokenArrayOut);
 
@@ -80,7 +81,7 @@ public:
     int VectorParamToJson(std::vector<std::string>& strVector, const char* szField, Json::Value& jParamOut);
 
     // Appends the token with the given id to jTokenArrayOut, which must be an array. An empty list is
-    // a failure; a list of more than one id finds nothing (README, lists in filters).
+    // a failure; a list of more than one id finds nothing.
     int tokenGetByTidArray(std::vector<std::string>& strTidVector, Json::Value& jTokenArrayOut);
 
     // Replaces those fields of a token that are members of the object jParam, each as a whole. Here
@@ -93,8 +94,7 @@ public:
     int tokenSaveByOverwrite(Json::Value& jToken);
 
     // Delete tokens by the value of a string field (szName is "tid", "bind_sid" or "function"), by id,
-    // by login session or by purpose. A list of more than one value matches nothing (README, lists in
-    // filters).
+    // by login session or by purpose. A list of more than one value matches nothing.
     // Return the number of tokens deleted, which may be 0, or -1, also for an empty argument.
     int tokenDeleteByArray(std::vector<std::string>& strVector, const char* szName);
     int tokenDeleteByName(std::string& strValue, const char* szName);

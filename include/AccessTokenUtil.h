@@ -2,7 +2,7 @@
 // and the two log switches.
 //
 // A token record is a Json::Value object with the nine fields tid, bind_sid, uid, deadline, count,
-// create_time, function, webapi_allow and extra (README has their table).
+// create_time, function, webapi_allow and extra (vemo-access-token(7) describes them).
 //
 // Results: 0 is success; -1 is a failure, which has written its log line. Functions with other results
 // or with exceptions other than std::bad_alloc say so.

@@ -2,7 +2,7 @@
 //
 // Each call opens the token database, deletes expired tokens (except where a function says otherwise),
 // does its work and closes the database again; nothing is kept between calls. The process must be able
-// to set its effective uid to 0 and should have it (README says why).
+// to set its effective uid to 0 and should have it (vemo-access-token(7) says why).
 //
 // Results: 0 or more is success; -1 is a failure or a refusal. Failures have written their log lines
 // (see AccessTokenUtil.h). An unknown token and a method that is not listed are logged in debug mode

@@ -2,8 +2,8 @@
 // service (AccessTokenApi.h); this class is for what the service does not offer.
 //
 // Results: 0 or more is success; -1 is a failure, which has written its log lines. Members with other
-// results say so. README describes filters. Arguments named ...Out are results; all others are only
-// read.
+// results say so. vemo-access-token(7) describes filters. Arguments named ...Out are results; all
+// others are only read.
 //
 // A statement that succeeds after waiting for a lock leaves "database is locked" in m_strErr. The
 // operations on tokens then report -1 although the statement took effect. Callers depend on it.
