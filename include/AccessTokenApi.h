@@ -45,7 +45,6 @@ public:
     // Closes the database.
     ~AccessTokenApi();
 
-    // The object owns its store and is never copied.
     AccessTokenApi(const AccessTokenApi&) = delete;
     AccessTokenApi& operator=(const AccessTokenApi&) = delete;
 

@@ -60,7 +60,6 @@ public:
         close(m_nFile);
     }
 
-    // The lock has one owner.
     CallLock(const CallLock&) = delete;
     CallLock& operator=(const CallLock&) = delete;
 

@@ -8,11 +8,7 @@
 // A statement that succeeds after waiting for a lock leaves "database is locked" in m_strErr. The
 // operations on tokens then report -1 although the statement took effect. Callers depend on it.
 //
-// Exceptions: Json::LogicError for a member of a filter or record that cannot be converted, and
-// std::bad_alloc.
-//
-// Threads and processes: one thread at a time may use an object. initDb changes the effective uid of
-// the whole process for a moment. Processes share the database file through SQLite's file locks.
+// AccessTokenApi.h describes exceptions, threads and processes.
 
 #ifndef VEMO_ACCESS_TOKEN_DB_API_H
 #define VEMO_ACCESS_TOKEN_DB_API_H
@@ -33,7 +29,6 @@ public:
     // Closes the connection (freeDb).
     ~AccessTokenDbApi();
 
-    // The connection has one owner.
     AccessTokenDbApi(const AccessTokenDbApi&) = delete;
     AccessTokenDbApi& operator=(const AccessTokenDbApi&) = delete;
 
@@ -66,9 +61,7 @@ public:
     // Closes the connection. If SQLite refuses, the connection stays open. Returns 0 always.
     int freeDb();
 
-    // Deletes the tokens whose deadline lies before now, as a deadline of -1 does. With blLog false the
-    // operation writes its own failure line in debug mode only. Returns 0 whatever the number of
-    // tokens deleted, or -1.
+    // Does what AccessTokenApi::cleanExpireToken does.
     int cleanExpireToken(bool blLog);
 
     // Saving

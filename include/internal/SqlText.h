@@ -39,39 +39,25 @@ constexpr Rendering renderingOf(std::string_view strType)
 // A member as an argument of sqlite3_mprintf, and the directive that formats it. What get() returns is valid
 // for as long as the object.
 template <Rendering rendering>
-class SqlArgument;
-
-template <>
-class SqlArgument<Rendering::Text> {
+class SqlArgument {
 public:
-    static constexpr const char* DIRECTIVE = "%Q";
-    explicit SqlArgument(const Json::Value& jMember) : m_szText(jMember.asCString()) {}
-    const char* get() const { return m_szText; }
+    static constexpr const char* DIRECTIVE = Rendering::Number == rendering ? "%lld" : "%Q";
+    explicit SqlArgument(const Json::Value& jMember)
+        : m_jMember(jMember), m_strJson(Rendering::Json == rendering ? toString(jMember) : std::string())
+    {
+    }
+    auto get() const
+    {
+        if constexpr (Rendering::Number == rendering) {
+            return sqlite3_int64{m_jMember.asInt64()};
+        } else {
+            return Rendering::Json == rendering ? m_strJson.c_str() : m_jMember.asCString();
+        }
+    }
 
 private:
-    const char* m_szText;
-};
-
-template <>
-class SqlArgument<Rendering::Json> {
-public:
-    static constexpr const char* DIRECTIVE = "%Q";
-    explicit SqlArgument(const Json::Value& jMember) : m_strText(toString(jMember)) {}
-    const char* get() const { return m_strText.c_str(); }
-
-private:
-    std::string m_strText;
-};
-
-template <>
-class SqlArgument<Rendering::Number> {
-public:
-    static constexpr const char* DIRECTIVE = "%lld";
-    explicit SqlArgument(const Json::Value& jMember) : m_nNumber(jMember.asInt64()) {}
-    sqlite3_int64 get() const { return m_nNumber; }
-
-private:
-    sqlite3_int64 m_nNumber;
+    const Json::Value& m_jMember;
+    const std::string m_strJson;
 };
 
 // Appends a value, escaped, and quoted unless it is rendered as a number. A number is not quoted whatever the
