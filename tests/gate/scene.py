@@ -1,0 +1,168 @@
+"""What the tests of the gate as it ships share: a store, the gate on it, and its clients.
+
+usage of each: NAME.py SOURCE-DIRECTORY GATE TOOL [CLASS...]
+GATE and TOOL are built with the redirection linked in. All runs below a throw-away directory, on Unix sockets, as the
+user who calls it. CLASS: the cases of this class only. Exit status 77: skipped, for the reason printed.
+"""
+import contextlib
+import http.client
+import os
+import pwd
+import re
+import shutil
+import socket
+import sqlite3
+import subprocess
+import sys
+import tempfile
+import time
+import unittest
+
+SOURCE, GATE, TOOL = sys.argv[1:4]
+PATH = "/usr/sbin:/usr/bin:/sbin:/bin"
+OWNER = pwd.getpwuid(0).pw_name  # of all tokens
+FUNCTION, FUNCTION_IN_HEADERS = "50 % \u00e4", "50%20%25%20%C3%A4"
+
+
+class UnixConnection(http.client.HTTPConnection):
+    def __init__(self, path, tls):
+        super().__init__("tokens.example" if tls else "example.org")
+        self.path, self.tls = path, tls
+
+    def connect(self):
+        self.sock = connected(self.path)
+        if self.tls:
+            self.sock = self.tls.wrap_socket(self.sock, server_hostname=self.host)
+
+
+def connected(path):
+    client = socket.socket(socket.AF_UNIX)
+    client.settimeout(10)
+    try:
+        client.connect(path)
+    except OSError:
+        client.close()
+        raise
+    return client
+
+
+def is_within(seconds, condition):
+    """Whether a condition comes to hold within this time."""
+    end = time.monotonic() + seconds
+    while not condition():
+        if time.monotonic() > end:
+            return False
+        time.sleep(0.01)
+    return True
+
+
+class Scene(unittest.TestCase):
+    """A store, which all cases of a class share, and what is started around it."""
+    PROGRAMS = ()  # that must be installed
+
+    @classmethod
+    def setUpClass(cls):
+        for program in cls.PROGRAMS:
+            if not shutil.which(program, path=PATH):
+                raise unittest.SkipTest(f"{program} is not installed")
+        memory = "/dev/shm"  # no disk that each call waits for
+        cls.directory = tempfile.mkdtemp(prefix="gate-", dir=memory if os.access(memory, os.W_OK) else None)
+        cls.addClassCleanup(shutil.rmtree, cls.directory)
+        cls.environment = {"PATH": PATH, "HOME": cls.directory, "VEMO_REDIRECT_DIR": cls.at("session"),
+                           "GATE_SOCKET": cls.at("calls")}
+        cls.tool("init")
+
+    @classmethod
+    def at(cls, name):
+        return os.path.join(cls.directory, name)
+
+    @classmethod
+    def start(cls, name, *command, **options):
+        """Starts a program that listens at a path, and ends with the last case."""
+        with open(cls.at(os.path.basename(command[0]) + ".log"), "w+b") as log:
+            program = subprocess.Popen(command, **{"env": cls.environment, "cwd": cls.directory, "stdout": log,
+                                                   "stdin": subprocess.DEVNULL, "stderr": log, **options})
+            cls.addClassCleanup(cls.end, program)
+            is_within(5, lambda: cls.listens(name) or program.poll() is not None)
+            log.seek(0)
+            if program.poll() is not None or not cls.listens(name):
+                raise AssertionError(f"{command[0]} does not listen: {log.read().decode()}")
+        return program
+
+    @classmethod
+    def listens(cls, name):
+        with contextlib.suppress(OSError), connected(cls.at(name)):
+            return True
+        return False
+
+    @staticmethod
+    def end(program):
+        """Ends a program, and returns its exit status."""
+        program.terminate()
+        try:
+            return program.wait(5)
+        except subprocess.TimeoutExpired:
+            program.kill()
+            return program.wait()
+
+    @classmethod
+    def start_gate(cls, **options):
+        cls.gate = cls.start("calls", *cls.gate_command(), **options)
+        return cls.gate
+
+    @classmethod
+    def gate_command(cls):
+        return (GATE, "--socket", cls.at("calls"), "--status-socket", cls.at("status"), "--user", "nobody",
+                "--once-header", "X-Request-Once")
+
+    @classmethod
+    def tool(cls, *arguments):
+        return subprocess.run([TOOL, *arguments], env=cls.environment, check=True, stdin=subprocess.DEVNULL,
+                              stdout=subprocess.PIPE, text=True).stdout.strip()
+
+    @classmethod
+    def token(cls, uses=3):
+        """The id of a new token."""
+        return cls.tool("create", "--uid", "0", "--function", FUNCTION, "--uses", str(uses), "--allow", "Api:get",
+                        "--allow", "Example.File:get,put", "--allow", "Example.Page:get,\u00e4++")
+
+    @classmethod
+    @contextlib.contextmanager
+    def database(cls):
+        path = cls.at("session/vemo-access-token.db")
+        with contextlib.closing(sqlite3.connect(path, isolation_level=None)) as database:
+            yield database
+
+    @classmethod
+    def uses(cls, id):
+        """The uses that are left of a token."""
+        with cls.database() as database:
+            return database.execute("SELECT count FROM token WHERE tid = ?", (id,)).fetchone()[0]
+
+    @classmethod
+    def answer(cls, name, method="GET", path="/", id=None, headers=None, body=None, tls=None):
+        """The status, the headers and the text of an answer on a socket."""
+        headers = {**(headers or {}), **({"Authorization": "Bearer " + id} if id else {})}
+        with contextlib.closing(UnixConnection(cls.at(name), tls)) as connection:
+            connection.request(method, path, body, headers)
+            answer = connection.getresponse()
+            return answer.status, answer.headers, answer.read().decode()
+
+    @classmethod
+    def metric(cls, name):
+        text = cls.answer("status", path="/metrics")[2]
+        return float(re.search("^" + re.escape(name) + " (.*)$", text, re.MULTILINE)[1])
+
+    @classmethod
+    def is_soon(cls, name, value):
+        """Whether a figure comes to be this: they can be a second old."""
+        return is_within(3, lambda: cls.metric(name) == value)
+
+
+def main():
+    arguments = sys.argv[:1] + sys.argv[4:]
+    result = unittest.main(argv=arguments, verbosity=2, exit=False).result
+    if result.skipped and result.testsRun <= len(result.skipped):
+        print("skipped:", result.skipped[0][1])
+        sys.exit(77)
+    sys.exit(not result.wasSuccessful())
