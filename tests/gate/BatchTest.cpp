@@ -1,9 +1,8 @@
 #include "gate/Batch.h"
 
-#include <gtest/gtest.h>
-#include <sqlite3.h>
+#include <cstring>
 
-#include <memory>
+#include "TokenTable.h"
 
 using gate::Answer;
 using gate::Outcome;
@@ -12,17 +11,11 @@ using gate::Request;
 
 namespace {
 
-// A database in memory with tokens whose ids tell what they are, and a batch over it.
-class Batch : public testing::Test {
+// A batch over tokens whose ids tell what they are.
+class Batch : public TokenTable {
 protected:
-    void SetUp() override
+    Batch()
     {
-        sqlite3* pDb = nullptr;
-        ASSERT_EQ(SQLITE_OK, sqlite3_open(":memory:", &pDb));
-        m_pDb.reset(pDb);
-        run("CREATE TABLE token (tid TEXT PRIMARY KEY, bind_sid TEXT, uid INTEGER, deadline INTEGER, count "
-            "INTEGER, "
-            "create_time INTEGER, function TEXT, webapi_allow TEXT, extra TEXT)");
         for (const auto& [szTid, szChange] : {
                  std::pair("three", "count = 3"),
                  std::pair("one", "count = 1"),
@@ -41,24 +34,23 @@ protected:
                  std::pair("too long", "function = printf('%.*c', 1025, 'f')"),
                  std::pair("large", "bind_sid = printf('%.*c', 16384, 's')"),
              }) {
-            run(std::string("INSERT INTO token VALUES ('") + szTid +
-                "', 's', 1000, 9999999999, 2, 5, 'VPN', " +
-                "'{\"Api\":{\"method\":[\"get\"]}}', '{}'); UPDATE token SET " + szChange + " WHERE tid = '" +
-                szTid + "'");
+            add(szTid, szChange);
         }
-        m_tokens.emplace(m_pDb.get());
+        m_tokens.emplace(m_pDb);
         m_batch.emplace(*m_tokens, m_fOwner);
     }
 
-    void run(const std::string& strSql)
+    void TearDown() override
     {
-        ASSERT_EQ(SQLITE_OK, sqlite3_exec(m_pDb.get(), strSql.c_str(), nullptr, nullptr, nullptr)) << strSql;
+        m_batch.reset();
+        m_tokens.reset();
+        TokenTable::TearDown();
     }
 
     // How many uses a token has, or "gone".
     std::string uses(const std::string& strTid)
     {
-        grant::Statement select(m_pDb.get(), "SELECT count FROM token WHERE tid = ?1");
+        grant::Statement select(m_pDb, "SELECT count FROM token WHERE tid = ?1");
         return select.bind(1, strTid).step() ? select.text(0) : "gone";
     }
 
@@ -88,7 +80,6 @@ protected:
 
     gate::Figures figures() const { return m_batch->figures(); }
 
-    std::unique_ptr<sqlite3, decltype(&sqlite3_close)> m_pDb{nullptr, sqlite3_close};
     std::optional<grant::Tokens> m_tokens;
     std::optional<gate::Batch> m_batch;
 
