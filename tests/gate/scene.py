@@ -18,7 +18,7 @@ import tempfile
 import time
 import unittest
 
-SOURCE, GATE, TOOL = sys.argv[1:4]
+SOURCE, GATE, TOOL = map(os.path.abspath, sys.argv[1:4])
 PATH = "/usr/sbin:/usr/bin:/sbin:/bin"
 OWNER = pwd.getpwuid(0).pw_name  # of all tokens
 FUNCTION, FUNCTION_IN_HEADERS = "50 % \u00e4", "50%20%25%20%C3%A4"
@@ -107,7 +107,7 @@ class Scene(unittest.TestCase):
 
     @classmethod
     def start_gate(cls, **options):
-        cls.gate = cls.start("calls", *cls.gate_command(), **options)
+        cls.gate = cls.start("status", *cls.gate_command(), **options)  # the socket that it makes last
         return cls.gate
 
     @classmethod
