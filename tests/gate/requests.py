@@ -284,11 +284,6 @@ class Requests(scene.Scene):
         client.close()
         return responses(received, sent)
 
-    def left(self):
-        """The uses that are left of all tokens."""
-        with self.database() as database:
-            return database.execute("SELECT sum(count) FROM token").fetchone()[0]
-
     def test_each_is_answered_exactly(self):
         self.assertGreaterEqual(len(ROWS), 100)
         self.assertEqual(len({row[0] for row in ROWS}), len(ROWS))

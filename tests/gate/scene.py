@@ -78,22 +78,23 @@ class Scene(unittest.TestCase):
 
     @classmethod
     def start(cls, name, *command, **options):
-        """Starts a program that listens at a path, and ends with the last case."""
+        """Starts a program that makes a socket and listens there, and ends with the last case."""
+        before = cls.socket(name)
         with open(cls.at(os.path.basename(command[0]) + ".log"), "w+b") as log:
             program = subprocess.Popen(command, **{"env": cls.environment, "cwd": cls.directory, "stdout": log,
                                                    "stdin": subprocess.DEVNULL, "stderr": log, **options})
             cls.addClassCleanup(cls.end, program)
-            is_within(5, lambda: cls.listens(name) or program.poll() is not None)
+            is_within(5, lambda: cls.socket(name) not in (None, before) or program.poll() is not None)
             log.seek(0)
-            if program.poll() is not None or not cls.listens(name):
+            if program.poll() is not None or cls.socket(name) in (None, before):
                 raise AssertionError(f"{command[0]} does not listen: {log.read().decode()}")
         return program
 
     @classmethod
-    def listens(cls, name):
+    def socket(cls, name):
+        """The number of the file of a socket where a program listens."""
         with contextlib.suppress(OSError), connected(cls.at(name)):
-            return True
-        return False
+            return os.stat(cls.at(name)).st_ino
 
     @staticmethod
     def end(program):
@@ -108,6 +109,7 @@ class Scene(unittest.TestCase):
     @classmethod
     def start_gate(cls, **options):
         cls.gate = cls.start("status", *cls.gate_command(), **options)  # the socket that it makes last
+        cls.answer("status", path="/health")  # both of its processes
         return cls.gate
 
     @classmethod
@@ -127,6 +129,13 @@ class Scene(unittest.TestCase):
                         "--allow", "Example.File:get,put", "--allow", "Example.Page:get,\u00e4++")
 
     @classmethod
+    def grant_by_tool(cls, id, api="Api"):
+        """As the gate would answer."""
+        status = subprocess.run([TOOL, "grant", "-", api, "get"], env=cls.environment, input=id.encode(),
+                                stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL).returncode
+        return {0: 200, 1: 403}.get(status, status)
+
+    @classmethod
     @contextlib.contextmanager
     def database(cls):
         path = cls.at("session/vemo-access-token.db")
@@ -138,6 +147,12 @@ class Scene(unittest.TestCase):
         """The uses that are left of a token."""
         with cls.database() as database:
             return database.execute("SELECT count FROM token WHERE tid = ?", (id,)).fetchone()[0]
+
+    @classmethod
+    def left(cls):
+        """The uses that are left of all tokens."""
+        with cls.database() as database:
+            return database.execute("SELECT coalesce(sum(count), 0) FROM token").fetchone()[0]
 
     @classmethod
     def answer(cls, name, method="GET", path="/", id=None, headers=None, body=None, tls=None):
