@@ -97,7 +97,7 @@ private:
 
 } // namespace
 
-TEST_F(Batch, SpendsTheUsesThatItsOwnCallsHaveLeft)
+TEST_F(Batch, SpendsOnlyTheUsesThatItsEarlierCallsHaveLeft)
 {
     const struct {
         const char* szTid;
@@ -150,7 +150,7 @@ TEST_F(Batch, RefusesAndSpendsNothing)
     EXPECT_EQ(0U, figures()[gate::GRANTED]);
 }
 
-TEST_F(Batch, RefusesARecordThatNoAnswerCanCarryAndNotTheCall)
+TEST_F(Batch, RefusesALargeRecordButGrantsTheCallWithoutIt)
 {
     EXPECT_EQ(Outcome::Refused, call("large", "get", "Api", true)->outcome);
     EXPECT_EQ(1U, figures()[gate::REFUSED_LARGE]);
@@ -169,7 +169,7 @@ TEST_F(Batch, WaitsForTheNameOfTheOwner)
     EXPECT_EQ("2", uses("failing"));
 }
 
-TEST_F(Batch, TellsTheTokenAsItIsAfterTheCallButForItsLastUse)
+TEST_F(Batch, AnswersWithTheRecordAfterTheCallOrAtTheLastUse)
 {
     const std::string strBegin = R"({"bind_sid":"s","count":)";
     const std::string strEnd =

@@ -38,7 +38,7 @@ TEST(Owners, AreLookedUpOnceAndRemembered)
     EXPECT_EQ(2, nLookUps);
 }
 
-TEST(Owners, KeepNobodyWaitingForALookUpThatStalls)
+TEST(Owners, AnswerAtOnceWhileALookUpStalls)
 {
     auto& release = *new std::promise<void>;
     auto& owners = *new Owners([&release](uid_t) {

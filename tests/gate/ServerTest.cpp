@@ -1,5 +1,5 @@
-// The process that reads HTTP, in a child of the test, which is its clients and the other process. Time
-// passes when the test says so, and a client's user is the number that its address ends with.
+// The process that reads HTTP runs in a child of the test. The test plays its clients and the other process,
+// and moves its clock. A client's user is the number at the end of the client's address.
 
 #include "gate/http/Server.h"
 
@@ -241,7 +241,7 @@ private:
 
 } // namespace
 
-TEST_F(Server, EndsWhoIsTooSlow)
+TEST_F(Server, ClosesConnectionsThatAreTooSlow)
 {
     const struct {
         std::string strSent;
@@ -265,7 +265,7 @@ TEST_F(Server, EndsWhoIsTooSlow)
     }
 }
 
-TEST_F(Server, HoldsLittleOfWhatComesFromWhoDoesNotRead)
+TEST_F(Server, BuffersLittleForAClientThatDoesNotRead)
 {
     const Socket greedy = client();
     const size_t cbMuch = 4 << 20; // more than the buffers of all sockets
@@ -279,7 +279,7 @@ TEST_F(Server, HoldsLittleOfWhatComesFromWhoDoesNotRead)
     EXPECT_EQ(EPIPE, errno);
 }
 
-TEST_F(Server, GoesOnWithWhoReadsLate)
+TEST_F(Server, ServesAClientThatReadsLate)
 {
     const Socket late = client();
     const size_t nSent = fill(late, NO_CALL, SIZE_MAX) / NO_CALL.size();
@@ -297,7 +297,7 @@ TEST_F(Server, GoesOnWithWhoReadsLate)
     EXPECT_EQ(nSent, nReceived);
 }
 
-TEST_F(Server, MakesRoomAtTheCostOfWhoWaitsLongest)
+TEST_F(Server, ClosesTheOldestIdleConnectionToMakeRoom)
 {
     std::vector<Socket> idle;
     for (int i = 0; i < 768; ++i) {
@@ -324,7 +324,7 @@ TEST_F(Server, MakesRoomAtTheCostOfWhoWaitsLongest)
     EXPECT_TRUE(areOpen(768)) << "those of the other user are younger";
 }
 
-TEST_F(Server, AsksOnceForCallsOfTheSameKey)
+TEST_F(Server, AsksOnceForCallsWithTheSameKey)
 {
     const Socket first = client(KEYED);
     const Request request = asked();
@@ -358,7 +358,7 @@ TEST_F(Server, KeepsTheAnswerForAKeyWhoseClientHasGone)
     EXPECT_EQ("200", client(KEYED).status());
 }
 
-TEST_F(Server, AsksAnewForAKeyThatComesAgainWhileItsCallIsCancelled)
+TEST_F(Server, AsksAgainForAKeyThatReturnsWhileItsCallIsCancelled)
 {
     Socket gone = client(KEYED);
     const Request request = asked();
@@ -378,7 +378,7 @@ TEST_F(Server, AsksAnewForAKeyThatComesAgainWhileItsCallIsCancelled)
     EXPECT_EQ("200", andAgain.status());
 }
 
-TEST_F(Server, TellsTheFiguresThatWereToldAndNoOthers)
+TEST_F(Server, ReportsTheFiguresItWasToldAndNoOthers)
 {
     const Socket call = client(CALL);
     answer(asked(), Outcome::Refused); // the figures too
@@ -393,7 +393,7 @@ TEST_F(Server, TellsTheFiguresThatWereToldAndNoOthers)
     EXPECT_EQ("4711", metric("vemo_gate_store_bytes"));
 }
 
-TEST_F(Server, QueuesNoMoreThanItCanSendSoon)
+TEST_F(Server, LimitsTheQueueToTheOtherProcess)
 {
     size_t nClients = 0;
     for (std::string strStatus; strStatus != "503" && ++nClients < 8000;) {
@@ -418,7 +418,7 @@ TEST_F(Server, QueuesNoMoreThanItCanSendSoon)
     EXPECT_EQ("403", last.status());
 }
 
-TEST_F(Server, ServesWhoHasConnectedWhenItIsToStop)
+TEST_F(Server, ServesThoseWhoHaveConnectedBeforeItStops)
 {
     settle();
     kill(m_pid, SIGSTOP);

@@ -44,7 +44,7 @@ protected:
 
 } // namespace
 
-TEST_F(Tokens, FailByWhatSqliteSays)
+TEST_F(Tokens, FailWithTheErrorOfSqlite)
 {
     Statement insert(m_pDb, "INSERT INTO token (tid) VALUES (?1)");
     const std::string strText = "text";
@@ -58,7 +58,7 @@ TEST_F(Tokens, FailByWhatSqliteSays)
     EXPECT_EQ("none", errorOf([&] { insert.bind(1, 2).step(); })) << "it has ended, and can be run again";
 }
 
-TEST_F(Tokens, FailForWantOfMemoryAndWorkAgainWhenThereIsSome)
+TEST_F(Tokens, FailWithoutMemoryAndWorkAgainWhenThereIsSome)
 {
     EXPECT_FALSE(within(1, [&] { return Statement(m_pDb, "SELECT 1").step(); }));
 
@@ -80,7 +80,7 @@ TEST_F(Tokens, FailForWantOfMemoryAndWorkAgainWhenThereIsSome)
     EXPECT_LT(1, nFailures);
 }
 
-TEST_F(Tokens, GiveTheFirstOfAnIdIfAllOfItCanBeRead)
+TEST_F(Tokens, GiveTheFirstRowOfAnIdAndWhetherAllRowsCanBeRead)
 {
     add("first", "count = 7");
     add("first", "count = 8");

@@ -210,6 +210,7 @@ ROWS = [
     ("a record", call("Accept: application/json\r\n"), [RECORD]),
     ("a record among others", call("Accept: text/html, Application/JSON;q=0.1\r\n"), [RECORD]),
     ("a record in the second of two headers", call("Accept: text/*\r\nACCEPT:application/json\r\n"), [RECORD]),
+    ("another header", call("X: close, application/json\r\n") + GOOD, [GRANTED, GRANTED]),
     ("what looks like a record", call("Accept: application/json-seq, */*\r\n"), [GRANTED]),
     # keys of repetitions
     ("a key", call(once("1")) * 3, [GRANTED] + [AGAIN] * 2),
