@@ -30,7 +30,7 @@ TEST(IsSame, ComparesFileSystemAndNumber)
     EXPECT_FALSE(tool::isSame(statusOfFile(1, 2), statusOfFile(3, 2)));
 }
 
-TEST(CanOthersWrite, TakesWhatIsRootsOrTheCallersForTheirs)
+TEST(CanOthersWrite, TrustsDirectoriesOfRootAndOfTheCaller)
 {
     const uid_t uidBefore = geteuid();
     if (0 == uidBefore) {

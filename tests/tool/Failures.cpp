@@ -1,15 +1,17 @@
-// For tests of what the tool says when the system fails: with "file" or "directory" in VEMO_TEST_SYNC, none
-// of these can be synced, with a path that one; with an errno in VEMO_TEST_LOOKUP, each look-up of a user
-// ends with it and finds nobody, with ERANGE as long as its buffer has less than 4 KiB; with one in
-// VEMO_TEST_PROC, /proc cannot be listed; with a name in VEMO_TEST_VFS, SQLite works on files in the way of
-// that name; with VEMO_TEST_ROOM, so many blocks of a file system are free, of so many bytes each, and there
-// are so many files, of which so many are free. Lines of VEMO_TEST_CALLS are "CALL|ERRNO", and all those
-// calls fail with it, or "CALL|COMMAND": in front of the first, that does what another program could do in
-// this moment. CALL is the name of one of the functions below that ask fails(), with that of the file behind
-// it, if it has one. And of what nobody sees: texts that are wiped from memory go into the file that
-// VEMO_TEST_WIPED names. For each log line, the file that VEMO_TEST_SYSLOG names gets its priority, and
-// "held" or "free": what the lock is then; and of those that tell of changes, which are kept from the log of
-// the machine, the text. What is opened to be handed on to other programs ends the tool.
+// What the system does to the tool in a test. These variables make it fail:
+//   VEMO_TEST_SYNC    "file", "directory" or a path: none of these can be synced
+//   VEMO_TEST_LOOKUP  an errno: each look-up of a user ends with it; ERANGE for buffers below 4 KiB only
+//   VEMO_TEST_PROC    an errno: /proc cannot be listed
+//   VEMO_TEST_VFS     the name of SQLite's way to work on files
+//   VEMO_TEST_ROOM    free blocks of a file system, their size, its files, and how many of these are free
+//   VEMO_TEST_CALLS   lines "CALL|ERRNO": all these calls fail; or "CALL|COMMAND": ahead of the first, the
+//                     command does what another program could. CALL is the name of a function below that
+//                     asks fails(), with that of its file behind it, if it has one.
+// And these name files that get what nobody sees otherwise:
+//   VEMO_TEST_WIPED   texts that are wiped from memory
+//   VEMO_TEST_SYSLOG  for each log line its priority, and whether the lock is "held" or "free" then; of lines
+//                     that tell of changes also the text, which does not get into the log of the machine
+// What is opened to be handed on to other programs ends the tool.
 
 #include <dirent.h>
 #include <dlfcn.h>

@@ -136,14 +136,14 @@ class ToolLastChange : public ToolFault {};
 
 } // namespace
 
-TEST_P(ToolFault, OfSystemCallsIsTold)
+TEST_P(ToolFault, IsReportedForEachSystemCall)
 {
     judgeEach(Fault::Kind::Error, strideOf(1));
     judgeEach(Fault::Kind::FullDisk, strideOf(1));
     print("system calls");
 }
 
-TEST_P(ToolFault, OfMemoryIsTold)
+TEST_P(ToolFault, IsReportedForEachAllocation)
 {
     judgeEach(Fault::Kind::Memory, strideOf(STRIDE_OF_MEMORY));
     if (0 == m_nRuns) { // it has nothing to do behind the command line
@@ -153,7 +153,7 @@ TEST_P(ToolFault, OfMemoryIsTold)
 }
 
 // Those that can be caught make a difference where a file must go, or an id must be told.
-TEST_P(ToolChange, BySignalLeavesAllOrNothing)
+TEST_P(ToolChange, IsAllOrNothingAfterASignal)
 {
     const std::string& strCommand = GetParam().strArguments[0];
     const auto signals = strCommand == "export" || strCommand == "create" || strCommand == "rotate"

@@ -1,6 +1,6 @@
-// For tests of locks: each time the library waits for a locked database, a line goes into the file (as
-// a rule a fifo) that VEMO_TEST_WAITS names, so that whoever holds the lock can let go just then. With
-// VEMO_TEST_HASTE, waiting takes no time.
+// For tests of locks: each time the library waits for a locked database, a line goes into the file, as a rule
+// a fifo, that VEMO_TEST_WAITS names. Whoever holds the lock can let go just then. With VEMO_TEST_HASTE,
+// waiting takes no time.
 
 #include <dlfcn.h>
 #include <fcntl.h>
