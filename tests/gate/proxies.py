@@ -10,7 +10,6 @@ import socketserver
 import ssl
 import subprocess
 import threading
-import unittest
 
 import scene
 

@@ -68,8 +68,8 @@ class Scene(unittest.TestCase):
         memory = "/dev/shm"  # no disk that each call waits for
         cls.directory = tempfile.mkdtemp(prefix="gate-", dir=memory if os.access(memory, os.W_OK) else None)
         cls.addClassCleanup(shutil.rmtree, cls.directory)
-        cls.environment = {"PATH": PATH, "HOME": cls.directory, "VEMO_REDIRECT_DIR": cls.at("session"),
-                           "GATE_SOCKET": cls.at("calls")}
+        cls.environment = {**os.environ, "PATH": PATH, "HOME": cls.directory, "GATE_SOCKET": cls.at("calls"),
+                           "VEMO_REDIRECT_DIR": cls.at("session")}
         cls.tool("init")
 
     @classmethod
