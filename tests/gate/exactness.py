@@ -125,7 +125,7 @@ class Exactness(scene.Scene):
             return int(children.read())
 
     def kill_some(self, name, victim):
-        """One that dies takes the other along. What was answered is spent, and of the rest no more than was under way."""
+        """One that dies takes the other along. Of what was not answered, no more is spent than was under way."""
         kills = 10 * int(os.environ.get("VEMO_TEST_FACTOR", 1))
         moments = random.Random(os.environ.get("VEMO_TEST_SEED", "1"))
         made = 0
@@ -141,8 +141,8 @@ class Exactness(scene.Scene):
             made += extra
             self.start_gate()
         self.assertLessEqual(set(self.answers), {200, UNANSWERED, TURNED_AWAY})
-        print(f"\nfigure: gate, its {name} killed: {kills} kills among {self.answers[200]} grants; nothing answered was "
-              f"lost; of {self.answers[UNANSWERED]} calls without an answer {made} were made")
+        print(f"\nfigure: gate, its {name} killed: {kills} kills among {self.answers[200]} grants; nothing answered "
+              f"was lost; of {self.answers[UNANSWERED]} calls without an answer {made} were made")
 
 
 if __name__ == "__main__":

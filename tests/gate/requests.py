@@ -3,6 +3,7 @@
 
 scene.py tells the usage.
 """
+import collections
 import contextlib
 import re
 import resource
@@ -29,6 +30,7 @@ CLOSE = " close"
 
 USES = 1000
 LONGEST_ID = "x" * 1024
+BLANK_ID = "x " * 70 + "x"  # nobody's id can come so
 
 
 def call(headers="", line=LINE, auth=AUTH, host=HOST):
@@ -194,6 +196,7 @@ ROWS = [
     ("the longest id", bearer("Bearer " + LONGEST_ID), [GRANTED]),
     ("the beginning of an id", bearer("Bearer {id:.126}"), [REFUSED]),
     ("an id and a letter", bearer("Bearer {id}x"), [REFUSED]),
+    ("an id with blanks in it", bearer("Bearer " + BLANK_ID), [REFUSED]),
     ("an id and a word", bearer("Bearer {id} x"), [REFUSED]),
     ("two ids in one header", bearer("Bearer {id}, Bearer {id}"), [REFUSED]),
     ("a quoted id", bearer('Bearer "{id}"'), [REFUSED]),
@@ -259,8 +262,9 @@ class Requests(scene.Scene):
         super().setUpClass()
         cls.id = cls.token(USES)
         with cls.database() as database:
-            database.execute("INSERT INTO token SELECT ?, bind_sid, uid, deadline, count, create_time, function, "
-                             "webapi_allow, extra FROM token", (LONGEST_ID,))
+            for id in (LONGEST_ID, BLANK_ID):
+                database.execute("INSERT INTO token SELECT ?, bind_sid, uid, deadline, count, create_time, function, "
+                                 "webapi_allow, extra FROM token LIMIT 1", (id,))
         cls.start_gate(preexec_fn=few_descriptors)
 
     def connect(self, text=""):
@@ -288,11 +292,13 @@ class Requests(scene.Scene):
     def test_each_is_answered_exactly(self):
         self.assertGreaterEqual(len(ROWS), 100)
         self.assertEqual(len({row[0] for row in ROWS}), len(ROWS))
+        before, told = self.told(), collections.Counter(["200"])  # that answer
         idle = [self.connect() for _ in range(100)]  # more than the descriptors that it was started with
         for name, text, expected in ROWS:
             with self.subTest(name):
                 left = self.left()
                 received = self.received(self.connect(text), text)
+                told.update(one[:3] for one in received)
                 self.assertEqual(received, [GRANTED if one == AGAIN else one for one in expected])
                 spent = sum(one.startswith(GRANTED) and one != AGAIN for one in expected)
                 self.assertEqual(self.left(), left - spent)
@@ -300,6 +306,14 @@ class Requests(scene.Scene):
             for byte in self.bytes(GOOD):
                 idle[0].sendall(bytes([byte]))
             self.assertEqual(self.received(idle[0], GOOD), [GRANTED])
+            told["200"] += 1
+        self.assertEqual(self.told() - before, told)
+
+    def told(self):
+        """How often each status was answered, as the gate counts it."""
+        text = self.answer("status", path="/metrics")[2]
+        lines = re.findall(r'^vemo_gate_responses_total{status="(\d+)"} (\d+)$', text, re.MULTILINE)
+        return collections.Counter({status: int(number) for status, number in lines})
 
     def test_nothing_is_spent_while_another_program_holds_the_database(self):
         left = self.left()
