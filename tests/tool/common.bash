@@ -1,111 +1,68 @@
-# Loaded by the tests of the tool. Each test has a directory of its own, in which the private directory
-# and the database stand.
-#   tool ARGUMENTS...       the tool, as the administrator calls it
-#   sql STATEMENTS          on the database, behind the tool's back
-#   a_token [OPTIONS...]    creates a token and prints its id
-#   row NAME [COLUMN = VALUE, ...]  a token whose id is the name, of 8 characters, and $ZEROS; behind the tool's
-#                           back. Its fields are those of ROW, which a file can set otherwise.
-#   state                   what there is of the private directory, to the byte
-#   whole                   the lines of standard input as a whole export: with the end behind them
-#   in_namespace COMMANDS   the real path, where there is nothing else
-#   run_tool ARGUMENTS...   runs it: $status, $output (standard output), $lines (of it, but for empty ones), $stderr
+# Loaded by the tests of the tool. Each test has a directory of its own, $DIR, with the private directory and the
+# database in it.
+#
+# It calls the tool by one of these; each is explained below:
+#   tool, run_tool and expect, succeeds, gives, fails, refuses, on_terminal, in_namespace
+# makes what there is to work on with these:
+#   a_token, row, rows, many_rows, whole
+# and looks at the result with these:
+#   sql, expect_left, state
 
 bats_require_minimum_version 1.5.0
 
 TOOL=${VEMO_TEST_TOOL:?names the tool: built with the redirection linked in}
 
-ZEROS=$(printf '%0119d' 0)
+REAL_DB=/usr/vemo/etc/private/session/vemo-access-token.db
+REAL_DIRECTORY=${REAL_DB%/*}
+ID_LENGTH=127
+ZEROS=$(printf '%0*d' $((ID_LENGTH - 8)) 0)
 ROW="'', 0, 9999999999, 1, 1000000000, 'VPN', '{\"Api\":{\"method\":[\"get\"]}}', '{}'"
+
+# What each command says of a store that is not as it should be.
+NO_DIRECTORY="there is no directory $REAL_DIRECTORY; \"vemo-access-token init\" makes it"
+NO_FILE="there is no database $REAL_DB; \"vemo-access-token init\" makes it"
+NO_TABLE="$REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
+NO_DATABASE="$REAL_DB is not a token database, or is damaged (file is not a database)"
 
 setup()
 {
     DIR=$BATS_TEST_TMPDIR
     export VEMO_REDIRECT_DIR=$DIR/session
     DB=$VEMO_REDIRECT_DIR/vemo-access-token.db
-    REAL_DB=/usr/vemo/etc/private/session/vemo-access-token.db
     export TZ=Europe/Berlin
     unset NO_COLOR
 }
 
+# tool ARGUMENTS...: the tool, as the administrator calls it
 tool()
 {
     "$TOOL" "$@"
 }
 
-# What "run --separate-stderr" does, in a third of the time.
+# text_of VARIABLE FILE: sets it to what $(<FILE) is, without a process for that
+text_of()
+{
+    local -n text=$1
+    IFS= read -r -d '' text <"$2" || true
+    while [[ $text == *$'\n' ]]; do
+        text=${text%$'\n'}
+    done
+}
+
+# run_tool ARGUMENTS...: sets $status, $output (standard output), $lines (those of it that are not empty) and $stderr.
+# It does what "run --separate-stderr" does, in a third of the time.
 run_tool()
 {
     local streams=$BATS_TEST_TMPDIR.streams
     status=0
     "$TOOL" "$@" >"$streams" 2>"$streams.errors" || status=$?
-    output=$(<"$streams")
-    stderr=$(<"$streams.errors")
+    text_of output "$streams"
+    text_of stderr "$streams.errors"
     local IFS=$'\n'
     set -f
     # shellcheck disable=SC2034,SC2206 # for the tests, which want the lines
     lines=($output)
     set +f
-}
-
-sql()
-{
-    sqlite3 "$DB" "$1"
-}
-
-a_token()
-{
-    [ -e "$DB" ] || tool init >/dev/null
-    tool create --uid 0 --function VPN "$@"
-}
-
-row()
-{
-    [ -e "$DB" ] || tool init >/dev/null
-    sql "INSERT INTO token VALUES ('$1$ZEROS', $ROW);
-         ${2:+UPDATE token SET $2 WHERE rowid = last_insert_rowid();}"
-}
-
-whole()
-{
-    local lines
-    lines=$(mktemp "$BATS_TEST_TMPDIR.XXXXXX")
-    cat >"$lines"
-    cat "$lines"
-    printf '{"end":{"sha256":"%s","tokens":%d}}\n' "$(sha256sum <"$lines" | cut -c 1-64)" \
-        "$(grep -c '[^[:space:]]' "$lines")"
-}
-
-state()
-{
-    [ ! -e "$VEMO_REDIRECT_DIR" ] || find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
-    [ ! -f "$DB" ] || sha256sum "$DB"
-}
-
-# refuses [ARGUMENTS]...: each line "ARGUMENTS|SENTENCE" of standard input, behind those, is a call that fails
-# with status 2 and that sentence. All of them change nothing.
-refuses()
-{
-    local arguments sentence before
-    before=$(state)
-    while IFS='|' read -r arguments sentence; do
-        echo "$arguments"
-        eval "run_tool $* $arguments" </dev/null
-        expect 2 "" "vemo-access-token: $sentence"
-    done
-    [ "$(state)" = "$before" ]
-}
-
-# in_namespace COMMANDS ARGUMENTS...: runs them as root of a namespace, where a layer in memory lies over /usr
-in_namespace()
-{
-    local overlay='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
-        mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr'
-    [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
-    mkdir "$DIR/layer"
-    unshare --user --map-root-user --mount bash -c "$overlay" "$DIR/layer" 2>/dev/null ||
-        skip "no namespace with an overlay here"
-    run --separate-stderr unshare --user --map-root-user --mount bash -c "unset VEMO_REDIRECT_DIR; $overlay; $1" \
-        "$DIR/layer" "${@:2}"
 }
 
 # expect STATUS OUTPUT [STDERR]: the result of run_tool, exactly
@@ -120,4 +77,145 @@ expect()
         echo "stderr:   $stderr"
         return 1
     fi
+}
+
+# succeeds ARGUMENTS...: the tool ends with status 0 and says nothing on standard error; what it prints is $output
+succeeds()
+{
+    run_tool "$@"
+    expect 0 "$output"
+}
+
+# gives OUTPUT ARGUMENTS...: the tool succeeds and prints that, and nothing on standard error
+gives()
+{
+    run_tool "${@:2}"
+    expect 0 "$1"
+}
+
+# fails STATUS SENTENCE ARGUMENTS...: the tool ends with that status and that sentence, and prints no result
+fails()
+{
+    run_tool "${@:3}"
+    expect "$1" "" "vemo-access-token: $2"
+}
+
+# refuses [ARGUMENTS...]: each line "ARGUMENTS|SENTENCE" of standard input, behind those, is a call that fails
+# with status 2 and that sentence. The line can redirect standard input. All of the calls change nothing.
+refuses()
+{
+    local arguments sentence before
+    before=$(state)
+    while IFS='|' read -r arguments sentence; do
+        echo "$arguments"
+        eval "run_tool $* $arguments" </dev/null
+        expect 2 "" "vemo-access-token: $sentence"
+    done
+    [ "$(state)" = "$before" ]
+}
+
+# on_terminal [OPTIONS OF terminal.py...] -- ARGUMENTS...: as run_tool, with all streams on a terminal; $output is what
+# it shows, and the file $DIR/modes tells of its modes
+on_terminal()
+{
+    run --separate-stderr "$BATS_TEST_DIRNAME/terminal.py" --modes "$DIR/modes" "$@"
+}
+
+# in_namespace COMMANDS ARGUMENTS...: bash executes them as root of a namespace where a file system in memory lies over
+# /usr; there the tool works on the real path, and nothing is there yet
+in_namespace()
+{
+    local overlay='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
+        mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr'
+    [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
+    mkdir "$DIR/layer"
+    unshare --user --map-root-user --mount bash -c "$overlay" "$DIR/layer" 2>/dev/null ||
+        skip "no namespace with an overlay here"
+    run --separate-stderr unshare --user --map-root-user --mount bash -c "unset VEMO_REDIRECT_DIR; $overlay; $1" \
+        "$DIR/layer" "${@:2}"
+}
+
+# need_store: makes the store, if there is none
+need_store()
+{
+    [ -e "$DB" ] || tool init >/dev/null
+}
+
+# a_token [OPTIONS...]: creates a token and prints its id
+a_token()
+{
+    need_store
+    tool create --uid 0 --function VPN "$@"
+}
+
+# inserted NAME [COLUMN = VALUE, ...]: sets $inserted to statements that insert a token as $ROW has it, but for
+# these columns. Its id is the name and zeros.
+inserted()
+{
+    printf -v inserted "INSERT INTO token VALUES ('%s%0*d', %s);" "$1" $((ID_LENGTH - ${#1})) 0 "$ROW"
+    [ -z "${2-}" ] || inserted+="UPDATE token SET $2 WHERE rowid = last_insert_rowid();"
+}
+
+# row NAME [COLUMN = VALUE, ...]: inserts that token behind the tool's back
+row()
+{
+    local inserted
+    need_store
+    inserted "$@"
+    sql "$inserted"
+}
+
+# rows: the same for each line "NAME|COLUMN = VALUE, ..." of standard input
+rows()
+{
+    local name columns inserted statements=
+    need_store
+    while IFS='|' read -r name columns; do
+        inserted "$name" "$columns"
+        statements+=$inserted
+    done
+    sql "BEGIN; $statements COMMIT"
+}
+
+# many_rows NUMBER [COLUMN = VALUE, ...]: inserts so many tokens, whose ids are numbers from 1 on
+many_rows()
+{
+    need_store
+    sql "BEGIN; WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < $1)
+         INSERT INTO token SELECT printf('%0${ID_LENGTH}d', i), $ROW FROM n; ${2:+UPDATE token SET $2;} COMMIT"
+}
+
+# whole: the lines of standard input as a whole export, with the end behind them
+whole()
+{
+    local lines
+    lines=$(mktemp "$BATS_TEST_TMPDIR.XXXXXX")
+    cat >"$lines"
+    cat "$lines"
+    printf '{"end":{"sha256":"%s","tokens":%d}}\n' "$(sha256sum <"$lines" | cut -c 1-64)" \
+        "$(grep -c '[^[:space:]]' "$lines")"
+}
+
+# sql STATEMENTS: on the database, behind the tool's back
+sql()
+{
+    sqlite3 -cmd "PRAGMA synchronous = OFF" "$DB" "$1"
+}
+
+# expect_left NAME...: these tokens are there, in order, and no others; their ids are the names and zeros
+expect_left()
+{
+    local left
+    left=$(sql "SELECT rtrim(tid, '0') FROM token ORDER BY 1" | xargs)
+    [ "$left" = "$*" ] || {
+        echo "there are: $left"
+        return 1
+    }
+}
+
+# state: what there is of the private directory, to the byte
+state()
+{
+    [ ! -e "$VEMO_REDIRECT_DIR" ] || find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
+    [ ! -f "$DB" ] || sha256sum "$DB"
 }
