@@ -10,38 +10,6 @@ setup_file()
     export LC_ALL=C.UTF-8
 }
 
-# on_terminal [OPTIONS OF terminal.py...] -- ARGUMENTS...: the tool, with all streams on a terminal
-on_terminal()
-{
-    local options=()
-    while [ "$1" != -- ]; do
-        options+=("$1")
-        shift
-    done
-    shift
-    run --separate-stderr "$BATS_TEST_DIRNAME/terminal.py" --modes "$DIR/modes" "${options[@]}" "$TOOL" "$@"
-}
-
-# sh_on_terminal [OPTIONS OF terminal.py...] -- SCRIPT ARGUMENTS...: the same through a shell, for
-# redirections; the tool is $0 in the script
-sh_on_terminal()
-{
-    local options=()
-    while [ "$1" != -- ]; do
-        options+=("$1")
-        shift
-    done
-    local script=$2
-    shift 2
-    run --separate-stderr "$BATS_TEST_DIRNAME/terminal.py" --modes "$DIR/modes" "${options[@]}" \
-        sh -c "$script" "$TOOL" "$@"
-}
-
-tokens()
-{
-    sql "SELECT count(*) FROM token"
-}
-
 # below TITLE: all that stands below a title of the table in $output, joined, without blanks
 below()
 {
@@ -83,7 +51,7 @@ $id" # the result
 }
 
 @test "a prompt can be left with nothing" {
-    a_token >"$DIR/id"
+    row token---
     local reply
     for reply in $'\r' $'\x04'; do
         on_terminal --answer "Token id: " "$reply" -- show -
@@ -91,19 +59,22 @@ $id" # the result
 vemo-access-token: TID: there is no id on standard input"
         [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
     done
+    on_terminal --answer "Token id: " $'\r' -- revoke -
+    expect 0 "Token id: 
+0 tokens revoked
+vemo-access-token: no token matches"
 }
 
 @test "Ctrl-C at a prompt or a question leaves the terminal and the tokens as they were" {
-    a_token >"$DIR/id"
-    on_terminal --answer "Token id: " "$(cut -c1-20 "$DIR/id")"$'\x03' -- revoke -
-    [ "$status" -eq 130 ]
-    [ "$output" = "Token id: " ]
+    row token---
+    on_terminal --answer "Token id: " $'token---00\x03' -- revoke -
+    [ "$status $output" = "130 Token id: " ]
     [ "$(cat "$DIR/modes")" = "typed: hidden
 modes: as before" ]
     on_terminal --answer "[y/N] " $'\x03' -- revoke --all
     [ "$status" -eq 130 ]
     [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
-    [ "$(tokens)" -eq 1 ]
+    expect_left token---
     # The same behind a bar, which goes on while the tool waits for the lock.
     exec 9>>"$VEMO_REDIRECT_DIR.lock"
     flock 9
@@ -113,66 +84,67 @@ modes: as before" ]
 }
 
 @test "the prompt does not get into the result, and ids from a pipe need none" {
-    local id
-    id=$(a_token --allow Api)
-    sh_on_terminal --answer "Token id: " "$id"$'\r' -- '"$0" check - Api >"$1"' "$DIR/result"
+    row token---
+    on_terminal --answer "Token id: " $'token---\r' --shell '"$0" check - Api >"$1"' -- "$DIR/result"
     expect 0 "Token id: "
     [ "$(cat "$DIR/result")" = allowed ]
-    sh_on_terminal -- 'echo "$1" | "$0" check - Api' "$id"
+    on_terminal --shell 'echo token--- | "$0" check - Api' --
     expect 0 allowed
 }
 
-@test "many tokens are revoked when the answer is yes" {
+@test "many tokens are revoked when the answer is yes, and left alone at any other" {
     local reply selection
-    for reply in y yes; do
-        for selection in --all "--function VPN" "--uid 0" "--user root" "--bind-sid s"; do
-            a_token --bind-sid s >"$DIR/id"
-            a_token --bind-sid s >"$DIR/id"
-            # shellcheck disable=SC2086
-            on_terminal --answer "Revoke 2 tokens? [y/N] " "$reply"$'\r' -- revoke $selection
-            expect 0 "Revoke 2 tokens? [y/N] $reply
-2 tokens revoked"
-            [ "$(tokens)" -eq 0 ]
-        done
-    done
-}
-
-@test "many tokens are left alone at any other answer" {
-    a_token >"$DIR/id"
-    local reply
+    rows <<'END'
+first|bind_sid = 's'
+second|bind_sid = 's'
+END
+    cp "$DB" "$DIR/both"
     for reply in n no '' yep Ye ' '; do
-        on_terminal --answer "Revoke 1 token? [y/N] " "$reply"$'\r' -- revoke --all
-        expect 0 "Revoke 1 token? [y/N] $reply
+        on_terminal --answer "Revoke 2 tokens? [y/N] " "$reply"$'\r' -- revoke --all
+        expect 0 "Revoke 2 tokens? [y/N] $reply
 0 tokens revoked"
     done
-    on_terminal --answer "Revoke 1 token? [y/N] " $'\x04' -- revoke --all
-    [ "$status" -eq 0 ]
-    [ "${lines[-1]}" = "0 tokens revoked" ] # on a line of its own
-    [ "$(tokens)" -eq 1 ]
+    on_terminal --answer "Revoke 2 tokens? [y/N] " $'\x04' -- revoke --all
+    [ "$status ${lines[-1]}" = "0 0 tokens revoked" ] # on a line of its own
+    expect_left first second
+    while IFS='|' read -r reply selection; do
+        # shellcheck disable=SC2086
+        on_terminal --answer "Revoke 2 tokens? [y/N] " "$reply"$'\r' -- revoke $selection
+        expect 0 "Revoke 2 tokens? [y/N] $reply
+2 tokens revoked"
+        cp "$DIR/both" "$DB"
+    done <<'TABLE'
+y|--all
+yes|--function VPN
+y|--uid 0
+yes|--user root
+y|--bind-sid s
+TABLE
+    sql "DELETE FROM token WHERE tid LIKE 'first%'"
+    on_terminal --answer "[y/N] " $'y\r' --shell '"$0" revoke --all >"$1"' -- "$DIR/result"
+    expect 0 "Revoke 1 token? [y/N] y"
+    [ "$(cat "$DIR/result")" = "1 token revoked" ]
 }
 
 @test "nothing is asked where it is clear, or nobody to ask" {
-    local id
-    id=$(a_token)
+    rows <<'END'
+token---
+another-
+END
     on_terminal -- revoke --all --dry-run
-    expect 0 "1 token would be revoked"
+    expect 0 "2 tokens would be revoked"
     on_terminal -- revoke --function Other
     expect 0 "0 tokens revoked"
-    sh_on_terminal -- '"$0" revoke --all </dev/null'
+    on_terminal --shell '"$0" revoke --all </dev/null' --
     expect 2 "vemo-access-token: repeat with --yes: there is nobody to ask"
-    sh_on_terminal -- '"$0" revoke --all 2>"$1"' "$DIR/stderr"
+    on_terminal --shell '"$0" revoke --all 2>"$1"' -- "$DIR/stderr"
     expect 2 ""
     [ "$(cat "$DIR/stderr")" = "vemo-access-token: repeat with --yes: there is nobody to ask" ]
-    [ "$(tokens)" -eq 1 ]
-    on_terminal -- revoke "$id"
+    expect_left another- token---
+    on_terminal -- revoke token---
     expect 0 "1 token revoked"
-    a_token >"$DIR/id"
     on_terminal -- revoke --all --yes
     expect 0 "1 token revoked"
-    a_token >"$DIR/id"
-    sh_on_terminal --answer "[y/N] " $'y\r' -- '"$0" revoke --all >"$1"' "$DIR/result"
-    expect 0 "Revoke 1 token? [y/N] y"
-    [ "$(cat "$DIR/result")" = "1 token revoked" ]
 }
 
 @test "expired tokens are red" {
@@ -201,9 +173,9 @@ modes: as before" ]
     on_terminal -- list -o json
     [ "$status" -eq 0 ]
     [[ $output != *"$ESC"* ]]
-    sh_on_terminal -- '"$0" list --no-header --epoch >"$1"' "$DIR/result"
+    on_terminal --shell '"$0" list --no-header --epoch >"$1"' -- "$DIR/result"
     expect 0 ""
-    sh_on_terminal -- '"$0" list --no-header --epoch --verbose >"$1"' "$DIR/result-verbose"
+    on_terminal --shell '"$0" list --no-header --epoch --verbose >"$1"' -- "$DIR/result-verbose"
     expect 0 ""
     cmp "$DIR/result" "$DIR/result-verbose"
     [ "$(cat "$DIR/result")" = "$(tool list --no-header --epoch)" ]
@@ -215,24 +187,21 @@ modes: as before" ]
 }
 
 @test "doctor's marks are coloured" {
-    a_token >"$DIR/id"
-    local id
-    id=$(cut -c1-8 "$DIR/id")
-    sql "UPDATE token SET deadline = 0"
+    row token--- "deadline = 0"
     chmod 0755 "$VEMO_REDIRECT_DIR"
     NO_COLOR=1 on_terminal -- doctor
     [ "$status" -eq 5 ]
     [ "$(grep -v '^ ' <<<"$output")" = "error: ${REAL_DB%/*} has mode 0755
-warning: a deadline of 0 or less in 1 token ($id)" ]
+warning: a deadline of 0 or less in 1 token (token---)" ]
     NO_COLOR= on_terminal -- doctor
     [ "$status" -eq 5 ]
     [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[31merror${ESC}[0m: ${REAL_DB%/*} has mode 0755
-${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
+${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
     on_terminal -- doctor --repair
     [ "$status" -eq 5 ]
     [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[32mrepaired${ESC}[0m: ${REAL_DB%/*} has mode 0755
-${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token ($id)" ]
-    sh_on_terminal -- '"$0" doctor >"$1"' "$DIR/result"
+${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
+    on_terminal --shell '"$0" doctor >"$1"' -- "$DIR/result"
     expect 5 ""
     [[ $(cat "$DIR/result") == "warning: "* ]]
 }
@@ -346,12 +315,12 @@ export "$EVIL/x"
 list --verbose --function "$EVIL" # which lacks its table now
 TABLE
     # shellcheck disable=SC2016
-    LC_ALL=$1 sh_on_terminal --columns 200 -- '
+    LC_ALL=$1 on_terminal --columns 200 --shell '
         while read -r arguments; do
             case $arguments in *--verbose*) sqlite3 "$2" "DROP TABLE token" ;; esac
             echo "$arguments"
             eval "\"\$0\" $arguments"
-        done <"$1"' "$DIR/commands" "$DB"
+        done <"$1"' -- "$DIR/commands" "$DB"
 }
 
 @test "what tokens and arguments hold cannot command the terminal" {
@@ -374,8 +343,7 @@ TABLE
     done
     [[ $output == *Û* ]]
     # Elsewhere a value comes out as it is.
-    run_tool show "$ID" --field function
-    expect 0 "$EVIL"
+    gives "$EVIL" show "$ID" --field function
 }
 
 @test "what is read by people stays readable on the terminal" {
@@ -404,72 +372,61 @@ bar()
     }
 }
 
-@test "export, import and tune show a progress bar on a terminal" {
-    a_token >"$DIR/id"
-    a_token >"$DIR/id"
+@test "export, import and tune show a progress bar on a terminal, which is none of the result" {
+    many_rows 2
     on_terminal -- export "$DIR/lines"
-    [ "$status" -eq 0 ]
     bar Exporting
-    [ "$(tail -n +2 <<<"$output")" = "vemo-access-token: 2 tokens exported" ]
+    expect 0 "${lines[0]}
+vemo-access-token: 2 tokens exported"
+    on_terminal --shell '"$0" export >"$1"' -- "$DIR/result"
+    bar Exporting
+    expect 0 "${lines[0]}
+vemo-access-token: 2 tokens exported"
+    cmp "$DIR/result" "$DIR/lines"
+    on_terminal --shell '"$0" tune >"$1"' -- "$DIR/result"
+    bar Tuning
+    expect 0 "${lines[0]}"
+    [[ $(head -n 1 "$DIR/result") =~ ^WHAT\ +BEFORE\ +AFTER$ ]]
 
+    # One that does not come to its end is ended before the reason is told.
+    sql "DELETE FROM token WHERE rowid = 1"
+    on_terminal -- import "$DIR/lines"
+    [[ ${lines[0]} == $'\r'"Importing ["* ]]
+    expect 2 "${lines[0]}
+vemo-access-token: $DIR/lines: line 2 has the id of a token that is there already; nothing of this file was imported"
     sql "DELETE FROM token"
     on_terminal -- import "$DIR/lines"
-    [ "$status" -eq 0 ]
     bar Importing
-    [ "$(tail -n +2 <<<"$output")" = "2 tokens imported" ]
+    expect 0 "${lines[0]}
+2 tokens imported"
 
-    # It is on standard error, and not in the result.
-    sh_on_terminal -- '"$0" export >"$1"' "$DIR/result"
-    [ "$status" -eq 0 ]
-    bar Exporting
-    cmp "$DIR/result" "$DIR/lines"
-    sh_on_terminal -- '"$0" tune >"$1"' "$DIR/result"
-    [ "$status" -eq 0 ]
-    bar Tuning
-    [ "${#lines[@]}" -eq 1 ]
-    [[ $(head -n 1 "$DIR/result") =~ ^WHAT\ +BEFORE\ +AFTER$ ]]
+    # The words of a table are as where there is room.
+    on_terminal --columns 20 -- tune --undo
+    [[ ${lines[0]} == *$'\rTuning [########################################] 100 %' ]]
+    [[ $output == *$'\nlook for expired tokens, as every call does  '* ]]
 }
 
-@test "a progress bar that does not come to its end is ended before the reason is told" {
-    a_token >"$DIR/id"
-    a_token >"$DIR/id"
-    tool export "$DIR/lines" 2>/dev/null
-    sql "DELETE FROM token WHERE tid <> '$(cat "$DIR/id")'"
-    on_terminal -- import "$DIR/lines"
-    [ "$status" -eq 2 ]
-    [[ ${lines[0]} == $'\r'"Importing ["* ]]
-    [ "${lines[1]}" = "vemo-access-token: $DIR/lines: line 2 has the id of a token that is there already; nothing of this file was imported" ]
-}
-
-@test "there is no progress bar where standard error is no terminal" {
-    a_token >"$DIR/id"
-    a_token >"$DIR/id"
-    sh_on_terminal -- '"$0" export "$1" 2>"$2"' "$DIR/lines" "$DIR/stderr"
+@test "there is no progress bar where standard error is no terminal, or the result goes to the same" {
+    many_rows 2
+    on_terminal --shell '"$0" export "$1" 2>"$2"' -- "$DIR/lines" "$DIR/stderr"
     expect 0 ""
     [ "$(cat "$DIR/stderr")" = "vemo-access-token: 2 tokens exported" ]
     sql "DELETE FROM token"
-    sh_on_terminal -- '"$0" import "$1" 2>"$2"' "$DIR/lines" "$DIR/stderr"
+    on_terminal --shell '"$0" import "$1" 2>"$2"' -- "$DIR/lines" "$DIR/stderr"
     expect 0 "2 tokens imported"
     [ ! -s "$DIR/stderr" ]
-    sh_on_terminal -- '"$0" tune 2>"$1" | tail -n 1 | cut -c1-20' "$DIR/stderr"
+    on_terminal --shell '"$0" tune 2>"$1" | tail -n 1 | cut -c1-20' -- "$DIR/stderr"
     expect 0 "write a small change"
     [ ! -s "$DIR/stderr" ]
-}
-
-@test "an export to the terminal is not mixed with a progress bar" {
-    a_token >"$DIR/id"
-    a_token >"$DIR/id"
     on_terminal --columns 1000 -- export
     expect 0 "$(tool export 2>/dev/null)
 vemo-access-token: 2 tokens exported"
 }
 
 @test "a terminal that was stopped holds up nobody but the tool itself" {
-    tool init
-    local i
-    for ((i = 0; i < 300; ++i)); do
-        printf '{"tid":"%0127d","bind_sid":"","uid":0,"deadline":9999999999,"count":1,"create_time":1,"function":"f","webapi_allow":{},"extra":{}}\n' "$i"
-    done | whole >"$DIR/file"
+    many_rows 300
+    tool export "$DIR/file"
+    sql "DELETE FROM token"
     local arguments
     for arguments in "import $DIR/file" tune; do
         # It is stopped as soon as the bar shows, and let go when another program has worked.

@@ -1,34 +1,72 @@
-#!/usr/bin/python3
-"""Runs a program on a terminal of its own and prints what the terminal shows.
+#!/usr/bin/python3 -IS
+"""Runs the tool on a terminal of its own and prints what the terminal shows.
 
-terminal.py [--columns N] [--modes FILE] [--answer TEXT REPLY]... PROGRAM ARGUMENTS...
+terminal.py [--columns N] [--modes FILE] [--answer TEXT REPLY]... [--shell SCRIPT] -- ARGUMENTS...
 
+The tool is that of VEMO_TEST_TOOL; with a script, sh runs that, and the tool is its $0.
 When the terminal shows TEXT, REPLY is typed, as $'...' of the shell has it: return is \\r, Ctrl-C \\x03,
 Ctrl-D \\x04. With several answers, one after the other. FILE receives a line for each, whether the terminal
 showed then what was typed, and one at the end, whether its modes are those of the start.
 The exit status is the program's, as a shell tells it; 99 when a TEXT or the program's end did not come.
 """
 
-import argparse
+import fcntl
 import os
 import pty
+import select
 import signal
+import struct
 import sys
 import termios
 import time
 
-import pexpect
-
 TIMEOUT = 20  # seconds
+FLAGS = 3  # where termios.tcgetattr() has the local ones
+
+
+def command_line():
+    """Returns the options by their names, the answers as pairs, and what to run."""
+    options = {"--columns": "80", "--modes": os.devnull, "--shell": ""}
+    answers = []
+    rest = iter(os.fsencode(argument) for argument in sys.argv[1:])
+    for option in rest:
+        if option == b"--":
+            break
+        if option == b"--answer":
+            answers.append((next(rest), next(rest)))
+        else:
+            options[option.decode()] = next(rest)
+    script = options["--shell"]
+    return options, answers, [*(["sh", "-c", script] if script else []), os.environ["VEMO_TEST_TOOL"], *rest]
+
+
+def start(command, columns):
+    """Returns the process that runs the command, and the terminal that all its streams are on."""
+    pid, terminal = pty.fork()
+    if pid == 0:
+        fcntl.ioctl(0, termios.TIOCSWINSZ, struct.pack("4H", 24, columns, 0, 0))
+        signal.signal(signal.SIGINT, signal.SIG_DFL)  # what runs in the background of a script ignores it
+        os.execvp(command[0], command)
+    return pid, terminal
 
 
 def initial_modes():
-    """The modes of a terminal that no program has touched."""
+    """Returns the modes of a terminal that no program has touched."""
     own, other = pty.openpty()
     modes = termios.tcgetattr(other)
     os.close(own)
     os.close(other)
     return modes
+
+
+def read_on(terminal):
+    """Returns what the terminal shows next, and nothing when all programs have closed it."""
+    if not select.select([terminal], [], [], TIMEOUT)[0]:
+        raise TimeoutError
+    try:
+        return os.read(terminal, 1 << 16)
+    except OSError:
+        return b""
 
 
 def wait_until_it_sleeps(pid):
@@ -41,40 +79,41 @@ def wait_until_it_sleeps(pid):
         time.sleep(0.001)
 
 
-def main():
-    parser = argparse.ArgumentParser()
-    parser.add_argument("--columns", type=int, default=80)
-    parser.add_argument("--modes", default=os.devnull)
-    parser.add_argument("--answer", nargs=2, action="append", default=[])
-    parser.add_argument("command", nargs=argparse.REMAINDER)
-    arguments = parser.parse_args()
-
-    child = pexpect.spawn(arguments.command[0], arguments.command[1:],
-                          dimensions=(24, arguments.columns), timeout=TIMEOUT,
-                          # What runs in the background of a script ignores it.
-                          preexec_fn=lambda: signal.signal(signal.SIGINT, signal.SIG_DFL))
-    child.delaybeforesend = None
-    child.ptyproc.delayafterclose = 0
+def talk(pid, terminal, answers, modes):
+    """Types the answers, and returns all that is shown until the end."""
     shown = b""
-    with open(arguments.modes, "w", encoding="ascii") as modes:
+    answered = 0  # bytes of it
+    for text, reply in answers:
+        while text not in shown[answered:]:
+            more = read_on(terminal)
+            if not more:
+                raise EOFError
+            shown += more
+        answered = shown.index(text, answered) + len(text)
+        hidden = not termios.tcgetattr(terminal)[FLAGS] & termios.ECHO
+        modes.write("typed: " + ("hidden" if hidden else "shown") + "\n")
+        wait_until_it_sleeps(pid)
+        os.write(terminal, reply)
+    while more := read_on(terminal):
+        shown += more
+    return shown
+
+
+def main():
+    options, answers, command = command_line()
+    pid, terminal = start(command, int(options["--columns"]))
+    with open(options["--modes"], "w", encoding="ascii") as modes:
         try:
-            for text, reply in arguments.answer:
-                child.expect_exact(os.fsencode(text))
-                shown += child.before + child.after
-                modes.write("typed: " + ("shown" if child.getecho() else "hidden") + "\n")
-                wait_until_it_sleeps(child.pid)
-                child.send(os.fsencode(reply))
-            child.expect_exact(pexpect.EOF)
-        except (pexpect.EOF, pexpect.TIMEOUT) as failure:
-            print(failure, file=sys.stderr)
-            child.close(force=True)
+            shown = talk(pid, terminal, answers, modes)
+        except (EOFError, TimeoutError) as failure:
+            print("the terminal does not show what is expected:", repr(failure), file=sys.stderr)
+            os.kill(pid, signal.SIGKILL)
             return 99
-        shown += child.before
-        same = termios.tcgetattr(child.child_fd) == initial_modes()
+        same = termios.tcgetattr(terminal) == initial_modes()
         modes.write("modes: " + ("as before" if same else "changed") + "\n")
-    child.wait()
     sys.stdout.buffer.write(shown.replace(b"\r\n", b"\n"))
-    return 128 + child.signalstatus if child.signalstatus else child.exitstatus
+    status = os.waitstatus_to_exitcode(os.waitpid(pid, 0)[1])
+    return status if status >= 0 else 128 - status
 
 
 sys.exit(main())
