@@ -48,7 +48,7 @@ setup_log()
                 ;;
             "revoke token---")
                 for name in one two three four five six; do
-                    row "$name$ZEROS" "function = '$name'"
+                    row "$name" "function = '$name'"
                 done
                 ;;
         esac
@@ -86,7 +86,7 @@ TABLE
     setup_log
     local name
     for name in one two three four five six; do
-        row "$name$ZEROS" "deadline = 5"
+        row "$name" "deadline = 5"
     done
     told >/dev/null
     tool export "$DIR/lines"

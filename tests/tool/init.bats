@@ -21,11 +21,9 @@ made the file $REAL_DB
 made the table of tokens"
     expect_complete
     cp "$DB" "$DIR/made"
-    run_tool init
-    expect 0 "all was there already"
+    gives "all was there already" init
     cmp "$DB" "$DIR/made"
-    run_tool doctor
-    expect 0 "no findings"
+    gives "no findings" doctor
 }
 
 @test "the modes are those of private files whatever the umask" {
@@ -38,56 +36,27 @@ made the table of tokens"
     done
 }
 
-@test "init makes the file where there is only the directory, which stays as it is" {
+@test "init makes the file or the table where only they are missing, and leaves all else as it is" {
     mkdir -m 0750 "$VEMO_REDIRECT_DIR"
-    run_tool init
-    expect 0 "made the file $REAL_DB
-made the table of tokens"
+    gives "made the file $REAL_DB
+made the table of tokens" init
     [ "$(stat -c %a "$VEMO_REDIRECT_DIR")" = 750 ]
     chmod 0700 "$VEMO_REDIRECT_DIR"
     expect_complete
-}
-
-@test "init makes the table in a file that has none" {
-    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
     install -m 0700 /dev/null "$DB"
-    run_tool init
-    expect 0 "made the table of tokens"
+    gives "made the table of tokens" init
     expect_complete
     rm "$DB"
     sql "CREATE TABLE other (a); INSERT INTO other VALUES (1)"
-    run_tool init
-    expect 0 "made the table of tokens"
+    gives "made the table of tokens" init
     [ "$(sql "SELECT a FROM other")" -eq 1 ]
-    run_tool list --count
-    expect 0 0
+    row expired- "deadline = 1"
+    gives "all was there already" init
+    expect_left expired-
 }
 
-@test "init leaves tokens alone, expired ones too" {
-    a_token
-    sql "UPDATE token SET deadline = 1"
-    run_tool init
-    expect 0 "all was there already"
-    [ "$(sql "SELECT count(*) FROM token")" -eq 1 ]
-}
-
-@test "init says what stands in its way, and leaves that" {
-    echo text >"$VEMO_REDIRECT_DIR"
-    run_tool init
-    expect 4 "" "vemo-access-token: ${REAL_DB%/*}: Not a directory"
-    [ "$(cat "$VEMO_REDIRECT_DIR")" = text ]
-    rm "$VEMO_REDIRECT_DIR"
-
-    mkdir -p "$DB"
-    run_tool init
-    expect 4 "" "vemo-access-token: $REAL_DB is not a regular file"
-    rmdir "$DB"
-
-    ln -s nowhere/x "$DB"
-    run_tool init
-    expect 4 "" "vemo-access-token: $REAL_DB is a symbolic link to a file that is not there"
-    rm "$DB"
-
+@test "init and create leave a database alone that a link leads to, and say so where it has no table" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
     sqlite3 "$DIR/other" "CREATE TABLE other (a)"
     cp "$DIR/other" "$DIR/untouched"
     ln -s "$DIR/other" "$DB"
@@ -98,16 +67,8 @@ made the table of tokens"
         cmp "$DIR/other" "$DIR/untouched"
     done
     : >"$DIR/other"
-    run_tool init
-    expect 4 "" "vemo-access-token: $REAL_DB is a symbolic link, and what it leads to has no table of tokens; find out who made it"
+    fails 4 "$REAL_DB is a symbolic link, and what it leads to has no table of tokens; find out who made it" init
     [ ! -s "$DIR/other" ]
-    rm "$DB"
-
-    echo "no database, but a text that is long enough to be told from an empty one" >"$DB"
-    cp "$DB" "$DIR/text"
-    run_tool init
-    expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
-    cmp "$DB" "$DIR/text"
 }
 
 @test "init says why it cannot make what is missing, and what a power cut can undo" {
@@ -134,8 +95,7 @@ TABLE
     local call command output_then
     while IFS='|' read -r call command output_then; do
         rm -r "$VEMO_REDIRECT_DIR"
-        VEMO_TEST_CALLS="$call|$command" run_tool init
-        expect 0 "$(printf '%b' "$output_then")"
+        VEMO_TEST_CALLS="$call|$command" gives "$(printf '%b' "$output_then")" init
     done <<TABLE
 mkdirat session|mkdir -m 0700 $VEMO_REDIRECT_DIR|made the file $REAL_DB\nmade the table of tokens
 openat vemo-access-token.db|cp -p $DIR/made $DB|made the directory ${REAL_DB%/*}
@@ -150,20 +110,13 @@ TABLE
         tool init
         sql "DROP TABLE token; $statement"
         sql .schema >"$DIR/before"
-        run_tool init
-        expect 4 "" "vemo-access-token: $REAL_DB $sentence"
+        fails 4 "$REAL_DB $sentence" init
         [ "$(sql .schema)" = "$(cat "$DIR/before")" ]
     done <<'TABLE'
 CREATE TABLE other (tid); CREATE VIEW token AS SELECT * FROM other|has a view in the place of the table of tokens; "vemo-access-token doctor" tells what helps
 CREATE VIRTUAL TABLE Token USING fts4(tid)|has a virtual table in the place of the table of tokens; "vemo-access-token doctor" tells what helps
 CREATE TABLE other (tid); CREATE INDEX token ON other (tid)|failed: there is already an index named token
 TABLE
-}
-
-@test "bad arguments of init end in a sentence that names them" {
-    run_tool init now
-    expect 2 "" "vemo-access-token: unexpected argument \"now\""
-    [ ! -e "$VEMO_REDIRECT_DIR" ]
 }
 
 @test "init makes the directories above, too, on the real path" {

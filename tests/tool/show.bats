@@ -6,8 +6,7 @@ load common
 # shows_at NUMBER ARGUMENTS...: this way of giving an id finds the token of that number.
 shows_at()
 {
-    run_tool show --field create_time "${@:2}"
-    expect 0 "$1"
+    gives "$1" show --field create_time "${@:2}"
 }
 
 @test "show tells all fields, the whole id too" {
@@ -63,14 +62,10 @@ END
 @test "-o json and jsonl give the record, the whole id too" {
     row token--- "extra = '{\"n\":[1,0.5,null]}', bind_sid = 'session-1', count = -1"
     record='{"bind_sid":"session-1","count":-1,"create_time":1000000000,"deadline":9999999999,"extra":{"n":[1,0.5,null]},"function":"VPN","tid":"token---'$ZEROS'","uid":0,"webapi_allow":{"Api":{"method":["get"]}}}'
-    run_tool show token--- -o jsonl
-    expect 0 "$record"
+    gives "$record" show token--- -o jsonl
     # Nothing of a table's makes a difference.
-    run_tool show token--- -o jsonl --no-header --utc
-    expect 0 "$record"
-    run_tool show token--- --output json
-    [ "$status" -eq 0 ]
-    [ "$stderr" = "" ]
+    gives "$record" show token--- -o jsonl --no-header --utc
+    succeeds show token--- --output json
     [ "${#lines[@]}" -gt 10 ]
     printf %s "$output" >"$DIR/json"
     [ "$(sqlite3 :memory: "SELECT json(CAST(readfile('$DIR/json') AS TEXT))")" = "$record" ]
@@ -81,18 +76,15 @@ END
     run_tool show token--- -o csv --columns tid,session
     expect 0 "tid,session
 token---$ZEROS,\"a,b\""
-    run_tool show token--- -o csv --columns uid --no-header
-    expect 0 0
-    run_tool show token--- --columns uid,session
-    expect 0 $'UID  SESSION\n  0  a,b'
+    gives 0 show token--- -o csv --columns uid --no-header
+    gives $'UID  SESSION\n  0  a,b' show token--- --columns uid,session
     refuses show token--- --columns uid <<<"-o json|--columns is for tables and CSV"
 }
 
 @test "--field gives one field as it is stored" {
     row token--- "bind_sid = ' a', extra = '{\"a\":\"ü\"}', count = -1"
     while IFS='|' read -r field value; do
-        run_tool show token--- --utc --field "$field"
-        expect 0 "$value"
+        gives "$value" show token--- --utc --field "$field"
     done <<END
 tid|token---$ZEROS
 bind_sid| a
@@ -105,32 +97,39 @@ webapi_allow|{"Api":{"method":["get"]}}
 extra|{"a":"ü"}
 END
     # It is stronger than a form.
-    run_tool show token--- --field uid -o json
-    expect 0 0
+    gives 0 show token--- --field uid -o json
 }
 
-@test "texts come through exactly in JSON, and harmless in the table" {
+@test "texts are stored as they are given, and come through exactly in JSON and harmless in tables" {
     export LC_ALL=C.UTF-8
-    text=$'a\'b"c\\d\ne\tf\e[31m\xc2\x9bÄ漢\xff'
+    local text json field expires shown='a'\''b"c\d\x5cx41\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff;--'
+    text=$'a\'b"c\\d\\x41\ne\tf\e[31m\xc2\x9bÄ漢\xff;--'
+    # What is not UTF-8 stays as it is stored, for what reads it to decide.
+    json=$'a\'b\\"c\\\\d\\\\x41\\ne\\tf\\u001b[31m\\u009bÄ漢\xff;--'
     tool init
     tid=$(tool create --uid 0 --function "$text" --bind-sid "$text" --allow "$text:$text" --extra '{"\u001b[31m":"\n"}')
-    # What is not UTF-8 stays as it is stored, for what reads it to decide.
-    json=$'a\'b\\"c\\\\d\\ne\\tf\\u001b[31m\\u009bÄ漢\xff'
+    [ "$(sql "SELECT lower(hex(function)) FROM token WHERE function = bind_sid")" = \
+        "$(printf %s "$text" | od -An -v -tx1 | tr -d ' \n')" ]
     run_tool show "$tid" -o jsonl
     [[ $output == "{\"bind_sid\":\"$json\","*",\"extra\":{\"\\u001b[31m\":\"\\n\"},\"function\":\"$json\","* ]]
     [[ $output == *",\"webapi_allow\":{\"$json\":{\"method\":[\"$json\"]}}}" ]]
+    gives "${output/"$tid"/"${tid:0:8}"}" list -o jsonl
     [[ "$(tool show "$tid" -o json)" == *"\"function\" : \"$json\","* ]]
     for field in function bind_sid; do
-        tool show "$tid" --field $field >"$DIR/field"
-        cmp "$DIR/field" <(printf '%s\n' "$text")
+        gives "$text" show "$tid" --field $field
+        gives "$text" list --field $field
     done
-    shown='a'\''b"c\d\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff'
-    shown_json=${json//$'\xff'/'\xff'}
+    run_tool list --no-header
+    for expires in "in 24 h" "in 23 h"; do
+        [[ $output != *"$expires"* ]] || [[ $output == "${tid:0:8}  root  $shown  1  "*"  $expires  $shown  $shown:$shown" ]]
+    done
+    [[ $output == *"  in 2"* ]]
     run_tool show "$tid" --no-header
-    [ "$status" -eq 0 ]
     [ "${lines[1]}" = "bind_sid      $shown" ]
     [ "${lines[6]}" = "function      $shown" ]
-    [ "${lines[7]}" = "webapi_allow  {\"$shown_json\":{\"method\":[\"$shown_json\"]}}" ]
+    json=${json//\\\\x41/\\\\x5cx41}
+    json=${json//$'\xff'/'\xff'}
+    [ "${lines[7]}" = "webapi_allow  {\"$json\":{\"method\":[\"$json\"]}}" ]
     [ "${lines[8]}" = 'extra         {"\u001b[31m":"\n"}' ]
     # Where the locale knows ASCII alone, nothing else is trusted.
     [[ "$(LC_ALL=C tool show "$tid" --no-header)" == *'\xc2\x9b\xc3\x84\xe6\xbc\xa2\xff'* ]]
@@ -144,8 +143,7 @@ END
     shows_at 2 second--0
     shows_at 2 "second--${ZEROS%0}"
     for tid in "second--${ZEROS}0" "second--1" secondly SECOND-- second_- 'second%%' "second--'" Äcond--; do
-        run_tool show "$tid"
-        expect 3 "" "vemo-access-token: there is no such token"
+        fails 3 "there is no such token" show "$tid"
     done
 }
 
@@ -153,11 +151,9 @@ END
     row prefix-- "create_time = 1"
     sql "INSERT INTO token SELECT tid || 'x', '', 0, 9999999999, 1, 2, 'VPN', '{}', '{}' FROM token;
          INSERT INTO token SELECT 'prefix-~', '', 0, 9999999999, 1, 3, 'VPN', '{}', '{}' FROM token LIMIT 1"
-    run_tool show prefix--
-    expect 2 "" 'vemo-access-token: TID: several tokens begin with "prefix--"; give more of the id'
+    fails 2 'TID: several tokens begin with "prefix--"; give more of the id' show prefix--
     # More of it is not repeated: it may be all but a character of the id.
-    run_tool show "prefix--${ZEROS%0}"
-    expect 2 "" 'vemo-access-token: TID: several tokens begin with "prefix--..."; give more of the id'
+    fails 2 'TID: several tokens begin with "prefix--..."; give more of the id' show "prefix--${ZEROS%0}"
     shows_at 1 "prefix--$ZEROS"
     shows_at 2 "prefix--${ZEROS}x"
     shows_at 3 prefix-~
@@ -165,8 +161,7 @@ END
     row another- "tid = CAST(x'616e6f746865722dff' AS TEXT) || tid, create_time = 4"
     shows_at 4 another-
     row another-
-    run_tool show another-
-    expect 2 "" 'vemo-access-token: TID: several tokens begin with "another-"; give more of the id'
+    fails 2 'TID: several tokens begin with "another-"; give more of the id' show another-
     row bytes--- "tid = CAST(x'ffffffffffffffffff' AS TEXT) || tid, create_time = 5"
     shows_at 5 $'\xff\xff\xff\xff\xff\xff\xff\xff'
 }
@@ -174,21 +169,17 @@ END
 @test "a prefix of less than 8 characters is refused, an id as short as that is not" {
     row token---
     for tid in t token-- "'; --"; do
-        run_tool show "$tid"
-        expect 2 "" "vemo-access-token: TID: \"$tid\" is too short: give the id or its first 8 characters, or more"
+        fails 2 "TID: \"$tid\" is too short: give the id or its first 8 characters, or more" show "$tid"
     done
     row other--- "tid = 't'"
-    run_tool show t --field tid
-    expect 0 t
+    gives t show t --field tid
 }
 
 @test "ids may hold anything" {
     for tid in "' OR 1=1; --" 'percent%_*?[a]' '-dash-in-front' 'two words' 'Ä漢Ä漢Ä漢Ä漢Ä' $'tab\tand\eesc' '"\\" backslash'; do
         row token--- "tid = '${tid//\'/\'\'}-$ZEROS'"
-        run_tool show --field tid -- "$tid"
-        expect 0 "$tid-$ZEROS"
-        run_tool show --field tid - <<<"$tid"
-        expect 0 "$tid-$ZEROS"
+        gives "$tid-$ZEROS" show --field tid -- "$tid"
+        gives "$tid-$ZEROS" show --field tid - <<<"$tid"
     done
 }
 
@@ -202,35 +193,18 @@ END
     shows_at 2 - < <(printf '%s\n\n' "second--$ZEROS")
 }
 
-@test "what is not one id on standard input is refused" {
-    row first---
-    run_tool show - <"$DIR"
-    expect 2 "" "vemo-access-token: standard input: Is a directory"
-    while IFS='|' read -r input sentence; do
-        echo "$input"
-        run_tool show - < <(printf "$input")
-        expect 2 "" "vemo-access-token: TID: $sentence"
-    done <<END
-|there is no id on standard input
-\n\n|there is no id on standard input
-first---\nfirst---\n|there is more than one id on standard input
-first---\0\n|an id on standard input holds a NUL byte
-\0|an id on standard input holds a NUL byte
-first\n|"first" is too short: give the id or its first 8 characters, or more
-END
-    run --separate-stderr bash -c '"$0" show - <&-' "$TOOL"
-    expect 2 "" "vemo-access-token: TID: there is no id on standard input"
-    # Longer than any id, and than a buffer might be.
-    run_tool show - < <(printf '%0100000d' 0)
-    expect 3 "" "vemo-access-token: there is no such token"
-    run_tool show - < <(printf 'first---%0100000d' 0)
-    expect 3 "" "vemo-access-token: there is no such token"
-}
-
 @test "show refuses arguments that it cannot use" {
     tool init
-    refuses show <<'END'
+    refuses show <<END
 |TID is required
+- <$DIR|standard input: Is a directory
+-|TID: there is no id on standard input
+- <&-|TID: there is no id on standard input
+- < <(printf '\n\n')|TID: there is no id on standard input
+- < <(printf 'token---\ntoken---\n')|TID: there is more than one id on standard input
+- < <(printf 'token---\0\n')|TID: an id on standard input holds a NUL byte
+- < <(printf '\0')|TID: an id on standard input holds a NUL byte
+- <<<first|TID: "first" is too short: give the id or its first 8 characters, or more
 ''|TID: the id is empty
 token---0 token---1|unexpected argument "token---1"
 token---0 --show-ids|unknown option "--show-ids"
@@ -240,17 +214,19 @@ token---0 --epoch --utc|--epoch excludes --utc
 END
 }
 
-@test "show spends and purges nothing: the file's bytes stay" {
+@test "show spends and purges nothing, and says so where there is no such token" {
+    local form tid before
     row a------- "deadline = -1"
     row b------- "count = 0"
     before=$(state)
     for form in table json jsonl; do
-        run_tool show a------- -o $form
-        [ "$status" -eq 0 ]
-        run_tool show b------- -o $form
-        [ "$status" -eq 0 ]
+        for tid in a------- b-------; do
+            run_tool show "$tid" -o $form
+            [ "$status" -eq 0 ]
+        done
     done
-    run_tool show c-------
-    expect 3 "" "vemo-access-token: there is no such token"
+    fails 3 "there is no such token" show c-------
+    # Longer than any id, and than a buffer might be.
+    fails 3 "there is no such token" show - < <(printf 'a-------%0100000d' 0)
     [ "$(state)" = "$before" ]
 }

@@ -5,11 +5,6 @@ load common
 
 ROW="'session-1', 0, 9999999999, 5, 1000000000, 'VPN', '{\"Api\":{\"method\":[\"get\"]}}', '{\"n\":[1,\"ü\"]}'"
 
-rows()
-{
-    sql "SELECT * FROM token ORDER BY tid"
-}
-
 @test "each option changes its field, and no other" {
     tool init
     echo '{"file":1}' >"$DIR/extra"
@@ -62,8 +57,7 @@ END
     row token---
     while read -r ttl seconds; do
         before=$(date +%s)
-        run_tool update token--- --ttl $ttl
-        expect 0 "1 token updated"
+        gives "1 token updated" update token--- --ttl $ttl
         [ "$(sql "SELECT deadline - $seconds BETWEEN $before AND $(date +%s) FROM token")" = 1 ]
     done <<'END'
 1w2d 777600
@@ -86,8 +80,7 @@ END
     while IFS='|' read -r stored arguments result; do
         echo "$stored $arguments"
         sql "UPDATE token SET webapi_allow = '$stored'"
-        run_tool update token--- $arguments
-        expect 0 "1 token updated"
+        gives "1 token updated" update token--- $arguments
         [ "$(sql "SELECT webapi_allow FROM token")" = "$result" ]
     done <<'END'
 {"A":{"method":["m"]}}|--allow B --allow C:x,y --allow C:z,x|{"B":{"method":[]},"C":{"method":["x","y","z"]}}
@@ -156,8 +149,7 @@ END
     row token---
     while IFS='|' read -r column stored; do
         sql "UPDATE token SET $column = '$stored'"
-        run_tool update token--- --uses 7 --ttl 1h --bind-sid s
-        expect 0 "1 token updated"
+        gives "1 token updated" update token--- --uses 7 --ttl 1h --bind-sid s
         [ "$(sql "SELECT count, bind_sid, $column FROM token")" = "7|s|$stored" ]
         sql "UPDATE token SET count = 1, bind_sid = '', $column = '{}'"
     done <<'END'
@@ -174,42 +166,22 @@ END
     for arguments in "first--- first---" "first--- first---$ZEROS" "second-- second--000"; do
         set -- $arguments
         sql "UPDATE token SET count = 5"
-        run_tool update "$2" --uses 7
-        expect 0 "1 token updated"
+        gives "1 token updated" update "$2" --uses 7
         [ "$(sql "SELECT substr(tid, 1, 8) FROM token WHERE count = 7")" = "$1" ]
         sql "UPDATE token SET count = 5"
-        run_tool update - --uses 7 <<<"$2"
-        expect 0 "1 token updated"
+        gives "1 token updated" update - --uses 7 <<<"$2"
         [ "$(sql "SELECT substr(tid, 1, 8) FROM token WHERE count = 7")" = "$1" ]
     done
 }
 
 @test "where there is no such token, update says so and changes nothing" {
     row token---
-    before=$(rows)
+    before=$(state)
     for tid in unknown- "token---${ZEROS}0" token--~; do
-        run_tool update "$tid" --unlimited --ttl 1h
-        expect 3 "" "vemo-access-token: there is no such token"
-        run_tool update - --unlimited <<<"$tid"
-        expect 3 "" "vemo-access-token: there is no such token"
+        fails 3 "there is no such token" update "$tid" --unlimited --ttl 1h
+        fails 3 "there is no such token" update - --unlimited <<<"$tid"
     done
-    [ "$(rows)" = "$before" ]
-}
-
-@test "what is not one id on standard input is refused" {
-    row token---
-    before=$(rows)
-    while IFS='|' read -r input sentence; do
-        run_tool update - --uses 7 < <(printf "$input")
-        expect 2 "" "vemo-access-token: TID: $sentence"
-    done <<END
-|there is no id on standard input
-\n\n|there is no id on standard input
-token---\ntoken---\n|there is more than one id on standard input
-token---\0\n|an id on standard input holds a NUL byte
-token--\n|"token--" is too short: give the id or its first 8 characters, or more
-END
-    [ "$(rows)" = "$before" ]
+    [ "$(state)" = "$before" ]
 }
 
 @test "update refuses arguments that it cannot use, and changes nothing" {
@@ -218,6 +190,11 @@ END
     row second-2 "tid = 'second-1x'"
     refuses update <<END
 --uses 2|TID is required
+- --uses 7|TID: there is no id on standard input
+- --uses 7 < <(printf '\n\n')|TID: there is no id on standard input
+- --uses 7 < <(printf 'token---\ntoken---\n')|TID: there is more than one id on standard input
+- --uses 7 < <(printf 'token---\0\n')|TID: an id on standard input holds a NUL byte
+- --uses 7 <<<token--|TID: "token--" is too short: give the id or its first 8 characters, or more
 token---|say what to change; "update --help" lists the fields
 '' --uses 2|TID: the id is empty
 token-- --uses 2|TID: "token--" is too short: give the id or its first 8 characters, or more
@@ -255,8 +232,7 @@ END
     json=$'a\'b\\"c\\\\d\\ne\\tf\\u001b[31mÄ漢\xff;--'
     [ "$(sql "SELECT webapi_allow FROM token")" = \
         "{\"Api\":{\"method\":[\"get\"]},\"$json\":{\"method\":[\"$json\"]}}" ]
-    run_tool update token--- --remove-allow "$text:$text"
-    expect 0 "1 token updated"
+    gives "1 token updated" update token--- --remove-allow "$text:$text"
     run_tool update token--- --remove-allow "$text:$text"
     expect 2 "" 'vemo-access-token: --remove-allow: the token does not list "a'\''b"c\d\x0ae\x09f\x1b[31mÄ漢\xff;--:a'\''b"c\d\x0ae\x09f\x1b[31mÄ漢\xff;--"'
 }
@@ -269,18 +245,14 @@ END
  unless --ttl or --deadline give it time"
     [ "$(sql "SELECT substr(tid, 1, 8), deadline, count FROM token ORDER BY tid")" = "another-|-1|5
 expired-|5|7" ]
-    run_tool update expired- --ttl 1h
-    expect 0 "1 token updated"
-    run_tool update another- --deadline 2060-01-01
-    expect 0 "1 token updated"
-    run_tool check expired- Api get
-    expect 0 allowed
+    gives "1 token updated" update expired- --ttl 1h
+    gives "1 token updated" update another- --deadline 2060-01-01
+    gives allowed check expired- Api get
 }
 
 @test "a note is changed alone, and what cannot hold one stays" {
     row token--- "extra = '{\"a\":[1.5,\"ü\"],\"note\":{}}'"
-    run_tool update token--- --note $'"new"\n'
-    expect 0 "1 token updated"
+    gives "1 token updated" update token--- --note $'"new"\n'
     [ "$(sql "SELECT extra FROM token")" = '{"a":[1.5,"ü"],"note":"\"new\"\n"}' ]
     [ "$(tool list --columns note -o csv --no-header)" = $'"""new""\n"' ]
     run_tool update token--- --note ""

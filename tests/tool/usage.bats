@@ -8,9 +8,8 @@ COMMANDS="create generate list show check grant update rotate revoke purge stats
 # plain ARGUMENTS...: the tool as it ships, without the redirection, as a user who is not root
 plain()
 {
-    local plain
+    local plain drop=()
     plain=$(dirname "$TOOL")/../../tools/vemo-access-token
-    local drop=()
     if [ "$(id -u)" -eq 0 ]; then
         drop=(setpriv --reuid=65534 --regid=65534 --clear-groups)
         "${drop[@]}" test -x "$plain" || skip "uid 65534 cannot reach the build directory"
@@ -18,16 +17,19 @@ plain()
     run --separate-stderr env -u VEMO_REDIRECT_DIR "${drop[@]}" "$plain" "$@"
 }
 
-# into FILE ARGUMENTS...: standard output goes there; "-" closes it
-into()
+# cannot_print REASON FILE ARGUMENTS...: the tool fails for that reason when its standard output goes there; "-"
+# closes it
+cannot_print()
 {
-    local file=$1
-    shift
-    if [ "$file" = - ]; then
-        run --separate-stderr bash -c '"$@" >&-' - "$TOOL" "$@"
+    local errors=$BATS_TEST_TMPDIR.errors
+    status=0 output=
+    if [ "$2" = - ]; then
+        "$TOOL" "${@:3}" >&- 2>"$errors" || status=$?
     else
-        run --separate-stderr bash -c 'file=$1; shift; "$@" >"$file"' - "$file" "$TOOL" "$@"
+        "$TOOL" "${@:3}" >"$2" 2>"$errors" || status=$?
     fi
+    text_of stderr "$errors"
+    expect 4 "" "vemo-access-token: cannot write the result: $1"
 }
 
 # into_closed_pipe ARGUMENTS...: standard output is a pipe that nobody reads any more. A shell may have
@@ -52,36 +54,24 @@ log_lines_only()
     }
 }
 
-tokens()
-{
-    sql "SELECT count(*) FROM token"
-}
-
 @test "--help lists every command and the exit statuses, on standard output" {
-    run_tool --help
-    [ "$status" -eq 0 ]
-    [ "$stderr" = "" ]
+    succeeds --help
     [ "$(sed -n '/^Commands:/,/^$/s/^  \([a-z]*\)  .*/\1/p' <<<"$output" | xargs)" = "$COMMANDS" ]
     [[ $output == "Usage: vemo-access-token [OPTIONS] COMMAND"* ]]
     [[ $output == *"Exit status: 0 done or granted, 1 refused (grant, check), 2 usage,
 3 no such token, 4 store or permission failure, 5 doctor has findings."* ]]
     local help=$output
     for arguments in -h help; do
-        run_tool $arguments
-        expect 0 "$help"
+        gives "$help" $arguments
     done
-    run_tool help list
-    expect 0 "$(tool list --help)"
-    run_tool help help
-    expect 0 "$(tool help --help)"
+    gives "$(tool list --help)" help list
+    gives "$(tool help --help)" help help
 }
 
 @test "--help of a command names each of its flags, and no others" {
     local command flags
     while IFS='|' read -r command flags; do
-        run_tool "$command" --help
-        [ "$status" -eq 0 ]
-        [ "$stderr" = "" ]
+        succeeds "$command" --help
         [[ $output == "Usage: vemo-access-token $command [OPTIONS]"* ]]
         local got
         got=$(grep -oE '^  (-[a-zA-Z],)?--[a-z-]+' <<<"$output" | tr -d ' ' | sort)
@@ -171,40 +161,31 @@ Examples:
         tool help "$command" | sed -n '/^Examples:$/,$s/^  //p' >examples
         [ "$(grep -c "^vemo-access-token $command\( \|\$\)" examples)" -eq 2 ]
         [ "$(wc -l <examples)" -eq 2 ]
-        while IFS= read -r example <&3; do
+        while IFS= read -r example <&4; do
             echo "$example"
-            tool revoke --all --yes
-            a_token --uses 10 --allow Backup:put >id
-            tool export tokens.jsonl
-            [ "$command" != import ] || tool revoke - <id
+            sql "DELETE FROM token"
+            row token--- "count = 10, webapi_allow = '{\"Backup\":{\"method\":[\"put\"]}}'"
+            echo "token---$ZEROS" >id
+            [ "$command" != import ] || { tool export tokens.jsonl; sql "DELETE FROM token"; }
             (eval "set -o pipefail; $example")
-        done 3<examples
+        done 4<examples
     done
 }
 
 @test "--version is the same everywhere" {
-    run_tool --version
-    [ "$status" -eq 0 ]
-    [ "$stderr" = "" ]
+    succeeds --version
     [[ $output =~ ^vemo-access-token\ [0-9]+\.[0-9]+\.[0-9]+$ ]]
     local version=$output
-    run_tool -V
-    expect 0 "$version"
+    gives "$version" -V
     for command in $COMMANDS; do
-        run_tool "$command" --version
-        expect 0 "$version"
-        run_tool "$command" -V
-        expect 0 "$version"
+        gives "$version" "$command" --version
     done
+    gives "$version" list -V
 }
 
-@test "arguments that cannot be are told in one sentence that names them" {
-    local arguments sentence
-    while IFS='|' read -r arguments sentence; do
-        # shellcheck disable=SC2086 # several arguments
-        run_tool $arguments
-        expect 2 "" "vemo-access-token: $sentence"
-    done <<'TABLE'
+@test "arguments that cannot be are told in one sentence that names them, and nothing is done" {
+    row expired- "deadline = 1"
+    refuses <<'TABLE'
 |say what to do; "vemo-access-token --help" lists the commands
 bogus|unknown command "bogus"
 list --count=5|--count: takes no value
@@ -237,35 +218,28 @@ show -o|--output: needs a value
 generate more|unexpected argument "more"
 generate -- more|unexpected argument "more"
 generate -|unexpected argument "-"
-show|TID is required
-check|TID is required
-check TID|API is required
-check TID API METHOD more|unexpected argument "more"
-grant|TID is required
-grant TID|API is required
-grant TID API METHOD more|unexpected argument "more"
-update|TID is required
-update TID|say what to change; "update --help" lists the fields
-rotate|TID is required
-rotate TID --grace 0|--grace: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
-revoke|say which tokens: by TID, by options that select, or --all
-import|FILE is required
-export FILE more|unexpected argument "more"
 create|--function is required
-create --function|--function: needs a value
-create --function TAG|--uid or --user is required
 create --function TAG --function TAG|--function: can be given once only
-create --function TAG --uid 0 --user root|--uid excludes --user
-create --function TAG --uid 0 --uses 1 --unlimited|--uses excludes --unlimited
-list --uid 0 --user root|--uid excludes --user
-list --utc --epoch|--utc excludes --epoch
 list --output|--output: needs a value
-list -o xml|--output: "xml" is not a form: table, json, jsonl or csv
-update TID --ttl 1h --deadline 2999-01-01|--ttl excludes --deadline
-update TID --allow A --add-allow B|--allow excludes --add-allow
-update TID --allow A --remove-allow B|--allow excludes --remove-allow
+show -o xml --utc|TID is required
+grant TID|API is required
+doctor -o xml|--output: "xml" is not a form: table, json or jsonl
+doctor --fix|unknown option "--fix"
+doctor aaaaaaaa|unexpected argument "aaaaaaaa"
+purge --yes|unknown option "--yes"
+purge --all|unknown option "--all"
+purge 12345678|unexpected argument "12345678"
+init now|unexpected argument "now"
+stats -o xml|--output: "xml" is not a form: table, json, jsonl or metrics
 stats --prometheus -o json|--prometheus excludes --output
+stats --prometheus -o metrics|--prometheus excludes --output
+stats VPN|unexpected argument "VPN"
 tune --wal --undo|--wal excludes --undo
+tune --undo --wal --dry-run|--undo excludes --wal
+tune deadline|unexpected argument "deadline"
+tune -o|unknown option "-o"
+list --sort $'a\e[31m\nb\x7f'|--sort: "a\x1b[31m\x0ab\x7f" is not a field of a token
+list --sort $'Ä\xc2\x9b31m'|--sort: "Ä\xc2\x9b31m" is not a field of a token
 TABLE
     LC_ALL=C run_tool café # only of a terminal anything is known
     expect 2 "" 'vemo-access-token: unknown command "café"'
@@ -277,8 +251,7 @@ TABLE
     for arguments in "$id Api get -o json" "-o json $id Api get" "$id -ojson Api get" "$id Api --output=json get" \
         "-vo json -- $id Api get"; do
         # shellcheck disable=SC2086
-        POSIXLY_CORRECT=1 run_tool check $arguments
-        expect 0 '{"allowed":true,"reason":""}'
+        POSIXLY_CORRECT=1 gives '{"allowed":true,"reason":""}' check $arguments
     done
 }
 
@@ -287,14 +260,11 @@ TABLE
     local text id
     tool init
     for text in '[a,b]' '[]' '"x"' "'x'" '{a}' 'a=b' '=' '-' '--' '--all' '-v' '%%' '\\n' ' ' $'a\nb' $'\x9b' '!#:+'; do
-        run_tool create --uid 0 --function "$text" --bind-sid="$text" --allow "Api" --extra "{\"x\": 1}"
-        [ "$status" -eq 0 ]
-        id=$output
-        [ "$(sql "SELECT function || char(9) || bind_sid FROM token WHERE tid = '$id'")" = "$text"$'\t'"$text" ]
-        run_tool grant "$id" -- "$text"
-        expect 1 "" "vemo-access-token: refused: API not listed"
-        run_tool revoke --yes --function "$text" --bind-sid="$text"
-        expect 0 "1 token revoked"
+        id=$(tool create --uid 0 --function "$text" --bind-sid="$text" --allow "Api" --extra "{\"x\": 1}")
+        [ "$(sql "SELECT function || char(9) || bind_sid FROM token")" = "$text"$'\t'"$text" ]
+        fails 1 "refused: API not listed" grant "$id" -- "$text"
+        gives "1 token would be revoked" revoke --dry-run --function "$text" --bind-sid="$text"
+        sql "DELETE FROM token"
     done
     tool create --uid 0 --function VPN --bind-sid=
     [ "$(tool list --field bind_sid)" = "" ]
@@ -334,14 +304,12 @@ TABLE
     other=$(a_token)
     run_tool revoke "[${one:0:8},${other:0:8},$ZEROS]"
     expect 0 "0 tokens revoked" "vemo-access-token: 1 id is unknown"
-    [ "$(tokens)" -eq 2 ]
+    [ "$(sql "SELECT count(*) FROM token")" -eq 2 ]
     cd "$DIR"
     tool export x
-    run_tool import "[x]"
-    expect 2 "" "vemo-access-token: [x]: No such file or directory"
-    run_tool import -- --a=
-    expect 2 "" "vemo-access-token: --a=: No such file or directory"
-    [ "$(tokens)" -eq 2 ]
+    fails 2 "[x]: No such file or directory" import "[x]"
+    fails 2 "--a=: No such file or directory" import -- --a=
+    [ "$(sql "SELECT count(*) FROM token")" -eq 2 ]
 }
 
 @test "who is not root is told so before anything is tried" {
@@ -370,19 +338,17 @@ import -
 init
 tune
 TABLE
-    plain doctor
+    plain doctor --repair
     expect 5 "error: not run as root: the effective uid is $uid
     meaning: the database belongs to root and cannot be looked at
     remedy: run doctor as root"
     plain generate
-    [ "$status" -eq 0 ]
-    [ "$stderr" = "" ]
+    [ "$status$stderr" = 0 ]
     [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
     for arguments in --help --version "list --help"; do
         # shellcheck disable=SC2086
         plain $arguments
-        [ "$status" -eq 0 ]
-        [ "$stderr" = "" ]
+        [ "$status$stderr" = 0 ]
         [ "$output" != "" ]
     done
 }
@@ -399,14 +365,12 @@ TABLE
     log_lines_only "$stderr"
     [[ $stderr == *'Failed [jToken["webapi_allow"].type() != Json::objectValue]'* ]]
 
-    run_tool list --verbose --count # nothing fails: nothing is logged
-    expect 0 "1"
+    gives "1" list --verbose --count # nothing fails: nothing is logged
     run_tool generate --verbose
     [ "$stderr" = "" ]
 
     echo "no database" >"$DB"
-    run_tool list
-    expect 4 "" "vemo-access-token: $REAL_DB is not a token database, or is damaged (file is not a database)"
+    fails 4 "$REAL_DB is not a token database, or is damaged (file is not a database)" list
     run_tool list --verbose
     [ "$status" -eq 4 ]
     [ "$output" = "" ]
@@ -418,62 +382,39 @@ TABLE
 @test "a result that cannot be written is a failure" {
     local id file reason made
     id=$(a_token --allow Api --uses 100)
-    while read -r file reason; do
+    while IFS='|' read -r file reason; do
         for arguments in --help --version "list --help" generate list "list -o json" "list --field uid" \
             "list --count" "show $id" "check $id Api" "grant $id Api" "grant $id Api --print-user" \
             "update $id --bind-sid x" "revoke --dry-run --all" "purge --dry-run" "purge" stats \
-            "stats --prometheus" doctor "doctor -o json" init "tune --dry-run"; do
-            # shellcheck disable=SC2086
-            into "$file" $arguments
+            "stats --prometheus" export doctor "doctor -o json" init "tune --dry-run"; do
             made=
             [[ $arguments != grant\ * && $arguments != update\ * ]] || made="; the change was made"
-            expect 4 "" "vemo-access-token: cannot write the result: $reason$made" || {
-                echo "of: $arguments >$file"
-                return 1
-            }
+            # shellcheck disable=SC2086
+            cannot_print "$reason$made" "$file" $arguments
         done
+        # A token whose id could not be printed does not stay.
+        cannot_print "$reason; the token was taken back" "$file" create --uid 0 --function VPN
     done <<'TABLE'
-/dev/full No space left on device
-- Bad file descriptor
+/dev/full|No space left on device
+-|Bad file descriptor
 TABLE
-}
-
-@test "a large result that cannot be written is a failure" {
-    a_token >"$DIR/id"
-    sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 300)
-         INSERT INTO token SELECT tid || i, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra
-         FROM token, n"
+    cannot_print "No space left on device; the token was taken back" /dev/full create --verbose --uid 0 --function VPN
+    run cannot_print "" - create --verbose --uid 0 --function VPN
+    [[ $output == *"got:      status 4"* ]]
+    [ "$(sql "SELECT count(*) FROM token")" -eq 1 ]
+    # Nor one that is larger than any buffer.
+    many_rows 300
     for arguments in "list --show-ids" "list -o json --show-ids" "list --field tid --show-ids"; do
         # shellcheck disable=SC2086
-        into /dev/full $arguments
-        expect 4 "" "vemo-access-token: cannot write the result: No space left on device"
+        cannot_print "No space left on device" /dev/full $arguments
     done
-}
-
-@test "an export that cannot be written does not say that tokens were exported" {
-    a_token >"$DIR/id"
-    into /dev/full export
-    expect 4 "" "vemo-access-token: cannot write the result: No space left on device"
-}
-
-@test "a token whose id could not be printed does not stay" {
-    tool init
-    into /dev/full create --uid 0 --function VPN
-    expect 4 "" "vemo-access-token: cannot write the result: No space left on device; the token was taken back"
-    into - create --uid 0 --function VPN
-    expect 4 "" "vemo-access-token: cannot write the result: Bad file descriptor; the token was taken back"
-    into /dev/full create --verbose --uid 0 --function VPN
-    expect 4 "" "vemo-access-token: cannot write the result: No space left on device; the token was taken back"
-    into - create --verbose --uid 0 --function VPN
-    [ "$status" -eq 4 ]
-    [ "$(tokens)" -eq 0 ]
 }
 
 @test "a token whose id went into a closed pipe does not stay" {
     tool init
     into_closed_pipe create --uid 0 --function VPN
     expect 4 "" "vemo-access-token: cannot write the result: Broken pipe; the token was taken back"
-    [ "$(tokens)" -eq 0 ]
+    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }
 
 @test "a reader that has seen enough ends a listing quietly" {
@@ -519,10 +460,7 @@ TABLE
 
 # SQLite's temporary files would hold purposes and sessions, on a file system that may not even be root's alone.
 @test "what is sorted does not get into temporary files" {
-    tool init
-    sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 8000)
-         INSERT INTO token SELECT printf('%08d', i) || '$ZEROS', printf('%0300d', i), i, 9999999999 - i, 1, 1,
-                                  printf('%0300d', i), '{}', '{}' FROM n"
+    many_rows 2500 "bind_sid = printf('%03000d', rowid), function = printf('%03000d', rowid), uid = rowid, deadline = deadline - rowid"
     mkdir "$DIR/tmp"
     local arguments made
     for arguments in stats "list --sort function --limit 1" "tune --dry-run" "tune" doctor "revoke --all --yes"; do
@@ -579,13 +517,6 @@ TABLE
     run_tool doctor
     [ "$status" -eq 5 ]
     [ "${lines[0]}" = "warning: a deadline of 0 or less in 1 token (${id:0:8})" ]
-}
-
-@test "of an argument that holds two ids, none appears when one of them is an argument too" {
-    local id
-    id=$(a_token)
-    run_tool show "$id" "$id$(a_token)"
-    expect 2 "" "vemo-access-token: unexpected argument \"${id:0:8}...\""
 }
 
 # in_wrong_places ID: calls that fail with a sentence, which must not hold the id
@@ -670,43 +601,27 @@ TABLE
     in_wrong_places "$(printf 'Own+id-%08d/' {1..8})=="
     id=$(a_token)
     in_wrong_places "$id"
-    run_tool "${ZEROS}0000000" # one byte less than an id has
-    expect 2 "" "vemo-access-token: unknown command \"${ZEROS}0000000\""
-    run_tool "${ZEROS}00000000"
-    expect 2 "" "vemo-access-token: unknown command \"00000000...\""
-    run_tool export "$DIR/$id/x"
-    expect 4 "" "vemo-access-token: $DIR/${id:0:8}.../x: Not a directory"
-    run_tool export "$DIR/x/$id"
-    expect 4 "" "vemo-access-token: $DIR/x/${id:0:8}...: No such file or directory"
+    fails 2 "unknown command \"${ZEROS}0000000\"" "${ZEROS}0000000" # one byte less than an id has
+    fails 2 "unknown command \"00000000...\"" "${ZEROS}00000000"
+    fails 4 "$DIR/${id:0:8}.../x: Not a directory" export "$DIR/$id/x"
+    fails 4 "$DIR/x/${id:0:8}...: No such file or directory" export "$DIR/x/$id"
     mkdir -p "$DIR/x/$id"
     run_tool export "$DIR/x/$id"
     expect 2 "" "vemo-access-token: $DIR/x/${id:0:8}... is not a regular file; to write to a pipe, write to standard output"
 }
 
-@test "no id appears on standard error when SQLite's reason holds it" {
+@test "no id appears on standard error when a sentence repeats it" {
     local id
     id=$(a_token)
+    fails 2 "unexpected argument \"${id:0:8}...\"" show "$id" "$id$id"
+    # As in SQLite's reason.
     sql "CREATE TRIGGER refuse BEFORE INSERT ON token BEGIN SELECT RAISE(ABORT, 'no (not $id)'); END"
-    run_tool create --uid 0 --function VPN
-    expect 4 "" "vemo-access-token: $REAL_DB failed: no (not ${id:0:4}...)"
+    fails 4 "$REAL_DB failed: no (not ${id:0:4}...)" create --uid 0 --function VPN
     sql "DROP TRIGGER refuse; CREATE TRIGGER refuse BEFORE INSERT ON token BEGIN SELECT RAISE(ABORT, '$id'); END"
-    run_tool create --uid 0 --function VPN
-    expect 4 "" "vemo-access-token: $REAL_DB failed: ${id:0:8}..."
-}
-
-@test "an id that is not a text is masked, too" {
-    row token---
+    fails 4 "$REAL_DB failed: ${id:0:8}..." create --uid 0 --function VPN
+    # One that is not a text is masked, too: 8 characters of 4 bytes at most, and the end of the line.
     sql "UPDATE token SET tid = CAST(x'61' || x'$(printf '9b%.0s' {1..140})' AS TEXT)"
-    [ "$(tool list --field tid | wc -c)" -eq 33 ] # 8 characters of 4 bytes at most, and the end of the line
-    run_tool list --sort "$(tool list --field tid --show-ids)"
-    [ "$stderr" = "vemo-access-token: --sort: \"a$(printf '\\x9b%.0s' {1..31})...\" is not a field of a token" ]
-}
-
-@test "no id appears on standard error when a long beginning fits several tokens" {
-    local id
-    id=$(a_token)
-    tool create --uid 0 --function VPN --tid "${id:0:126}-1" >/dev/null
-    tool create --uid 0 --function VPN --tid "${id:0:126}-2" >/dev/null
-    run_tool show "${id:0:126}"
-    expect 2 "" "vemo-access-token: TID: several tokens begin with \"${id:0:8}...\"; give more of the id"
+    [ "$(tool list --field tid | wc -c)" -eq 33 ]
+    fails 2 "--sort: \"a$(printf '\\x9b%.0s' {1..31})...\" is not a field of a token" \
+        list --sort "$(tool list --field tid --show-ids)"
 }
