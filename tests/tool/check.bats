@@ -1,13 +1,10 @@
 #!/usr/bin/env bats
-# check
+# check, and where grant must say the same
 
 load common
 
-ROW="'', 0, 9999999999, 1, 1000000000, 'VPN',
-     '{\"Api\":{\"method\":[\"get\",\"list\"]},\"Bare\":{\"method\":[]}}', '{}'"
-
 # checks: each line "ARGUMENTS|RESULT" of standard input is what check answers for a call; all of them
-# change nothing.
+# change nothing
 checks()
 {
     local arguments result before
@@ -23,9 +20,19 @@ checks()
     [ "$(state)" = "$before" ]
 }
 
-@test "check tells whether a call would be granted, and why not" {
-    row token---
-    row expired- "deadline = strftime('%s') - 5"
+@test "check tells whether a call would be granted, and why not; it spends and purges nothing" {
+    rows <<'END'
+token---|webapi_allow = '{"Api":{"method":["get","list"]},"Bare":{"method":[]}}'
+expired-|deadline = strftime('%s') - 5
+never---|deadline = -1
+none----|count = 0
+last----|count = 1
+many----|count = 9223372036854775807
+endless-|count = -1
+first---|webapi_allow = '{"First":{}}'
+second--|webapi_allow = '{"Second":{}}'
+second-~
+END
     checks <<END
 token---$ZEROS Api get|allowed
 token---$ZEROS Api list|allowed
@@ -38,7 +45,20 @@ token---$ZEROS Other get|API not listed
 token---$ZEROS Other|API not listed
 expired-$ZEROS Api get|expired
 expired-$ZEROS Other|expired
+never--- Api get|expired
 unknown-$ZEROS Api get|unknown token
+none---- Api get|allowed
+last---- Api get|allowed
+many---- Api get|allowed
+endless- Api get|allowed
+first--- First|allowed
+second--0 Second|allowed
+second-~ Api get|allowed
+first---1 First|unknown token
+- First <<<"first---$ZEROS"|allowed
+- Second < <(printf '\n%s' second--)|allowed
+- Second <<<first---|API not listed
+- First < <(printf '%0100000d' 0)|unknown token
 END
 }
 
@@ -62,115 +82,94 @@ token--- create create|method not listed
 END
 }
 
-@test "the number of uses left refuses nothing" {
-    row none---- "count = 0"
-    row last---- "count = 1"
-    row many---- "count = 9223372036854775807"
-    row endless- "count = -1"
-    checks <<'END'
-none---- Api get|allowed
-last---- Api get|allowed
-many---- Api get|allowed
-endless- Api get|allowed
-END
-}
-
-@test "a malformed token is told, as far as the call touches what is wrong with it" {
-    row no-text- "webapi_allow = ''"
-    row array--- "webapi_allow = '[\"Api\"]'"
-    row entry--- "webapi_allow = '{\"Api\":1,\"Bare\":{\"method\":[\"get\"]}}'"
-    row methods- "webapi_allow = '{\"Api\":{\"method\":\"get\"}}'"
-    row method-- "webapi_allow = '{\"Api\":{\"method\":[\"get\",{},\"list\"]}}'"
-    # A grant would save it with its uses lowered, the others would not.
-    row extra--- "extra = '[]', count = 2"
-    row endless- "extra = '[]', count = -1"
-    row last---- "extra = '[]', count = 1"
-    checks <<'END'
-no-text- Api get|malformed token
-array--- Api get|malformed token
-array--- Api|malformed token
-entry--- Api get|malformed token
-entry--- Api|allowed
-entry--- Bare get|allowed
-entry--- Other|API not listed
-methods- Api get|malformed token
-methods- Api|allowed
-method-- Api get|allowed
-method-- Api list|malformed token
-extra--- Api get|malformed token
-extra--- Other get|API not listed
-endless- Api get|allowed
-last---- Api get|allowed
-END
+@test "a malformed token is told as far as the call touches what is wrong with it, by check and grant alike" {
+    local columns arguments result before
+    row token---
+    while IFS='~' read -r columns arguments result; do
+        echo "$columns $arguments"
+        sql "DELETE FROM token"
+        row token--- "count = 5, extra = '{}', $columns"
+        before=$(sql "SELECT * FROM token")
+        succeeds list --epoch
+        succeeds show token---
+        # shellcheck disable=SC2086 # several arguments
+        if [ "$result" = allowed ]; then
+            gives allowed check token--- $arguments
+            gives granted grant "token---$ZEROS" $arguments
+            [ "$(sql "SELECT count IN (-1, 4) FROM token")" != 0 ]
+        else
+            run_tool check token--- $arguments
+            expect 1 "refused: $result"
+            fails 1 "refused: $result" grant "token---$ZEROS" $arguments
+            fails 1 "refused: $result" grant --print-user "token---$ZEROS" $arguments
+            [ "$(sql "SELECT * FROM token")" = "$before" ]
+        fi
+    done <<TABLE
+webapi_allow = ''~Api get~malformed token
+webapi_allow = '{'~Api get~API not listed
+webapi_allow = '{"Other": {"method": ['~Api get~API not listed
+webapi_allow = 'null'~Api get~malformed token
+webapi_allow = 7~Api get~malformed token
+webapi_allow = '"Api"'~Api get~malformed token
+webapi_allow = '["Api"]'~Api get~malformed token
+webapi_allow = '["Api"]'~Api~malformed token
+webapi_allow = '{"Api":1,"Bare":{"method":["get"]}}'~Api get~malformed token
+webapi_allow = '{"Api":1,"Bare":{"method":["get"]}}'~Api~allowed
+webapi_allow = '{"Api":1,"Bare":{"method":["get"]}}'~Bare get~allowed
+webapi_allow = '{"Api":1,"Bare":{"method":["get"]}}'~Other~API not listed
+webapi_allow = '{"Api": null}'~Api get~malformed token
+webapi_allow = '{"Api": []}'~Api get~malformed token
+webapi_allow = '{"Api": {}}'~Api get~malformed token
+webapi_allow = '{"Api": {"method": "get"}}'~Api get~malformed token
+webapi_allow = '{"Api": {"method": "get"}}'~Api~allowed
+webapi_allow = '{"Api": {"method": {"get": 1}}}'~Api get~malformed token
+webapi_allow = '{"Api": {"method": ["pu'~Api get~method not listed
+webapi_allow = '{"Api": {"method": [["get"]]}}'~Api get~malformed token
+webapi_allow = '{"Api": {"method": ["get",{},"list"]}}'~Api get~allowed
+webapi_allow = '{"Api": {"method": ["get",{},"list"]}}'~Api list~malformed token
+webapi_allow = '{"Api": {"method": [1, null, 1.5, true]}}'~Api get~method not listed
+webapi_allow = '{"Api": $(printf '[%.0s' {1..2000})'~Api get~malformed token
+extra = ''~Api get~malformed token
+extra = 'null'~Api get~malformed token
+extra = 7~Api get~malformed token
+extra = '"x"'~Api get~malformed token
+extra = 'no JSON'~Api get~malformed token
+extra = '[]'~Api get~malformed token
+extra = '[]'~Other get~API not listed
+extra = '[]', count = -1~Api get~allowed
+extra = '[]', count = 1~Api get~allowed
+TABLE
 }
 
 @test "-o json and jsonl give the answer as an object" {
     row token---
     for form in json jsonl; do
-        run_tool check token--- Api get -o $form
-        expect 0 '{"allowed":true,"reason":""}'
+        gives '{"allowed":true,"reason":""}' check token--- Api get -o $form
         run_tool check token--- Api put --output=$form
         expect 1 '{"allowed":false,"reason":"method not listed"}'
         run_tool check unknown-token Api -o $form
         expect 1 '{"allowed":false,"reason":"unknown token"}'
     done
-    run_tool check token--- Api get -o table
-    expect 0 allowed
-}
-
-@test "check takes an id from standard input, or the beginning of one" {
-    row first--- "webapi_allow = '{\"First\":{}}'"
-    row second-- "webapi_allow = '{\"Second\":{}}'"
-    row second-~
-    checks <<END
-first--- First|allowed
-second--0 Second|allowed
-second-~ Api get|allowed
-first---1 First|unknown token
-END
-    run_tool check - First <<<"first---$ZEROS"
-    expect 0 allowed
-    run_tool check - Second < <(printf '\n%s' second--)
-    expect 0 allowed
-    run_tool check - Second <<<first---
-    expect 1 "refused: API not listed"
-    run_tool check - First < <(printf '%0100000d' 0)
-    expect 1 "refused: unknown token"
+    gives allowed check token--- Api get -o table
 }
 
 @test "check refuses arguments that it cannot use" {
     row second-1
     row second-2 "tid = 'second-1' || 'x'"
-    before=$(state)
-    while IFS='|' read -r arguments input sentence; do
-        eval "run_tool check $arguments" < <(printf "$input")
-        expect 2 "" "vemo-access-token: $sentence"
-    done <<'END'
-||TID is required
-second-1||API is required
-second-1 ''||API: must not be empty
-second-1 '' get||API: must not be empty
-'' Api||TID: the id is empty
-second Api||TID: "second" is too short: give the id or its first 8 characters, or more
-second-1 Api||TID: several tokens begin with "second-1"; give more of the id
-second-1 Api get put||unexpected argument "put"
-second-1 Api -o xml||--output: "xml" is not a form: table, json or jsonl
-second-1 Api --utc||unknown option "--utc"
-- Api||TID: there is no id on standard input
-- Api|\n|TID: there is no id on standard input
-- Api|a\nb\n|TID: there is more than one id on standard input
-- Api|second-1\0|TID: an id on standard input holds a NUL byte
+    refuses check <<'END'
+|TID is required
+second-1|API is required
+second-1 ''|API: must not be empty
+second-1 '' get|API: must not be empty
+'' Api|TID: the id is empty
+second Api|TID: "second" is too short: give the id or its first 8 characters, or more
+second-1 Api|TID: several tokens begin with "second-1"; give more of the id
+second-1 Api get put|unexpected argument "put"
+second-1 Api -o xml|--output: "xml" is not a form: table, json or jsonl
+second-1 Api --utc|unknown option "--utc"
+- Api|TID: there is no id on standard input
+- Api < <(printf '\n')|TID: there is no id on standard input
+- Api < <(printf 'a\nb\n')|TID: there is more than one id on standard input
+- Api < <(printf 'second-1\0')|TID: an id on standard input holds a NUL byte
 END
-    [ "$(state)" = "$before" ]
-}
-
-@test "check spends and purges nothing" {
-    row token--- "count = 1"
-    row expired- "deadline = -1"
-    row another- "deadline = 0, count = 0"
-    before=$(state)
-    for arguments in "token--- Api get" "token--- Api" "token--- Other" "expired- Api" "unknown- Api"; do
-        run_tool check $arguments
-        [ "$(state)" = "$before" ]
-    done
 }

@@ -18,9 +18,7 @@ kept()
     row another-
     before=$(kept "s/^'token---$ZEROS'/'fresh'/")
     now=$(date +%s)
-    VEMO_TEST_SYSLOG=$DIR/log run_tool rotate token---
-    [ "$status" -eq 0 ]
-    [ "$stderr" = "" ]
+    VEMO_TEST_SYSLOG=$DIR/log succeeds rotate token---
     [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
     [[ $(<"$DIR/log") == *" rotate: 1 token created (${output:0:8}...), 1 token deleted (token---...); "* ]]
     [ "$(kept "s/^'$output'/'fresh'/" | sort)" = "$(sort <<<"$before")" ]
@@ -37,9 +35,7 @@ kept()
     while IFS='|' read -r grace left; do
         rm -rf "$VEMO_REDIRECT_DIR"
         row token--- "deadline = strftime('%s', 'now') + 7200"
-        run_tool rotate token--- --grace "$grace"
-        [ "$status" -eq 0 ]
-        [ "$stderr" = "" ]
+        succeeds rotate token--- --grace "$grace"
         [ "$(sql "SELECT round((deadline - strftime('%s', 'now')) / 100.0) FROM token ORDER BY tid = '$output'" | xargs)" = "$left 72.0" ]
         [ "$(sql "SELECT count(DISTINCT hex(webapi_allow) || hex(extra) || count || uid), count(*) FROM token")" = "1|2" ]
         [ "$(sql "SELECT create_time FROM token WHERE tid = 'token---$ZEROS'")" = 1000000000 ]
@@ -66,8 +62,7 @@ token--1 token--2|unexpected argument "token--2"
 END
     local before
     before=$(state)
-    run_tool rotate unknown-
-    expect 3 "" "vemo-access-token: there is no such token"
+    fails 3 "there is no such token" rotate unknown-
     [ "$(state)" = "$before" ]
 }
 
@@ -80,8 +75,7 @@ END
         expect 4 "" "vemo-access-token: $reason; the change was taken back"
         [ "$(sql "SELECT * FROM token")" = "$before" ]
     done
-    VEMO_TEST_SYNC=file run_tool rotate token---
-    expect 4 "" "vemo-access-token: $REAL_DB failed: disk I/O error"
+    VEMO_TEST_SYNC=file fails 4 "$REAL_DB failed: disk I/O error" rotate token---
     [ "$(sql "SELECT * FROM token")" = "$before" ]
 }
 
