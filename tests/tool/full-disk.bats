@@ -79,24 +79,3 @@ vemo-access-token: cannot write the result: No space left on device"
 allowed
 1"
 }
-
-@test "doctor tells that there is no room for a change, or for another file" {
-    # shellcheck disable=SC2016
-    on_full_disk '
-        "$TOOL" doctor; echo $?
-        rm disk/filler
-        "$TOOL" doctor; echo $?
-        mount -o remount,nr_inodes=$(df --output=iused disk | tail -1 | tr -d " ") disk
-        "$TOOL" doctor --repair; echo $?'
-    local place=/usr/vemo/etc/private/session meaning="no token can be created, changed or granted"
-    expect 0 "error: the file system of $place has no room for a change
-    meaning: $meaning
-    remedy: remove what is not needed there: \"df $place\" tells how full it is
-5
-no findings
-0
-error: the file system of $place has no room for another file
-    meaning: $meaning
-    remedy: remove what is not needed there: \"df -i $place\" tells how full it is
-5"
-}
