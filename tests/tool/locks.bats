@@ -284,20 +284,15 @@ warning: expired for more than an hour: 1 token (old${ID:0:5})
 
 @test "of a lock that stays behind a first change, it is not said that nothing was changed" {
     a_store
-    local kind sentence importer locker
+    local kind sentence importer locker first
     while IFS='|' read -r kind sentence; do
         sql "DELETE FROM token"
-        rm -f "$DIR/lines"
-        mkfifo "$DIR/lines"
-        VEMO_TEST_HASTE=1 "$TOOL" import "$DIR/other" - <"$DIR/lines" >"$DIR/out" 2>&1 3>&- &
+        rm -f "$DIR/lines" "$DIR/out"
+        mkfifo "$DIR/lines" "$DIR/out"
+        { VEMO_TEST_HASTE=1 "$TOOL" import "$DIR/other" - || echo "status $?"; } <"$DIR/lines" >"$DIR/out" 2>&1 3>&- &
         importer=$!
-        exec 9>"$DIR/lines"
-        # Without a lock, which the import in its haste would not wait for.
-        until [ "$(sqlite3 "file:$DB?immutable=1" "SELECT count(*) FROM token" 2>/dev/null)" = 1 ] &&
-            [ ! -e "$DB-journal" ]; do
-            sleep 0.01
-        done
-        sleep 0.1 # the commit is made; now the lock goes, too
+        exec 9>"$DIR/lines" 5<"$DIR/out"
+        read -r -t 20 -u 5 first # the first commit is made
         if [ "$kind" = database ]; then
             lock "$EXCLUSIVE"
         else
@@ -308,64 +303,52 @@ warning: expired for more than an hour: 1 token (old${ID:0:5})
         fi
         whole </dev/null >&9
         exec 9>&-
-        wait $importer || echo "status $?" >>"$DIR/out"
-        [ "$kind" = file ] || unlock
-        exec 6>&-
-        diff "$DIR/out" - <<<"1 token imported
+        [ "$first
+$(cat <&5)" = "1 token imported
 vemo-access-token: $sentence${locker:+ $locker)} for 5 seconds
-status 4"
+status 4" ]
+        wait $importer
+        [ "$kind" = file ] || unlock
+        exec 5<&- 6>&-
     done <<TABLE
 database|$REAL_DB stayed locked by another process
 file|/run/vemo-access-token.lock stayed locked by a program (process
 TABLE
 }
 
-@test "several creations at once, where there is no database yet, all succeed" {
-    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
-    local i pids=()
-    for i in 1 2 3 4 5 6; do
-        "$TOOL" create --uid 0 --function VPN --allow Api >"$DIR/out$i" 2>"$DIR/err$i" 3>&- &
-        pids+=($!)
-    done
-    for i in "${pids[@]}"; do
-        wait "$i"
-    done
-    [ "$(cat "$DIR"/err*)" = "" ]
-    [ "$(sql "SELECT tid FROM token ORDER BY 1")" = "$(LC_ALL=C sort "$DIR"/out*)" ]
-}
-
-@test "several grants at once spend one use each" {
-    local id i pids=() granted refused
-    id=$(a_token --allow Api:get --uses 3)
-    for i in 1 2 3 4 5 6 7 8; do
-        { "$TOOL" grant "$id" Api get >"$DIR/out$i" 2>&1 || echo "status $?" >>"$DIR/out$i"; } 3>&- &
+# at_once NUMBER ARGUMENTS...: prints what so many runs at the same time print, and their statuses, sorted
+at_once()
+{
+    local i pids=() directory
+    directory=$(mktemp -d "$DIR/XXXXXX")
+    for ((i = 0; i < $1; ++i)); do
+        { "$TOOL" "${@:2}" >"$directory/$i" 2>&1 || echo "status $?" >>"$directory/$i"; } 3>&- &
         pids+=($!)
     done
     wait "${pids[@]}"
-    granted=$(grep -lx granted "$DIR"/out* | wc -l)
-    refused=$(grep -lx "vemo-access-token: refused: unknown token" "$DIR"/out* | wc -l)
-    [ "$granted" -eq 3 ]
-    [ "$refused" -eq 5 ]
-    [ "$(grep -lx "status 1" "$DIR"/out* | wc -l)" -eq 5 ]
-    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
+    LC_ALL=C sort "$directory"/*
 }
 
-@test "of several that revoke a token at once, one has revoked it" {
-    local id i pids=()
+@test "several creations at once, where there is no database yet, all succeed" {
+    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
+    at_once 6 create --uid 0 --function VPN --allow Api >"$DIR/created"
+    [ "$(wc -l <"$DIR/created")" -eq 6 ]
+    sql "SELECT tid FROM token ORDER BY 1" | diff "$DIR/created" -
+}
+
+@test "several grants at once spend one use each, and of several that revoke a token, one has revoked it" {
+    local id creations
+    id=$(a_token --allow Api:get --uses 3)
+    [ "$(at_once 8 grant "$id" Api get | uniq -c | xargs)" = \
+        "3 granted 5 status 1 5 vemo-access-token: refused: unknown token" ]
+    [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
     id=$(a_token)
-    for i in 1 2 3 4; do
-        "$TOOL" revoke "$id" >"$DIR/out$i" 2>&1 3>&- &
-        pids+=($!)
-    done
-    for i in 5 6 7 8; do
-        "$TOOL" create --uid 0 --function VPN --allow Api >"$DIR/out$i" 2>&1 3>&- &
-        pids+=($!)
-    done
-    for i in "${pids[@]}"; do
-        wait "$i" # each has succeeded
-    done
-    [ "$(sort "$DIR"/out[1-4] | uniq -c | xargs)" = "3 0 tokens revoked 1 1 token revoked 3 vemo-access-token: 1 id is unknown" ]
-    [ "$(sort "$DIR"/out[5-8])" = "$(sql "SELECT tid FROM token" | sort)" ]
+    at_once 4 create --uid 0 --function VPN --allow Api >"$DIR/created" &
+    creations=$!
+    [ "$(at_once 4 revoke "$id" | uniq -c | xargs)" = \
+        "3 0 tokens revoked 1 1 token revoked 3 vemo-access-token: 1 id is unknown" ]
+    wait $creations
+    sql "SELECT tid FROM token ORDER BY 1" | diff "$DIR/created" -
 }
 
 # calling: a program that has read the tokens, opens no transaction and takes no lock. It does what
@@ -654,9 +637,7 @@ $open" ]
     exec 5<>"$DIR/pipe"
     head -c 65536 /dev/zero >&5
     "$TOOL" create --uid 0 --function VPN --allow Api >&5 3>&- &
-    while [ "$(sql "SELECT count(*) FROM token")" = 0 ]; do
-        sleep 0.01
-    done
+    until_sql 1 "SELECT count(*) FROM token"
     run_tool create --uid 0 --function Mail --allow Api
     [ "$status" -eq 0 ]
     head -c 65536 <&5 >/dev/null
