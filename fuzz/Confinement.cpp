@@ -1,7 +1,6 @@
 #include "Confinement.h"
 
 #include <dirent.h>
-#include <dlfcn.h>
 #include <fcntl.h>
 #include <pwd.h>
 #include <sqlite3.h>
@@ -16,6 +15,7 @@
 
 #include "AccessTokenDefine.h"
 #include "CallLock.h"
+#include "Interpose.h"
 #include "Require.h"
 
 namespace {
@@ -154,15 +154,6 @@ std::string takeComplaints()
 
 } // namespace fuzz
 
-#define CONFINED __attribute__((visibility("default")))
-
-// The function of that name that would run if this one were not here.
-#define NEXT(name)                                                                                           \
-    ([] {                                                                                                    \
-        static const auto pNext = reinterpret_cast<decltype(&::name)>(dlsym(RTLD_NEXT, #name));              \
-        return pNext;                                                                                        \
-    }())
-
 namespace {
 
 // The descriptor of a file that can be read; -1 for any other name.
@@ -177,45 +168,45 @@ int inputFile(const char* szName)
 
 extern "C" {
 
-CONFINED int sqlite3_open(const char*, sqlite3** ppDb)
+INTERPOSED int sqlite3_open(const char*, sqlite3** ppDb)
 {
     *ppDb = g_pOffered ? g_pOffered : fuzz::openStore();
     g_pOffered = nullptr;
     return SQLITE_OK;
 }
 
-CONFINED uid_t geteuid() noexcept
+INTERPOSED uid_t geteuid() noexcept
 {
     return g_blConfined ? 0 : NEXT(geteuid)();
 }
 
-CONFINED int seteuid(uid_t uid) noexcept
+INTERPOSED int seteuid(uid_t uid) noexcept
 {
     return g_blConfined ? 0 : NEXT(seteuid)(uid);
 }
 
-CONFINED int access(const char* szPath, int nMode) noexcept
+INTERPOSED int access(const char* szPath, int nMode) noexcept
 {
     struct stat status;
     return g_blConfined ? statusOf(szPath, &status) : NEXT(access)(szPath, nMode);
 }
 
-CONFINED int stat(const char* szPath, struct stat* pStatus) noexcept
+INTERPOSED int stat(const char* szPath, struct stat* pStatus) noexcept
 {
     return g_blConfined ? statusOf(szPath, pStatus) : NEXT(stat)(szPath, pStatus);
 }
 
-CONFINED int lstat(const char* szPath, struct stat* pStatus) noexcept
+INTERPOSED int lstat(const char* szPath, struct stat* pStatus) noexcept
 {
     return g_blConfined ? statusOf(szPath, pStatus) : NEXT(lstat)(szPath, pStatus);
 }
 
-CONFINED int chmod(const char* szPath, mode_t mode) noexcept
+INTERPOSED int chmod(const char* szPath, mode_t mode) noexcept
 {
     return g_blConfined ? 0 : NEXT(chmod)(szPath, mode);
 }
 
-CONFINED int fstat(int nFile, struct stat* pStatus) noexcept
+INTERPOSED int fstat(int nFile, struct stat* pStatus) noexcept
 {
     const int nResult = NEXT(fstat)(nFile, pStatus);
     if (g_blConfined) { // a file without a name is everybody's
@@ -226,7 +217,7 @@ CONFINED int fstat(int nFile, struct stat* pStatus) noexcept
     return nResult;
 }
 
-CONFINED int fstatat(int nDirectory, const char* szName, struct stat* pStatus, int nFlags) noexcept
+INTERPOSED int fstatat(int nDirectory, const char* szName, struct stat* pStatus, int nFlags) noexcept
 {
     if (!g_blConfined) {
         return NEXT(fstatat)(nDirectory, szName, pStatus, nFlags);
@@ -235,27 +226,27 @@ CONFINED int fstatat(int nDirectory, const char* szName, struct stat* pStatus, i
     return 0 > nFile ? -1 : fstat(nFile, pStatus);
 }
 
-CONFINED int mkdirat(int nDirectory, const char* szName, mode_t mode) noexcept
+INTERPOSED int mkdirat(int nDirectory, const char* szName, mode_t mode) noexcept
 {
     return g_blConfined ? refused(EEXIST) : NEXT(mkdirat)(nDirectory, szName, mode);
 }
 
-CONFINED int linkat(int nFrom, const char* szFrom, int nTo, const char* szTo, int nFlags) noexcept
+INTERPOSED int linkat(int nFrom, const char* szFrom, int nTo, const char* szTo, int nFlags) noexcept
 {
     return g_blConfined ? 0 : NEXT(linkat)(nFrom, szFrom, nTo, szTo, nFlags);
 }
 
-CONFINED int unlinkat(int nDirectory, const char* szName, int nFlags) noexcept
+INTERPOSED int unlinkat(int nDirectory, const char* szName, int nFlags) noexcept
 {
     return g_blConfined ? 0 : NEXT(unlinkat)(nDirectory, szName, nFlags);
 }
 
-CONFINED DIR* opendir(const char* szPath)
+INTERPOSED DIR* opendir(const char* szPath)
 {
     return g_blConfined ? nullptr : NEXT(opendir)(szPath);
 }
 
-CONFINED int openat(int nDirectory, const char* szName, int nFlags, ...)
+INTERPOSED int openat(int nDirectory, const char* szName, int nFlags, ...)
 {
     va_list args;
     va_start(args, nFlags);
@@ -272,7 +263,7 @@ CONFINED int openat(int nDirectory, const char* szName, int nFlags, ...)
                      : NEXT(open)(("/proc/self/fd/" + std::to_string(nFile)).c_str(), O_RDONLY | O_CLOEXEC);
 }
 
-CONFINED int open(const char* szPath, int nFlags, ...)
+INTERPOSED int open(const char* szPath, int nFlags, ...)
 {
     va_list args;
     va_start(args, nFlags);
@@ -285,33 +276,33 @@ CONFINED int open(const char* szPath, int nFlags, ...)
     return g_blConfined && !blHarmless ? refused(ENOENT) : NEXT(open)(szPath, nFlags, mode);
 }
 
-CONFINED FILE* fopen64(const char* szPath, const char* szMode)
+INTERPOSED FILE* fopen64(const char* szPath, const char* szMode)
 {
     return g_blConfined && refused(ENOENT) ? nullptr : NEXT(fopen64)(szPath, szMode);
 }
 
-CONFINED int isatty(int nFile) noexcept
+INTERPOSED int isatty(int nFile) noexcept
 {
     return g_blConfined ? 0 : NEXT(isatty)(nFile);
 }
 
-CONFINED int usleep(useconds_t nMicroseconds)
+INTERPOSED int usleep(useconds_t nMicroseconds)
 {
     return g_blConfined ? 0 : NEXT(usleep)(nMicroseconds);
 }
 
-CONFINED int getpwnam_r(const char* szName, struct passwd* pEntry, char*, size_t, struct passwd** ppFound)
+INTERPOSED int getpwnam_r(const char* szName, struct passwd* pEntry, char*, size_t, struct passwd** ppFound)
 {
     const bool blAnna = 0 == strcmp(szName, "anna");
     return userOf(blAnna || 0 == strcmp(szName, "root"), "", blAnna ? ANNA : 0, pEntry, ppFound);
 }
 
-CONFINED int getpwuid_r(uid_t uid, struct passwd* pEntry, char*, size_t, struct passwd** ppFound)
+INTERPOSED int getpwuid_r(uid_t uid, struct passwd* pEntry, char*, size_t, struct passwd** ppFound)
 {
     return userOf(uid == ANNA || uid == 0, uid ? "anna" : "root", uid, pEntry, ppFound);
 }
 
-CONFINED void syslog(int, const char* szFormat, ...)
+INTERPOSED void syslog(int, const char* szFormat, ...)
 {
     char szLine[256];
     va_list args;
@@ -320,7 +311,7 @@ CONFINED void syslog(int, const char* szFormat, ...)
     va_end(args);
 }
 
-CONFINED int printf(const char* szFormat, ...)
+INTERPOSED int printf(const char* szFormat, ...)
 {
     char szLine[256];
     va_list args;

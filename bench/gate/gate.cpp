@@ -142,7 +142,7 @@ void redis(benchmark::State& state, int nUsed, size_t nClients)
 }
 
 // Programs that call the library, with a gate that holds the store open or without.
-void callers(benchmark::State& state, Journal journal, int nProcesses, bool blLock, bool blGate)
+void callers(benchmark::State& state, Journal journal, int nProcesses, Calls calls, bool blGate)
 {
     const std::unique_ptr<Store> pStore = makeStore(journal, TOKENS);
     const std::unique_ptr<Gate> pGate = blGate ? std::make_unique<Gate>(*pStore) : nullptr;
@@ -155,7 +155,7 @@ void callers(benchmark::State& state, Journal journal, int nProcesses, bool blLo
         run(load);
     }
     for (auto _ : state) {
-        state.counters["per_second"] = grantsPerSecond(nProcesses, TOKENS, SECONDS, blLock);
+        state.counters["per_second"] = grantsPerSecond(grantAtOnce(nProcesses, TOKENS, SECONDS, calls));
         state.SetIterationTime(SECONDS);
     }
 }
@@ -182,10 +182,10 @@ void registerBenchmarks()
     add("many-tokens/64", gate, Journal::WriteAhead, MANY_TOKENS, TOKENS, CLIENTS);
     add("nginx-at-once/64", behindNginx, false);
     add("nginx/64", behindNginx, true);
-    add("calls/64", callers, Journal::Rollback, 64, false, false);
-    add("calls-locked/64", callers, Journal::Rollback, 64, true, false);
-    add("call/1", callers, Journal::WriteAhead, 1, false, false);
-    add("call-beside/1", callers, Journal::WriteAhead, 1, false, true);
+    add("calls/64", callers, Journal::Rollback, 64, Calls::Plain, false);
+    add("calls-locked/64", callers, Journal::Rollback, 64, Calls::Serialised, false);
+    add("call/1", callers, Journal::WriteAhead, 1, Calls::Plain, false);
+    add("call-beside/1", callers, Journal::WriteAhead, 1, Calls::Plain, true);
 }
 
 } // namespace

@@ -1,6 +1,5 @@
 // What CallLock promises: to threads, to forked children, across signals and when a holder is killed.
 
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 #include <pthread.h>
 #include <sys/stat.h>
@@ -20,9 +19,10 @@
 #include "AccessTokenUtil.h"
 #include "CallLock.h"
 #include "Figures.h"
+#include "Interpose.h"
 #include "ProcessState.h"
+#include "Processes.h"
 #include "StormCalls.h"
-#include "StormProcesses.h"
 #include "internal/AccessTokenDbApi.h"
 
 namespace {
@@ -52,8 +52,7 @@ extern "C" int flock(int nFile, int nOperation) noexcept
 
 extern "C" int fstat(int nFile, struct stat* pStatus) noexcept
 {
-    static const auto next = reinterpret_cast<decltype(&::fstat)>(dlsym(RTLD_NEXT, "fstat"));
-    return isAnswered() ? -1 : next(nFile, pStatus);
+    return isAnswered() ? -1 : NEXT(fstat)(nFile, pStatus);
 }
 
 namespace {
@@ -280,12 +279,12 @@ TEST_F(SerialisingLock, OnTheDatabaseTakesItsLocksAway)
     AccessTokenDbApi db;
     ASSERT_EQ(0, db.initDb());
     ASSERT_EQ(0, db.runSqlEx("BEGIN IMMEDIATE", nullptr, nullptr));
-    EXPECT_TRUE(isLockedBySqlite(m_calls.database()));
-    ASSERT_EQ(0, chmod(m_calls.database().c_str(), 0600)); // the lock refuses what is open to others
+    EXPECT_TRUE(isLockedBySqlite(m_calls.store().path()));
+    ASSERT_EQ(0, chmod(m_calls.store().path().c_str(), 0600)); // the lock refuses what is open to others
     {
-        const CallLock lock(m_calls.database().c_str());
+        const CallLock lock(m_calls.store().path().c_str());
     }
-    EXPECT_FALSE(isLockedBySqlite(m_calls.database()));
+    EXPECT_FALSE(isLockedBySqlite(m_calls.store().path()));
 }
 
 // What others could open, they could hold for ever.

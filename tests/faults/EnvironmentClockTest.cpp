@@ -9,8 +9,11 @@
 
 #include <ctime>
 #include <limits>
+#include <optional>
+#include <vector>
 
 #include "AccessTokenApi.h"
+#include "Interpose.h"
 #include "ProcessState.h"
 #include "TokenStore.h"
 #include "vemo-access-token.h"
@@ -22,12 +25,13 @@ const time_t NOW = 1700000000;
 const time_t LAST_OF_32_BITS = std::numeric_limits<int32_t>::max();
 const time_t YEAR_10000 = 253402300800;
 
-time_t g_now = NOW;
+std::optional<time_t> g_now; // of this test's clock; the others have the real one
 
 // A store of its own and the token that was created last.
 class Clock : public ::testing::Test {
 protected:
     Clock() { g_now = NOW; }
+    ~Clock() override { g_now.reset(); }
 
     // Creates a token with a lifetime, or with the default of a day.
     int create(const Json::Value& jLifetime = Json::Value())
@@ -74,15 +78,19 @@ protected:
 // The clocks of the library and of SQLite.
 extern "C" time_t time(time_t* pTime) noexcept
 {
+    const time_t now = g_now ? *g_now : NEXT(time)(nullptr);
     if (pTime) {
-        *pTime = g_now;
+        *pTime = now;
     }
-    return g_now;
+    return now;
 }
 
-extern "C" int gettimeofday(struct timeval* pTime, void*) noexcept
+extern "C" int gettimeofday(struct timeval* pTime, void* pZone) noexcept
 {
-    *pTime = {g_now, 0};
+    if (!g_now) {
+        return NEXT(gettimeofday)(pTime, pZone);
+    }
+    *pTime = {*g_now, 0};
     return 0;
 }
 

@@ -2,43 +2,33 @@
 
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <cstdio>
 #include <cstring>
 #include <functional>
-#include <memory>
-#include <optional>
 
 #include "AccessTokenApi.h"
 #include "AccessTokenUtil.h"
-#include "EnvironmentOutcome.h"
 #include "Environments.h"
+#include "Operations.h"
+#include "Oracle.h"
+#include "ProcessState.h"
+#include "Processes.h"
+#include "ShortWaits.h"
 
 namespace {
 
-// An environment, until it is released. Nothing virtual here: where there are no descriptors,
-// UndefinedBehaviorSanitizer cannot look at objects and takes them for broken.
-typedef std::unique_ptr<void, void (*)(void*)> Stay;
-typedef std::function<Stay(const TokenStore&)> Entry;
-
-template <typename Environment, typename... Arguments>
-Entry in(Arguments... arguments)
-{
-    return [=](const TokenStore& store) {
-        return Stay(new Environment(store, arguments...),
-                    [](void* pEnvironment) { delete static_cast<Environment*>(pEnvironment); });
-    };
-}
-
 enum class Needs { Nothing, Root, FileSystem };
 
-// The outcomes of a first creation, of the operations that change a store, and of a listing. They are the
-// words of EnvironmentOutcome.h; a first creation without any does not meet the environment.
+// The outcomes of a first creation, of the operations that change a store, and of a listing, in the words of
+// outcomeOf(). A first creation without any does not meet the environment.
 struct Row {
     const char* szName;
-    Entry enter;
+    Environment enter;
     std::string strFirst;
     std::string strChange;
     std::string strListing;
@@ -87,63 +77,62 @@ const std::string FULL = sqlError("database or disk is full");
 const std::string NO_TABLE = sqlError("no such table: token");
 const std::string LOCKED = "i=500,run sql failed, error=database is locked, 500 waits";
 
-Row everywhere(const char* szName, const Entry& enter, const std::string& strOutcome)
+Row everywhere(const char* szName, const Environment& enter, const std::string& strOutcome)
 {
     return {szName, enter, strOutcome, strOutcome, strOutcome};
 }
 
 const std::vector<Row> ROWS = {
-    {"Umask0", in<Umask>(0U), DONE_FIRST, DONE, DONE},
-    {"Umask022", in<Umask>(022U), DONE_FIRST, DONE, DONE},
-    {"Umask077", in<Umask>(077U), DONE_FIRST, DONE, DONE},
-    {"Umask0777", in<Umask>(0777U), DONE_FIRST, DONE, DONE},
+    {"Umask0", umaskOf(0), DONE_FIRST, DONE, DONE},
+    {"Umask022", umaskOf(022), DONE_FIRST, DONE, DONE},
+    {"Umask077", umaskOf(077), DONE_FIRST, DONE, DONE},
+    {"Umask0777", umaskOf(0777), DONE_FIRST, DONE, DONE},
 
-    everywhere("NoDirectory", in<DirectoryIs>(Thing::Nothing), noTouch("No such file or directory")),
-    everywhere("FileAsDirectory", in<DirectoryIs>(Thing::EmptyFile), noTouch("Not a directory")),
-    everywhere("DanglingLinkAsDirectory", in<DirectoryIs>(Thing::DanglingLink),
+    everywhere("NoDirectory", directoryIs(Thing::Nothing), noTouch("No such file or directory")),
+    everywhere("FileAsDirectory", directoryIs(Thing::EmptyFile), noTouch("Not a directory")),
+    everywhere("DanglingLinkAsDirectory", directoryIs(Thing::DanglingLink),
                noTouch("No such file or directory")),
-    {"LinkAsDirectory", in<DirectoryIs>(Thing::Link), DONE_FIRST, DONE, DONE},
+    {"LinkAsDirectory", directoryIs(Thing::Link), DONE_FIRST, DONE, DONE},
 
     // A file that is there is never given the table, and a directory in its place costs the effective uid.
-    everywhere("EmptyDatabase", in<DatabaseIs>(Thing::EmptyFile), refused(NO_TABLE)),
-    everywhere("DirectoryAsDatabase", in<DatabaseIs>(Thing::Directory), noOpen("14")),
-    everywhere("FifoAsDatabase", in<DatabaseIs>(Thing::Fifo), noOpen("10")),
-    everywhere("DanglingLinkAsDatabase", in<DatabaseIs>(Thing::DanglingLink),
+    everywhere("EmptyDatabase", databaseIs(Thing::EmptyFile), refused(NO_TABLE)),
+    everywhere("DirectoryAsDatabase", databaseIs(Thing::Directory), noOpen("14")),
+    everywhere("FifoAsDatabase", databaseIs(Thing::Fifo), noOpen("10")),
+    everywhere("DanglingLinkAsDatabase", databaseIs(Thing::DanglingLink),
                noTouch("No such file or directory")),
-    {"LinkAsDatabase", in<DatabaseIs>(Thing::Link), "", DONE, DONE},
+    {"LinkAsDatabase", databaseIs(Thing::Link), "", DONE, DONE},
 
     // Without root, modes bind.
-    {"OrdinaryUser", in<Modes>(User::Other, 0700U, 0600U), DONE_FIRST, DONE, DONE},
-    {"ReadOnlyDirectory", in<Modes>(User::Other, 0500U, 0600U), noTouch("Permission denied"),
-     refused(READ_ONLY), DONE},
-    {"ReadOnlyDatabase", in<Modes>(User::Other, 0700U, 0400U), "", refused(READ_ONLY), DONE},
-    {"UnreadableDatabase", in<Modes>(User::Other, 0700U, 0U), "", noOpen("14"), noOpen("14")},
-    {"ReadOnlyForRoot", in<Modes>(User::Same, 0500U, 0400U), DONE_FIRST, DONE, DONE, Needs::Root},
+    {"OrdinaryUser", modes(User::Other, 0700, 0600), DONE_FIRST, DONE, DONE},
+    {"ReadOnlyDirectory", modes(User::Other, 0500, 0600), noTouch("Permission denied"), refused(READ_ONLY),
+     DONE},
+    {"ReadOnlyDatabase", modes(User::Other, 0700, 0400), "", refused(READ_ONLY), DONE},
+    {"UnreadableDatabase", modes(User::Other, 0700, 0), "", noOpen("14"), noOpen("14")},
+    {"ReadOnlyForRoot", modes(User::Same, 0500, 0400), DONE_FIRST, DONE, DONE, Needs::Root},
 
-    {"NoStandardInput", in<ClosedDescriptors>(std::vector<int>{0}), DONE_FIRST, DONE, DONE},
-    {"NoStandardOutput", in<ClosedDescriptors>(std::vector<int>{1}), DONE_FIRST, DONE, DONE},
-    {"NoStandardError", in<ClosedDescriptors>(std::vector<int>{2}), DONE_FIRST, DONE, DONE},
-    {"NoStandardStreams", in<ClosedDescriptors>(std::vector<int>{0, 1, 2}), DONE_FIRST, DONE, DONE},
+    {"NoStandardInput", closedDescriptors({0}), DONE_FIRST, DONE, DONE},
+    {"NoStandardOutput", closedDescriptors({1}), DONE_FIRST, DONE, DONE},
+    {"NoStandardError", closedDescriptors({2}), DONE_FIRST, DONE, DONE},
+    {"NoStandardStreams", closedDescriptors({0, 1, 2}), DONE_FIRST, DONE, DONE},
 
     // The database takes one descriptor, its journal another. A third would be for the directory, and is not
     // missed.
-    {"NoDescriptor", in<FreeDescriptors>(0U), noTouch("Too many open files"), noOpen("14"), noOpen("14")},
-    {"OneDescriptor", in<FreeDescriptors>(1U), noTable(NO_JOURNAL), refused(NO_JOURNAL), DONE},
-    {"TwoDescriptors", in<FreeDescriptors>(2U), DONE_FIRST, DONE, DONE},
+    {"NoDescriptor", freeDescriptors(0), noTouch("Too many open files"), noOpen("14"), noOpen("14")},
+    {"OneDescriptor", freeDescriptors(1U), noTable(NO_JOURNAL), refused(NO_JOURNAL), DONE},
+    {"TwoDescriptors", freeDescriptors(2U), DONE_FIRST, DONE, DONE},
 
-    {"NoFileMayGrow", in<FileSizeLimit>(0U), noTable(IO_ERROR), refused(IO_ERROR), DONE},
-    {"FilesOfTwoPages", in<FileSizeLimit>(8192U), noTable(IO_ERROR), refused(IO_ERROR), DONE},
-    {"FilesOfFourPages", in<FileSizeLimit>(16384U), DONE_FIRST, refused(IO_ERROR), DONE},
+    {"NoFileMayGrow", fileSizeLimit(0), noTable(IO_ERROR), refused(IO_ERROR), DONE},
+    {"FilesOfTwoPages", fileSizeLimit(8192), noTable(IO_ERROR), refused(IO_ERROR), DONE},
+    {"FilesOfFourPages", fileSizeLimit(16384), DONE_FIRST, refused(IO_ERROR), DONE},
 
-    {"StoppedWriter", in<StoppedHolder>("BEGIN EXCLUSIVE"), "", refused(LOCKED), refused(LOCKED)},
-    {"StoppedBeforeItWrites", in<StoppedHolder>("BEGIN IMMEDIATE"), "", refused(LOCKED), DONE},
-    {"StoppedReader", in<StoppedHolder>("BEGIN; SELECT * FROM token"), "", refused(LOCKED), DONE},
+    {"StoppedWriter", stoppedHolder("BEGIN EXCLUSIVE"), "", refused(LOCKED), refused(LOCKED)},
+    {"StoppedBeforeItWrites", stoppedHolder("BEGIN IMMEDIATE"), "", refused(LOCKED), DONE},
+    {"StoppedReader", stoppedHolder("BEGIN; SELECT * FROM token"), "", refused(LOCKED), DONE},
 
-    {"FullFileSystem", in<FullFileSystem>(0U), noTable(FULL), refused(FULL), DONE, Needs::FileSystem},
-    {"NearlyFullFileSystem", in<FullFileSystem>(8192U), noTable(FULL), refused(FULL), DONE,
+    {"FullFileSystem", fullFileSystem(0), noTable(FULL), refused(FULL), DONE, Needs::FileSystem},
+    {"NearlyFullFileSystem", fullFileSystem(8192), noTable(FULL), refused(FULL), DONE, Needs::FileSystem},
+    {"ReadOnlyFileSystem", readOnlyFileSystem(), noTouch("Read-only file system"), refused(READ_ONLY), DONE,
      Needs::FileSystem},
-    {"ReadOnlyFileSystem", in<ReadOnlyFileSystem>(), noTouch("Read-only file system"), refused(READ_ONLY),
-     DONE, Needs::FileSystem},
 };
 
 const std::string& expectedOf(const Row& row, const Operation& operation)
@@ -153,38 +142,91 @@ const std::string& expectedOf(const Row& row, const Operation& operation)
                                                       : row.strChange;
 }
 
-void expectOutcomes(const TokenStore& store, const Row& row)
+int (*g_pRun)() = nullptr;
+int g_nResult = 0;
+
+int runAndRemember()
 {
-    for (const Operation& operation : operations()) {
-        SCOPED_TRACE(operation.szName);
-        const std::string& strExpected = expectedOf(row, operation);
-        Stay stay(nullptr, [](void*) {});
-        if (!strExpected.empty()) {
-            EXPECT_EQ(strExpected,
-                      outcomeOf(
-                          store, operation, [&] { stay = row.enter(store); }, [&] { stay.reset(); }));
-        }
-    }
+    g_nResult = -1;
+    return g_nResult = g_pRun();
 }
 
-// The wait status of a child process, which exits with 1 when an expectation fails in it.
-int statusOfChild(const std::function<void()>& run)
+std::string modeOf(const std::string& strPath)
 {
-    const pid_t nProcess = fork();
-    if (0 == nProcess) {
-        run();
-        _exit(::testing::Test::HasFailure() ? 1 : 0);
+    struct stat status;
+    if (0 != stat(strPath.c_str(), &status)) {
+        return "";
     }
-    int nStatus = -1;
-    EXPECT_EQ(nProcess, waitpid(nProcess, &nStatus, 0));
-    return nStatus;
+    char szMode[16];
+    snprintf(szMode, sizeof(szMode), ", mode %04o", status.st_mode & 07777);
+    return szMode;
 }
 
-class Environment : public ::testing::TestWithParam<Row> {};
+// How the operation ended, judged by the store and by the next call, which nothing disturbs.
+std::string endOf(const TokenStore& store, const Operation& operation)
+{
+    if (0 <= g_nResult) {
+        return "done";
+    }
+    const std::string strAfter = store.state();
+    const bool blWorksAgain = 0 <= operation.run();
+    if (strAfter == STATE_NO_TABLE) {
+        return blWorksAgain ? "leaves no table for the moment" : "leaves no table";
+    }
+    prepareStore(store, operation);
+    if (strAfter != store.state()) {
+        return "fails late";
+    }
+    return blWorksAgain ? "refused" : "refused for good";
+}
+
+// Runs an operation in an environment and has the oracle judge it. Returns
+// - "done": it gave its result, and the store holds what it does
+// - "refused: WHY": it failed, the store is as it was, and the next call in peace works; WHY is the first
+// line of its
+//   log, without location and statement
+// - "leaves no table: WHY": it failed, and leaves a file without the table, so that the next call fails too
+// - "fails late: WHY": it failed, and yet the store holds what it does
+// A first creation that leaves a file says its mode, "done, mode 0700"; a file that was there keeps its own.
+// Waits for a lock are counted for each statement: ", 500 waits". Whatever the oracle finds wrong comes last,
+// after "; WRONG: ".
+std::string outcomeOf(const TokenStore& store, const Operation& operation, const Environment& enter)
+{
+    g_pRun = operation.run;
+    Operation watched = operation;
+    watched.run = &runAndRemember;
+    std::function<void()> leave;
+    std::string strModeBefore;
+    std::string strMode;
+    const std::string strWrong = Oracle(store, watched)
+                                     .judge(
+                                         [&] {
+                                             leave = enter(store);
+                                             strModeBefore = modeOf(store.path());
+                                             takeWaits();
+                                         },
+                                         [&] {
+                                             strMode = modeOf(store.path());
+                                             leave();
+                                         });
+    std::string strDetails = strMode == strModeBefore ? "" : strMode;
+    if (0 > g_nResult) {
+        strDetails += ": " + Log::firstLine();
+    }
+    if (const int nWaits = takeWaits()) {
+        strDetails += ", " + std::to_string(nWaits / (operation.blPurges ? 2 : 1)) + " waits";
+    }
+    if (!strWrong.empty()) {
+        strDetails += "; WRONG: " + strWrong;
+    }
+    return endOf(store, operation) + strDetails;
+}
+
+class InEnvironment : public ::testing::TestWithParam<Row> {};
 
 } // namespace
 
-TEST_P(Environment, HasItsOutcomeForEachOperation)
+TEST_P(InEnvironment, HasItsOutcomeForEachOperation)
 {
     const Row& row = GetParam();
     if (Needs::Root == row.needs && 0 != getuid()) {
@@ -192,17 +234,21 @@ TEST_P(Environment, HasItsOutcomeForEachOperation)
     }
     try {
         const TokenStore store;
-        std::optional<SmallFileSystem> fileSystem;
-        if (Needs::FileSystem == row.needs) {
-            fileSystem.emplace(store);
+        const auto unmount = Needs::FileSystem == row.needs ? smallFileSystem()(store) : [] {};
+        for (const Operation& operation : operations()) {
+            SCOPED_TRACE(operation.szName);
+            const std::string& strExpected = expectedOf(row, operation);
+            if (!strExpected.empty()) {
+                EXPECT_EQ(strExpected, outcomeOf(store, operation, row.enter));
+            }
         }
-        expectOutcomes(store, row);
+        unmount();
     } catch (const Unavailable& unavailable) {
         GTEST_SKIP() << unavailable.what();
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(In, Environment, ::testing::ValuesIn(ROWS),
+INSTANTIATE_TEST_SUITE_P(In, InEnvironment, ::testing::ValuesIn(ROWS),
                          [](const auto& instance) { return instance.param.szName; });
 
 // The signal that tells of the limit kills a process that does not ignore it; what it was writing is undone.
@@ -210,17 +256,16 @@ TEST(FileSizeSignal, EndsTheProcessAndLeavesTheStoreAsItWas)
 {
     const TokenStore store;
     const Operation& operation = operationNamed("update");
-    for (const rlim_t cbMax : {0U, 8192U, 16384U}) {
+    for (const size_t cbMax : {0U, 8192U, 16384U}) {
         SCOPED_TRACE(cbMax);
         prepareStore(store, operation);
         const std::string strBefore = store.state();
-        const int nStatus = statusOfChild([&] {
+        const int nStatus = statusOf(startProcess([&] {
             const struct rlimit noCore = {};
             setrlimit(RLIMIT_CORE, &noCore);
-            const FileSizeLimit limit(store, cbMax);
-            signal(SIGXFSZ, SIG_DFL);
+            fileSizeLimit(cbMax, Signal::Kills)(store);
             operation.run();
-        });
+        }));
         EXPECT_TRUE(WIFSIGNALED(nStatus));
         EXPECT_EQ(SIGXFSZ, WTERMSIG(nStatus));
         EXPECT_EQ(strBefore, store.state());
@@ -232,15 +277,18 @@ TEST(ClosedStandardStreams, KeepLogLinesOutOfTheDatabase)
 {
     const TokenStore store;
     const Operation& operation = operationNamed("creation under a given id");
-    const int nStatus = statusOfChild([&] {
+    EXPECT_TRUE(endsWell(startProcess([&] {
         VEMO_ACCESS_TOKEN::logToStdout(true);
         setvbuf(stdout, nullptr, _IONBF, 0);
-        const ClosedDescriptors closed(store, {0, 1, 2});
+        const auto reopen = closedDescriptors({0, 1, 2})(store);
         const AccessTokenApi api; // creates the store, and keeps it open
-        EXPECT_EQ(0, operation.run());
-        EXPECT_EQ(-1, operation.run()); // logs why
-    });
-    EXPECT_EQ(0, nStatus);
+        const int nFirst = operation.run();
+        const int nSecond = operation.run(); // fails, and logs why
+        reopen();
+        if (0 != nFirst || -1 != nSecond || ::testing::Test::HasFailure()) {
+            throw std::logic_error("not as with streams");
+        }
+    })));
     EXPECT_EQ(1U, store.files().size());
     EXPECT_EQ(std::string::npos, store.files().begin()->second.find("Failed ["));
     EXPECT_EQ(0U, store.state().find("known-given|")) << store.state();

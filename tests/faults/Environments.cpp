@@ -5,7 +5,7 @@
 #include <signal.h>
 #include <sqlite3.h>
 #include <sys/mount.h>
-#include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
@@ -17,7 +17,13 @@
 #include <filesystem>
 #include <fstream>
 
+#include "Processes.h"
+
 namespace {
+
+namespace fs = std::filesystem;
+
+typedef std::function<void()> Leave;
 
 const uid_t UID_NOBODY = 65534;
 
@@ -28,12 +34,7 @@ void provide(bool blSucceeded, const char* szWhat)
     }
 }
 
-// The real effective uid, whatever the library is made to believe.
-uid_t realEffectiveUid()
-{
-    return static_cast<uid_t>(syscall(SYS_geteuid));
-}
-
+// Past the redirection, which keeps an effective uid of its own.
 void becomeReally(uid_t uid)
 {
     provide(0 == syscall(SYS_setresuid, -1, uid, -1), "change the user");
@@ -50,208 +51,198 @@ void make(Thing thing, const std::string& strPath, const std::string& strTarget)
     switch (thing) {
     case Thing::Nothing: break;
     case Thing::EmptyFile: std::ofstream{strPath}; break;
-    case Thing::Directory: std::filesystem::create_directory(strPath); break;
-    case Thing::Link: std::filesystem::create_symlink(strTarget, strPath); break;
-    case Thing::DanglingLink: std::filesystem::create_symlink("nowhere", strPath); break;
+    case Thing::Directory: fs::create_directory(strPath); break;
+    case Thing::Link: fs::create_symlink(strTarget, strPath); break;
+    case Thing::DanglingLink: fs::create_symlink("nowhere", strPath); break;
     case Thing::Fifo: EXPECT_EQ(0, mkfifo(strPath.c_str(), 0600)); break;
     }
 }
 
-int openNull()
+// Sets a limit, and returns how to put it back.
+Leave limit(__rlimit_resource resource, rlim_t nLimit)
 {
-    return open("/dev/null", O_RDONLY | O_CLOEXEC);
-}
-
-// Holds a lock, stops, and lets go when it is continued. The exit status tells whether all went well.
-[[noreturn]] void holdLock(const std::string& strPath, const char* szSql)
-{
-    prctl(PR_SET_PDEATHSIG, SIGKILL); // or it would stay stopped if the test were killed
-    sqlite3* pDb = nullptr;
-    const bool blHeld = SQLITE_OK == sqlite3_open_v2(strPath.c_str(), &pDb, SQLITE_OPEN_READWRITE, "unix") &&
-                        SQLITE_OK == sqlite3_exec(pDb, szSql, nullptr, nullptr, nullptr);
-    raise(SIGSTOP);
-    _exit(blHeld && SQLITE_OK == sqlite3_exec(pDb, "COMMIT", nullptr, nullptr, nullptr) ? 0 : 1);
+    struct rlimit before = {};
+    getrlimit(resource, &before);
+    const struct rlimit limit = {nLimit, before.rlim_max};
+    EXPECT_EQ(0, setrlimit(resource, &limit));
+    return [=] { setrlimit(resource, &before); };
 }
 
 } // namespace
 
-Umask::Umask(const TokenStore&, mode_t mode) : m_mode(mode), m_modeBefore(umask(mode)) {}
-
-Umask::~Umask()
+Environment umaskOf(mode_t mode)
 {
-    EXPECT_EQ(m_mode, umask(m_modeBefore));
+    return [=](const TokenStore&) -> Leave {
+        const mode_t before = umask(mode);
+        return [=] { EXPECT_EQ(mode, umask(before)); };
+    };
 }
 
-DirectoryIs::DirectoryIs(const TokenStore& store, Thing thing) : m_store(store)
+Environment directoryIs(Thing thing)
 {
-    const std::string strPath = store.directory() + "/directory";
-    make(thing, strPath, ".");
-    setenv("VEMO_REDIRECT_DIR", strPath.c_str(), 1);
+    return [=](const TokenStore& store) -> Leave {
+        const std::string strPath = store.directory() + "/directory";
+        make(thing, strPath, ".");
+        setenv("VEMO_REDIRECT_DIR", strPath.c_str(), 1);
+        return [&store] { setenv("VEMO_REDIRECT_DIR", store.directory().c_str(), 1); };
+    };
 }
 
-DirectoryIs::~DirectoryIs()
+Environment databaseIs(Thing thing)
 {
-    setenv("VEMO_REDIRECT_DIR", m_store.directory().c_str(), 1);
+    return [=](const TokenStore& store) -> Leave {
+        const std::string strPath = store.path();
+        const std::string strAside = store.directory() + "/aside";
+        const bool blMissing = !fs::exists(strPath);
+        if (!blMissing) {
+            fs::rename(strPath, strAside);
+        }
+        make(thing, strPath, "aside");
+        const fs::file_type type = fs::symlink_status(strPath).type();
+        return [=] {
+            EXPECT_EQ(type, fs::symlink_status(strPath).type());
+            fs::remove(strPath);
+            if (!blMissing) {
+                fs::rename(strAside, strPath);
+            }
+        };
+    };
 }
 
-DatabaseIs::DatabaseIs(const TokenStore& store, Thing thing)
-    : m_strPath(store.path()),
-      m_strAside(store.directory() + "/aside"),
-      m_blMissing(!std::filesystem::exists(m_strPath))
+Environment modes(User user, mode_t modeDirectory, mode_t modeFile)
 {
-    if (!m_blMissing) {
-        std::filesystem::rename(m_strPath, m_strAside);
-    }
-    make(thing, m_strPath, "aside");
-    m_type = std::filesystem::symlink_status(m_strPath).type();
+    return [=](const TokenStore& store) -> Leave {
+        const auto uidBefore = static_cast<uid_t>(syscall(SYS_geteuid));
+        const uid_t uid = User::Other == user && 0 == uidBefore ? UID_NOBODY : uidBefore;
+        if (fs::exists(store.path())) {
+            setMode(store.path(), uid, modeFile);
+        }
+        setMode(store.directory(), uid, modeDirectory);
+        becomeReally(uid);
+        if (std::error_code ignored; !fs::exists(store.directory(), ignored)) {
+            becomeReally(uidBefore);
+            throw Unavailable("another user cannot reach " + store.directory());
+        }
+        return [=, &store] {
+            becomeReally(uidBefore);
+            setMode(store.directory(), uidBefore, 0700);
+            if (fs::exists(store.path())) {
+                setMode(store.path(), uidBefore, 0600); // can be read again, by others than root too
+            }
+        };
+    };
 }
 
-DatabaseIs::~DatabaseIs()
+Environment closedDescriptors(const std::vector<int>& descriptors)
 {
-    EXPECT_EQ(m_type, std::filesystem::symlink_status(m_strPath).type());
-    std::filesystem::remove(m_strPath);
-    if (!m_blMissing) {
-        std::filesystem::rename(m_strAside, m_strPath);
-    }
+    return [=](const TokenStore&) -> Leave {
+        std::vector<int> kept;
+        for (const int nDescriptor : descriptors) {
+            kept.push_back(fcntl(nDescriptor, F_DUPFD_CLOEXEC, 3));
+            close(nDescriptor);
+        }
+        return [=] {
+            std::vector<std::string> targets;
+            for (size_t i = 0; i < descriptors.size(); ++i) {
+                targets.push_back(fs::read_symlink("/proc/self/fd/" + std::to_string(descriptors[i])));
+                dup2(kept[i], descriptors[i]);
+                close(kept[i]);
+            }
+            EXPECT_EQ(std::vector<std::string>(descriptors.size(), "/dev/null"), targets);
+        };
+    };
 }
 
-Modes::Modes(const TokenStore& store, User user, mode_t modeDirectory, mode_t modeFile)
-    : m_store(store), m_uidBefore(realEffectiveUid())
+Environment freeDescriptors(size_t nFree)
 {
-    const uid_t uid = User::Other == user && 0 == m_uidBefore ? UID_NOBODY : m_uidBefore;
-    if (std::filesystem::exists(store.path())) {
-        setMode(store.path(), uid, modeFile);
-    }
-    setMode(store.directory(), uid, modeDirectory);
-    becomeReally(uid);
-    std::error_code ignored;
-    if (!std::filesystem::exists(store.directory(), ignored)) {
-        becomeReally(m_uidBefore);
-        throw Unavailable("another user cannot reach " + store.directory());
-    }
+    return [=](const TokenStore&) -> Leave {
+        const Leave restoreLimit = limit(RLIMIT_NOFILE, 64);
+        std::vector<int> taken;
+        for (int n = 0; 0 <= (n = open("/dev/null", O_RDONLY | O_CLOEXEC));) {
+            taken.push_back(n);
+        }
+        for (size_t nLeft = nFree; 0 < nLeft; --nLeft) {
+            close(taken.back());
+            taken.pop_back();
+        }
+        return [=] {
+            for (const int nDescriptor : taken) {
+                close(nDescriptor);
+            }
+            restoreLimit();
+        };
+    };
 }
 
-Modes::~Modes()
+Environment fileSizeLimit(size_t cbMax, Signal atLimit)
 {
-    becomeReally(m_uidBefore);
-    setMode(m_store.directory(), m_uidBefore, 0700);
-    if (std::filesystem::exists(m_store.path())) {
-        setMode(m_store.path(), m_uidBefore, 0600); // can be read again, by others than root too
-    }
+    return [=](const TokenStore&) -> Leave {
+        const Leave restoreLimit = limit(RLIMIT_FSIZE, cbMax);
+        signal(SIGXFSZ, Signal::Ignored == atLimit ? SIG_IGN : SIG_DFL);
+        return [=] {
+            restoreLimit();
+            signal(SIGXFSZ, SIG_DFL);
+        };
+    };
 }
 
-ClosedDescriptors::ClosedDescriptors(const TokenStore&, const std::vector<int>& descriptors)
-    : m_descriptors(descriptors)
+Environment stoppedHolder(const char* szSql)
 {
-    for (const int nDescriptor : m_descriptors) {
-        m_kept.push_back(fcntl(nDescriptor, F_DUPFD_CLOEXEC, 3));
-        close(nDescriptor);
-    }
+    return [=](const TokenStore& store) -> Leave {
+        const pid_t pid = startProcess([&] {
+            sqlite3* pDb = nullptr;
+            const bool blHeld =
+                SQLITE_OK == sqlite3_open_v2(store.path().c_str(), &pDb, SQLITE_OPEN_READWRITE, "unix") &&
+                SQLITE_OK == sqlite3_exec(pDb, szSql, nullptr, nullptr, nullptr);
+            raise(SIGSTOP);
+            if (!blHeld || SQLITE_OK != sqlite3_exec(pDb, "COMMIT", nullptr, nullptr, nullptr)) {
+                throw std::runtime_error("the lock was not held");
+            }
+        });
+        int nStatus = 0;
+        EXPECT_EQ(pid, waitpid(pid, &nStatus, WUNTRACED));
+        EXPECT_TRUE(WIFSTOPPED(nStatus));
+        return [=] {
+            kill(pid, SIGCONT);
+            EXPECT_TRUE(endsWell(pid));
+        };
+    };
 }
 
-ClosedDescriptors::~ClosedDescriptors()
+Environment smallFileSystem()
 {
-    std::vector<std::string> targets;
-    for (size_t i = 0; i < m_descriptors.size(); ++i) {
-        targets.push_back(std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(m_descriptors[i])));
-        dup2(m_kept[i], m_descriptors[i]);
-        close(m_kept[i]);
-    }
-    EXPECT_EQ(std::vector<std::string>(m_descriptors.size(), "/dev/null"), targets);
+    return [=](const TokenStore& store) -> Leave {
+        const char* const szDirectory = store.directory().c_str();
+        provide(0 == unshare(CLONE_NEWNS) && 0 == mount(nullptr, "/", "", MS_REC | MS_PRIVATE, nullptr) &&
+                    0 == mount("tmpfs", szDirectory, "tmpfs", 0, "size=256k,mode=0700"),
+                "mount a file system that nobody else sees");
+        return [=] { umount2(szDirectory, MNT_DETACH); };
+    };
 }
 
-FreeDescriptors::FreeDescriptors(const TokenStore&, size_t nFree)
+Environment fullFileSystem(size_t cbFree)
 {
-    getrlimit(RLIMIT_NOFILE, &m_limitBefore);
-    struct rlimit limit = m_limitBefore;
-    limit.rlim_cur = 64;
-    EXPECT_EQ(0, setrlimit(RLIMIT_NOFILE, &limit));
-    for (int n = openNull(); 0 <= n; n = openNull()) {
-        m_taken.push_back(n);
-    }
-    for (; 0 < nFree; --nFree) {
-        close(m_taken.back());
-        m_taken.pop_back();
-    }
+    return [=](const TokenStore& store) -> Leave {
+        const std::string strFiller = store.directory() + "/filler";
+        const int nFile = open(strFiller.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
+        const std::string strBlock(4096, 'f');
+        size_t cbFiller = 0;
+        while (0 < write(nFile, strBlock.data(), strBlock.size())) {
+            cbFiller += strBlock.size();
+        }
+        EXPECT_EQ(0, ftruncate(nFile, static_cast<off_t>(cbFiller - cbFree)));
+        close(nFile);
+        return [=] { fs::remove(strFiller); };
+    };
 }
 
-FreeDescriptors::~FreeDescriptors()
+Environment readOnlyFileSystem()
 {
-    for (const int nDescriptor : m_taken) {
-        close(nDescriptor);
-    }
-    setrlimit(RLIMIT_NOFILE, &m_limitBefore);
-}
-
-FileSizeLimit::FileSizeLimit(const TokenStore&, rlim_t cbMax)
-{
-    getrlimit(RLIMIT_FSIZE, &m_limitBefore);
-    struct rlimit limit = m_limitBefore;
-    limit.rlim_cur = cbMax;
-    signal(SIGXFSZ, SIG_IGN);
-    EXPECT_EQ(0, setrlimit(RLIMIT_FSIZE, &limit));
-}
-
-FileSizeLimit::~FileSizeLimit()
-{
-    setrlimit(RLIMIT_FSIZE, &m_limitBefore);
-    signal(SIGXFSZ, SIG_DFL);
-}
-
-StoppedHolder::StoppedHolder(const TokenStore& store, const char* szSql) : m_nProcess(fork())
-{
-    if (0 == m_nProcess) {
-        holdLock(store.path(), szSql);
-    }
-    int nStatus = 0;
-    EXPECT_EQ(m_nProcess, waitpid(m_nProcess, &nStatus, WUNTRACED));
-    EXPECT_TRUE(WIFSTOPPED(nStatus));
-}
-
-StoppedHolder::~StoppedHolder()
-{
-    int nStatus = 0;
-    kill(m_nProcess, SIGCONT);
-    EXPECT_EQ(m_nProcess, waitpid(m_nProcess, &nStatus, 0));
-    EXPECT_EQ(0, nStatus);
-}
-
-SmallFileSystem::SmallFileSystem(const TokenStore& store) : m_store(store)
-{
-    provide(0 == unshare(CLONE_NEWNS) && 0 == mount(nullptr, "/", "", MS_REC | MS_PRIVATE, nullptr) &&
-                0 == mount("tmpfs", store.directory().c_str(), "tmpfs", 0, "size=256k,mode=0700"),
-            "mount a file system that nobody else sees");
-}
-
-SmallFileSystem::~SmallFileSystem()
-{
-    umount2(m_store.directory().c_str(), MNT_DETACH);
-}
-
-FullFileSystem::FullFileSystem(const TokenStore& store, size_t cbFree)
-    : m_strFiller(store.directory() + "/filler")
-{
-    const int nFile = open(m_strFiller.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
-    const std::string strBlock(4096, 'f');
-    off_t cbFiller = 0;
-    while (0 < write(nFile, strBlock.data(), strBlock.size())) {
-        cbFiller += static_cast<off_t>(strBlock.size());
-    }
-    EXPECT_EQ(0, ftruncate(nFile, cbFiller - static_cast<off_t>(cbFree)));
-    close(nFile);
-}
-
-FullFileSystem::~FullFileSystem()
-{
-    std::filesystem::remove(m_strFiller);
-}
-
-ReadOnlyFileSystem::ReadOnlyFileSystem(const TokenStore& store) : m_store(store)
-{
-    EXPECT_EQ(0, mount(nullptr, store.directory().c_str(), "", MS_REMOUNT | MS_RDONLY, nullptr));
-}
-
-ReadOnlyFileSystem::~ReadOnlyFileSystem()
-{
-    EXPECT_EQ(0, mount(nullptr, m_store.directory().c_str(), "", MS_REMOUNT, nullptr));
+    return [=](const TokenStore& store) -> Leave {
+        const auto remount = [&store](unsigned long nFlags) {
+            EXPECT_EQ(0, mount(nullptr, store.directory().c_str(), "", MS_REMOUNT | nFlags, nullptr));
+        };
+        remount(MS_RDONLY);
+        return [=] { remount(0); };
+    };
 }

@@ -1,262 +1,110 @@
 #include "FaultyVfs.h"
 
-#include <new>
+#include <map>
 
 namespace {
 
-FileHook g_hook;
+typedef sqlite3_io_methods Methods;
 
-// A file of ours; the real one stands right behind it.
+// An open file is SQLite's own, with other methods: those that go past the hook, and its own for the rest.
 struct File {
-    sqlite3_file base;
-    std::string* pstrPath;
-    sqlite3_file* real() { return reinterpret_cast<sqlite3_file*>(this + 1); }
+    std::string strPath;
+    const Methods* pReal;
+    Methods hooked;
 };
 
-File& fileOf(sqlite3_file* pFile)
+FileHook g_hook;
+sqlite3_vfs* g_pReal = nullptr;
+std::map<sqlite3_file*, File> g_files;
+
+template <auto METHOD, typename... Arguments>
+int passFile(FileCall call, sqlite3_file* pFile, Arguments... arguments)
 {
-    return *reinterpret_cast<File*>(pFile);
+    const File& file = g_files.at(pFile);
+    call.strPath = file.strPath;
+    return g_hook(call, [&] { return (file.pReal->*METHOD)(pFile, arguments...); });
 }
 
-sqlite3_vfs* realVfs(sqlite3_vfs* pVfs)
+template <auto METHOD, typename... Arguments>
+int pass(FileCall call, const char* szPath, Arguments... arguments)
 {
-    return static_cast<sqlite3_vfs*>(pVfs->pAppData);
-}
-
-int told(const FileCall& call, const std::function<int()>& real)
-{
-    return g_hook(call, real);
-}
-
-FileCall callOn(sqlite3_file* pFile, const char* szName, sqlite3_int64 nArgument = 0)
-{
-    FileCall call;
-    call.szName = szName;
-    call.strPath = *fileOf(pFile).pstrPath;
-    call.nArgument = nArgument;
-    return call;
-}
-
-int fileClose(sqlite3_file* pFile)
-{
-    const int nResult = told(callOn(pFile, "xClose"),
-                             [&] { return fileOf(pFile).real()->pMethods->xClose(fileOf(pFile).real()); });
-    delete fileOf(pFile).pstrPath;
-    fileOf(pFile).base.pMethods = nullptr;
-    return nResult;
-}
-
-int fileRead(sqlite3_file* pFile, void* pData, int cb, sqlite3_int64 nOffset)
-{
-    FileCall call = callOn(pFile, "xRead");
-    call.cb = cb;
-    call.nOffset = nOffset;
-    return told(call, [&] {
-        return fileOf(pFile).real()->pMethods->xRead(fileOf(pFile).real(), pData, cb, nOffset);
-    });
-}
-
-int fileWrite(sqlite3_file* pFile, const void* pData, int cb, sqlite3_int64 nOffset)
-{
-    FileCall call = callOn(pFile, "xWrite");
-    call.pData = pData;
-    call.cb = cb;
-    call.nOffset = nOffset;
-    call.write = [&](int cbPart) {
-        return fileOf(pFile).real()->pMethods->xWrite(fileOf(pFile).real(), pData, cbPart, nOffset);
-    };
-    return told(call, [&] { return call.write(cb); });
-}
-
-int fileTruncate(sqlite3_file* pFile, sqlite3_int64 cb)
-{
-    return told(callOn(pFile, "xTruncate", cb),
-                [&] { return fileOf(pFile).real()->pMethods->xTruncate(fileOf(pFile).real(), cb); });
-}
-
-int fileSync(sqlite3_file* pFile, int nFlags)
-{
-    return told(callOn(pFile, "xSync", nFlags),
-                [&] { return fileOf(pFile).real()->pMethods->xSync(fileOf(pFile).real(), nFlags); });
-}
-
-int fileSize(sqlite3_file* pFile, sqlite3_int64* pcb)
-{
-    return told(callOn(pFile, "xFileSize"),
-                [&] { return fileOf(pFile).real()->pMethods->xFileSize(fileOf(pFile).real(), pcb); });
-}
-
-int fileLock(sqlite3_file* pFile, int nLock)
-{
-    return told(callOn(pFile, "xLock", nLock),
-                [&] { return fileOf(pFile).real()->pMethods->xLock(fileOf(pFile).real(), nLock); });
-}
-
-int fileUnlock(sqlite3_file* pFile, int nLock)
-{
-    return told(callOn(pFile, "xUnlock", nLock),
-                [&] { return fileOf(pFile).real()->pMethods->xUnlock(fileOf(pFile).real(), nLock); });
-}
-
-int fileCheckReservedLock(sqlite3_file* pFile, int* pnReserved)
-{
-    return told(callOn(pFile, "xCheckReservedLock"), [&] {
-        return fileOf(pFile).real()->pMethods->xCheckReservedLock(fileOf(pFile).real(), pnReserved);
-    });
-}
-
-int fileControl(sqlite3_file* pFile, int nOperation, void* pArgument)
-{
-    return told(callOn(pFile, "xFileControl", nOperation), [&] {
-        return fileOf(pFile).real()->pMethods->xFileControl(fileOf(pFile).real(), nOperation, pArgument);
-    });
-}
-
-int fileSectorSize(sqlite3_file* pFile)
-{
-    return fileOf(pFile).real()->pMethods->xSectorSize(fileOf(pFile).real());
-}
-
-int fileDeviceCharacteristics(sqlite3_file* pFile)
-{
-    return fileOf(pFile).real()->pMethods->xDeviceCharacteristics(fileOf(pFile).real());
-}
-
-// The index of a write-ahead log: memory, which no disk and no fault concerns.
-int fileShmMap(sqlite3_file* pFile, int nRegion, int cb, int nExtend, void volatile** ppRegion)
-{
-    return fileOf(pFile).real()->pMethods->xShmMap(fileOf(pFile).real(), nRegion, cb, nExtend, ppRegion);
-}
-
-int fileShmLock(sqlite3_file* pFile, int nOffset, int n, int nFlags)
-{
-    return fileOf(pFile).real()->pMethods->xShmLock(fileOf(pFile).real(), nOffset, n, nFlags);
-}
-
-void fileShmBarrier(sqlite3_file* pFile)
-{
-    fileOf(pFile).real()->pMethods->xShmBarrier(fileOf(pFile).real());
-}
-
-int fileShmUnmap(sqlite3_file* pFile, int nDelete)
-{
-    return fileOf(pFile).real()->pMethods->xShmUnmap(fileOf(pFile).real(), nDelete);
-}
-
-// Version 2: no mapping of the database.
-const sqlite3_io_methods g_methods = {2,
-                                      &fileClose,
-                                      &fileRead,
-                                      &fileWrite,
-                                      &fileTruncate,
-                                      &fileSync,
-                                      &fileSize,
-                                      &fileLock,
-                                      &fileUnlock,
-                                      &fileCheckReservedLock,
-                                      &fileControl,
-                                      &fileSectorSize,
-                                      &fileDeviceCharacteristics,
-                                      &fileShmMap,
-                                      &fileShmLock,
-                                      &fileShmBarrier,
-                                      &fileShmUnmap,
-                                      nullptr,
-                                      nullptr};
-
-FileCall callOf(const char* szName, const char* szPath, sqlite3_int64 nArgument)
-{
-    FileCall call;
-    call.szName = szName;
     call.strPath = szPath ? szPath : ""; // a temporary file has no name
-    call.nArgument = nArgument;
-    return call;
+    return g_hook(call, [&] { return (g_pReal->*METHOD)(g_pReal, szPath, arguments...); });
 }
 
-int vfsOpen(sqlite3_vfs* pVfs, const char* szPath, sqlite3_file* pFile, int nFlags, int* pnFlags)
+void hook(sqlite3_file* pFile, const char* szPath)
 {
-    File& file = fileOf(pFile);
-    file.base.pMethods = nullptr;
-    const int nResult = told(callOf("xOpen", szPath, nFlags), [&] {
-        return realVfs(pVfs)->xOpen(realVfs(pVfs), szPath, file.real(), nFlags, pnFlags);
-    });
-    if (SQLITE_OK == nResult) {
-        file.pstrPath = new std::string(szPath ? szPath : "");
-        file.base.pMethods = &g_methods;
-    }
-    return nResult;
-}
-
-int vfsDelete(sqlite3_vfs* pVfs, const char* szPath, int nSync)
-{
-    return told(callOf("xDelete", szPath, nSync),
-                [&] { return realVfs(pVfs)->xDelete(realVfs(pVfs), szPath, nSync); });
-}
-
-int vfsAccess(sqlite3_vfs* pVfs, const char* szPath, int nFlags, int* pnResult)
-{
-    return told(callOf("xAccess", szPath, nFlags),
-                [&] { return realVfs(pVfs)->xAccess(realVfs(pVfs), szPath, nFlags, pnResult); });
-}
-
-int vfsFullPathname(sqlite3_vfs* pVfs, const char* szPath, int cbOut, char* szOut)
-{
-    return told(callOf("xFullPathname", szPath, 0),
-                [&] { return realVfs(pVfs)->xFullPathname(realVfs(pVfs), szPath, cbOut, szOut); });
-}
-
-// These go to the real VFS, which expects itself as their first argument.
-int vfsRandomness(sqlite3_vfs* pVfs, int cb, char* szOut)
-{
-    return realVfs(pVfs)->xRandomness(realVfs(pVfs), cb, szOut);
-}
-
-int vfsSleep(sqlite3_vfs* pVfs, int nMicroseconds)
-{
-    return realVfs(pVfs)->xSleep(realVfs(pVfs), nMicroseconds);
-}
-
-int vfsCurrentTime(sqlite3_vfs* pVfs, double* pdTime)
-{
-    return realVfs(pVfs)->xCurrentTime(realVfs(pVfs), pdTime);
-}
-
-int vfsGetLastError(sqlite3_vfs* pVfs, int cb, char* szOut)
-{
-    return realVfs(pVfs)->xGetLastError(realVfs(pVfs), cb, szOut);
-}
-
-int vfsCurrentTimeInt64(sqlite3_vfs* pVfs, sqlite3_int64* pnTime)
-{
-    return realVfs(pVfs)->xCurrentTimeInt64(realVfs(pVfs), pnTime);
+    File& file = g_files[pFile];
+    file = {szPath ? szPath : "", pFile->pMethods, *pFile->pMethods};
+    pFile->pMethods = &file.hooked;
+    Methods& methods = file.hooked;
+    methods.iVersion = 2; // no mapping of the database
+    methods.xClose = [](sqlite3_file* p) {
+        const int nResult = passFile<&Methods::xClose>({"xClose"}, p);
+        g_files.erase(p);
+        return nResult;
+    };
+    methods.xRead = [](sqlite3_file* p, void* pData, int cb, sqlite3_int64 nOffset) {
+        return passFile<&Methods::xRead>({"xRead", "", 0, nullptr, cb, nOffset}, p, pData, cb, nOffset);
+    };
+    methods.xWrite = [](sqlite3_file* p, const void* pData, int cb, sqlite3_int64 nOffset) {
+        const auto write = [=](int cbPart) { return g_files.at(p).pReal->xWrite(p, pData, cbPart, nOffset); };
+        return passFile<&Methods::xWrite>({"xWrite", "", 0, pData, cb, nOffset, write}, p, pData, cb,
+                                          nOffset);
+    };
+    methods.xTruncate = [](sqlite3_file* p, sqlite3_int64 cb) {
+        return passFile<&Methods::xTruncate>({"xTruncate", "", cb}, p, cb);
+    };
+    methods.xSync = [](sqlite3_file* p, int nFlags) {
+        return passFile<&Methods::xSync>({"xSync", "", nFlags}, p, nFlags);
+    };
+    methods.xFileSize = [](sqlite3_file* p, sqlite3_int64* pcb) {
+        return passFile<&Methods::xFileSize>({"xFileSize"}, p, pcb);
+    };
+    methods.xLock = [](sqlite3_file* p, int nLock) {
+        return passFile<&Methods::xLock>({"xLock", "", nLock}, p, nLock);
+    };
+    methods.xUnlock = [](sqlite3_file* p, int nLock) {
+        return passFile<&Methods::xUnlock>({"xUnlock", "", nLock}, p, nLock);
+    };
+    methods.xCheckReservedLock = [](sqlite3_file* p, int* pnReserved) {
+        return passFile<&Methods::xCheckReservedLock>({"xCheckReservedLock"}, p, pnReserved);
+    };
+    methods.xFileControl = [](sqlite3_file* p, int nOperation, void* pArgument) {
+        return passFile<&Methods::xFileControl>({"xFileControl", "", nOperation}, p, nOperation, pArgument);
+    };
 }
 
 } // namespace
 
-FaultyVfs::FaultyVfs(FileHook hook) : m_vfs()
+FaultyVfs::FaultyVfs(FileHook hooked) : m_vfs(*sqlite3_vfs_find("unix"))
 {
-    sqlite3_vfs* pReal = sqlite3_vfs_find("unix");
-    g_hook = std::move(hook);
-    m_vfs.iVersion = 2;
-    m_vfs.szOsFile = static_cast<int>(sizeof(File)) + pReal->szOsFile;
-    m_vfs.mxPathname = pReal->mxPathname;
+    g_pReal = sqlite3_vfs_find("unix");
+    g_hook = std::move(hooked);
     m_vfs.zName = "faulty";
-    m_vfs.pAppData = pReal;
-    m_vfs.xOpen = &vfsOpen;
-    m_vfs.xDelete = &vfsDelete;
-    m_vfs.xAccess = &vfsAccess;
-    m_vfs.xFullPathname = &vfsFullPathname;
-    m_vfs.xRandomness = &vfsRandomness;
-    m_vfs.xSleep = &vfsSleep;
-    m_vfs.xCurrentTime = &vfsCurrentTime;
-    m_vfs.xGetLastError = &vfsGetLastError;
-    m_vfs.xCurrentTimeInt64 = &vfsCurrentTimeInt64;
+    m_vfs.xOpen = [](sqlite3_vfs*, const char* szPath, sqlite3_file* pFile, int nFlags, int* pnFlags) {
+        pFile->pMethods = nullptr;
+        const int nResult = pass<&sqlite3_vfs::xOpen>({"xOpen", "", nFlags}, szPath, pFile, nFlags, pnFlags);
+        if (SQLITE_OK == nResult) {
+            hook(pFile, szPath);
+        }
+        return nResult;
+    };
+    m_vfs.xDelete = [](sqlite3_vfs*, const char* szPath, int nSync) {
+        return pass<&sqlite3_vfs::xDelete>({"xDelete", "", nSync}, szPath, nSync);
+    };
+    m_vfs.xAccess = [](sqlite3_vfs*, const char* szPath, int nFlags, int* pnResult) {
+        return pass<&sqlite3_vfs::xAccess>({"xAccess", "", nFlags}, szPath, nFlags, pnResult);
+    };
+    m_vfs.xFullPathname = [](sqlite3_vfs*, const char* szPath, int cbOut, char* szOut) {
+        return pass<&sqlite3_vfs::xFullPathname>({"xFullPathname"}, szPath, cbOut, szOut);
+    };
     sqlite3_vfs_register(&m_vfs, 1);
 }
 
 FaultyVfs::~FaultyVfs()
 {
     sqlite3_vfs_unregister(&m_vfs);
-    sqlite3_vfs_register(sqlite3_vfs_find("unix"), 1);
+    sqlite3_vfs_register(g_pReal, 1);
     g_hook = nullptr;
 }

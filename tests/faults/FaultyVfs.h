@@ -1,5 +1,5 @@
-// A VFS in front of SQLite's own, which it stands in for as the default one, so that it is the one the
-// library gets: each call on a file goes past a hook.
+// SQLite's own VFS, with a hook that each call on a file goes past. It is the default one, which the library
+// gets.
 
 #ifndef TESTS_FAULTY_VFS_H
 #define TESTS_FAULTY_VFS_H
@@ -9,16 +9,15 @@
 #include <functional>
 #include <string>
 
-// One call. For xOpen, nArgument holds the flags; for xSync, xLock and xFileControl their second argument;
-// for xDelete whether to sync the directory; for xTruncate the new size.
 struct FileCall {
     const char* szName; // "xOpen", "xWrite", ...
-    std::string strPath;
-    sqlite3_int64 nArgument = 0;
-    const void* pData = nullptr;      // of xWrite
-    int cb = 0;                       // of xWrite and xRead
-    sqlite3_int64 nOffset = 0;        // of xWrite and xRead
-    std::function<int(int cb)> write; // of xWrite: writes only the first cb bytes
+    std::string strPath = "";
+    sqlite3_int64 nArgument =
+        0; // the flags, the lock, the operation, or the new size; of xDelete: whether to sync
+    const void* pData = nullptr;                // of xWrite
+    int cb = 0;                                 // of xWrite and xRead
+    sqlite3_int64 nOffset = 0;                  // of xWrite and xRead
+    std::function<int(int cb)> write = nullptr; // of xWrite: writes only the first cb bytes
 };
 
 // Answers a call in the place of the real one, which is `real`.

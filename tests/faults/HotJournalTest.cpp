@@ -2,6 +2,7 @@
 // undoes its half is a journal that others may not see.
 
 #include <gtest/gtest.h>
+#include <signal.h>
 #include <sqlite3.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
@@ -9,6 +10,7 @@
 
 #include "AccessTokenApi.h"
 #include "Figures.h"
+#include "Processes.h"
 #include "TokenStore.h"
 
 namespace {
@@ -40,16 +42,14 @@ void makeTokens()
 // written most of the pages.
 void crashHalfWay(const TokenStore& store)
 {
-    const pid_t pid = fork();
-    if (0 == pid) {
+    const int nStatus = statusOf(startProcess([&] {
         sqlite3* pDb = nullptr;
         sqlite3_open(store.path().c_str(), &pDb);
         sqlite3_exec(pDb, "PRAGMA cache_size = 1; BEGIN; UPDATE token SET count = 99;", nullptr, nullptr,
                      nullptr);
         raise(SIGKILL);
-    }
-    int nStatus = 0;
-    ASSERT_EQ(pid, waitpid(pid, &nStatus, 0));
+    }));
+    ASSERT_TRUE(WIFSIGNALED(nStatus));
 }
 
 int tokensWith99Uses(AccessTokenApi& api)

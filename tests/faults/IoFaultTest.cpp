@@ -1,21 +1,12 @@
 // Every call that SQLite makes on the files of the store fails: once, and from then on.
 
 #include <gtest/gtest.h>
-#include <unistd.h>
 
-#include <cerrno>
 #include <cstring>
 
 #include "FaultyVfs.h"
 #include "Figures.h"
 #include "Oracle.h"
-
-// Nobody waits for a lock here: each wait is cut short, as by a signal.
-extern "C" int usleep(useconds_t)
-{
-    errno = EINTR;
-    return -1;
-}
 
 namespace {
 

@@ -14,8 +14,8 @@
 
 #include "FaultyVfs.h"
 #include "Figures.h"
-#include "InMemory.h"
 #include "Oracle.h"
+#include "Processes.h"
 #include "internal/AccessTokenDbApi.h"
 
 namespace {
@@ -53,16 +53,12 @@ protected:
     // Whether a process was killed in the midst of the call.
     bool isKilledIn(const Call& run)
     {
-        const pid_t nChild = fork();
-        if (0 == nChild) {
+        const int nStatus = statusOf(startProcess([&] {
             alarm(60); // nobody waits for a call that hangs
             run();
-            _exit(0);
-        }
-        int nStatus = 0;
-        EXPECT_EQ(nChild, waitpid(nChild, &nStatus, 0));
+        }));
         const bool blKilled = WIFSIGNALED(nStatus) && SIGKILL == WTERMSIG(nStatus);
-        EXPECT_TRUE(blKilled || (WIFEXITED(nStatus) && 0 == WEXITSTATUS(nStatus))) << nStatus;
+        EXPECT_TRUE(blKilled || 0 == nStatus) << nStatus;
         return blKilled;
     }
 
@@ -123,7 +119,6 @@ protected:
                                        " ended before; " + m_leftovers.text());
     }
 
-    InMemory m_inMemory;
     TokenStore m_store;
     Leftovers m_leftovers;
     std::mt19937_64 m_random{seed()};

@@ -1,6 +1,5 @@
 // Every allocation of each operation fails: once, and from then on. That of SQLite and of jsoncpp too.
 
-#include <dlfcn.h>
 #include <gtest/gtest.h>
 #include <pwd.h>
 #include <sqlite3.h>
@@ -11,6 +10,7 @@
 
 #include "Figures.h"
 #include "Heap.h"
+#include "Interpose.h"
 #include "Oracle.h"
 
 namespace {
@@ -63,9 +63,8 @@ void failEachAllocation(const Operation& operation, void (*run)(const std::funct
 extern "C" int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(void*, int, char**, char**),
                             void* pArgument, char** pszError)
 {
-    static const auto real = reinterpret_cast<decltype(&sqlite3_exec)>(dlsym(RTLD_NEXT, "sqlite3_exec"));
     try {
-        return real(pDb, szSql, callback, pArgument, pszError);
+        return NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
     } catch (...) {
         g_blCrossedSqlite = true;
         throw;

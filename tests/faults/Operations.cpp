@@ -96,37 +96,34 @@ int deleteAll()
     return api.tokenDeleteAll();
 }
 
-void insert(const TokenStore& store, const std::string& strName, const std::string& strColumns)
-{
-    store.run("INSERT INTO token VALUES ('" + idOf(strName) + "'," + strColumns +
-              R"(,'{"Example.Api":{"method":["get"]}}','{"ratio":1.25}');)");
-}
-
 // Some tokens on a few pages: one of them over several, and two that have expired.
 Files makeStore(const TokenStore& store)
 {
-    store.setFiles({{"vemo-access-token.db", ""}});
-    std::string strSql;
-    AccessTokenDbApi().SqlExpandCreateTable(strSql);
-    store.run(strSql);
-    insert(store, "one", "'',0,4102444800,1,1,'VPN'");
-    insert(store, "three", "'',0,4102444800,3,1,'VPN'");
-    insert(store, "bound", "'session',0,4102444800,-1,1,'VPN'");
-    insert(store, "mail", "'',0,4102444800,5,1,'Mail'");
-    insert(store, "large", "'" + std::string(10000, 'l') + "',0,4102444800,5,1,'Large'");
-    insert(store, "expired", "'session',0,1,5,1,'VPN'");
-    insert(store, "expired-large", "'" + std::string(5000, 'e') + "',0,1,5,1,'VPN'");
+    makeTable(store);
+    insertToken(store, "one", "'',0,4102444800,1,1,'VPN'");
+    insertToken(store, "three", "'',0,4102444800,3,1,'VPN'");
+    insertToken(store, "bound", "'session',0,4102444800,-1,1,'VPN'");
+    insertToken(store, "mail", "'',0,4102444800,5,1,'Mail'");
+    insertToken(store, "large", "'" + std::string(10000, 'l') + "',0,4102444800,5,1,'Large'");
+    insertToken(store, "expired", "'session',0,1,5,1,'VPN'");
+    insertToken(store, "expired-large", "'" + std::string(5000, 'e') + "',0,1,5,1,'VPN'");
     return store.files();
 }
 
 } // namespace
 
-// Long enough to be accepted.
-std::string idOf(const std::string& strName)
+void makeTable(const TokenStore& store, const std::string& strSettings)
 {
-    std::string strTid = "known-" + strName;
-    strTid.resize(VEMO_ATOKEN_LENGTH_MIN, 'x');
-    return strTid;
+    store.setFiles({{DATABASE, ""}});
+    std::string strSql;
+    AccessTokenDbApi().SqlExpandCreateTable(strSql);
+    store.run(strSettings + strSql);
+}
+
+void insertToken(const TokenStore& store, const std::string& strName, const std::string& strColumns)
+{
+    store.run("INSERT INTO token VALUES ('" + idOf(strName) + "'," + strColumns +
+              R"(,'{"Example.Api":{"method":["get"]}}','{"ratio":1.25}');)");
 }
 
 const std::vector<Operation>& operations()
@@ -146,6 +143,16 @@ const std::vector<Operation>& operations()
         {"deletion of all", false, false, &deleteAll},
     };
     return all;
+}
+
+const Operation& operationNamed(const std::string& strName)
+{
+    for (const Operation& operation : operations()) {
+        if (strName == operation.szName) {
+            return operation;
+        }
+    }
+    throw std::logic_error("no operation " + strName);
 }
 
 void prepareStore(const TokenStore& store, const Operation& operation)

@@ -18,10 +18,14 @@ struct Operation {
 // Twelve: creating the store, and each way in which the library changes it or reads it.
 const std::vector<Operation>& operations();
 
-// The id that a token of the store has by its name; TokenStore::state() shows the name.
-std::string idOf(const std::string& strName);
+const Operation& operationNamed(const std::string& strName);
 
 // Puts the store in the state in which the operation finds it.
 void prepareStore(const TokenStore& store, const Operation& operation);
+
+// For stores of other tokens: a store with an empty table, made behind some statements, and a token with
+// these values in the columns from bind_sid to function, which allows the method "get" of Example.Api.
+void makeTable(const TokenStore& store, const std::string& strSettings = "");
+void insertToken(const TokenStore& store, const std::string& strName, const std::string& strColumns);
 
 #endif

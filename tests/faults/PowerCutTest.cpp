@@ -7,7 +7,6 @@
 #include <algorithm>
 
 #include "Figures.h"
-#include "InMemory.h"
 #include "Oracle.h"
 #include "PowerJudge.h"
 
@@ -115,7 +114,6 @@ protected:
                    share(tally.nUndone, tally.nExposed) + ") before the directory is synced, 0 after");
     }
 
-    InMemory m_inMemory;
     TokenStore m_store;
     PowerJudge m_judge{m_store};
 };

@@ -85,6 +85,17 @@ const char* Log::text()
     return g_szLog;
 }
 
+std::string Log::firstLine()
+{
+    const std::string strLog = text();
+    std::string strLine = strLog.substr(0, strLog.find('\n'));
+    strLine.erase(0, strLine.find(' ') + 1);
+    while ('(' == strLine[0]) {
+        strLine.erase(0, strLine.find(')') + 1);
+    }
+    return strLine.substr(0, strLine.find(", sql="));
+}
+
 extern "C" void vsyslog(int, const char* szFormat, va_list args)
 {
     const int cch = vsnprintf(g_szLog + g_cchLog, sizeof(g_szLog) - g_cchLog, szFormat, args);

@@ -26,6 +26,7 @@ struct ProcessState {
 struct Log {
     static void clear();
     static const char* text();
+    static std::string firstLine(); // without location, errno and statement
 };
 
 #endif

@@ -6,7 +6,6 @@
 #include <cstdint>
 #include <map>
 #include <string>
-#include <vector>
 
 #include "TokenStore.h"
 
@@ -24,15 +23,13 @@ public:
     int grant(const std::string& strName) const;
     int revoke(const std::string& strName) const;
 
-    // Replaces the store by one with these tokens, or by none.
+    // Replaces the store by one with these tokens.
     void prepare(const Tokens& tokens) const;
-    void removeStore() const;
 
-    // The tokens that the store holds, which must be sound; "new" stands for those of other programs.
+    // The tokens that the store holds, which must be sound; none where there is no table.
     Tokens tokens() const;
-    bool hasTable() const { return STATE_NO_TABLE != m_store.state(); }
 
-    std::string database() const { return m_store.path(); }
+    const TokenStore& store() const { return m_store; }
 
     // Of the serialised calls; stands beside the database.
     std::string lockFile() const { return m_store.directory() + "/calls.lock"; }
@@ -44,14 +41,5 @@ private:
     const Calls m_calls;
     const TokenStore m_store;
 };
-
-// "KIND-PROCESS-ROUND"
-std::string nameOf(const char* szKind, int nProcess, int nRound = 0);
-
-// The numbers of processes to try: 1 to 64, and VEMO_TEST_PROCESSES when it is set.
-std::vector<int> stormSizes();
-
-// "8 processes, plain, 100 calls"
-std::string stormName(int nProcesses, Calls calls, int64_t nCalls);
 
 #endif

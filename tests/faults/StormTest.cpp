@@ -1,175 +1,213 @@
-// 1 to 64 processes create, grant and delete on one file, through the exported functions: as they come,
-// and one at a time by CallLock. VEMO_TEST_PROCESSES, a number, adds a storm of so many.
+// 1 to 64 processes at once on one file, through the exported functions: as they come, and one at a time by
+// CallLock. VEMO_TEST_PROCESSES, a number, adds a storm of so many.
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cstdlib>
+#include <cstring>
+#include <string>
+#include <vector>
 
 #include "Figures.h"
+#include "ProcessState.h"
+#include "Processes.h"
 #include "StormCalls.h"
-#include "StormProcesses.h"
 
 namespace {
 
-struct Plan {
-    Calls calls;
-    int nProcesses;
-    int nRounds;
-
-    int64_t roundsOfAll() const { return static_cast<int64_t>(nProcesses) * nRounds; }
-    // Half of the attempts, so that all are spent where each is counted.
-    int64_t sharedUses() const { return roundsOfAll() / 2; }
-};
-
-// What one process was told in one round.
-struct Round {
-    int nCreated;
-    int nGrantedOwn;
-    int nGrantedShared;
-    int nRevoked;
-};
-
+// What came of calls whose effect is theirs alone.
 struct Tally {
-    int64_t nCalls = 0;     // creations, grants of own tokens and deletions
-    int64_t nFailed = 0;    // told failure, had no effect
-    int64_t nFalse = 0;     // told failure, took effect
-    int64_t nMissing = 0;   // told success, had no effect
-    int64_t nGranted = 0;   // grants of the token that all share
-    int64_t nSpent = 0;     // what they took off its count
-    int64_t nDeletions = 0; // told success
-    int64_t nUndone = 0;    // and the token is there none the less
+    int64_t nCalls = 0;
+    int64_t nFailed = 0;  // told failure, had no effect
+    int64_t nFalse = 0;   // told failure, took effect
+    int64_t nMissing = 0; // told success, had no effect
+
+    void add(bool blTold, bool blDone)
+    {
+        ++nCalls;
+        nMissing += blTold && !blDone;
+        nFalse += !blTold && blDone;
+        nFailed += !blTold && !blDone;
+    }
 };
 
+// "KIND-PROCESS-ROUND"
+std::string nameOf(const char* szKind, int nProcess, int nRound = 0)
+{
+    return std::string(szKind) + "-" + std::to_string(nProcess) + "-" + std::to_string(nRound);
+}
+
+bool has(const Tokens& tokens, const std::string& strName)
+{
+    return 0 != tokens.count(strName);
+}
+
+void expectExact(const Tally& tally)
+{
+    EXPECT_EQ(0, tally.nFailed);
+    EXPECT_EQ(0, tally.nFalse);
+}
+
+void print(const char* szName, int nProcesses, Calls calls, const Tally& tally, const std::string& strMore)
+{
+    figure(szName, std::to_string(nProcesses) + (1 == nProcesses ? " process, " : " processes, ") +
+                       (Calls::Plain == calls ? "plain, " : "serialised, ") + std::to_string(tally.nCalls) +
+                       " calls: failed though done " + share(tally.nFalse, tally.nCalls) + ", failed " +
+                       share(tally.nFailed, tally.nCalls) + strMore);
+}
+
+// Processes that create, grant and delete.
 class Storm {
 public:
-    explicit Storm(const Plan& plan)
-        : m_plan(plan), m_calls(plan.calls), m_rounds(static_cast<size_t>(plan.roundsOfAll()))
+    Storm(Calls calls, int nProcesses, int nRounds)
+        : m_nProcesses(nProcesses),
+          m_nRounds(nRounds),
+          m_nShared(nProcesses * nRounds / 2),
+          m_calls(calls),
+          m_rounds(static_cast<size_t>(nProcesses * nRounds))
     {
-        prepare();
+        Tokens tokens = {{"shared", m_nShared}};
+        for (int nProcess = 0; nProcess < m_nProcesses; ++nProcess) {
+            tokens[nameOf("own", nProcess)] = m_nRounds + 1;
+            for (int nRound = 0; nRound < m_nRounds; ++nRound) {
+                tokens[nameOf("revoked", nProcess, nRound)] = 1000;
+            }
+        }
+        m_calls.prepare(tokens);
     }
 
-    void takePart(int nProcess);
+    // Each token that a process deletes is granted by its neighbour.
+    void takePart(int nProcess)
+    {
+        for (int nRound = 0; nRound < m_nRounds; ++nRound) {
+            Round& told = round(nProcess, nRound);
+            told.nCreated = m_calls.create(nameOf("new", nProcess, nRound));
+            told.nGrantedOwn = m_calls.grant(nameOf("own", nProcess));
+            told.nGrantedShared = m_calls.grant("shared");
+            m_calls.grant(nameOf("revoked", (nProcess + 1) % m_nProcesses, nRound));
+            told.nRevoked = m_calls.revoke(nameOf("revoked", nProcess, nRound));
+        }
+    }
 
     // Compares what the processes were told with what the store holds.
-    Tally tally();
+    void judge(Calls calls)
+    {
+        Tally tally;
+        int64_t nGranted = 0; // of the token that all share
+        int64_t nDeleted = 0;
+        int64_t nUndone = 0; // told that it was deleted, and the token is there none the less
+        const Tokens found = m_calls.tokens();
+        for (int nProcess = 0; nProcess < m_nProcesses; ++nProcess) {
+            const int64_t nSpent = m_nRounds + 1 - found.at(nameOf("own", nProcess));
+            int64_t nGrantedOwn = 0;
+            for (int nRound = 0; nRound < m_nRounds; ++nRound) {
+                const Round& told = round(nProcess, nRound);
+                tally.add(0 == told.nCreated, has(found, nameOf("new", nProcess, nRound)));
+                nGrantedOwn += 0 == told.nGrantedOwn;
+                nGranted += 0 == told.nGrantedShared;
+                // A grant can write the token back, so what is there may have been deleted.
+                const bool blThere = has(found, nameOf("revoked", nProcess, nRound));
+                const bool blTold = 1 == told.nRevoked;
+                tally.add(blTold, blTold || !blThere);
+                nDeleted += blTold;
+                nUndone += blTold && blThere;
+            }
+            for (int nRound = 0; nRound < m_nRounds; ++nRound) {
+                tally.add(nRound < nGrantedOwn, nRound < nSpent);
+            }
+        }
+        const int64_t nSpent = m_nShared - (has(found, "shared") ? found.at("shared") : 0);
+        EXPECT_EQ(0, tally.nMissing);
+        if (Calls::Serialised == calls || 1 == m_nProcesses) {
+            expectExact(tally);
+            EXPECT_EQ(m_nShared, nGranted);
+            EXPECT_EQ(m_nShared, nSpent);
+            EXPECT_EQ(m_nProcesses * m_nRounds, nDeleted);
+            EXPECT_EQ(0, nUndone);
+        }
+        print("Storm", m_nProcesses, calls, tally,
+              ", grants beyond count " + share(std::max<int64_t>(0, nGranted - nSpent), nGranted) +
+                  ", deletions undone " + share(nUndone, nDeleted));
+    }
 
 private:
-    void prepare() const;
+    // What one process was told in one round.
+    struct Round {
+        int nCreated;
+        int nGrantedOwn;
+        int nGrantedShared;
+        int nRevoked;
+    };
     Round& round(int nProcess, int nRound)
     {
-        return m_rounds[static_cast<size_t>(nProcess * m_plan.nRounds + nRound)];
+        return m_rounds[static_cast<size_t>(nProcess * m_nRounds + nRound)];
     }
-    void addOwn(int nProcess, const Tokens& found, Tally& tally);
 
-    const Plan m_plan;
+    const int m_nProcesses;
+    const int m_nRounds;
+    const int64_t m_nShared; // uses: half of the attempts, so that all are spent where each is counted
     const StormCalls m_calls;
     SharedArray<Round> m_rounds;
 };
 
-void Storm::prepare() const
+void raise(Calls calls, int nProcesses)
 {
-    Tokens tokens = {{"shared", m_plan.sharedUses()}};
-    for (int nProcess = 0; nProcess < m_plan.nProcesses; ++nProcess) {
-        tokens[nameOf("own", nProcess)] = m_plan.nRounds + 1;
-        for (int nRound = 0; nRound < m_plan.nRounds; ++nRound) {
-            tokens[nameOf("revoked", nProcess, nRound)] = 1000;
-        }
-    }
-    m_calls.prepare(tokens);
+    Storm storm(calls, nProcesses, static_cast<int>(scaled(std::max(4, 64 / nProcesses))));
+    EXPECT_EQ(0, runProcesses(nProcesses, [&](int nProcess) { storm.takePart(nProcess); }));
+    storm.judge(calls);
 }
 
-// Each token that a process deletes is granted by its neighbour.
-void Storm::takePart(int nProcess)
+// Processes that all begin without a file, which is there before its table is: whoever comes in between
+// fails.
+void makeStores(Calls calls, int nProcesses)
 {
-    const int nNeighbour = (nProcess + 1) % m_plan.nProcesses;
-    for (int nRound = 0; nRound < m_plan.nRounds; ++nRound) {
-        Round& told = round(nProcess, nRound);
-        told.nCreated = m_calls.create(nameOf("new", nProcess, nRound));
-        told.nGrantedOwn = m_calls.grant(nameOf("own", nProcess));
-        told.nGrantedShared = m_calls.grant("shared");
-        m_calls.grant(nameOf("revoked", nNeighbour, nRound));
-        told.nRevoked = m_calls.revoke(nameOf("revoked", nProcess, nRound));
-    }
-}
-
-// A change that only the call can have made.
-void addChange(bool blTold, bool blDone, Tally& tally)
-{
-    ++tally.nCalls;
-    tally.nMissing += blTold && !blDone;
-    tally.nFalse += !blTold && blDone;
-    tally.nFailed += !blTold && !blDone;
-}
-
-// The grants of a token that the process has to itself.
-void Storm::addOwn(int nProcess, const Tokens& found, Tally& tally)
-{
-    int nGranted = 0;
-    for (int nRound = 0; nRound < m_plan.nRounds; ++nRound) {
-        nGranted += 0 == round(nProcess, nRound).nGrantedOwn;
-    }
-    const int64_t nSpent = m_plan.nRounds + 1 - found.at(nameOf("own", nProcess));
-    for (int nRound = 0; nRound < m_plan.nRounds; ++nRound) {
-        addChange(nRound < nGranted, nRound < nSpent, tally);
-    }
-}
-
-Tally Storm::tally()
-{
-    const Tokens found = m_calls.tokens();
+    struct Told {
+        int nCreated;
+        bool blNoTable;
+    };
+    const StormCalls stormCalls(calls);
+    const int64_t nStores = scaled(std::max(2, 64 / nProcesses));
     Tally tally;
-    for (int nProcess = 0; nProcess < m_plan.nProcesses; ++nProcess) {
-        addOwn(nProcess, found, tally);
-        for (int nRound = 0; nRound < m_plan.nRounds; ++nRound) {
-            const Round& told = round(nProcess, nRound);
-            addChange(0 == told.nCreated, 0 != found.count(nameOf("new", nProcess, nRound)), tally);
-            tally.nGranted += 0 == told.nGrantedShared;
-
-            // A grant can write the token back, so what is there may have been deleted.
-            const bool blThere = 0 != found.count(nameOf("revoked", nProcess, nRound));
-            const bool blTold = 1 == told.nRevoked;
-            addChange(blTold, blTold || !blThere, tally);
-            tally.nDeletions += blTold;
-            tally.nUndone += blTold && blThere;
+    int64_t nNoTable = 0; // failed for want of the table
+    int64_t nBroken = 0;  // stores that stayed without one
+    for (int64_t nStore = 0; nStore < nStores; ++nStore) {
+        SharedArray<Told> rgTold(static_cast<size_t>(nProcesses));
+        stormCalls.store().setFiles({});
+        EXPECT_EQ(0, runProcesses(nProcesses, [&](int nProcess) {
+                      Log::clear();
+                      Told& told = rgTold[static_cast<size_t>(nProcess)];
+                      told.nCreated = stormCalls.create(nameOf("new", nProcess));
+                      told.blNoTable = nullptr != strstr(Log::text(), "no such table: token");
+                  }));
+        const Tokens found = stormCalls.tokens();
+        nBroken += STATE_NO_TABLE == stormCalls.store().state();
+        for (int nProcess = 0; nProcess < nProcesses; ++nProcess) {
+            const Told& told = rgTold[static_cast<size_t>(nProcess)];
+            const bool blDone = has(found, nameOf("new", nProcess));
+            tally.add(0 == told.nCreated, blDone);
+            nNoTable += 0 > told.nCreated && !blDone && told.blNoTable;
         }
     }
-    const auto shared = found.find("shared");
-    tally.nSpent = m_plan.sharedUses() - (found.end() == shared ? 0 : shared->second);
-    return tally;
+    EXPECT_EQ(0, tally.nMissing);
+    if (Calls::Serialised == calls || 1 == nProcesses) {
+        expectExact(tally);
+    }
+    print("First creation", nProcesses, calls, tally,
+          " (for want of the table " + share(nNoTable, tally.nCalls) + "), stores without a table " +
+              share(nBroken, nStores));
 }
 
-void expectExact(const Plan& plan, const Tally& tally)
+// 1 to 64, and VEMO_TEST_PROCESSES.
+void forEachSize(Calls calls, void (*storm)(Calls calls, int nProcesses))
 {
-    EXPECT_EQ(0, tally.nFailed);
-    EXPECT_EQ(0, tally.nFalse);
-    EXPECT_EQ(plan.sharedUses(), tally.nGranted);
-    EXPECT_EQ(plan.sharedUses(), tally.nSpent);
-    EXPECT_EQ(plan.roundsOfAll(), tally.nDeletions);
-    EXPECT_EQ(0, tally.nUndone);
-}
-
-void print(const Plan& plan, const Tally& tally)
-{
-    figure("Storm", stormName(plan.nProcesses, plan.calls, tally.nCalls) + ": failed though done " +
-                        share(tally.nFalse, tally.nCalls) + ", failed " + share(tally.nFailed, tally.nCalls) +
-                        ", grants beyond count " +
-                        share(std::max<int64_t>(0, tally.nGranted - tally.nSpent), tally.nGranted) +
-                        ", deletions undone " + share(tally.nUndone, tally.nDeletions));
-}
-
-void raise(Calls calls)
-{
-    for (const int nProcesses : stormSizes()) {
+    std::vector<int> nSizes = {1, 2, 4, 8, 16, 32, 64};
+    if (const char* szMore = getenv("VEMO_TEST_PROCESSES")) {
+        nSizes.push_back(std::stoi(szMore));
+    }
+    for (const int nProcesses : nSizes) {
         SCOPED_TRACE(nProcesses);
-        const Plan plan = {calls, nProcesses, static_cast<int>(scaled(std::max(4, 64 / nProcesses)))};
-        Storm storm(plan);
-        EXPECT_EQ(0, runProcesses(nProcesses, [&](int nProcess) { storm.takePart(nProcess); }));
-        const Tally tally = storm.tally();
-        EXPECT_EQ(0, tally.nMissing);
-        if (Calls::Serialised == calls || 1 == nProcesses) {
-            expectExact(plan, tally);
-        }
-        print(plan, tally);
+        storm(calls, nProcesses);
     }
 }
 
@@ -177,10 +215,20 @@ void raise(Calls calls)
 
 TEST(Storm, OfPlainCallsEndsAndCorruptsNothing)
 {
-    raise(Calls::Plain);
+    forEachSize(Calls::Plain, &raise);
 }
 
 TEST(Storm, OfSerialisedCallsIsExact)
 {
-    raise(Calls::Serialised);
+    forEachSize(Calls::Serialised, &raise);
+}
+
+TEST(FirstCreation, ByPlainCallsEndsAndCorruptsNothing)
+{
+    forEachSize(Calls::Plain, &makeStores);
+}
+
+TEST(FirstCreation, BySerialisedCallsIsExact)
+{
+    forEachSize(Calls::Serialised, &makeStores);
 }

@@ -1,7 +1,6 @@
 // Every call of the system that opening the store takes, the library's own and SQLite's, fails: once, and
 // from then on. (The wait for a lock fails in IoFaultTest.)
 
-#include <dlfcn.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -12,6 +11,7 @@
 #include <cstring>
 
 #include "Figures.h"
+#include "Interpose.h"
 #include "Oracle.h"
 
 namespace {
@@ -38,17 +38,9 @@ struct Injection {
 
 Injection g_injection;
 
-template <typename Function>
-Function* next(const char* szName, Function*)
-{
-    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szName));
-}
-
 class SystemCallFault : public ::testing::TestWithParam<const char*> {};
 
 } // namespace
-
-#define NEXT(name) next(#name, &name)
 
 extern "C" {
 
@@ -78,23 +70,17 @@ int chmod(const char* szPath, mode_t mode) noexcept
     return g_injection.fails("chmod") ? -1 : NEXT(chmod)(szPath, mode);
 }
 
-int open(const char* szPath, int nFlags, ...)
-{
-    va_list args;
-    va_start(args, nFlags);
-    const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
-    va_end(args);
-    return g_injection.fails("open") ? -1 : NEXT(open)(szPath, nFlags, mode);
-}
-
-int open64(const char* szPath, int nFlags, ...)
-{
-    va_list args;
-    va_start(args, nFlags);
-    const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;
-    va_end(args);
-    return g_injection.fails("open") ? -1 : NEXT(open64)(szPath, nFlags, mode);
-}
+#define OPEN(name)                                                                                           \
+    int name(const char* szPath, int nFlags, ...)                                                            \
+    {                                                                                                        \
+        va_list args;                                                                                        \
+        va_start(args, nFlags);                                                                              \
+        const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;                                   \
+        va_end(args);                                                                                        \
+        return g_injection.fails("open") ? -1 : NEXT(name)(szPath, nFlags, mode);                            \
+    }
+OPEN(open)
+OPEN(open64)
 
 } // extern "C"
 

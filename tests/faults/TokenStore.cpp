@@ -12,6 +12,8 @@
 #include <sstream>
 #include <stdexcept>
 
+#include "AccessTokenDefine.h"
+
 namespace {
 
 struct Closer {
@@ -73,9 +75,19 @@ extern "C" __attribute__((weak)) int fdatasync(int)
     return 0;
 }
 
+std::string idOf(const std::string& strName)
+{
+    std::string strTid = "known-" + strName;
+    strTid.resize(VEMO_ATOKEN_LENGTH_MIN, 'x');
+    return strTid;
+}
+
+// In memory where there is a place, since no disk is needed.
 TokenStore::TokenStore()
 {
-    m_strDirectory = (std::filesystem::temp_directory_path() / "vemo-faults-XXXXXX").string();
+    const bool blMemory = 0 == access("/dev/shm", W_OK | X_OK);
+    m_strDirectory =
+        (blMemory ? "/dev/shm" : std::filesystem::temp_directory_path().string()) + "/vemo-faults-XXXXXX";
     if (!mkdtemp(m_strDirectory.data())) {
         throw std::runtime_error("cannot make a directory like " + m_strDirectory);
     }
@@ -91,7 +103,7 @@ TokenStore::~TokenStore()
 
 std::string TokenStore::path() const
 {
-    return m_strDirectory + "/vemo-access-token.db";
+    return m_strDirectory + "/" + DATABASE;
 }
 
 Files TokenStore::files() const
@@ -133,6 +145,11 @@ std::string TokenStore::state() const
                              "WHEN deadline > 4000000000 THEN 'far' ELSE 'new' END, count, "
                              "CASE WHEN create_time > 1000000000 THEN 'new' ELSE 'past' END, "
                              "function, webapi_allow, extra FROM token");
+}
+
+std::string TokenStore::rows(const std::string& strSelect) const
+{
+    return rowsOf(openDatabase(path()).get(), strSelect.c_str());
 }
 
 void TokenStore::run(const std::string& strSql) const

@@ -9,6 +9,11 @@
 // Contents by name: of the database and, while there is one, of its journal.
 typedef std::map<std::string, std::string> Files;
 
+const std::string DATABASE = "vemo-access-token.db";
+
+// The id of a token that tests know by a name, which TokenStore::state() shows.
+std::string idOf(const std::string& strName);
+
 class TokenStore {
 public:
     TokenStore();
@@ -28,7 +33,8 @@ public:
     // that is not sound reads "corrupt: " and why.
     std::string state() const;
 
-    // Runs SQL behind the library's back.
+    // Run SQL behind the library's back. The rows come as lines, in the order of their text.
+    std::string rows(const std::string& strSelect) const;
     void run(const std::string& strSql) const;
 
 private:

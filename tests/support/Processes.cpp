@@ -1,4 +1,4 @@
-#include "StormProcesses.h"
+#include "Processes.h"
 
 #include <sys/prctl.h>
 #include <sys/wait.h>
@@ -11,43 +11,37 @@
 #include <system_error>
 #include <vector>
 
-namespace {
-
-// Neither a return nor an exception may take a child to its parent's business.
-[[noreturn]] void runAndExit(const std::function<void()>& body) noexcept
+pid_t startProcess(const std::function<void()>& body)
 {
-    int nStatus = 0;
-    try {
-        body();
+    const pid_t pidParent = getpid();
+    const pid_t pid = fork();
+    if (0 > pid) {
+        throw std::system_error(errno, std::generic_category(), "fork");
+    }
+    if (0 < pid) {
+        return pid;
+    }
+    prctl(PR_SET_PDEATHSIG, SIGKILL);
+    int nStatus = getppid() == pidParent ? 0 : 1;
+    try { // neither a return nor an exception may take a child to its parent's business
+        if (0 == nStatus) {
+            body();
+        }
     } catch (...) {
         nStatus = 1;
     }
     _exit(nStatus);
 }
 
-} // namespace
-
-pid_t startProcess(const std::function<void()>& body)
+int statusOf(pid_t pid)
 {
-    const pid_t pidParent = getpid();
-    const pid_t pid = fork();
-    if (0 == pid) {
-        prctl(PR_SET_PDEATHSIG, SIGKILL);
-        if (getppid() != pidParent) {
-            _exit(1);
-        }
-        runAndExit(body);
-    }
-    if (0 > pid) {
-        throw std::system_error(errno, std::generic_category(), "fork");
-    }
-    return pid;
+    int nStatus = -1;
+    return pid == waitpid(pid, &nStatus, 0) ? nStatus : -1;
 }
 
 bool endsWell(pid_t pid)
 {
-    int nStatus = -1;
-    return pid == waitpid(pid, &nStatus, 0) && 0 == nStatus;
+    return 0 == statusOf(pid);
 }
 
 int runProcesses(int nProcesses, const std::function<void(int)>& body)

@@ -1,7 +1,7 @@
 // For programs that define functions of the libraries they use, to see them called.
 
-#ifndef VEMO_ACCESS_TOKEN_BENCH_INTERPOSE_H
-#define VEMO_ACCESS_TOKEN_BENCH_INTERPOSE_H
+#ifndef TESTS_INTERPOSE_H
+#define TESTS_INTERPOSE_H
 
 #include <dlfcn.h>
 

@@ -1,7 +1,7 @@
-// Many processes at once, and what they report.
+// Processes that a test or a benchmark forks, and what they report.
 
-#ifndef TESTS_STORM_PROCESSES_H
-#define TESTS_STORM_PROCESSES_H
+#ifndef TESTS_PROCESSES_H
+#define TESTS_PROCESSES_H
 
 #include <sys/mman.h>
 #include <sys/types.h>
@@ -39,7 +39,8 @@ private:
 // ends.
 pid_t startProcess(const std::function<void()>& body);
 
-// Waits for a process; whether it ended with status 0.
+// Wait for a process: its wait status, and whether that is 0.
+int statusOf(pid_t pid);
 bool endsWell(pid_t pid);
 
 // Runs body(0), body(1) and so on in processes of their own, which all begin when the last is there.

@@ -1,0 +1,101 @@
+#include "Callers.h"
+
+#include <fcntl.h>
+#include <sqlite3.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstring>
+#include <optional>
+#include <stdexcept>
+
+#include "AccessTokenUtil.h"
+#include "CallLock.h"
+#include "Interpose.h"
+#include "Processes.h"
+#include "Store.h"
+#include "vemo-access-token.h"
+
+namespace {
+
+const size_t CALLS_MAX = 200000; // of one process: far more than there is time for
+
+// How often this process has written a token. A grant that raised it spent its use, whatever it returned.
+long long g_nWritten = 0;
+
+double now()
+{
+    return std::chrono::duration<double>(std::chrono::steady_clock::now().time_since_epoch()).count();
+}
+
+GrantCall timedGrant(int nToken, Calls calls)
+{
+    std::string strTid = tokenOf(nToken).strTid;
+    Json::Value jToken;
+    const long long nWritten = g_nWritten;
+    GrantCall call = {now(), 0, false, false};
+    {
+        std::optional<CallLock> lock;
+        if (Calls::Serialised == calls) {
+            lock.emplace();
+        }
+        call.blGranted = 0 == VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken);
+    }
+    call.dEnd = now();
+    call.blSpent = nWritten != g_nWritten;
+    return call;
+}
+
+} // namespace
+
+// Found ahead of SQLite's own, by the library too.
+extern "C" INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql,
+                                       int (*callback)(void*, int, char**, char**), void* arg, char** pszErr)
+{
+    const int nResult = NEXT(sqlite3_exec)(pDb, szSql, callback, arg, pszErr);
+    g_nWritten += SQLITE_OK == nResult && 0 == strncmp(szSql, "REPLACE", strlen("REPLACE"));
+    return nResult;
+}
+
+std::vector<GrantCall> grantAtOnce(int nProcesses, int nTokens, double dSeconds, Calls calls)
+{
+    const auto nSize = static_cast<size_t>(nProcesses);
+    SharedArray<GrantCall> made(nSize * CALLS_MAX);
+    SharedArray<size_t> numbers(nSize);
+    const int nBad = runProcesses(nProcesses, [&](int nProcess) {
+        const auto nFirst = static_cast<size_t>(nProcess);
+        const double dEnd = now() + dSeconds;
+        // Failures are counted; a line about each would only fill the system log.
+        VEMO_ACCESS_TOKEN::logToStdout(true);
+        dup2(open("/dev/null", O_WRONLY), STDOUT_FILENO);
+        for (int nToken = nProcess % nTokens; now() < dEnd; nToken = (nToken + nProcesses) % nTokens) {
+            if (CALLS_MAX == numbers[nFirst]) {
+                throw std::logic_error("too many calls");
+            }
+            made[nFirst * CALLS_MAX + numbers[nFirst]++] = timedGrant(nToken, calls);
+        }
+    });
+    if (0 != nBad) {
+        throw std::runtime_error("a process failed");
+    }
+    std::vector<GrantCall> all;
+    for (size_t nProcess = 0; nProcess < nSize; ++nProcess) {
+        const GrantCall* const pFirst = &made[nProcess * CALLS_MAX];
+        all.insert(all.end(), pFirst, pFirst + numbers[nProcess]);
+    }
+    return all;
+}
+
+double grantsPerSecond(const std::vector<GrantCall>& calls)
+{
+    double dStart = calls.front().dStart;
+    double dEnd = dStart;
+    double dGranted = 0;
+    for (const GrantCall& call : calls) {
+        dStart = std::min(dStart, call.dStart);
+        dEnd = std::max(dEnd, call.dEnd);
+        dGranted += call.blGranted;
+    }
+    return dGranted / (dEnd - dStart);
+}
