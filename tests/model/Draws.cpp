@@ -1,11 +1,14 @@
 #include "Draws.h"
 
+#include <map>
+
 #include "ModelFilter.h"
 #include "World.h"
 
 namespace {
 
 const size_t TID_MIN = 127;
+const Json::UInt USER_SIZE = 16;
 
 std::string id(std::string strText)
 {
@@ -98,12 +101,27 @@ time_t Draws::step()
     return oneIn(3000) ? 100000 : oneIn(100) ? 500 : oneIn(4) ? static_cast<time_t>(below(4)) : 0;
 }
 
-std::string Draws::tid()
+Json::Value Draws::argument(const std::string& strName)
+{
+    static const std::map<std::string, Json::Value (Draws::*)()> DRAWS = {
+        {"tid", &Draws::tid},          {"fresh", &Draws::newTid},     {"granted", &Draws::granted},
+        {"webapi", &Draws::webapi},    {"method", &Draws::method},    {"uid", &Draws::uid},
+        {"function", &Draws::purpose}, {"sid", &Draws::session},      {"sid_or_null", &Draws::sessionOrNull},
+        {"name", &Draws::name},        {"option", &Draws::option},    {"param", &Draws::param},
+        {"record", &Draws::record},    {"filter", &Draws::filter},    {"text", &Draws::text},
+        {"texts", &Draws::texts},      {"list", &Draws::list},        {"user", &Draws::user},
+        {"size", &Draws::size},        {"flag", &Draws::flag},        {"rare_flag", &Draws::rareFlag},
+        {"made", &Draws::untouched},   {"answer", &Draws::untouched},
+    };
+    return (this->*DRAWS.at(strName))();
+}
+
+Json::Value Draws::tid()
 {
     return m_rows.empty() || oneIn(4) ? newTid() : row().columns[0];
 }
 
-std::string Draws::newTid()
+Json::Value Draws::newTid()
 {
     return oneOf(g_rgTid);
 }
@@ -114,32 +132,43 @@ Json::Value Draws::uid()
     return oneOf(rgUid);
 }
 
-std::string Draws::session()
+Json::Value Draws::session()
 {
     return oneOf(g_rgSession);
 }
 
-std::string Draws::purpose()
+Json::Value Draws::purpose()
 {
     return oneOf(g_rgPurpose);
 }
 
-// Mostly what the token allows, as few others would.
-Json::Value Draws::grant()
+Json::Value Draws::sessionOrNull()
 {
-    Json::Value jGrant;
-    jGrant["tid"] = tid();
-    jGrant["webapi"] = oneIn(30) ? Json::Value() : Json::Value(oneOf(g_rgWebapi));
-    jGrant["method"] = oneIn(10) ? Json::Value() : Json::Value(oneOf(g_rgMethod));
-    if (!m_rows.empty() && !oneIn(3)) {
-        const Row& granted = row();
-        const Json::Value& jAllow = granted.jRecord["webapi_allow"];
-        jGrant["tid"] = granted.columns[0];
-        if (jAllow.isObject() && !jAllow.empty()) {
-            jGrant["webapi"] = oneOf(jAllow.getMemberNames());
-        }
+    return oneIn(20) ? Json::Value() : session();
+}
+
+Json::Value Draws::granted()
+{
+    m_jAllow = Json::Value();
+    if (m_rows.empty() || oneIn(3)) {
+        return tid();
     }
-    return jGrant;
+    const Row& granted = row();
+    m_jAllow = granted.jRecord["webapi_allow"];
+    return granted.columns[0];
+}
+
+// Mostly one that the token allows, as few others would.
+Json::Value Draws::webapi()
+{
+    return m_jAllow.isObject() && !m_jAllow.empty() ? oneOf(m_jAllow.getMemberNames())
+           : oneIn(30)                              ? Json::Value()
+                                                    : Json::Value(oneOf(g_rgWebapi));
+}
+
+Json::Value Draws::method()
+{
+    return oneIn(10) ? Json::Value() : Json::Value(oneOf(g_rgMethod));
 }
 
 Json::Value Draws::name()
@@ -332,12 +361,30 @@ Json::Value Draws::texts()
 {
     Json::Value jTexts(Json::arrayValue);
     for (size_t i = oneIn(3) ? below(4) : 1; 0 < i; --i) {
-        jTexts.append(oneIn(3) ? oneIn(2) ? session() : purpose() : oneIn(2) ? g_rgTid[below(3)] : tid());
+        jTexts.append(oneIn(3)   ? oneIn(2) ? session() : purpose()
+                        : oneIn(2) ? Json::Value(g_rgTid[below(3)])
+                                 : tid());
     }
     return jTexts;
 }
 
-Json::Value Draws::out()
+Json::Value Draws::text()
+{
+    return oneIn(5) ? Json::Value("1") : texts().get(0U, "-1");
+}
+
+Json::Value Draws::list()
 {
     return oneIn(12) ? anything() : Json::Value(Json::arrayValue);
+}
+
+Json::Value Draws::user()
+{
+    return oneIn(8) ? Json::Value() : Json::Value(std::string(USER_SIZE, '?'));
+}
+
+Json::Value Draws::size()
+{
+    const Json::UInt rgSize[] = {0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE};
+    return oneOf(rgSize);
 }

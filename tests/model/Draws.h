@@ -5,6 +5,8 @@
 
 #include <cstdint>
 #include <random>
+#include <string>
+#include <vector>
 
 #include "ModelRow.h"
 
@@ -17,21 +19,41 @@ public:
     bool oneIn(size_t nTimes) { return 0 == below(nTimes); }
     time_t step(); // how far the clock moves on
 
-    std::string tid();    // mostly one that a row has
-    std::string newTid(); // mostly one that no row has
-    Json::Value uid();    // as an argument of creations
-    std::string session();
-    std::string purpose();
-    Json::Value grant();  // "tid", "webapi" and "method", the last two null now and then
-    Json::Value name();   // of a field, mostly
-    Json::Value option(); // of a creation
-    Json::Value param();  // of an update
-    Json::Value record();
-    Json::Value filter();
-    Json::Value texts(); // an array of values that the fields of kind Text have, mostly ids
-    Json::Value out();   // what a caller hands over for a list
+    // The argument of that name:
+    //   tid, fresh     ids that a row has, mostly; that no row has, mostly
+    //   granted, webapi, method
+    //                  mostly what a row allows; the last two null now and then
+    //   uid, function, sid, sid_or_null, name (of a field, mostly), option (of a creation), param (of an
+    //   update), record, filter text, texts    values that the fields of kind Text have, mostly ids list,
+    //   user, size
+    //                  what a caller hands over for a list, or for the user's name
+    //   flag, rare_flag
+    //   made, answer   what is not to be read
+    Json::Value argument(const std::string& strName);
 
 private:
+    Json::Value tid();
+    Json::Value newTid();
+    Json::Value granted();
+    Json::Value webapi();
+    Json::Value method();
+    Json::Value uid();
+    Json::Value session();
+    Json::Value sessionOrNull();
+    Json::Value purpose();
+    Json::Value name();
+    Json::Value option();
+    Json::Value param();
+    Json::Value record();
+    Json::Value filter();
+    Json::Value text();
+    Json::Value texts();
+    Json::Value list();
+    Json::Value user();
+    Json::Value size();
+    Json::Value flag() { return oneIn(2); }
+    Json::Value rareFlag() { return oneIn(8); }
+    Json::Value untouched() { return "untouched"; }
     template <typename Values>
     auto oneOf(const Values& values)
     {
@@ -53,6 +75,7 @@ private:
 
     std::mt19937_64 m_source;
     const std::vector<Row>& m_rows;
+    Json::Value m_jAllow; // of the id that was drawn last for a grant
 };
 
 #endif

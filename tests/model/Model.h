@@ -9,6 +9,12 @@
 
 #include "ModelRow.h"
 
+struct ModelRules {
+    int checkJsonType(Json::Value& jToken);
+    int fillDefaultValue(Json::Value& jToken, bool blCheck);
+    int checkPermission(Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod);
+};
+
 class ModelStore {
 public:
     int tokenSave(Json::Value& jRecord, bool blCreate);
@@ -62,28 +68,48 @@ private:
     std::string m_strGenerated;
 };
 
-// The exported functions.
+// The exported functions: all but the deletion by session purge first.
 class ModelFunctions {
 public:
     explicit ModelFunctions(ModelService& service) : m_service(service) {}
 
-    int create(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption, std::string& strTid);
+    int create(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption, std::string& strTid)
+    {
+        return purged().tokenCreate(uid, strFunction, jTokenOption, strTid);
+    }
     int createByTid(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
-                    std::string& strTid);
+                    std::string& strTid)
+    {
+        return purged().tokenCreateByTid(uid, strFunction, jTokenOption, strTid);
+    }
     int generate(std::string& strTid) { return m_service.tokenGenerate(strTid); }
     int grantEx(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
-                Json::Value& jToken);
+                Json::Value& jToken)
+    {
+        return purged().tokenGrant(strTid, szWebapiName, szWebapiMethod, jToken);
+    }
     int grant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod, char* szUser,
               size_t cbUser);
-    int deleteByTid(std::string& strTid);
-    int deleteByBindSid(const char* szSid);
-    int deleteByFunction(std::string& strFunction);
+    int deleteByTid(std::string& strTid) { return purged().tokenDeleteByTid(strTid); }
+    int deleteByBindSid(const char* szSid)
+    {
+        std::string strSid = szSid ? szSid : "";
+        return m_service.tokenDeleteByBindSid(strSid);
+    }
+    int deleteByFunction(std::string& strFunction) { return purged().tokenDeleteByFunction(strFunction); }
 
 private:
+    ModelService& purged()
+    {
+        m_service.cleanExpireToken(false);
+        return m_service;
+    }
+
     ModelService& m_service;
 };
 
 struct Model {
+    ModelRules rules;
     ModelStore store;
     ModelService service{store};
     ModelFunctions functions{service};

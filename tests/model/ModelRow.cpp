@@ -61,9 +61,15 @@ Json::Value parsed(const std::string& strText)
 } // namespace
 
 const std::vector<Field> FIELDS = {
-    {"tid", Kind::Text},        {"bind_sid", Kind::Text},     {"uid", Kind::Number},
-    {"deadline", Kind::Number}, {"count", Kind::Number},      {"create_time", Kind::Number},
-    {"function", Kind::Text},   {"webapi_allow", Kind::Json}, {"extra", Kind::Json},
+    {"tid", Kind::Text, "INVALID_TOKEN_ID"},
+    {"bind_sid", Kind::Text, ""},
+    {"uid", Kind::Number, 4294967295U},
+    {"deadline", Kind::Number, -1},
+    {"count", Kind::Number, 1},
+    {"create_time", Kind::Number, Json::Value()},
+    {"function", Kind::Text, "VEMO_ACCESS_TOKEN"},
+    {"webapi_allow", Kind::Json, Json::objectValue},
+    {"extra", Kind::Json, Json::objectValue},
 };
 
 size_t fieldNumber(const std::string& strName)

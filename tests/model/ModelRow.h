@@ -13,6 +13,7 @@ enum class Kind { Text, Json, Number };
 struct Field {
     const char* szName;
     Kind kind;
+    Json::Value jDefault; // but for create_time, which is the time
 };
 
 // In the order of the columns.

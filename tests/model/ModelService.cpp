@@ -33,45 +33,53 @@ bool isOfKind(Kind kind, const Json::Value& jValue)
                                 : jValue.isIntegral();
 }
 
-bool isComplete(const Json::Value& jToken)
-{
-    return std::all_of(FIELDS.begin(), FIELDS.end(),
-                       [&](const Field& field) { return jToken.isMember(field.szName); });
-}
+} // namespace
 
 // Fields that are there are of their type.
-bool isWellTyped(const Json::Value& jToken)
+int ModelRules::checkJsonType(Json::Value& jToken)
 {
-    return std::all_of(FIELDS.begin(), FIELDS.end(), [&](const Field& field) {
-        return !jToken.isMember(field.szName) || isOfKind(field.kind, jToken[field.szName]);
-    });
+    const bool blSound =
+        jToken.isObject() && std::all_of(FIELDS.begin(), FIELDS.end(), [&](const Field& field) {
+            return !jToken.isMember(field.szName) || isOfKind(field.kind, jToken[field.szName]);
+        });
+    return blSound ? 0 : -1;
 }
 
-bool allows(const Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod)
+int ModelRules::fillDefaultValue(Json::Value& jToken, bool blCheck)
 {
-    const Json::Value& jAllow = jToken["webapi_allow"];
+    for (const Field& field : FIELDS) {
+        if (jToken.isMember(field.szName)) {
+            continue;
+        }
+        if (blCheck) {
+            return -1;
+        }
+        jToken[field.szName] =
+            std::string("create_time") == field.szName ? Json::Int64(worldClock()) : field.jDefault;
+    }
+    return 0;
+}
+
+int ModelRules::checkPermission(Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod)
+{
+    const Json::Value& jRecord = jToken;
+    if (!jRecord.isObject() || !isGiven(szWebapiName)) {
+        return -1;
+    }
+    const Json::Value& jAllow = jRecord["webapi_allow"];
     if (!jAllow.isObject() || !jAllow.isMember(szWebapiName)) {
-        return false;
+        return -1;
     }
     if (!isGiven(szWebapiMethod)) {
-        return true;
+        return 1;
     }
     const Json::Value& jEntry = jAllow[szWebapiName];
     if (!jEntry.isObject() || !jEntry["method"].isArray()) {
-        return false;
+        return -1;
     }
     return std::any_of(jEntry["method"].begin(), jEntry["method"].end(),
                        [&](const Json::Value& jMethod) { return jMethod.asString() == szWebapiMethod; });
 }
-
-void setDefault(Json::Value& jToken, const char* szName, const Json::Value& jDefault)
-{
-    if (!jToken.isMember(szName)) {
-        jToken[szName] = jDefault;
-    }
-}
-
-} // namespace
 
 void ModelService::setGenerated(const std::string& strTid)
 {
@@ -104,11 +112,8 @@ int ModelService::tokenCreateByTid(unsigned int& uid, std::string& strFunction, 
     } else {
         jToken["deadline"] = jToken["create_time"].asInt64() + DAY;
     }
-    setDefault(jToken, "bind_sid", "");
-    setDefault(jToken, "count", 1);
-    setDefault(jToken, "webapi_allow", Json::Value(Json::objectValue));
-    setDefault(jToken, "extra", Json::Value(Json::objectValue));
-    return isWellTyped(jToken) ? m_store.tokenSave(jToken, true) : -1;
+    ModelRules().fillDefaultValue(jToken, false);
+    return 0 == ModelRules().checkJsonType(jToken) ? m_store.tokenSave(jToken, true) : -1;
 }
 
 int ModelService::tokenCreate(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
@@ -180,10 +185,9 @@ int ModelService::tokenUpdateByTid(std::string& strTid, Json::Value& jParam)
 
 int ModelService::tokenSaveByOverwrite(Json::Value& jToken)
 {
-    if (!jToken.isObject() || !isComplete(jToken) || !isWellTyped(jToken)) {
-        return -1;
-    }
-    return m_store.tokenSave(jToken, false);
+    const bool blSound =
+        0 == ModelRules().checkJsonType(jToken) && 0 == ModelRules().fillDefaultValue(jToken, true);
+    return blSound ? m_store.tokenSave(jToken, false) : -1;
 }
 
 int ModelService::tokenDeleteByArray(std::vector<std::string>& strVector, const char* szName)
@@ -214,7 +218,8 @@ int ModelService::tokenGrant(std::string& strTid, const char* szWebapiName, cons
 {
     Json::Value jToken;
     if (!isGiven(szWebapiName) || 1 != tokenGetByTid(strTid, jToken) ||
-        !allows(jToken, szWebapiName, szWebapiMethod) || 0 > tokenCountDegrade(jToken)) {
+        1 != ModelRules().checkPermission(jToken, szWebapiName, szWebapiMethod) ||
+        0 > tokenCountDegrade(jToken)) {
         return -1;
     }
     jTokenOut = jToken;
@@ -241,27 +246,6 @@ int ModelService::tokenCountDegrade(Json::Value& jToken)
     return std::min(0, tokenDeleteByTid(strTid));
 }
 
-int ModelFunctions::create(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
-                           std::string& strTid)
-{
-    m_service.cleanExpireToken(false);
-    return m_service.tokenCreate(uid, strFunction, jTokenOption, strTid);
-}
-
-int ModelFunctions::createByTid(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
-                                std::string& strTid)
-{
-    m_service.cleanExpireToken(false);
-    return m_service.tokenCreateByTid(uid, strFunction, jTokenOption, strTid);
-}
-
-int ModelFunctions::grantEx(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
-                            Json::Value& jToken)
-{
-    m_service.cleanExpireToken(false);
-    return m_service.tokenGrant(strTid, szWebapiName, szWebapiMethod, jToken);
-}
-
 int ModelFunctions::grant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
                           char* szUser, size_t cbUser)
 {
@@ -280,23 +264,4 @@ int ModelFunctions::grant(std::string& strTid, const char* szWebapiName, const c
     memcpy(szUser, szName, cchWritten);
     szUser[cchWritten] = '\0';
     return cchWritten < strlen(szName) ? -1 : 0;
-}
-
-int ModelFunctions::deleteByTid(std::string& strTid)
-{
-    m_service.cleanExpireToken(false);
-    return m_service.tokenDeleteByTid(strTid);
-}
-
-// The one function that purges nothing.
-int ModelFunctions::deleteByBindSid(const char* szSid)
-{
-    std::string strSid = szSid ? szSid : "";
-    return m_service.tokenDeleteByBindSid(strSid);
-}
-
-int ModelFunctions::deleteByFunction(std::string& strFunction)
-{
-    m_service.cleanExpireToken(false);
-    return m_service.tokenDeleteByFunction(strFunction);
 }

@@ -20,10 +20,8 @@ int removeIf(std::vector<Row>& rows, Predicate predicate)
 
 int ModelStore::tokenSave(Json::Value& jRecord, bool blCreate)
 {
-    for (const Field& field : FIELDS) {
-        if (!jRecord.isMember(field.szName)) {
-            return -1;
-        }
+    if (0 > ModelRules().fillDefaultValue(jRecord, true)) {
+        return -1;
     }
     const Row row = rowOf(jRecord);
     const auto isSame = [&](const Row& other) { return other.columns[0] == row.columns[0]; };

@@ -7,6 +7,7 @@
 #include <numeric>
 #include <sstream>
 
+#include "Draws.h"
 #include "Figures.h"
 #include "GateGrant.h"
 #include "Operations.h"
@@ -18,17 +19,6 @@ namespace {
 
 const size_t REPORTED = 12;    // operations that a failure shows
 const size_t TEXT_SHOWN = 500; // of each
-
-struct Outcome {
-    int nResult = 0;
-    std::string strThrown; // instead of a result
-    Json::Value jCall;     // the arguments as they are afterwards
-
-    bool operator==(const Outcome& other) const
-    {
-        return strThrown == other.strThrown && nResult == other.nResult && jCall == other.jCall;
-    }
-};
 
 // For a reader's eyes: short, and with what cannot be printed in hexadecimal.
 std::string shown(const Json::Value& jCall)
@@ -44,27 +34,16 @@ std::string shown(const Json::Value& jCall)
     return strShown + (TEXT_SHOWN < strText.size() ? "..." : "");
 }
 
-std::ostream& operator<<(std::ostream& stream, const Outcome& outcome)
+} // namespace
+
+// For the messages of GoogleTest.
+static std::ostream& operator<<(std::ostream& stream, const Outcome& outcome)
 {
     return stream << (outcome.strThrown.empty() ? std::to_string(outcome.nResult) : outcome.strThrown) << ", "
                   << shown(outcome.jCall);
 }
 
-template <typename System>
-Outcome run(const std::function<int(System&, Json::Value&)>& operation, System& system,
-            const Json::Value& jCall)
-{
-    Outcome outcome;
-    outcome.jCall = jCall;
-    try {
-        outcome.nResult = operation(system, outcome.jCall);
-    } catch (const Json::LogicError&) {
-        outcome.strThrown = "Json::LogicError"; // its text is no part of the interface
-    } catch (const std::exception& exception) {
-        outcome.strThrown = exception.what();
-    }
-    return outcome;
-}
+namespace {
 
 struct Tally {
     int64_t nSucceeded = 0;
@@ -77,6 +56,14 @@ struct Tally {
     }
 };
 
+// Beside the library's own connections.
+sqlite3* openDatabase(const std::string& strPath)
+{
+    sqlite3* pDb = nullptr;
+    EXPECT_EQ(SQLITE_OK, sqlite3_open_v2(strPath.c_str(), &pDb, SQLITE_OPEN_READONLY, nullptr));
+    return pDb;
+}
+
 class ModelCheck : public ::testing::Test {
 protected:
     // Draws an operation and runs it on both; a fatal failure when they do not agree.
@@ -85,12 +72,15 @@ protected:
         worldClock() += m_draws.step();
         const size_t nOperation = drawOperation();
         const Operation& operation = operations()[nOperation];
-        const Json::Value jCall = operation.draw(m_draws);
+        Json::Value jCall(Json::objectValue);
+        for (const char* szArgument : operation.szArguments) {
+            jCall[szArgument] = m_draws.argument(szArgument);
+        }
         remember(operation, jCall);
 
-        const Outcome library = run(operation.runOnLibrary, m_library, jCall);
-        m_model.service.setGenerated(library.jCall.get("tid", "").asString());
-        const Outcome model = run(operation.runOnModel, m_model, jCall);
+        const Outcome library = operation.run(m_library, jCall);
+        m_model.service.setGenerated(library.jCall.get("made", "").asString());
+        const Outcome model = operation.run(m_model, jCall);
         ASSERT_EQ(model, library) << "expected is the model's\n" << history();
         ASSERT_EQ("", m_table.differenceFrom(m_model.store.rows())) << history();
         m_tallies[nOperation].count(library);
@@ -159,7 +149,9 @@ protected:
 
     const TokenStore m_files;
     Library m_library;
-    const Table m_table{m_files.path()};
+    const std::unique_ptr<sqlite3, decltype(&sqlite3_close)> m_pDb{openDatabase(m_files.path()),
+                                                                   &sqlite3_close};
+    const Table m_table{m_pDb.get()};
     Model m_model;
     Draws m_draws{seed(), m_model.store.rows()};
     std::vector<Tally> m_tallies = std::vector<Tally>(operations().size());

@@ -1,17 +1,25 @@
-// The operations that the test draws, each of which runs on the library and on the model.
+// The operations that tests draw, each of which runs on the library and on the model.
 
 #ifndef TESTS_MODEL_OPERATIONS_H
 #define TESTS_MODEL_OPERATIONS_H
 
 #include <functional>
+#include <string>
+#include <vector>
 
 #include "AccessTokenApi.h"
-#include "Draws.h"
+#include "AccessTokenUtil.h"
 #include "Model.h"
 #include "internal/AccessTokenDbApi.h"
 #include "vemo-access-token.h"
 
-// The eight functions under the names that the model has for them.
+// The functions under the names that the model has for them.
+struct LibraryRules {
+    decltype(&VEMO_ACCESS_TOKEN::checkJsonType) checkJsonType = &VEMO_ACCESS_TOKEN::checkJsonType;
+    decltype(&VEMO_ACCESS_TOKEN::fillDefaultValue) fillDefaultValue = &VEMO_ACCESS_TOKEN::fillDefaultValue;
+    decltype(&VEMO_ACCESS_TOKEN::checkPermission) checkPermission = &VEMO_ACCESS_TOKEN::checkPermission;
+};
+
 struct LibraryFunctions {
     decltype(&VemoAccessTokenCreate) create = &VemoAccessTokenCreate;
     decltype(&VemoAccessTokenCreateByTid) createByTid = &VemoAccessTokenCreateByTid;
@@ -24,25 +32,54 @@ struct LibraryFunctions {
 };
 
 struct Library {
+    LibraryRules rules;
     AccessTokenDbApi store;
     AccessTokenApi service;
     LibraryFunctions functions;
 };
 
-struct Operation {
-    // run takes a Library or a Model, and the arguments.
-    template <typename Run>
-    Operation(const char* szOperation, size_t nTimes, Json::Value (*drawCall)(Draws&), Run run)
-        : szName(szOperation), nWeight(nTimes), draw(drawCall), runOnLibrary(run), runOnModel(run)
+// What came of an operation.
+struct Outcome {
+    int nResult = 0;
+    std::string strThrown; // instead of a result
+    Json::Value jCall;     // the arguments as they are afterwards
+
+    bool operator==(const Outcome& other) const
     {
+        return strThrown == other.strThrown && nResult == other.nResult && jCall == other.jCall;
     }
+};
+
+// A call of a member of a Library or a Model; its arguments are the members of jCall that have these names.
+typedef std::vector<const char*> Names;
+template <typename System>
+using Call = std::function<int(System& system, Json::Value& jCall, const Names& szArguments)>;
+
+struct Operation {
+    Outcome run(Library& library, const Json::Value& jCall) const { return run(callLibrary, library, jCall); }
+    Outcome run(Model& model, const Json::Value& jCall) const { return run(callModel, model, jCall); }
 
     const char* szName;
-    size_t nWeight;              // how often it is drawn, beside the others
-    Json::Value (*draw)(Draws&); // its arguments, by their names
-    // Return its result; the arguments are afterwards as the operation left them.
-    std::function<int(Library&, Json::Value&)> runOnLibrary;
-    std::function<int(Model&, Json::Value&)> runOnModel;
+    size_t nWeight;    // how often it is drawn, beside the others
+    Names szArguments; // as Draws names them
+    Call<Library> callLibrary;
+    Call<Model> callModel;
+
+private:
+    template <typename System>
+    Outcome run(const Call<System>& call, System& system, const Json::Value& jCall) const
+    {
+        Outcome outcome;
+        outcome.jCall = jCall;
+        try {
+            outcome.nResult = call(system, outcome.jCall, szArguments);
+        } catch (const Json::LogicError&) {
+            outcome.strThrown = "Json::LogicError"; // its text is no part of the interface
+        } catch (const std::exception& exception) {
+            outcome.strThrown = exception.what();
+        }
+        return outcome;
+    }
 };
 
 const std::vector<Operation>& operations();

@@ -25,11 +25,8 @@ std::string columnDifference(sqlite3_stmt* pRow, const Row& row)
 
 } // namespace
 
-Table::Table(const std::string& strPath)
+Table::Table(sqlite3* pDb)
 {
-    sqlite3* pDb = nullptr;
-    const int nOpen = sqlite3_open_v2(strPath.c_str(), &pDb, SQLITE_OPEN_READONLY, nullptr);
-    m_pDb.reset(pDb);
     std::string strSelect = "SELECT ";
     for (const Field& field : FIELDS) {
         strSelect.append(field.szName).append(",");
@@ -37,8 +34,7 @@ Table::Table(const std::string& strPath)
     strSelect.back() = ' ';
     strSelect += "FROM token ORDER BY rowid";
     sqlite3_stmt* pSelect = nullptr;
-    if (SQLITE_OK != nOpen ||
-        SQLITE_OK != sqlite3_prepare_v2(pDb, strSelect.c_str(), -1, &pSelect, nullptr)) {
+    if (SQLITE_OK != sqlite3_prepare_v2(pDb, strSelect.c_str(), -1, &pSelect, nullptr)) {
         throw std::runtime_error(sqlite3_errmsg(pDb));
     }
     m_pSelect.reset(pSelect);
@@ -59,7 +55,7 @@ std::string Table::differenceFrom(const std::vector<Row>& rows) const
     if (strDifference.empty() && (SQLITE_DONE != nStep || nRow != rows.size())) {
         strDifference = SQLITE_ROW == nStep    ? "more rows than " + std::to_string(rows.size())
                         : SQLITE_DONE == nStep ? "only " + std::to_string(nRow) + " rows"
-                                               : sqlite3_errmsg(m_pDb.get());
+                                               : sqlite3_errmsg(sqlite3_db_handle(m_pSelect.get()));
     }
     sqlite3_reset(m_pSelect.get());
     return strDifference;

@@ -1,4 +1,4 @@
-// The library's table, read over a connection of the test's own.
+// The library's table, read beside the library.
 
 #ifndef TESTS_TABLE_H
 #define TESTS_TABLE_H
@@ -11,18 +11,16 @@
 
 class Table {
 public:
-    explicit Table(const std::string& strPath);
+    explicit Table(sqlite3* pDb);
 
     // How the table differs from the rows, in whose order it is to be; "" when it does not.
     std::string differenceFrom(const std::vector<Row>& rows) const;
 
 private:
     struct Closer {
-        void operator()(sqlite3* pDb) const { sqlite3_close(pDb); }
         void operator()(sqlite3_stmt* pStatement) const { sqlite3_finalize(pStatement); }
     };
 
-    std::unique_ptr<sqlite3, Closer> m_pDb;
     std::unique_ptr<sqlite3_stmt, Closer> m_pSelect;
 };
 

@@ -6,6 +6,8 @@
 #include <cerrno>
 #include <cstring>
 
+#include "Interpose.h"
+
 time_t& worldClock()
 {
     static time_t now = 1700000000;
@@ -19,7 +21,7 @@ const char* userName(uid_t uid)
 
 extern "C" {
 
-time_t time(time_t* pTime) noexcept
+INTERPOSED time_t time(time_t* pTime) noexcept
 {
     if (pTime) {
         *pTime = worldClock();
@@ -28,14 +30,15 @@ time_t time(time_t* pTime) noexcept
 }
 
 // The clock of SQLite.
-int gettimeofday(struct timeval* pTime, void*) noexcept
+INTERPOSED int gettimeofday(struct timeval* pTime, void*) noexcept
 {
     pTime->tv_sec = worldClock();
     pTime->tv_usec = 0;
     return 0;
 }
 
-int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer, struct passwd** ppEntry)
+INTERPOSED int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+                          struct passwd** ppEntry)
 {
     const char* szName = userName(uid);
     *ppEntry = nullptr;
@@ -49,16 +52,16 @@ int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer
     return 0;
 }
 
-int fsync(int)
+INTERPOSED int fsync(int)
 {
     return 0;
 }
 
-int fdatasync(int)
+INTERPOSED int fdatasync(int)
 {
     return 0;
 }
 
-void syslog(int, const char*, ...) {}
+INTERPOSED void syslog(int, const char*, ...) {}
 
 } // extern "C"
