@@ -18,8 +18,6 @@ BareToken freshToken(long long nCount)
 
 // Preparation
 
-void nothing(Call&) {}
-
 void useStoredToken(Call& call)
 {
     call.token = tokenOf(0);
@@ -66,144 +64,94 @@ void holdConnectionToUpdate(Call& call)
     call.jArgument["extra"]["colour"] = "blue";
 }
 
-// The library
-
-int create(Call& call)
-{
-    unsigned int uid = 0;
-    return VemoAccessTokenCreate(uid, call.token.strFunction, call.jArgument, call.strTid);
-}
-
-int createByTid(Call& call)
-{
-    unsigned int uid = 0;
-    return VemoAccessTokenCreateByTid(uid, call.token.strFunction, call.jArgument, call.token.strTid);
-}
-
-int generate(Call& call)
-{
-    return VemoAccessTokenGenerate(call.strTid);
-}
-
 int grantEx(Call& call)
 {
     return VemoAccessTokenGrantEx(call.token.strTid, webapi(), method(), call.jResult);
 }
 
-int grantExUnlistedMethod(Call& call)
+// The bare engine: what each exported function must execute, but for the deletion by session with a purge
+// first.
+BareEngine& purged(BareEngine&& engine)
 {
-    return VemoAccessTokenGrantEx(call.token.strTid, webapi(), "delete", call.jResult);
+    engine.purge();
+    return engine;
 }
-
-int grant(Call& call)
-{
-    return VemoAccessTokenGrant(call.token.strTid, webapi(), method(), call.szUser, sizeof(call.szUser));
-}
-
-int deleteByTid(Call& call)
-{
-    return VemoAccessTokenDeleteByTid(call.token.strTid);
-}
-
-int deleteByBindSid(Call& call)
-{
-    return VemoAccessTokenDeleteByBindSid(call.token.strBindSid.c_str());
-}
-
-int deleteByFunction(Call& call)
-{
-    return VemoAccessTokenDeleteByFunction(call.token.strFunction);
-}
-
-int tokenList(Call& call)
-{
-    return call.pApi->tokenList(call.jArgument, call.jResult);
-}
-
-int tokenUpdateByTid(Call& call)
-{
-    return call.pApi->tokenUpdateByTid(call.token.strTid, call.jArgument);
-}
-
-int tokenGrant(Call& call)
-{
-    return call.pApi->tokenGrant(call.token.strTid, webapi(), method(), call.jResult);
-}
-
-// The bare engine
 
 void bareCreate(Call& call)
 {
-    BareEngine engine;
-    engine.purge();
-    engine.create(call.token);
+    purged(BareEngine()).create(call.token);
 }
 
 void bareGrant(Call& call)
 {
-    BareEngine engine;
-    engine.purge();
-    engine.grant(call.token.strTid);
+    purged(BareEngine()).grant(call.token.strTid);
 }
 
-int controlGrant(Call& call)
-{
-    bareGrant(call);
-    return 0;
-}
-
-void bareRead(Call& call)
-{
-    BareEngine engine;
-    engine.purge();
-    engine.read(call.token.strTid);
-}
-
-void bareDeleteByTid(Call& call)
-{
-    BareEngine engine;
-    engine.purge();
-    engine.deleteWhere("tid", call.token.strTid);
-}
-
-void bareDeleteByBindSid(Call& call)
-{
-    BareEngine().deleteWhere("bind_sid", call.token.strBindSid);
-}
-
-void bareDeleteByFunction(Call& call)
-{
-    BareEngine engine;
-    engine.purge();
-    engine.deleteWhere("function", call.token.strFunction);
-}
+unsigned int g_uid = 0;
 
 } // namespace
 
 const std::vector<Operation>& operations()
 {
     static const std::vector<Operation> rgOperation = {
-        {"Create", useFreshToken, create, 0, bareCreate},
-        {"CreateByTid", useFreshToken, createByTid, 0, bareCreate},
-        {"Generate", nothing, generate, 0, nullptr},
+        {"Create", useFreshToken,
+         [](Call& call) {
+             return VemoAccessTokenCreate(g_uid, call.token.strFunction, call.jArgument, call.strTid);
+         },
+         0, bareCreate},
+        {"CreateByTid", useFreshToken,
+         [](Call& call) {
+             return VemoAccessTokenCreateByTid(g_uid, call.token.strFunction, call.jArgument,
+                                               call.token.strTid);
+         },
+         0, bareCreate},
+        {"Generate", [](Call&) {}, [](Call& call) { return VemoAccessTokenGenerate(call.strTid); }, 0,
+         nullptr},
         {"GrantEx.saved", useStoredToken, grantEx, 0, bareGrant},
         {"GrantEx.deleted", storeFreshToken<1>, grantEx, 0, bareGrant},
         {"GrantEx.unlimited", storeFreshToken<-1>, grantEx, 0, bareGrant},
-        {"GrantEx.refused", useStoredToken, grantExUnlistedMethod, -1, bareRead},
-        {"Grant.saved", storeFreshToken<1000>, grant, 0, bareGrant},
-        {"DeleteByTid", storeFreshToken<1>, deleteByTid, 1, bareDeleteByTid},
-        {"DeleteByBindSid", storeFreshToken<1>, deleteByBindSid, 1, bareDeleteByBindSid},
-        {"DeleteByFunction", storeFreshToken<1>, deleteByFunction, 1, bareDeleteByFunction},
-        {"tokenList", holdConnectionToList, tokenList, 0, nullptr},
-        {"tokenUpdateByTid", holdConnectionToUpdate, tokenUpdateByTid, 0, nullptr},
-        {"tokenGrant.saved", holdConnection, tokenGrant, 0, nullptr},
+        {"GrantEx.refused", useStoredToken,
+         [](Call& call) {
+             return VemoAccessTokenGrantEx(call.token.strTid, webapi(), "delete", call.jResult);
+         },
+         -1, [](Call& call) { purged(BareEngine()).read(call.token.strTid); }},
+        {"Grant.saved", storeFreshToken<1000>,
+         [](Call& call) {
+             return VemoAccessTokenGrant(call.token.strTid, webapi(), method(), call.szUser,
+                                         sizeof(call.szUser));
+         },
+         0, bareGrant},
+        {"DeleteByTid", storeFreshToken<1>,
+         [](Call& call) { return VemoAccessTokenDeleteByTid(call.token.strTid); }, 1,
+         [](Call& call) { purged(BareEngine()).deleteWhere("tid", call.token.strTid); }},
+        {"DeleteByBindSid", storeFreshToken<1>,
+         [](Call& call) { return VemoAccessTokenDeleteByBindSid(call.token.strBindSid.c_str()); }, 1,
+         [](Call& call) { BareEngine().deleteWhere("bind_sid", call.token.strBindSid); }},
+        {"DeleteByFunction", storeFreshToken<1>,
+         [](Call& call) { return VemoAccessTokenDeleteByFunction(call.token.strFunction); }, 1,
+         [](Call& call) { purged(BareEngine()).deleteWhere("function", call.token.strFunction); }},
+        {"tokenList", holdConnectionToList,
+         [](Call& call) { return call.pApi->tokenList(call.jArgument, call.jResult); }, 0, nullptr},
+        {"tokenUpdateByTid", holdConnectionToUpdate,
+         [](Call& call) { return call.pApi->tokenUpdateByTid(call.token.strTid, call.jArgument); }, 0,
+         nullptr},
+        {"tokenGrant.saved", holdConnection,
+         [](Call& call) {
+             return call.pApi->tokenGrant(call.token.strTid, webapi(), method(), call.jResult);
+         },
+         0, nullptr},
     };
     return rgOperation;
 }
 
 const Operation& control()
 {
-    static const Operation operation = {"Control", useStoredToken, controlGrant, 0, bareGrant};
+    static const Operation operation = {"Control", useStoredToken,
+                                        [](Call& call) {
+                                            bareGrant(call);
+                                            return 0;
+                                        },
+                                        0, bareGrant};
     return operation;
 }
 

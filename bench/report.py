@@ -19,39 +19,45 @@ import matplotlib
 matplotlib.use("Agg")
 from matplotlib import pyplot  # noqa: E402
 
-GOAL_OPERATIONS = (
-    "Create",
-    "CreateByTid",
-    "GrantEx.saved",
-    "GrantEx.deleted",
-    "DeleteByTid",
-    "DeleteByBindSid",
-    "DeleteByFunction",
-)
+GOAL_OPERATIONS = ("Create", "CreateByTid", "GrantEx.saved", "GrantEx.deleted", "DeleteByTid", "DeleteByBindSid",
+                   "DeleteByFunction")
 GOAL_OVERHEAD = {"memory": 1.08, "disk": 1.03}
 
+HALF_CHANGE = "no half change; the last one may be undone"
+RETURNED = "what returned is kept"
+ANSWERED = "what was answered is kept"
+SECONDS_LOST = "the last second or two of answers may be lost"
 PEERS = {  # what each promises at a power cut
-    "ours-plain-per-call": ("this library, a function per call", "no half change; the last one may be undone"),
-    "ours-plain-held": ("this library, a held object", "no half change; the last one may be undone"),
-    "ours-tuned-per-call": ("the same, tuned: a function per call", "what returned is kept"),
-    "ours-tuned-per-call-beside-another": (
-        "the same, tuned: a function per call, another process connected",
-        "what returned is kept",
-    ),
-    "ours-tuned-held": ("the same, tuned: a held object", "what returned is kept"),
-    "redis-always-per-call": ("Redis, appendfsync always, a connection per call", "what was answered is kept"),
-    "redis-always-held": ("Redis, appendfsync always, a held connection", "what was answered is kept"),
-    "redis-everysec-per-call": (
-        "Redis, appendfsync everysec, a connection per call",
-        "the last second or two of answers may be lost",
-    ),
-    "redis-everysec-held": (
-        "Redis, appendfsync everysec, a held connection",
-        "the last second or two of answers may be lost",
-    ),
-    "postgresql-per-call": ("PostgreSQL, a connection per call", "what was answered is kept"),
-    "postgresql-held": ("PostgreSQL, a held connection", "what was answered is kept"),
+    "ours-plain-per-call": ("this library, a function per call", HALF_CHANGE),
+    "ours-plain-held": ("this library, a held object", HALF_CHANGE),
+    "ours-tuned-per-call": ("the same, tuned: a function per call", RETURNED),
+    "ours-tuned-per-call-beside-another": ("the same, tuned: a function per call, another process connected", RETURNED),
+    "ours-tuned-held": ("the same, tuned: a held object", RETURNED),
+    "redis-always-per-call": ("Redis, appendfsync always, a connection per call", ANSWERED),
+    "redis-always-held": ("Redis, appendfsync always, a held connection", ANSWERED),
+    "redis-everysec-per-call": ("Redis, appendfsync everysec, a connection per call", SECONDS_LOST),
+    "redis-everysec-held": ("Redis, appendfsync everysec, a held connection", SECONDS_LOST),
+    "postgresql-per-call": ("PostgreSQL, a connection per call", ANSWERED),
+    "postgresql-held": ("PostgreSQL, a held connection", ANSWERED),
 }
+PEER_GOALS = (  # what, beside what, the most that the ratio may be
+    ("ours-tuned-held", "redis-always-held", 1),
+    ("ours-plain-held", "redis-always-held", None),
+    ("ours-plain-per-call", "postgresql-per-call", 1),
+    ("ours-tuned-per-call", "postgresql-per-call", None),
+)
+
+GATE_GOALS = (  # what, beside what, the least ratio
+    ("write-ahead/8", "redis/8", 0.9),
+    ("write-ahead/64", "redis/64", 1.0),
+    ("write-ahead/256", "redis/256", 0.9),
+    ("one-token/64", "redis-one-token/64", 1.0),
+    ("rollback/64", "calls/64", 30),
+    ("rollback/64", "calls-locked/64", 20),
+    ("nginx/64", "nginx-at-once/64", 0.4),
+    ("many-tokens/64", "write-ahead/64", 0.5),
+    ("call-beside/1", "call/1", 2),
+)
 
 
 class Results:
@@ -135,72 +141,32 @@ def ratios(results):
         rows.append([what, ours, beside, f"{ratio:.3f}", verdict(ratio, goal)])
 
     for (operation, place, tokens), cell in results["overhead"].cells.items():
-        goal = GOAL_OVERHEAD[place] if tokens == "10" and operation in GOAL_OPERATIONS else None
-        add(
-            f"{operation}, {place}, {int(tokens):,} tokens",
-            microseconds(cell["ours_us"]),
-            f"bare engine {microseconds(cell['bare_us'])}",
-            cell["ratio"],
-            goal,
-        )
+        add(f"{operation}, {place}, {int(tokens):,} tokens", microseconds(cell["ours_us"]),
+            f"bare engine {microseconds(cell['bare_us'])}", cell["ratio"],
+            GOAL_OVERHEAD[place] if tokens == "10" and operation in GOAL_OPERATIONS else None)
     listing = results["listing"].cells
     time, memory = listing[("time",)], listing[("memory",)]
-    add(
-        "tokenList, 100,000 tokens",
-        f"{time['ours_us'] / 1000:.0f} ms",
-        f"sqlite3_exec {time['bare_us'] / 1000:.0f} ms",
-        time["ratio"],
-        1.5,
-    )
-    add(
-        "its peak memory",
-        f"{memory['peak_kB'] / 1000:.1f} MB",
-        f"the values {memory['values_kB'] / 1000:.1f} MB",
-        memory["ratio"],
-        1.1,
-    )
+    add("tokenList, 100,000 tokens", f"{time['ours_us'] / 1000:.0f} ms",
+        f"sqlite3_exec {time['bare_us'] / 1000:.0f} ms", time["ratio"], 1.5)
+    add("its peak memory", f"{memory['peak_kB'] / 1000:.1f} MB", f"the values {memory['values_kB'] / 1000:.1f} MB",
+        memory["ratio"], 1.1)
     for (place, kind, tokens), cell in results["growth"].cells.items():
         if tokens == "1000000":
-            add(
-                f"grant at 1,000,000 tokens, {kind}, {place}",
-                microseconds(cell["median_us"]),
-                f"at 10 tokens {microseconds(cell['few_us'])}",
-                cell["ratio"],
-                1.3 if kind == "indexed" else None,
-            )
+            add(f"grant at 1,000,000 tokens, {kind}, {place}", microseconds(cell["median_us"]),
+                f"at 10 tokens {microseconds(cell['few_us'])}", cell["ratio"], 1.3 if kind == "indexed" else None)
     peers = results["peers"].cells
-    for ours, peer, goal in (
-        ("ours-tuned-held", "redis-always-held", 1),
-        ("ours-plain-held", "redis-always-held", None),
-        ("ours-plain-per-call", "postgresql-per-call", 1),
-        ("ours-tuned-per-call", "postgresql-per-call", None),
-    ):
-        if peers:
-            ours_us, peer_us = peers[(ours,)]["median_us"], peers[(peer,)]["median_us"]
-            add(ours, microseconds(ours_us), f"{peer} {microseconds(peer_us)}", ours_us / peer_us, goal)
+    for ours, peer, goal in PEER_GOALS if peers else ():
+        ours_us, peer_us = peers[(ours,)]["median_us"], peers[(peer,)]["median_us"]
+        add(ours, microseconds(ours_us), f"{peer} {microseconds(peer_us)}", ours_us / peer_us, goal)
     return table(["Measured", "Ours", "Beside", "Ratio", "Goal"], rows)
 
 
 def peers_table(results):
-    rows = []
-    for slug, (name, promise) in PEERS.items():
-        cell = results["peers"].cells.get((slug,))
-        if cell:
-            rows.append([name, microseconds(cell["median_us"]), microseconds(cell["p99_us"]), promise])
-    return table(["Grant", "Median", "99th percentile", "At a power cut"], rows)
-
-
-GATE_GOALS = (  # what, beside what, the least ratio
-    ("write-ahead/8", "redis/8", 0.9),
-    ("write-ahead/64", "redis/64", 1.0),
-    ("write-ahead/256", "redis/256", 0.9),
-    ("one-token/64", "redis-one-token/64", 1.0),
-    ("rollback/64", "calls/64", 30),
-    ("rollback/64", "calls-locked/64", 20),
-    ("nginx/64", "nginx-at-once/64", 0.4),
-    ("many-tokens/64", "write-ahead/64", 0.5),
-    ("call-beside/1", "call/1", 2),
-)
+    cells = results["peers"].cells
+    return table(
+        ["Grant", "Median", "99th percentile", "At a power cut"],
+        [[name, microseconds(cells[(slug,)]["median_us"]), microseconds(cells[(slug,)]["p99_us"]), promise]
+         for slug, (name, promise) in PEERS.items() if (slug,) in cells])
 
 
 def gate_table(results):
@@ -208,11 +174,8 @@ def gate_table(results):
     rows = []
     for ours, other, goal in GATE_GOALS:
         rate, beside = (cells[tuple(name.split("/"))]["per_second"] for name in (ours, other))
-        ratio = rate / beside
-        rows.append(
-            [ours, f"{rate:,.0f}", other, f"{beside:,.0f}", f"{ratio:.2f}", f"{goal:g}"
-             + (": met" if ratio >= goal else ": missed")]
-        )
+        rows.append([ours, f"{rate:,.0f}", other, f"{beside:,.0f}", f"{rate / beside:.2f}",
+                     f"{goal:g}: " + ("met" if rate / beside >= goal else "missed")])
     busy, many = cells[("write-ahead", "64")], cells[("write-ahead", "256")]
     spread = busy["p99_us"] / busy["median_us"]
     rows.append(["99th percentile, 64 clients", microseconds(busy["p99_us"]), "median", microseconds(busy["median_us"]),
@@ -222,82 +185,53 @@ def gate_table(results):
     return table(["Grants/s (clients)", "Gate", "Beside", "Grants/s", "Ratio", "Goal"], rows)
 
 
-def plot_gate(results, directory):
-    cells = results["gate"].cells
-    figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5))
-    for series in ("write-ahead", "rollback", "redis"):
-        points = [(int(key[1]), cell) for key, cell in cells.items() if key[0] == series]
-        points.sort(key=lambda point: point[0])
-        label = "Redis, appendfsync always" if series == "redis" else f"gate, {series} journal"
-        clients = [number for number, _ in points]
-        panels[0].plot(clients, [cell["per_second"] for _, cell in points], marker="o", label=label)
-        (line,) = panels[1].plot(clients, [cell["p99_us"] / 1000 for _, cell in points], marker="o", label=label)
-        panels[1].plot(clients, [cell["median_us"] / 1000 for _, cell in points], linestyle=":", color=line.get_color())
-    panels[0].set_title("grants a second")
-    panels[1].set_title("a grant: 99th percentile, dotted: median (ms)")
-    for axes in panels:
-        axes.set_xscale("log", base=2)
-        axes.set_yscale("log")
-        axes.xaxis.set_major_formatter("{x:.0f}")
-        axes.set_xlabel("clients")
-        axes.grid(True, alpha=0.3)
-    panels[0].legend()
-    save(figure, directory, "gate.png")
-
-
 def growth_table(results):
-    cells = results["growth"].cells
-    rows = []
-    for tokens in ("10", "100", "1000", "10000", "100000", "1000000"):
-        row = [f"{int(tokens):,}"]
-        for place in ("memory", "disk"):
-            for kind in ("plain", "indexed"):
-                cell = cells[(place, kind, tokens)]
-                row.append(f"{microseconds(cell['median_us'])} ({cell['ratio']:.2f})")
-        rows.append(row)
-    return table(["Tokens", "memory, plain", "memory, indexed", "disk, plain", "disk, indexed"], rows)
+    def text(place, kind, tokens):
+        cell = results["growth"].cells[(place, kind, tokens)]
+        return f"{microseconds(cell['median_us'])} ({cell['ratio']:.2f})"
+
+    return table(
+        ["Tokens", "memory, plain", "memory, indexed", "disk, plain", "disk, indexed"],
+        [[f"{int(tokens):,}"]
+         + [text(place, kind, tokens) for place in ("memory", "disk") for kind in ("plain", "indexed")]
+         for tokens in ("10", "100", "1000", "10000", "100000", "1000000")])
 
 
 def contention_table(results):
-    rows = []
-    for (journal, calls, processes), cell in results["contention"].cells.items():
-        rows.append(
-            [
-                journal,
-                calls,
-                processes,
-                f"{cell['grants_per_second']:.0f}",
-                f"{cell['median_us'] / 1000:.1f} ms",
-                f"{cell['p99_us'] / 1000:.1f} ms",
-                percent(cell["failed"]),
-                percent(cell["false_failures"]),
-                percent(cell["beyond_count"]),
-            ]
-        )
-    header = ["Journal", "Calls", "Processes", "Grants/s", "Median", "99th percentile"]
-    return table(header + ["Failed", "False failures", "Beyond count"], rows)
+    return table(
+        ["Journal", "Calls", "Processes", "Grants/s", "Median", "99th percentile", "Failed", "False failures",
+         "Beyond count"],
+        [[*key, f"{cell['grants_per_second']:.0f}", f"{cell['median_us'] / 1000:.1f} ms",
+          f"{cell['p99_us'] / 1000:.1f} ms"]
+         + [percent(cell[counter]) for counter in ("failed", "false_failures", "beyond_count")]
+         for key, cell in results["contention"].cells.items()])
 
 
-def breakdown_table(results):
-    steps = ("open", "purge", "select", "save", "close", "library", "total")
-    rows = []
-    for (kind, place, journal), cell in results["breakdown"].cells.items():
-        rows.append([f"{kind}, {place}, {journal}"] + [f"{cell[step + '_us']:.0f}" for step in steps])
-    return table(["Grant (µs)"] + list(steps), rows)
-
-
-def calls_table(results):
-    kinds = ("opens", "closes", "reads", "writes", "syncs", "locks", "unlinks", "stats", "others")
-    rows = []
-    for (kind, place, journal), cell in results["breakdown"].cells.items():
-        rows.append([f"{kind}, {place}, {journal}"] + [f"{cell[name]:.0f}" for name in kinds])
-    return table(["System calls"] + list(kinds), rows)
+def breakdown_table(results, title, names, suffix=""):
+    return table([title, *names], [[", ".join(key)] + [f"{cell[name + suffix]:.0f}" for name in names]
+                                   for key, cell in results["breakdown"].cells.items()])
 
 
 def save(figure, directory, name):
     figure.tight_layout()
     figure.savefig(os.path.join(directory, name), dpi=100)
     pyplot.close(figure)
+
+
+def plot_lines(axes, cells, series, counter, factor=1, **options):
+    """The counter of a series (the first parts of the benchmarks' names) over the number that comes last."""
+    points = sorted((int(key[-1]), cell[counter] * factor) for key, cell in cells.items() if key[:-1] == series)
+    return axes.plot(*zip(*points), **options)[0]
+
+
+def finish_panels(panels, titles, xlabel, base=None):
+    for axes, title in zip(panels, titles):
+        axes.set_title(title)
+        axes.grid(True, alpha=0.3)
+        axes.set_xlabel(xlabel)
+        if base:
+            axes.set_xscale("log", base=base)
+            axes.xaxis.set_major_formatter("{x:.0f}")
 
 
 def plot_overhead(results, directory):
@@ -317,45 +251,49 @@ def plot_overhead(results, directory):
 
 
 def plot_growth(results, directory):
-    cells = results["growth"].cells
     figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5), sharey=True)
     for axes, place in zip(panels, ("memory", "disk")):
         for kind in ("plain", "indexed"):
-            series = (place, kind)
-            points = [(int(key[2]), cell["median_us"] / 1000) for key, cell in cells.items() if key[:2] == series]
-            axes.loglog(*zip(*points), marker="o", label=kind)
-        axes.set_xlabel("tokens")
-        axes.set_title(f"A grant in {place}" if place == "memory" else "A grant on disk")
-        axes.grid(True, alpha=0.3)
+            plot_lines(axes, results["growth"].cells, (place, kind), "median_us", 1e-3, marker="o", label=kind)
+        axes.set_yscale("log")
         axes.legend()
+    finish_panels(panels, ("A grant in memory", "A grant on disk"), "tokens", base=10)
     panels[0].set_ylabel("ms (median)")
     save(figure, directory, "growth.png")
 
 
 def plot_contention(results, directory):
     cells = results["contention"].cells
-    figure, panels = pyplot.subplots(2, 2, figsize=(9, 7), sharex=True)
-    for axes, counter, factor, title in (
-        (panels[0][0], "grants_per_second", 1, "grants a second"),
-        (panels[0][1], "p99_us", 1e-3, "a call: 99th percentile, dotted: median (ms)"),
-        (panels[1][0], "false_failures", 100, "false failures (% of calls)"),
-        (panels[1][1], "beyond_count", 100, "uses beyond count (% of grants)"),
+    figure, panels = pyplot.subplots(2, 2, figsize=(9, 7))
+    panels = panels.flatten()
+    for axes, counter, factor in zip(
+        panels, ("grants_per_second", "p99_us", "false_failures", "beyond_count"), (1, 1e-3, 100, 100)
     ):
         for series in dict.fromkeys(key[:2] for key in cells):
-            points = [(int(key[2]), cell[counter] * factor) for key, cell in cells.items() if key[:2] == series]
-            (line,) = axes.plot(*zip(*points), marker="o", label=", ".join(series))
+            line = plot_lines(axes, cells, series, counter, factor, marker="o", label=", ".join(series))
             if counter == "p99_us":
-                medians = [cell["median_us"] * factor for key, cell in cells.items() if key[:2] == series]
-                axes.plot([x for x, _ in points], medians, linestyle=":", color=line.get_color())
-        axes.set_xscale("log", base=2)
-        axes.xaxis.set_major_formatter("{x:.0f}")
-        axes.set_title(title)
-        axes.grid(True, alpha=0.3)
-    panels[0][1].set_yscale("log")
-    panels[1][0].legend()
-    for axes in panels[1]:
-        axes.set_xlabel("processes on one token")
+                plot_lines(axes, cells, series, "median_us", factor, linestyle=":", color=line.get_color())
+    panels[1].set_yscale("log")
+    panels[2].legend()
+    finish_panels(panels, ("grants a second", "a call: 99th percentile, dotted: median (ms)",
+                           "false failures (% of calls)", "uses beyond count (% of grants)"),
+                  "processes on one token", base=2)
     save(figure, directory, "contention.png")
+
+
+def plot_gate(results, directory):
+    cells = results["gate"].cells
+    figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5))
+    for series in ("write-ahead", "rollback", "redis"):
+        label = "Redis, appendfsync always" if series == "redis" else f"gate, {series} journal"
+        plot_lines(panels[0], cells, (series,), "per_second", marker="o", label=label)
+        line = plot_lines(panels[1], cells, (series,), "p99_us", 1e-3, marker="o", label=label)
+        plot_lines(panels[1], cells, (series,), "median_us", 1e-3, linestyle=":", color=line.get_color())
+    for axes in panels:
+        axes.set_yscale("log")
+    panels[0].legend()
+    finish_panels(panels, ("grants a second", "a grant: 99th percentile, dotted: median (ms)"), "clients", base=2)
+    save(figure, directory, "gate.png")
 
 
 def plot_peers(results, directory):
@@ -381,7 +319,11 @@ def main():
     results = {name: Results(directory, name) for name in names}
     sections = [
         ("Ratios", machine(results) + "\n" + ratios(results)),
-        ("Where the time of a grant goes", breakdown_table(results) + "\n" + calls_table(results)),
+        ("Where the time of a grant goes",
+         breakdown_table(results, "Grant (µs)", ("open", "purge", "select", "save", "close", "library", "total"), "_us")
+         + "\n"
+         + breakdown_table(results, "System calls", ("opens", "closes", "reads", "writes", "syncs", "locks", "unlinks",
+                                                    "stats", "others"))),
         ("Growth", growth_table(results)),
         ("Contention", contention_table(results)),
     ]
