@@ -2,7 +2,6 @@
 
 #include <dirent.h>
 #include <fcntl.h>
-#include <pwd.h>
 #include <sqlite3.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
@@ -19,8 +18,6 @@
 #include "Require.h"
 
 namespace {
-
-const uid_t ANNA = 1000;
 
 bool g_blConfined = false;
 sqlite3* g_pOffered = nullptr;
@@ -70,8 +67,10 @@ int refused(int nErrno)
 }
 
 // The database and the directories that lead to it.
-int statusOf(const char* szPath, struct stat* pStatus)
+int statusOf(const char* szPath, struct stat* pStatus = nullptr)
 {
+    struct stat ignored;
+    pStatus = pStatus ? pStatus : &ignored;
     const std::string strDatabase = VEMO_ATOKEN_DB_PATH;
     const bool blDatabase = strDatabase == szPath;
     if (!blDatabase && 0 != strDatabase.compare(0, strlen(szPath) + 1, std::string(szPath) + "/")) {
@@ -83,12 +82,12 @@ int statusOf(const char* szPath, struct stat* pStatus)
     return 0;
 }
 
-int userOf(bool blFound, const char* szName, uid_t uid, struct passwd* pEntry, struct passwd** ppFound)
+// The descriptor of a file that can be read; -1 for any other name.
+int inputFile(const char* szName)
 {
-    *ppFound = blFound ? pEntry : nullptr;
-    pEntry->pw_name = const_cast<char*>(szName);
-    pEntry->pw_uid = uid;
-    return 0;
+    return 0 == strcmp(szName, fuzz::EXTRA_FILE)    ? g_nExtraFile
+           : 0 == strcmp(szName, fuzz::TOKENS_FILE) ? g_nTokensFile
+                                                    : refused(ENOENT);
 }
 
 } // namespace
@@ -154,18 +153,6 @@ std::string takeComplaints()
 
 } // namespace fuzz
 
-namespace {
-
-// The descriptor of a file that can be read; -1 for any other name.
-int inputFile(const char* szName)
-{
-    return 0 == strcmp(szName, fuzz::EXTRA_FILE)    ? g_nExtraFile
-           : 0 == strcmp(szName, fuzz::TOKENS_FILE) ? g_nTokensFile
-                                                    : refused(ENOENT);
-}
-
-} // namespace
-
 extern "C" {
 
 INTERPOSED int sqlite3_open(const char*, sqlite3** ppDb)
@@ -175,36 +162,32 @@ INTERPOSED int sqlite3_open(const char*, sqlite3** ppDb)
     return SQLITE_OK;
 }
 
-INTERPOSED uid_t geteuid() noexcept
-{
-    return g_blConfined ? 0 : NEXT(geteuid)();
-}
+// Defines a function that gives an answer of its own to the code under test.
+#define CONFINED(result, name, parameters, arguments, answer)                                                \
+    INTERPOSED result name parameters                                                                        \
+    {                                                                                                        \
+        return g_blConfined ? answer : NEXT(name) arguments;                                                 \
+    }
 
-INTERPOSED int seteuid(uid_t uid) noexcept
-{
-    return g_blConfined ? 0 : NEXT(seteuid)(uid);
-}
-
-INTERPOSED int access(const char* szPath, int nMode) noexcept
-{
-    struct stat status;
-    return g_blConfined ? statusOf(szPath, &status) : NEXT(access)(szPath, nMode);
-}
-
-INTERPOSED int stat(const char* szPath, struct stat* pStatus) noexcept
-{
-    return g_blConfined ? statusOf(szPath, pStatus) : NEXT(stat)(szPath, pStatus);
-}
-
-INTERPOSED int lstat(const char* szPath, struct stat* pStatus) noexcept
-{
-    return g_blConfined ? statusOf(szPath, pStatus) : NEXT(lstat)(szPath, pStatus);
-}
-
-INTERPOSED int chmod(const char* szPath, mode_t mode) noexcept
-{
-    return g_blConfined ? 0 : NEXT(chmod)(szPath, mode);
-}
+CONFINED(uid_t, geteuid, () noexcept, (), 0)
+CONFINED(int, seteuid, (uid_t uid) noexcept, (uid), 0)
+CONFINED(int, access, (const char* szPath, int nMode) noexcept, (szPath, nMode), statusOf(szPath))
+CONFINED(int, stat, (const char* szPath, struct stat* pStatus) noexcept, (szPath, pStatus),
+         statusOf(szPath, pStatus))
+CONFINED(int, lstat, (const char* szPath, struct stat* pStatus) noexcept, (szPath, pStatus),
+         statusOf(szPath, pStatus))
+CONFINED(int, chmod, (const char* szPath, mode_t mode) noexcept, (szPath, mode), 0)
+CONFINED(int, mkdirat, (int nDirectory, const char* szName, mode_t mode) noexcept, (nDirectory, szName, mode),
+         refused(EEXIST))
+CONFINED(int, linkat, (int nFrom, const char* szFrom, int nTo, const char* szTo, int nFlags) noexcept,
+         (nFrom, szFrom, nTo, szTo, nFlags), 0)
+CONFINED(int, unlinkat, (int nDirectory, const char* szName, int nFlags) noexcept,
+         (nDirectory, szName, nFlags), 0)
+CONFINED(DIR*, opendir, (const char* szPath), (szPath), nullptr)
+CONFINED(FILE*, fopen64, (const char* szPath, const char* szMode), (szPath, szMode),
+         (refused(ENOENT), nullptr))
+CONFINED(int, isatty, (int nFile) noexcept, (nFile), 0)
+CONFINED(int, usleep, (useconds_t nMicroseconds), (nMicroseconds), 0)
 
 INTERPOSED int fstat(int nFile, struct stat* pStatus) noexcept
 {
@@ -224,26 +207,6 @@ INTERPOSED int fstatat(int nDirectory, const char* szName, struct stat* pStatus,
     }
     const int nFile = inputFile(szName);
     return 0 > nFile ? -1 : fstat(nFile, pStatus);
-}
-
-INTERPOSED int mkdirat(int nDirectory, const char* szName, mode_t mode) noexcept
-{
-    return g_blConfined ? refused(EEXIST) : NEXT(mkdirat)(nDirectory, szName, mode);
-}
-
-INTERPOSED int linkat(int nFrom, const char* szFrom, int nTo, const char* szTo, int nFlags) noexcept
-{
-    return g_blConfined ? 0 : NEXT(linkat)(nFrom, szFrom, nTo, szTo, nFlags);
-}
-
-INTERPOSED int unlinkat(int nDirectory, const char* szName, int nFlags) noexcept
-{
-    return g_blConfined ? 0 : NEXT(unlinkat)(nDirectory, szName, nFlags);
-}
-
-INTERPOSED DIR* opendir(const char* szPath)
-{
-    return g_blConfined ? nullptr : NEXT(opendir)(szPath);
 }
 
 INTERPOSED int openat(int nDirectory, const char* szName, int nFlags, ...)
@@ -274,41 +237,6 @@ INTERPOSED int open(const char* szPath, int nFlags, ...)
     }
     const bool blHarmless = 0 == strcmp(szPath, "/dev/null") || 0 == strcmp(szPath, "/dev/urandom");
     return g_blConfined && !blHarmless ? refused(ENOENT) : NEXT(open)(szPath, nFlags, mode);
-}
-
-INTERPOSED FILE* fopen64(const char* szPath, const char* szMode)
-{
-    return g_blConfined && refused(ENOENT) ? nullptr : NEXT(fopen64)(szPath, szMode);
-}
-
-INTERPOSED int isatty(int nFile) noexcept
-{
-    return g_blConfined ? 0 : NEXT(isatty)(nFile);
-}
-
-INTERPOSED int usleep(useconds_t nMicroseconds)
-{
-    return g_blConfined ? 0 : NEXT(usleep)(nMicroseconds);
-}
-
-INTERPOSED int getpwnam_r(const char* szName, struct passwd* pEntry, char*, size_t, struct passwd** ppFound)
-{
-    const bool blAnna = 0 == strcmp(szName, "anna");
-    return userOf(blAnna || 0 == strcmp(szName, "root"), "", blAnna ? ANNA : 0, pEntry, ppFound);
-}
-
-INTERPOSED int getpwuid_r(uid_t uid, struct passwd* pEntry, char*, size_t, struct passwd** ppFound)
-{
-    return userOf(uid == ANNA || uid == 0, uid ? "anna" : "root", uid, pEntry, ppFound);
-}
-
-INTERPOSED void syslog(int, const char* szFormat, ...)
-{
-    char szLine[256];
-    va_list args;
-    va_start(args, szFormat);
-    vsnprintf(szLine, sizeof(szLine), szFormat, args);
-    va_end(args);
 }
 
 INTERPOSED int printf(const char* szFormat, ...)

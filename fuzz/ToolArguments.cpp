@@ -21,10 +21,6 @@ namespace {
 
 using fuzz::Texts;
 
-// What the tool may say of the store and the system here, where nothing fails but what is asked in vain.
-const char* const STORE_FAILURES[] = {"the journal cannot be made", "granted, but there is no user",
-                                      "no regular file", "cannot be repaired"};
-
 const std::map<std::string, void (*)(tool::Commands&)> COMMANDS = {
     {"create", tool::addCreate}, {"generate", tool::addGenerate}, {"list", tool::addList},
     {"show", tool::addShow},     {"check", tool::addCheck},       {"grant", tool::addGrant},
@@ -182,9 +178,10 @@ void checkComplaint(const Texts& strArguments, int nStatus, const std::string& s
     for (const std::string& strArgument : strArguments) {
         FUZZ_REQUIRE(!isId(strArgument) || std::string::npos == strComplaint.find(strArgument));
     }
-    const auto isSaid = [&](const char* szText) { return std::string::npos != strComplaint.find(szText); };
-    FUZZ_REQUIRE(tool::EXIT_STATUS_STORE != nStatus ||
-                 std::any_of(std::begin(STORE_FAILURES), std::end(STORE_FAILURES), isSaid));
+    // Nothing of the store and the system fails here but what is asked in vain.
+    const auto says = [&](const char* szText) { return std::string::npos != strComplaint.find(szText); };
+    FUZZ_REQUIRE(tool::EXIT_STATUS_STORE != nStatus || says("the journal cannot be made") ||
+                 says("granted, but there is no user"));
 }
 
 } // namespace

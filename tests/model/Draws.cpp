@@ -75,6 +75,10 @@ const char* const g_rgExtra[] = {"{}", R"({"note":"it's"})", R"({"a":{"b":[1,-2,
 const char* const g_rgNumberText[] = {"7",    "-1", "count", "uid",       TEXT_OR_TRUE,
                                       "null", "'",  "",      "no_column", "1 1"};
 
+const unsigned int g_rgUid[] = {UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77, 4294967294, 4294967295};
+
+const Json::UInt g_rgSize[] = {0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE};
+
 const char* const g_rgName[] = {"tid",   "tid",   "bind_sid", "function", "function", "uid",
                                 "count", "extra", "limit",    "sort_by",  "no_field", ""};
 
@@ -103,48 +107,40 @@ time_t Draws::step()
 
 Json::Value Draws::argument(const std::string& strName)
 {
-    static const std::map<std::string, Json::Value (Draws::*)()> DRAWS = {
-        {"tid", &Draws::tid},          {"fresh", &Draws::newTid},     {"granted", &Draws::granted},
-        {"webapi", &Draws::webapi},    {"method", &Draws::method},    {"uid", &Draws::uid},
-        {"function", &Draws::purpose}, {"sid", &Draws::session},      {"sid_or_null", &Draws::sessionOrNull},
-        {"name", &Draws::name},        {"option", &Draws::option},    {"param", &Draws::param},
-        {"record", &Draws::record},    {"filter", &Draws::filter},    {"text", &Draws::text},
-        {"texts", &Draws::texts},      {"list", &Draws::list},        {"user", &Draws::user},
-        {"size", &Draws::size},        {"flag", &Draws::flag},        {"rare_flag", &Draws::rareFlag},
-        {"made", &Draws::untouched},   {"answer", &Draws::untouched},
+    typedef Json::Value Draw(Draws&);
+    static const std::map<std::string, Draw*> DRAWS = {
+        {"tid", [](Draws& draws) { return draws.tid(); }},
+        {"fresh", [](Draws& draws) { return Json::Value(draws.oneOf(g_rgTid)); }},
+        {"granted", [](Draws& draws) { return draws.granted(); }},
+        {"webapi", [](Draws& draws) { return draws.webapi(); }},
+        {"method", [](Draws& draws) { return draws.oneIn(10) ? Json::Value() : draws.oneOf(g_rgMethod); }},
+        {"uid", [](Draws& draws) { return Json::Value(draws.oneOf(g_rgUid)); }},
+        {"function", [](Draws& draws) { return Json::Value(draws.oneOf(g_rgPurpose)); }},
+        {"sid", [](Draws& draws) { return Json::Value(draws.oneOf(g_rgSession)); }},
+        {"sid_or_null",
+         [](Draws& draws) { return draws.oneIn(20) ? Json::Value() : draws.oneOf(g_rgSession); }},
+        {"name", [](Draws& draws) { return draws.oneIn(20) ? Json::Value() : draws.oneOf(g_rgName); }},
+        {"option", [](Draws& draws) { return draws.option(); }},
+        {"param", [](Draws& draws) { return draws.param(); }},
+        {"record", [](Draws& draws) { return draws.record(); }},
+        {"filter", [](Draws& draws) { return draws.filter(); }},
+        {"text",
+         [](Draws& draws) { return draws.oneIn(5) ? Json::Value("1") : draws.texts().get(0U, "-1"); }},
+        {"texts", [](Draws& draws) { return draws.texts(); }},
+        {"list", [](Draws& draws) { return draws.oneIn(12) ? draws.anything() : Json::arrayValue; }},
+        {"user", [](Draws& draws) { return draws.oneIn(8) ? Json::Value() : std::string(USER_SIZE, '?'); }},
+        {"size", [](Draws& draws) { return Json::Value(draws.oneOf(g_rgSize)); }},
+        {"flag", [](Draws& draws) { return Json::Value(draws.oneIn(2)); }},
+        {"rare_flag", [](Draws& draws) { return Json::Value(draws.oneIn(8)); }},
+        {"made", [](Draws&) { return Json::Value("untouched"); }},
+        {"answer", [](Draws&) { return Json::Value("untouched"); }},
     };
-    return (this->*DRAWS.at(strName))();
+    return DRAWS.at(strName)(*this);
 }
 
 Json::Value Draws::tid()
 {
-    return m_rows.empty() || oneIn(4) ? newTid() : row().columns[0];
-}
-
-Json::Value Draws::newTid()
-{
-    return oneOf(g_rgTid);
-}
-
-Json::Value Draws::uid()
-{
-    const unsigned int rgUid[] = {UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77, 4294967294, 4294967295};
-    return oneOf(rgUid);
-}
-
-Json::Value Draws::session()
-{
-    return oneOf(g_rgSession);
-}
-
-Json::Value Draws::purpose()
-{
-    return oneOf(g_rgPurpose);
-}
-
-Json::Value Draws::sessionOrNull()
-{
-    return oneIn(20) ? Json::Value() : session();
+    return m_rows.empty() || oneIn(4) ? Json::Value(oneOf(g_rgTid)) : row().columns[0];
 }
 
 Json::Value Draws::granted()
@@ -164,16 +160,6 @@ Json::Value Draws::webapi()
     return m_jAllow.isObject() && !m_jAllow.empty() ? oneOf(m_jAllow.getMemberNames())
            : oneIn(30)                              ? Json::Value()
                                                     : Json::Value(oneOf(g_rgWebapi));
-}
-
-Json::Value Draws::method()
-{
-    return oneIn(10) ? Json::Value() : Json::Value(oneOf(g_rgMethod));
-}
-
-Json::Value Draws::name()
-{
-    return oneIn(20) ? Json::Value() : Json::Value(oneOf(g_rgName));
 }
 
 Json::Value Draws::anything()
@@ -240,13 +226,13 @@ Json::Value Draws::field(const Field& field)
         return anything();
     }
     switch (fieldNumber(field.szName)) {
-    case 0: return newTid();
-    case 1: return session();
-    case 2: return oneIn(4) ? Json::Value(Json::Int64(1) << 32) : uid();
+    case 0: return oneOf(g_rgTid);
+    case 1: return oneOf(g_rgSession);
+    case 2: return oneIn(4) ? Json::Value(Json::Int64(1) << 32) : Json::Value(oneOf(g_rgUid));
     case 3: return deadline();
     case 4: return oneOf(g_jCount);
     case 5: return static_cast<Json::Int64>(worldClock());
-    case 6: return purpose();
+    case 6: return oneOf(g_rgPurpose);
     case 7: return allow();
     default: return extra();
     }
@@ -361,30 +347,9 @@ Json::Value Draws::texts()
 {
     Json::Value jTexts(Json::arrayValue);
     for (size_t i = oneIn(3) ? below(4) : 1; 0 < i; --i) {
-        jTexts.append(oneIn(3)   ? oneIn(2) ? session() : purpose()
-                        : oneIn(2) ? Json::Value(g_rgTid[below(3)])
+        jTexts.append(oneIn(3) ? oneIn(2) ? Json::Value(oneOf(g_rgSession)) : Json::Value(oneOf(g_rgPurpose))
+                      : oneIn(2) ? Json::Value(g_rgTid[below(3)])
                                  : tid());
     }
     return jTexts;
-}
-
-Json::Value Draws::text()
-{
-    return oneIn(5) ? Json::Value("1") : texts().get(0U, "-1");
-}
-
-Json::Value Draws::list()
-{
-    return oneIn(12) ? anything() : Json::Value(Json::arrayValue);
-}
-
-Json::Value Draws::user()
-{
-    return oneIn(8) ? Json::Value() : Json::Value(std::string(USER_SIZE, '?'));
-}
-
-Json::Value Draws::size()
-{
-    const Json::UInt rgSize[] = {0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE};
-    return oneOf(rgSize);
 }

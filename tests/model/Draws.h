@@ -33,27 +33,13 @@ public:
 
 private:
     Json::Value tid();
-    Json::Value newTid();
     Json::Value granted();
     Json::Value webapi();
-    Json::Value method();
-    Json::Value uid();
-    Json::Value session();
-    Json::Value sessionOrNull();
-    Json::Value purpose();
-    Json::Value name();
     Json::Value option();
     Json::Value param();
     Json::Value record();
     Json::Value filter();
-    Json::Value text();
     Json::Value texts();
-    Json::Value list();
-    Json::Value user();
-    Json::Value size();
-    Json::Value flag() { return oneIn(2); }
-    Json::Value rareFlag() { return oneIn(8); }
-    Json::Value untouched() { return "untouched"; }
     template <typename Values>
     auto oneOf(const Values& values)
     {

@@ -1,5 +1,6 @@
 #include "ModelRow.h"
 
+#include <cmath>
 #include <cstdio>
 #include <cstring>
 #include <memory>
@@ -27,6 +28,9 @@ std::string quoted(const std::string& strText)
 
 std::string realText(double dValue)
 {
+    if (!std::isfinite(dValue)) {
+        return std::isnan(dValue) ? "NaN" : 0 < dValue ? "Infinity" : "-Infinity";
+    }
     char szText[32];
     snprintf(szText, sizeof(szText), "%.17g", dValue);
     return strpbrk(szText, ".e") ? szText : std::string(szText) + ".0";
@@ -52,7 +56,11 @@ std::string objectText(const Json::Value& jObject)
 
 Json::Value parsed(const std::string& strText)
 {
-    static const std::unique_ptr<Json::CharReader> pReader(Json::CharReaderBuilder().newCharReader());
+    static const std::unique_ptr<Json::CharReader> pReader = [] {
+        Json::CharReaderBuilder builder;
+        builder["allowSpecialFloats"] = true;
+        return std::unique_ptr<Json::CharReader>(builder.newCharReader());
+    }();
     Json::Value jValue;
     pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, nullptr);
     return jValue;

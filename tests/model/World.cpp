@@ -4,7 +4,10 @@
 #include <sys/time.h>
 
 #include <cerrno>
+#include <cstdarg>
+#include <cstdio>
 #include <cstring>
+#include <initializer_list>
 
 #include "Interpose.h"
 
@@ -52,6 +55,19 @@ INTERPOSED int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size
     return 0;
 }
 
+INTERPOSED int getpwnam_r(const char* szName, struct passwd* pEntry, char*, size_t, struct passwd** ppEntry)
+{
+    *ppEntry = nullptr;
+    for (const uid_t uid : {UID_ROOT, UID_ANNA}) {
+        if (0 == strcmp(userName(uid), szName)) {
+            pEntry->pw_name = const_cast<char*>(szName);
+            pEntry->pw_uid = uid;
+            *ppEntry = pEntry;
+        }
+    }
+    return 0;
+}
+
 INTERPOSED int fsync(int)
 {
     return 0;
@@ -62,6 +78,14 @@ INTERPOSED int fdatasync(int)
     return 0;
 }
 
-INTERPOSED void syslog(int, const char*, ...) {}
+// Lines are written out and dropped.
+INTERPOSED void syslog(int, const char* szFormat, ...)
+{
+    char szLine[256];
+    va_list args;
+    va_start(args, szFormat);
+    vsnprintf(szLine, sizeof(szLine), szFormat, args);
+    va_end(args);
+}
 
 } // extern "C"

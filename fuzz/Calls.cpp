@@ -1,0 +1,287 @@
+// Calls of the library, each beside the model of it (tests/model): a line with an API, a line with a method
+// ("none": none is named), and JSON, which serves as a record, as the options of a creation, as a change and
+// as a filter.
+//
+// Strings in the place of numbers go into statements as they are, so a filter can hold any SQL; what must
+// hold for those is only that the process lives.
+
+#include <sqlite3.h>
+
+#include <algorithm>
+#include <map>
+#include <string>
+
+#include "Library.h"
+#include "Operations.h"
+#include "Table.h"
+
+namespace {
+
+const int STEPS_MAX = 20; // thousands of instructions of a statement
+const int LENGTH_MAX = 1 << 20;
+const char* const TOKENS[] = {
+    R"({"tid":"a","bind_sid":"","uid":0,"deadline":4102444800,"count":1,"create_time":1,"function":"f",)"
+    R"("webapi_allow":{},"extra":{}})",
+    R"({"tid":"b","bind_sid":"s","uid":1024,"deadline":-1,"count":-1,"create_time":0,"function":"a'b",)"
+    R"("webapi_allow":{"A":{"method":["get"]}},"extra":{"x":[1]}})",
+    R"({"tid":"ab","bind_sid":"s","uid":12,"deadline":9223372036854775807,"count":2,"create_time":1,)"
+    R"("function":"f","webapi_allow":{},"extra":{"y":null}})"};
+
+int g_nSteps = 0;
+
+// What a statement may not do, since it stands in a transaction and must stay alone.
+int isAllowed(void*, int nAction, const char*, const char*, const char*, const char*)
+{
+    return SQLITE_ATTACH == nAction || SQLITE_PRAGMA == nAction || SQLITE_TRANSACTION == nAction ||
+                   SQLITE_SAVEPOINT == nAction
+               ? SQLITE_DENY
+               : SQLITE_OK;
+}
+
+int isTooLong(void*)
+{
+    return ++g_nSteps > STEPS_MAX;
+}
+
+sqlite3* database()
+{
+    static sqlite3* const pDb = fuzz::openStore();
+    return pDb;
+}
+
+// Over that one connection, and so within one transaction. Stays until the process ends.
+Library& library()
+{
+    static Library& theLibrary = [&]() -> Library& {
+        fuzz::offer(database());
+        Library& made = *new Library;
+        fuzz::offer(database());
+        FUZZ_REQUIRE(0 == made.store.createTable());
+        return made;
+    }();
+    return theLibrary;
+}
+
+Model& model()
+{
+    static Model theModel;
+    return theModel;
+}
+
+void requireSameTable()
+{
+    static const Table table(database());
+    const std::string strDifference = table.differenceFrom(model().store.rows());
+    if (!strDifference.empty()) {
+        dprintf(STDERR_FILENO, "%s\n", strDifference.c_str());
+    }
+    FUZZ_REQUIRE(strDifference.empty());
+}
+
+// Runs an operation on the library and on the model, which must agree. Returns the arguments as they are
+// afterwards.
+Json::Value both(const std::string& strOperation, const Json::Value& jCall)
+{
+    const auto pOperation = std::find_if(operations().begin(), operations().end(),
+                                         [&](const Operation& each) { return each.szName == strOperation; });
+    g_nSteps = 0;
+    const Outcome ours = pOperation->run(library(), jCall);
+    const Outcome expected = pOperation->run(model(), jCall);
+    const std::string strOurs = fuzz::text(ours.jCall);
+    const std::string strExpected = fuzz::text(expected.jCall);
+    const bool blSame =
+        ours.nResult == expected.nResult && ours.strThrown == expected.strThrown && strOurs == strExpected;
+    if (!blSame) {
+        dprintf(STDERR_FILENO, "%s gives %d %s %s instead of %d %s %s\n", pOperation->szName, ours.nResult,
+                ours.strThrown.c_str(), strOurs.c_str(), expected.nResult, expected.strThrown.c_str(),
+                strExpected.c_str());
+    }
+    FUZZ_REQUIRE(blSame);
+    requireSameTable();
+    return ours.jCall;
+}
+
+typedef std::map<std::string, Json::Value> Arguments;
+
+Json::Value call(const Arguments& arguments)
+{
+    Json::Value jCall(Json::objectValue);
+    for (const auto& [strName, jArgument] : arguments) {
+        jCall[strName] = jArgument;
+    }
+    return jCall;
+}
+
+void run(const char* szSql)
+{
+    FUZZ_REQUIRE(SQLITE_OK == sqlite3_exec(database(), szSql, nullptr, nullptr, nullptr));
+}
+
+// Makes a check in a transaction, which is undone.
+template <typename Check>
+void undone(Check check)
+{
+    const ModelStore before = model().store;
+    run("BEGIN");
+    g_nSteps = 0;
+    check();
+    sqlite3_set_authorizer(database(), nullptr, nullptr);
+    g_nSteps = 0;
+    if (!sqlite3_get_autocommit(database())) { // what took too long has been undone
+        run("ROLLBACK");
+    }
+    model().store = before;
+    requireSameTable();
+}
+
+// Text is read as what it was written from, and written the same again.
+void checkText(const Json::Value& jValue)
+{
+    const std::string strText = fuzz::text(jValue);
+    const Json::Value jRead = fuzz::json(strText);
+    FUZZ_REQUIRE(fuzz::text(jRead) == strText);
+    FUZZ_REQUIRE(jRead == jValue || std::string::npos != strText.find("NaN"));
+}
+
+void checkRecord(const Json::Value& jValue, const Json::Value& jApi, const Json::Value& jMethod)
+{
+    const std::string strTid = fuzz::tid("t");
+    both("checkJsonType", call({{"record", jValue}}));
+    both("checkPermission", call({{"record", jValue}, {"webapi", jApi}, {"method", jMethod}}));
+    both("fillDefaultValue", call({{"record", jValue}, {"flag", true}}));
+    Json::Value jRecord = both("fillDefaultValue", call({{"record", jValue}, {"flag", false}}))["record"];
+    for (const bool blCreate : {true, true, false}) {
+        both("tokenSave of the store", call({{"record", jRecord}, {"flag", blCreate}}));
+    }
+    if (jRecord.isObject()) {
+        jRecord["tid"] = strTid;
+        both("tokenSaveByOverwrite", call({{"record", jRecord}}));
+        both("tokenGrant",
+             call({{"granted", strTid}, {"webapi", jApi}, {"method", jMethod}, {"answer", ""}}));
+    }
+    both("tokenDeleteByTid", call({{"tid", strTid}}));
+    both("tokenCreateByTid",
+         call({{"uid", 7U}, {"function", "fuzz"}, {"option", jValue}, {"fresh", strTid}}));
+    both("tokenUpdateByTid", call({{"tid", strTid}, {"param", jValue}}));
+    both("tokenGetByTid", call({{"tid", strTid}, {"answer", ""}}));
+}
+
+// The filter's values for fields: one for each, or a list.
+template <typename Predicate>
+bool isAnyField(const Json::Value& jFilter, Predicate predicate)
+{
+    return std::any_of(FIELDS.begin(), FIELDS.end(), [&](const Field& field) {
+        return jFilter.isMember(field.szName) && predicate(field.kind, jFilter[field.szName]);
+    });
+}
+
+// Whether the filter does what it says: one value for each field, of the field's kind, and no paging.
+bool isPlain(const Json::Value& jFilter)
+{
+    return !jFilter.isMember("sort_by") && !jFilter.isMember("limit") &&
+           !isAnyField(jFilter, [](Kind kind, const Json::Value& jValues) {
+               const Json::Value& jValue = jValues.isArray() && jValues.size() == 1 ? jValues[0U] : jValues;
+               return Kind::Number == kind ? !jValue.isIntegral() && !jValue.isBool()
+                                           : jValue.isArray() || jValue.isObject();
+           });
+}
+
+// Whether a string in the place of a number makes the filter any SQL.
+bool isSql(const Json::Value& jFilter)
+{
+    const auto isString = [](const Json::Value& jElement) { return jElement.isString(); };
+    return isAnyField(jFilter, [&](Kind kind, const Json::Value& jValue) {
+        return Kind::Number == kind &&
+               (jValue.isString() ||
+                (jValue.isArray() && std::any_of(jValue.begin(), jValue.end(), isString)));
+    });
+}
+
+// The condition is appended, and is one that cannot end the statement.
+void checkCondition(Json::Value jFilter, bool blAnd)
+{
+    const std::string strStart = "SELECT 1 FROM token WHERE 1 and";
+    std::string strSql = strStart;
+    int nResult = -1;
+    fuzz::throwsLogicError([&] { nResult = library().store.SqlWhereFromJson(jFilter, strSql, blAnd); });
+    FUZZ_REQUIRE(-1 <= nResult && nResult <= 1);
+    FUZZ_REQUIRE(0 == strSql.compare(0, strStart.size(), strStart));
+    const bool blFields = isAnyField(jFilter, [](Kind, const Json::Value&) { return true; });
+    FUZZ_REQUIRE(1 != nResult || !blFields);
+    if (0 == nResult && isPlain(jFilter)) {
+        sqlite3_stmt* pStatement = nullptr;
+        const char* szTail = nullptr;
+        FUZZ_REQUIRE(SQLITE_OK == sqlite3_prepare_v2(database(), strSql.c_str(), -1, &pStatement, &szTail));
+        FUZZ_REQUIRE(szTail == strSql.c_str() + strSql.size());
+        sqlite3_finalize(pStatement);
+    }
+}
+
+// As a plain filter, it selects and deletes what the model does.
+void checkPlainFilter(const Json::Value& jFilter)
+{
+    both("tokenGet of the store", call({{"filter", jFilter}, {"list", Json::arrayValue}}));
+    for (const bool blAll : {false, true}) {
+        both("tokenDelete of the store", call({{"filter", jFilter}, {"rare_flag", blAll}}));
+    }
+}
+
+// As any other, it gives one of the results that the headers name, and deletes as many as it says.
+void checkOddFilter(Json::Value jFilter)
+{
+    AccessTokenDbApi& db = library().store;
+    sqlite3_set_authorizer(database(), isAllowed, nullptr);
+    Json::Value jFound(Json::arrayValue);
+    fuzz::throwsLogicError([&] {
+        const int nResult = db.tokenGet(jFilter, jFound);
+        FUZZ_REQUIRE(0 == nResult || -1 == nResult);
+    });
+    g_nSteps = 0;
+    int nDeleted = -1;
+    fuzz::throwsLogicError([&] { nDeleted = db.tokenDelete(jFilter, false); });
+    FUZZ_REQUIRE(-1 <= nDeleted);
+    if (!isSql(jFilter)) { // or there may be no table any more
+        FUZZ_REQUIRE(static_cast<int>(std::size(TOKENS) - fuzz::tokens(db).size()) == std::max(nDeleted, 0));
+    }
+}
+
+void prepare()
+{
+    static bool blPrepared = false;
+    if (!blPrepared) {
+        library();
+        for (const char* szToken : TOKENS) {
+            both("tokenSave of the store", call({{"record", fuzz::json(szToken)}, {"flag", true}}));
+        }
+        sqlite3_progress_handler(database(), 1000, isTooLong, nullptr);
+        sqlite3_limit(database(), SQLITE_LIMIT_LENGTH, LENGTH_MAX);
+        blPrepared = true;
+    }
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
+{
+    const fuzz::Confinement confinement;
+    prepare();
+    std::string_view strRest = fuzz::viewOf(pData, cbData);
+    const Json::Value jApi = fuzz::takeLine(strRest);
+    const std::string strMethod = fuzz::takeLine(strRest);
+    const Json::Value jMethod = strMethod == "none" ? Json::Value() : Json::Value(strMethod);
+    const Json::Value jValue = fuzz::json(strRest);
+    checkText(jValue);
+    undone([&] { checkRecord(jValue, jApi, jMethod); });
+    undone([&] {
+        if (jValue.isObject()) {
+            checkCondition(jValue, true);
+            checkCondition(jValue, false);
+        }
+        if (!jValue.isObject() || isPlain(jValue)) {
+            checkPlainFilter(jValue);
+        } else {
+            checkOddFilter(jValue);
+        }
+    });
+    return 0;
+}
