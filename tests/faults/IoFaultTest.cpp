@@ -5,7 +5,6 @@
 #include <cstring>
 
 #include "FaultyVfs.h"
-#include "Figures.h"
 #include "Oracle.h"
 
 namespace {
@@ -54,49 +53,26 @@ struct Injection {
     }
 };
 
-struct Case {
-    const char* szName;
-    Fault fault;
-};
-
-// For the messages of GoogleTest.
-void PrintTo(const Case& testCase, std::ostream* pStream)
-{
-    *pStream << testCase.szName;
-}
-
-class IoFault : public ::testing::TestWithParam<Case> {};
+class IoFault : public ::testing::TestWithParam<std::pair<std::string, Fault>> {};
 
 } // namespace
 
 TEST_P(IoFault, LeavesAStateThatTheCallerKnows)
 {
-    TokenStore store;
+    const auto& [strName, fault] = GetParam();
     Injection injection;
-    int64_t nInjected = 0;
-
-    for (const Operation& operation : operations()) {
-        SCOPED_TRACE(operation.szName);
-        const Oracle oracle(store, operation);
-        const FaultyVfs vfs(
-            [&](const FileCall& call, const std::function<int()>& real) { return injection(call, real); });
-        const auto judge = [&](int64_t nFirst, int64_t nLast) {
-            const std::string strWrong = oracle.judge(
-                [&] {
-                    injection = {GetParam().fault, nFirst, nLast, 0};
-                },
-                [&] { injection.nLast = 0; });
-            ++nInjected;
-            EXPECT_EQ("", strWrong) << "call " << nFirst << " to " << nLast;
-        };
-        failEach(judge, [&] { return injection.nCalls; });
-    }
-    figure("I/O faults",
-           std::string(GetParam().szName) + ": " + std::to_string(nInjected) + " runs of 12 operations");
+    const FaultyVfs vfs(
+        [&](const FileCall& call, const std::function<int()>& real) { return injection(call, real); });
+    Injector injector;
+    injector.arm = [&, kind = fault](int64_t nFirst, int64_t nLast) { injection = {kind, nFirst, nLast, 0}; };
+    injector.disarm = [&] { injection.nLast = 0; };
+    injector.calls = [&] { return injection.nCalls; };
+    failEachOfAll("I/O faults", strName, injector);
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, IoFault,
-                         ::testing::Values(Case{"Error", Fault::Error}, Case{"FullDisk", Fault::FullDisk},
-                                           Case{"TornWrite", Fault::TornWrite},
-                                           Case{"Locked", Fault::Locked}),
-                         [](const auto& instance) { return instance.param.szName; });
+                         ::testing::Values(std::pair("Error", Fault::Error),
+                                           std::pair("FullDisk", Fault::FullDisk),
+                                           std::pair("TornWrite", Fault::TornWrite),
+                                           std::pair("Locked", Fault::Locked)),
+                         [](const auto& instance) { return instance.param.first; });

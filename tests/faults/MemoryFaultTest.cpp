@@ -21,38 +21,36 @@ bool g_blCrossedSqlite = false;
 
 class MemoryFault : public ::testing::TestWithParam<size_t> {};
 
-void inThisThread(const std::function<void()>& judge)
+// Judges each run by itself, in this thread or in one of its own, which finds nothing that the library keeps
+// for a thread.
+void failEachAllocation(const Operation& operation, bool blOwnThread = false)
 {
-    judge();
-}
-
-// Finds nothing that the library keeps for a thread.
-void inThreadOfItsOwn(const std::function<void()>& judge)
-{
-    std::thread(judge).join();
-}
-
-void failEachAllocation(const Operation& operation, void (*run)(const std::function<void()>& judge))
-{
-    TokenStore store;
-    getpwuid(NOBODY_KNOWN); // has every user database loaded, which stays
-    const Oracle oracle(store, operation);
-    std::string strWrong;
+    const TokenStore store;
+    getpwuid(NOBODY_KNOWN);     // has every user database loaded, which stays
     int64_t cbHeld = INT64_MAX; // after an undisturbed run
-    const auto judge = [&](int64_t nFirst, int64_t nLast) {
-        run([&] { strWrong = oracle.judge([&] { Heap::failFrom(nFirst, nLast); }, &Heap::failNone); });
-        EXPECT_EQ("", strWrong) << "allocation " << nFirst << " to " << nLast;
-        EXPECT_FALSE(g_blCrossedSqlite) << "allocation " << nFirst << " to " << nLast;
-        // Less, when something that was kept has been given up.
-        EXPECT_GE(cbHeld, Heap::liveBytes()) << "allocation " << nFirst << " to " << nLast;
-        if (0 == nFirst && INT64_MAX != cbHeld) {
-            EXPECT_EQ(cbHeld, Heap::liveBytes());
+    bool blDisturbed = false;
+    Injector injector;
+    injector.arm = [&](int64_t nFirst, int64_t nLast) {
+        blDisturbed = 0 != nFirst;
+        Heap::failFrom(nFirst, nLast);
+    };
+    injector.disarm = &Heap::failNone;
+    injector.calls = &Heap::allocations;
+    injector.run = [&](const std::function<void()>& judge) {
+        if (blOwnThread) {
+            std::thread(judge).join();
+        } else {
+            judge();
+        }
+        EXPECT_FALSE(g_blCrossedSqlite);
+        const int64_t cbLive = Heap::liveBytes();
+        cbHeld = INT64_MAX == cbHeld ? cbLive : cbHeld;
+        EXPECT_GE(cbHeld, cbLive); // less, when something that was kept has been given up
+        if (!blDisturbed) {
+            EXPECT_EQ(cbHeld, cbLive);
         }
     };
-    const int64_t nAllocations = failEach(judge, [&] {
-        cbHeld = Heap::liveBytes();
-        return Heap::allocations();
-    });
+    const int64_t nAllocations = failEach(store, operation, injector);
     figure("memory faults",
            std::string(operation.szName) + ": " + std::to_string(nAllocations) + " allocations");
 }
@@ -73,12 +71,12 @@ extern "C" int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(voi
 
 TEST_P(MemoryFault, LeavesNothingBehind)
 {
-    failEachAllocation(operations()[GetParam()], &inThisThread);
+    failEachAllocation(operations()[GetParam()]);
 }
 
 TEST(MemoryFaultInAFreshThread, LeavesNothingBehind)
 {
-    failEachAllocation(operations()[3], &inThreadOfItsOwn); // which reads and writes JSON
+    failEachAllocation(operations()[3], true); // which reads and writes JSON
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, MemoryFault, ::testing::Range<size_t>(0, operations().size()),

@@ -1,5 +1,6 @@
 #include "Oracle.h"
 
+#include <gtest/gtest.h>
 #include <sqlite3.h>
 #include <unistd.h>
 
@@ -11,6 +12,7 @@
 #include <stdexcept>
 
 #include "AccessTokenApi.h"
+#include "Figures.h"
 #include "ProcessState.h"
 
 namespace {
@@ -106,15 +108,33 @@ std::string Oracle::judge(const std::function<void()>& arm, const std::function<
     return strWrong.empty() ? "" : strWrong + "log: " + std::string(Log::text()).substr(0, 2000);
 }
 
-int64_t failEach(const std::function<void(int64_t nFirst, int64_t nLast)>& judge,
-                 const std::function<int64_t()>& calls)
+int64_t failEach(const TokenStore& store, const Operation& operation, const Injector& injector)
 {
+    SCOPED_TRACE(operation.szName);
+    const Oracle oracle(store, operation);
+    const auto judge = [&](int64_t nFirst, int64_t nLast) {
+        std::string strWrong;
+        injector.run([&] {
+            strWrong = oracle.judge([&] { injector.arm(nFirst, nLast); }, injector.disarm, injector.uidAfter);
+        });
+        EXPECT_EQ("", strWrong) << "call " << nFirst << " to " << nLast;
+    };
     judge(0, -1);
-    const int64_t nCalls = calls();
+    const int64_t nCalls = injector.calls();
     for (int64_t nCall = 1; nCall <= nCalls; ++nCall) {
         judge(nCall, nCall);
         judge(nCall, INT64_MAX);
     }
     judge(0, -1);
     return nCalls;
+}
+
+void failEachOfAll(const std::string& strKind, const std::string& strName, const Injector& injector)
+{
+    const TokenStore store;
+    int64_t nRuns = 0;
+    for (const Operation& operation : operations()) {
+        nRuns += 2 * failEach(store, operation, injector) + 2;
+    }
+    figure(strKind, strName + ": " + std::to_string(nRuns) + " runs of 12 operations");
 }

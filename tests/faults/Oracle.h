@@ -52,10 +52,21 @@ private:
     int m_nResult;
 };
 
+// What lets calls fail: those from nFirst to nLast of a run.
+struct Injector {
+    std::function<void(int64_t nFirst, int64_t nLast)> arm;
+    std::function<void()> disarm;
+    std::function<int64_t()> calls; // of the last run
+    std::function<uid_t()> uidAfter = [] { return UID_CALLER; };
+    // Runs and judges; for more than that.
+    std::function<void(const std::function<void()>& judge)> run = [](const auto& judge) { judge(); };
+};
+
 // Judges an operation undisturbed, then with each of the calls failing that it made, that one alone and all
-// from that one on, and undisturbed again. Returns how many calls there were, which is what calls tells after
-// a run.
-int64_t failEach(const std::function<void(int64_t nFirst, int64_t nLast)>& judge,
-                 const std::function<int64_t()>& calls);
+// from that one on, and undisturbed again. Returns how many calls there were.
+int64_t failEach(const TokenStore& store, const Operation& operation, const Injector& injector);
+
+// Does so with all operations, and prints how many runs there were.
+void failEachOfAll(const std::string& strKind, const std::string& strName, const Injector& injector);
 
 #endif

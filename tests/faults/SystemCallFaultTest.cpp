@@ -10,7 +10,6 @@
 #include <cstdarg>
 #include <cstring>
 
-#include "Figures.h"
 #include "Interpose.h"
 #include "Oracle.h"
 
@@ -86,33 +85,16 @@ OPEN(open64)
 
 TEST_P(SystemCallFault, LeavesAStateThatTheCallerKnows)
 {
-    TokenStore store;
-    int64_t nInjected = 0;
-
-    for (const Operation& operation : operations()) {
-        SCOPED_TRACE(operation.szName);
-        const Oracle oracle(store, operation);
-        bool blUidLost = false;
-        const auto judge = [&](int64_t nFirst, int64_t nLast) {
-            const std::string strWrong = oracle.judge(
-                [&] {
-                    g_injection = {};
-                    g_injection.nFirst = nFirst;
-                    g_injection.nLast = nLast;
-                    g_injection.szFunction = GetParam();
-                },
-                [&] {
-                    g_injection.szFunction = "";
-                    blUidLost = g_injection.blUidLost;
-                },
-                [&] { return blUidLost ? 0 : UID_CALLER; });
-            EXPECT_EQ("", strWrong) << "call " << nFirst << " to " << nLast;
-            ++nInjected;
-        };
-        failEach(judge, [] { return g_injection.nCalls; });
-    }
-    figure("system calls",
-           std::string(GetParam()) + ": " + std::to_string(nInjected) + " runs of 12 operations");
+    bool blUidLost = false;
+    Injector injector;
+    injector.arm = [&](int64_t nFirst, int64_t nLast) { g_injection = {GetParam(), nFirst, nLast}; };
+    injector.disarm = [&] {
+        g_injection.szFunction = "";
+        blUidLost = g_injection.blUidLost;
+    };
+    injector.calls = [] { return g_injection.nCalls; };
+    injector.uidAfter = [&] { return blUidLost ? 0 : UID_CALLER; };
+    failEachOfAll("system calls", GetParam(), injector);
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, SystemCallFault,

@@ -79,6 +79,21 @@ const unsigned int g_rgUid[] = {UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77
 
 const Json::UInt g_rgSize[] = {0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE};
 
+// Of a clock that was not set, or is days wrong; around the end of 32 bits; and where SQLite's dates end.
+const time_t DAY = 86400;
+const time_t g_rgWrongTime[] = {-DAY - 1,
+                                -1,
+                                0,
+                                1700000000 - 1000 * DAY,
+                                1700000000 + 1000 * DAY,
+                                INT32_MAX,
+                                INT32_MAX + time_t(1),
+                                UINT32_MAX,
+                                UINT32_MAX + time_t(1),
+                                YEAR_10000 - DAY - 2,
+                                YEAR_10000 - 1,
+                                YEAR_10000};
+
 const char* const g_rgName[] = {"tid",   "tid",   "bind_sid", "function", "function", "uid",
                                 "count", "extra", "limit",    "sort_by",  "no_field", ""};
 
@@ -100,9 +115,16 @@ const Json::Value g_jPosition =
 
 } // namespace
 
-time_t Draws::step()
+void Draws::moveClock()
 {
-    return oneIn(3000) ? 100000 : oneIn(100) ? 500 : oneIn(4) ? static_cast<time_t>(below(4)) : 0;
+    if (oneIn(m_usualTime ? 10 : 1000)) {
+        const time_t wrong = oneOf(g_rgWrongTime);
+        const time_t now = worldClock();
+        worldClock() = m_usualTime.value_or(wrong);
+        m_usualTime = m_usualTime ? std::nullopt : std::optional<time_t>(now);
+        return;
+    }
+    worldClock() += oneIn(3000) ? 100000 : oneIn(100) ? 500 : oneIn(4) ? static_cast<time_t>(below(4)) : 0;
 }
 
 Json::Value Draws::argument(const std::string& strName)

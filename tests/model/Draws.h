@@ -4,6 +4,7 @@
 #define TESTS_DRAWS_H
 
 #include <cstdint>
+#include <optional>
 #include <random>
 #include <string>
 #include <vector>
@@ -17,7 +18,9 @@ public:
 
     size_t below(size_t nLimit) { return static_cast<size_t>(m_source() % nLimit); }
     bool oneIn(size_t nTimes) { return 0 == below(nTimes); }
-    time_t step(); // how far the clock moves on
+
+    // Now and then ahead, and rarely to a time that is quite wrong, for some ten operations.
+    void moveClock();
 
     // The argument of that name:
     //   tid, fresh     ids that a row has, mostly; that no row has, mostly
@@ -61,7 +64,8 @@ private:
 
     std::mt19937_64 m_source;
     const std::vector<Row>& m_rows;
-    Json::Value m_jAllow; // of the id that was drawn last for a grant
+    std::optional<time_t> m_usualTime; // while the clock is wrong
+    Json::Value m_jAllow;              // of the id that was drawn last for a grant
 };
 
 #endif

@@ -83,6 +83,8 @@ int ModelStore::tokenDelete(Json::Value& jFilter, bool blAll)
 
 int ModelStore::cleanExpireToken(bool)
 {
-    removeIf(m_rows, [](const Row& row) { return row.jRecord["deadline"].asInt64() < worldClock(); });
+    if (worldClock() < YEAR_10000) { // then there is no date to compare with
+        removeIf(m_rows, [](const Row& row) { return row.jRecord["deadline"].asInt64() < worldClock(); });
+    }
     return 0;
 }

@@ -69,7 +69,7 @@ protected:
     // Draws an operation and runs it on both; a fatal failure when they do not agree.
     void runOne()
     {
-        worldClock() += m_draws.step();
+        m_draws.moveClock();
         const size_t nOperation = drawOperation();
         const Operation& operation = operations()[nOperation];
         Json::Value jCall(Json::objectValue);

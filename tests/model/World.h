@@ -11,6 +11,8 @@
 // In seconds since the epoch, and to be set.
 time_t& worldClock();
 
+const time_t YEAR_10000 = 253402300800; // SQLite has no dates from then on
+
 // The user's name; null when there is no such user, or the look-up fails.
 const char* userName(uid_t uid);
 
