@@ -15,8 +15,6 @@ public:
     Bystander& operator=(const Bystander&) = delete;
 
 private:
-    [[noreturn]] static void holdAndExit(int nEnd) noexcept;
-
     int m_rgnEnd[2];
     pid_t m_pid;
 };

@@ -23,7 +23,6 @@
 
 #include <benchmark/benchmark.h>
 #include <fcntl.h>
-#include <sqlite3.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -34,8 +33,6 @@
 #include <memory>
 #include <numeric>
 #include <string>
-#include <string_view>
-#include <utility>
 
 #include "AccessTokenApi.h"
 #include "Bystander.h"
@@ -43,6 +40,7 @@
 #include "Run.h"
 #include "Samples.h"
 #include "Store.h"
+#include "Turns.h"
 #include "vemo-access-token.h"
 
 namespace {
@@ -52,12 +50,12 @@ const int GRANTS = 300;
 
 // What is measured of a grant: the microseconds of its steps, and the numbers of system calls.
 enum Quantity {
+    Library = LIBRARY,
     Open,
     Purge,
     Select,
     Save,
     Close,
-    Library,
     Total,
     Opens,
     Closes,
@@ -72,8 +70,8 @@ enum Quantity {
 };
 
 const char* const g_rgszName[QUANTITIES] = {
-    "open_us", "purge_us", "select_us", "save_us", "close_us", "library_us", "total_us", "opens",
-    "closes",  "reads",    "writes",    "syncs",   "locks",    "unlinks",    "stats",    "others",
+    "library_us", "open_us", "purge_us", "select_us", "save_us", "close_us", "total_us", "opens",
+    "closes",     "reads",   "writes",   "syncs",     "locks",   "unlinks",  "stats",    "others",
 };
 
 typedef std::array<double, QUANTITIES> Breakdown;
@@ -82,51 +80,7 @@ typedef std::chrono::steady_clock Clock;
 // The grant that is being measured.
 bool g_blMeasuring = false;
 Breakdown g_breakdown;
-Quantity g_step = Library;
-Clock::time_point g_stepStart;
-
-// Ends the present step, which is returned, and begins another.
-Quantity enter(Quantity step)
-{
-    const Clock::time_point now = Clock::now();
-    g_breakdown[g_step] += std::chrono::duration<double, std::micro>(now - g_stepStart).count();
-    g_stepStart = now;
-    return std::exchange(g_step, step);
-}
-
-// A step that lasts as long as the object, and interrupts the one around it.
-class Step {
-public:
-    explicit Step(Quantity step) : m_outer(enter(step)) {}
-    ~Step() { enter(m_outer); }
-    Step(const Step&) = delete;
-    Step& operator=(const Step&) = delete;
-
-private:
-    const Quantity m_outer;
-};
-
-Quantity stepOf(std::string_view strSql)
-{
-    switch (strSql.front()) {
-    case 'D': return Purge;
-    case 'S': return Select;
-    case 'R': return Save;
-    default: return Library;
-    }
-}
-
-struct RowCallback {
-    int (*callback)(void*, int, char**, char**);
-    void* arg;
-};
-
-int runRowCallback(void* pRowCallback, int nColumns, char** rgszValue, char** rgszName)
-{
-    const RowCallback& row = *static_cast<RowCallback*>(pRowCallback);
-    const Step step(Library);
-    return row.callback(row.arg, nColumns, rgszValue, rgszName);
-}
+Clock::time_point g_turnStart;
 
 void count(Quantity call)
 {
@@ -137,6 +91,26 @@ void count(Quantity call)
 
 } // namespace
 
+int turnOf(const char* szWhat)
+{
+    switch (szWhat[0]) {
+    case 'o': return Open;
+    case 'c': return Close;
+    case 'D': return Purge;
+    case 'S': return Select;
+    case 'R': return Save;
+    default: return Library;
+    }
+}
+
+void endTurn(int nTurn)
+{
+    const Clock::time_point now = Clock::now();
+    g_breakdown[static_cast<size_t>(nTurn)] +=
+        std::chrono::duration<double, std::micro>(now - g_turnStart).count();
+    g_turnStart = now;
+}
+
 // Defines a function that counts its calls.
 #define COUNTED(call, result, name, parameters, arguments)                                                   \
     INTERPOSED result name parameters                                                                        \
@@ -146,29 +120,6 @@ void count(Quantity call)
     }
 
 extern "C" {
-
-INTERPOSED int sqlite3_open(const char* szPath, sqlite3** ppDb)
-{
-    const Step step(Open);
-    return NEXT(sqlite3_open)(szPath, ppDb);
-}
-
-INTERPOSED int sqlite3_close(sqlite3* pDb)
-{
-    const Step step(Close);
-    return NEXT(sqlite3_close)(pDb);
-}
-
-INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(void*, int, char**, char**),
-                            void* arg, char** pszErr)
-{
-    if (Library != g_step) { // SQLite reads the schema in the middle of a statement
-        return NEXT(sqlite3_exec)(pDb, szSql, callback, arg, pszErr);
-    }
-    RowCallback row = {callback, arg};
-    const Step step(stepOf(szSql));
-    return NEXT(sqlite3_exec)(pDb, szSql, callback ? runRowCallback : nullptr, &row, pszErr);
-}
 
 INTERPOSED int open64(const char* szPath, int nFlags, ...)
 {
@@ -242,11 +193,11 @@ bool grant(AccessTokenApi* pHeld, std::string& strTid)
 bool measuredGrant(AccessTokenApi* pHeld, std::string& strTid)
 {
     g_breakdown.fill(0);
-    g_stepStart = Clock::now();
+    g_turnStart = Clock::now();
     g_blMeasuring = true;
     const bool blGranted = grant(pHeld, strTid);
     g_blMeasuring = false;
-    enter(Library);
+    endTurn(Library);
     g_breakdown[Total] = std::accumulate(g_breakdown.begin(), g_breakdown.begin() + Total, 0.0);
     return blGranted && 0 < g_breakdown[Save];
 }

@@ -20,76 +20,30 @@
 #include "Interpose.h"
 #include "Operations.h"
 #include "Store.h"
+#include "Turns.h"
 
 namespace {
 
-const char OWN[] = "own";          // the library, with all that it calls but for the two below
-const char SQLITE[] = "sqlite";    // opening, statements and closing
-const char STANDIN[] = "stand-in"; // what stands in for the system here, and is no part of any count
+enum { SQLITE = LIBRARY + 1, STANDIN };
+const char* const NAMES[] = {"own", "sqlite", "stand-in"}; // the last is no part of any count
 
-const char* g_szRunning = OWN;
 bool g_blCounting = false;
-
-void passTo(const char* szNext)
-{
-    if (g_blCounting) {
-        CALLGRIND_DUMP_STATS_AT(g_szRunning);
-    }
-    g_szRunning = szNext;
-}
-
-// Until the end of the scope someone else is running.
-class Turn {
-public:
-    explicit Turn(const char* szWho) : m_szBefore(g_szRunning) { passTo(szWho); }
-    ~Turn() { passTo(m_szBefore); }
-    Turn(const Turn&) = delete;
-    Turn& operator=(const Turn&) = delete;
-
-private:
-    const char* const m_szBefore;
-};
-
-typedef int RowCallback(void*, int, char**, char**);
-
-struct RowReceiver {
-    RowCallback* callback;
-    void* pArgument;
-};
-
-int receiveRow(void* pReceiver, int nColumns, char** rgszValue, char** rgszName)
-{
-    const Turn turn(OWN);
-    const RowReceiver& receiver = *static_cast<RowReceiver*>(pReceiver);
-    return receiver.callback(receiver.pArgument, nColumns, rgszValue, rgszName);
-}
 
 } // namespace
 
+int turnOf(const char*)
+{
+    return SQLITE;
+}
+
+void endTurn(int nTurn)
+{
+    if (g_blCounting) {
+        CALLGRIND_DUMP_STATS_AT(NAMES[nTurn]);
+    }
+}
+
 extern "C" {
-
-INTERPOSED int sqlite3_open(const char* szPath, sqlite3** ppDb)
-{
-    const Turn turn(SQLITE);
-    return NEXT(sqlite3_open)(szPath, ppDb);
-}
-
-INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql, RowCallback* callback, void* pArgument,
-                            char** pszError)
-{
-    // SQLite reads the schema through this function too, with a callback of its own.
-    const bool blOurs = OWN == g_szRunning && callback;
-    RowReceiver receiver = {callback, pArgument};
-    const Turn turn(SQLITE);
-    return blOurs ? NEXT(sqlite3_exec)(pDb, szSql, receiveRow, &receiver, pszError)
-                  : NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
-}
-
-INTERPOSED int sqlite3_close(sqlite3* pDb)
-{
-    const Turn turn(SQLITE);
-    return NEXT(sqlite3_close)(pDb);
-}
 
 // The redirection (examples/redirect.cpp) follows these three.
 
