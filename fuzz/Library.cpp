@@ -31,16 +31,6 @@ std::string text(const Json::Value& jValue)
     return VEMO_ACCESS_TOKEN::toString(jValue);
 }
 
-const std::vector<std::string>& fields()
-{
-    static const std::vector<std::string> strFields = {
-#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) #name,
-#include "internal/vemo-access-token-data-member"
-#undef VEMO_ATOKEN_DATA_MEMBER
-    };
-    return strFields;
-}
-
 std::string tid(const std::string& strStart)
 {
     return strStart + std::string(VEMO_ATOKEN_LENGTH_MIN - strStart.size(), 'f');

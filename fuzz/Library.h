@@ -27,9 +27,6 @@ std::string takeLine(std::string_view& strRest);
 Json::Value json(std::string_view strText);
 std::string text(const Json::Value& jValue);
 
-// The fields of a token, in their order.
-const std::vector<std::string>& fields();
-
 // An id of 127 characters that begins so.
 std::string tid(const std::string& strStart);
 

@@ -11,6 +11,7 @@
 
 #include "AccessTokenApi.h"
 #include "Library.h"
+#include "ModelRow.h"
 #include "internal/AccessTokenDbApi.h"
 
 namespace {
@@ -65,12 +66,12 @@ sqlite3* hostile(std::string_view strInput)
 
 // The texts of the rows, by SQLite alone: up to a first NUL; nothing for a NULL, and where the table has a
 // field's name in other letters. No rows if they cannot be read to the end.
-typedef std::vector<std::optional<std::string>> Row;
-std::optional<std::vector<Row>> rowsOf(sqlite3* pDb)
+typedef std::vector<std::optional<std::string>> Texts;
+std::optional<std::vector<Texts>> rowsOf(sqlite3* pDb)
 {
     const std::string strSql =
         "SELECT tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra FROM token ;";
-    std::vector<Row> rows;
+    std::vector<Texts> rows;
     sqlite3_stmt* pStatement = nullptr;
     g_nSteps = 0;
     if (SQLITE_OK != sqlite3_prepare_v2(pDb, strSql.c_str(), -1, &pStatement, nullptr)) {
@@ -81,37 +82,36 @@ std::optional<std::vector<Row>> rowsOf(sqlite3* pDb)
         rows.emplace_back();
         for (int i = 0; i < sqlite3_column_count(pStatement); ++i) {
             const auto* szText = reinterpret_cast<const char*>(sqlite3_column_text(pStatement, i));
-            const bool blNamed = fuzz::fields()[static_cast<size_t>(i)] == sqlite3_column_name(pStatement, i);
+            const bool blNamed =
+                0 == strcmp(FIELDS[static_cast<size_t>(i)].szName, sqlite3_column_name(pStatement, i));
             rows.back().push_back(szText && blNamed ? std::optional<std::string>(szText) : std::nullopt);
         }
     }
     sqlite3_finalize(pStatement);
-    return SQLITE_DONE == nResult ? std::optional<std::vector<Row>>(rows) : std::nullopt;
+    return SQLITE_DONE == nResult ? std::optional<std::vector<Texts>>(rows) : std::nullopt;
 }
 
-Json::Value decoded(const std::string& strField, const std::string& strText)
+Json::Value decoded(Kind kind, const std::string& strText)
 {
-    if (strField == "webapi_allow" || strField == "extra") {
-        return fuzz::json(strText);
-    }
-    const bool blText = strField == "tid" || strField == "bind_sid" || strField == "function";
-    return blText ? Json::Value(strText) : Json::Value(Json::Int64{strtoll(strText.c_str(), nullptr, 10)});
+    return Kind::Json == kind   ? fuzz::json(strText)
+           : Kind::Text == kind ? Json::Value(strText)
+                                : Json::Value(Json::Int64{strtoll(strText.c_str(), nullptr, 10)});
 }
 
 // The tokens of the rows; nothing where one cannot be decoded.
-std::optional<Json::Value> tokensOf(const std::optional<std::vector<Row>>& rows)
+std::optional<Json::Value> tokensOf(const std::optional<std::vector<Texts>>& rows)
 {
     if (!rows) {
         return std::nullopt;
     }
     Json::Value jTokens(Json::arrayValue);
-    for (const Row& row : *rows) {
+    for (const Texts& row : *rows) {
         Json::Value& jToken = jTokens.append(Json::Value(Json::objectValue));
         for (size_t i = 0; i < row.size(); ++i) {
             if (!row[i]) {
                 return std::nullopt;
             }
-            jToken[fuzz::fields()[i]] = decoded(fuzz::fields()[i], *row[i]);
+            jToken[FIELDS[i].szName] = decoded(FIELDS[i].kind, *row[i]);
         }
     }
     return jTokens;

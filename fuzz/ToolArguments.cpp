@@ -12,7 +12,6 @@
 #include "AccessTokenUtil.h"
 #include "Commands.h"
 #include "Console.h"
-#include "Failure.h"
 #include "Library.h"
 #include "PlainReading.h"
 #include "ToolStore.h"
@@ -59,21 +58,7 @@ void checkReading(const tool::Command& command, const Texts& strArguments, int n
     }
 }
 
-int runCommand(tool::Commands& commands, Texts strArguments)
-{
-    std::vector<char*> rgArguments;
-    for (std::string& strArgument : strArguments) {
-        rgArguments.push_back(strArgument.data());
-    }
-    try {
-        return commands.run(static_cast<int>(rgArguments.size()), rgArguments.data());
-    } catch (const tool::Failure& failure) {
-        tool::complain(failure.what());
-        return failure.status();
-    }
-}
-
-// The exit status. What main() would take for a failure of the system ends the fuzzing.
+// The exit status.
 int run(const Texts& strArguments, const std::string& strInput)
 {
     const fuzz::Input input(strInput);
@@ -81,7 +66,7 @@ int run(const Texts& strArguments, const std::string& strInput)
     const std::string strCommand = commandOf(strArguments);
     tool::Commands commands;
     COMMANDS.at(strCommand.empty() ? "generate" : strCommand)(commands);
-    const int nStatus = runCommand(commands, strArguments);
+    const int nStatus = fuzz::runTool(commands, strArguments);
     if (!strCommand.empty()) {
         checkReading(commands.all().front(), strArguments, nStatus);
     }

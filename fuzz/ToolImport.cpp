@@ -13,21 +13,14 @@
 
 namespace {
 
-// Runs the tool with these arguments and returns its exit status.
 int run(void (&addCommand)(tool::Commands&), std::vector<std::string> strArguments)
 {
-    strArguments.insert(strArguments.begin(), "vemo-access-token");
-    std::vector<char*> words;
-    for (std::string& strArgument : strArguments) {
-        words.push_back(strArgument.data());
-    }
     tool::Commands commands;
     addCommand(commands);
-    try {
-        return commands.run(static_cast<int>(words.size()), words.data());
-    } catch (const tool::Failure& failure) {
-        return failure.status();
-    }
+    strArguments.insert(strArguments.begin(), "vemo-access-token");
+    const int nStatus = fuzz::runTool(commands, strArguments);
+    fuzz::takeComplaints();
+    return nStatus;
 }
 
 int importText(const std::string& strText)
@@ -47,11 +40,6 @@ std::string exportText()
     fuzz::takeResult();
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == run(tool::addExport, {"export", "-"}));
     return fuzz::takeResult();
-}
-
-void prepare()
-{
-    fuzz::captureStreams();
 }
 
 bool isObject(const std::string& strLine)
@@ -105,7 +93,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
 {
     const fuzz::Confinement confinement;
     static fuzz::ToolStore store;
-    [[maybe_unused]] static const bool blPrepared = (prepare(), true);
+    [[maybe_unused]] static const bool blPrepared = (fuzz::captureStreams(), true);
     const std::string_view strText = fuzz::viewOf(pData, cbData);
     const int nStatus = importPartially(std::string(strText));
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == nStatus || tool::EXIT_STATUS_USAGE == nStatus);

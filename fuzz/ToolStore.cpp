@@ -6,6 +6,8 @@
 #include <sstream>
 
 #include "AccessTokenUtil.h"
+#include "Console.h"
+#include "Failure.h"
 #include "Library.h"
 #include "internal/AccessTokenDbApi.h"
 
@@ -35,6 +37,20 @@ int isOk(void*, int, char** rgValue, char**)
 } // namespace
 
 namespace fuzz {
+
+int runTool(tool::Commands& commands, std::vector<std::string> strArguments)
+{
+    std::vector<char*> rgArguments;
+    for (std::string& strArgument : strArguments) {
+        rgArguments.push_back(strArgument.data());
+    }
+    try {
+        return commands.run(static_cast<int>(rgArguments.size()), rgArguments.data());
+    } catch (const tool::Failure& failure) {
+        tool::complain(failure.what());
+        return failure.status();
+    }
+}
 
 ToolStore::ToolStore() : m_pDb(openStore()), m_pFirst(nullptr)
 {

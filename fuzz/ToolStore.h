@@ -7,10 +7,17 @@
 
 #include <memory>
 #include <string>
+#include <vector>
+
+#include "Commands.h"
 
 struct sqlite3;
 
 namespace fuzz {
+
+// Runs the tool with these arguments, the name of the program being the first, and returns its exit status.
+// What main() would take for a failure of the system ends the fuzzing.
+int runTool(tool::Commands& commands, std::vector<std::string> strArguments);
 
 class ToolStore {
 public:

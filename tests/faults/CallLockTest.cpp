@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 #include <pthread.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -57,27 +58,6 @@ extern "C" int fstat(int nFile, struct stat* pStatus) noexcept
 
 namespace {
 
-// Whether somebody holds the lock just now.
-bool isHeld(const std::string& strFile)
-{
-    const int nFile = open(strFile.c_str(), O_RDWR | O_CLOEXEC);
-    const bool blHeld = 0 != flock(nFile, LOCK_EX | LOCK_NB);
-    close(nFile);
-    return blHeld;
-}
-
-struct Pipe {
-    Pipe() { EXPECT_EQ(0, pipe2(rgnEnd, O_CLOEXEC)); }
-    ~Pipe()
-    {
-        close(rgnEnd[0]);
-        close(rgnEnd[1]);
-    }
-    Pipe(const Pipe&) = delete;
-    Pipe& operator=(const Pipe&) = delete;
-    int rgnEnd[2] = {-1, -1};
-};
-
 // Whether another process meets SQLite's locks on the database. It asks the kernel: in a child, SQLite would
 // go by what it remembers of its parent's.
 bool isLockedBySqlite(const std::string& strDatabase)
@@ -114,6 +94,8 @@ protected:
             return error.code().value();
         }
     }
+
+    bool isHeld() const { return ETIMEDOUT == lockOnce(std::chrono::milliseconds(0)); }
 
     const StormCalls m_calls{Calls::Serialised};
     const std::string m_strFile = m_calls.lockFile();
@@ -171,25 +153,27 @@ TEST_F(SerialisingLock, GoesOnWhenAHolderIsKilled)
 // Programs that the holder started do not keep it.
 TEST_F(SerialisingLock, IsFreedByTheKernelWithItsHolder)
 {
-    Pipe toCat;
-    Pipe fromCat;
+    int rgnEnd[2];
+    ASSERT_EQ(0, socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, rgnEnd));
     const pid_t pid = startProcess([&] {
         const CallLock lock(m_strFile.c_str());
         if (0 == fork()) {
-            dup2(toCat.rgnEnd[0], STDIN_FILENO);
-            dup2(fromCat.rgnEnd[1], STDOUT_FILENO);
+            dup2(rgnEnd[1], STDIN_FILENO);
+            dup2(rgnEnd[1], STDOUT_FILENO);
             execlp("cat", "cat", nullptr);
             _exit(1);
         }
         pause();
     });
     char cEcho = 'x';
-    EXPECT_EQ(1, write(toCat.rgnEnd[1], &cEcho, 1));
-    EXPECT_EQ(1, read(fromCat.rgnEnd[0], &cEcho, 1)); // so it runs now
-    EXPECT_TRUE(isHeld(m_strFile));
+    EXPECT_EQ(1, write(rgnEnd[0], &cEcho, 1));
+    EXPECT_EQ(1, read(rgnEnd[0], &cEcho, 1)); // so it runs now
+    EXPECT_TRUE(isHeld());
     kill(pid, SIGKILL);
     EXPECT_FALSE(endsWell(pid));
-    EXPECT_FALSE(isHeld(m_strFile));
+    EXPECT_FALSE(isHeld());
+    close(rgnEnd[0]);
+    close(rgnEnd[1]);
 }
 
 // A child that is forked meanwhile has the descriptor too; it neither frees the lock nor keeps it.
@@ -197,11 +181,11 @@ TEST_F(SerialisingLock, IsItsMakersAlone)
 {
     std::optional<CallLock> lock(std::in_place, m_strFile.c_str());
     EXPECT_TRUE(endsWell(startProcess([] {})));
-    EXPECT_TRUE(isHeld(m_strFile));
+    EXPECT_TRUE(isHeld());
 
     const pid_t pid = startProcess([] { pause(); });
     lock.reset();
-    EXPECT_FALSE(isHeld(m_strFile));
+    EXPECT_FALSE(isHeld());
     kill(pid, SIGKILL);
     EXPECT_FALSE(endsWell(pid));
 }

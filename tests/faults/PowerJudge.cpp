@@ -68,8 +68,7 @@ struct Moment {
         if (blUndone && strState != strBefore && blMayBeUndone && blTruncated) {
             ++tally.nDamaged;
         } else if (blUndone && (strState != strBefore || !blMayBeUndone)) {
-            ++tally.nWrong;
-            tally.strFirstWrong = tally.strFirstWrong.empty() ? "wrong: " + strState : tally.strFirstWrong;
+            tally.addWrong(strState);
         }
     }
 };
@@ -129,18 +128,21 @@ void PowerJudge::visit(const Recording& recording, Order order, int64_t nDraws,
     }
 }
 
-PowerTally PowerJudge::judge(const Recording& recording, Order order, int64_t nDraws)
+void PowerTally::addWrong(const std::string& strState)
+{
+    strFirstWrong = 0 == nWrong++ ? "wrong: " + strState : strFirstWrong;
+}
+
+void PowerJudge::judge(const Recording& recording, Order order, int64_t nDraws, PowerTally& tally)
 {
     Moment moment;
     moment.strNow = stateOf(recording.files);
-    PowerTally tally;
     visit(
         recording, order, nDraws,
         [&](const DiskCall& call, const PowerDisk& disk) {
             moment.pass(call, isStep(call) ? stateOf(disk.files()) : "");
         },
         [&](const Files& files) { moment.judge(stateOf(files), hasJournal(files), tally); });
-    return tally;
 }
 
 PowerTally PowerJudge::judgeReturned(const Recording& recording, int64_t nDraws)
@@ -162,21 +164,8 @@ PowerTally PowerJudge::judgeReturned(const Recording& recording, int64_t nDraws)
             const std::string& strState = stateOf(files);
             ++tally.nImages;
             if (strState != *itReturned && (itReturned + 1 == states.end() || strState != itReturned[1])) {
-                ++tally.nWrong;
-                tally.strFirstWrong =
-                    tally.strFirstWrong.empty() ? "wrong: " + strState : tally.strFirstWrong;
+                tally.addWrong(strState);
             }
         });
     return tally;
-}
-
-PowerTally& operator+=(PowerTally& sum, const PowerTally& tally)
-{
-    sum.nImages += tally.nImages;
-    sum.nWrong += tally.nWrong;
-    sum.strFirstWrong = sum.strFirstWrong.empty() ? tally.strFirstWrong : sum.strFirstWrong;
-    sum.nExposed += tally.nExposed;
-    sum.nUndone += tally.nUndone;
-    sum.nDamaged += tally.nDamaged;
-    return sum;
 }

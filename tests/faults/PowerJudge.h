@@ -18,6 +18,8 @@ struct PowerTally {
     int64_t nImages = 0;
     int64_t nWrong = 0;
     std::string strFirstWrong;
+    void addWrong(const std::string& strState);
+
     // Of the images of a disk whose last change was acknowledged but for a sync of the directory: all, and
     // those in which that change is undone because its journal came back.
     int64_t nExposed = 0;
@@ -37,7 +39,7 @@ public:
     // or the creation of the database. Until the directory is synced it may hold the state before instead.
     // Looks at two extremes at each moment, all done and only what was synced, and draws nDraws images for
     // each change that is not synced.
-    PowerTally judge(const Recording& recording, Order order, int64_t nDraws);
+    void judge(const Recording& recording, Order order, int64_t nDraws, PowerTally& tally);
 
     // Each image must hold what all calls that returned have done, and of the next one all or nothing. Knows
     // of no journals, and so serves each way of journalling.
@@ -64,8 +66,5 @@ private:
     std::set<std::string> m_states;
     std::unordered_map<size_t, const std::string*> m_stateOfImage; // by the hash of the image
 };
-
-// The images of many recordings together.
-PowerTally& operator+=(PowerTally& sum, const PowerTally& tally);
 
 #endif
