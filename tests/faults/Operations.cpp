@@ -16,85 +16,8 @@ Json::Value options()
     return jOption;
 }
 
-int create()
-{
-    unsigned int uid = 0;
-    std::string strFunction = "VPN";
-    Json::Value jOption = options();
-    std::string strTid;
-    return VemoAccessTokenCreate(uid, strFunction, jOption, strTid);
-}
-
-int createByTid()
-{
-    unsigned int uid = 0;
-    std::string strFunction = "VPN";
-    Json::Value jOption = options();
-    std::string strTid = idOf("given");
-    return VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid);
-}
-
-int grantOneOfSome()
-{
-    std::string strTid = idOf("three");
-    Json::Value jToken;
-    return VemoAccessTokenGrantEx(strTid, "Example.Api", "get", jToken);
-}
-
-int grantTheLast()
-{
-    std::string strTid = idOf("one");
-    char szUser[64];
-    return VemoAccessTokenGrant(strTid, "Example.Api", "get", szUser, sizeof(szUser));
-}
-
-int deleteByTid()
-{
-    std::string strTid = idOf("one");
-    return VemoAccessTokenDeleteByTid(strTid);
-}
-
-int deleteByBindSid()
-{
-    return VemoAccessTokenDeleteByBindSid("session");
-}
-
-int deleteByFunction()
-{
-    std::string strFunction = "Mail";
-    return VemoAccessTokenDeleteByFunction(strFunction);
-}
-
-int update()
-{
-    AccessTokenApi api;
-    std::string strTid = idOf("three");
-    Json::Value jParam(Json::objectValue);
-    jParam["extra"]["note"] = std::string(6000, 'n'); // more than a page
-    return api.tokenUpdateByTid(strTid, jParam);
-}
-
-int list()
-{
-    AccessTokenApi api;
-    Json::Value jFilter(Json::objectValue);
-    Json::Value jTokenArray(Json::arrayValue);
-    const int nResult = api.tokenList(jFilter, jTokenArray);
-    return 0 > nResult ? nResult : static_cast<int>(jTokenArray.size());
-}
-
-int deleteByTidArray()
-{
-    AccessTokenApi api;
-    std::vector<std::string> strTidVector = {idOf("large")};
-    return api.tokenDeleteByTidArray(strTidVector);
-}
-
-int deleteAll()
-{
-    AccessTokenApi api;
-    return api.tokenDeleteAll();
-}
+std::string g_strFunction = "VPN";
+unsigned int g_uid = 0;
 
 // Some tokens on a few pages: one of them over several, and two that have expired.
 Files makeStore(const TokenStore& store)
@@ -128,19 +51,63 @@ void insertToken(const TokenStore& store, const std::string& strName, const std:
 
 const std::vector<Operation>& operations()
 {
+    static int (*const create)() = [] {
+        Json::Value jOption = options();
+        std::string strTid;
+        return VemoAccessTokenCreate(g_uid, g_strFunction, jOption, strTid);
+    };
     static const std::vector<Operation> all = {
-        {"first creation", true, true, &create},
-        {"creation", false, true, &create},
-        {"creation under a given id", false, true, &createByTid},
-        {"grant of one use of three", false, true, &grantOneOfSome},
-        {"grant of the last use", false, true, &grantTheLast},
-        {"deletion by id", false, true, &deleteByTid},
-        {"deletion by session", false, false, &deleteByBindSid},
-        {"deletion by purpose", false, true, &deleteByFunction},
-        {"update", false, false, &update},
-        {"listing", false, false, &list},
-        {"deletion by a list of ids", false, false, &deleteByTidArray},
-        {"deletion of all", false, false, &deleteAll},
+        {"first creation", true, true, create},
+        {"creation", false, true, create},
+        {"creation under a given id", false, true,
+         [] {
+             Json::Value jOption = options();
+             std::string strTid = idOf("given");
+             return VemoAccessTokenCreateByTid(g_uid, g_strFunction, jOption, strTid);
+         }},
+        {"grant of one use of three", false, true,
+         [] {
+             std::string strTid = idOf("three");
+             Json::Value jToken;
+             return VemoAccessTokenGrantEx(strTid, "Example.Api", "get", jToken);
+         }},
+        {"grant of the last use", false, true,
+         [] {
+             std::string strTid = idOf("one");
+             char szUser[64];
+             return VemoAccessTokenGrant(strTid, "Example.Api", "get", szUser, sizeof(szUser));
+         }},
+        {"deletion by id", false, true,
+         [] {
+             std::string strTid = idOf("one");
+             return VemoAccessTokenDeleteByTid(strTid);
+         }},
+        {"deletion by session", false, false, [] { return VemoAccessTokenDeleteByBindSid("session"); }},
+        {"deletion by purpose", false, true,
+         [] {
+             std::string strFunction = "Mail";
+             return VemoAccessTokenDeleteByFunction(strFunction);
+         }},
+        {"update", false, false,
+         [] {
+             std::string strTid = idOf("three");
+             Json::Value jParam(Json::objectValue);
+             jParam["extra"]["note"] = std::string(6000, 'n'); // more than a page
+             return AccessTokenApi().tokenUpdateByTid(strTid, jParam);
+         }},
+        {"listing", false, false,
+         [] {
+             Json::Value jFilter(Json::objectValue);
+             Json::Value jTokenArray(Json::arrayValue);
+             const int nResult = AccessTokenApi().tokenList(jFilter, jTokenArray);
+             return 0 > nResult ? nResult : static_cast<int>(jTokenArray.size());
+         }},
+        {"deletion by a list of ids", false, false,
+         [] {
+             std::vector<std::string> strTidVector = {idOf("large")};
+             return AccessTokenApi().tokenDeleteByTidArray(strTidVector);
+         }},
+        {"deletion of all", false, false, [] { return AccessTokenApi().tokenDeleteAll(); }},
     };
     return all;
 }

@@ -1,58 +1,8 @@
 #include "ModelRow.h"
 
-#include <cmath>
-#include <cstdio>
-#include <cstring>
 #include <memory>
 
 namespace {
-
-std::string quoted(const std::string& strText)
-{
-    static const std::string strNamed = "\"\\\b\f\n\r\t";
-    std::string strQuoted = "\"";
-    for (const char c : strText) {
-        const size_t nNamed = strNamed.find(c);
-        if (std::string::npos != nNamed) {
-            strQuoted.append({'\\', "\"\\bfnrt"[nNamed]});
-        } else if (0 <= c && c < ' ') {
-            char szEscape[8];
-            snprintf(szEscape, sizeof(szEscape), "\\u%04x", static_cast<unsigned int>(c));
-            strQuoted += szEscape;
-        } else {
-            strQuoted += c;
-        }
-    }
-    return strQuoted + "\"";
-}
-
-std::string realText(double dValue)
-{
-    if (!std::isfinite(dValue)) {
-        return std::isnan(dValue) ? "NaN" : 0 < dValue ? "Infinity" : "-Infinity";
-    }
-    char szText[32];
-    snprintf(szText, sizeof(szText), "%.17g", dValue);
-    return strpbrk(szText, ".e") ? szText : std::string(szText) + ".0";
-}
-
-std::string arrayText(const Json::Value& jArray)
-{
-    std::string strText = "[";
-    for (const Json::Value& jElement : jArray) {
-        strText += (1 == strText.size() ? "" : ",") + jsonText(jElement);
-    }
-    return strText + "]";
-}
-
-std::string objectText(const Json::Value& jObject)
-{
-    std::string strText = "{";
-    for (auto it = jObject.begin(); it != jObject.end(); ++it) {
-        strText += (1 == strText.size() ? "" : ",") + quoted(it.name()) + ":" + jsonText(*it);
-    }
-    return strText + "}";
-}
 
 Json::Value parsed(const std::string& strText)
 {
@@ -120,12 +70,13 @@ std::string untilNul(const std::string& strText)
 
 std::string jsonText(const Json::Value& jValue)
 {
-    switch (jValue.type()) {
-    case Json::nullValue: return "null";
-    case Json::stringValue: return quoted(jValue.asString());
-    case Json::realValue: return realText(jValue.asDouble());
-    case Json::arrayValue: return arrayText(jValue);
-    case Json::objectValue: return objectText(jValue);
-    default: return jValue.asString(); // integers and booleans
-    }
+    static const Json::StreamWriterBuilder builder = [] {
+        Json::StreamWriterBuilder compact;
+        compact["indentation"] = "";
+        compact["precision"] = 17;
+        compact["useSpecialFloats"] = true;
+        compact["emitUTF8"] = true;
+        return compact;
+    }();
+    return Json::writeString(builder, jValue);
 }
