@@ -3,9 +3,9 @@
 #include <sqlite3.h>
 #include <unistd.h>
 
-#include <cstdio>
 #include <cstdlib>
 #include <memory>
+#include <stdexcept>
 
 #include "AccessTokenDefine.h"
 
@@ -39,8 +39,7 @@ BareEngine::BareEngine() : m_pDb(nullptr)
     const uid_t uid = geteuid();
     if (0 != seteuid(0) || 0 != access(VEMO_ATOKEN_DB_PATH, F_OK) ||
         SQLITE_OK != sqlite3_open(VEMO_ATOKEN_DB_PATH, &m_pDb) || 0 != seteuid(uid)) {
-        fprintf(stderr, "bare engine: cannot open the database\n");
-        exit(1);
+        throw std::runtime_error("bare engine: cannot open the database");
     }
 }
 
@@ -53,8 +52,7 @@ void BareEngine::run(const char* szSql, int (*callback)(void*, int, char**, char
 {
     char* szErr = nullptr;
     if (SQLITE_OK != sqlite3_exec(m_pDb, szSql, callback, arg, &szErr)) {
-        fprintf(stderr, "bare engine: %s, sql=%s\n", szErr, szSql);
-        exit(1);
+        throw std::runtime_error(std::string("bare engine: ") + szErr + ", sql=" + szSql);
     }
 }
 

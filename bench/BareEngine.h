@@ -2,7 +2,7 @@
 // cost is held against. The same SQLite calls with the same statement texts, and the columns of a
 // row copied out; no checks, no log, no JSON.
 //
-// A failure ends the program: a benchmark of failures would be worth nothing.
+// A failure throws std::runtime_error.
 
 #ifndef VEMO_ACCESS_TOKEN_BARE_ENGINE_H
 #define VEMO_ACCESS_TOKEN_BARE_ENGINE_H

@@ -4,7 +4,10 @@
 #include <json/version.h>
 #include <sqlite3.h>
 
-int runBenchmarks(int argc, char** argv)
+#include <cstdio>
+#include <exception>
+
+int main(int argc, char** argv)
 {
     benchmark::Initialize(&argc, argv);
     if (benchmark::ReportUnrecognizedArguments(argc, argv)) {
@@ -14,6 +17,12 @@ int runBenchmarks(int argc, char** argv)
     benchmark::AddCustomContext("compiler", VEMO_ATOKEN_COMPILER);
     benchmark::AddCustomContext("sqlite", sqlite3_libversion());
     benchmark::AddCustomContext("jsoncpp", JSONCPP_VERSION_STRING);
-    benchmark::RunSpecifiedBenchmarks();
-    return 0;
+    try {
+        registerBenchmarks();
+        benchmark::RunSpecifiedBenchmarks();
+        return 0;
+    } catch (const std::exception& exception) {
+        fprintf(stderr, "%s: %s\n", argv[0], exception.what());
+        return 1;
+    }
 }

@@ -1,10 +1,11 @@
 #include "Store.h"
 
-#include <cstdio>
+#include <cerrno>
 #include <cstdlib>
 #include <ctime>
 #include <filesystem>
 #include <random>
+#include <system_error>
 
 #include "AccessTokenApi.h"
 
@@ -41,8 +42,7 @@ Store::Store(Place place) : m_nTokens(0)
 {
     std::string strTemplate = std::string(baseOf(place)) + "/vemo-bench-XXXXXX";
     if (!mkdtemp(strTemplate.data())) {
-        perror(strTemplate.c_str());
-        exit(1);
+        throw std::system_error(errno, std::generic_category(), strTemplate);
     }
     m_strDirectory = strTemplate;
     use();

@@ -1,7 +1,7 @@
 // A database of the benchmark's own, filled with tokens such as programs make them.
 //
 // The database path is redirected (examples/redirect.cpp), for the library and the bare engine alike.
-// A failure ends the program.
+// A failure throws.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_STORE_H
 #define VEMO_ACCESS_TOKEN_BENCH_STORE_H

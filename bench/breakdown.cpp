@@ -30,8 +30,8 @@
 #include <array>
 #include <chrono>
 #include <cstdarg>
-#include <memory>
 #include <numeric>
+#include <optional>
 #include <string>
 
 #include "AccessTokenApi.h"
@@ -224,22 +224,18 @@ void measure(benchmark::State& state, AccessTokenApi* pHeld)
 
 void breakdown(benchmark::State& state, const Cell& cell)
 {
-    static std::unique_ptr<Store> pStore; // static, so that exit() removes it
-    pStore = std::make_unique<Store>(cell.place);
-    pStore->grow(TOKENS);
-    std::unique_ptr<Bystander> pBystander;
+    Store store(cell.place);
+    store.grow(TOKENS);
+    std::optional<Bystander> bystander;
     if (cell.blWriteAheadLog) {
-        pStore->useWriteAheadLog();
-        pBystander = std::make_unique<Bystander>();
+        store.useWriteAheadLog();
+        bystander.emplace();
     }
-    std::unique_ptr<AccessTokenApi> pHeld;
+    std::optional<AccessTokenApi> held;
     if (cell.blHeld) {
-        pHeld = std::make_unique<AccessTokenApi>();
+        held.emplace();
     }
-    measure(state, pHeld.get());
-    pHeld.reset();
-    pBystander.reset();
-    pStore.reset();
+    measure(state, held ? &*held : nullptr);
 }
 
 const Cell g_rgCell[] = {
@@ -249,12 +245,11 @@ const Cell g_rgCell[] = {
 
 } // namespace
 
-int main(int argc, char** argv)
+void registerBenchmarks()
 {
     for (const Cell& cell : g_rgCell) {
         benchmark::RegisterBenchmark(nameOf(cell).c_str(), breakdown, cell)
             ->UseManualTime()
             ->Iterations(GRANTS);
     }
-    return runBenchmarks(argc, argv);
 }

@@ -69,7 +69,7 @@ void contention(benchmark::State& state, bool blWriteAheadLog, Calls calls, int 
 
 } // namespace
 
-int main(int argc, char** argv)
+void registerBenchmarks()
 {
     for (const bool blWriteAheadLog : {false, true}) {
         for (const Calls calls : {Calls::Plain, Calls::Serialised}) {
@@ -84,5 +84,4 @@ int main(int argc, char** argv)
             }
         }
     }
-    return runBenchmarks(argc, argv);
 }

@@ -7,9 +7,8 @@
 #include <benchmark/benchmark.h>
 
 #include <algorithm>
-#include <cstdio>
-#include <cstdlib>
 #include <memory>
+#include <stdexcept>
 #include <string>
 
 #include "Run.h"
@@ -27,8 +26,7 @@ void grant(const Store& store, int nToken, Samples& samples)
     Json::Value jToken;
     store.use();
     if (0 != samples.time([&] { return VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken); })) {
-        fprintf(stderr, "the grant failed\n");
-        exit(1);
+        throw std::runtime_error("the grant failed");
     }
 }
 
@@ -66,7 +64,7 @@ void growth(benchmark::State& state, Place place, bool blIndexes, int nTokens)
 
 } // namespace
 
-int main(int argc, char** argv)
+void registerBenchmarks()
 {
     for (const Place place : {Place::Memory, Place::Disk}) {
         for (const bool blIndexes : {false, true}) {
@@ -80,5 +78,4 @@ int main(int argc, char** argv)
             }
         }
     }
-    return runBenchmarks(argc, argv);
 }

@@ -18,7 +18,7 @@
 #include <cstring>
 
 #include "Interpose.h"
-#include "Operations.h"
+#include "MeasuredCalls.h"
 #include "Store.h"
 #include "Turns.h"
 

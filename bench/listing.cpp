@@ -4,10 +4,9 @@
 #include <benchmark/benchmark.h>
 #include <malloc.h>
 
-#include <cstdio>
-#include <cstdlib>
 #include <fstream>
 #include <memory>
+#include <stdexcept>
 
 #include "AccessTokenApi.h"
 #include "Run.h"
@@ -71,8 +70,7 @@ Json::Value listOurs(AccessTokenApi& api)
     Json::Value jAll;
     Json::Value jTokens(Json::arrayValue);
     if (0 != api.tokenList(jAll, jTokens) || TOKENS != jTokens.size()) {
-        fprintf(stderr, "the library failed\n");
-        exit(1);
+        throw std::runtime_error("the library failed");
     }
     return jTokens;
 }
@@ -135,9 +133,8 @@ void listingMemory(benchmark::State& state)
 
 } // namespace
 
-int main(int argc, char** argv)
+void registerBenchmarks()
 {
     benchmark::RegisterBenchmark("Listing/time", listingTime)->UseManualTime()->Iterations(10);
     benchmark::RegisterBenchmark("Listing/memory", listingMemory)->Iterations(1);
-    return runBenchmarks(argc, argv);
 }

@@ -9,12 +9,11 @@
 
 #include <benchmark/benchmark.h>
 
-#include <cstdio>
-#include <cstdlib>
 #include <memory>
+#include <stdexcept>
 #include <string>
 
-#include "Operations.h"
+#include "MeasuredCalls.h"
 #include "Run.h"
 #include "Samples.h"
 #include "Store.h"
@@ -27,7 +26,7 @@ const int MANY = 100000; // with which a call takes so long that fewer calls mus
 // The store of the last benchmark serves the next of its kind.
 void useStore(Place place, int nTokens)
 {
-    static std::unique_ptr<Store> pStore; // static, so that exit() removes it
+    static std::unique_ptr<Store> pStore;
     static Place placeOfStore;
     static int nTokensOfStore;
     if (!pStore || place != placeOfStore || nTokens != nTokensOfStore) {
@@ -43,8 +42,7 @@ double runOurs(const Operation& operation, Call& call, Samples& samples)
 {
     operation.prepare(call);
     if (operation.nExpected != samples.time([&] { return operation.run(call); })) {
-        fprintf(stderr, "the library failed\n");
-        exit(1);
+        throw std::runtime_error("the library failed");
     }
     return samples.last();
 }
@@ -98,7 +96,7 @@ void registerBenchmark(const Operation& operation, Place place, int nTokens)
         ->Iterations(turnsOf(place, nTokens));
 }
 
-void registerBenchmarks(Place place, int nTokens)
+void registerOperations(Place place, int nTokens)
 {
     for (const Operation& operation : operations()) {
         if (operation.runBare) {
@@ -110,12 +108,11 @@ void registerBenchmarks(Place place, int nTokens)
 
 } // namespace
 
-int main(int argc, char** argv)
+void registerBenchmarks()
 {
     for (const Place place : {Place::Memory, Place::Disk}) {
         for (const int nTokens : {FEW, 1000, MANY}) {
-            registerBenchmarks(place, nTokens);
+            registerOperations(place, nTokens);
         }
     }
-    return runBenchmarks(argc, argv);
 }

@@ -12,7 +12,7 @@
 #include <string>
 
 #include "Library.h"
-#include "Operations.h"
+#include "ModelCalls.h"
 #include "Table.h"
 
 namespace {

@@ -6,7 +6,6 @@
 
 #include <benchmark/benchmark.h>
 
-#include <cstdio>
 #include <cstdlib>
 #include <memory>
 #include <stdexcept>
@@ -169,8 +168,13 @@ void add(const std::string& strName, Arguments... arguments)
         ->Iterations(1);
 }
 
+} // namespace
+
 void registerBenchmarks()
 {
+    if (!getenv("VEMO_BENCH_REDIS_ALWAYS")) {
+        throw std::runtime_error("to be run through with-peers, which starts Redis");
+    }
     for (const size_t nClients : {1, 8, 64, 256}) {
         const std::string strClients = "/" + std::to_string(nClients);
         add("write-ahead" + strClients, gate, Journal::WriteAhead, TOKENS, TOKENS, nClients);
@@ -186,21 +190,4 @@ void registerBenchmarks()
     add("calls-locked/64", callers, Journal::Rollback, 64, Calls::Serialised, false);
     add("call/1", callers, Journal::WriteAhead, 1, Calls::Plain, false);
     add("call-beside/1", callers, Journal::WriteAhead, 1, Calls::Plain, true);
-}
-
-} // namespace
-
-int main(int argc, char** argv)
-{
-    if (!getenv("VEMO_BENCH_REDIS_ALWAYS")) {
-        fprintf(stderr, "Run bench-gate through with-peers, which starts Redis.\n");
-        return 2;
-    }
-    try {
-        registerBenchmarks();
-        return runBenchmarks(argc, argv);
-    } catch (const std::exception& exception) {
-        fprintf(stderr, "bench-gate: %s\n", exception.what());
-        return 1;
-    }
 }

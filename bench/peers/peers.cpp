@@ -9,7 +9,6 @@
 #include <benchmark/benchmark.h>
 
 #include <algorithm>
-#include <cstdio>
 #include <cstdlib>
 #include <ctime>
 #include <stdexcept>
@@ -128,29 +127,17 @@ void measure(benchmark::State& state, const Entry& entry)
     state.counters["p99_us"] = samples.percentile(99) * 1e6;
 }
 
+} // namespace
+
 void registerBenchmarks()
 {
+    if (!getenv(REDIS_ALWAYS) || !getenv(REDIS_EVERYSEC) || !getenv(POSTGRESQL)) {
+        throw std::runtime_error("to be run through with-peers, which starts the servers");
+    }
     for (const Entry& entry : g_rgEntry) {
         verify(entry);
         benchmark::RegisterBenchmark((std::string("Peers/") + entry.szSlug).c_str(), measure, entry)
             ->UseManualTime()
             ->Iterations(CALLS);
-    }
-}
-
-} // namespace
-
-int main(int argc, char** argv)
-{
-    if (!getenv(REDIS_ALWAYS) || !getenv(REDIS_EVERYSEC) || !getenv(POSTGRESQL)) {
-        fprintf(stderr, "Run bench-peers through with-peers, which starts the servers it needs.\n");
-        return 2;
-    }
-    try {
-        registerBenchmarks();
-        return runBenchmarks(argc, argv);
-    } catch (const std::exception& exception) {
-        fprintf(stderr, "bench-peers: %s\n", exception.what());
-        return 1;
     }
 }

@@ -3,18 +3,13 @@
 #include <map>
 
 #include "ModelFilter.h"
+#include "TokenStore.h"
 #include "World.h"
 
 namespace {
 
 const size_t TID_MIN = 127;
 const Json::UInt USER_SIZE = 16;
-
-std::string id(std::string strText)
-{
-    strText.resize(TID_MIN, 'x');
-    return strText;
-}
 
 std::string withNul(const std::string& strHead, const std::string& strTail)
 {
@@ -30,19 +25,19 @@ Json::Value parsed(const char* szText)
 
 // Ids long enough and not, two of which read the same up to a NUL, and one that two others make in a list.
 const std::string g_rgTid[] = {
-    id("a"),
-    id("b"),
-    id("c"),
-    id("d"),
-    id("e"),
-    id("it's"),
-    id("\xff\xfe\xc3"),
-    id("'; DROP TABLE token; --"),
-    id("a") + "'" + id("b"),
+    idOf("a"),
+    idOf("b"),
+    idOf("c"),
+    idOf("d"),
+    idOf("e"),
+    idOf("it's"),
+    idOf("\xff\xfe\xc3"),
+    idOf("'; DROP TABLE token; --"),
+    idOf("a") + "'" + idOf("b"),
     std::string(6000, 'l'),
-    withNul(id("a"), "tail"),
-    withNul("short", id("")),
-    withNul("", id("")),
+    withNul(idOf("a"), "tail"),
+    withNul("short", idOf("")),
+    withNul("", idOf("")),
     "short",
     std::string(TID_MIN - 1, 'x'),
     "",

@@ -10,7 +10,7 @@
 #include "Draws.h"
 #include "Figures.h"
 #include "GateGrant.h"
-#include "Operations.h"
+#include "ModelCalls.h"
 #include "Table.h"
 #include "TokenStore.h"
 #include "World.h"

@@ -1,4 +1,4 @@
-#include "Operations.h"
+#include "MeasuredCalls.h"
 
 #include "Store.h"
 #include "vemo-access-token.h"

@@ -1,4 +1,4 @@
-#include "Operations.h"
+#include "ModelCalls.h"
 
 #include <tuple>
 #include <utility>

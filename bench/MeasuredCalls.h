@@ -1,7 +1,7 @@
 // The operations that are measured: each exported function, and what a held object is used for.
 
-#ifndef VEMO_ACCESS_TOKEN_BENCH_OPERATIONS_H
-#define VEMO_ACCESS_TOKEN_BENCH_OPERATIONS_H
+#ifndef VEMO_ACCESS_TOKEN_BENCH_MEASURED_CALLS_H
+#define VEMO_ACCESS_TOKEN_BENCH_MEASURED_CALLS_H
 
 #include <json/value.h>
 

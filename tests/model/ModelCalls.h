@@ -1,7 +1,7 @@
 // The operations that tests draw, each of which runs on the library and on the model.
 
-#ifndef TESTS_MODEL_OPERATIONS_H
-#define TESTS_MODEL_OPERATIONS_H
+#ifndef TESTS_MODEL_CALLS_H
+#define TESTS_MODEL_CALLS_H
 
 #include <functional>
 #include <string>
