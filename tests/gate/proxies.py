@@ -127,6 +127,15 @@ class Clients(Scene):
         return result.returncode, result.stdout.strip(), result.stderr.strip()
 
 
+def users(told):
+    """What the application gets of the user's headers and the id."""
+    return {name: value for name, value in told["headers"].items()
+            if name.replace("_", "-").startswith("x-token-") or name == "authorization"}
+
+
+GRANTED = {"x-token-user": scene.OWNER, "x-token-uid": "0", "x-token-function": scene.FUNCTION_IN_HEADERS}
+
+
 class Proxy:
     """What both proxies are asked."""
 
@@ -135,22 +144,16 @@ class Proxy:
         status, headers, text = self.answer(self.PROGRAMS[0], method, path, id, headers, body)
         return status, headers, json.loads(text) if text.startswith('{"method"') else None
 
-    def users(self, told):
-        """What the application gets of the user's headers and the id."""
-        return {name: value for name, value in told["headers"].items()
-                if name.replace("_", "-").startswith("x-token-") or name == "authorization"}
-
     def test_grants_and_refuses(self):
-        granted = {"x-token-user": scene.OWNER, "x-token-uid": "0", "x-token-function": scene.FUNCTION_IN_HEADERS}
         status, _, told = self.request(id=self.id)
-        self.assertEqual((status, told["method"], told["path"], self.users(told)),
-                         (200, "GET", "/files/a?b=c", granted))
+        self.assertEqual((status, told["method"], told["path"], users(told)),
+                         (200, "GET", "/files/a?b=c", GRANTED))
         self.assertEqual(self.uses(self.id), 2)
 
         # Who forges the headers, in whatever case, gets one's own.
         for forged in (FORGED, {name.lower(): value for name, value in FORGED.items()}):
             status, _, told = self.request(id=self.token(), headers=forged)
-            self.assertEqual((status, self.users(told)), (200, granted))
+            self.assertEqual((status, users(told)), (200, GRANTED))
 
         status, headers, told = self.request()
         self.assertEqual((status, headers["WWW-Authenticate"], told), (401, "Bearer", None))
@@ -165,7 +168,7 @@ class Proxy:
 
     def test_lets_preflights_through_without_a_user(self):
         status, _, told = self.request("OPTIONS", headers={**PREFLIGHT, **FORGED}, id=self.id)
-        self.assertEqual((status, told["method"], self.users(told)), (200, "OPTIONS", {}))
+        self.assertEqual((status, told["method"], users(told)), (200, "OPTIONS", {}))
         self.assertEqual(self.uses(self.id), 3)
 
     def test_carries_bodies_and_large_cookies(self):
@@ -295,8 +298,10 @@ class ManyMachines(Scene):
         subprocess.run(["openssl", *arguments], cwd=cls.directory, check=True, stderr=subprocess.PIPE)
 
     def test_grant_what_a_certificate_and_a_token_allow(self):
-        for id, status in ((None, 401), ("0" * 127, 403), (self.id, 200)):
+        for id, status in ((None, 401), ("0" * 127, 403)):
             self.assertEqual(self.answer("front", path="/page", id=id)[0], status)
+        status, _, text = self.answer("front", path="/page", id=self.id, headers=FORGED)
+        self.assertEqual((status, users(json.loads(text))), (200, GRANTED))
         self.assertEqual(self.uses(self.id), 2)
 
     def test_answer_none_but_front_ends_and_nothing_but_calls(self):
@@ -310,7 +315,8 @@ class ManyMachines(Scene):
 
     def test_grant_nothing_without_the_gate(self):
         self.end(self.gate)
-        self.assertEqual(self.answer("front", path="/page", id=self.id)[0], 500)
+        status, headers, _ = self.answer("front", path="/page", id=self.id)
+        self.assertEqual((status, headers["Retry-After"]), (503, "1"))
         self.start_gate()
         self.assertEqual(self.uses(self.id), 3)
 
