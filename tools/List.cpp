@@ -1,5 +1,6 @@
 // list and show: which tokens there are.
 
+#include <algorithm>
 #include <map>
 #include <memory>
 
@@ -75,10 +76,44 @@ uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
             return nTokens;
         }
         for (const tool::Row& row : rows) {
-            ids.add(row[0].value_or(""), row[1].value_or(""), blNumber,
-                    strtoll(row[2]->c_str(), nullptr, 10));
+            ids.add({row[0].value_or(""), strtoll(row[2]->c_str(), nullptr, 10)}, row[1].value_or(""),
+                    blNumber);
         }
     }
+}
+
+template <typename Part>
+std::string listOf(const std::vector<tool::SortedIds::Id>& ids, Part part)
+{
+    std::string strList;
+    for (const auto& id : ids) {
+        strList += (strList.empty() ? "" : ",") + part(id);
+    }
+    return strList;
+}
+
+typedef std::multimap<std::string, Json::Value> Tokens; // by their ids, as SQL
+
+// Those of the ids that are there. A row is found sooner than an id; but a token that a program has changed
+// since is in another row.
+Tokens tokensOf(std::vector<tool::SortedIds::Id> ids)
+{
+    Tokens tokens;
+    tool::Store store(tool::Store::Access::Read);
+    const auto add = [&](const std::string& strWhere) {
+        store.eachToken(strWhere, std::string(", ") + tool::SQL_QUOTED_TID,
+                        [&tokens](Json::Value jToken, const tool::Row& columns) {
+                            tokens.emplace(*columns[0], std::move(jToken));
+                        });
+    };
+    add("rowid IN (" + listOf(ids, [](const auto& id) { return std::to_string(id.nRow); }) + ")");
+    ids.erase(
+        std::remove_if(ids.begin(), ids.end(), [&tokens](const auto& id) { return tokens.count(id.strTid); }),
+        ids.end());
+    if (!ids.empty()) {
+        add("tid IN (" + listOf(ids, [](const auto& id) { return id.strTid; }) + ")");
+    }
+    return tokens;
 }
 
 // Hands out the tokens of the ids, in their order, but those that are gone.
@@ -86,19 +121,10 @@ template <typename Use>
 void eachOf(tool::SortedIds& ids, const ListOptions& options, Use use)
 {
     ids.each(static_cast<uint64_t>(options.nLimit.value_or(INT64_MAX)),
-             [&](const std::vector<std::string>& strTids) {
-                 std::string strList;
-                 for (const std::string& strTid : strTids) {
-                     strList += (strList.empty() ? "" : ",") + strTid;
-                 }
-                 std::multimap<std::string, Json::Value> tokens;
-                 tool::Store(tool::Store::Access::Read)
-                     .eachToken("tid IN (" + strList + ")", std::string(", ") + tool::SQL_QUOTED_TID,
-                                [&tokens](Json::Value jToken, const tool::Row& columns) {
-                                    tokens.emplace(*columns[0], std::move(jToken));
-                                });
-                 for (const std::string& strTid : strTids) {
-                     const auto pToken = tokens.find(strTid);
+             [&](const std::vector<tool::SortedIds::Id>& group) {
+                 Tokens tokens = tokensOf(group);
+                 for (const auto& id : group) {
+                     const auto pToken = tokens.find(id.strTid);
                      if (pToken != tokens.end()) {
                          use(pToken->second);
                          tokens.erase(pToken);

@@ -13,6 +13,9 @@ namespace {
 
 const size_t GROUP_MAX = 1000;
 
+// Of 16 MB, not of 2: parts of this size are sorted in memory and merged, and a few of them at once.
+const char* const SORT_IN = "PRAGMA cache_size = -16000";
+
 // A database that ends with its connection. SQLite makes a file of it when it grows beyond some megabytes.
 sqlite3* opened()
 {
@@ -37,8 +40,8 @@ namespace tool {
 SortedIds::SortedIds(bool blDescending) : m_pDb(opened(), sqlite3_close), m_blDescending(blDescending)
 {
     run([this] {
-        for (const char* szSql :
-             {"PRAGMA journal_mode = OFF", "BEGIN", "CREATE TABLE ids (key, equal INTEGER, tid TEXT)"}) {
+        for (const char* szSql : {"PRAGMA journal_mode = OFF", SORT_IN, "BEGIN",
+                                  "CREATE TABLE ids (key, place INTEGER, tid TEXT)"}) {
             grant::Statement(m_pDb.get(), szSql).step();
         }
         m_insert.emplace(m_pDb.get(), "INSERT INTO ids VALUES (?1, ?2, ?3)");
@@ -56,7 +59,7 @@ void SortedIds::run(Run run)
     }
 }
 
-void SortedIds::add(const std::string& strTid, const std::string& strKey, bool blNumber, int64_t nOfEquals)
+void SortedIds::add(const Id& id, const std::string& strKey, bool blNumber)
 {
     run([&] {
         if (blNumber) {
@@ -64,27 +67,28 @@ void SortedIds::add(const std::string& strTid, const std::string& strKey, bool b
         } else {
             m_insert->bind(1, strKey);
         }
-        m_insert->bind(2, nOfEquals).bind(3, strTid).step();
+        m_insert->bind(2, id.nRow).bind(3, id.strTid).step();
         m_insert->reset();
     });
 }
 
-void SortedIds::each(uint64_t nLimit, const std::function<void(const std::vector<std::string>& strTids)>& use)
+void SortedIds::each(uint64_t nLimit, const std::function<void(const std::vector<Id>& ids)>& use)
 {
     run([&] {
-        grant::Statement ids(m_pDb.get(), m_blDescending
-                                              ? "SELECT tid FROM ids ORDER BY key DESC, equal LIMIT ?1"
-                                              : "SELECT tid FROM ids ORDER BY key, equal LIMIT ?1");
-        ids.bind(1, static_cast<int64_t>(nLimit));
-        std::vector<std::string> strTids;
+        // Without a LIMIT: SQLite would put all into a tree instead of sorting them.
+        grant::Statement sorted(m_pDb.get(), m_blDescending
+                                                 ? "SELECT tid, place FROM ids ORDER BY key DESC, place"
+                                                 : "SELECT tid, place FROM ids ORDER BY key, place");
+        std::vector<Id> ids;
         for (bool blMore = true; blMore;) {
-            blMore = ids.step();
+            blMore = 0 != nLimit && sorted.step();
             if (blMore) {
-                strTids.emplace_back(ids.text(0));
+                --nLimit;
+                ids.push_back({sorted.text(0), sorted.number(1)});
             }
-            if (!strTids.empty() && (!blMore || strTids.size() == GROUP_MAX)) {
-                use(strTids);
-                strTids.clear();
+            if (!ids.empty() && (!blMore || ids.size() == GROUP_MAX)) {
+                use(ids);
+                ids.clear();
             }
         }
     });

@@ -22,11 +22,16 @@ class SortedIds {
 public:
     explicit SortedIds(bool blDescending);
 
-    // Takes an id, as SQL, and what it is sorted by: a number or a text. Equals come by the second number.
-    void add(const std::string& strTid, const std::string& strKey, bool blNumber, int64_t nOfEquals);
+    struct Id {
+        std::string strTid; // as SQL
+        int64_t nRow;
+    };
+
+    // Takes an id, and what it is sorted by: a number or a text. Equals come by their rows.
+    void add(const Id& id, const std::string& strKey, bool blNumber);
 
     // Hands them out in their order, the first nLimit of them, in groups.
-    void each(uint64_t nLimit, const std::function<void(const std::vector<std::string>& strTids)>& use);
+    void each(uint64_t nLimit, const std::function<void(const std::vector<Id>& ids)>& use);
 
 private:
     template <typename Run>

@@ -28,7 +28,7 @@ setup()
     chmod 0700 "$DB"
 }
 
-# beside ARGUMENTS...: runs the tool, with 32 MB in all, beside a program that creates a token each 20 ms. Each creation
+# beside ARGUMENTS...: runs the tool, with 64 MB in all, beside a program that creates a token each 20 ms. Each creation
 # is made, and none waits for a second.
 beside()
 {
@@ -37,7 +37,7 @@ beside()
     # shellcheck disable=SC2154 # coproc sets it
     exec {absent}>&"${creations[1]}" 4<&"${creations[0]}"
     status=0
-    (ulimit -v 32000 && exec "$TOOL" "$@") >"$DIR/output" 2>"$DIR/stderr" 3>&- 4<&- || status=$?
+    (ulimit -v 64000 && exec "$TOOL" "$@") >"$DIR/output" 2>"$DIR/stderr" 3>&- 4<&- || status=$?
     eval "exec {absent}>&- ${creations[1]}>&-"
     read -r calls there longest <&4
     exec 4<&-
