@@ -90,38 +90,33 @@ TEST_F(TokensTest, KeepTheirId)
 
 TEST_F(TokensTest, SayWhatHappenedToAGrant)
 {
-    const struct {
-        const char* szCount;
-        std::string strStatement; // of which the first tries are answered
-        std::vector<Answer> answers;
-        AccessTokens::Answer answer;
-        const char* szStored; // the count afterwards
-    } rows[] = {
-        {"2", "", {}, GRANTED, "1"},
-        {"2", REPLACE, {LOCKED, LOCKED}, GRANTED, "1"},
-        {"1", DELETE_T, {LOCKED}, GRANTED, ""},
-        {"0", DELETE_T, {LOCKED}, GRANTED, ""}, // 0 is one last use
-        {"2", SELECT, {LOCKED}, GRANTED, "1"},
-        {"2", REPLACE, {DISK_ERROR}, FAILED, "2"},
-        {"1", DELETE_T, {DISK_ERROR}, FAILED, "1"},
-        {"2", SELECT, {DISK_ERROR, DISK_ERROR}, FAILED, "2"},
-        {"2", SELECT, {RUN, DISK_ERROR}, FAILED, "2"},
-        {"-1", SELECT, {RUN, LOCKED}, GRANTED, "-1"}, // an unlimited token needs no change
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.szCount + (" " + row.strStatement));
+    // The first tries of the statement get the answers. The count is szStored then.
+    const auto says = [&](const char* szCount, const std::string& strStatement,
+                          const std::vector<Answer>& answers, AccessTokens::Answer answer,
+                          const char* szStored) {
+        SCOPED_TRACE(szCount + (" " + strStatement));
         query("DELETE FROM token");
-        insert(std::string("{\"count\":") + row.szCount + "}");
-        answerStatements(row.strStatement, row.answers);
+        insert(std::string("{\"count\":") + szCount + "}");
+        answerStatements(strStatement, answers);
         Json::Value jToken = "what the caller had";
-        EXPECT_EQ(row.answer, m_tokens.grant("t", "Api", "get", &jToken));
-        EXPECT_EQ(row.szStored, countOf());
-        if (GRANTED != row.answer) {
+        EXPECT_EQ(answer, m_tokens.grant("t", "Api", "get", &jToken));
+        EXPECT_EQ(szStored, countOf());
+        if (GRANTED != answer) {
             EXPECT_EQ(Json::Value("what the caller had"), jToken);
         } else {
-            EXPECT_EQ(row.szStored[0] ? row.szStored : row.szCount, jToken["count"].asString());
+            EXPECT_EQ(szStored[0] ? szStored : szCount, jToken["count"].asString());
         }
-    }
+    };
+    says("2", "", {}, GRANTED, "1");
+    says("2", REPLACE, {LOCKED, LOCKED}, GRANTED, "1");
+    says("1", DELETE_T, {LOCKED}, GRANTED, "");
+    says("0", DELETE_T, {LOCKED}, GRANTED, ""); // 0 is one last use
+    says("2", SELECT, {LOCKED}, GRANTED, "1");
+    says("2", REPLACE, {DISK_ERROR}, FAILED, "2");
+    says("1", DELETE_T, {DISK_ERROR}, FAILED, "1");
+    says("2", SELECT, {DISK_ERROR, DISK_ERROR}, FAILED, "2");
+    says("2", SELECT, {RUN, DISK_ERROR}, FAILED, "2");
+    says("-1", SELECT, {RUN, LOCKED}, GRANTED, "-1"); // an unlimited token needs no change
 }
 
 TEST_F(TokensTest, RefuseWhatATokenDoesNotOpen)

@@ -115,35 +115,29 @@ TEST_F(Creation, PrefersArgumentsAndClockToTheOption)
 
 TEST_F(Creation, CountsTheDeadlineFromNowIn64Bits)
 {
-    const struct {
-        const char* szOption;
-        time_t now;
-        const char* szDeadline;
-    } rows[] = {
-        {"{}", NOW, "1700086400"},
-        {R"({"deadline":3600})", NOW, "1700003600"},
-        {R"({"deadline":-1})", NOW, "1699999999"},
-        {R"({"deadline":0})", NOW, "1700000000"},
-        {R"({"deadline":null})", NOW, "1700000000"},
-        {R"({"deadline":true})", NOW, "1700000001"},
-        {R"({"deadline":1.9})", NOW, "1700000001"},
-        {R"({"deadline":-1.9})", NOW, "1699999999"},
-        {R"({"deadline":2147483647})", NOW, "3847483647"},
-        {R"({"deadline":2147483647})", INT_MAX, "4294967294"},
-        {R"({"deadline":1})", INT_MAX, "2147483648"},
-        {R"({"deadline":-2147483648})", -10, "-2147483658"},
-        {"{}", INT_MAX, "2147570047"},
-        {"{}", static_cast<time_t>(INT_MAX) + 1, "2147570048"},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(::testing::Message() << row.szOption << " at " << row.now);
+    const auto expires = [&](const char* szOption, time_t now, const char* szDeadline) {
+        SCOPED_TRACE(::testing::Message() << szOption << " at " << now);
         query("DELETE FROM token");
-        seam().clock = row.now;
-        m_jOption = json(row.szOption);
+        seam().clock = now;
+        m_jOption = json(szOption);
         EXPECT_EQ(0, createByTid());
-        EXPECT_EQ((Texts{std::string("integer|") + row.szDeadline + "|" + std::to_string(row.now)}),
+        EXPECT_EQ((Texts{std::string("integer|") + szDeadline + "|" + std::to_string(now)}),
                   query("SELECT typeof(deadline),deadline,create_time FROM token"));
-    }
+    };
+    expires("{}", NOW, "1700086400");
+    expires(R"({"deadline":3600})", NOW, "1700003600");
+    expires(R"({"deadline":-1})", NOW, "1699999999");
+    expires(R"({"deadline":0})", NOW, "1700000000");
+    expires(R"({"deadline":null})", NOW, "1700000000");
+    expires(R"({"deadline":true})", NOW, "1700000001");
+    expires(R"({"deadline":1.9})", NOW, "1700000001");
+    expires(R"({"deadline":-1.9})", NOW, "1699999999");
+    expires(R"({"deadline":2147483647})", NOW, "3847483647");
+    expires(R"({"deadline":2147483647})", INT_MAX, "4294967294");
+    expires(R"({"deadline":1})", INT_MAX, "2147483648");
+    expires(R"({"deadline":-2147483648})", -10, "-2147483658");
+    expires("{}", INT_MAX, "2147570047");
+    expires("{}", static_cast<time_t>(INT_MAX) + 1, "2147570048");
 }
 
 TEST_F(Creation, ThrowsAtNumbersThatDoNotFitAndLeavesNothing)
@@ -171,50 +165,41 @@ TEST_F(Creation, RefusesArgumentsInOrder)
 {
     const std::string strOption =
         "jTokenOption.type() != Json::objectValue && jTokenOption.type() != Json::nullValue";
-    const struct {
-        unsigned int uid;
-        const char* szFunction;
-        std::string strTid;
-        const char* szOption;
-        std::string strCondition;
-        const char* szPrintedUid;
-    } rows[] = {
-        {4294967295U, "", "", "[]", "uid == UID_ERR", "-1"},
-        {4294967295U, "VPN", tid(), "{}", "uid == UID_ERR", "-1"},
-        {2147483648U, "", "short", "[]", "strFunction.empty()", "-2147483648"},
-        {1026, "", tid(), "{}", "strFunction.empty()", "1026"},
-        {1026, "VPN", std::string(126, 'x'), "{}", SHORT_TID, "1026"},
-        {4294967294U, "VPN", "", "[]", SHORT_TID, "-2"},
-        {0, "VPN", tid(), "[]", strOption, "0"},
-        {0, "VPN", tid(), "[{}]", strOption, "0"},
-        {0, "VPN", tid(), R"("")", strOption, "0"},
-        {0, "VPN", tid(), "5", strOption, "0"},
-        {0, "VPN", tid(), "1.5", strOption, "0"},
-        {0, "VPN", tid(), "false", strOption, "0"},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.strCondition + row.szOption);
-        m_uid = row.uid;
-        m_strFunction = row.szFunction;
-        m_strTid = row.strTid;
-        m_jOption = json(row.szOption);
+    const auto refuses = [&](unsigned int uid, const char* szFunction, const std::string& strTid,
+                             const char* szOption, const std::string& strCondition,
+                             const char* szPrintedUid) {
+        SCOPED_TRACE(strCondition + szOption);
+        m_uid = uid;
+        m_strFunction = szFunction;
+        m_strTid = strTid;
+        m_jOption = json(szOption);
         errno = EACCES;
-        EXPECT_FAILURE(createByTid(), failed(SERVICE, row.strCondition, EACCES),
-                       ordinary(SERVICE, "tokenCreate failed, tid=" + row.strTid +
-                                             ", uid=" + row.szPrintedUid + ", strFunction=" + row.szFunction +
-                                             ", jTokenOption=" + row.szOption));
+        EXPECT_FAILURE(createByTid(), failed(SERVICE, strCondition, EACCES),
+                       ordinary(SERVICE, "tokenCreate failed, tid=" + strTid + ", uid=" + szPrintedUid +
+                                             ", strFunction=" + szFunction + ", jTokenOption=" + szOption));
         // No id is generated for a uid or a function that is refused.
-        EXPECT_EQ(row.strCondition == SHORT_TID && row.szOption[0] == '{' ? 0 : -1, createGenerated());
-        const bool blBeforeId =
-            row.strCondition == "uid == UID_ERR" || row.strCondition == "strFunction.empty()";
+        EXPECT_EQ(strCondition == SHORT_TID && szOption[0] == '{' ? 0 : -1, createGenerated());
+        const bool blBeforeId = strCondition == "uid == UID_ERR" || strCondition == "strFunction.empty()";
         EXPECT_EQ(blBeforeId, seam().callsOf({"getrandom"}).empty());
         const Texts lines = takeLines();
         if (blBeforeId) {
-            EXPECT_EQ((Texts{failed(SERVICE, row.strCondition, EACCES)}), lines);
+            EXPECT_EQ((Texts{failed(SERVICE, strCondition, EACCES)}), lines);
         }
         m_strOut = "before";
         seam().calls.clear();
-    }
+    };
+    refuses(4294967295U, "", "", "[]", "uid == UID_ERR", "-1");
+    refuses(4294967295U, "VPN", tid(), "{}", "uid == UID_ERR", "-1");
+    refuses(2147483648U, "", "short", "[]", "strFunction.empty()", "-2147483648");
+    refuses(1026, "", tid(), "{}", "strFunction.empty()", "1026");
+    refuses(1026, "VPN", std::string(126, 'x'), "{}", SHORT_TID, "1026");
+    refuses(4294967294U, "VPN", "", "[]", SHORT_TID, "-2");
+    refuses(0, "VPN", tid(), "[]", strOption, "0");
+    refuses(0, "VPN", tid(), "[{}]", strOption, "0");
+    refuses(0, "VPN", tid(), R"("")", strOption, "0");
+    refuses(0, "VPN", tid(), "5", strOption, "0");
+    refuses(0, "VPN", tid(), "1.5", strOption, "0");
+    refuses(0, "VPN", tid(), "false", strOption, "0");
 }
 
 TEST_F(Creation, AcceptsTheBoundsOfItsArguments)

@@ -118,60 +118,48 @@ TEST_F(Exported, PurgeThenOperateAndDoSoAfterAFailedPurge)
     const Texts shortTid = {
         failed(SERVICE, "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN"),
         ordinary(SERVICE, "tokenCreate failed, tid=short, uid=1000, strFunction=VPN, jTokenOption=null")};
-    const struct {
-        const char* szName;
-        Call call;
-        int nResult;
-        Texts statements; // after those of the purge
-        Texts lines;
-    } rows[] = {
-        {"create refused", create(UID_ERR, "null"), -1, {}, {failed(SERVICE, "uid == UID_ERR")}},
-        {"create by tid", create(1000, "null", tid("n")), 0, {strInsert}, {}},
-        {"create by tid refused", create(1000, "null", "short"), -1, {}, shortTid},
-        {"grant ex", grantEx("t", "Api", "get"), 0, {SELECT_T, strReplace}, {}},
-        {"grant ex refused", grantEx("t", "api", "get"), -1, {SELECT_T}, {NOT_PERMITTED}},
-        {"grant", grant("t", "Api", "get"), 0, {SELECT_T, strReplace}, {}},
-        {"grant refused", grant("t", "Api", "put"), -1, {SELECT_T}, {GRANT_REFUSED}},
-        {"delete by tid", deleteByTid("t"), 1, {deleteSql("tid", "t")}, {}},
-        {"delete by unknown tid", deleteByTid("z"), 0, {deleteSql("tid", "z")}, {}},
-        {"delete by tid refused", deleteByTid(""), -1, {}, emptyValue("tid")},
-        {"delete by function", deleteByFunction("MAIL"), 1, {deleteSql("function", "MAIL")}, {}},
-        {"delete by function refused", deleteByFunction(""), -1, {}, emptyValue("function")},
-    };
-    for (const auto& row : rows) {
+    // The statements follow that of the purge.
+    const auto purges = [&](const char* szName, const Call& call, int nResult, const Texts& statements,
+                            const Texts& lines) {
         for (const bool blPurged : {true, false}) {
-            SCOPED_TRACE(row.szName);
+            SCOPED_TRACE(szName);
             fill();
             reset();
             failStatements(PURGE, {SQLITE_IOERR, "disk I/O error", 0}, blPurged ? 0 : 1);
-            EXPECT_EQ(row.nResult, row.call());
-            expectCalls(Texts{PURGE} + row.statements);
+            EXPECT_EQ(nResult, call());
+            expectCalls(Texts{PURGE} + statements);
             // The store logs its statement; the purge itself logs nothing.
-            EXPECT_LINES((blPurged ? Texts{} : failureOf(PURGE, "disk I/O error")) + row.lines);
+            EXPECT_LINES((blPurged ? Texts{} : failureOf(PURGE, "disk I/O error")) + lines);
             EXPECT_EQ(blPurged ? "" : "3", countOf("old"));
         }
-    }
+    };
+    purges("create refused", create(UID_ERR, "null"), -1, {}, {failed(SERVICE, "uid == UID_ERR")});
+    purges("create by tid", create(1000, "null", tid("n")), 0, {strInsert}, {});
+    purges("create by tid refused", create(1000, "null", "short"), -1, {}, shortTid);
+    purges("grant ex", grantEx("t", "Api", "get"), 0, {SELECT_T, strReplace}, {});
+    purges("grant ex refused", grantEx("t", "api", "get"), -1, {SELECT_T}, {NOT_PERMITTED});
+    purges("grant", grant("t", "Api", "get"), 0, {SELECT_T, strReplace}, {});
+    purges("grant refused", grant("t", "Api", "put"), -1, {SELECT_T}, {GRANT_REFUSED});
+    purges("delete by tid", deleteByTid("t"), 1, {deleteSql("tid", "t")}, {});
+    purges("delete by unknown tid", deleteByTid("z"), 0, {deleteSql("tid", "z")}, {});
+    purges("delete by tid refused", deleteByTid(""), -1, {}, emptyValue("tid"));
+    purges("delete by function", deleteByFunction("MAIL"), 1, {deleteSql("function", "MAIL")}, {});
+    purges("delete by function refused", deleteByFunction(""), -1, {}, emptyValue("function"));
 }
 
 TEST_F(Exported, DeleteByBindSidDoesNotPurge)
 {
     const std::string strNoSid = failed(WRAPPER, "!szSid || !szSid[0]");
-    const struct {
-        const char* szSid;
-        int nResult;
-        Texts statements, lines;
-    } rows[] = {
-        {"S1", 2, {deleteSql("bind_sid", "S1")}, {}}, // two: the expired token is still there
-        {"S9", 0, {deleteSql("bind_sid", "S9")}, {}},
-        {nullptr, -1, {}, {strNoSid}},
-        {"", -1, {}, {strNoSid}},
-    };
-    for (const auto& row : rows) {
+    const auto deletes = [&](const char* szSid, int nResult, const Texts& statements, const Texts& lines) {
         seam().calls.clear();
-        EXPECT_EQ(row.nResult, deleteByBindSid(row.szSid)());
-        expectCalls(row.statements);
-        EXPECT_LINES(row.lines);
-    }
+        EXPECT_EQ(nResult, deleteByBindSid(szSid)());
+        expectCalls(statements);
+        EXPECT_LINES(lines);
+    };
+    deletes("S1", 2, {deleteSql("bind_sid", "S1")}, {}); // two: the expired token is still there
+    deletes("S9", 0, {deleteSql("bind_sid", "S9")}, {});
+    deletes(nullptr, -1, {}, {strNoSid});
+    deletes("", -1, {}, {strNoSid});
 }
 
 TEST_F(Exported, CreateMakesTheDatabaseOnFirstUseAndReturnsTheNewId)
@@ -327,57 +315,45 @@ TEST_F(GrantWithName, LooksUpNoUserWithoutABuffer)
 TEST_F(GrantWithName, WritesWhatFits)
 {
     const size_t cbHuge = static_cast<size_t>(UINT_MAX) + 1;
-    const struct {
-        const char* szName;
-        size_t cbUser;
-        int nResult;
-        const char* szWritten;
-    } rows[] = {
-        {"alice", 6, 0, "alice"},
-        {"alice", 5, -1, "alic"},
-        {"alice", 2, -1, "a"},
-        {"alice", 1, -1, ""},
-        {"alice", 17, 0, "alice"},
-        {"", 1, 0, ""},
-        {"%s%n%d", 17, 0, "%s%n%d"},
-        // The size counts as an int, after the name was written.
-        {"alice", static_cast<size_t>(INT_MAX), 0, "alice"},
-        {"alice", static_cast<size_t>(INT_MAX) + 1, -1, "alice"},
-        {"alice", cbHuge + 5, -1, "alice"},
-        {"alice", cbHuge + 6, 0, "alice"},
-    };
     query("UPDATE token SET count = -1");
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.cbUser);
-        setUser(row.szName);
+    const auto writes = [&](const char* szName, size_t cbUser, int nResult, const char* szWritten) {
+        SCOPED_TRACE(cbUser);
+        setUser(szName);
         memset(m_szUser, '#', 16);
         errno = 0;
-        EXPECT_EQ(row.nResult, grant("t", "Api", "get", row.cbUser));
-        EXPECT_STREQ(row.szWritten, m_szUser);
-        EXPECT_EQ('#', m_szUser[strlen(row.szWritten) + 1]);
+        EXPECT_EQ(nResult, grant("t", "Api", "get", cbUser));
+        EXPECT_STREQ(szWritten, m_szUser);
+        EXPECT_EQ('#', m_szUser[strlen(szWritten) + 1]);
         const std::string strLine =
             failed(WRAPPER, "(int)cbUser <= snprintf(szUser,cbUser, \"%s\", pUser->szName)");
-        EXPECT_LINES(0 == row.nResult ? Texts{} : Texts{strLine});
-    }
+        EXPECT_LINES(0 == nResult ? Texts{} : Texts{strLine});
+    };
+    writes("alice", 6, 0, "alice");
+    writes("alice", 5, -1, "alic");
+    writes("alice", 2, -1, "a");
+    writes("alice", 1, -1, "");
+    writes("alice", 17, 0, "alice");
+    writes("", 1, 0, "");
+    writes("%s%n%d", 17, 0, "%s%n%d");
+    // The size counts as an int, after the name was written.
+    writes("alice", static_cast<size_t>(INT_MAX), 0, "alice");
+    writes("alice", static_cast<size_t>(INT_MAX) + 1, -1, "alice");
+    writes("alice", cbHuge + 5, -1, "alice");
+    writes("alice", cbHuge + 6, 0, "alice");
 }
 
 TEST_F(GrantWithName, LeavesTheNameAloneWhenRefused)
 {
-    const struct {
-        const char *szTid, *szApi, *szMethod;
-        Texts lines;
-    } rows[] = {
-        {"", "Api", "get", {failed(SERVICE, "strTid.empty()")}},
-        {"t", nullptr, "get", {failed(SERVICE, "!szWebapiName || !szWebapiName[0]")}},
-        {"unknown", "Api", "get", {}},
-        {"old", "Api", "get", {}},
-        {"t", "api", "get", {NOT_PERMITTED}},
-        {"t", "Api", "put", {}},
-    };
-    for (const auto& row : rows) {
-        EXPECT_FAILURE(grant(row.szTid, row.szApi, row.szMethod), row.lines + Texts{GRANT_REFUSED});
+    const auto refuses = [&](const char* szTid, const char* szApi, const char* szMethod, const Texts& lines) {
+        EXPECT_FAILURE(grant(szTid, szApi, szMethod), lines + Texts{GRANT_REFUSED});
         EXPECT_EQ(m_strUntouched, m_szUser);
-    }
+    };
+    refuses("", "Api", "get", {failed(SERVICE, "strTid.empty()")});
+    refuses("t", nullptr, "get", {failed(SERVICE, "!szWebapiName || !szWebapiName[0]")});
+    refuses("unknown", "Api", "get", {});
+    refuses("old", "Api", "get", {});
+    refuses("t", "api", "get", {NOT_PERMITTED});
+    refuses("t", "Api", "put", {});
     EXPECT_EQ("2", countOf());
     EXPECT_EQ(Texts{}, seam().callsOf({"getpwuid_r"}));
 }

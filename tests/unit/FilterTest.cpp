@@ -63,45 +63,38 @@ private:
 
 TEST_F(Filter, MakesOneConditionOfTheFields)
 {
-    const struct {
-        const char* szFilter;
-        bool bAnd;
-        const char* szOutput;
-        int nResult;
-    } rows[] = {
-        {R"({"tid":"Ab12"})", true, " (tid='Ab12' )", 0},
-        {R"({"uid":1024,"function":"VPN"})", true, " (function='VPN' and uid=1024 )", 0},
-        {R"({"uid":1024,"function":"VPN"})", false, " (function='VPN' or uid=1024 )", 0},
-        {R"({"bind_sid":"s'1"})", true, " (bind_sid='s''1' )", 0},
-        {R"({"tid":["Ab12"]})", true, " (tid in ('Ab12' ) )", 0},
-        {R"({"tid":["a","b"],"count":0})", true, " (count=0 and tid in ('a''b' ) )", 0},
-        {R"({"uid":[1,2]})", true, " (uid in (12 ) )", 0},
-        {R"({"tid":null,"uid":null})", true, " (tid='' and uid= )", 0},
-        {R"({"extra":[{"a":1}],"webapi_allow":"x"})", true,
-         R"( (extra in ('{"a":1}' ) and webapi_allow='"x"' ))", 0},
-        {R"({"tid":"x' OR '1'='1"})", true, " (tid='x'' OR ''1''=''1' )", 0},
-        {R"({"uid":"7 or 1=1"})", true, " (uid=7 or 1=1 )", 0},
-        // Names that are no fields are passed over, whatever their values are.
-        {"{}", true, "", 1},
-        {"{}", false, "", 1},
-        {R"({"sort_by":"uid","sort_direction":"desc","limit":1,"offset":2})", true, "", 1},
-        {R"({"foo":{"a":1},"":[1],"Tid":"x","tid ":"x","tid\u0000":"x","TID":null})", true, "", 1},
-        {R"({"foo":{},"uid":1,"limit":{},"zzz":[[]]})", true, " (uid=1 )", 0},
-        // An empty list leaves the joining words.
-        {R"({"uid":[]})", true, " ( )", 0},
-        {R"({"count":1,"uid":[]})", true, " (count=1 and  )", 0},
-        {R"({"count":[],"uid":1})", true, " ( and uid=1 )", 0},
-        {R"({"count":[],"deadline":[],"uid":[]})", false, " ( or  or  )", 0},
-        {R"({"bind_sid":"s","tid":[],"uid":1})", true, " (bind_sid='s' and  and uid=1 )", 0},
-    };
-    for (const auto& row : rows) {
+    const auto makes = [&](const char* szFilter, bool bAnd, const char* szOutput, int nResult) {
         for (const std::string strBefore : {"", "held (before"}) {
-            SCOPED_TRACE(std::string(row.szFilter) + " after '" + strBefore + "'");
+            SCOPED_TRACE(std::string(szFilter) + " after '" + strBefore + "'");
             m_strOut = strBefore;
-            EXPECT_EQ(row.nResult, where(row.szFilter, row.bAnd));
-            EXPECT_EQ(strBefore + row.szOutput, m_strOut);
+            EXPECT_EQ(nResult, where(szFilter, bAnd));
+            EXPECT_EQ(strBefore + szOutput, m_strOut);
         }
-    }
+    };
+    makes(R"({"tid":"Ab12"})", true, " (tid='Ab12' )", 0);
+    makes(R"({"uid":1024,"function":"VPN"})", true, " (function='VPN' and uid=1024 )", 0);
+    makes(R"({"uid":1024,"function":"VPN"})", false, " (function='VPN' or uid=1024 )", 0);
+    makes(R"({"bind_sid":"s'1"})", true, " (bind_sid='s''1' )", 0);
+    makes(R"({"tid":["Ab12"]})", true, " (tid in ('Ab12' ) )", 0);
+    makes(R"({"tid":["a","b"],"count":0})", true, " (count=0 and tid in ('a''b' ) )", 0);
+    makes(R"({"uid":[1,2]})", true, " (uid in (12 ) )", 0);
+    makes(R"({"tid":null,"uid":null})", true, " (tid='' and uid= )", 0);
+    makes(R"({"extra":[{"a":1}],"webapi_allow":"x"})", true,
+          R"( (extra in ('{"a":1}' ) and webapi_allow='"x"' ))", 0);
+    makes(R"({"tid":"x' OR '1'='1"})", true, " (tid='x'' OR ''1''=''1' )", 0);
+    makes(R"({"uid":"7 or 1=1"})", true, " (uid=7 or 1=1 )", 0);
+    // Names that are no fields are passed over, whatever their values are.
+    makes("{}", true, "", 1);
+    makes("{}", false, "", 1);
+    makes(R"({"sort_by":"uid","sort_direction":"desc","limit":1,"offset":2})", true, "", 1);
+    makes(R"({"foo":{"a":1},"":[1],"Tid":"x","tid ":"x","tid\u0000":"x","TID":null})", true, "", 1);
+    makes(R"({"foo":{},"uid":1,"limit":{},"zzz":[[]]})", true, " (uid=1 )", 0);
+    // An empty list leaves the joining words.
+    makes(R"({"uid":[]})", true, " ( )", 0);
+    makes(R"({"count":1,"uid":[]})", true, " (count=1 and  )", 0);
+    makes(R"({"count":[],"uid":1})", true, " ( and uid=1 )", 0);
+    makes(R"({"count":[],"deadline":[],"uid":[]})", false, " ( or  or  )", 0);
+    makes(R"({"bind_sid":"s","tid":[],"uid":1})", true, " (bind_sid='s' and  and uid=1 )", 0);
 }
 
 TEST_F(Filter, VisitsFieldsInAscendingOrderOfTheirBytes)
@@ -129,36 +122,31 @@ TEST_F(Filter, RefusesWhatIsNoObject)
 
 TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
 {
-    const struct {
-        const char* szFilter;
-        int nCall; // the text that gets no memory; 0: the filter is wrong
-        const char* szKept;
-        std::string strInner, strOuter;
-    } rows[] = {
-        {R"({"extra":{"a":1}})", 0, "held (", "", ""},
-        {R"({"webapi_allow":{}})", 0, "held (", "", ""},
-        {R"({"tid":{}})", 0, "held (", "", ""},
-        {R"({"count":1,"uid":{"a":1},"webapi_allow":{}})", 0, "held (count=1 and ", "", ""},
-        {R"({"tid":"a"})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED},
-        {R"({"uid":7})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED},
-        {R"({"extra":7})", 1, "held (", MATCH_JSON_FAILED, MATCH_FAILED},
-        {R"({"count":1,"uid":7})", 2, "held (count=1 and ", MATCH_TEXT_FAILED, MATCH_FAILED},
-        {R"({"tid":["a"]})", 1, "held (", LIST_TEXT_FAILED, LIST_FAILED},
-        {R"({"uid":[7]})", 1, "held (", LIST_TEXT_FAILED, LIST_FAILED},
-        {R"({"extra":[{}]})", 1, "held (", LIST_JSON_FAILED, LIST_FAILED},
-        {R"({"tid":["a","b"]})", 2, "held (", LIST_TEXT_FAILED, LIST_FAILED},
-        {R"({"count":[1],"uid":[1,2,3]})", 4, "held (count in (1 ) and ", LIST_TEXT_FAILED, LIST_FAILED},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.szFilter);
+    // The text nCall gets no memory; with 0, the filter is wrong.
+    const auto keeps = [&](const char* szFilter, int nCall, const char* szKept, const std::string& strInner,
+                           const std::string& strOuter) {
+        SCOPED_TRACE(szFilter);
         m_strOut = "held";
         errno = EIO;
-        failText(row.nCall);
-        EXPECT_EQ(-1, where(row.szFilter));
-        EXPECT_EQ(row.szKept, m_strOut);
-        EXPECT_LINES(row.nCall ? allFailed(STORE, {row.strInner, row.strOuter}, ENOMEM)
-                               : Texts{fail(STORE, "err input type, jTokenParam=(null)", EIO)});
-    }
+        failText(nCall);
+        EXPECT_EQ(-1, where(szFilter));
+        EXPECT_EQ(szKept, m_strOut);
+        EXPECT_LINES(nCall ? allFailed(STORE, {strInner, strOuter}, ENOMEM)
+                           : Texts{fail(STORE, "err input type, jTokenParam=(null)", EIO)});
+    };
+    keeps(R"({"extra":{"a":1}})", 0, "held (", "", "");
+    keeps(R"({"webapi_allow":{}})", 0, "held (", "", "");
+    keeps(R"({"tid":{}})", 0, "held (", "", "");
+    keeps(R"({"count":1,"uid":{"a":1},"webapi_allow":{}})", 0, "held (count=1 and ", "", "");
+    keeps(R"({"tid":"a"})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED);
+    keeps(R"({"uid":7})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED);
+    keeps(R"({"extra":7})", 1, "held (", MATCH_JSON_FAILED, MATCH_FAILED);
+    keeps(R"({"count":1,"uid":7})", 2, "held (count=1 and ", MATCH_TEXT_FAILED, MATCH_FAILED);
+    keeps(R"({"tid":["a"]})", 1, "held (", LIST_TEXT_FAILED, LIST_FAILED);
+    keeps(R"({"uid":[7]})", 1, "held (", LIST_TEXT_FAILED, LIST_FAILED);
+    keeps(R"({"extra":[{}]})", 1, "held (", LIST_JSON_FAILED, LIST_FAILED);
+    keeps(R"({"tid":["a","b"]})", 2, "held (", LIST_TEXT_FAILED, LIST_FAILED);
+    keeps(R"({"count":[1],"uid":[1,2,3]})", 4, "held (count in (1 ) and ", LIST_TEXT_FAILED, LIST_FAILED);
 }
 
 // How a value is written in a condition of its own and as an element of a list: for a field of text, of JSON

@@ -43,31 +43,26 @@ protected:
 
 TEST_F(Grant, SpendsOneUse)
 {
-    const struct {
-        Json::Int64 nCount;
-        const char* szStored; // after the grant
-        Json::Int64 nHandedBack;
-        std::string strStatement; // besides the SELECT
-    } rows[] = {
-        {3, "2", 2, saveSql("REPLACE", counted(2))},
-        {2, "1", 1, saveSql("REPLACE", counted(1))},
-        {1, "", 1, DELETE_T},
-        {0, "", 0, DELETE_T},
-        {-1, "-1", -1, ""},
-        {INT64_MIN, "-9223372036854775808", INT64_MIN, ""},
-        {INT64_MAX, "9223372036854775806", INT64_MAX - 1, saveSql("REPLACE", counted(INT64_MAX - 1))},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.nCount);
+    // A grant runs the statement besides the SELECT.
+    const auto spends = [&](Json::Int64 nCount, const char* szStored, Json::Int64 nHandedBack,
+                            const std::string& strStatement) {
+        SCOPED_TRACE(nCount);
         query("DELETE FROM token");
-        insert(text(counted(row.nCount)));
+        insert(text(counted(nCount)));
         seam().calls.clear();
         EXPECT_EQ(0, grant());
-        EXPECT_EQ(row.szStored, countOf());
-        EXPECT_EQ(counted(row.nHandedBack), m_jToken);
-        EXPECT_EQ(Texts{SELECT_T} + (row.strStatement.empty() ? Texts{} : Texts{row.strStatement}),
+        EXPECT_EQ(szStored, countOf());
+        EXPECT_EQ(counted(nHandedBack), m_jToken);
+        EXPECT_EQ(Texts{SELECT_T} + (strStatement.empty() ? Texts{} : Texts{strStatement}),
                   seam().statements());
-    }
+    };
+    spends(3, "2", 2, saveSql("REPLACE", counted(2)));
+    spends(2, "1", 1, saveSql("REPLACE", counted(1)));
+    spends(1, "", 1, DELETE_T);
+    spends(0, "", 0, DELETE_T);
+    spends(-1, "-1", -1, "");
+    spends(INT64_MIN, "-9223372036854775808", INT64_MIN, "");
+    spends(INT64_MAX, "9223372036854775806", INT64_MAX - 1, saveSql("REPLACE", counted(INT64_MAX - 1)));
 }
 
 // The purge before the grant removes expired tokens; the grant does not look at the deadline.
@@ -193,31 +188,25 @@ TEST_F(Grant, FailsWithTheStoreAndLeavesTheCallersRecordAlone)
                           ordinary(SERVICE, "tokenDeleteByName failed, name=tid, strValue=t"),
                           failed(SERVICE, "0 > tokenDeleteByTid(strTid)", EIO),
                           failed(SERVICE, "0 > tokenCountDegrade(jToken)", EIO)};
-    const struct {
-        const char* szStart; // of the statement that fails
-        std::string strSql, strCondition;
-        int nCount;
-        const char* szAfterLock; // the count
-        Texts lines;
-    } rows[] = {
-        {"SELECT", SELECT_T, "0 > runSql(FillList, &jTokenArrayOut)", 2, "2", lookup},
-        {"REPLACE", saveSql("REPLACE", counted(1)), "0 > runSql()", 2, "1", save},
-        {"DELETE", DELETE_T, "0 > (err = runSql())", 1, "", remove},
-    };
-    for (const auto& row : rows) {
+    // The statement that fails starts with szStart.
+    const auto fails = [&](const char* szStart, const std::string& strSql, const std::string& strCondition,
+                           int nCount, const char* szAfterLock, const Texts& lines) {
         for (const bool blLock : {false, true}) {
-            SCOPED_TRACE(row.szStart);
+            SCOPED_TRACE(szStart);
             query("DELETE FROM token");
-            insert(text(counted(row.nCount)));
-            failStatements(row.szStart, blLock ? LOCKED : DISK_ERROR);
-            EXPECT_FAILURE(grant(), (blLock ? Texts{fail(STORE, "sql error, sql=" + row.strSql, EIO)}
-                                            : failureOf(row.strSql, "disk I/O error", EIO) +
-                                                  Texts{failed(STORE, row.strCondition, EIO)}) +
-                                        row.lines);
+            insert(text(counted(nCount)));
+            failStatements(szStart, blLock ? LOCKED : DISK_ERROR);
+            EXPECT_FAILURE(grant(), (blLock ? Texts{fail(STORE, "sql error, sql=" + strSql, EIO)}
+                                            : failureOf(strSql, "disk I/O error", EIO) +
+                                                  Texts{failed(STORE, strCondition, EIO)}) +
+                                        lines);
             EXPECT_EQ(UNTOUCHED, m_jToken);
-            EXPECT_EQ(blLock ? row.szAfterLock : std::to_string(row.nCount), countOf());
+            EXPECT_EQ(blLock ? szAfterLock : std::to_string(nCount), countOf());
         }
-    }
+    };
+    fails("SELECT", SELECT_T, "0 > runSql(FillList, &jTokenArrayOut)", 2, "2", lookup);
+    fails("REPLACE", saveSql("REPLACE", counted(1)), "0 > runSql()", 2, "1", save);
+    fails("DELETE", DELETE_T, "0 > (err = runSql())", 1, "", remove);
 }
 
 // Nothing is locked between the lookup and the change: another process may come in between.

@@ -161,32 +161,26 @@ TEST(RandomNumber, HasBothBoundsAndNoBias)
 {
     // 129 numbers fit so many times into 64 bits; greater draws would favour some and are drawn again.
     const uint64_t nLimit = UINT64_MAX / 129 * 129;
-    const struct {
-        int nMin, nMax;
-        std::vector<uint64_t> draws;
-        int nExpected;
-    } rows[] = {
-        {127, 255, {0}, 127},
-        {127, 255, {1}, 128},
-        {127, 255, {128}, 255},
-        {127, 255, {129}, 127},
-        {127, 255, {nLimit - 129}, 127},
-        {127, 255, {nLimit - 1}, 255},
-        {127, 255, {nLimit, 5}, 132},
-        {127, 255, {UINT64_MAX, nLimit, nLimit + 1, 128}, 255},
-        {0, 0, {12345}, 0},
-        {255, 255, {12345}, 255},
-        {INT_MAX, INT_MAX, {12345}, INT_MAX},
-        {0, INT_MAX, {0x7fffffff}, INT_MAX},
-        {0, INT_MAX, {0x80000000}, 0},
-        {0, 1, {7}, 1},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.draws.front());
-        ScriptedSource source(row.draws);
-        EXPECT_EQ(row.nExpected, source.random(row.nMin, row.nMax));
+    const auto gives = [&](int nMin, int nMax, const std::vector<uint64_t>& draws, int nExpected) {
+        SCOPED_TRACE(draws.front());
+        ScriptedSource source(draws);
+        EXPECT_EQ(nExpected, source.random(nMin, nMax));
         EXPECT_EQ(0u, source.left());
-    }
+    };
+    gives(127, 255, {0}, 127);
+    gives(127, 255, {1}, 128);
+    gives(127, 255, {128}, 255);
+    gives(127, 255, {129}, 127);
+    gives(127, 255, {nLimit - 129}, 127);
+    gives(127, 255, {nLimit - 1}, 255);
+    gives(127, 255, {nLimit, 5}, 132);
+    gives(127, 255, {UINT64_MAX, nLimit, nLimit + 1, 128}, 255);
+    gives(0, 0, {12345}, 0);
+    gives(255, 255, {12345}, 255);
+    gives(INT_MAX, INT_MAX, {12345}, INT_MAX);
+    gives(0, INT_MAX, {0x7fffffff}, INT_MAX);
+    gives(0, INT_MAX, {0x80000000}, 0);
+    gives(0, 1, {7}, 1);
     std::map<int, int> counts;
     for (uint64_t nDraw = 0; nDraw < 129 * 3; ++nDraw) {
         ++counts[ScriptedSource(std::vector<uint64_t>{nDraw}).random(127, 255)];

@@ -73,69 +73,60 @@ private:
 
 TEST_F(Query, RunsTheStatementThatTheFilterMakes)
 {
-    const struct {
-        const char* szFilter;
-        std::string strCondition;
-        std::string strFound;
-    } rows[] = {
-        {"{}", "", ALL},
-        {R"({"tid":"Ab12"})", " WHERE  (tid='Ab12' )", "Ab12"},
-        {R"({"uid":1024,"sort_by":"create_time","sort_direction":"desc"})",
-         " WHERE  (uid=1024 ) order by 'create_time' DESC", "Ab12 Cd34"}, // sorted by a constant
-        {R"({"tid":"nobody"})", " WHERE  (tid='nobody' )", ""},
-        {R"({"foo":"x","offset":3,"sort_direction":"desc"})", "", ALL},
-        {R"({"limit":7,"offset":8})", "", ALL},
-        {R"({"uid":7,"limit":6})", " WHERE  (uid=7 ) ", "Ef56"},
-        {R"({"function":"VPN","bind_sid":"S1"})", " WHERE  (bind_sid='S1' and function='VPN' )", "Ab12"},
-        {R"({"uid":"7"})", " WHERE  (uid=7 )", "Ef56"},
-        {R"({"uid":"7 or 1"})", " WHERE  (uid=7 or 1 )", ALL},
-        {R"({"tid":"x' OR '1'='1"})", " WHERE  (tid='x'' OR ''1''=''1' )", ""},
-        {R"({"tid":"'; DELETE FROM token; --"})", " WHERE  (tid='''; DELETE FROM token; --' )", ""},
-        {R"({"tid":["Cd34"]})", " WHERE  (tid in ('Cd34' ) )", "Cd34"},
-        {R"({"tid":["Ab12","Cd34"]})", " WHERE  (tid in ('Ab12''Cd34' ) )", ""}, // one value
-        {R"({"uid":[10,24]})", " WHERE  (uid in (1024 ) )", "Ab12 Cd34"},
-        {R"({"extra":[{"note":"it's mine"}]})", R"( WHERE  (extra in ('{"note":"it''s mine"}' ) ))",
-         "Ab12 Ef56"},
-        {R"({"webapi_allow":[{"a":{}}]})", R"( WHERE  (webapi_allow in ('{"a":{}}' ) ))", "Cd34"},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.szFilter);
-        EXPECT_EQ(0, get(row.szFilter));
-        EXPECT_EQ(SELECT + row.strCondition + ";", m_db.m_strSql);
+    const auto finds = [&](const char* szFilter, const std::string& strCondition,
+                           const std::string& strFound) {
+        SCOPED_TRACE(szFilter);
+        EXPECT_EQ(0, get(szFilter));
+        EXPECT_EQ(SELECT + strCondition + ";", m_db.m_strSql);
         EXPECT_EQ("", m_db.m_strErr);
-        EXPECT_EQ(row.strFound, found());
-        EXPECT_EQ(row.strFound.empty(), m_jOut.isNull());
-    }
+        EXPECT_EQ(strFound, found());
+        EXPECT_EQ(strFound.empty(), m_jOut.isNull());
+    };
+    finds("{}", "", ALL);
+    finds(R"({"tid":"Ab12"})", " WHERE  (tid='Ab12' )", "Ab12");
+    finds(R"({"uid":1024,"sort_by":"create_time","sort_direction":"desc"})",
+          " WHERE  (uid=1024 ) order by 'create_time' DESC", "Ab12 Cd34"); // sorted by a constant
+    finds(R"({"tid":"nobody"})", " WHERE  (tid='nobody' )", "");
+    finds(R"({"foo":"x","offset":3,"sort_direction":"desc"})", "", ALL);
+    finds(R"({"limit":7,"offset":8})", "", ALL);
+    finds(R"({"uid":7,"limit":6})", " WHERE  (uid=7 ) ", "Ef56");
+    finds(R"({"function":"VPN","bind_sid":"S1"})", " WHERE  (bind_sid='S1' and function='VPN' )", "Ab12");
+    finds(R"({"uid":"7"})", " WHERE  (uid=7 )", "Ef56");
+    finds(R"({"uid":"7 or 1"})", " WHERE  (uid=7 or 1 )", ALL);
+    finds(R"({"tid":"x' OR '1'='1"})", " WHERE  (tid='x'' OR ''1''=''1' )", "");
+    finds(R"({"tid":"'; DELETE FROM token; --"})", " WHERE  (tid='''; DELETE FROM token; --' )", "");
+    finds(R"({"tid":["Cd34"]})", " WHERE  (tid in ('Cd34' ) )", "Cd34");
+    finds(R"({"tid":["Ab12","Cd34"]})", " WHERE  (tid in ('Ab12''Cd34' ) )", ""); // one value
+    finds(R"({"uid":[10,24]})", " WHERE  (uid in (1024 ) )", "Ab12 Cd34");
+    finds(R"({"extra":[{"note":"it's mine"}]})", R"( WHERE  (extra in ('{"note":"it''s mine"}' ) ))",
+          "Ab12 Ef56");
+    finds(R"({"webapi_allow":[{"a":{}}]})", R"( WHERE  (webapi_allow in ('{"a":{}}' ) ))", "Cd34");
     EXPECT_EQ(ALL, tids());
 }
 
 TEST_F(Query, FailsWhereSqliteRefusesTheStatement)
 {
-    const struct {
-        const char* szFilter;
-        std::string strCondition, strError;
-    } rows[] = {
-        {R"({"sort_by":"uid"})", " order by 'uid'", "near \"order\": syntax error"},
-        {R"({"function":"VPN","limit":0})", " (function='VPN' ) LIMIT ", "near \";\": syntax error"},
-        {R"({"function":"VPN","limit":0,"offset":0})", " (function='VPN' ) LIMIT  OFFSET ",
-         "no such column: OFFSET"},
-        {R"({"limit":0})", " LIMIT ", "near \"LIMIT\": syntax error"},
-        {R"({"limit":6})", " ", "near \";\": syntax error"},
-        {R"({"limit":2})", "IMIT ", "no such column: IMIT"},
-        {R"({"uid":[]})", " ( )", "near \")\": syntax error"},
-        {R"({"uid":null})", " (uid= )", "near \")\": syntax error"},
-        {R"({"uid":"x"})", " (uid=x )", "no such column: x"},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.szFilter);
-        const std::string strSql = SELECT + " WHERE " + row.strCondition + ";";
+    const auto fails = [&](const char* szFilter, const std::string& strCondition,
+                           const std::string& strError) {
+        SCOPED_TRACE(szFilter);
+        const std::string strSql = SELECT + " WHERE " + strCondition + ";";
         errno = EIO;
-        EXPECT_EQ(-1, get(row.szFilter));
+        EXPECT_EQ(-1, get(szFilter));
         EXPECT_EQ(strSql, m_db.m_strSql);
-        EXPECT_EQ(row.strError, m_db.m_strErr);
+        EXPECT_EQ(strError, m_db.m_strErr);
         EXPECT_TRUE(m_jOut.isNull());
-        EXPECT_LINES(failureOf(strSql, row.strError, EIO) + Texts{failed(STORE, RUN_QUERY_FAILED, EIO)});
-    }
+        EXPECT_LINES(failureOf(strSql, strError, EIO) + Texts{failed(STORE, RUN_QUERY_FAILED, EIO)});
+    };
+    fails(R"({"sort_by":"uid"})", " order by 'uid'", "near \"order\": syntax error");
+    fails(R"({"function":"VPN","limit":0})", " (function='VPN' ) LIMIT ", "near \";\": syntax error");
+    fails(R"({"function":"VPN","limit":0,"offset":0})", " (function='VPN' ) LIMIT  OFFSET ",
+          "no such column: OFFSET");
+    fails(R"({"limit":0})", " LIMIT ", "near \"LIMIT\": syntax error");
+    fails(R"({"limit":6})", " ", "near \";\": syntax error");
+    fails(R"({"limit":2})", "IMIT ", "no such column: IMIT");
+    fails(R"({"uid":[]})", " ( )", "near \")\": syntax error");
+    fails(R"({"uid":null})", " (uid= )", "near \")\": syntax error");
+    fails(R"({"uid":"x"})", " (uid=x )", "no such column: x");
     EXPECT_EQ(0, get("{}"));
     EXPECT_EQ("", m_db.m_strErr);
 }
@@ -265,32 +256,28 @@ TEST_F(Query, ReportsFailureAfterALockThatItWaitedOut)
 
 TEST_F(Query, GetsTheFirstRowWhoseFieldMatches)
 {
-    const struct {
-        const char *szName, *szValue;
-        std::string strCondition;
-        const char* szTid; // null when none matches
-    } rows[] = {
-        {"tid", "Ab12", " WHERE  (tid='Ab12' )", "Ab12"},
-        {"uid", "1024", " WHERE  (uid=1024 )", "Ab12"},
-        {"uid", "7", " WHERE  (uid=7 )", "Ef56"},
-        {"create_time", "300", " WHERE  (create_time=300 )", "Cd34"},
-        {"bind_sid", "S1", " WHERE  (bind_sid='S1' )", "Ab12"},
-        {"bind_sid", "s'1", " WHERE  (bind_sid='s''1' )", nullptr},
-        {"tid", "nobody", " WHERE  (tid='nobody' )", nullptr},
-        {"extra", "{}", " WHERE  (extra='\"{}\"' )", nullptr}, // the value is a text, in JSON too
-        // What is no field selects the whole table.
-        {"foo", "x", "", "Ab12"},
-        {"Tid", "Ef56", "", "Ab12"},
-        {"offset", "3", "", "Ab12"},
-        {"sort_direction", "desc", "", "Ab12"},
+    // szTid is null when no row matches.
+    const auto getsOne = [&](const char* szName, const char* szValue, const std::string& strCondition,
+                             const char* szTid) {
+        SCOPED_TRACE(std::string(szName) + "=" + szValue);
+        EXPECT_EQ(szTid ? 1 : 0, getOne(szName, szValue));
+        EXPECT_EQ(SELECT + strCondition + ";", m_db.m_strSql);
+        EXPECT_EQ(szTid ? 9u : 0u, m_jOut.size());
+        EXPECT_EQ(szTid ? szTid : "", m_jOut["tid"].asString());
     };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(std::string(row.szName) + "=" + row.szValue);
-        EXPECT_EQ(row.szTid ? 1 : 0, getOne(row.szName, row.szValue));
-        EXPECT_EQ(SELECT + row.strCondition + ";", m_db.m_strSql);
-        EXPECT_EQ(row.szTid ? 9u : 0u, m_jOut.size());
-        EXPECT_EQ(row.szTid ? row.szTid : "", m_jOut["tid"].asString());
-    }
+    getsOne("tid", "Ab12", " WHERE  (tid='Ab12' )", "Ab12");
+    getsOne("uid", "1024", " WHERE  (uid=1024 )", "Ab12");
+    getsOne("uid", "7", " WHERE  (uid=7 )", "Ef56");
+    getsOne("create_time", "300", " WHERE  (create_time=300 )", "Cd34");
+    getsOne("bind_sid", "S1", " WHERE  (bind_sid='S1' )", "Ab12");
+    getsOne("bind_sid", "s'1", " WHERE  (bind_sid='s''1' )", nullptr);
+    getsOne("tid", "nobody", " WHERE  (tid='nobody' )", nullptr);
+    getsOne("extra", "{}", " WHERE  (extra='\"{}\"' )", nullptr); // the value is a text, in JSON too
+    // What is no field selects the whole table.
+    getsOne("foo", "x", "", "Ab12");
+    getsOne("Tid", "Ef56", "", "Ab12");
+    getsOne("offset", "3", "", "Ab12");
+    getsOne("sort_direction", "desc", "", "Ab12");
     // The name of an ordering key is one as well.
     EXPECT_EQ(-1, getOne("sort_by", "uid"));
     EXPECT_EQ(json("{}"), m_jOut);
@@ -305,40 +292,33 @@ TEST_F(Query, GetsTheFirstRowWhoseFieldMatches)
 
 TEST_F(Query, DeletesWhatTheFilterSelects)
 {
-    const struct {
-        const char* szFilter;
-        bool bAll;
-        const char* szSql;
-        int nResult;
-        std::string strLeft;
-    } rows[] = {
-        {R"({"tid":"Ab12"})", false, "DELETE FROM token WHERE  (tid='Ab12' );", 1, "Cd34 Ef56"},
-        {R"({"bind_sid":"S1","function":"VPN"})", false,
-         "DELETE FROM token WHERE  (bind_sid='S1' and function='VPN' );", 1, "Cd34 Ef56"},
-        {"{}", true, "DELETE FROM token;", 3, ""},
-        {"{}", false, "earlier", -1, ALL},
-        {R"({"limit":3})", false, "earlier", -1, ALL},
-        {R"({"limit":3})", true, "DELETE FROM token;", 3, ""},
-        {R"({"foo":"x"})", false, "earlier", -1, ALL},
-        {R"({"foo":{},"sort_by":5,"limit":"x"})", true, "DELETE FROM token;", 3, ""},
-        // A condition counts whatever bAll says; no row is no failure.
-        {R"({"uid":7})", true, "DELETE FROM token WHERE  (uid=7 );", 1, "Ab12 Cd34"},
-        {R"({"uid":[10,24]})", false, "DELETE FROM token WHERE  (uid in (1024 ) );", 2, "Ef56"},
-        {R"({"tid":"nobody"})", false, "DELETE FROM token WHERE  (tid='nobody' );", 0, ALL},
-        {R"({"uid":1024,"limit":0,"offset":0,"sort_by":"uid"})", false,
-         "DELETE FROM token WHERE  (uid=1024 );", 2, "Ef56"},
-        {R"({"tid":"' OR 1; --"})", true, "DELETE FROM token WHERE  (tid=''' OR 1; --' );", 0, ALL},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(std::string(row.szFilter) + (row.bAll ? " all" : ""));
+    const auto deletes = [&](const char* szFilter, bool bAll, const char* szSql, int nResult,
+                             const std::string& strLeft) {
+        SCOPED_TRACE(std::string(szFilter) + (bAll ? " all" : ""));
         fill();
         m_db.m_strSql = "earlier";
-        EXPECT_EQ(row.nResult, remove(row.szFilter, row.bAll));
-        EXPECT_EQ(row.szSql, m_db.m_strSql);
-        EXPECT_EQ(row.strLeft, tids());
+        EXPECT_EQ(nResult, remove(szFilter, bAll));
+        EXPECT_EQ(szSql, m_db.m_strSql);
+        EXPECT_EQ(strLeft, tids());
         EXPECT_EQ("", m_db.m_strErr);
-        EXPECT_LINES(0 > row.nResult ? Texts{failed(STORE, "strSql.empty()")} : Texts{});
-    }
+        EXPECT_LINES(0 > nResult ? Texts{failed(STORE, "strSql.empty()")} : Texts{});
+    };
+    deletes(R"({"tid":"Ab12"})", false, "DELETE FROM token WHERE  (tid='Ab12' );", 1, "Cd34 Ef56");
+    deletes(R"({"bind_sid":"S1","function":"VPN"})", false,
+            "DELETE FROM token WHERE  (bind_sid='S1' and function='VPN' );", 1, "Cd34 Ef56");
+    deletes("{}", true, "DELETE FROM token;", 3, "");
+    deletes("{}", false, "earlier", -1, ALL);
+    deletes(R"({"limit":3})", false, "earlier", -1, ALL);
+    deletes(R"({"limit":3})", true, "DELETE FROM token;", 3, "");
+    deletes(R"({"foo":"x"})", false, "earlier", -1, ALL);
+    deletes(R"({"foo":{},"sort_by":5,"limit":"x"})", true, "DELETE FROM token;", 3, "");
+    // A condition counts whatever bAll says; no row is no failure.
+    deletes(R"({"uid":7})", true, "DELETE FROM token WHERE  (uid=7 );", 1, "Ab12 Cd34");
+    deletes(R"({"uid":[10,24]})", false, "DELETE FROM token WHERE  (uid in (1024 ) );", 2, "Ef56");
+    deletes(R"({"tid":"nobody"})", false, "DELETE FROM token WHERE  (tid='nobody' );", 0, ALL);
+    deletes(R"({"uid":1024,"limit":0,"offset":0,"sort_by":"uid"})", false,
+            "DELETE FROM token WHERE  (uid=1024 );", 2, "Ef56");
+    deletes(R"({"tid":"' OR 1; --"})", true, "DELETE FROM token WHERE  (tid=''' OR 1; --' );", 0, ALL);
 }
 
 TEST_F(Query, DeletesNothingWhereSqliteRefusesTheStatement)

@@ -136,49 +136,40 @@ TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
 // The text of the error decides whether a statement is tried again, not the code.
 TEST_F(RunSql, TriesAgainOnlyAfterLocks)
 {
-    const struct {
-        const char* szName;
-        std::vector<Answer> answers; // one for each try
-        const char* szErrAfter;
-        const char* szError; // of the failure line; null when the statement succeeds
-    } rows[] = {
-        {"success", {RUN}, "", nullptr},
-        {"success with a text", {{SQLITE_OK, "no matter"}}, "", nullptr},
-        {"lock", {LOCKED, {SQLITE_BUSY, "(2) database is locked"}, RUN}, "(2) database is locked", nullptr},
-        {"lock of another code",
-         {{SQLITE_ERROR, "cannot: database is locked!"}, RUN},
-         "cannot: database is locked!",
-         nullptr},
-        {"lock, then error", {LOCKED, DISK_ERROR}, "disk I/O error", "disk I/O error"},
-        {"lock, then no text", {LOCKED, {SQLITE_MISUSE, nullptr}}, "Unknow Error!!", "(null)"},
-        {"busy with another text", {{SQLITE_BUSY, "busy"}}, "busy", "busy"},
-        {"busy without text", {{SQLITE_BUSY, nullptr}}, "Unknow Error!!", "(null)"},
-        {"locked table",
-         {{SQLITE_LOCKED, "database table is locked: a"}},
-         "database table is locked: a",
-         "database table is locked: a"},
-        {"other spelling", {{SQLITE_BUSY, "Database is locked"}}, "Database is locked", "Database is locked"},
-        {"empty text", {{SQLITE_ERROR, ""}}, "", ""},
-        {"directives", {{SQLITE_ERROR, "near \"%n%s\""}}, "near \"%n%s\"", "near \"%n%s\""},
-    };
-    for (const auto& row : rows) {
+    // One answer for each try. szError is that of the failure line, null when the statement succeeds.
+    const auto runs = [&](const char* szName, const std::vector<Answer>& answers, const char* szErrAfter,
+                          const char* szError) {
         for (const bool blCallback : {false, true}) {
-            SCOPED_TRACE(::testing::Message() << row.szName << " " << blCallback);
-            const int nWaits = static_cast<int>(row.answers.size()) - 1;
+            SCOPED_TRACE(::testing::Message() << szName << " " << blCallback);
+            const int nWaits = static_cast<int>(answers.size()) - 1;
             reset();
-            answerStatements(UPDATE, row.answers);
-            EXPECT_EQ(row.szError ? -1 : blCallback ? 0 : 2, run(UPDATE, blCallback ? countRow : nullptr));
-            EXPECT_EQ(row.szErrAfter, m_db.m_strErr);
+            answerStatements(UPDATE, answers);
+            EXPECT_EQ(szError ? -1 : blCallback ? 0 : 2, run(UPDATE, blCallback ? countRow : nullptr));
+            EXPECT_EQ(szErrAfter, m_db.m_strErr);
             Texts calls = {"sqlite3_exec " + UPDATE};
             for (int i = 0; i < nWaits; ++i) {
                 calls = calls + Texts{"usleep 10000", calls[0]};
             }
-            EXPECT_EQ(calls + (row.szError || blCallback ? Texts{} : Texts{CHANGES}), seam().calls);
-            EXPECT_LINES(row.szError ? Texts{tryLine(nWaits, row.szError),
-                                             fail(STORE, "run sql failed, sql=" + UPDATE, EIO)}
-                                     : Texts{});
+            EXPECT_EQ(calls + (szError || blCallback ? Texts{} : Texts{CHANGES}), seam().calls);
+            EXPECT_LINES(
+                szError ? Texts{tryLine(nWaits, szError), fail(STORE, "run sql failed, sql=" + UPDATE, EIO)}
+                        : Texts{});
         }
-    }
+    };
+    runs("success", {RUN}, "", nullptr);
+    runs("success with a text", {{SQLITE_OK, "no matter"}}, "", nullptr);
+    runs("lock", {LOCKED, {SQLITE_BUSY, "(2) database is locked"}, RUN}, "(2) database is locked", nullptr);
+    runs("lock of another code", {{SQLITE_ERROR, "cannot: database is locked!"}, RUN},
+         "cannot: database is locked!", nullptr);
+    runs("lock, then error", {LOCKED, DISK_ERROR}, "disk I/O error", "disk I/O error");
+    runs("lock, then no text", {LOCKED, {SQLITE_MISUSE, nullptr}}, "Unknow Error!!", "(null)");
+    runs("busy with another text", {{SQLITE_BUSY, "busy"}}, "busy", "busy");
+    runs("busy without text", {{SQLITE_BUSY, nullptr}}, "Unknow Error!!", "(null)");
+    runs("locked table", {{SQLITE_LOCKED, "database table is locked: a"}}, "database table is locked: a",
+         "database table is locked: a");
+    runs("other spelling", {{SQLITE_BUSY, "Database is locked"}}, "Database is locked", "Database is locked");
+    runs("empty text", {{SQLITE_ERROR, ""}}, "", "");
+    runs("directives", {{SQLITE_ERROR, "near \"%n%s\""}}, "near \"%n%s\"", "near \"%n%s\"");
 }
 
 TEST_F(RunSql, WaitsForAnotherConnection)

@@ -116,51 +116,45 @@ TEST_F(Save, ExpandersAppend)
 // The caller is responsible for types: a value is written as the JSON library converts it.
 TEST_F(Save, RendersEachField)
 {
-    const struct {
-        const char* szField;
-        const char* szValue;
-        const char* szSql;
-    } rows[] = {
-        {"tid", R"("it's")", "'it''s'"},
-        {"tid", R"("''")", "''''''"},
-        {"tid", R"("%Q %s %n %%")", "'%Q %s %n %%'"},
-        {"tid", R"("a\\\"\n;--")", "'a\\\"\n;--'"},
-        {"tid", R"("x'); DROP TABLE token; --")", "'x''); DROP TABLE token; --'"},
-        {"bind_sid", R"("")", "''"},
-        {"bind_sid", R"("NULL")", "'NULL'"},
-        {"bind_sid", R"("cut\u0000here")", "'cut'"},
-        {"uid", "4294967295", "4294967295"},
-        {"uid", "null", "0"},
-        {"deadline", "-9223372036854775808", "-9223372036854775808"},
-        {"deadline", "9223372036854775807", "9223372036854775807"},
-        {"deadline", "true", "1"},
-        {"count", "0", "0"},
-        {"count", "2.9", "2"},
-        {"create_time", "null", "0"},
-        {"function", R"("'")", "''''"},
-        {"webapi_allow", "{}", "'{}'"},
-        {"webapi_allow", "null", "'null'"},
-        {"webapi_allow", R"({"it's":["'"]})", R"('{"it''s":["''"]}')"},
-        {"extra", "[]", "'[]'"},
-        {"extra", R"("text")", R"('"text"')"},
-        {"extra", "-1", "'-1'"},
-        {"extra", R"({"b":1, "a" : {"c":true}})", R"('{"a":{"c":true},"b":1}')"},
-        {"extra", R"("\u0000\u001f\n\u007fü")", "'\"\\u0000\\u001f\\n\x7fü\"'"},
-    };
     seam().sqliteExec = [](sqlite3*, const char*, auto, void*, char**) { return SQLITE_OK; };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(std::string(row.szField) + " " + row.szValue);
+    const auto renders = [&](const char* szField, const char* szValue, const char* szSql) {
+        SCOPED_TRACE(std::string(szField) + " " + szValue);
         // The statement of a record with a mark in place of the value.
         Json::Value jToken = token();
-        const bool blNumber = jToken[row.szField].isNumeric();
-        jToken[row.szField] = blNumber ? Json::Value(77777) : "MARK";
+        const bool blNumber = jToken[szField].isNumeric();
+        jToken[szField] = blNumber ? Json::Value(77777) : "MARK";
         std::string strSql = saveSql("INSERT", jToken);
         const std::string strMark = blNumber ? "77777" : "'MARK'";
-        strSql.replace(strSql.find(strMark), strMark.size(), row.szSql);
-        jToken[row.szField] = json(row.szValue);
+        strSql.replace(strSql.find(strMark), strMark.size(), szSql);
+        jToken[szField] = json(szValue);
         EXPECT_EQ(0, save(jToken, true));
         EXPECT_EQ(strSql, m_db.m_strSql);
-    }
+    };
+    renders("tid", R"("it's")", "'it''s'");
+    renders("tid", R"("''")", "''''''");
+    renders("tid", R"("%Q %s %n %%")", "'%Q %s %n %%'");
+    renders("tid", R"("a\\\"\n;--")", "'a\\\"\n;--'");
+    renders("tid", R"("x'); DROP TABLE token; --")", "'x''); DROP TABLE token; --'");
+    renders("bind_sid", R"("")", "''");
+    renders("bind_sid", R"("NULL")", "'NULL'");
+    renders("bind_sid", R"("cut\u0000here")", "'cut'");
+    renders("uid", "4294967295", "4294967295");
+    renders("uid", "null", "0");
+    renders("deadline", "-9223372036854775808", "-9223372036854775808");
+    renders("deadline", "9223372036854775807", "9223372036854775807");
+    renders("deadline", "true", "1");
+    renders("count", "0", "0");
+    renders("count", "2.9", "2");
+    renders("create_time", "null", "0");
+    renders("function", R"("'")", "''''");
+    renders("webapi_allow", "{}", "'{}'");
+    renders("webapi_allow", "null", "'null'");
+    renders("webapi_allow", R"({"it's":["'"]})", R"('{"it''s":["''"]}')");
+    renders("extra", "[]", "'[]'");
+    renders("extra", R"("text")", R"('"text"')");
+    renders("extra", "-1", "'-1'");
+    renders("extra", R"({"b":1, "a" : {"c":true}})", R"('{"a":{"c":true},"b":1}')");
+    renders("extra", R"("\u0000\u001f\n\u007fü")", "'\"\\u0000\\u001f\\n\x7fü\"'");
 }
 
 // For what the JSON library cannot convert, it throws; nothing is run.

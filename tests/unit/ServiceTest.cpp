@@ -273,32 +273,28 @@ TEST_F(Lookup, MakesListsForFilters)
     const std::string strType =
         "jParamOut.type() != Json::objectValue && jParamOut.type() != Json::nullValue";
     const std::string strName = "!szField || !szField[0]";
-    const struct {
-        Texts values;
-        const char *szField, *szParam, *szResult;
-        std::string strCondition; // of the failure; "": the list is made
-    } rows[] = {
-        {{"a"}, "tid", "null", R"({"tid":["a"]})", ""},
-        {{"b", "a", "b", ""}, "bind_sid", "{}", R"({"bind_sid":["b","a","b",""]})", ""},
-        {{}, "tid", R"({"tid":["old"]})", R"({"tid":[]})", ""},
-        {{"1"}, "tid", R"({"tid":"old","uid":5})", R"({"tid":["1"],"uid":5})", ""},
-        {{"it's \""}, "no field", R"({"tid":"t"})", R"({"no field":["it's \""],"tid":"t"})", ""},
-        {{"a"}, nullptr, "{}", "{}", strName},
-        {{"a"}, "", "null", "null", strName},
-        {{"a"}, "tid", "[]", "[]", strType},
-        {{"a"}, "tid", R"("")", R"("")", strType},
-        {{"a"}, "tid", "0", "0", strType},
-        {{"a"}, nullptr, "[]", "[]", strType},
+    // The condition is that of the failure, "" when the list is made.
+    const auto makes = [&](const Texts& list, const char* szField, const char* szParam, const char* szResult,
+                           const std::string& strCondition) {
+        SCOPED_TRACE(szResult);
+        Texts values = list;
+        Json::Value jParam = json(szParam);
+        EXPECT_EQ(strCondition.empty() ? 0 : -1, api().VectorParamToJson(values, szField, jParam));
+        EXPECT_EQ(json(szResult), jParam);
+        EXPECT_EQ(list, values);
+        EXPECT_LINES(strCondition.empty() ? Texts{} : Texts{failed(SERVICE, strCondition)});
     };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.szResult);
-        Texts values = row.values;
-        Json::Value jParam = json(row.szParam);
-        EXPECT_EQ(row.strCondition.empty() ? 0 : -1, api().VectorParamToJson(values, row.szField, jParam));
-        EXPECT_EQ(json(row.szResult), jParam);
-        EXPECT_EQ(row.values, values);
-        EXPECT_LINES(row.strCondition.empty() ? Texts{} : Texts{failed(SERVICE, row.strCondition)});
-    }
+    makes({"a"}, "tid", "null", R"({"tid":["a"]})", "");
+    makes({"b", "a", "b", ""}, "bind_sid", "{}", R"({"bind_sid":["b","a","b",""]})", "");
+    makes({}, "tid", R"({"tid":["old"]})", R"({"tid":[]})", "");
+    makes({"1"}, "tid", R"({"tid":"old","uid":5})", R"({"tid":["1"],"uid":5})", "");
+    makes({"it's \""}, "no field", R"({"tid":"t"})", R"({"no field":["it's \""],"tid":"t"})", "");
+    makes({"a"}, nullptr, "{}", "{}", strName);
+    makes({"a"}, "", "null", "null", strName);
+    makes({"a"}, "tid", "[]", "[]", strType);
+    makes({"a"}, "tid", R"("")", R"("")", strType);
+    makes({"a"}, "tid", "0", "0", strType);
+    makes({"a"}, nullptr, "[]", "[]", strType);
 }
 
 } // namespace

@@ -41,32 +41,27 @@ TEST_F(TokenId, HasEveryLengthFrom127To255AndEveryLetterAndDigit)
 TEST_F(TokenId, TakesCharactersInTheOrderOfTheAlphabet)
 {
     const std::string strAlphabet = "0987654321abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ";
-    const struct {
-        unsigned char nLength; // of 129
-        unsigned char nFirst;  // of the bytes that follow, each one greater than the one before it
-        std::string strTid;
-    } rows[] = {
-        {0, 0, strAlphabet + strAlphabet + "098"},
-        {61, 0, strAlphabet + strAlphabet + strAlphabet + "09"},
-        {128, 0, strAlphabet + strAlphabet + strAlphabet + strAlphabet + "0987654"},
-        {0, 61, "Z" + strAlphabet + strAlphabet + "09"},
-        {0, 246, "YZ" + strAlphabet + strAlphabet + "0"},
-    };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.strTid);
+    // nLength of 129; the bytes that follow start at nFirst and count up.
+    const auto generates = [](unsigned char nLength, unsigned char nFirst, const std::string& strExpected) {
+        SCOPED_TRACE(strExpected);
         seam().calls.clear();
-        seam().random = [&row, nByte = row.nFirst](void* pBuffer, size_t cbBuffer, unsigned int) mutable {
+        seam().random = [=, nByte = nFirst](void* pBuffer, size_t cbBuffer, unsigned int) mutable {
             unsigned char* const pBytes = static_cast<unsigned char*>(pBuffer);
             const bool blLength = 1 == seam().calls.size();
             for (size_t i = 0; i < cbBuffer; ++i) {
-                pBytes[i] = blLength ? (0 == i ? row.nLength : 0) : nByte++;
+                pBytes[i] = blLength ? (0 == i ? nLength : 0) : nByte++;
             }
             return static_cast<ssize_t>(cbBuffer);
         };
         std::string strTid;
         EXPECT_LE(0, tokenGenerate(strTid));
-        EXPECT_EQ(row.strTid, strTid);
-    }
+        EXPECT_EQ(strExpected, strTid);
+    };
+    generates(0, 0, strAlphabet + strAlphabet + "098");
+    generates(61, 0, strAlphabet + strAlphabet + strAlphabet + "09");
+    generates(128, 0, strAlphabet + strAlphabet + strAlphabet + strAlphabet + "0987654");
+    generates(0, 61, "Z" + strAlphabet + strAlphabet + "09");
+    generates(0, 246, "YZ" + strAlphabet + strAlphabet + "0");
 }
 
 TEST_F(TokenId, FailsWithTheRandomSourceUnlessThatWasInterrupted)
