@@ -9,7 +9,6 @@
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
-#include <functional>
 #include <thread>
 
 #include "Statements.h"
@@ -32,47 +31,6 @@ Json::Value created(const std::string& strTid)
                                   "function":"VPN","webapi_allow":{},"extra":{}})");
     jToken["tid"] = strTid;
     return jToken;
-}
-
-// The functions, bound to their arguments.
-typedef std::function<int()> Call;
-
-Call create(unsigned int uid, const char* szOption, std::string strTid = "")
-{
-    return [=]() mutable {
-        Json::Value jOption = json(szOption);
-        std::string strFunction = "VPN";
-        return strTid.empty() ? VemoAccessTokenCreate(uid, strFunction, jOption, strTid)
-                              : VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid);
-    };
-}
-
-Call grantEx(std::string strTid, const char* szApi, const char* szMethod)
-{
-    return [=]() mutable {
-        Json::Value jToken;
-        return VemoAccessTokenGrantEx(strTid, szApi, szMethod, jToken);
-    };
-}
-
-Call grant(std::string strTid, const char* szApi, const char* szMethod)
-{
-    return [=]() mutable { return VemoAccessTokenGrant(strTid, szApi, szMethod, nullptr, 0); };
-}
-
-Call deleteByTid(std::string strTid)
-{
-    return [=]() mutable { return VemoAccessTokenDeleteByTid(strTid); };
-}
-
-Call deleteByFunction(std::string strFunction)
-{
-    return [=]() mutable { return VemoAccessTokenDeleteByFunction(strFunction); };
-}
-
-Call deleteByBindSid(const char* szSid)
-{
-    return [=] { return VemoAccessTokenDeleteByBindSid(szSid); };
 }
 
 // Each call opens the database, runs the statements and closes it, in this order.
@@ -105,6 +63,26 @@ protected:
         insert(R"({"tid":"u","bind_sid":"S2","function":"MAIL"})");
         insert(R"({"tid":"old","deadline":1699999999})");
     }
+
+    // The functions, which take references, for values.
+    static int create(unsigned int uid, const char* szOption, std::string strTid = "")
+    {
+        Json::Value jOption = json(szOption);
+        std::string strFunction = "VPN";
+        return strTid.empty() ? VemoAccessTokenCreate(uid, strFunction, jOption, strTid)
+                              : VemoAccessTokenCreateByTid(uid, strFunction, jOption, strTid);
+    }
+    static int grantEx(std::string strTid, const char* szApi, const char* szMethod)
+    {
+        Json::Value jToken;
+        return VemoAccessTokenGrantEx(strTid, szApi, szMethod, jToken);
+    }
+    static int grantOnly(std::string strTid, const char* szApi, const char* szMethod)
+    {
+        return VemoAccessTokenGrant(strTid, szApi, szMethod, nullptr, 0);
+    }
+    static int deleteByTid(std::string strTid) { return VemoAccessTokenDeleteByTid(strTid); }
+    static int deleteByFunction(std::string strTag) { return VemoAccessTokenDeleteByFunction(strTag); }
 };
 
 TEST_F(Exported, PurgeThenOperateAndDoSoAfterAFailedPurge)
@@ -119,32 +97,31 @@ TEST_F(Exported, PurgeThenOperateAndDoSoAfterAFailedPurge)
         failed(SERVICE, "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN"),
         ordinary(SERVICE, "tokenCreate failed, tid=short, uid=1000, strFunction=VPN, jTokenOption=null")};
     // The statements follow that of the purge.
-    const auto purges = [&](const char* szName, const Call& call, int nResult, const Texts& statements,
-                            const Texts& lines) {
+    const auto purges = [&](int (*pCall)(), int nResult, const Texts& statements, const Texts& lines) {
         for (const bool blPurged : {true, false}) {
-            SCOPED_TRACE(szName);
+            SCOPED_TRACE(joined(statements + lines, ""));
             fill();
             reset();
             failStatements(PURGE, {SQLITE_IOERR, "disk I/O error", 0}, blPurged ? 0 : 1);
-            EXPECT_EQ(nResult, call());
+            EXPECT_EQ(nResult, pCall());
             expectCalls(Texts{PURGE} + statements);
             // The store logs its statement; the purge itself logs nothing.
             EXPECT_LINES((blPurged ? Texts{} : failureOf(PURGE, "disk I/O error")) + lines);
             EXPECT_EQ(blPurged ? "" : "3", countOf("old"));
         }
     };
-    purges("create refused", create(UID_ERR, "null"), -1, {}, {failed(SERVICE, "uid == UID_ERR")});
-    purges("create by tid", create(1000, "null", tid("n")), 0, {strInsert}, {});
-    purges("create by tid refused", create(1000, "null", "short"), -1, {}, shortTid);
-    purges("grant ex", grantEx("t", "Api", "get"), 0, {SELECT_T, strReplace}, {});
-    purges("grant ex refused", grantEx("t", "api", "get"), -1, {SELECT_T}, {NOT_PERMITTED});
-    purges("grant", grant("t", "Api", "get"), 0, {SELECT_T, strReplace}, {});
-    purges("grant refused", grant("t", "Api", "put"), -1, {SELECT_T}, {GRANT_REFUSED});
-    purges("delete by tid", deleteByTid("t"), 1, {deleteSql("tid", "t")}, {});
-    purges("delete by unknown tid", deleteByTid("z"), 0, {deleteSql("tid", "z")}, {});
-    purges("delete by tid refused", deleteByTid(""), -1, {}, emptyValue("tid"));
-    purges("delete by function", deleteByFunction("MAIL"), 1, {deleteSql("function", "MAIL")}, {});
-    purges("delete by function refused", deleteByFunction(""), -1, {}, emptyValue("function"));
+    purges([] { return create(UID_ERR, "null"); }, -1, {}, {failed(SERVICE, "uid == UID_ERR")});
+    purges([] { return create(1000, "null", tid("n")); }, 0, {strInsert}, {});
+    purges([] { return create(1000, "null", "short"); }, -1, {}, shortTid);
+    purges([] { return grantEx("t", "Api", "get"); }, 0, {SELECT_T, strReplace}, {});
+    purges([] { return grantEx("t", "api", "get"); }, -1, {SELECT_T}, {NOT_PERMITTED});
+    purges([] { return grantOnly("t", "Api", "get"); }, 0, {SELECT_T, strReplace}, {});
+    purges([] { return grantOnly("t", "Api", "put"); }, -1, {SELECT_T}, {GRANT_REFUSED});
+    purges([] { return deleteByTid("t"); }, 1, {deleteSql("tid", "t")}, {});
+    purges([] { return deleteByTid("z"); }, 0, {deleteSql("tid", "z")}, {});
+    purges([] { return deleteByTid(""); }, -1, {}, emptyValue("tid"));
+    purges([] { return deleteByFunction("MAIL"); }, 1, {deleteSql("function", "MAIL")}, {});
+    purges([] { return deleteByFunction(""); }, -1, {}, emptyValue("function"));
 }
 
 TEST_F(Exported, DeleteByBindSidDoesNotPurge)
@@ -152,7 +129,7 @@ TEST_F(Exported, DeleteByBindSidDoesNotPurge)
     const std::string strNoSid = failed(WRAPPER, "!szSid || !szSid[0]");
     const auto deletes = [&](const char* szSid, int nResult, const Texts& statements, const Texts& lines) {
         seam().calls.clear();
-        EXPECT_EQ(nResult, deleteByBindSid(szSid)());
+        EXPECT_EQ(nResult, VemoAccessTokenDeleteByBindSid(szSid));
         expectCalls(statements);
         EXPECT_LINES(lines);
     };
@@ -202,30 +179,28 @@ TEST_F(Exported, GrantExHandsTheRecordBackOrLeavesItAlone)
 
 TEST_F(Exported, LetExceptionsPassOnceTheDatabaseIsClosed)
 {
-    const std::pair<Call, Texts> throwing[] = {
-        {create(1000, R"({"deadline":"soon"})"), {PURGE}},
-        {create(1000, R"({"deadline":"soon"})", tid()), {PURGE}},
-        {create(1000, R"({"deadline":4294967296})", tid()), {PURGE}},
-        {grantEx("t", "Odd", "get"), {PURGE, SELECT_T}},
-        {grant("t", "Odd", "get"), {PURGE, SELECT_T}},
-    };
-    for (const auto& [call, statements] : throwing) {
+    const auto throws = [](int (*pCall)(), const Texts& statements) {
         seam().calls.clear();
-        EXPECT_THROW(call(), Json::LogicError);
-        expectCalls(statements);
-    }
+        EXPECT_THROW(pCall(), Json::LogicError);
+        expectCalls(Texts{PURGE} + statements);
+    };
+    throws([] { return create(1000, R"({"deadline":"soon"})"); }, {});
+    throws([] { return create(1000, R"({"deadline":"soon"})", tid()); }, {});
+    throws([] { return create(1000, R"({"deadline":4294967296})", tid()); }, {});
+    throws([] { return grantEx("t", "Odd", "get"); }, {SELECT_T});
+    throws([] { return grantOnly("t", "Odd", "get"); }, {SELECT_T});
     EXPECT_EQ("2", countOf());
 }
 
 TEST_F(Exported, FailWhenTheDatabaseCannotBeOpened)
 {
     seam().fail("seteuid", EPERM, 1, INT_MAX);
-    for (const Call& call :
-         {create(1000, "null"), create(1000, "null", tid()), grantEx("t", "Api", "get"),
-          grant("t", "Api", "get"), deleteByTid("t"), deleteByBindSid("S1"), deleteByFunction("VPN")}) {
-        EXPECT_EQ(-1, call());
-        EXPECT_EQ(NOT_ROOT, takeLines().front());
+    for (const int nResult : {create(1000, "null"), create(1000, "null", tid()), grantEx("t", "Api", "get"),
+                              grantOnly("t", "Api", "get"), deleteByTid("t"),
+                              VemoAccessTokenDeleteByBindSid("S1"), deleteByFunction("VPN")}) {
+        EXPECT_EQ(-1, nResult);
     }
+    EXPECT_EQ(NOT_ROOT, takeLines().front());
     EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_open", "sqlite3_exec", "sqlite3_close"}));
 }
 

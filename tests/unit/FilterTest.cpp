@@ -149,56 +149,47 @@ TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
     keeps(R"({"count":[1],"uid":[1,2,3]})", 4, "held (count in (1 ) and ", LIST_TEXT_FAILED, LIST_FAILED);
 }
 
-// How a value is written in a condition of its own and as an element of a list: for a field of text, of JSON
-// and of a number.
-const struct {
-    const char* szValue;
-    std::string strText, strJson, strNumber;
-} VALUES[] = {
-    {"null", "''", "'null'", ""},
-    {"true", "'true'", "'true'", "true"},
-    {"false", "'false'", "'false'", "false"},
-    {"0", "'0'", "'0'", "0"},
-    {"-7", "'-7'", "'-7'", "-7"},
-    {"-9223372036854775808", "'-9223372036854775808'", "'-9223372036854775808'", "-9223372036854775808"},
-    {"18446744073709551615", "'18446744073709551615'", "'18446744073709551615'", "18446744073709551615"},
-    {"1.5", "'1.5'", "'1.5'", "1.5"},
-    {"2.0", "'2.0'", "'2.0'", "2.0"},
-    {R"("")", "''", R"('""')", ""},
-    {R"("7")", "'7'", R"('"7"')", "7"},
-    {R"("it's")", "'it''s'", R"('"it''s"')", "it''s"},
-    {R"("''")", "''''''", R"('"''''"')", "''''"},
-    {R"("x'; DROP TABLE token; --")", "'x''; DROP TABLE token; --'", R"('"x''; DROP TABLE token; --"')",
-     "x''; DROP TABLE token; --"},
-    {R"("%s%n%q%Q")", "'%s%n%q%Q'", R"('"%s%n%q%Q"')", "%s%n%q%Q"},
-    {R"("a\"b\\c")", R"('a"b\c')", R"('"a\"b\\c"')", R"(a"b\c)"},
-    {R"("a\nb")", "'a\nb'", R"('"a\nb"')", "a\nb"},
-    {"\"gr\xc3\xbc\xc3\x9f\"", "'gr\xc3\xbc\xc3\x9f'", "'\"gr\xc3\xbc\xc3\x9f\"'", "gr\xc3\xbc\xc3\x9f"},
-    {R"("a\u0000b")", "'a'", R"('"a\u0000b"')", "a"}, // text ends at its first zero byte
-};
-
 TEST_F(Filter, WritesEachValueAsItsFieldDemands)
 {
-    for (const Field& field : fields()) {
-        for (const auto& value : VALUES) {
-            SCOPED_TRACE(std::string(field.szName) + "=" + value.szValue);
-            const std::string strValue = value.szValue;
+    // In a condition of its own and as an element of a list, for a field of text, of JSON and of a number.
+    const auto writes = [&](const std::string& strValue, const std::string& strText,
+                            const std::string& strJson, const std::string& strNumber) {
+        for (const Field& field : fields()) {
+            const std::string strName = field.szName;
             const std::string strType = field.szType;
-            const std::string& strSql = "string" == strType      ? value.strText
-                                        : "long long" == strType ? value.strNumber
-                                                                 : value.strJson;
+            SCOPED_TRACE(strName + "=" + strValue);
+            const std::string& strSql = "string" == strType      ? strText
+                                        : "long long" == strType ? strNumber
+                                                                 : strJson;
             m_strOut = "held ";
-            EXPECT_EQ(0, match(field.szName, json(strValue)));
-            EXPECT_EQ(std::string("held ") + field.szName + "=" + strSql, m_strOut);
+            EXPECT_EQ(0, match(strName, json(strValue)));
+            EXPECT_EQ("held " + strName + "=" + strSql, m_strOut);
             m_strOut = "held ";
             EXPECT_EQ(0, list(field.szName, json("[" + strValue + "]")));
-            EXPECT_EQ(std::string("held ") + field.szName + " in (" + strSql + " )", m_strOut);
+            EXPECT_EQ("held " + strName + " in (" + strSql + " )", m_strOut);
             // Nothing separates elements.
             m_strOut.clear();
             EXPECT_EQ(0, list(field.szName, json("[" + strValue + "," + strValue + "," + strValue + "]")));
-            EXPECT_EQ(field.szName + (" in (" + strSql + strSql + strSql + " )"), m_strOut);
+            EXPECT_EQ(strName + " in (" + strSql + strSql + strSql + " )", m_strOut);
         }
+    };
+    for (const std::string strValue :
+         {"true", "false", "0", "-7", "-9223372036854775808", "18446744073709551615", "1.5", "2.0"}) {
+        writes(strValue, "'" + strValue + "'", "'" + strValue + "'", strValue);
     }
+    writes("null", "''", "'null'", "");
+    writes(R"("")", "''", R"('""')", "");
+    writes(R"("7")", "'7'", R"('"7"')", "7");
+    writes(R"("it's")", "'it''s'", R"('"it''s"')", "it''s");
+    writes(R"("''")", "''''''", R"('"''''"')", "''''");
+    writes(R"("x'; DROP TABLE token; --")", "'x''; DROP TABLE token; --'", R"('"x''; DROP TABLE token; --"')",
+           "x''; DROP TABLE token; --");
+    writes(R"("%s%n%q%Q")", "'%s%n%q%Q'", R"('"%s%n%q%Q"')", "%s%n%q%Q");
+    writes(R"("a\"b\\c")", R"('a"b\c')", R"('"a\"b\\c"')", R"(a"b\c)");
+    writes(R"("a\nb")", "'a\nb'", R"('"a\nb"')", "a\nb");
+    writes("\"gr\xc3\xbc\xc3\x9f\"", "'gr\xc3\xbc\xc3\x9f'", "'\"gr\xc3\xbc\xc3\x9f\"'",
+           "gr\xc3\xbc\xc3\x9f");
+    writes(R"("a\u0000b")", "'a'", R"('"a\u0000b"')", "a"); // text ends at its first zero byte
 }
 
 TEST_F(Filter, WritesTextThatIsNotUtf8AsItIs)
@@ -324,33 +315,29 @@ TEST_F(Filter, ReleasesItsTextsAndTracesNothingInDebugMode)
 
 TEST_F(Filter, SortsByATextAndInOneOfTwoDirections)
 {
-    const std::pair<const char*, const char*> rows[] = {
-        {R"({"sort_by":"create_time"})", " order by 'create_time'"},
-        {R"({"sort_by":"create_time","sort_direction":"desc"})", " order by 'create_time' DESC"},
-        {R"({"sort_by":"uid","sort_direction":"asc"})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":"DESC"})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":"desc "})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":"desc\u0000"})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":null})", " order by 'uid' ASC"},
-        {R"({"sort_by":"uid","sort_direction":1})", " order by 'uid' ASC"},
-        {R"({"sort_by":""})", " order by ''"},
-        {R"({"sort_by":"x'; DROP TABLE token; --"})", " order by 'x''; DROP TABLE token; --'"},
-        {R"({"sort_by":"%s%n%q"})", " order by '%s%n%q'"},
-        {R"({"sort_by":"a\u0000b"})", " order by 'a'"},
-        {R"({"sort_by":"uid","sort_direction":"desc","limit":0,"offset":1})",
-         " order by 'uid' DESC LIMIT OFFSET "},
-        {R"({"sort_by":"uid","limit":7})", " order by 'uid'"},
-        {R"({"limit":0,"offset":0})", " LIMIT  OFFSET "},
-        {R"({"offset":3})", ""},
-        {R"({"tid":"a","foo":1})", ""},
-        {R"({"sort_direction":{},"offset":"x"})", ""}, // what is not read does not matter
-    };
-    for (const auto& [szFilter, szAppended] : rows) {
-        SCOPED_TRACE(szFilter);
+    const auto appends = [&](const std::string& strFilter, const std::string& strAppended) {
+        SCOPED_TRACE(strFilter);
         m_strOut = "held";
-        EXPECT_EQ(0, condition(json(szFilter)));
-        EXPECT_EQ(std::string("held") + szAppended, m_strOut);
+        EXPECT_EQ(0, condition(json(strFilter)));
+        EXPECT_EQ("held" + strAppended, m_strOut);
+    };
+    appends(R"({"sort_by":"create_time"})", " order by 'create_time'");
+    appends(R"({"sort_by":"create_time","sort_direction":"desc"})", " order by 'create_time' DESC");
+    for (const std::string strOther :
+         {R"("asc")", R"("DESC")", R"("desc ")", R"("desc\u0000")", "null", "1"}) {
+        appends(R"({"sort_by":"uid","sort_direction":)" + strOther + "}", " order by 'uid' ASC");
     }
+    appends(R"({"sort_by":""})", " order by ''");
+    appends(R"({"sort_by":"x'; DROP TABLE token; --"})", " order by 'x''; DROP TABLE token; --'");
+    appends(R"({"sort_by":"%s%n%q"})", " order by '%s%n%q'");
+    appends(R"({"sort_by":"a\u0000b"})", " order by 'a'");
+    appends(R"({"sort_by":"uid","sort_direction":"desc","limit":0,"offset":1})",
+            " order by 'uid' DESC LIMIT OFFSET ");
+    appends(R"({"sort_by":"uid","limit":7})", " order by 'uid'");
+    appends(R"({"limit":0,"offset":0})", " LIMIT  OFFSET ");
+    appends(R"({"offset":3})", "");
+    appends(R"({"tid":"a","foo":1})", "");
+    appends(R"({"sort_direction":{},"offset":"x"})", ""); // what is not read does not matter
 }
 
 TEST_F(Filter, WritesTheTailOfTheKeywordThatTheNumberPointsTo)

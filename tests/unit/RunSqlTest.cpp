@@ -115,22 +115,20 @@ TEST_F(RunSql, FailsWhenTheCallbackStopsIt)
 // The number is SQLite's own, which statements that change no row leave as it is.
 TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
 {
-    const std::pair<const char*, int> rows[] = {
-        {"UPDATE token SET uid = 1", 2},
-        {"SELECT tid FROM token", 2},
-        {"DELETE FROM token WHERE tid = 'c'", 0},
-        {"DELETE FROM token; INSERT INTO token (tid, function) VALUES ('c', '')", 1},
-        {" ", 1},
-        {"-- nothing", 1},
-    };
-    for (const auto& [szSql, nChanges] : rows) {
+    const auto returns = [&](const char* szSql, int nChanges) {
         SCOPED_TRACE(szSql);
         EXPECT_EQ(nChanges, run(szSql));
         EXPECT_EQ("", m_db.m_strErr);
         m_db.m_strErr = "stale";
         EXPECT_LE(0, m_db.runSqlEx("SELECT 1", nullptr, nullptr));
         EXPECT_EQ("stale", m_db.m_strErr);
-    }
+    };
+    returns("UPDATE token SET uid = 1", 2);
+    returns("SELECT tid FROM token", 2);
+    returns("DELETE FROM token WHERE tid = 'c'", 0);
+    returns("DELETE FROM token; INSERT INTO token (tid, function) VALUES ('c', '')", 1);
+    returns(" ", 1);
+    returns("-- nothing", 1);
 }
 
 // The text of the error decides whether a statement is tried again, not the code.
