@@ -2,6 +2,7 @@
 // passes their failures on. Nothing else causes such failures.
 
 #include <dlfcn.h>
+#include <unistd.h>
 
 #include <functional>
 
@@ -9,94 +10,73 @@
 #include "StoreTest.h"
 #include "vemo-access-token.h"
 
-#define STRING "NSt7__cxx1112basic_stringIcSt11char_traitsIcESaIcEEE"
-
 namespace {
 
-// What each function does instead of the library's own, when that is set.
-struct {
-    std::function<int(std::string&)> names, symbols, table;
-    std::function<int()> fillDefaultValue, getTimeAfterNow, getOne, toJson, grantEx;
-    std::function<Json::ValueType()> typeOfObjects;
-} g_instead;
-
-// The definition that this file's own hides.
-template <typename Function>
-Function* next(const char* szMangledName)
-{
-    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szMangledName));
-}
-
-int expand(const std::function<int(std::string&)>& instead, const char* szMangledName, AccessTokenDbApi* pDb,
-           std::string& strSql)
-{
-    return instead ? instead(strSql) : next<int(AccessTokenDbApi*, std::string&)>(szMangledName)(pDb, strSql);
-}
+// What the functions below return, where the tests need more than one result.
+int g_nNames = 0;
+int g_nSymbols = 0;
+int g_nList = 0;
+std::function<Json::ValueType()> g_typeOfObjects; // when set
 
 } // namespace
 
-int VEMO_ACCESS_TOKEN::fillDefaultValue(Json::Value& jToken, bool blCheck)
+int VEMO_ACCESS_TOKEN::fillDefaultValue(Json::Value&, bool)
 {
-    const char* const szName = "_ZN17VEMO_ACCESS_TOKEN16fillDefaultValueERN4Json5ValueEb";
-    return g_instead.fillDefaultValue ? g_instead.fillDefaultValue()
-                                      : next<int(Json::Value&, bool)>(szName)(jToken, blCheck);
+    return -1;
 }
 
-int VEMO_ACCESS_TOKEN::getTimeAfterNow(int offsetSecond, long& now)
+int VEMO_ACCESS_TOKEN::getTimeAfterNow(int, long&)
 {
-    const char* const szName = "_ZN17VEMO_ACCESS_TOKEN15getTimeAfterNowEiRl";
-    return g_instead.getTimeAfterNow ? g_instead.getTimeAfterNow()
-                                     : next<int(int, long&)>(szName)(offsetSecond, now);
+    return -1;
 }
 
-int AccessTokenDbApi::SqlExpandMemberName(std::string& strSql)
+int AccessTokenDbApi::SqlExpandCreateTable(std::string&)
 {
-    return expand(g_instead.names, "_ZN16AccessTokenDbApi19SqlExpandMemberNameER" STRING, this, strSql);
+    return -1;
+}
+
+int AccessTokenDbApi::SqlExpandMemberName(std::string&)
+{
+    return g_nNames;
 }
 
 int AccessTokenDbApi::SqlExpandMemberSymbol(std::string& strSql)
 {
-    return expand(g_instead.symbols, "_ZN16AccessTokenDbApi21SqlExpandMemberSymbolER" STRING, this, strSql);
-}
-
-int AccessTokenDbApi::SqlExpandCreateTable(std::string& strSql)
-{
-    return expand(g_instead.table, "_ZN16AccessTokenDbApi20SqlExpandCreateTableER" STRING, this, strSql);
+    strSql.clear();
+    return g_nSymbols;
 }
 
 int AccessTokenDbApi::tokenGetOne(const char*, std::string&, Json::Value&)
 {
-    return g_instead.getOne();
+    return -7;
 }
 
 int AccessTokenApi::VectorParamToJson(std::vector<std::string>&, const char*, Json::Value&)
 {
-    return g_instead.toJson();
+    return g_nList;
 }
 
 int VemoAccessTokenGrantEx(std::string&, const char*, const char*, Json::Value&)
 {
-    return g_instead.grantEx();
+    return 0;
 }
 
+// Of the JSON library.
 __attribute__((visibility("default"))) Json::ValueType Json::Value::type() const
 {
-    static auto* const pType = next<Json::ValueType(const Json::Value*)>("_ZNK4Json5Value4typeEv");
+    typedef Json::ValueType Function(const Json::Value*);
+    static auto* const pType = reinterpret_cast<Function*>(dlsym(RTLD_NEXT, "_ZNK4Json5Value4typeEv"));
     const Json::ValueType type = pType(this);
-    return Json::objectValue == type && g_instead.typeOfObjects ? g_instead.typeOfObjects() : type;
+    return Json::objectValue == type && g_typeOfObjects ? g_typeOfObjects() : type;
 }
 
 namespace {
-
-const auto FAILS = [] { return -1; };
-const auto FAILS_TO_EXPAND = [](std::string&) { return -1; };
 
 class Interposed : public TableTest {};
 
 TEST_F(Interposed, TheTextOfATimeFailsWithTheTime)
 {
     std::string strTime = "before";
-    g_instead.getTimeAfterNow = FAILS;
     errno = EACCES;
     EXPECT_EQ(-1, VEMO_ACCESS_TOKEN::getTimeAfterNow(3600, strTime));
     EXPECT_EQ("before", strTime);
@@ -109,17 +89,16 @@ TEST_F(Interposed, StatementsFailWithTheirParts)
     Json::Value jAll(Json::objectValue);
     Json::Value jOut;
     m_db.m_strSql = "earlier";
-    g_instead.table = FAILS_TO_EXPAND;
     EXPECT_FAILURE(m_db.createTable(), failed(STORE, "0 > AccessTokenDbApi::SqlExpandCreateTable(strSql)"));
-    g_instead.names = FAILS_TO_EXPAND;
+    g_nNames = -1;
     EXPECT_EQ(-1, m_db.tokenGet(jAll, jOut));
     EXPECT_FAILURE(m_db.tokenSave(jToken, true),
                    allFailed(STORE, {"0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)",
                                      "0 > SqlExpandMemberName(strSqlPrefix)"}));
-    g_instead.names = nullptr;
-    g_instead.symbols = FAILS_TO_EXPAND;
+    g_nNames = 0;
+    g_nSymbols = -1;
     EXPECT_EQ(-1, m_db.tokenSave(jToken, true));
-    g_instead.symbols = [](std::string& strSql) { return strSql.clear(), 0; };
+    g_nSymbols = 0;
     EXPECT_FAILURE(m_db.tokenSave(jToken, true),
                    allFailed(STORE, {"0 > SqlExpandMemberSymbol(strSqlPrefix)", "!szSql || !szSql[0]"}));
     EXPECT_EQ("earlier", m_db.m_strSql);
@@ -130,7 +109,6 @@ TEST_F(Interposed, OpeningSucceedsWithoutATable)
 {
     query("DROP TABLE token");
     ASSERT_EQ(0, unlink(path().c_str()));
-    g_instead.table = FAILS_TO_EXPAND;
     EXPECT_EQ(0, m_db.initDb());
     EXPECT_LINES(failed(STORE, "0 > SqlExpandCreateTable(strSql)", ENOENT));
     EXPECT_EQ((Texts{UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN, RAISE}), seam().callsOf(OPENING_CALLS));
@@ -141,7 +119,6 @@ TEST_F(Interposed, CreationsFailWithTheDefaults)
     unsigned int uid = 1000;
     std::string strFunction = "VPN", strTid = tid();
     Json::Value jOption;
-    g_instead.fillDefaultValue = FAILS;
     EXPECT_FAILURE(api().tokenCreateByTid(uid, strFunction, jOption, strTid),
                    failed(SERVICE, "0 > fillDefaultValue(jParam, false)"),
                    ordinary(SERVICE, "tokenCreate failed, tid=" + strTid +
@@ -153,7 +130,6 @@ TEST_F(Interposed, LookupsReturnAnyNegativeResultOfTheStore)
     const std::string strGetOne = "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))";
     std::string strTid = "t";
     Json::Value jToken(Json::objectValue);
-    g_instead.getOne = [] { return -7; };
     EXPECT_EQ(-7, api().tokenGetByTid(strTid, jToken));
     EXPECT_FAILURE(
         api().tokenUpdateByTid(strTid, jToken),
@@ -166,13 +142,13 @@ TEST_F(Interposed, ListsThatFailSelectNothing)
     Texts values{"a", "b"};
     Json::Value jArray(Json::arrayValue);
     insert();
-    g_instead.toJson = FAILS;
+    g_nList = -1;
     EXPECT_FAILURE(api().tokenGetByTidArray(values, jArray),
                    failed(SERVICE, "0 > VectorParamToJson(strTidVector, \"tid\", jParam)"));
     const std::string strSummary = ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=a,b");
     EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"),
                    failed(SERVICE, "0 > VectorParamToJson(strVector, szName, jParam)"), strSummary);
-    g_instead.toJson = [] { return 0; };
+    g_nList = 0;
     EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"), failed(STORE, "strSql.empty()"),
                    failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))"), strSummary);
     EXPECT_EQ(Texts{}, seam().statements());
@@ -183,7 +159,6 @@ TEST_F(Interposed, ARecordWithoutUidGivesNoName)
 {
     std::string strTid = "t";
     char szUser[] = "before";
-    g_instead.grantEx = [] { return 0; };
     EXPECT_FAILURE(VemoAccessTokenGrant(strTid, "Api", "get", szUser, sizeof(szUser)),
                    failed(WRAPPER, "!jToken.isMember(\"uid\")"));
     EXPECT_STREQ("before", szUser);
@@ -204,11 +179,9 @@ TEST_F(Interposed, RowsBecomeRecordsThatAreObjectsOrNull)
     char szName[] = "tid", szValue[] = "a";
     char *names[] = {szName}, *values[] = {szValue};
     for (const Json::ValueType type : {Json::arrayValue, Json::nullValue}) {
-        g_instead.typeOfObjects = [type, nLies = 2]() mutable {
-            return 0 < nLies-- ? type : Json::objectValue;
-        };
+        g_typeOfObjects = [type, nLies = 2]() mutable { return 0 < nLies-- ? type : Json::objectValue; };
         EXPECT_EQ(Json::nullValue == type ? 0 : -1, pDecoder(&jArray, 1, values, names));
-        g_instead.typeOfObjects = nullptr;
+        g_typeOfObjects = nullptr;
     }
     EXPECT_EQ(json(R"([{"tid":"a"}])"), jArray);
     EXPECT_LINES(allFailed(STORE, {"jToken.type() != Json::objectValue && jToken.type() != Json::nullValue",

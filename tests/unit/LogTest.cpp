@@ -31,10 +31,10 @@ void missTheId()
     EXPECT_EQ(-1, fillDefaultValue(jToken, true));
 }
 
-void askForAnApi(const char* szApi = "Api", const char* szMethod = "get")
+void askForAnApi(const char* szMethod = "get")
 {
     Json::Value jToken = json(R"({"webapi_allow":{"Api":{"method":[]}}})");
-    EXPECT_GE(0, checkPermission(jToken, szApi, szMethod));
+    EXPECT_EQ(0, checkPermission(jToken, "Api", szMethod));
 }
 
 void checkACountOfText()
@@ -93,41 +93,37 @@ TEST_F(Log, WritesEachFormOfLine)
         for (const int nErrno : {0, EACCES, 4095}) {
             const std::string strError = strerror(nErrno);
             const std::string strErrno = blStdout || 0 == nErrno ? "" : "(" + strError + ")";
-            const struct {
-                std::string strLocation, strMessage;
-                std::function<void()> operate;
-            } forms[] = {
-                {"include/internal/vemo-access-token-data-member:2", "lost data member=tid\n", missTheId},
-                {"util.cpp:#",
-                 "(util.cpp:#)(" + strError + ")Failed [!jTokenParam.isObject()], err=" + strError + "\n\n",
-                 [] {
-                     Json::Value jToken;
-                     EXPECT_EQ(-1, checkJsonType(jToken));
-                 }},
-                {"include/internal/vemo-access-token-data-member:4",
-                 "(include/internal/vemo-access-token-data-member:4)(" + strError +
-                     ")Failed [!jParam.isMember(\"bind_sid\")], err=" + strError + "\n\n",
-                 [&] {
-                     Json::Value jToken = json(R"({"tid":""})");
-                     EXPECT_EQ(-1, db.tokenSave(jToken, true));
-                     seam().lines.erase(seam().lines.begin()); // the line of debug mode
-                 }},
-                {"util.cpp:#",
-                 "(util.cpp:#)(" + strError +
-                     ")type failed, jmList[i]=count, jTokenParam={\"count\":\"5\"}\n\n",
-                 checkACountOfText},
-                {"util.cpp:#",
-                 "webapi=Api , method=%m %n\n%s, not in allow list, "
-                 "jToken={\"webapi_allow\":{\"Api\":{\"method\":[]}}}\n",
-                 [] { askForAnApi("Api", "%m %n\n%s"); }},
-            };
-            for (const auto& form : forms) {
-                SCOPED_TRACE(form.strMessage);
+            const auto writes = [&](const std::string& strLocation, const std::string& strMessage,
+                                    auto operate) {
+                SCOPED_TRACE(strMessage);
                 errno = nErrno;
-                form.operate();
+                operate();
                 EXPECT_EQ(nErrno, errno);
-                EXPECT_LINES((blStdout ? "" : "<3>") + form.strLocation + " " + strErrno + form.strMessage);
-            }
+                EXPECT_LINES((blStdout ? "" : "<3>") + strLocation + " " + strErrno + strMessage);
+            };
+            writes("include/internal/vemo-access-token-data-member:2", "lost data member=tid\n", missTheId);
+            writes("util.cpp:#",
+                   "(util.cpp:#)(" + strError + ")Failed [!jTokenParam.isObject()], err=" + strError + "\n\n",
+                   [] {
+                       Json::Value jToken;
+                       EXPECT_EQ(-1, checkJsonType(jToken));
+                   });
+            writes("include/internal/vemo-access-token-data-member:4",
+                   "(include/internal/vemo-access-token-data-member:4)(" + strError +
+                       ")Failed [!jParam.isMember(\"bind_sid\")], err=" + strError + "\n\n",
+                   [&] {
+                       Json::Value jToken = json(R"({"tid":""})");
+                       EXPECT_EQ(-1, db.tokenSave(jToken, true));
+                       seam().lines.erase(seam().lines.begin()); // the line of debug mode
+                   });
+            writes("util.cpp:#",
+                   "(util.cpp:#)(" + strError +
+                       ")type failed, jmList[i]=count, jTokenParam={\"count\":\"5\"}\n\n",
+                   checkACountOfText);
+            writes("util.cpp:#",
+                   "webapi=Api , method=%m %n\n%s, not in allow list, "
+                   "jToken={\"webapi_allow\":{\"Api\":{\"method\":[]}}}\n",
+                   [] { askForAnApi("%m %n\n%s"); });
         }
     }
 }
