@@ -16,6 +16,7 @@
 #include <cstring>
 #include <new>
 
+#include "Interpose.h"
 #include "internal/ErrnoKeeper.h"
 
 using VEMO_ACCESS_TOKEN::ErrnoKeeper;
@@ -102,16 +103,9 @@ void* withoutThrowing(Allocation allocation)
     }
 }
 
-template <typename Function>
-Function* next(const char* szName, Function* /* of this type */)
-{
-    return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, szName));
-}
-
 } // namespace
 
-// The next definition of a function, and whether the caller of the one we are in is the library.
-#define NEXT(name) next(#name, &name)
+// Whether the library calls the function that this stands in.
 #define CALLED_BY_LIBRARY isIn("libvemoaccesstoken.so", __builtin_return_address(0))
 
 Seam& seam()

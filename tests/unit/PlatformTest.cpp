@@ -1,6 +1,5 @@
 // The stand-ins for the platform's libraries: creating files, random numbers and strings, the user database.
 
-#include <dlfcn.h>
 #include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/resource.h>
@@ -13,6 +12,7 @@
 #include <fstream>
 #include <map>
 
+#include "Interpose.h"
 #include "StoreTest.h"
 #include "plibc.h"
 #include "vemorandom.h"
@@ -27,7 +27,7 @@ std::vector<int> g_rgClosedFlags; // the descriptor flags of what was closed
 extern "C" int close(int nFile)
 {
     g_rgClosedFlags.push_back(fcntl(nFile, F_GETFD));
-    return reinterpret_cast<int (*)(int)>(dlsym(RTLD_NEXT, "close"))(nFile);
+    return NEXT(close)(nFile);
 }
 
 namespace {
