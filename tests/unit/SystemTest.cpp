@@ -1,11 +1,12 @@
 // What only root can test: the real path, owner and mode, and the real effective uid.
 
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <filesystem>
+#include <stdexcept>
 
+#include "Processes.h"
 #include "StoreTest.h"
 #include "vemo-access-token.h"
 
@@ -99,16 +100,13 @@ TEST_F(System, FailedOpeningLeavesTheEffectiveUidAtRoot)
 
 TEST_F(System, NeedsTheRightToBecomeRoot)
 {
-    const pid_t nChild = fork();
-    if (0 == nChild) {
+    EXPECT_TRUE(endsWell(startProcess([] {
         std::string strTid;
-        const bool blRefused = 0 == setresuid(UID_NOBODY, UID_NOBODY, UID_NOBODY) && -1 == create(strTid) &&
-                               NOT_ROOT == takeLines().front();
-        _exit(blRefused ? 0 : 1);
-    }
-    int nStatus = -1;
-    ASSERT_EQ(nChild, waitpid(nChild, &nStatus, 0));
-    EXPECT_EQ(0, nStatus);
+        if (0 != setresuid(UID_NOBODY, UID_NOBODY, UID_NOBODY) || -1 != create(strTid) ||
+            NOT_ROOT != takeLines().front()) {
+            throw std::runtime_error("not refused");
+        }
+    })));
     EXPECT_FALSE(std::filesystem::exists(VEMO_ATOKEN_DB_PATH));
 }
 
