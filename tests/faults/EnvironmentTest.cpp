@@ -142,15 +142,6 @@ const std::string& expectedOf(const Row& row, const Operation& operation)
                                                       : row.strChange;
 }
 
-int (*g_pRun)() = nullptr;
-int g_nResult = 0;
-
-int runAndRemember()
-{
-    g_nResult = -1;
-    return g_nResult = g_pRun();
-}
-
 std::string modeOf(const std::string& strPath)
 {
     struct stat status;
@@ -163,9 +154,9 @@ std::string modeOf(const std::string& strPath)
 }
 
 // How the operation ended, judged by the store and by the next call, which nothing disturbs.
-std::string endOf(const TokenStore& store, const Operation& operation)
+std::string endOf(const TokenStore& store, const Operation& operation, int nResult)
 {
-    if (0 <= g_nResult) {
+    if (0 <= nResult) {
         return "done";
     }
     const std::string strAfter = store.state();
@@ -192,25 +183,29 @@ std::string endOf(const TokenStore& store, const Operation& operation)
 // after "; WRONG: ".
 std::string outcomeOf(const TokenStore& store, const Operation& operation, const Environment& enter)
 {
-    g_pRun = operation.run;
+    int nResult = -1;
     Operation watched = operation;
-    watched.run = &runAndRemember;
+    watched.run = [&] {
+        nResult = -1;
+        return nResult = operation.run();
+    };
+    const Oracle oracle(store, watched);
     std::function<void()> leave;
     std::string strModeBefore;
     std::string strMode;
-    const std::string strWrong = Oracle(store, watched)
-                                     .judge(
-                                         [&] {
-                                             leave = enter(store);
-                                             strModeBefore = modeOf(store.path());
-                                             takeWaits();
-                                         },
-                                         [&] {
-                                             strMode = modeOf(store.path());
-                                             leave();
-                                         });
+    const auto arm = [&] {
+        leave = enter(store);
+        strModeBefore = modeOf(store.path());
+        takeWaits();
+    };
+    const auto disarm = [&] {
+        strMode = modeOf(store.path());
+        leave();
+    };
+    const std::string strWrong = oracle.judge(arm, disarm);
+
     std::string strDetails = strMode == strModeBefore ? "" : strMode;
-    if (0 > g_nResult) {
+    if (0 > nResult) {
         strDetails += ": " + Log::firstLine();
     }
     if (const int nWaits = takeWaits()) {
@@ -219,7 +214,7 @@ std::string outcomeOf(const TokenStore& store, const Operation& operation, const
     if (!strWrong.empty()) {
         strDetails += "; WRONG: " + strWrong;
     }
-    return endOf(store, operation) + strDetails;
+    return endOf(store, operation, nResult) + strDetails;
 }
 
 class InEnvironment : public ::testing::TestWithParam<Row> {};

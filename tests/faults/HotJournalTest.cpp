@@ -10,6 +10,7 @@
 
 #include "AccessTokenApi.h"
 #include "Figures.h"
+#include "Operations.h"
 #include "Processes.h"
 #include "TokenStore.h"
 
@@ -24,18 +25,13 @@ void setRealEffectiveUid(uid_t uid)
     ASSERT_EQ(0, syscall(SYS_setresuid, -1, uid, -1));
 }
 
-void makeTokens()
+void makeTokens(const TokenStore& store)
 {
-    AccessTokenApi api;
-    unsigned int uid = 0;
-    std::string strFunction = "VPN";
-    Json::Value jOption(Json::objectValue);
-    jOption["deadline"] = 1000000;
-    jOption["extra"]["filling"] = std::string(1000, 'f'); // three tokens to a page
-    for (unsigned int i = 0; i < TOKENS; ++i) {
-        std::string strTid;
-        ASSERT_EQ(0, api.tokenCreate(uid, strFunction, jOption, strTid));
-    }
+    makeTable(store);
+    store.run("WITH RECURSIVE number(n) AS (SELECT 1 UNION ALL SELECT n + 1 FROM number WHERE n < " +
+              std::to_string(TOKENS) +
+              ") INSERT INTO token SELECT 'token-' || n, '', 0, 4102444800, 1, 1, 'VPN', '{}', " +
+              "json_object('filling', printf('%.1000c', 'f')) FROM number"); // three of them to a page
 }
 
 // A process that gives each token 99 uses and dies before it commits: with no memory to keep them in, it has
@@ -69,7 +65,7 @@ TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
         GTEST_SKIP() << "only root can take another effective uid";
     }
     const TokenStore store;
-    makeTokens();
+    makeTokens(store);
     AccessTokenApi api; // its connection is open already
     crashHalfWay(store);
 

@@ -24,30 +24,6 @@ const Operation& CREATION = operations()[1];
 
 typedef std::function<int()> Call;
 
-// How often a first creation left what.
-struct Leftovers {
-    int64_t nMissing = 0;
-    int64_t nNoTable = 0;
-    int64_t nNoToken = 0;
-    int64_t nDone = 0;
-
-    void count(const std::string& strState)
-    {
-        int64_t& nCount = STATE_MISSING == strState    ? nMissing
-                          : STATE_NO_TABLE == strState ? nNoTable
-                          : strState.empty()           ? nNoToken
-                                                       : nDone;
-        ++nCount;
-    }
-
-    std::string text() const
-    {
-        const int64_t nAll = nMissing + nNoTable + nNoToken + nDone;
-        return "first creation left no file " + share(nMissing, nAll) + ", a file without the table " +
-               share(nNoTable, nAll) + ", no token " + share(nNoToken, nAll) + ", all " + share(nDone, nAll);
-    }
-};
-
 class Kill : public ::testing::Test {
 protected:
     // Whether a process was killed in the midst of the call.
@@ -90,7 +66,8 @@ protected:
         EXPECT_EQ(0, CREATION.run());
         EXPECT_NE(std::string::npos, m_store.state().find("new||0|new|2|new|VPN"));
         if (operation.blCreatesStore) {
-            m_leftovers.count(strState);
+            const bool blHalf = STATE_MISSING == strState || STATE_NO_TABLE == strState;
+            ++m_leftovers[blHalf ? strState : strState.empty() ? "no token" : "all"];
         }
     }
 
@@ -115,12 +92,16 @@ protected:
                 judge(operation, oracle);
             }
         }
-        figure("kill, " + strName, std::to_string(nKilled) + " processes killed, " + std::to_string(nEnded) +
-                                       " ended before; " + m_leftovers.text());
+        std::string strText =
+            std::to_string(nKilled) + " killed, " + std::to_string(nEnded) + " ended before";
+        for (const auto& [strLeft, nTimes] : m_leftovers) {
+            strText += ", " + std::to_string(nTimes) + " first creations left " + strLeft;
+        }
+        figure("kill, " + strName, strText);
     }
 
     TokenStore m_store;
-    Leftovers m_leftovers;
+    std::map<std::string, int64_t> m_leftovers; // by a first creation
     std::mt19937_64 m_random{seed()};
 };
 

@@ -3,6 +3,7 @@
 #ifndef TESTS_FAULT_OPERATIONS_H
 #define TESTS_FAULT_OPERATIONS_H
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -10,9 +11,9 @@
 
 struct Operation {
     const char* szName;
-    bool blCreatesStore; // finds no file
-    bool blPurges;       // deletes expired tokens first, and goes on when that fails
-    int (*run)();        // the library's result; for a listing, the number of tokens
+    bool blCreatesStore;      // finds no file
+    bool blPurges;            // deletes expired tokens first, and goes on when that fails
+    std::function<int()> run; // the library's result; for a listing, the number of tokens
 };
 
 // Twelve: creating the store, and each way in which the library changes it or reads it.
