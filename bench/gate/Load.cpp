@@ -1,17 +1,17 @@
 #include "Load.h"
 
-#include <netinet/in.h>
 #include <sys/epoll.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <chrono>
 #include <cstdlib>
 #include <cstring>
 #include <stdexcept>
+
+#include "Samples.h"
 
 namespace {
 
@@ -29,25 +29,6 @@ struct Client {
     throw std::runtime_error(std::string(szWhat) + ": " + strerror(errno));
 }
 
-int connectTo(const std::string& strAddress)
-{
-    struct sockaddr_un path = {};
-    struct sockaddr_in port = {};
-    path.sun_family = AF_UNIX;
-    strncpy(path.sun_path, strAddress.c_str(), sizeof(path.sun_path) - 1);
-    port.sin_family = AF_INET;
-    port.sin_port = htons(static_cast<uint16_t>(atoi(strAddress.c_str())));
-    port.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    const bool blPath = '/' == strAddress[0];
-    const int nSocket = socket(blPath ? AF_UNIX : AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    const int nResult = blPath ? connect(nSocket, reinterpret_cast<struct sockaddr*>(&path), sizeof(path))
-                               : connect(nSocket, reinterpret_cast<struct sockaddr*>(&port), sizeof(port));
-    if (0 != nResult) {
-        fail(strAddress.c_str());
-    }
-    return nSocket;
-}
-
 void sendNext(Client& client, const Load& load)
 {
     const std::string& strRequest = load.strRequests[client.nNext];
@@ -59,12 +40,53 @@ void sendNext(Client& client, const Load& load)
     }
 }
 
+std::vector<Client> connectAll(const Load& load, int nEpoll)
+{
+    std::vector<Client> clients(load.nClients);
+    for (size_t i = 0; i < clients.size(); ++i) {
+        clients[i].nSocket = connectTo(load.strPath);
+        clients[i].nNext = i % load.strRequests.size();
+        struct epoll_event event = {};
+        event.events = EPOLLIN;
+        event.data.ptr = &clients[i];
+        epoll_ctl(nEpoll, EPOLL_CTL_ADD, clients[i].nSocket, &event);
+    }
+    return clients;
+}
+
+// Takes what has come, and the reply when it is whole.
+Reply takeReply(Client& client, const Load& load)
+{
+    char rgBytes[16384];
+    const ssize_t cbBytes = recv(client.nSocket, rgBytes, sizeof(rgBytes), 0);
+    if (0 >= cbBytes) {
+        fail("recv");
+    }
+    client.strReply.append(rgBytes, static_cast<size_t>(cbBytes));
+    const Reply reply = load.readReply(client.strReply);
+    client.strReply.erase(0, reply.cbReply);
+    return reply;
+}
+
 double seconds(Clock::duration duration)
 {
     return std::chrono::duration<double>(duration).count();
 }
 
 } // namespace
+
+int connectTo(const std::string& strPath)
+{
+    struct sockaddr_un address = {};
+    address.sun_family = AF_UNIX;
+    strncpy(address.sun_path, strPath.c_str(), sizeof(address.sun_path) - 1);
+    const int nSocket = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    if (0 != connect(nSocket, reinterpret_cast<struct sockaddr*>(&address), sizeof(address))) {
+        close(nSocket);
+        fail(strPath.c_str());
+    }
+    return nSocket;
+}
 
 Reply readHttpReply(std::string_view strBytes)
 {
@@ -109,40 +131,25 @@ Reply readRedisReply(std::string_view strBytes)
 Loaded run(const Load& load)
 {
     const int nEpoll = epoll_create1(EPOLL_CLOEXEC);
-    std::vector<Client> clients(load.nClients);
-    for (size_t i = 0; i < clients.size(); ++i) {
-        clients[i].nSocket = connectTo(load.strAddress);
-        clients[i].nNext = i % load.strRequests.size();
-        struct epoll_event event = {};
-        event.events = EPOLLIN;
-        event.data.ptr = &clients[i];
-        epoll_ctl(nEpoll, EPOLL_CTL_ADD, clients[i].nSocket, &event);
-    }
+    std::vector<Client> clients = connectAll(load, nEpoll);
     Loaded loaded;
-    std::vector<double> took;
+    Samples took;
     const Clock::time_point start = Clock::now();
-    size_t nWaiting = clients.size();
     for (Client& client : clients) {
         sendNext(client, load);
     }
-    while (nWaiting) {
+    for (size_t nWaiting = clients.size(); nWaiting;) {
         struct epoll_event rgEvent[64];
         const int nEvents = epoll_wait(nEpoll, rgEvent, 64, -1);
         for (int i = 0; i < nEvents; ++i) {
             Client& client = *static_cast<Client*>(rgEvent[i].data.ptr);
-            char rgBytes[16384];
-            const ssize_t cbBytes = recv(client.nSocket, rgBytes, sizeof(rgBytes), 0);
-            if (0 >= cbBytes) {
-                fail("recv");
-            }
-            client.strReply.append(rgBytes, static_cast<size_t>(cbBytes));
-            const Reply reply = load.readReply(client.strReply);
+            const Reply reply = takeReply(client, load);
             if (!reply.cbReply) {
                 continue;
             }
             const Clock::time_point now = Clock::now();
-            client.strReply.erase(0, reply.cbReply);
-            took.push_back(seconds(now - client.sent));
+            took.add(seconds(now - client.sent));
+            ++loaded.nReplies;
             loaded.nGranted += reply.blGranted;
             if (seconds(now - start) < load.dSeconds) {
                 sendNext(client, load);
@@ -152,13 +159,11 @@ Loaded run(const Load& load)
         }
     }
     loaded.dSeconds = seconds(Clock::now() - start);
-    loaded.nReplies = took.size();
     for (const Client& client : clients) {
         close(client.nSocket);
     }
     close(nEpoll);
-    std::sort(took.begin(), took.end());
-    loaded.dMedian = took[took.size() / 2];
-    loaded.d99th = took[took.size() * 99 / 100];
+    loaded.dMedian = took.percentile(50);
+    loaded.d99th = took.percentile(99);
     return loaded;
 }

@@ -11,6 +11,10 @@
 #include <string_view>
 #include <vector>
 
+// A connection to the path of a Unix socket, or to "PORT" of 127.0.0.1. Throws std::runtime_error when there
+// is none.
+int connectTo(const std::string& strAddress);
+
 // What a server has replied so far.
 struct Reply {
     size_t cbReply = 0; // the size of the whole reply; 0: more must come
@@ -24,7 +28,7 @@ Reply readHttpReply(std::string_view strBytes);
 Reply readRedisReply(std::string_view strBytes); // an array: granted; nil: refused
 
 struct Load {
-    std::string strAddress; // the path of a Unix socket, or "PORT" of 127.0.0.1
+    std::string strPath; // of a Unix socket
     std::vector<std::string> strRequests;
     ReplyReader readReply;
     size_t nClients = 1;

@@ -1,19 +1,16 @@
 #include "Servers.h"
 
-#include <hiredis/hiredis.h>
 #include <signal.h>
-#include <sys/prctl.h>
-#include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <cstdlib>
-#include <cstring>
 #include <fstream>
-#include <memory>
 #include <stdexcept>
+
+#include "../peers/Redis.h"
+#include "Load.h"
+#include "Processes.h"
 
 namespace {
 
@@ -82,14 +79,12 @@ http {
 
 bool isListening(const std::string& strPath)
 {
-    struct sockaddr_un address = {};
-    address.sun_family = AF_UNIX;
-    strncpy(address.sun_path, strPath.c_str(), sizeof(address.sun_path) - 1);
-    const int nSocket = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    const bool blListening =
-        0 == connect(nSocket, reinterpret_cast<struct sockaddr*>(&address), sizeof(address));
-    close(nSocket);
-    return blListening;
+    try {
+        close(connectTo(strPath));
+        return true;
+    } catch (const std::runtime_error&) {
+        return false;
+    }
 }
 
 double memoryOf(pid_t pid)
@@ -128,25 +123,18 @@ std::string nginxConfiguration(const std::string& strDirectory, std::string strG
     return strFile;
 }
 
-struct Deleter {
-    void operator()(redisContext* pContext) const { redisFree(pContext); }
-    void operator()(redisReply* pReply) const { freeReplyObject(pReply); }
-};
-
 } // namespace
 
-Program::Program(const std::vector<std::string>& strArguments, const std::string& strPath) : m_pid(fork())
+Program::Program(const std::vector<std::string>& strArguments, const std::string& strPath)
+    : m_pid(startProcess([&] {
+          std::vector<char*> szArguments;
+          for (const std::string& strArgument : strArguments) {
+              szArguments.push_back(const_cast<char*>(strArgument.c_str()));
+          }
+          szArguments.push_back(nullptr);
+          execvp(szArguments[0], szArguments.data());
+      }))
 {
-    if (0 == m_pid) {
-        prctl(PR_SET_PDEATHSIG, SIGKILL);
-        std::vector<char*> szArguments;
-        for (const std::string& strArgument : strArguments) {
-            szArguments.push_back(const_cast<char*>(strArgument.c_str()));
-        }
-        szArguments.push_back(nullptr);
-        execvp(szArguments[0], szArguments.data());
-        _exit(127);
-    }
     for (int i = 0; i < 500; ++i, usleep(10000)) {
         if (isListening(strPath)) {
             return;
@@ -158,7 +146,7 @@ Program::Program(const std::vector<std::string>& strArguments, const std::string
 Program::~Program()
 {
     kill(m_pid, SIGTERM);
-    waitpid(m_pid, nullptr, 0);
+    endsWell(m_pid);
 }
 
 double Program::memory() const
@@ -185,18 +173,9 @@ Nginx::Nginx(const Store& store, const std::string& strGate)
 
 std::string fillRedis(const std::string& strPath, int nTokens)
 {
-    const std::unique_ptr<redisContext, Deleter> pContext(redisConnectUnix(strPath.c_str()));
-    if (!pContext || pContext->err) {
-        throw std::runtime_error("no connection to Redis at " + strPath);
-    }
+    const redis::Context pContext = redis::connect(strPath);
     const auto run = [&pContext](const std::vector<const char*>& szWords) {
-        std::unique_ptr<redisReply, Deleter> pReply(
-            static_cast<redisReply*>(redisCommandArgv(pContext.get(), static_cast<int>(szWords.size()),
-                                                      const_cast<const char**>(szWords.data()), nullptr)));
-        if (!pReply || REDIS_REPLY_ERROR == pReply->type) {
-            throw std::runtime_error(std::string("Redis: ") + (pReply ? pReply->str : pContext->errstr));
-        }
-        return pReply;
+        return redis::run(*pContext, szWords);
     };
     run({"FLUSHALL"});
     run({"MULTI"});

@@ -75,7 +75,7 @@ long long ask(benchmark::State& state, const std::string& strPath, std::vector<s
               ReplyReader read, size_t nClients)
 {
     Load load;
-    load.strAddress = strPath;
+    load.strPath = strPath;
     load.strRequests = std::move(strRequests);
     load.readReply = std::move(read);
     load.nClients = nClients;
@@ -147,7 +147,7 @@ void callers(benchmark::State& state, Journal journal, int nProcesses, Calls cal
     const std::unique_ptr<Gate> pGate = blGate ? std::make_unique<Gate>(*pStore) : nullptr;
     if (blGate) { // it opens the store with the first call
         Load load;
-        load.strAddress = pGate->path();
+        load.strPath = pGate->path();
         load.strRequests = httpRequests(1, std::string("/grant/") + webapi());
         load.readReply = readHttpReply;
         load.dSeconds = 0;

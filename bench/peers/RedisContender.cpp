@@ -1,9 +1,5 @@
-#include <hiredis/hiredis.h>
-
-#include <stdexcept>
-#include <vector>
-
 #include "Contender.h"
+#include "Redis.h"
 #include "Store.h"
 
 namespace {
@@ -35,33 +31,8 @@ end
 return record
 )lua";
 
-struct Deleter {
-    void operator()(redisContext* pContext) const { redisFree(pContext); }
-    void operator()(redisReply* pReply) const { freeReplyObject(pReply); }
-};
-
-typedef std::unique_ptr<redisContext, Deleter> Context;
-typedef std::unique_ptr<redisReply, Deleter> Reply;
-typedef std::vector<const char*> Words;
-
-Context connect(const char* szSocket)
-{
-    Context pContext(redisConnectUnix(szSocket));
-    if (!pContext || pContext->err) {
-        throw std::runtime_error(std::string("no connection to Redis at ") + szSocket);
-    }
-    return pContext;
-}
-
-Reply run(redisContext& context, Words rgszWord)
-{
-    const int nWords = static_cast<int>(rgszWord.size());
-    Reply pReply(static_cast<redisReply*>(redisCommandArgv(&context, nWords, rgszWord.data(), nullptr)));
-    if (!pReply || REDIS_REPLY_ERROR == pReply->type) {
-        throw std::runtime_error(std::string("Redis: ") + (pReply ? pReply->str : context.errstr));
-    }
-    return pReply;
-}
+using redis::connect;
+using redis::run;
 
 class RedisContender final : public Contender {
 public:
@@ -82,7 +53,7 @@ public:
     void create(const BareToken& token) override
     {
         const Texts rgstrText = textsOf(token);
-        Words rgszWord = {"HSET", token.strTid.c_str()};
+        std::vector<const char*> rgszWord = {"HSET", token.strTid.c_str()};
         for (size_t i = 0; i < rgstrText.size(); ++i) {
             rgszWord.push_back(fieldNames()[i].c_str());
             rgszWord.push_back(rgstrText[i].c_str());
@@ -93,11 +64,12 @@ public:
 
     bool grant(std::string& strTid, const char* szWebapi, const char* szMethod) override
     {
-        const Words rgszWord = {"EVALSHA", m_strGrant.c_str(), "1", strTid.c_str(), szWebapi, szMethod};
+        const std::vector<const char*> rgszWord = {"EVALSHA",      m_strGrant.c_str(), "1",
+                                                   strTid.c_str(), szWebapi,           szMethod};
         if (Connection::Held == m_connection) {
             m_pAnswer = run(*m_pHeld, rgszWord);
         } else {
-            m_pAnswer = run(*connect(m_strSocket.c_str()), rgszWord);
+            m_pAnswer = run(*connect(m_strSocket), rgszWord);
         }
         return REDIS_REPLY_ARRAY == m_pAnswer->type;
     }
@@ -114,9 +86,9 @@ public:
 private:
     std::string m_strSocket;
     Connection m_connection;
-    Context m_pHeld;
+    redis::Context m_pHeld;
     std::string m_strGrant; // the script's digest
-    Reply m_pAnswer;
+    redis::Reply m_pAnswer;
 };
 
 } // namespace
