@@ -52,14 +52,14 @@ sqlite3* database()
 // Over that one connection, and so within one transaction. Stays until the process ends.
 Library& library()
 {
-    static Library& theLibrary = [&]() -> Library& {
+    static Library* pLibrary = nullptr;
+    if (!pLibrary) {
         fuzz::offer(database());
-        Library& made = *new Library;
+        pLibrary = new Library;
         fuzz::offer(database());
-        FUZZ_REQUIRE(0 == made.store.createTable());
-        return made;
-    }();
-    return theLibrary;
+        FUZZ_REQUIRE(0 == pLibrary->store.createTable());
+    }
+    return *pLibrary;
 }
 
 Model& model()
@@ -80,8 +80,12 @@ void requireSameTable()
 
 // Runs an operation on the library and on the model, which must agree. Returns the arguments as they are
 // afterwards.
-Json::Value both(const std::string& strOperation, const Json::Value& jCall)
+Json::Value both(const std::string& strOperation, const std::map<std::string, Json::Value>& arguments)
 {
+    Json::Value jCall(Json::objectValue);
+    for (const auto& [strName, jArgument] : arguments) {
+        jCall[strName] = jArgument;
+    }
     const auto pOperation = std::find_if(operations().begin(), operations().end(),
                                          [&](const Operation& each) { return each.szName == strOperation; });
     g_nSteps = 0;
@@ -99,17 +103,6 @@ Json::Value both(const std::string& strOperation, const Json::Value& jCall)
     FUZZ_REQUIRE(blSame);
     requireSameTable();
     return ours.jCall;
-}
-
-typedef std::map<std::string, Json::Value> Arguments;
-
-Json::Value call(const Arguments& arguments)
-{
-    Json::Value jCall(Json::objectValue);
-    for (const auto& [strName, jArgument] : arguments) {
-        jCall[strName] = jArgument;
-    }
-    return jCall;
 }
 
 void run(const char* szSql)
@@ -146,24 +139,22 @@ void checkText(const Json::Value& jValue)
 void checkRecord(const Json::Value& jValue, const Json::Value& jApi, const Json::Value& jMethod)
 {
     const std::string strTid = fuzz::tid("t");
-    both("checkJsonType", call({{"record", jValue}}));
-    both("checkPermission", call({{"record", jValue}, {"webapi", jApi}, {"method", jMethod}}));
-    both("fillDefaultValue", call({{"record", jValue}, {"flag", true}}));
-    Json::Value jRecord = both("fillDefaultValue", call({{"record", jValue}, {"flag", false}}))["record"];
+    both("checkJsonType", {{"record", jValue}});
+    both("checkPermission", {{"record", jValue}, {"webapi", jApi}, {"method", jMethod}});
+    both("fillDefaultValue", {{"record", jValue}, {"flag", true}});
+    Json::Value jRecord = both("fillDefaultValue", {{"record", jValue}, {"flag", false}})["record"];
     for (const bool blCreate : {true, true, false}) {
-        both("tokenSave of the store", call({{"record", jRecord}, {"flag", blCreate}}));
+        both("tokenSave of the store", {{"record", jRecord}, {"flag", blCreate}});
     }
     if (jRecord.isObject()) {
         jRecord["tid"] = strTid;
-        both("tokenSaveByOverwrite", call({{"record", jRecord}}));
-        both("tokenGrant",
-             call({{"granted", strTid}, {"webapi", jApi}, {"method", jMethod}, {"answer", ""}}));
+        both("tokenSaveByOverwrite", {{"record", jRecord}});
+        both("tokenGrant", {{"granted", strTid}, {"webapi", jApi}, {"method", jMethod}, {"answer", ""}});
     }
-    both("tokenDeleteByTid", call({{"tid", strTid}}));
-    both("tokenCreateByTid",
-         call({{"uid", 7U}, {"function", "fuzz"}, {"option", jValue}, {"fresh", strTid}}));
-    both("tokenUpdateByTid", call({{"tid", strTid}, {"param", jValue}}));
-    both("tokenGetByTid", call({{"tid", strTid}, {"answer", ""}}));
+    both("tokenDeleteByTid", {{"tid", strTid}});
+    both("tokenCreateByTid", {{"uid", 7U}, {"function", "fuzz"}, {"option", jValue}, {"fresh", strTid}});
+    both("tokenUpdateByTid", {{"tid", strTid}, {"param", jValue}});
+    both("tokenGetByTid", {{"tid", strTid}, {"answer", ""}});
 }
 
 // The filter's values for fields: one for each, or a list.
@@ -220,9 +211,9 @@ void checkCondition(Json::Value jFilter, bool blAnd)
 // As a plain filter, it selects and deletes what the model does.
 void checkPlainFilter(const Json::Value& jFilter)
 {
-    both("tokenGet of the store", call({{"filter", jFilter}, {"list", Json::arrayValue}}));
+    both("tokenGet of the store", {{"filter", jFilter}, {"list", Json::arrayValue}});
     for (const bool blAll : {false, true}) {
-        both("tokenDelete of the store", call({{"filter", jFilter}, {"rare_flag", blAll}}));
+        both("tokenDelete of the store", {{"filter", jFilter}, {"rare_flag", blAll}});
     }
 }
 
@@ -254,7 +245,7 @@ void prepare()
     if (!blPrepared) {
         library();
         for (const char* szToken : TOKENS) {
-            both("tokenSave of the store", call({{"record", fuzz::json(szToken)}, {"flag", true}}));
+            both("tokenSave of the store", {{"record", fuzz::json(szToken)}, {"flag", true}});
         }
         sqlite3_progress_handler(database(), 1000, isTooLong, nullptr);
         sqlite3_limit(database(), SQLITE_LIMIT_LENGTH, LENGTH_MAX);
