@@ -28,8 +28,8 @@
 
 namespace {
 
-// What comes of the next calls of flock() and fstat(): an errno, or 0 for what the system says, as it is with
-// those behind.
+// The errno with which the next calls of flock() and fstat() fail; 0 stands for a real call. When the list is
+// empty, all calls are real.
 std::deque<int> g_rgErrors;
 std::atomic<int> g_nLocks(0); // calls of flock()
 
@@ -58,8 +58,8 @@ extern "C" int fstat(int nFile, struct stat* pStatus) noexcept
 
 namespace {
 
-// Whether another process meets SQLite's locks on the database. It asks the kernel: in a child, SQLite would
-// go by what it remembers of its parent's.
+// Whether SQLite's locks on the database stop another process. The child asks the kernel, because SQLite in a
+// forked child relies on what it knew in the parent.
 bool isLockedBySqlite(const std::string& strDatabase)
 {
     const off_t FIRST_LOCK_BYTE = 0x40000000;
@@ -78,7 +78,7 @@ bool isLockedBySqlite(const std::string& strDatabase)
 
 class SerialisingLock : public ::testing::Test {
 protected:
-    // Takes the lock and lets go of it again. Returns the reason why it could not be taken, or 0.
+    // Takes the lock and releases it. Returns 0, or the errno why it could not be taken.
     template <typename... Wait>
     int lockOnce(Wait... wait) const
     {
@@ -150,7 +150,7 @@ TEST_F(SerialisingLock, GoesOnWhenAHolderIsKilled)
     figure("Killed holders", std::to_string(nKills) + " kills, no call of others failed");
 }
 
-// Programs that the holder started do not keep it.
+// A program that the holder has started does not keep the lock.
 TEST_F(SerialisingLock, IsFreedByTheKernelWithItsHolder)
 {
     int rgnEnd[2];
@@ -176,7 +176,7 @@ TEST_F(SerialisingLock, IsFreedByTheKernelWithItsHolder)
     close(rgnEnd[1]);
 }
 
-// A child that is forked meanwhile has the descriptor too; it neither frees the lock nor keeps it.
+// A child that is forked meanwhile has the descriptor too. It neither releases nor keeps the lock.
 TEST_F(SerialisingLock, IsItsMakersAlone)
 {
     std::optional<CallLock> lock(std::in_place, m_strFile.c_str());
@@ -190,7 +190,7 @@ TEST_F(SerialisingLock, IsItsMakersAlone)
     EXPECT_FALSE(endsWell(pid));
 }
 
-// The waiter is interrupted again and again, and waits on.
+// Signals interrupt the waiting thread again and again; it goes on waiting.
 TEST_F(SerialisingLock, WaitsOnWhenASignalInterrupts)
 {
     static std::atomic<int> nSignals;
@@ -246,7 +246,7 @@ TEST_F(SerialisingLock, TellsWhyItCannotBeHadAndLeavesNothingOpen)
     EXPECT_EQ("", before.differenceTo(ProcessState::now()));
 }
 
-// Standard input can be closed.
+// A process may have no standard input; the lock file then gets its descriptor.
 TEST_F(SerialisingLock, MayHaveTheFirstDescriptor)
 {
     close(STDIN_FILENO);
@@ -255,8 +255,8 @@ TEST_F(SerialisingLock, MayHaveTheFirstDescriptor)
     EXPECT_EQ(STDIN_FILENO, open("/dev/null", O_RDONLY));
 }
 
-// Why the file is never the database: to close a descriptor of a file drops the locks that SQLite has on it
-// for any connection of the process.
+// Why the lock file must not be the database: closing any descriptor of a file drops all locks that SQLite
+// holds on it in this process.
 TEST_F(SerialisingLock, OnTheDatabaseTakesItsLocksAway)
 {
     m_calls.prepare({});
@@ -271,7 +271,7 @@ TEST_F(SerialisingLock, OnTheDatabaseTakesItsLocksAway)
     EXPECT_FALSE(isLockedBySqlite(m_calls.store().path()));
 }
 
-// What others could open, they could hold for ever.
+// Others could hold a lock forever on a file that they can open.
 TEST_F(SerialisingLock, RefusesAFileThatIsNotItsOwnersAlone)
 {
     EXPECT_EQ(0, lockOnce());

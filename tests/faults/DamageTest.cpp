@@ -1,5 +1,5 @@
-// Each byte of a database is damaged, and the database is cut off behind each: the calls go on to give an
-// answer.
+// Each byte of a database is damaged, and the database is cut off after each byte. The calls must still
+// return.
 
 #include <gtest/gtest.h>
 #include <sqlite3.h>
@@ -20,7 +20,7 @@ const unsigned int HANG_SEC = 60;
 const uid_t UID_CALLER = 1234;
 const char* const CALLS[] = {LISTING, GRANT, CREATION, DELETION};
 
-// Nothing has to reach the disk here.
+// Skips all syncs.
 int withoutSync(const FileCall& call, const std::function<int()>& real)
 {
     const std::string strName = call.szName;
@@ -42,8 +42,7 @@ protected:
 
     ~DamagedByte() override { alarm(0); }
 
-    // Has the first calls use a database one after the other. They may fail or do what they can, but for what
-    // the process is trusted with.
+    // Runs the first nFirst calls on a database. They may fail, or succeed with what they can still read.
     void use(const std::string& strContents, size_t nFirst = std::size(CALLS))
     {
         alarm(HANG_SEC); // ends a test that hangs
@@ -73,7 +72,7 @@ protected:
         m_nAsSound += strAnswer == strSound;
     }
 
-    // Called at the end: by then, what calls leave behind would have piled up.
+    // Checks at the end that the calls left nothing behind in the process, and prints the counts.
     void print(const std::string& strWhat) const
     {
         EXPECT_EQ("", m_processBefore.differenceTo(ProcessState::now()));
@@ -113,8 +112,8 @@ TEST_F(DamagedByte, InvertedHarmsNobody)
     print("each byte inverted");
 }
 
-// Decoding rows is the library's own work, all else SQLite's. On ordinary days it is the bit that turns a
-// zero into NULL; longer runs flip the others too.
+// Only decoding rows is the library's own work. A usual run flips the bit that turns a zero into NULL; longer
+// runs flip the other bits too.
 TEST_F(DamagedByte, WithOneBitFlippedIsReadWithoutHarm)
 {
     for (int64_t nBit = 3; nBit < 3 + std::min<int64_t>(8, scaled(1)); ++nBit) {

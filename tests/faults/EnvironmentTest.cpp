@@ -1,4 +1,4 @@
-// What operations give where the environment is not as it should be: a row for each environment.
+// What operations do in a bad environment: one row for each environment.
 
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -24,8 +24,8 @@ namespace {
 
 enum class Needs { Nothing, Root, FileSystem };
 
-// The outcomes of a first creation, of the operations that change a store, and of a listing, in the words of
-// outcomeOf(). A first creation without any does not meet the environment.
+// The expected outcomes of a first creation, of the operations that change the store, and of a listing, in
+// the words of outcomeOf(). An empty outcome: the environment cannot occur at a first creation.
 struct Row {
     const char* szName;
     Environment enter;
@@ -94,7 +94,7 @@ const std::vector<Row> ROWS = {
                noTouch("No such file or directory")),
     {"LinkAsDirectory", directoryIs(Thing::Link), DONE_FIRST, DONE, DONE},
 
-    // A file that is there is never given the table, and a directory in its place costs the effective uid.
+    // The library makes no table in a file that exists. After a failed opening the effective uid stays 0.
     everywhere("EmptyDatabase", databaseIs(Thing::EmptyFile), refused(NO_TABLE)),
     everywhere("DirectoryAsDatabase", databaseIs(Thing::Directory), noOpen("14")),
     everywhere("FifoAsDatabase", databaseIs(Thing::Fifo), noOpen("10")),
@@ -102,7 +102,7 @@ const std::vector<Row> ROWS = {
                noTouch("No such file or directory")),
     {"LinkAsDatabase", databaseIs(Thing::Link), "", DONE, DONE},
 
-    // Without root, modes bind.
+    // Modes restrict everybody but root.
     {"OrdinaryUser", modes(User::Other, 0700, 0600), DONE_FIRST, DONE, DONE},
     {"ReadOnlyDirectory", modes(User::Other, 0500, 0600), noTouch("Permission denied"), refused(READ_ONLY),
      DONE},
@@ -115,8 +115,8 @@ const std::vector<Row> ROWS = {
     {"NoStandardError", closedDescriptors({2}), DONE_FIRST, DONE, DONE},
     {"NoStandardStreams", closedDescriptors({0, 1, 2}), DONE_FIRST, DONE, DONE},
 
-    // The database takes one descriptor, its journal another. A third would be for the directory, and is not
-    // missed.
+    // The database needs one descriptor and its journal another. The third, for the directory, is not
+    // necessary.
     {"NoDescriptor", freeDescriptors(0), noTouch("Too many open files"), noOpen("14"), noOpen("14")},
     {"OneDescriptor", freeDescriptors(1U), noTable(NO_JOURNAL), refused(NO_JOURNAL), DONE},
     {"TwoDescriptors", freeDescriptors(2U), DONE_FIRST, DONE, DONE},
@@ -153,7 +153,7 @@ std::string modeOf(const std::string& strPath)
     return szMode;
 }
 
-// How the operation ended, judged by the store and by the next call, which nothing disturbs.
+// How the operation ended, judged by the store and by the next call, outside of the environment.
 std::string endOf(const TokenStore& store, const Operation& operation, int nResult)
 {
     if (0 <= nResult) {
@@ -171,16 +171,14 @@ std::string endOf(const TokenStore& store, const Operation& operation, int nResu
     return blWorksAgain ? "refused" : "refused for good";
 }
 
-// Runs an operation in an environment and has the oracle judge it. Returns
-// - "done": it gave its result, and the store holds what it does
-// - "refused: WHY": it failed, the store is as it was, and the next call in peace works; WHY is the first
-// line of its
-//   log, without location and statement
-// - "leaves no table: WHY": it failed, and leaves a file without the table, so that the next call fails too
-// - "fails late: WHY": it failed, and yet the store holds what it does
-// A first creation that leaves a file says its mode, "done, mode 0700"; a file that was there keeps its own.
-// Waits for a lock are counted for each statement: ", 500 waits". Whatever the oracle finds wrong comes last,
-// after "; WRONG: ".
+// Runs an operation in an environment, and lets the oracle judge it. Returns
+// - "done": it succeeded
+// - "refused: WHY": it failed, the store is unchanged, and the next call works. WHY is its first log line.
+// - "leaves no table: WHY": it failed and left a file without the table, so the next call fails too
+// - "fails late: WHY": it failed, but has changed the store
+// A first creation adds the mode of the file: "done, mode 0700". Waits for a lock are added for each
+// statement:
+// ", 500 waits". What the oracle finds wrong comes last: "; WRONG: ".
 std::string outcomeOf(const TokenStore& store, const Operation& operation, const Environment& enter)
 {
     int nResult = -1;
@@ -246,7 +244,7 @@ TEST_P(InEnvironment, HasItsOutcomeForEachOperation)
 INSTANTIATE_TEST_SUITE_P(In, InEnvironment, ::testing::ValuesIn(ROWS),
                          [](const auto& instance) { return instance.param.szName; });
 
-// The signal that tells of the limit kills a process that does not ignore it; what it was writing is undone.
+// The signal for the limit kills a process that does not ignore it. What it was writing is rolled back.
 TEST(FileSizeSignal, EndsTheProcessAndLeavesTheStoreAsItWas)
 {
     const TokenStore store;
@@ -267,7 +265,7 @@ TEST(FileSizeSignal, EndsTheProcessAndLeavesTheStoreAsItWas)
     }
 }
 
-// Were the database to become the standard output, the log would be written into it.
+// If the database were opened as standard output, log lines would be written into it.
 TEST(ClosedStandardStreams, KeepLogLinesOutOfTheDatabase)
 {
     const TokenStore store;

@@ -34,7 +34,7 @@ void provide(bool blSucceeded, const char* szWhat)
     }
 }
 
-// Past the redirection, which keeps an effective uid of its own.
+// By the system call: the redirection has replaced seteuid().
 void becomeReally(uid_t uid)
 {
     provide(0 == syscall(SYS_setresuid, -1, uid, -1), "change the user");
@@ -58,7 +58,7 @@ void make(Thing thing, const std::string& strPath, const std::string& strTarget)
     }
 }
 
-// Sets a limit, and returns how to put it back.
+// Sets a limit, and returns how to restore it.
 Leave limit(__rlimit_resource resource, rlim_t nLimit)
 {
     struct rlimit before = {};

@@ -6,7 +6,7 @@ namespace {
 
 typedef sqlite3_io_methods Methods;
 
-// An open file is SQLite's own, with other methods: those that go past the hook, and its own for the rest.
+// An open file is SQLite's own, but some of its methods are replaced by ones that ask the hook.
 struct File {
     std::string strPath;
     const Methods* pReal;

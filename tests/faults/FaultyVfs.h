@@ -1,5 +1,5 @@
-// SQLite's own VFS, with a hook that each call on a file goes past. It is the default one, which the library
-// gets.
+// SQLite's own VFS, but a hook is asked about each call on a file. It is the default VFS, so the library uses
+// it.
 
 #ifndef TESTS_FAULTY_VFS_H
 #define TESTS_FAULTY_VFS_H
@@ -20,10 +20,10 @@ struct FileCall {
     std::function<int(int cb)> write = nullptr; // of xWrite: writes only the first cb bytes
 };
 
-// Answers a call in the place of the real one, which is `real`.
+// Answers a call; real() makes the real one.
 typedef std::function<int(const FileCall& call, const std::function<int()>& real)> FileHook;
 
-// At most one at a time; it must outlive all connections over it.
+// At most one at a time. It must live longer than all connections that use it.
 class FaultyVfs {
 public:
     explicit FaultyVfs(FileHook hook);

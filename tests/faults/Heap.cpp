@@ -5,7 +5,7 @@
 #include <cerrno>
 #include <cstddef>
 
-// The allocator itself, by the names that it keeps for those who take its place.
+// The C library's own functions, under the names that it offers to those who replace them.
 extern "C" void* __libc_malloc(size_t cb);
 extern "C" void* __libc_calloc(size_t nElements, size_t cb);
 extern "C" void* __libc_realloc(void* pBlock, size_t cb);

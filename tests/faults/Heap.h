@@ -1,5 +1,4 @@
-// The heap of the process, which this takes the place of: counts what is allocated, and fails what a test
-// wants failed.
+// Replaces malloc and its kin in this process: counts allocations, and lets those fail that a test chooses.
 
 #ifndef TESTS_HEAP_H
 #define TESTS_HEAP_H

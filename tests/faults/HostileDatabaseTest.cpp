@@ -1,4 +1,4 @@
-// Databases that only their owner can make so, or a file in the place of one: what each call gives.
+// Databases that somebody has tampered with, or other files in their place: what each call does.
 
 #include <gtest/gtest.h>
 
@@ -11,7 +11,7 @@ namespace {
 
 typedef std::function<void(const TokenStore&)> Damage;
 
-// What is done to a sound store, and the answers of the calls, each on a store of its own.
+// What is done to a sound store, and what each call then answers. Each call gets a fresh store.
 struct Case {
     const char* szName;
     Damage damage;
@@ -50,7 +50,7 @@ std::string failed(const std::string& strError)
     return "-1: i=0,run sql failed, error=" + strError;
 }
 
-// The table anew, without the conditions that its columns had.
+// Makes the table again, without the constraints of its columns.
 const std::string LAX = "ALTER TABLE token RENAME TO old; CREATE TABLE token AS SELECT * FROM old;";
 
 std::string setThree(const std::string& strAssignment)
@@ -58,7 +58,7 @@ std::string setThree(const std::string& strAssignment)
     return "UPDATE token SET " + strAssignment + " WHERE tid LIKE 'known-three%'";
 }
 
-// An expression over the row of that token, or "gone".
+// The value of an expression in the row of that token, or "gone".
 std::string valueOfThree(const TokenStore& store, const std::string& strExpression)
 {
     const std::string strRow =
@@ -119,19 +119,20 @@ const std::vector<Case> CASES = {
     null("NullPurpose", LAX, "function"),
     null("NullAllow", "", "webapi_allow"),
     null("NullExtra", "", "extra"),
-    // Nobody finds it by its id; that is no failure, and no line tells of it.
+    // A token without an id is not found; that is not a failure and is not logged.
     {"NullId", sql(LAX + setThree("tid = NULL")),
      "-1: Failed [NULL == column_name[i] || NULL == column_value[i]]", "-1: ", "0", "1"},
 
     {"View", sql("ALTER TABLE token RENAME TO real; CREATE VIEW token AS SELECT * FROM real"), "3", IS_VIEW,
      IS_VIEW, IS_VIEW},
     trigger("RefusedInsertion", "INSERT", "ABORT, 'no'", failed("no"), failed("no"), "1"),
-    // Success is reported of what a trigger prevents: nothing is created, and no use is spent.
+    // The calls report success although the trigger prevented the change: nothing is created, no use is
+    // spent.
     trigger("IgnoredInsertion", "INSERT", "IGNORE", "0", "0", "1"),
     trigger("IgnoredDeletion", "DELETE", "IGNORE", "0", "0", "0"),
-    // A lock is what is called so.
+    // The text of an error decides whether the library takes it for a lock.
     trigger("FeignedLock", "INSERT", "ABORT, 'database is locked'", LOCKED, LOCKED, "1"),
-    // The ids are looked up where they are not: nobody finds a token, and the purge what does not fit.
+    // The index of the ids points to another table: no token is found by its id, and the purge notices.
     {"LyingIndex",
      sql("CREATE TABLE other (t TEXT PRIMARY KEY); PRAGMA writable_schema = ON;"
          "CREATE TEMP TABLE page AS SELECT * FROM sqlite_schema WHERE name LIKE 'sqlite_autoindex%';"
@@ -144,8 +145,8 @@ const std::vector<Case> CASES = {
     everywhere("Zeros", contents(std::string(4096, '\0')), NO_DATABASE),
 };
 
-// A field of another type than the library writes: what a grant answers, and the token's count, deadline and
-// uid afterwards, or "gone".
+// A field with a type that the library never writes: what a grant answers, and the token's count, deadline
+// and uid afterwards, or "gone".
 struct Value {
     const char* szAssignment;
     std::string strAnswer;
@@ -164,7 +165,7 @@ const std::string NOT_LISTED =
 const std::string WRONG_EXTRA = "-1: type failed, jmList[i]=extra";
 
 const std::vector<Value> VALUES = {
-    // Numbers are read as far as there are digits, and written back so: a text is 0.
+    // A number is read as far as it has digits, and written back like that; a text reads as 0.
     {"count = 'abc'", "0", "gone"},
     {"count = ''", "0", "gone"},
     {"count = '7up'", "0", "6 4102444800 0"},
@@ -176,7 +177,7 @@ const std::vector<Value> VALUES = {
     {"count = -9223372036854775808", "0", "-9223372036854775808 4102444800 0"},
     {"uid = 'nobody'", "0", SPENT},
     {"uid = 1e300", "0", "2 4102444800 1"},
-    // SQLite takes texts for later than any time. The next purge does not.
+    // SQLite sorts texts after all numbers, so this deadline has not passed. The grant writes a number back.
     {"deadline = 'never'", "0", "2 0 0"},
     {"deadline = ''", "0", "2 0 0"},
     {"deadline = X'39'", "0", "2 9 0"},
@@ -194,12 +195,12 @@ const std::vector<Value> VALUES = {
     {R"(webapi_allow = '{"Example.Api":{"method":"get"}}')", NO_METHODS, UNTOUCHED},
     {R"(webapi_allow = '{"Example.Api":{"method":[{}]}}')", "throws: Type is not convertible to string",
      UNTOUCHED},
-    // What was read before the damage opens what it lists.
+    // What was read before the damage counts.
     {R"(webapi_allow = '{"Example.Api":{"method":["get"]')", "0", SPENT},
     {R"(webapi_allow = '{"Example.Api":{"method":["get"]}} more')", "0", SPENT},
     {R"(webapi_allow = '{"Example.Api":7,"Example.Api":{"method":[7,null,"get"]}}')", "0", SPENT},
 
-    // Only who writes the token back looks at it.
+    // The type of this field is checked only when the token is written back.
     {"extra = '[]'", WRONG_EXTRA, UNTOUCHED},
     {"extra = 'x'", WRONG_EXTRA, UNTOUCHED},
     {"extra = 'x', count = 1", "0", "gone"},
@@ -239,7 +240,7 @@ TEST(HostileValue, GetsItsAnswerFromAGrant)
     }
 }
 
-// SQLite cannot tell whose journal it is: the next call puts the pages of the other database into this one.
+// SQLite cannot see that a journal belongs to another database: the next call copies its pages into this one.
 TEST(HostileJournal, OfAnotherDatabaseIsRolledBackIntoThisOne)
 {
     const TokenStore store;

@@ -1,5 +1,5 @@
-// Why a process stays at effective uid 0 while it holds a connection: a writer has crashed half-way, and what
-// undoes its half is a journal that others may not see.
+// Why a process must stay at effective uid 0 while it holds a connection: other users cannot see the journal
+// that undoes the change of a writer that crashed half-way.
 
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -19,7 +19,7 @@ namespace {
 const unsigned int TOKENS = 300;
 const uid_t UID_OTHER = 65534;
 
-// Past the redirection, which keeps an effective uid of its own.
+// By the system call: the redirection has replaced seteuid().
 void setRealEffectiveUid(uid_t uid)
 {
     ASSERT_EQ(0, syscall(SYS_setresuid, -1, uid, -1));
@@ -34,7 +34,7 @@ void makeTokens(const TokenStore& store)
               "json_object('filling', printf('%.1000c', 'f')) FROM number"); // three of them to a page
 }
 
-// A process that gives each token 99 uses and dies before it commits: with no memory to keep them in, it has
+// A process sets all counts to 99 and is killed before it commits. Its cache is so small that it has already
 // written most of the pages.
 void crashHalfWay(const TokenStore& store)
 {

@@ -1,4 +1,4 @@
-// Every call that SQLite makes on the files of the store fails: once, and from then on.
+// Each call that SQLite makes on the store's files fails: that call alone, or that call and all later ones.
 
 #include <gtest/gtest.h>
 
@@ -11,7 +11,7 @@ namespace {
 
 enum class Fault { Error, FullDisk, TornWrite, Locked };
 
-// What a call that fails so answers; SQLITE_OK when this kind of fault does not meet it.
+// The error code for this kind of fault; SQLITE_OK if the fault cannot happen in this call.
 int answerOf(Fault fault, const FileCall& call)
 {
     const std::string strName = call.szName;
@@ -26,7 +26,7 @@ int answerOf(Fault fault, const FileCall& call)
     return SQLITE_OK;
 }
 
-// Lets the calls nFirst to nLast fail of those that the fault meets.
+// Of the calls in which the fault can happen, nFirst to nLast fail.
 struct Injection {
     Fault fault = Fault::Error;
     int64_t nFirst = 0;

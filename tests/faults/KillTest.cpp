@@ -1,4 +1,4 @@
-// Processes are killed in the midst of an operation, and leave the store as a crash does.
+// Processes are killed in the middle of an operation, and leave the store as a crash does.
 
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -26,7 +26,7 @@ typedef std::function<int()> Call;
 
 class Kill : public ::testing::Test {
 protected:
-    // Whether a process was killed in the midst of the call.
+    // Runs the call in another process. Returns whether it was killed before it ended.
     bool isKilledIn(const Call& run)
     {
         const int nStatus = statusOf(startProcess([&] {
@@ -38,7 +38,7 @@ protected:
         return blKilled;
     }
 
-    // The life of a process that is not killed: the shortest of some, because others use the machine too.
+    // How long the process lives if it is not killed: the shortest of ten runs.
     int64_t nanosecondsOf(const Operation& operation)
     {
         int64_t nShortest = INT64_MAX;
@@ -52,7 +52,7 @@ protected:
         return nShortest;
     }
 
-    // A program that reads, and the library itself, each as the first to find what was left.
+    // What was left must be a state that the caller knows, for a reader and for the library's next call.
     void judge(const Operation& operation, const Oracle& oracle)
     {
         const Files files = m_store.files();
@@ -116,7 +116,7 @@ int64_t countCalls(const Operation& operation)
     return nCalls;
 }
 
-// Dies in the call of that number: ahead of it, behind it, or, if it writes, half-way.
+// Dies before the call of that number, after it, or half-way if it is a write.
 int runUntil(const Operation& operation, int64_t nFatal, uint64_t nWhere)
 {
     int64_t nCalls = 0;
@@ -134,7 +134,7 @@ int runUntil(const Operation& operation, int64_t nFatal, uint64_t nWhere)
     return operation.run();
 }
 
-// The kernel kills the process when that time is over.
+// The kernel kills the process after that time.
 int runFor(const Operation& operation, int64_t nNanoseconds)
 {
     sigevent event = {};

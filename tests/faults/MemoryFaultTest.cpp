@@ -1,4 +1,4 @@
-// Every allocation of each operation fails: once, and from then on. That of SQLite and of jsoncpp too.
+// Each allocation of each operation fails, also those of SQLite and jsoncpp: alone, or with all later ones.
 
 #include <gtest/gtest.h>
 #include <pwd.h>
@@ -21,12 +21,11 @@ bool g_blCrossedSqlite = false;
 
 class MemoryFault : public ::testing::TestWithParam<size_t> {};
 
-// Judges each run by itself, in this thread or in one of its own, which finds nothing that the library keeps
-// for a thread.
+// With blOwnThread, each run has a new thread, for which the library has kept nothing yet.
 void failEachAllocation(const Operation& operation, bool blOwnThread = false)
 {
     const TokenStore store;
-    getpwuid(NOBODY_KNOWN);     // has every user database loaded, which stays
+    getpwuid(NOBODY_KNOWN);     // loads the user databases, which stay in memory
     int64_t cbHeld = INT64_MAX; // after an undisturbed run
     bool blDisturbed = false;
     Injector injector;
@@ -57,7 +56,7 @@ void failEachAllocation(const Operation& operation, bool blOwnThread = false)
 
 } // namespace
 
-// Tells when an exception comes out of SQLite, which knows none and would not clean up behind it.
+// Notices an exception that passes through SQLite, which is written in C and would not clean up.
 extern "C" int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(void*, int, char**, char**),
                             void* pArgument, char** pszError)
 {

@@ -19,7 +19,7 @@ Json::Value options()
 std::string g_strFunction = "VPN";
 unsigned int g_uid = 0;
 
-// Some tokens on a few pages: one of them over several, and two that have expired.
+// Some tokens on a few pages. One is longer than a page, two have expired.
 Files makeStore(const TokenStore& store)
 {
     makeTable(store);

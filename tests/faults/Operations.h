@@ -1,4 +1,4 @@
-// The operations into which faults are injected, and the store that they find.
+// The operations into which faults are injected, and the store that they start from.
 
 #ifndef TESTS_FAULT_OPERATIONS_H
 #define TESTS_FAULT_OPERATIONS_H
@@ -11,7 +11,7 @@
 
 struct Operation {
     const char* szName;
-    bool blCreatesStore;      // finds no file
+    bool blCreatesStore;      // starts without a database file
     bool blPurges;            // deletes expired tokens first, and goes on when that fails
     std::function<int()> run; // the library's result; for a listing, the number of tokens
 };
@@ -21,11 +21,12 @@ const std::vector<Operation>& operations();
 
 const Operation& operationNamed(const std::string& strName);
 
-// Puts the store in the state in which the operation finds it.
+// Makes the store that the operation starts from.
 void prepareStore(const TokenStore& store, const Operation& operation);
 
-// For stores of other tokens: a store with an empty table, made behind some statements, and a token with
-// these values in the columns from bind_sid to function, which allows the method "get" of Example.Api.
+// For stores of other tokens. makeTable() makes a store with an empty table, after running strSettings.
+// insertToken() adds a token with these values in the columns from bind_sid to function; it allows the method
+// "get" of Example.Api.
 void makeTable(const TokenStore& store, const std::string& strSettings = "");
 void insertToken(const TokenStore& store, const std::string& strName, const std::string& strColumns);
 

@@ -17,7 +17,7 @@
 
 namespace {
 
-// The lines of the one state, and those of expired tokens in the other.
+// The lines of strState, and those lines of strOther that show expired tokens.
 std::string withExpired(const std::string& strState, const std::string& strOther)
 {
     std::multiset<std::string> lines;

@@ -16,23 +16,22 @@ const uid_t UID_CALLER = 1234; // the effective uid at which operations are judg
 
 class Oracle {
 public:
-    // Runs the operation once undisturbed, to know what it gives.
+    // Runs the operation once without a fault, to learn its result.
     Oracle(const TokenStore& store, const Operation& operation);
 
-    // Puts the store back, runs the operation between arm and disarm, and returns what is wrong with
-    // how it ended, "" when nothing is:
-    // - the store is sound and as before the operation, after its purge, or after all of it, never
-    //   anything else; as after all of it when the operation reported success. (A purge that fails is no
-    //   failure of the operation: all of it may be done but for that.)
-    // - the effective uid, umask, working directory, signal mask, descriptors and SQLite's memory are as they
-    //   were; but after an opening that SQLite refused the effective uid stays 0
-    // - a failure has its log line, or is the exception of an allocation that failed
-    // A test that takes the effective uid away itself says in uidAfter what is to be left of it.
+    // Restores the store, runs the operation between arm() and disarm(), and returns what is wrong
+    // afterwards, or "". What must hold:
+    // - The store is sound, and is as before the operation, after its purge, or after all of it. After a
+    //   success it is as after all of it. (The purge alone may be missing: an operation goes on without it.)
+    // - Effective uid, umask, working directory, signal mask, descriptors and SQLite's memory are unchanged.
+    //   Only when SQLite refuses to open the database, the effective uid stays 0.
+    // - A failure is logged, or is the exception of an allocation that failed.
+    // uidAfter() gives the effective uid to expect, for tests that make setting it fail.
     std::string judge(
         const std::function<void()>& arm, const std::function<void()>& disarm,
         const std::function<uid_t()>& uidAfter = [] { return UID_CALLER; }) const;
 
-    // Whether the store may be left so by a crash or a failure.
+    // Whether a crash or a failure may leave the store in this state.
     bool allows(const std::string& strState) const;
 
 private:
@@ -52,21 +51,21 @@ private:
     int m_nResult;
 };
 
-// What lets calls fail: those from nFirst to nLast of a run.
+// Makes the calls nFirst to nLast of a run fail.
 struct Injector {
     std::function<void(int64_t nFirst, int64_t nLast)> arm;
     std::function<void()> disarm;
     std::function<int64_t()> calls; // of the last run
     std::function<uid_t()> uidAfter = [] { return UID_CALLER; };
-    // Runs and judges; for more than that.
+    // Calls judge(), which makes one run. A test can do more around it.
     std::function<void(const std::function<void()>& judge)> run = [](const auto& judge) { judge(); };
 };
 
-// Judges an operation undisturbed, then with each of the calls failing that it made, that one alone and all
-// from that one on, and undisturbed again. Returns how many calls there were.
+// Judges an operation without a fault; then, for each call that it made, with that call failing, and with
+// that call and all later ones failing; and without a fault again. Returns the number of calls.
 int64_t failEach(const TokenStore& store, const Operation& operation, const Injector& injector);
 
-// Does so with all operations, and prints how many runs there were.
+// The same for all operations; prints the number of runs.
 void failEachOfAll(const std::string& strKind, const std::string& strName, const Injector& injector);
 
 #endif

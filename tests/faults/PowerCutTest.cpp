@@ -1,4 +1,4 @@
-// The power fails at every moment of an operation, and the disk keeps of what was not synced what it likes.
+// The power fails at each moment of an operation, and the disk keeps any part of what was not synced.
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -46,7 +46,7 @@ protected:
     Recording recordOn(const Files& files, const Calls& calls)
     {
         const Recording recording = record(m_store, files, calls);
-        // The model is of use only where it says what programs saw.
+        // The simulated disk must agree with the real one.
         EXPECT_TRUE(m_store.files() == diskAfter(recording).files());
         return recording;
     }
@@ -56,7 +56,7 @@ protected:
         return recordOn(filesBefore(operation), {operation.run});
     }
 
-    // All that find a store, one after another.
+    // All operations that start from a store, one after another.
     Recording recordOneAfterAnother(const Files& files)
     {
         Calls calls;
@@ -68,7 +68,7 @@ protected:
         return recordOn(files, calls);
     }
 
-    // The call, and what its caller can do for the change to be kept.
+    // The call, followed by what its caller can do to make the change durable.
     std::function<int()> thenSync(const Operation& operation)
     {
         return [this, &operation] {
@@ -80,7 +80,8 @@ protected:
         };
     }
 
-    // Disks whose power was cut when a change was written and not synced: there is a journal to recover from.
+    // Disks after a power cut between the writing of a change and its sync: they have a journal to recover
+    // from.
     std::vector<Files> drawInterrupted(const Recording& recording)
     {
         std::vector<Files> interrupted;
@@ -147,7 +148,7 @@ TEST_F(PowerCut, UndoesNoAcknowledgedChangeButTheLast)
     report("one call after another", tally);
 }
 
-// A first call that changes nothing else makes the table, and that is then the last change.
+// A first call that only reads makes the table; that is the last change then, and may be undone.
 TEST_F(PowerCut, CanTakeBackTheTable)
 {
     const PowerDisk disk = diskAfter(recordOn({}, {LISTING.run}));
@@ -229,9 +230,9 @@ TEST_F(PowerCut, UndoesNothingThatTheGateHasAnswered)
 }
 #endif
 
-// SQLite truncates a database that has shrunk after it has unlinked the journal, and journals nothing of what
-// it cuts off. A disk that keeps the truncation and loses the unlink has a journal that cannot bring that
-// back.
+// When a database has shrunk, SQLite first unlinks the journal and then truncates the file; the journal does
+// not hold what is cut off. If a disk keeps the truncation but loses the unlink, the recovery cannot restore
+// that part.
 TEST_F(PowerCut, DamagesATokenWhereTheDiskLosesTheOrder)
 {
     const PowerTally tally = judgeAll({recordOneAfterAnother(filesBefore(CREATION))}, Order::Lost, scaled(1));
@@ -248,7 +249,7 @@ TEST_F(PowerCut, DamagesNoTokenWhereTheDatabaseDoesNotShrink)
     report("order lost, without auto_vacuum", tally);
 }
 
-// What the judge would find if SQLite left out a sync.
+// The judge must notice when a sync is missing.
 TEST_F(PowerCut, WouldDamageAStoreThatIsNotSynced)
 {
     for (const DiskCall::Kind kind : {DiskCall::Kind::Sync, DiskCall::Kind::SyncDirectory}) {

@@ -14,7 +14,7 @@ void grow(std::string& strContents, size_t cb, const Outcome& outcome)
     }
 }
 
-// Those bytes of the write that stand from nFirst to nEnd in the file.
+// Applies the part of the write that lies between nFirst and nEnd of the file.
 void put(std::string& strContents, const DiskCall& call, size_t nFirst, size_t nEnd, const Outcome& outcome)
 {
     grow(strContents, nFirst, outcome);

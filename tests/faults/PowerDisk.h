@@ -1,12 +1,12 @@
-// A disk that loses power: what it may hold then, given what was asked of it.
+// A simulated disk: what it may hold after a power cut.
 //
-// A sync makes the contents of a file durable, a sync of the directory its entries. Until then each write is
-// lost, kept or torn, whatever becomes of those before and after it, and a file that grows may hold anything
-// where nothing was written. A write changes no byte outside of its range, which is what SQLite's "unix" VFS
-// promises of the disk (SQLITE_IOCAP_POWERSAFE_OVERWRITE), and all that it promises.
+// A sync of a file makes its contents durable; a sync of the directory makes its entries durable. Until then,
+// each write may be lost, kept or torn, independently of all others, and a file that has grown may hold any
+// bytes where nothing was written. A write never changes bytes outside of its range: SQLite's "unix" VFS
+// relies on that (SQLITE_IOCAP_POWERSAFE_OVERWRITE), and on nothing else.
 //
-// File systems with a journal of their own keep the order of what is no write, that is of creations, unlinks
-// and truncations: what is lost of them is the last ones. Others lose any of them.
+// File systems with a journal keep the order of creations, unlinks and truncations: a power cut loses the
+// last of them. Other file systems may lose any of them.
 
 #ifndef TESTS_POWER_DISK_H
 #define TESTS_POWER_DISK_H
@@ -28,29 +28,29 @@ struct DiskCall {
 
 enum class Order { Kept, Lost };
 
-// Picks one of n outcomes: 0 is the oldest, n - 1 what was asked for last.
+// Picks one of n outcomes: from 0, the oldest, to n - 1, what was requested last.
 typedef std::function<size_t(size_t n)> Outcome;
 
-// All is lost that was not synced.
+// Picks the oldest: everything that was not synced is lost.
 size_t onlySynced(size_t n);
 
 class PowerDisk {
 public:
-    // All of this is durable.
+    // A disk with these files, all durable.
     PowerDisk(const Files& files, Order order);
 
     void take(const DiskCall& call);
 
-    // How much a power cut may undo.
+    // The number of changes that a power cut may undo.
     size_t pending() const;
 
     Files afterPowerCut(const Outcome& outcome) const;
 
-    // As programs see it.
+    // The files as programs see them.
     Files files() const;
 
 private:
-    // Numbers count the calls that are no writes.
+    // nNumber counts all calls but writes.
     struct Change {
         DiskCall call;
         size_t nNumber;

@@ -31,7 +31,7 @@ size_t hashOf(const Files& files)
     return std::hash<std::string>()(strAll);
 }
 
-// Where the disk stands.
+// What the judge knows about one moment of a recording.
 struct Moment {
     std::string strBefore; // the last step
     std::string strNow;
@@ -87,7 +87,7 @@ const std::string& PowerJudge::stateOf(const Files& files)
     return *pstrState;
 }
 
-// Some images keep nearly all and some nearly nothing.
+// Some images keep nearly everything, others nearly nothing.
 Files PowerJudge::draw(const PowerDisk& disk)
 {
     const uint64_t nKeptOfFour = m_random() % 4;

@@ -1,4 +1,4 @@
-// Cuts the power after each call of a recording, and judges what the disk may then hold.
+// Cuts the power after each call of a recording, and judges what the disk may hold then.
 
 #ifndef TESTS_POWER_JUDGE_H
 #define TESTS_POWER_JUDGE_H
@@ -20,12 +20,12 @@ struct PowerTally {
     std::string strFirstWrong;
     void addWrong(const std::string& strState);
 
-    // Of the images of a disk whose last change was acknowledged but for a sync of the directory: all, and
-    // those in which that change is undone because its journal came back.
+    // Images after a change that the library has reported, but before the directory is synced: all of them,
+    // and those in which the change is undone because its journal came back.
     int64_t nExposed = 0;
     int64_t nUndone = 0;
-    // Images in which the journal of a change that made the file smaller came back when the file had been
-    // truncated already: its recovery cannot bring back what stood beyond.
+    // Images in which the file was already truncated when the journal of that change came back: the recovery
+    // cannot restore what was cut off.
     int64_t nDamaged = 0;
 };
 
@@ -35,28 +35,27 @@ class PowerJudge {
 public:
     explicit PowerJudge(const TokenStore& store);
 
-    // Each image must hold the state that the last step led to: a commit, which is the unlink of the journal,
-    // or the creation of the database. Until the directory is synced it may hold the state before instead.
-    // Looks at two extremes at each moment, all done and only what was synced, and draws nDraws images for
-    // each change that is not synced.
+    // Each image must hold the state after the last step. A step is a commit (the unlink of the journal) or
+    // the creation of the database. Until the directory is synced, the state before that step is allowed too.
+    // At each moment it looks at the two extremes, everything kept and only what was synced kept, and at
+    // nDraws random images for each change that is not synced.
     void judge(const Recording& recording, Order order, int64_t nDraws, PowerTally& tally);
 
-    // Each image must hold what all calls that returned have done, and of the next one all or nothing. Knows
-    // of no journals, and so serves each way of journalling.
+    // Each image must hold everything that the returned calls have done, and all or nothing of the next call.
+    // This holds for every kind of journal.
     PowerTally judgeReturned(const Recording& recording, int64_t nDraws);
 
-    // The states that the steps led to, from the one that was found.
+    // The state at the start, and the state after each step.
     std::vector<std::string> steps(const Recording& recording);
 
     Files draw(const PowerDisk& disk);
     const std::string& stateOf(const Files& files);
 
-    // How many different images it has seen.
+    // The number of different images so far.
     int64_t different() const { return static_cast<int64_t>(m_stateOfImage.size()); }
 
 private:
-    // Calls the first function behind each call of the recording, and the second for the images of each
-    // moment.
+    // Calls fPassed after each call of the recording, and fImage for each image of each moment.
     void visit(const Recording& recording, Order order, int64_t nDraws,
                const std::function<void(const DiskCall&, const PowerDisk&)>& fPassed,
                const std::function<void(const Files&)>& fImage);

@@ -30,7 +30,7 @@ void recordSync(int nFile)
     }
 }
 
-// The library makes the database file ahead of SQLite's first call, SQLite its journal in xOpen.
+// The library creates the database file before SQLite's first call; SQLite creates its journal in xOpen.
 void recordOpening(std::set<std::string>& known, const std::string& strName)
 {
     if (known.insert(strName).second) {
@@ -55,7 +55,7 @@ int recordCall(std::set<std::string>& known, const FileCall& call, const std::fu
         g_calls.push_back({DiskCall::Kind::Truncate, strName, static_cast<size_t>(call.nArgument)});
     } else if (0 == strcmp("xDelete", call.szName)) {
         known.erase(strName);
-        // Ahead of the sync of the directory, if that was part of it.
+        // Before the sync of the directory, if the call made one.
         g_calls.insert(g_calls.begin() + nBefore, {DiskCall::Kind::Unlink, strName});
     }
     return nResult;

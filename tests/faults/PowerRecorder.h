@@ -1,4 +1,4 @@
-// Records what calls of the library ask of the disk.
+// Records what calls of the library request of the disk.
 
 #ifndef TESTS_POWER_RECORDER_H
 #define TESTS_POWER_RECORDER_H
@@ -14,8 +14,8 @@ struct Recording {
     std::vector<DiskCall> calls;
 };
 
-// A call that fails is an error. The program that uses this syncs nothing: fsync and fdatasync are recorded
-// only, and so are known to have been called, on the directory as well.
+// Throws when a call fails. In this program fsync and fdatasync only record that they were called, for the
+// directory too.
 Recording record(const TokenStore& store, const Files& files, const std::vector<std::function<int()>>& calls);
 
 #endif

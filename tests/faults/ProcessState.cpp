@@ -33,7 +33,7 @@ std::string blockedSignals()
     return strBlocked;
 }
 
-// The descriptors with what they stand for.
+// The open descriptors, each with the file that it refers to.
 std::string openDescriptors()
 {
     std::set<std::string> descriptors;
@@ -110,7 +110,7 @@ extern "C" void syslog(int nPriority, const char* szFormat, ...)
     va_end(args);
 }
 
-// What the tool calls where it is hardened.
+// The hardened tool calls this one.
 extern "C" void __syslog_chk(int nPriority, int, const char* szFormat, ...)
 {
     va_list args;

@@ -1,4 +1,4 @@
-// What a call of the library must leave as it was, and what it logged.
+// The state of the process that a call of the library must not change; and what the call logged.
 
 #ifndef TESTS_PROCESS_STATE_H
 #define TESTS_PROCESS_STATE_H
@@ -21,8 +21,7 @@ struct ProcessState {
     std::string differenceTo(const ProcessState& other) const;
 };
 
-// The lines that the library handed to syslog, which this program takes the place of. Takes no memory
-// from the heap.
+// What the library passed to syslog(), which this program replaces. It allocates no memory.
 struct Log {
     static void clear();
     static const char* text();

@@ -1,9 +1,9 @@
-// Waits for a lock that are over at once, as if cut short by a signal, and counted.
+// Replaces usleep(): nobody waits for a lock here. Waits are counted, and end as if a signal came.
 
 #ifndef TESTS_SHORT_WAITS_H
 #define TESTS_SHORT_WAITS_H
 
-// How many there were since the last call.
+// The number of waits since the last call.
 int takeWaits();
 
 #endif

@@ -1,5 +1,4 @@
-// A store of three tokens on pages of 512 bytes, small enough to damage each of its bytes, and the calls that
-// meet it.
+// A store of three tokens on pages of 512 bytes, so small that each byte can be damaged in turn.
 
 #ifndef TESTS_SMALL_STORE_H
 #define TESTS_SMALL_STORE_H
@@ -8,19 +7,18 @@
 
 #include "TokenStore.h"
 
-// Makes the store, and returns the bytes of its database. Before the table is made, strSettings are run.
+// Makes the store, and returns the bytes of its database. strSettings run before the table is made.
 std::string makeSmallStore(const TokenStore& store, const std::string& strSettings = "");
 
-// Of all operations, these read or change what is damaged. The listing shows all three tokens, the grant is
-// to "known-three", and the deletion of "known-one".
+// The operations that are run on the damaged store. The listing shows all three tokens; the others use
+// "known-three", "known-given" and "known-one".
 const char* const LISTING = "listing";
 const char* const GRANT = "grant of one use of three";
 const char* const CREATION = "creation under a given id";
 const char* const DELETION = "deletion by id";
 
-// What an operation answers: its result ("0"), if it failed with the first line of its log up to errno or a
-// record
-// ("-1: LINE"), or the exception of the JSON library that it lets out ("throws: WHAT"). Others pass.
+// Runs an operation. Returns its result ("0"); after a failure also the start of its first log line
+// ("-1: LINE"); or the JSON library's exception ("throws: WHAT"). Other exceptions pass through.
 std::string call(const std::string& strOperation);
 
 #endif

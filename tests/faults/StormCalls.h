@@ -1,4 +1,4 @@
-// The calls of a storm, on tokens that have names, and what the store says afterwards.
+// The calls that many processes make at once, on tokens with names, and what the store holds afterwards.
 
 #ifndef TESTS_STORM_CALLS_H
 #define TESTS_STORM_CALLS_H
@@ -11,7 +11,7 @@
 
 enum class Calls { Plain, Serialised };
 
-// Uses by the name of the token.
+// The uses left, by the name of the token.
 typedef std::map<std::string, int64_t> Tokens;
 
 class StormCalls {
@@ -23,15 +23,15 @@ public:
     int grant(const std::string& strName) const;
     int revoke(const std::string& strName) const;
 
-    // Replaces the store by one with these tokens.
+    // Makes a new store with these tokens.
     void prepare(const Tokens& tokens) const;
 
-    // The tokens that the store holds, which must be sound; none where there is no table.
+    // The tokens in the store, which must be sound. None if there is no table.
     Tokens tokens() const;
 
     const TokenStore& store() const { return m_store; }
 
-    // Of the serialised calls; stands beside the database.
+    // The lock file of serialised calls, beside the database.
     std::string lockFile() const { return m_store.directory() + "/calls.lock"; }
 
 private:

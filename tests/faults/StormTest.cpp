@@ -1,5 +1,5 @@
-// 1 to 64 processes at once on one file, through the exported functions: as they come, and one at a time by
-// CallLock. VEMO_TEST_PROCESSES, a number, adds a storm of so many.
+// 1 to 64 processes use one file at once, through the exported functions: without a lock, and serialised by
+// CallLock. VEMO_TEST_PROCESSES adds a storm of that many processes.
 
 #include <gtest/gtest.h>
 
@@ -16,12 +16,12 @@
 
 namespace {
 
-// What came of calls whose effect is theirs alone.
+// What became of calls whose effect no other call can have.
 struct Tally {
     int64_t nCalls = 0;
-    int64_t nFailed = 0;  // told failure, had no effect
-    int64_t nFalse = 0;   // told failure, took effect
-    int64_t nMissing = 0; // told success, had no effect
+    int64_t nFailed = 0;  // reported failure, had no effect
+    int64_t nFalse = 0;   // reported failure, but took effect
+    int64_t nMissing = 0; // reported success, but had no effect
 
     void add(bool blTold, bool blDone)
     {
@@ -106,7 +106,7 @@ public:
                 tally.add(0 == told.nCreated, has(found, nameOf("new", nProcess, nRound)));
                 nGrantedOwn += 0 == told.nGrantedOwn;
                 nGranted += 0 == told.nGrantedShared;
-                // A grant can write the token back, so what is there may have been deleted.
+                // A grant may have written the deleted token back, so only a missing one proves a deletion.
                 const bool blThere = has(found, nameOf("revoked", nProcess, nRound));
                 const bool blTold = 1 == told.nRevoked;
                 tally.add(blTold, blTold || !blThere);
@@ -158,8 +158,7 @@ void raise(Calls calls, int nProcesses)
     storm.judge(calls);
 }
 
-// Processes that all begin without a file, which is there before its table is: whoever comes in between
-// fails.
+// All processes start without a file. The file exists before its table does: calls in between fail.
 void makeStores(Calls calls, int nProcesses)
 {
     struct Told {

@@ -1,5 +1,5 @@
-// Every call of the system that opening the store takes, the library's own and SQLite's, fails: once, and
-// from then on. (The wait for a lock fails in IoFaultTest.)
+// Each system call that is needed to open the store fails, the library's own and SQLite's: that call alone,
+// or that call and all later ones. (ShortWaits.h lets waits for a lock fail.)
 
 #include <fcntl.h>
 #include <gtest/gtest.h>

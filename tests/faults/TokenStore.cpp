@@ -21,7 +21,7 @@ struct Closer {
 };
 typedef std::unique_ptr<sqlite3, Closer> Database;
 
-// Not over the default VFS, which may be one that fails.
+// Not with the default VFS, which may be the one with faults.
 Database openDatabase(const std::string& strPath)
 {
     sqlite3* pDb = nullptr;
@@ -42,7 +42,7 @@ int insertLine(void* pLines, int nColumns, char** szValues, char**)
     return 0;
 }
 
-// The rows in the order of their text, or the error in the form "corrupt: ...".
+// The rows as sorted lines, or the error as "corrupt: ...".
 std::string rowsOf(sqlite3* pDb, const char* szSql)
 {
     std::multiset<std::string> lines;
@@ -63,8 +63,8 @@ std::string contentsOf(const std::filesystem::path& path)
 
 } // namespace
 
-// What SQLite flushes to the disk need not get there: nothing here outlives the machine. Weak, for a test
-// that counts on the syncs.
+// Nothing has to survive a crash of the machine, so nothing is synced. Weak, because PowerRecorder defines
+// its own.
 extern "C" __attribute__((weak)) int fsync(int)
 {
     return 0;
@@ -82,7 +82,7 @@ std::string idOf(const std::string& strName)
     return strTid;
 }
 
-// In memory where there is a place, since no disk is needed.
+// In memory if possible: no test needs a disk.
 TokenStore::TokenStore()
 {
     const bool blMemory = 0 == access("/dev/shm", W_OK | X_OK);

@@ -1,4 +1,4 @@
-// A store of a test's own: a fresh directory, which the library takes for the real private one.
+// A store for one test: a fresh directory, which the library uses instead of the real private one.
 
 #ifndef TESTS_TOKEN_STORE_H
 #define TESTS_TOKEN_STORE_H
@@ -6,12 +6,12 @@
 #include <map>
 #include <string>
 
-// Contents by name: of the database and, while there is one, of its journal.
+// The contents of the files by name: of the database and, if there is one, of its journal.
 typedef std::map<std::string, std::string> Files;
 
 const std::string DATABASE = "vemo-access-token.db";
 
-// The id of a token that tests know by a name, which TokenStore::state() shows.
+// The id of the token with this name, padded to the length of an id. TokenStore::state() shows the name.
 std::string idOf(const std::string& strName);
 
 class TokenStore {
@@ -27,13 +27,12 @@ public:
     Files files() const;
     void setFiles(const Files& files) const;
 
-    // What the file holds, read as its next user would, who rolls back what a crash left: STATE_MISSING,
-    // STATE_NO_TABLE, or a line for each token, in the order of their text. Ids that no operation
-    // knows beforehand read "new"; instead of a time the line says "past", "new" or "far". A database
-    // that is not sound reads "corrupt: " and why.
+    // What the next user of the database would find, who rolls back what a crash left: STATE_MISSING,
+    // STATE_NO_TABLE, or a sorted line for each token. Ids that the library made up read "new"; times read
+    // "past", "new" or "far". A damaged database reads "corrupt: " and why.
     std::string state() const;
 
-    // Run SQL behind the library's back. The rows come as lines, in the order of their text.
+    // Run SQL without the library. The rows come as sorted lines.
     std::string rows(const std::string& strSelect) const;
     void run(const std::string& strSql) const;
 
