@@ -1,6 +1,5 @@
-// What every call of the library must execute, and nothing else: the measure that the library's own
-// cost is held against. The same SQLite calls with the same statement texts, and the columns of a
-// row copied out; no checks, no log, no JSON.
+// The SQLite calls that the library must make, and nothing else: the baseline for the library's own cost.
+// Same calls, same statement texts, and the columns of a row are copied; no checks, no log, no JSON.
 //
 // A failure throws std::runtime_error.
 

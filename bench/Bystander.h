@@ -1,6 +1,5 @@
-// Another process with a connection to the store in use, for as long as the object, or until this
-// process is gone. A connection of this process would not do: SQLite shares descriptors and locks
-// within a process.
+// Another process that holds a connection to the store in use, as long as the object or this process lives.
+// A connection of this process would not do: SQLite shares descriptors and locks within a process.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_BYSTANDER_H
 #define VEMO_ACCESS_TOKEN_BENCH_BYSTANDER_H

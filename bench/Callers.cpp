@@ -21,7 +21,7 @@ namespace {
 
 const size_t CALLS_MAX = 200000; // of one process: far more than there is time for
 
-// How often this process has written a token. A grant that raised it spent its use, whatever it returned.
+// How often this process has written a token. A grant that has raised it has spent a use.
 long long g_nWritten = 0;
 
 double now()
@@ -49,7 +49,7 @@ GrantCall timedGrant(int nToken, Calls calls)
 
 } // namespace
 
-// Found ahead of SQLite's own, by the library too.
+// The library calls this one, which counts what is written.
 extern "C" INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql,
                                        int (*callback)(void*, int, char**, char**), void* arg, char** pszErr)
 {

@@ -1,4 +1,4 @@
-// Processes that call the library at the same time, as many programs of a machine do.
+// Many processes call the library at the same time.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_CALLERS_H
 #define VEMO_ACCESS_TOKEN_BENCH_CALLERS_H
@@ -9,16 +9,16 @@ struct GrantCall {
     double dStart; // seconds on the clock that all processes share
     double dEnd;
     bool blGranted;
-    bool blSpent; // whatever it returned
+    bool blSpent; // whether it spent a use, whatever it returned
 };
 
 enum class Calls { Plain, Serialised };
 
-// Has nProcesses processes grant the first nTokens tokens of the store in use, each as fast as it can, and
-// returns the calls of all. Serialised calls queue for the call lock, and the wait is part of their time.
+// nProcesses processes grant the first nTokens tokens of the store in use, as fast as they can. Returns all
+// their calls. Serialised calls wait for the call lock, and their time includes that.
 std::vector<GrantCall> grantAtOnce(int nProcesses, int nTokens, double dSeconds, Calls calls);
 
-// How many a second were granted, from the start of the first call to the end of the last.
+// Granted calls a second, from the start of the first call to the end of the last.
 double grantsPerSecond(const std::vector<GrantCall>& calls);
 
 #endif

@@ -69,8 +69,7 @@ int grantEx(Call& call)
     return VemoAccessTokenGrantEx(call.token.strTid, webapi(), method(), call.jResult);
 }
 
-// The bare engine: what each exported function must execute, but for the deletion by session with a purge
-// first.
+// A bare engine that has purged, as all exported functions do except the deletion by session.
 BareEngine& purged(BareEngine&& engine)
 {
     engine.purge();

@@ -1,4 +1,4 @@
-// The operations that are measured: each exported function, and what a held object is used for.
+// The operations that are measured: each exported function, and some calls of an object that is kept.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_MEASURED_CALLS_H
 #define VEMO_ACCESS_TOKEN_BENCH_MEASURED_CALLS_H
@@ -32,10 +32,10 @@ struct Operation {
 
 const std::vector<Operation>& operations();
 
-// The bare engine in the place of the library.
+// Runs the bare engine instead of the library.
 const Operation& control();
 
-// Deletes the tokens that operations and their preparation may leave in the store in use.
+// Deletes the tokens that operations and their preparation leave behind.
 void removeFreshTokens();
 
 #endif

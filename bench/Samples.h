@@ -1,4 +1,4 @@
-// What was measured of single calls.
+// Measurements of single calls.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_SAMPLES_H
 #define VEMO_ACCESS_TOKEN_BENCH_SAMPLES_H
@@ -12,7 +12,7 @@ class Samples {
 public:
     void add(double dSample) { m_rgdSample.push_back(dSample); }
 
-    // Adds the seconds that a call takes, and returns what it does.
+    // Adds the seconds that the call takes, and returns its result.
     template <typename Call>
     auto time(Call call)
     {
@@ -24,7 +24,7 @@ public:
 
     double last() const { return m_rgdSample.back(); }
 
-    // What nPercent of the samples do not exceed. There must be some.
+    // The value that nPercent of the samples do not exceed. There must be samples.
     double percentile(int nPercent)
     {
         const size_t nRank = m_rgdSample.size() * static_cast<size_t>(nPercent) / 100;

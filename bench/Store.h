@@ -1,4 +1,4 @@
-// A database of the benchmark's own, filled with tokens such as programs make them.
+// A database for a benchmark, with tokens like those that programs make.
 //
 // The database path is redirected (examples/redirect.cpp), for the library and the bare engine alike.
 // A failure throws.
@@ -14,10 +14,10 @@ enum class Place { Memory, Disk };
 
 const char* nameOf(Place place);
 
-// Stands for as long as the object.
+// Exists as long as the object.
 class Store {
 public:
-    // Makes it, and uses it.
+    // Makes the store, and uses it.
     explicit Store(Place place);
     ~Store();
     Store(const Store&) = delete;
@@ -29,7 +29,7 @@ public:
     // Adds tokens until there are nTokens.
     void grow(int nTokens);
 
-    // What an administrator may do from outside.
+    // What an administrator can do (`vemo-access-token tune`).
     void makeIndexes();
     void useWriteAheadLog();
 
@@ -40,14 +40,14 @@ private:
     int m_nTokens;
 };
 
-// The token of that number: its id and texts depend on nothing else. A store of n tokens holds those
-// of 0 to n - 1. Each has many uses left and two methods of one API (webapi() and
-// method()), and expires in a day, ten tokens a second.
+// The token of that number, which alone decides its id and texts. A store of n tokens holds those of 0 to
+// n - 1. Each has many uses left and allows two methods of one API. Tokens expire from a day on, ten a
+// second.
 BareToken tokenOf(int nNumber);
 
 const int FRESH = 100000000; // the number of a token that no store holds by itself
 
-// What the tokens allow, among others.
+// An API and a method that the tokens allow.
 const char* webapi();
 const char* method();
 

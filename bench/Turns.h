@@ -1,20 +1,20 @@
-// Whose turn it is within a call of the library: its own, or that of a function that it calls. The functions
-// of SQLite are defined here once more, ahead of the real ones: each has a turn of its own, but for the
-// callbacks of rows, which are the library's.
+// Tells whose code runs within a call: the library's, or SQLite's. This program replaces the functions of
+// SQLite that the library calls. Each of them begins a turn and then calls the real function; a row callback
+// is the library's turn again.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_TURNS_H
 #define VEMO_ACCESS_TOKEN_BENCH_TURNS_H
 
 const int LIBRARY = 0; // the other turns are what the program numbers them
 
-// The program defines these two: which turn a function of SQLite has ("open", "close", or else the
-// statement's text), and what is to be done when a turn ends.
+// The program defines these two: the turn of a call of SQLite ("open", "close" or the text of a statement),
+// and what happens when a turn ends.
 int turnOf(const char* szWhat);
 void endTurn(int nTurn);
 
 inline int g_nTurn = LIBRARY;
 
-// Until the end of the scope somebody else's turn.
+// A turn that lasts until the end of the scope.
 class Turn {
 public:
     explicit Turn(int nTurn) : m_nBefore(g_nTurn) { pass(nTurn); }

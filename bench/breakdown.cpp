@@ -4,8 +4,8 @@
 // keeps it open. With the write-ahead journal another process holds a connection, or the end of each
 // call would write the journal back and delete it.
 //
-// The program defines the functions of SQLite that are the steps of a grant, and the C library's that
-// make the system calls, and forwards them. Each benchmark reports the medians of its grants:
+// The program replaces the functions of SQLite and of the C library that a grant calls; they count, and call
+// the real ones. Each benchmark reports the medians of its grants:
 //
 //   open_us, close_us              sqlite3_open and sqlite3_close
 //   purge_us, select_us, save_us   sqlite3_exec of the DELETE, SELECT and REPLACE, without the row callback
@@ -17,7 +17,7 @@
 //   stats                          of stat, lstat, fstat and access
 //   others                         of getpid, fchown, ftruncate, mmap and munmap
 //
-// The calls that read and set the effective uid are missing: the redirection of the database makes none.
+// Calls that read and set the effective uid are missing: the redirection of the database replaces them.
 
 #undef _FORTIFY_SOURCE // with it, headers define functions that this program defines
 
@@ -48,7 +48,7 @@ namespace {
 const int TOKENS = 10;
 const int GRANTS = 300;
 
-// What is measured of a grant: the microseconds of its steps, and the numbers of system calls.
+// What is measured: microseconds of the steps of a grant, and numbers of its system calls.
 enum Quantity {
     Library = LIBRARY,
     Open,
@@ -111,7 +111,7 @@ void endTurn(int nTurn)
     g_turnStart = now;
 }
 
-// Defines a function that counts its calls.
+// Replaces a function by one that counts its calls.
 #define COUNTED(call, result, name, parameters, arguments)                                                   \
     INTERPOSED result name parameters                                                                        \
     {                                                                                                        \
@@ -189,7 +189,7 @@ bool grant(AccessTokenApi* pHeld, std::string& strTid)
     return 0 == VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken);
 }
 
-// Returns whether the token was granted and saved; g_breakdown then tells how.
+// Returns whether the token was granted and saved. The measurements are in g_breakdown.
 bool measuredGrant(AccessTokenApi* pHeld, std::string& strTid)
 {
     g_breakdown.fill(0);

@@ -1,8 +1,8 @@
 // What a grant costs as the number of tokens grows, without and with an administrator's indexes.
 //
-// It takes turns with a store of ten tokens, so that the ratio of the two is not that of two moments of
-// the machine. The call that comes first in a turn finds the processor's caches as the other store left
-// them, and does not count.
+// Calls alternate with calls on a store of ten tokens, so that changes of the machine's speed do not change
+// the ratio. The first call after a change of the store does not count: the processor's caches hold the other
+// one.
 
 #include <benchmark/benchmark.h>
 
@@ -49,7 +49,7 @@ void growth(benchmark::State& state, Place place, bool blIndexes, int nTokens)
     Samples firsts;
     int nCall = 0;
     for (auto _ : state) {
-        // Not the same token again and again: its pages would stay in the caches.
+        // A different token each time: the pages of one would stay in the caches.
         grant(*pMany, nCall * 7919 % nTokens, firsts);
         grant(*pMany, (nCall + 1) * 7919 % nTokens, many);
         grant(*pFew, nCall % FEW, firsts);

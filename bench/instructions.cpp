@@ -1,10 +1,8 @@
-// Runs each operation of the library once, for callgrind to count the instructions; instructions.sh runs
-// this program and reads the counts. With --environment it tells what the counts depend on instead.
+// Runs each operation once, so that callgrind counts its instructions. instructions.sh runs this program and
+// reads the counts. With --environment it prints what the counts depend on instead.
 //
-// The functions through which the library leaves its own code are defined here once more, ahead of the
-// real ones, and cut the count: callgrind writes down the instructions since the last cut, under the
-// name of whoever executed them, and begins anew. An operation's last part is the library's own, and
-// bears the operation's name.
+// At the end of each turn (Turns.h) callgrind writes down the instructions since the turn began, under the
+// name of who executed them. The last part of an operation is the library's own, under the operation's name.
 
 #include <gnu/libc-version.h>
 #include <json/version.h>
@@ -45,7 +43,7 @@ void endTurn(int nTurn)
 
 extern "C" {
 
-// The redirection (examples/redirect.cpp) follows these three.
+// The redirection (examples/redirect.cpp) answers the next three.
 
 INTERPOSED uid_t geteuid() noexcept
 {
@@ -65,7 +63,7 @@ INTERPOSED int access(const char* szPath, int nMode) noexcept
     return NEXT(access)(szPath, nMode);
 }
 
-// The same bytes always, so that generated ids are of one length.
+// Always the same bytes, so that generated ids have one length.
 INTERPOSED ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned int /* flags */)
 {
     const Turn turn(STANDIN);
@@ -76,7 +74,7 @@ INTERPOSED ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned int /* fla
     return static_cast<ssize_t>(cbBuffer);
 }
 
-// The same name always, whatever users the machine has.
+// Always the same name, whatever users the machine has.
 INTERPOSED int getpwuid_r(uid_t /* any */, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
                           struct passwd** ppResult)
 {
@@ -103,7 +101,7 @@ int count(const Operation& operation, Call& call)
     return nResult;
 }
 
-// Runs an operation twice, as what only a first call does is no part of the count.
+// Runs an operation twice: the count leaves out what only a first call does.
 bool measure(const Operation& operation)
 {
     for (const bool blCounted : {false, true}) {

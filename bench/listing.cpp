@@ -1,5 +1,5 @@
-// Listing every token beside a plain query that builds the same values: what decoding costs, in time
-// and in memory.
+// What decoding costs, in time and memory: listing all tokens, compared with a plain query that builds the
+// same values.
 
 #include <benchmark/benchmark.h>
 #include <malloc.h>
@@ -17,7 +17,7 @@ namespace {
 
 const int TOKENS = 100000;
 
-// What the plain query is spared to read: numbers and JSON. The other columns are copied from the row.
+// Values that the plain query does not read from the row: numbers and JSON.
 struct KnownValues {
     Json::Value jUid;
     Json::Value jDeadline;
@@ -95,7 +95,7 @@ void listingTime(benchmark::State& state)
     state.counters["ratio"] = ours.percentile(50) / bare.percentile(50);
 }
 
-// A number of kilobytes that the kernel tells of this process.
+// A line of the kernel's status of this process, in kB.
 long status(const std::string& strName)
 {
     std::ifstream file("/proc/self/status");

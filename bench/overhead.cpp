@@ -1,11 +1,11 @@
-// Each exported function beside the bare engine: what the library adds to what must be executed.
+// Each exported function compared with the bare engine: what the library adds.
 //
-// The two take turns, so that whatever else the machine does meets both. Each benchmark reports
+// Their calls alternate, so that other load on the machine affects both. Each benchmark reports
 //
 //   ours_us, bare_us   medians of single calls
 //   ratio              median of the ratios of neighbours: two calls of each
 //
-// Control is the bare engine beside itself: how far its ratio is from 1 tells how far to trust the others.
+// Control compares the bare engine with itself: how far its ratio is from 1 shows the error of the others.
 
 #include <benchmark/benchmark.h>
 
@@ -23,7 +23,7 @@ namespace {
 const int FEW = 10;      // tokens
 const int MANY = 100000; // with which a call takes so long that fewer calls must do
 
-// The store of the last benchmark serves the next of its kind.
+// Keeps the store for the next benchmark with the same place and size.
 void useStore(Place place, int nTokens)
 {
     static std::unique_ptr<Store> pStore;
@@ -65,7 +65,7 @@ void overhead(benchmark::State& state, const Operation& operation, Place place, 
     Samples ratios;
     Call call;
     for (auto _ : state) {
-        // In this order, what comes first and what comes after whom is the same for both.
+        // In this order, both come first and second, and follow each other, equally often.
         const double dBareFirst = runBare(operation, call, bare);
         const double dOurs = runOurs(operation, call, ours) + runOurs(operation, call, ours);
         const double dBare = dBareFirst + runBare(operation, call, bare);
@@ -78,7 +78,7 @@ void overhead(benchmark::State& state, const Operation& operation, Place place, 
     state.counters["ratio"] = ratios.percentile(50);
 }
 
-// The most where the library shows most.
+// More turns where the library's share of the time is larger.
 int turnsOf(Place place, int nTokens)
 {
     if (MANY == nTokens) {

@@ -1,9 +1,9 @@
-// Calls of the library, each beside the model of it (tests/model): a line with an API, a line with a method
-// ("none": none is named), and JSON, which serves as a record, as the options of a creation, as a change and
-// as a filter.
+// Compares calls of the library with its model (tests/model). The input is a line with an API, a line with a
+// method ("none" for none), and JSON, which is used as a record, as the options of a creation, as an update
+// and as a filter.
 //
-// Strings in the place of numbers go into statements as they are, so a filter can hold any SQL; what must
-// hold for those is only that the process lives.
+// A filter can contain SQL: a string for a number field becomes part of the statement. For such a filter it
+// is enough that the process survives.
 
 #include <sqlite3.h>
 
@@ -29,7 +29,7 @@ const char* const TOKENS[] = {
 
 int g_nSteps = 0;
 
-// What a statement may not do, since it stands in a transaction and must stay alone.
+// A filter with SQL may not leave the transaction or open other databases.
 int isAllowed(void*, int nAction, const char*, const char*, const char*, const char*)
 {
     return SQLITE_ATTACH == nAction || SQLITE_PRAGMA == nAction || SQLITE_TRANSACTION == nAction ||
@@ -49,7 +49,7 @@ sqlite3* database()
     return pDb;
 }
 
-// Over that one connection, and so within one transaction. Stays until the process ends.
+// Uses that connection alone, so that one transaction covers all. Lives until the process ends.
 Library& library()
 {
     static Library* pLibrary = nullptr;
@@ -78,8 +78,7 @@ void requireSameTable()
     FUZZ_REQUIRE(strDifference.empty());
 }
 
-// Runs an operation on the library and on the model, which must agree. Returns the arguments as they are
-// afterwards.
+// Runs an operation on the library and on the model, which must agree. Returns the arguments afterwards.
 Json::Value both(const std::string& strOperation, const std::map<std::string, Json::Value>& arguments)
 {
     Json::Value jCall(Json::objectValue);
@@ -110,7 +109,7 @@ void run(const char* szSql)
     FUZZ_REQUIRE(SQLITE_OK == sqlite3_exec(database(), szSql, nullptr, nullptr, nullptr));
 }
 
-// Makes a check in a transaction, which is undone.
+// Runs a check in a transaction, and rolls it back.
 template <typename Check>
 void undone(Check check)
 {
@@ -120,14 +119,14 @@ void undone(Check check)
     check();
     sqlite3_set_authorizer(database(), nullptr, nullptr);
     g_nSteps = 0;
-    if (!sqlite3_get_autocommit(database())) { // what took too long has been undone
+    if (!sqlite3_get_autocommit(database())) { // a statement that takes too long is rolled back by SQLite
         run("ROLLBACK");
     }
     model().store = before;
     requireSameTable();
 }
 
-// Text is read as what it was written from, and written the same again.
+// A value that is written and read again is equal.
 void checkText(const Json::Value& jValue)
 {
     const std::string strText = fuzz::text(jValue);
@@ -157,7 +156,7 @@ void checkRecord(const Json::Value& jValue, const Json::Value& jApi, const Json:
     both("tokenGetByTid", {{"tid", strTid}, {"answer", ""}});
 }
 
-// The filter's values for fields: one for each, or a list.
+// Whether the predicate holds for any field in the filter.
 template <typename Predicate>
 bool isAnyField(const Json::Value& jFilter, Predicate predicate)
 {
@@ -166,7 +165,7 @@ bool isAnyField(const Json::Value& jFilter, Predicate predicate)
     });
 }
 
-// Whether the filter does what it says: one value for each field, of the field's kind, and no paging.
+// Whether the filter has one value of the right kind for each field, and no paging.
 bool isPlain(const Json::Value& jFilter)
 {
     return !jFilter.isMember("sort_by") && !jFilter.isMember("limit") &&
@@ -177,7 +176,7 @@ bool isPlain(const Json::Value& jFilter)
            });
 }
 
-// Whether a string in the place of a number makes the filter any SQL.
+// Whether the filter can contain SQL: a string for a number field.
 bool isSql(const Json::Value& jFilter)
 {
     const auto isString = [](const Json::Value& jElement) { return jElement.isString(); };
@@ -188,7 +187,7 @@ bool isSql(const Json::Value& jFilter)
     });
 }
 
-// The condition is appended, and is one that cannot end the statement.
+// The condition is appended, and does not end the statement.
 void checkCondition(Json::Value jFilter, bool blAnd)
 {
     const std::string strStart = "SELECT 1 FROM token WHERE 1 and";
@@ -208,7 +207,7 @@ void checkCondition(Json::Value jFilter, bool blAnd)
     }
 }
 
-// As a plain filter, it selects and deletes what the model does.
+// A plain filter selects and deletes the same tokens as in the model.
 void checkPlainFilter(const Json::Value& jFilter)
 {
     both("tokenGet of the store", {{"filter", jFilter}, {"list", Json::arrayValue}});
@@ -217,7 +216,7 @@ void checkPlainFilter(const Json::Value& jFilter)
     }
 }
 
-// As any other, it gives one of the results that the headers name, and deletes as many as it says.
+// Any other filter gives a result that the headers name, and deletes as many tokens as it reports.
 void checkOddFilter(Json::Value jFilter)
 {
     AccessTokenDbApi& db = library().store;

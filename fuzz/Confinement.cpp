@@ -66,7 +66,7 @@ int refused(int nErrno)
     return -1;
 }
 
-// The database and the directories that lead to it.
+// The status of the database, or of a directory above it.
 int statusOf(const char* szPath, struct stat* pStatus = nullptr)
 {
     struct stat ignored;
@@ -162,7 +162,7 @@ INTERPOSED int sqlite3_open(const char*, sqlite3** ppDb)
     return SQLITE_OK;
 }
 
-// Defines a function that gives an answer of its own to the code under test.
+// Replaces a function by one that gives this answer to the code under test.
 #define CONFINED(result, name, parameters, arguments, answer)                                                \
     INTERPOSED result name parameters                                                                        \
     {                                                                                                        \

@@ -1,8 +1,8 @@
 // What the code under test may do to the machine: nothing.
 //
-// While a Confinement lives, the process seems to be root's, and the private directory seems to be there,
-// with a database that stands in memory. Two files can be read, EXTRA_FILE and TOKENS_FILE; files that are
-// made vanish. Log lines are written out and dropped. Users are root, and anna with uid 1000.
+// While a Confinement lives, the process believes that it is root's and that the private directory exists;
+// the database is in memory. Two files can be read, EXTRA_FILE and TOKENS_FILE; new files vanish. The clock,
+// the users and the log are those of tests/model/World.h.
 
 #ifndef FUZZ_CONFINEMENT_H
 #define FUZZ_CONFINEMENT_H
@@ -24,7 +24,8 @@ public:
     Confinement& operator=(const Confinement&) = delete;
 };
 
-// The database in memory that sqlite3_open opens for the code under test. It lasts as long as a connection.
+// Opens the database in memory that the code under test gets from sqlite3_open. It lasts as long as any
+// connection.
 sqlite3* openStore();
 
 // Gives this connection to the next caller of sqlite3_open instead.
@@ -33,8 +34,8 @@ void offer(sqlite3* pDb);
 // The text of both files.
 void setFileTexts(const std::string& strExtra, const std::string& strTokens);
 
-// From captureStreams on, which is to be called once while confined, the streams of the tool are kept: what
-// it wrote to each since the last call.
+// captureStreams() is called once, while confined. From then on the other two return what the tool has
+// written to standard output and standard error since their last call.
 void captureStreams();
 std::string takeResult();
 std::string takeComplaints();

@@ -26,7 +26,7 @@ Read readAtOnce(std::string_view strBytes)
     return read;
 }
 
-// As readHead, byte by byte.
+// The same, but the bytes arrive one by one.
 Read readSlowly(std::string_view strBytes)
 {
     Read read;
@@ -52,7 +52,7 @@ void requireSame(const Read& one, const Read& other)
                             }));
 }
 
-// The head in its plainest form.
+// The head in its simplest form.
 std::string plain(const Head& head)
 {
     std::string strPlain;
@@ -64,7 +64,7 @@ std::string plain(const Head& head)
     return strPlain + "\r\n";
 }
 
-// Whether any other reader finds the same lines: they end with CR LF, and nothing else controls anything.
+// Whether every reader finds the same lines: they end with CR LF, and there are no other control characters.
 bool hasPlainLines(std::string_view strHead, size_t nLines)
 {
     size_t nFound = 0;
@@ -91,7 +91,7 @@ std::string escaped(const std::string& strPart)
     return strEscaped;
 }
 
-// The same call, said plainly.
+// The same call in its simplest form.
 std::string plain(const Call& call)
 {
     std::string strPlain = "GET /grant/" + escaped(call.strApi);
@@ -136,7 +136,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pBytes, size_t cbBytes)
     const Read again = readAtOnce(strMore);
     requireSame(read, again);
     FUZZ_REQUIRE(again.cbHead == strPlain.size());
-    // Where a request ends is said once or not at all, and where it is not known, no other follows.
+    // The length of a request is given at most once. If it is unknown, the connection ends after it.
     const size_t nCoded = head.count("transfer-encoding");
     const size_t nSized = head.count("content-length");
     FUZZ_REQUIRE(nCoded + nSized <= 1 && head.count("host") <= 1);

@@ -1,4 +1,4 @@
-// What one process of the gate sends to the other: what is a message has one form.
+// Messages between the two processes of the gate: each valid message has exactly one form.
 
 #include "gate/Messages.h"
 

@@ -24,7 +24,7 @@ bool add(const Parameter* pParameter, const std::string& strText, Reading& readi
     return true;
 }
 
-// The arguments that are left; each call takes the first of them, or the first few.
+// Reads the arguments that are left. Each function takes one or more from the beginning.
 class Reader {
 public:
     Reader(const tool::Command& command, const Texts& strArguments, Reading& reading)
@@ -81,7 +81,7 @@ private:
         return addNext(pOption);
     }
 
-    // "otext", "o text", "o", or "ox" of several, without the "-" in front
+    // "otext", "o text", "o" or several flags "ox", after the "-"
     bool readShort(const std::string& strLetters)
     {
         const Parameter* pOption = find(m_command.options(), [&](const Parameter& each) {

@@ -1,4 +1,4 @@
-// The one way in which a target says that something does not hold that should.
+// How a target reports that a condition does not hold.
 
 #ifndef FUZZ_REQUIRE_H
 #define FUZZ_REQUIRE_H

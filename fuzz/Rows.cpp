@@ -1,5 +1,5 @@
-// A hostile database: SQL that makes one, or the bytes of a database file. Whatever stands in the table, the
-// library reads the rows that SQLite has, each as the rules of decoding say, or reports failure.
+// A hostile database: SQL that makes it, or the bytes of its file. Whatever it contains, the library decodes
+// the rows as SQLite returns them, or reports a failure.
 
 #include <sqlite3.h>
 
@@ -27,7 +27,7 @@ int isTooLong(void*)
     return ++g_nSteps > STEPS_MAX;
 }
 
-// Chance would make two readings differ.
+// Random values would make two readings differ.
 int isAllowed(void*, int nAction, const char* szName, const char* szFunction, const char*, const char*)
 {
     const bool blChance =
@@ -36,7 +36,7 @@ int isAllowed(void*, int nAction, const char* szName, const char* szFunction, co
     return blChance || blPragma || SQLITE_ATTACH == nAction ? SQLITE_DENY : SQLITE_OK;
 }
 
-// The database of a file's bytes, which SQLite gets a copy of.
+// Opens a copy of the bytes as the database.
 void readFile(sqlite3* pDb, std::string_view strFile)
 {
     auto* pCopy = static_cast<unsigned char*>(sqlite3_malloc64(strFile.size()));
@@ -64,8 +64,8 @@ sqlite3* hostile(std::string_view strInput)
     return pDb;
 }
 
-// The texts of the rows, by SQLite alone: up to a first NUL; nothing for a NULL, and where the table has a
-// field's name in other letters. No rows if they cannot be read to the end.
+// The texts of the rows as SQLite returns them, up to the first NUL. A value is missing if it is NULL or if
+// the column's name has other letters than the field's. No rows if reading them fails.
 typedef std::vector<std::optional<std::string>> Texts;
 std::optional<std::vector<Texts>> rowsOf(sqlite3* pDb)
 {
@@ -98,7 +98,7 @@ Json::Value decoded(Kind kind, const std::string& strText)
                                 : Json::Value(Json::Int64{strtoll(strText.c_str(), nullptr, 10)});
 }
 
-// The tokens of the rows; nothing where one cannot be decoded.
+// The tokens of the rows, or nothing if one cannot be decoded.
 std::optional<Json::Value> tokensOf(const std::optional<std::vector<Texts>>& rows)
 {
     if (!rows) {
@@ -133,8 +133,8 @@ void checkReading(AccessTokenApi& api, sqlite3* pDb)
     FUZZ_REQUIRE(!jExpected || fuzz::text(jTokens) == fuzz::text(*jExpected));
 }
 
-// Runs an operation, which may give any number that the headers name. Json::LogicError is one of them too: a
-// method list with arrays in it throws where a call is granted.
+// Runs an operation, which may return any result that the headers name. It may also throw Json::LogicError: a
+// grant does when a method list contains arrays.
 template <typename Operation>
 void run(Operation operation)
 {

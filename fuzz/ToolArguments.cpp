@@ -1,5 +1,4 @@
-// Command lines: an argument on each line, and behind a NUL byte the text on standard input. The whole
-// program runs, from main() on, on a store of some tokens.
+// Command lines of the tool: one argument on each line, and after a NUL byte the text on standard input.
 
 #include <algorithm>
 #include <cctype>
@@ -45,8 +44,7 @@ std::string commandOf(const Texts& strArguments)
     return strArguments.size() > 1 && COMMANDS.count(strArguments[1]) ? strArguments[1] : "";
 }
 
-// Each text of the command line reaches the option or argument that it is for, byte for byte; or the command
-// fails.
+// Each option and argument gets exactly its texts from the command line, or the command fails.
 void checkReading(const tool::Command& command, const Texts& strArguments, int nStatus)
 {
     fuzz::Reading reading;
@@ -62,7 +60,7 @@ void checkReading(const tool::Command& command, const Texts& strArguments, int n
 int run(const Texts& strArguments, const std::string& strInput)
 {
     const fuzz::Input input(strInput);
-    // To make all commands would take most of the time.
+    // Making all commands would take most of the time.
     const std::string strCommand = commandOf(strArguments);
     tool::Commands commands;
     COMMANDS.at(strCommand.empty() ? "generate" : strCommand)(commands);
@@ -73,7 +71,7 @@ int run(const Texts& strArguments, const std::string& strInput)
     return nStatus;
 }
 
-// No command of the tool is left out.
+// COMMANDS holds all commands of the tool.
 void checkCommands()
 {
     tool::Commands commands;
@@ -107,7 +105,7 @@ bool mayChange(const Texts& strArguments, int nStatus)
     if (blDryRun || READERS.count(strCommand) || (strCommand == "doctor" && !has(strArguments, "--repair"))) {
         return false;
     }
-    // Of several files, those ahead of a bad one are imported.
+    // The files before a bad one are imported.
     return strCommand == "import" ||
            (tool::EXIT_STATUS_USAGE != nStatus && tool::EXIT_STATUS_NO_TOKEN != nStatus);
 }
@@ -123,7 +121,7 @@ bool endsWith(const std::string& strText, const std::string& strEnd)
            0 == strText.compare(strText.size() - strEnd.size(), strEnd.size(), strEnd);
 }
 
-// Import says these of a file, when it has imported it, and can fail at the next one.
+// Notes on a file that was imported. The next file may fail, so they can precede a complaint.
 bool isNote(const std::string& strLine)
 {
     const std::string strStart = "vemo-access-token: ";
@@ -148,7 +146,7 @@ std::string withoutNotes(std::string strComplaint)
     }
 }
 
-// A failure is said in one sentence, without an id that was given as an argument.
+// A failure is reported in one sentence that contains no id from the arguments.
 void checkComplaint(const Texts& strArguments, int nStatus, const std::string& strComplaints)
 {
     const std::string strStart = "vemo-access-token: ";
@@ -163,7 +161,7 @@ void checkComplaint(const Texts& strArguments, int nStatus, const std::string& s
     for (const std::string& strArgument : strArguments) {
         FUZZ_REQUIRE(!isId(strArgument) || std::string::npos == strComplaint.find(strArgument));
     }
-    // Nothing of the store and the system fails here but what is asked in vain.
+    // Store and system do not fail here. Only these two requests cannot be met.
     const auto says = [&](const char* szText) { return std::string::npos != strComplaint.find(szText); };
     FUZZ_REQUIRE(tool::EXIT_STATUS_STORE != nStatus || says("the journal cannot be made") ||
                  says("granted, but there is no user"));
@@ -187,7 +185,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
     checkComplaint(strArguments, nStatus, strComplaints);
     if (store.isChanged()) {
         FUZZ_REQUIRE(mayChange(strArguments, nStatus));
-        // Import takes what the store can hold, the others what programs can create.
+        // Import accepts everything that the store can hold; the other commands make only what programs can.
         for (Json::Value& jToken : store.tokens()) {
             FUZZ_REQUIRE(commandOf(strArguments) == "import" ||
                          0 == VEMO_ACCESS_TOKEN::checkJsonType(jToken));

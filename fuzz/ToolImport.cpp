@@ -1,5 +1,5 @@
-// The text of a file that is imported. All of it comes in or none; what came in can be exported and imported
-// again; and what comes in without --partial is what came in with it.
+// The text of a file to import. Either all of it is imported or nothing. What was imported can be exported
+// and imported again, and is the same without --partial if the import then succeeds.
 
 #include <string>
 #include <vector>
@@ -52,7 +52,7 @@ bool isObject(const std::string& strLine)
     }
 }
 
-// The tokens of a text that was imported.
+// The tokens in a text that can be imported.
 Json::Value tokensOf(std::string_view strText)
 {
     Json::Value jTokens(Json::arrayValue);

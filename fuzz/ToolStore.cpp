@@ -13,7 +13,7 @@
 
 namespace {
 
-// Begins of ids, and what else is not as by default.
+// The beginnings of ids, and fields that differ from their defaults.
 const char* const TOKENS[] = {
     R"({"tid":"LiveToken","bind_sid":"sid","uid":0,"deadline":4102444800,"count":3,"function":"backup",)"
     R"("webapi_allow":{"Example.File":{"method":["get","list"]}},"extra":{"note":"\u001b[31m"}})",

@@ -1,4 +1,4 @@
-// The store that the tool finds: some tokens, the same ahead of each run.
+// The store that the tool uses, with the same tokens before each run.
 
 #ifndef FUZZ_TOOL_STORE_H
 #define FUZZ_TOOL_STORE_H
@@ -15,8 +15,8 @@ struct sqlite3;
 
 namespace fuzz {
 
-// Runs the tool with these arguments, the name of the program being the first, and returns its exit status.
-// What main() would take for a failure of the system ends the fuzzing.
+// Runs the tool with these arguments; the first is the name of the program. Returns its exit status.
+// Exceptions other than tool::Failure pass through, and end the fuzzing.
 int runTool(tool::Commands& commands, std::vector<std::string> strArguments);
 
 class ToolStore {
@@ -25,13 +25,13 @@ public:
     ToolStore(const ToolStore&) = delete;
     ToolStore& operator=(const ToolStore&) = delete;
 
-    // Whether a byte of the database is another than at first.
+    // Whether the database differs from its first state.
     bool isChanged() const;
 
-    // Its tokens. Fails unless all can be read and the database is sound.
+    // Its tokens. The database must be sound.
     Json::Value tokens() const;
 
-    // Makes it as it was at first.
+    // Restores its first state.
     void restore();
 
     // Deletes all tokens.
@@ -46,7 +46,7 @@ private:
     std::string m_strImage;
 };
 
-// Gives the tool a text on standard input while it lives.
+// Standard input for the tool, as long as the object lives.
 class Input {
 public:
     explicit Input(const std::string& strText);

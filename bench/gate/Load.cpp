@@ -54,7 +54,7 @@ std::vector<Client> connectAll(const Load& load, int nEpoll)
     return clients;
 }
 
-// Takes what has come, and the reply when it is whole.
+// Receives bytes. Returns the reply once it is complete.
 Reply takeReply(Client& client, const Load& load)
 {
     char rgBytes[16384];

@@ -1,5 +1,5 @@
 // Clients of a server in a closed loop: each sends a request, waits for the whole reply, and sends the next.
-// All run in one thread, which takes much less of the machine than a server does.
+// All run in one thread, which needs much less time than a server does.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_LOAD_H
 #define VEMO_ACCESS_TOKEN_BENCH_LOAD_H
@@ -11,17 +11,16 @@
 #include <string_view>
 #include <vector>
 
-// A connection to the path of a Unix socket, or to "PORT" of 127.0.0.1. Throws std::runtime_error when there
-// is none.
-int connectTo(const std::string& strAddress);
+// Connects to a Unix socket. Throws std::runtime_error when that fails.
+int connectTo(const std::string& strPath);
 
-// What a server has replied so far.
+// What the client has of a reply so far.
 struct Reply {
     size_t cbReply = 0; // the size of the whole reply; 0: more must come
     bool blGranted = false;
 };
 
-// Reads the reply at the beginning of what has come.
+// Reads the reply at the beginning of the received bytes.
 typedef std::function<Reply(std::string_view)> ReplyReader;
 
 Reply readHttpReply(std::string_view strBytes);
@@ -43,8 +42,7 @@ struct Loaded {
     double d99th = 0;
 };
 
-// Runs it, and waits for the replies that are still to come. Throws std::runtime_error when a connection
-// fails.
+// Runs the load, and waits for the last replies. Throws std::runtime_error when a connection fails.
 Loaded run(const Load& load);
 
 #endif

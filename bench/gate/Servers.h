@@ -1,4 +1,4 @@
-// The servers that are measured beside each other.
+// The servers that are compared with each other.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_SERVERS_H
 #define VEMO_ACCESS_TOKEN_BENCH_SERVERS_H
@@ -13,13 +13,13 @@
 // A program that runs as long as the object.
 class Program {
 public:
-    // Waits until something listens at the path.
+    // Starts the program, and waits until something listens at the path.
     Program(const std::vector<std::string>& strArguments, const std::string& strPath);
     ~Program();
     Program(const Program&) = delete;
     Program& operator=(const Program&) = delete;
 
-    // Of the program and those that it has started, in bytes.
+    // The memory of the program and its children, in bytes.
     double memory() const;
 
 private:
@@ -38,8 +38,8 @@ private:
     const Program m_program;
 };
 
-// nginx, which asks the server at strGate about each request of its own, or with an empty path one that
-// answers all at once.
+// nginx, which asks the server at strGate about each request. If strGate is empty, it asks a server that
+// allows everything at once.
 class Nginx {
 public:
     Nginx(const Store& store, const std::string& strGate);
@@ -50,7 +50,7 @@ private:
     const Program m_program;
 };
 
-// Has Redis hold the tokens from 0 to nTokens - 1, and returns the digest of the script that grants them.
+// Puts the tokens 0 to nTokens - 1 into Redis. Returns the digest of the script that grants them.
 std::string fillRedis(const std::string& strPath, int nTokens);
 
 #endif

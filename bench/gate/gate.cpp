@@ -1,8 +1,8 @@
 // The gate beside Redis, beside the library's calls and behind nginx. with-peers starts Redis and runs this
 // program.
 //
-// All stand on the disk, and all but what says otherwise hold 1000 tokens with many uses. Clients run in a
-// closed loop. The gate's replies are as many as the uses that are gone, or the program ends.
+// All data is on the disk. Unless stated otherwise there are 1000 tokens with many uses. Clients run in a
+// closed loop. The program fails unless the gate has spent exactly one use for each reply.
 
 #include <benchmark/benchmark.h>
 
@@ -70,7 +70,7 @@ void report(benchmark::State& state, const Loaded& loaded)
     state.counters["p99_us"] = loaded.d99th * 1e6;
 }
 
-// Returns how many replies there were.
+// Returns the number of replies.
 long long ask(benchmark::State& state, const std::string& strPath, std::vector<std::string> strRequests,
               ReplyReader read, size_t nClients)
 {
@@ -140,7 +140,7 @@ void redis(benchmark::State& state, int nUsed, size_t nClients)
     ask(state, strPath, redisRequests(nUsed, fillRedis(strPath, TOKENS)), readRedisReply, nClients);
 }
 
-// Programs that call the library, with a gate that holds the store open or without.
+// Programs that call the library; with blGate, while a gate holds the store open.
 void callers(benchmark::State& state, Journal journal, int nProcesses, Calls calls, bool blGate)
 {
     const std::unique_ptr<Store> pStore = makeStore(journal, TOKENS);

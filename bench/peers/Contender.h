@@ -1,6 +1,6 @@
-// One way to keep tokens and to grant them, so that several can be measured side by side.
+// One way to store and grant tokens. Several are compared.
 //
-// What fails for another reason than a refusal throws std::runtime_error.
+// A failure that is not a refusal throws std::runtime_error.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_CONTENDER_H
 #define VEMO_ACCESS_TOKEN_BENCH_CONTENDER_H
@@ -29,8 +29,8 @@ public:
     // if it has expired or does not list the method, spends one use and deletes it with the last.
     virtual bool grant(std::string& strTid, const char* szWebapi, const char* szMethod) = 0;
 
-    // The record that the last grant brought back, with the uses that are left; after the last use
-    // it still shows the count before it.
+    // The record that the last grant returned, with the uses left. After the last use it shows the count
+    // before that.
     virtual Json::Value answer() const = 0;
 };
 
@@ -38,9 +38,9 @@ public:
 enum class Tuning { Plain, Tuned };
 enum class Connection { PerCall, PerCallBesideAnother, Held };
 
-// Make a contender with the tokens 0 to nTokens - 1 (tokenOf()) and no others. At any time there may
-// be one of this library, and one on each server. PerCallBesideAnother is this library's alone: a call
-// opens and closes the file, but another process has it open too.
+// Make a contender with the tokens 0 to nTokens - 1 (tokenOf()). At most one for this library and one for
+// each server may exist at a time. PerCallBesideAnother is for this library only: each call opens and closes
+// the file while another process has it open.
 std::unique_ptr<Contender> makeOurs(int nTokens, Tuning tuning, Connection connection);
 std::unique_ptr<Contender> makeRedis(int nTokens, const char* szSocket, Connection connection);
 std::unique_ptr<Contender> makePostgresql(int nTokens, const char* szServer, Connection connection);
@@ -53,7 +53,7 @@ const Texts& fieldNames();
 
 Texts textsOf(const BareToken& token);
 
-// The record that these texts make.
+// The record with these texts.
 Json::Value recordOf(const Texts& rgstrText);
 
 #endif

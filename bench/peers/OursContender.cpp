@@ -49,8 +49,8 @@ public:
     Json::Value answer() const override { return m_jAnswer; }
 
 private:
-    // A write-ahead journal that stays grows to some size, and is written over from then on. What is
-    // measured is that long rest of its life.
+    // A write-ahead journal that stays grows to some size, and is overwritten from then on. Only that later
+    // phase is measured.
     void fillLog()
     {
         std::string strTid = tokenOf(0).strTid;

@@ -1,4 +1,4 @@
-// Calls of a Redis server, which throw std::runtime_error when they fail.
+// Calls of a Redis server. They throw std::runtime_error when they fail.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_REDIS_H
 #define VEMO_ACCESS_TOKEN_BENCH_REDIS_H

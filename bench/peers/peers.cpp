@@ -1,10 +1,9 @@
 // The same grant on this library, on Redis and on PostgreSQL, side by side. with-peers starts the
 // servers and runs this program.
 //
-// Every contender holds 1000 tokens. One more is made, which is not timed, and granted until its
-// last use deletes it; each of these grants is timed. A repetition begins with fresh data, so that
-// repetitions can be interleaved (--benchmark_enable_random_interleaving), and reports the median and
-// the 99th percentile of its calls.
+// Each contender holds 1000 tokens. One more is made and granted until its last use deletes it; only these
+// grants are timed. Each repetition starts with fresh data, so repetitions can be interleaved
+// (--benchmark_enable_random_interleaving). It reports the median and the 99th percentile of its calls.
 
 #include <benchmark/benchmark.h>
 
@@ -78,7 +77,7 @@ void require(bool blHolds, const Entry& entry, const char* szWhat)
     }
 }
 
-// Throws unless the contender does what is to be measured.
+// Throws unless the contender works as it should.
 void verify(const Entry& entry)
 {
     const std::unique_ptr<Contender> pContender = entry.make();

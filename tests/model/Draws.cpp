@@ -23,7 +23,7 @@ Json::Value parsed(const char* szText)
     return jValue;
 }
 
-// Ids long enough and not, two of which read the same up to a NUL, and one that two others make in a list.
+// Ids that are long enough or not. Two are equal up to a NUL, and one is what two others become in a list.
 const std::string g_rgTid[] = {
     idOf("a"),
     idOf("b"),
@@ -66,7 +66,7 @@ const char* const g_rgExtra[] = {"{}", R"({"note":"it's"})", R"({"a":{"b":[1,-2,
                                  R"({"n":18446744073709551615,"m":-9223372036854775808,"d":0.1})",
                                  "{\"t\":\"\\u0000\\u0001\\n\\t\\\"\\\\/\xff\xc3\xa9\"}"};
 
-// Texts for number fields, whose place in a statement they take without quotes.
+// Texts for number fields, which become part of a statement without quotes.
 const char* const g_rgNumberText[] = {"7",    "-1", "count", "uid",       TEXT_OR_TRUE,
                                       "null", "'",  "",      "no_column", "1 1"};
 
@@ -74,7 +74,7 @@ const unsigned int g_rgUid[] = {UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77
 
 const Json::UInt g_rgSize[] = {0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE};
 
-// Of a clock that was not set, or is days wrong; around the end of 32 bits; and where SQLite's dates end.
+// A clock that was never set or is years wrong; the end of 32 bits; the end of SQLite's dates.
 const time_t DAY = 86400;
 const time_t g_rgWrongTime[] = {-DAY - 1,
                                 -1,
@@ -171,7 +171,7 @@ Json::Value Draws::granted()
     return granted.columns[0];
 }
 
-// Mostly one that the token allows, as few others would.
+// Mostly one that the token allows: others would rarely match.
 Json::Value Draws::webapi()
 {
     return m_jAllow.isObject() && !m_jAllow.empty() ? oneOf(m_jAllow.getMemberNames())
@@ -289,7 +289,7 @@ Json::Value Draws::record()
     return jRecord;
 }
 
-// What a filter compares with a field: mostly what some row holds there.
+// A value to compare a field with: mostly the value of some row.
 Json::Value Draws::scalar(const Field& compared)
 {
     Json::Value jValue = field(compared);

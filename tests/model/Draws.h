@@ -1,4 +1,4 @@
-// The arguments of operations, drawn at random: from few values, so that they meet, and from strange ones.
+// Draws the arguments of operations at random: from a few values, so that calls meet, and from strange ones.
 
 #ifndef TESTS_DRAWS_H
 #define TESTS_DRAWS_H
@@ -13,25 +13,26 @@
 
 class Draws {
 public:
-    // Some draws repeat what is in the rows, which must live as long.
+    // Some draws repeat values of these rows, which must live as long as this object.
     Draws(uint64_t nSeed, const std::vector<Row>& rows) : m_source(nSeed), m_rows(rows) {}
 
     size_t below(size_t nLimit) { return static_cast<size_t>(m_source() % nLimit); }
     bool oneIn(size_t nTimes) { return 0 == below(nTimes); }
 
-    // Now and then ahead, and rarely to a time that is quite wrong, for some ten operations.
+    // Moves it on a little now and then; rarely sets it to a wrong time for about ten operations.
     void moveClock();
 
     // The argument of that name:
-    //   tid, fresh     ids that a row has, mostly; that no row has, mostly
+    //   tid, fresh     an id that a row has, mostly; an id that no row has, mostly
     //   granted, webapi, method
-    //                  mostly what a row allows; the last two null now and then
-    //   uid, function, sid, sid_or_null, name (of a field, mostly), option (of a creation), param (of an
-    //   update), record, filter text, texts    values that the fields of kind Text have, mostly ids list,
-    //   user, size
-    //                  what a caller hands over for a list, or for the user's name
-    //   flag, rare_flag
-    //   made, answer   what is not to be read
+    //                  mostly what a row allows; the last two are null now and then
+    //   option, param  of a creation; of an update
+    //   name           mostly that of a field
+    //   text, texts    values of text fields, mostly ids
+    //   list           what a caller passes for a list
+    //   user, size     a buffer for the user's name
+    //   made, answer   a value that the operation must not read
+    //   uid, function, sid, sid_or_null, record, filter, flag, rare_flag
     Json::Value argument(const std::string& strName);
 
 private:
@@ -57,7 +58,7 @@ private:
     Json::Value allow();
     Json::Value extra();
     Json::Value deadline();
-    Json::Value field(const Field& field);     // a value to store, now and then of a wrong type
+    Json::Value field(const Field& field);     // a value to store, sometimes of a wrong type
     Json::Value condition(const Field& field); // a value to filter by
     Json::Value scalar(const Field& field);
     void addPaging(Json::Value& jFilter);

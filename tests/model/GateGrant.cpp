@@ -15,7 +15,7 @@ gate::Owners::Owner anyOwner(uid_t)
     return {gate::Owners::State::Known, "anybody"};
 }
 
-// The library writes the whole row anew, at the end of the table; the gate leaves it in its place.
+// The library replaces the row, which moves it to the end of the table; the gate updates it in place.
 void moveToTheEnd(const std::string& strTid)
 {
     AccessTokenDbApi db;
@@ -25,7 +25,7 @@ void moveToTheEnd(const std::string& strTid)
     move.bind(1, strTid).step();
 }
 
-// The answer, and what was counted for it.
+// The answer, and the gate's counters.
 std::pair<gate::Answer, gate::Figures> call(const gate::Request& request)
 {
     static gate::Store& store = *new gate::Store;

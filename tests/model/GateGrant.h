@@ -1,4 +1,4 @@
-// A grant as the gate makes it, in the place of the library's.
+// A grant by the gate instead of the library.
 
 #ifndef TESTS_MODEL_GATE_GRANT_H
 #define TESTS_MODEL_GATE_GRANT_H
@@ -7,8 +7,7 @@
 
 #include <string>
 
-// Does what VemoAccessTokenGrantEx does. What the gate refuses on purpose though the library grants it, the
-// library grants here.
+// Does what VemoAccessTokenGrantEx does. Calls that the gate refuses on purpose go to the library.
 int grantAtTheGate(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
                    Json::Value& jToken);
 

@@ -1,8 +1,8 @@
-// The library as one reads about it: a table in memory, and the operations on it under the names and
-// arguments of the library's own. Nothing of the library is used here, and no SQL.
+// A model of the library: a table in memory, and operations with the names and arguments of the library's.
+// Nothing of the library is used here, and no SQL.
 //
-// What the operations only read they leave as it was, as the library does. They throw Json::LogicError where
-// the library passes one on, that is where a value is of a type that its use cannot convert.
+// Operations do not change arguments that they only read. They throw Json::LogicError where the library does:
+// when a value cannot be converted.
 
 #ifndef TESTS_MODEL_H
 #define TESTS_MODEL_H
@@ -23,7 +23,7 @@ public:
     int tokenDelete(Json::Value& jFilter, bool blAll);
     int cleanExpireToken(bool blLog);
 
-    // In the order of the table, which is that of their last writing.
+    // In the order of the table: sorted by when they were last written.
     const std::vector<Row>& rows() const { return m_rows; }
 
 private:
@@ -34,7 +34,7 @@ class ModelService {
 public:
     explicit ModelService(ModelStore& store) : m_store(store) {}
 
-    // Takes the library's word for an id that it made up, if it looks like one.
+    // Tells the model the id that the library has generated; it must look like one.
     void setGenerated(const std::string& strTid);
     int tokenGenerate(std::string& strTidOut);
 
@@ -68,7 +68,7 @@ private:
     std::string m_strGenerated;
 };
 
-// The exported functions: all but the deletion by session purge first.
+// The exported functions. All of them purge first, except the deletion by session.
 class ModelFunctions {
 public:
     explicit ModelFunctions(ModelService& service) : m_service(service) {}

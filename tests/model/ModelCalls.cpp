@@ -5,7 +5,7 @@
 
 namespace {
 
-// An argument of a call in the type of its parameter. Strings are put back as they are afterwards.
+// A member of jCall as an argument of the parameter's type. Strings are written back after the call.
 template <typename Parameter>
 struct Argument;
 
@@ -25,7 +25,7 @@ struct Argument<std::string&> {
     Json::Value& j;
 };
 
-// Room for a text, or null.
+// A buffer for a text, or null.
 template <>
 struct Argument<char*> {
     explicit Argument(Json::Value& jMember)
@@ -97,7 +97,7 @@ int invoke(Part& part, Member member, Json::Value& jCall, const Names& szArgumen
     return invoke(part, member, jCall, szArguments, types, std::index_sequence_for<Parameters...>());
 }
 
-// Calls the member of that part of a system.
+// A call of that member of that part of a Library or a Model.
 template <typename System, typename Part, typename Member>
 Call<System> on(Part System::*part, Member member)
 {

@@ -1,4 +1,4 @@
-// The operations that tests draw, each of which runs on the library and on the model.
+// The operations. Each can run on the library and on the model.
 
 #ifndef TESTS_MODEL_CALLS_H
 #define TESTS_MODEL_CALLS_H
@@ -38,7 +38,7 @@ struct Library {
     LibraryFunctions functions;
 };
 
-// What came of an operation.
+// The outcome of an operation.
 struct Outcome {
     int nResult = 0;
     std::string strThrown; // instead of a result
@@ -50,7 +50,7 @@ struct Outcome {
     }
 };
 
-// A call of a member of a Library or a Model; its arguments are the members of jCall that have these names.
+// Calls a member of a Library or a Model. The arguments are the members of jCall with these names.
 typedef std::vector<const char*> Names;
 template <typename System>
 using Call = std::function<int(System& system, Json::Value& jCall, const Names& szArguments)>;
@@ -60,7 +60,7 @@ struct Operation {
     Outcome run(Model& model, const Json::Value& jCall) const { return run(callModel, model, jCall); }
 
     const char* szName;
-    size_t nWeight;    // how often it is drawn, beside the others
+    size_t nWeight;    // how often it is drawn, compared with the others
     Names szArguments; // as Draws names them
     Call<Library> callLibrary;
     Call<Model> callModel;

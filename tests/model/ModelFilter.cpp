@@ -23,13 +23,13 @@ Json::Int64 number(const Row& row, size_t nField)
     return row.jRecord[FIELDS[nField].szName].asInt64();
 }
 
-// A long double holds each integer of 64 bits exactly, and none equals a number beyond them.
+// A long double holds every 64-bit integer exactly.
 Condition numberIs(size_t nField, long double number64)
 {
     return [=](const Row& row) { return static_cast<long double>(number(row, nField)) == number64; };
 }
 
-// "12", "2.5" or "true" at the head of a text, which is taken off it.
+// Takes "12", "2.5" or "true" off the beginning of a text.
 std::optional<long double> takeNumber(std::string& strText)
 {
     long double number64 = 0;
@@ -48,8 +48,8 @@ std::optional<long double> takeNumber(std::string& strText)
     return number64;
 }
 
-// Numbers that stand side by side without a separator run together, but for negative ones, whose sign
-// then subtracts: 1 and 2 are 12, 3 and -2 are 1. Nothing when it is no valid SQL.
+// The library puts no separator between the numbers of a list: 1 and 2 become 12. A negative number is
+// subtracted: 3 and -2 become 1. Returns nothing if the text is not valid SQL.
 std::optional<long double> valueOf(std::string strText)
 {
     long double sum = 0;
@@ -77,8 +77,8 @@ std::string textOf(Kind kind, const Json::Value& jValue)
     return Kind::Json == kind ? jsonText(jValue) : untilNul(jValue.asString());
 }
 
-// No separator stands between the elements. Those of text fields are quoted, and two quotes in a row are
-// one that belongs to the text.
+// The library puts no separator between the elements of a list. Texts are quoted, so two quotes meet and
+// stand for one quote in the text.
 std::string listText(Kind kind, const Json::Value& jList)
 {
     std::string strText;
@@ -88,7 +88,7 @@ std::string listText(Kind kind, const Json::Value& jList)
     return strText;
 }
 
-// The keyword from the position on that the number tells, of which 32 bits count.
+// The keyword from a position on, of which only 32 bits count.
 std::string tail(const std::string& strKeyword, Json::Int64 nNumber)
 {
     return strKeyword.substr(std::min<size_t>(static_cast<uint32_t>(nNumber), strKeyword.size()));
@@ -137,7 +137,7 @@ void Where::add(size_t nField, const Json::Value& jValue)
     }
 }
 
-// The text goes into the statement as it is, so it may be more than a number.
+// The text becomes part of the statement without quotes, so it may contain SQL.
 void Where::addNumber(size_t nField, const std::string& strText, bool blList)
 {
     const size_t nOther = fieldNumber(strText);
@@ -176,7 +176,7 @@ bool isSpoiledByPaging(const Json::Value& jFilter, bool blWithoutFields)
         strTail = tail(" LIMIT ", jFilter["limit"].asInt64());
         strTail += jFilter.isMember("offset") ? tail(" OFFSET ", jFilter["offset"].asInt64()) : "";
     }
-    // What is left of the keywords is no SQL, and anything behind "WHERE" is none either.
+    // A part of a keyword is not valid SQL; nor is "WHERE" without a condition.
     return std::string::npos != strTail.find_first_not_of(' ') ||
            (blWithoutFields && (blSorted || !strTail.empty()));
 }

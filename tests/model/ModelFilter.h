@@ -9,7 +9,7 @@
 
 typedef std::function<bool(const Row&)> Condition;
 
-// The filter's members that name fields.
+// The conditions of a filter: those members that name fields.
 struct Where {
     explicit Where(const Json::Value& jFilter);
     bool matches(const Row& row) const;
@@ -27,16 +27,16 @@ private:
     struct Alternative {
         std::vector<Condition> conditions;
         bool blUnknownName = false; // of a column
-        bool blNever = false;       // SQLite sees so from the first, and does not look for columns then
+        bool blNever = false;       // SQLite notices that at once, and does not look for the column then
     };
     std::vector<Alternative> m_alternatives = {{}}; // one of which must hold
 };
 
-// Whether the filter's ordering and paging make a query invalid; they have no other effect.
+// Whether ordering and paging make the query invalid. They have no other effect.
 bool isSpoiledByPaging(const Json::Value& jFilter, bool blWithoutFields);
 
-// A text for a number field that says more than a number: it ends the conditions so far, and adds the
-// alternative that always holds, to which the conditions that follow belong.
+// A text for a number field that contains SQL. It ends the conditions so far and adds an alternative that
+// always holds; later conditions belong to that alternative.
 const char* const TEXT_OR_TRUE = "0 or 1=1";
 
 #endif

@@ -1,4 +1,4 @@
-// A token of the model's table, and the fields that it is made of.
+// A token in the model's table, and its fields.
 
 #ifndef TESTS_MODEL_ROW_H
 #define TESTS_MODEL_ROW_H
@@ -24,13 +24,13 @@ size_t fieldNumber(const std::string& strName);
 
 struct Row {
     std::vector<std::string> columns; // as the table holds them; numbers as decimal text
-    Json::Value jRecord;              // as the library hands it out
+    Json::Value jRecord;              // as the library returns it
 };
 
 // The row that a complete record becomes. Throws Json::LogicError when a member cannot be converted.
 Row rowOf(const Json::Value& jRecord);
 
-// What SQL sees of a text that is handed over as a C string.
+// A text up to its first NUL, which is what SQL gets.
 std::string untilNul(const std::string& strText);
 
 // The JSON text that the table holds, and that filters compare: compact, strings byte for byte.

@@ -20,7 +20,7 @@ namespace {
 const size_t REPORTED = 12;    // operations that a failure shows
 const size_t TEXT_SHOWN = 500; // of each
 
-// For a reader's eyes: short, and with what cannot be printed in hexadecimal.
+// Short, and with bytes that cannot be printed in hexadecimal.
 std::string shown(const Json::Value& jCall)
 {
     const std::string strText = jsonText(jCall);
@@ -56,7 +56,7 @@ struct Tally {
     }
 };
 
-// Beside the library's own connections.
+// Another connection than the library's.
 sqlite3* openDatabase(const std::string& strPath)
 {
     sqlite3* pDb = nullptr;
@@ -66,7 +66,7 @@ sqlite3* openDatabase(const std::string& strPath)
 
 class ModelCheck : public ::testing::Test {
 protected:
-    // Draws an operation and runs it on both; a fatal failure when they do not agree.
+    // Draws an operation and runs it on both. Fails fatally if they do not agree.
     void runOne()
     {
         m_draws.moveClock();
@@ -120,7 +120,7 @@ protected:
         }
     }
 
-    // The last operations, and how to have them again.
+    // The last operations, and how to repeat them.
     std::string history() const
     {
         std::string strText = "seed " + std::to_string(seed()) + ", operation " + std::to_string(m_nNumber) +

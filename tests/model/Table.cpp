@@ -5,7 +5,7 @@
 
 namespace {
 
-// The differing column of the current row; "" when there is none.
+// How the current row differs from the expected one, or "".
 std::string columnDifference(sqlite3_stmt* pRow, const Row& row)
 {
     for (size_t i = 0; i < FIELDS.size(); ++i) {

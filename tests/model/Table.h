@@ -1,4 +1,4 @@
-// The library's table, read beside the library.
+// The library's table, read without the library.
 
 #ifndef TESTS_TABLE_H
 #define TESTS_TABLE_H
@@ -13,7 +13,7 @@ class Table {
 public:
     explicit Table(sqlite3* pDb);
 
-    // How the table differs from the rows, in whose order it is to be; "" when it does not.
+    // How the table differs from these rows in this order, or "".
     std::string differenceFrom(const std::vector<Row>& rows) const;
 
 private:

@@ -78,7 +78,7 @@ INTERPOSED int fdatasync(int)
     return 0;
 }
 
-// Lines are written out and dropped.
+// Formats the line, and drops it.
 INTERPOSED void syslog(int, const char* szFormat, ...)
 {
     char szLine[256];

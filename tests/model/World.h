@@ -1,5 +1,5 @@
-// The system around the library as this test has it: a clock that stands still until the test moves it, a few
-// users, a disk that nobody waits for and a log that nobody reads. The library and SQLite see it too.
+// Replaces parts of the system for the library and SQLite: a clock that only the test moves, a few users, no
+// syncs and no log.
 
 #ifndef TESTS_WORLD_H
 #define TESTS_WORLD_H
@@ -8,7 +8,7 @@
 
 #include <ctime>
 
-// In seconds since the epoch, and to be set.
+// Seconds since the epoch; tests set it.
 time_t& worldClock();
 
 const time_t YEAR_10000 = 253402300800; // SQLite has no dates from then on

@@ -1,4 +1,4 @@
-// For programs that define functions of the libraries they use, to see them called.
+// For programs that replace functions of the libraries that they use.
 
 #ifndef TESTS_INTERPOSE_H
 #define TESTS_INTERPOSE_H

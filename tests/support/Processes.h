@@ -11,7 +11,7 @@
 #include <new>
 #include <type_traits>
 
-// Zeroed memory that processes share with those that they fork.
+// Zeroed memory that a process shares with those that it forks.
 template <typename Element>
 class SharedArray {
 public:
@@ -35,16 +35,16 @@ private:
     void* const m_pMemory;
 };
 
-// Forks a process that runs body and ends; with status 0, unless body throws. It is killed when its parent
-// ends.
+// Forks a process that runs body and ends with status 0, or with 1 if body throws. It is killed if its parent
+// ends first.
 pid_t startProcess(const std::function<void()>& body);
 
-// Wait for a process: its wait status, and whether that is 0.
+// Wait for a process to end. They return its wait status, and whether that is 0.
 int statusOf(pid_t pid);
 bool endsWell(pid_t pid);
 
-// Runs body(0), body(1) and so on in processes of their own, which all begin when the last is there.
-// Returns how many of them did not end well.
+// Runs body(0), body(1) and so on, each in a process of its own. All begin when the last process has started.
+// Returns how many did not end well.
 int runProcesses(int nProcesses, const std::function<void(int)>& body);
 
 #endif
