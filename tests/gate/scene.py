@@ -65,7 +65,7 @@ class Scene(unittest.TestCase):
         for program in cls.PROGRAMS:
             if not shutil.which(program, path=PATH):
                 raise unittest.SkipTest(f"{program} is not installed")
-        memory = "/dev/shm"  # no disk that each call waits for
+        memory = os.environ.get("TMPDIR", "/dev/shm")  # no disk that each call waits for
         cls.directory = tempfile.mkdtemp(prefix="gate-", dir=memory if os.access(memory, os.W_OK) else None)
         cls.addClassCleanup(shutil.rmtree, cls.directory)
         cls.environment = {**os.environ, "PATH": PATH, "HOME": cls.directory, "GATE_SOCKET": cls.at("calls"),
