@@ -57,11 +57,9 @@ std::string contentsOf(const fs::path& path)
 
 std::string line(const std::string& strName)
 {
-    std::string strTid = "known-" + strName;
-    strTid.resize(VEMO_ATOKEN_LENGTH_MIN, 'x');
     return R"({"bind_sid":"","count":2,"create_time":1,"deadline":4102444800,"extra":{"n":[1.5,"x"]},)"
            R"("function":"VPN","tid":")" +
-           strTid + R"(","uid":0,"webapi_allow":{"Example.Api":{"method":["get"]}}})" + "\n";
+           idOf(strName) + R"(","uid":0,"webapi_allow":{"Example.Api":{"method":["get"]}}})" + "\n";
 }
 
 // An export of two tokens.

@@ -9,15 +9,15 @@
 #include <memory>
 
 #include "Figures.h"
+#include "Operations.h"
 #include "Scene.h"
-#include "vemo-access-token.h"
 
 namespace {
 
 const int64_t STRIDE_OF_MEMORY = 32; // of the many allocations, these every day
 const int64_t LAST_CALLS = 12;       // each of them counts: they come when the change has been made
 
-const std::string TID = "known-three" + std::string(VEMO_ATOKEN_LENGTH_MIN - 11, 'x');
+const std::string TID = idOf("three");
 
 struct Command {
     const char* szName;
