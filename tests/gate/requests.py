@@ -60,8 +60,8 @@ def head_of(size):
 
 GOOD = call()
 
-# What is sent, and all that comes back, response by response. The client sends nothing more, but stays open for
-# reading, so whatever is not answered ends the connection. Behind CLOSE, the gate has said so.
+# What a client sends, and all that comes back, response by response. The client then sends nothing more and reads on
+# until the gate ends the connection. CLOSE: the response says that it does.
 ROWS = [
     ("a call", GOOD, [GRANTED]),
     ("two calls in one packet", GOOD + GOOD, [GRANTED, GRANTED]),
