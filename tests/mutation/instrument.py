@@ -285,7 +285,9 @@ class Source:
         if self.text.startswith("const ", start):
             start += len("const ")
         end = variable.location.offset - 1
-        self.edits.append((start, end, f"mutant_guard<{number}, ", ">"))
+        written, whole = self.text[start:end], variable.type.get_canonical().spelling
+        arguments = whole[whole.index("<") :] if "<" in whole and "<" not in written else ""  # deduced ones
+        self.edits.append((start, end, f"mutant_guard<{number}, ", arguments + ">"))
 
     # Expressions
 
