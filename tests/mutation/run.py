@@ -3,13 +3,13 @@
 
 usage: run.py BUILD MUTANTS SURVIVORS [-j JOBS] [-k PATTERN] [-n N]
 BUILD is the build of the mutated sources, MUTANTS the list that instrument.py wrote. SURVIVORS explains the mutants
-that no test can tell from the original, or none is meant to: lines with the names of mutants, and behind each group
-of them an indented reason. -k leaves all mutants alone whose names do not contain PATTERN. -n takes one in N of the
-others, drawn at random from the seed VEMO_TEST_SEED.
+that no test can tell from the original, or none is meant to: lines with their names, in which "..." stands for any
+text, and behind each group of them an indented reason. -k leaves all mutants alone whose names do not contain
+PATTERN. -n takes one in N of the others, drawn at random from the seed VEMO_TEST_SEED.
 
-A test is one of GoogleTest or one case of bats. A first run of each notes which mutants make a difference where it
-passes; only these can it notice. So against each mutant run only the tests that reach it, until one fails: those first
-that killed mutants of the same function, then the quickest.
+A test is one of GoogleTest, one case of bats or one class of Python. A first run of each notes which mutants make a
+difference where it passes; only these can it notice. So against each mutant run only the tests that reach it, until one
+fails: those first that killed mutants of the same function, then the quickest.
 
 A mutant is killed when a test fails, crashes, or takes ten times as long as it should and ten seconds more.
 """
@@ -98,6 +98,8 @@ def all_tests(build):
             for case in re.findall('^@test "(.*)" {$', pathlib.Path(command[1]).read_text("utf-8"), re.MULTILINE):
                 pattern = re.sub(r"([][\\.^$*+?(){}|])", r"\\\1", case)
                 yield Test(entry, f"{entry['name']}: {case}", [command[0], "-f", f"^{pattern}$", command[1]])
+        elif command and command[0].endswith(".py"):
+            yield Test(entry, entry["name"], command)
 
 
 def profile(build, n_mutants, pool):
@@ -126,25 +128,29 @@ def killer(mutant, name, tests, explained, killers):
     return None
 
 
-def read_survivors(path):
-    """The explained mutants. A reason explains the names above it, up to the reason before."""
-    explained, waiting = set(), []
+def read_survivors(path, names):
+    """The mutants that each line explains. A reason explains the lines above it, up to the reason before."""
+    explained, waiting = {}, []
     for line in path.read_text(encoding="ascii").splitlines():
         if line.startswith(" "):
-            explained.update(waiting)
             waiting = []
         elif line and not line.startswith("#"):
             waiting.append(line)
-    for name in waiting:
-        print(f"without a reason: {name}")
+            pattern = re.compile(".*".join(re.escape(part) for part in line.split("...")))
+            explained[line] = {name for name in names if pattern.fullmatch(name)}
+            if not explained[line]:
+                print(f"explained, but no mutant: {line}")
+    for line in waiting:
+        print(f"without a reason: {line}")
     return explained
 
 
-def report(killers, explained):
-    """killers: the test that killed a mutant, or None, by the mutant's name."""
-    for name in sorted(explained & killers.keys()):
-        if killers[name]:
-            print(f"explained, but killed: {name}")
+def report(killers, lines):
+    """killers: the test that killed a mutant, or None, by the mutant's name. lines: what explains which mutants."""
+    for line, mutants in lines.items():
+        if mutants & killers.keys() and all(killers[name] for name in mutants & killers.keys()):
+            print(f"explained, but killed: {line}")
+    explained = set().union(*lines.values())
     good = True
     for part in sorted({name.split("/")[0] for name in killers}):
         names = [name for name in killers if name.startswith(part + "/")]
@@ -178,14 +184,13 @@ def main():
         seed = os.environ.get("VEMO_TEST_SEED") or str(random.randrange(1 << 32))
         chosen = random.Random(seed).sample(chosen, -(-len(chosen) // arguments.n))
         print(f"{len(chosen)} of them, VEMO_TEST_SEED={seed}")
-    explained = read_survivors(arguments.survivors)
-    for name in sorted(explained - set(names)):
-        print(f"explained, but no mutant: {name}")
+    lines = read_survivors(arguments.survivors, names)
+    explained = set().union(*lines.values())
     killers = collections.defaultdict(collections.Counter)
     with concurrent.futures.ThreadPoolExecutor(arguments.j) as pool:
         tests = profile(arguments.build, len(names), pool)
         results = dict(pool.map(lambda each: (each[1], killer(*each, tests, explained, killers)), chosen))
-    sys.exit(0 if report(results, explained) else 1)
+    sys.exit(0 if report(results, lines) else 1)
 
 
 main()
