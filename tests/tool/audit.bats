@@ -35,7 +35,6 @@ setup_log()
     setup_log
     local arguments expected name
     while IFS='|' read -r arguments expected; do
-        # shellcheck disable=SC2086
         run_tool $arguments
         [ "$(told)" = "$expected" ] || {
             echo "$arguments: $output$stderr"

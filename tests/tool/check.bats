@@ -92,7 +92,6 @@ END
         before=$(sql "SELECT * FROM token")
         succeeds list --epoch
         succeeds show token---
-        # shellcheck disable=SC2086 # several arguments
         if [ "$result" = allowed ]; then
             gives allowed check token--- $arguments
             gives granted grant "token---$ZEROS" $arguments

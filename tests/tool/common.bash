@@ -60,7 +60,6 @@ run_tool()
     text_of stderr "$streams.errors"
     local IFS=$'\n'
     set -f
-    # shellcheck disable=SC2034,SC2206 # for the tests, which want the lines
     lines=($output)
     set +f
 }

@@ -66,7 +66,6 @@ all_fail()
     [ ! -f "$DB" ] || cp -f "$DB" "$DIR/before"
     before=$(ls -Al "$VEMO_REDIRECT_DIR" 2>&1 || true)
     while read -r arguments; do
-        # shellcheck disable=SC2086 # several arguments
         fails 4 "$1" $arguments </dev/null || {
             echo "of: $arguments"
             return 1
@@ -199,7 +198,6 @@ TABLE
     chmod 0000 "$DB"
     local arguments
     while read -r arguments; do
-        # shellcheck disable=SC2086
         fails 4 "$REAL_DB cannot be opened: Permission denied" $arguments
     done < <(commands)
     run_tool doctor

@@ -75,7 +75,6 @@ paths()
 
 # As the drop-in has it for services, on the real path.
 @test "without a capability, root takes a token through its life" {
-    # shellcheck disable=SC2016 # expanded there
     in_namespace 'mount -t tmpfs tmpfs /run
         tool=(setpriv --bounding-set=-all --inh-caps=-all --ambient-caps=-all "$1")
         "${tool[@]}" init && id=$("${tool[@]}" create --uid 0 --function VPN --allow Api) &&
@@ -172,7 +171,6 @@ logout()
     [ "$told" = "" ]
     a_token --bind-sid "$boot-42" >/dev/null
     while read -r arguments; do
-        # shellcheck disable=SC2086
         logout $arguments
         [ "$told" = "" ]
         [ "$(sql "SELECT count(*) FROM token")" -eq 4 ]

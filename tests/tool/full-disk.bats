@@ -11,7 +11,6 @@ on_full_disk()
     cd "$DIR" || return
     unshare --mount --propagation private mount -t tmpfs tmpfs disk 2>/dev/null || skip "no right to mount"
     export TOOL VEMO_REDIRECT_DIR=$DIR/disk/session
-    # shellcheck disable=SC2016 # for that bash
     run --separate-stderr unshare --mount --propagation private bash -c '
         mount -t tmpfs -o size=256k tmpfs disk
         "$TOOL" init >/dev/null
@@ -30,7 +29,6 @@ FULL="vemo-access-token: /usr/vemo/etc/private/session/vemo-access-token.db fail
         printf '{"bind_sid":"","count":1,"create_time":0,"deadline":9999999999,"extra":{},"function":"VPN",'
         printf '"tid":"%0127d","uid":0,"webapi_allow":{}}\n' "$i"
     done | whole >"$DIR/tokens"
-    # shellcheck disable=SC2016
     on_full_disk '
         "$TOOL" import tokens; echo $?
         "$TOOL" create --uid 0 --function VPN; echo $?
@@ -56,7 +54,6 @@ $FULL"
 }
 
 @test "an export that has no room leaves the old file, and no other" {
-    # shellcheck disable=SC2016
     on_full_disk '
         "$TOOL" export disk/file; echo $?
         cat disk/file
@@ -73,7 +70,6 @@ vemo-access-token: cannot write the result: No space left on device"
 }
 
 @test "reading needs no room" {
-    # shellcheck disable=SC2016
     on_full_disk '"$TOOL" show $ID --field count && "$TOOL" check $ID Api get && "$TOOL" list --count'
     expect 0 "5
 allowed

@@ -55,12 +55,9 @@ END
     all_tokens >"$DIR/before"
     local arguments reason
     while IFS='|' read -r arguments reason; do
-        # shellcheck disable=SC2086 # several arguments
         run_tool check $arguments
         expect 1 "refused: $reason"
-        # shellcheck disable=SC2086
         fails 1 "refused: $reason" grant $arguments
-        # shellcheck disable=SC2086
         fails 1 "refused: $reason" grant --print-user $arguments
     done <<END
 token---$ZEROS Api put|method not listed

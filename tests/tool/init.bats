@@ -61,7 +61,6 @@ made the table of tokens" init
     cp "$DIR/other" "$DIR/untouched"
     ln -s "$DIR/other" "$DB"
     for arguments in init "create --uid 0 --function f"; do
-        # shellcheck disable=SC2086 # several arguments
         run_tool $arguments
         [ "$status" -eq 4 ]
         cmp "$DIR/other" "$DIR/untouched"
@@ -143,7 +142,6 @@ no findings"
     VEMO_TEST_HASTE=1 run --separate-stderr flock "$VEMO_REDIRECT_DIR.lock" "$TOOL" init
     [ "$status" -eq 4 ]
     [ "$output" = "made the directory ${REAL_DB%/*}" ]
-    # shellcheck disable=SC2154 # bats sets it
     [[ $stderr == *" stayed locked by flock (process "*") for 5 seconds" ]] # and not that nothing was changed
 }
 

@@ -62,7 +62,6 @@ later---  4294967294  VPN         unlimited  $(at $((now + 200000)))  in 2 d    
     expect 0 "[]" "vemo-access-token: no token matches"
     local arguments
     for arguments in "" "-o jsonl" "--field uid"; do
-        # shellcheck disable=SC2086 # several arguments
         none_matches $arguments
     done
     gives 0 list --count

@@ -81,10 +81,8 @@ stored()
     a_store
     local arguments expected
     while read -r arguments; do
-        # shellcheck disable=SC2086 # several arguments
         expected=$(tool $arguments 2>/dev/null)
         lock "$EXCLUSIVE"
-        # shellcheck disable=SC2086
         run_waiting 1 $arguments
         expect 0 "$expected" "$([ "$arguments" != export ] || echo "vemo-access-token: 2 tokens exported")"
     done <<TABLE
@@ -120,7 +118,6 @@ TABLE
             [ $kind = EXCLUSIVE ] || times=3
             cp "$DIR/before" "$DB"
             lock "${!kind}"
-            # shellcheck disable=SC2086
             run_waiting $times $arguments
             expect 0 "$output_then" && [ "$(stored)" = "$stored_then" ] || {
                 echo "of: $arguments, $kind; stored: $(stored)"
@@ -255,7 +252,6 @@ TABLE
         [ $kind = EXCLUSIVE ] || pattern="^(create|grant)"
         lock "${!kind}"
         while IFS='|' read -r arguments more; do
-            # shellcheck disable=SC2086 # several arguments
             VEMO_TEST_HASTE=1 fails 4 "$locked$more" $arguments || {
                 echo "of: $arguments"
                 return 1
@@ -387,7 +383,6 @@ beside_call()
         [[ $arguments != *--uid* ]] || sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 8)
             INSERT INTO token SELECT i || tid, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra
             FROM token, n"
-        # shellcheck disable=SC2086 # several arguments
         beside_call 0 "SELECT count(*) FROM token" "CREATE TEMP TABLE new AS SELECT * FROM read;
             UPDATE new SET tid = 'new' || tid; INSERT INTO token SELECT * FROM read UNION ALL SELECT * FROM new" $arguments
         expect 0 "$tokens revoked" "vemo-access-token: a token came back $times, by calls that do not take the lock, and was revoked again"
@@ -407,9 +402,7 @@ TABLE
     local writes="UPDATE read SET count = max(count - 1, -1); REPLACE INTO token SELECT * FROM read"
     local uses change set call then sentence
     while IFS='|' read -r uses change set call then sentence; do
-        # shellcheck disable=SC2086 # several arguments
         a_token --allow Api:get,put $uses >"$DIR/id"
-        # shellcheck disable=SC2086
         beside_call 1 "SELECT count(*) FROM token WHERE $set" "$call" update - $change <"$DIR/id"
         expect 0 "1 token updated" "vemo-access-token: $sentence"
         [ "$(sql "SELECT group_concat(count) FROM token WHERE $set")" = "$then" ]
@@ -429,7 +422,6 @@ TABLE
     local old arguments then sentence again
     while IFS=';' read -r arguments then sentence again; do
         old=$(a_token --uses 9 --ttl 2h)
-        # shellcheck disable=SC2086
         beside_call 1 "SELECT count(*) FROM token WHERE tid <> '$old'" \
             "UPDATE read SET count = 8; REPLACE INTO token SELECT * FROM read" rotate $arguments - <<<"$old"
         expect 0 "$output" "vemo-access-token: $sentence 1 time, by calls that do not take the lock, and was $again again"
@@ -559,7 +551,6 @@ TABLE
     ln -s session "$DIR/links"
     i=3
     while read -r arguments; do
-        # shellcheck disable=SC2086
         VEMO_REDIRECT_DIR=$DIR/links "$TOOL" $arguments >"$DIR/out$i" 2>&1 3>&- 7>&- 8<&- &
         pids+=($!)
         i=$((i + 1))

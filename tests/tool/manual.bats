@@ -99,7 +99,6 @@ locked()
         rm -rf "$VEMO_REDIRECT_DIR"
         row token---
         eval "$calls" >/dev/null 2>"$DIR/said" || true
-        # shellcheck disable=SC2053 # a pattern: dots stand for anything
         [[ $(cat "$DIR/said") == "vemo-access-token: "*${sentence//.../*}* ]] || {
             echo "$calls: does not say \"$sentence\", but \"$(cat "$DIR/said")\""
             return 1

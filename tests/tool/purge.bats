@@ -36,7 +36,6 @@ END
     row token---
     local arguments
     while read -r arguments; do
-        # shellcheck disable=SC2086 # several arguments
         VEMO_TEST_SYNC=directory fails 4 \
             "$REAL_DIRECTORY: Input/output error; a power cut can undo what others changed last" $arguments
     done <<'TABLE'

@@ -137,7 +137,6 @@ while 0 == rename(-100, sys.argv[1].encode(), -100, sys.argv[2].encode(), 2): # 
         as=--reuid=65534
     fi
     for arguments in init "create --uid 0 --function VPN" list purge; do
-        # shellcheck disable=SC2086 # several arguments
         run --separate-stderr nsenter --target "$HOLDER" --mount --root -- setpriv "$as" "$PLAIN" $arguments
         expect 4 "" "vemo-access-token: only root may do this: the token database belongs to root, and the effective uid is 65534"
     done

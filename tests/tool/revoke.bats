@@ -75,7 +75,6 @@ END
         eval "gives '${#revoked} token$([ ${#revoked} = 1 ] || echo s) revoked' revoke --yes $selectors"
         left=abcdef
         left=${left//["$revoked "]/}
-        # shellcheck disable=SC2086 # several names
         expect_left ${left//?/&&&&&&&& }
     done <<'TABLE'
 --uid 0|ab
@@ -96,7 +95,6 @@ TABLE
          UPDATE token SET deadline = strftime('%s', 'now') + 1000 WHERE tid LIKE 'd%'"
     cp "$DB" "$DIR/six"
     while IFS='|' read -r arguments number; do
-        # shellcheck disable=SC2086 # several arguments
         run_tool revoke --dry-run $arguments
         expect 0 "$number would be revoked" "$([[ $arguments != *unknown* ]] || echo "vemo-access-token: 1 id is unknown")"
     done <<'TABLE'

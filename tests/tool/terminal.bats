@@ -29,7 +29,6 @@ below()
     local id shown arguments
     id=$(a_token --allow Api --unlimited)
     while IFS='|' read -r arguments shown; do
-        # shellcheck disable=SC2086 # several arguments
         VEMO_TEST_WIPED=$DIR/wiped on_terminal --answer "Token id: " "$id"$'\r' -- $arguments
         expect 0 "Token id: 
 $shown"
@@ -108,7 +107,6 @@ END
     [ "$status ${lines[-1]}" = "0 0 tokens revoked" ] # on a line of its own
     expect_left first second
     while IFS='|' read -r reply selection; do
-        # shellcheck disable=SC2086
         on_terminal --answer "Revoke 2 tokens? [y/N] " "$reply"$'\r' -- revoke $selection
         expect 0 "Revoke 2 tokens? [y/N] $reply
 2 tokens revoked"
@@ -314,7 +312,6 @@ import "$EVIL"
 export "$EVIL/x"
 list --verbose --function "$EVIL" # which lacks its table now
 TABLE
-    # shellcheck disable=SC2016
     LC_ALL=$1 on_terminal --columns 200 --shell '
         while read -r arguments; do
             case $arguments in *--verbose*) sqlite3 "$2" "DROP TABLE token" ;; esac
@@ -352,7 +349,6 @@ TABLE
     tool create --uid 0 --function "$name" >/dev/null
     local arguments
     for arguments in list "list -o json" "list --field function" "stats --prometheus" export; do
-        # shellcheck disable=SC2086
         on_terminal --columns 200 -- $arguments
         [ "$status" -eq 0 ]
         [[ $output == *"$name"* ]]
@@ -430,7 +426,6 @@ vemo-access-token: 2 tokens exported"
     local arguments
     for arguments in "import $DIR/file" tune; do
         # It is stopped as soon as the bar shows, and let go when another program has worked.
-        # shellcheck disable=SC2086 # several arguments
         /usr/bin/python3 - "$TOOL" $arguments >"$DIR/id" <<'END'
 import os, pty, subprocess, sys, termios
 own, other = pty.openpty()

@@ -454,10 +454,8 @@ TABLE
         echo "$edit"
         eval "$edit" <"$DIR/whole" >"$DIR/file"
         for option in "" --partial; do
-            # shellcheck disable=SC2086 # none, too
             run_tool import $option "$DIR/file"
             [ "$status$output" = 2 ]
-            # shellcheck disable=SC2053 # a pattern
             [[ $stderr == "vemo-access-token: $DIR/file: line "$reason"; nothing of this file was imported" ]]
         done
     done <<'TABLE'

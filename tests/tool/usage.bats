@@ -144,7 +144,6 @@ Examples:
 @test "help fits 80 columns" {
     local command
     for command in "" $COMMANDS; do
-        # shellcheck disable=SC2086
         run_tool help $command
         [ "$(grep -E '.{81}' <<<"$output")" = "" ]
     done
@@ -250,7 +249,6 @@ TABLE
     id=$(a_token --allow Api:get)
     for arguments in "$id Api get -o json" "-o json $id Api get" "$id -ojson Api get" "$id Api --output=json get" \
         "-vo json -- $id Api get"; do
-        # shellcheck disable=SC2086
         POSIXLY_CORRECT=1 gives '{"allowed":true,"reason":""}' check $arguments
     done
 }
@@ -318,7 +316,6 @@ TABLE
     echo '{}' >"$DIR/lines"
     local arguments
     while read -r arguments; do
-        # shellcheck disable=SC2086
         plain $arguments </dev/null
         expect 4 "" "vemo-access-token: only root may do this: the token database belongs to root, and the effective uid is $uid"
     done <<'TABLE'
@@ -346,7 +343,6 @@ TABLE
     [ "$status$stderr" = 0 ]
     [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
     for arguments in --help --version "list --help"; do
-        # shellcheck disable=SC2086
         plain $arguments
         [ "$status$stderr" = 0 ]
         [ "$output" != "" ]
@@ -389,7 +385,6 @@ TABLE
             "stats --prometheus" export doctor "doctor -o json" init "tune --dry-run"; do
             made=
             [[ $arguments != grant\ * && $arguments != update\ * ]] || made="; the change was made"
-            # shellcheck disable=SC2086
             cannot_print "$reason$made" "$file" $arguments
         done
         # A token whose id could not be printed does not stay.
@@ -405,7 +400,6 @@ TABLE
     # Nor one that is larger than any buffer.
     many_rows 300
     for arguments in "list --show-ids" "list -o json --show-ids" "list --field tid --show-ids"; do
-        # shellcheck disable=SC2086
         cannot_print "No space left on device" /dev/full $arguments
     done
 }
@@ -464,7 +458,6 @@ TABLE
     mkdir "$DIR/tmp"
     local arguments made
     for arguments in stats "list --sort function --limit 1" "tune --dry-run" "tune" doctor "revoke --all --yes"; do
-        # shellcheck disable=SC2086
         made=$(TMPDIR=$DIR/tmp "$BATS_TEST_DIRNAME/made_in.py" "$DIR/tmp" "$TOOL" $arguments 2>/dev/null)
         [ "$made" = "" ] || {
             echo "$arguments: $made"
@@ -479,7 +472,6 @@ TABLE
     other=_${id:1} # no character of an id
     tool export "$DIR/lines"
     while read -r arguments; do
-        # shellcheck disable=SC2086
         run_tool $arguments
         [[ $output$stderr != *"${id:1:20}"* ]] || {
             echo "$arguments"
@@ -529,7 +521,6 @@ in_wrong_places()
     tool export 2>/dev/null | sed "s|^{|{\"$id\":1,|" >"$DIR/unknown"
     tool export 2>/dev/null | sed "s|\"uid\":0|\"uid\":${id//[^0-9]/}e|" >"$DIR/number"
     while read -r arguments; do
-        # shellcheck disable=SC2086
         run_tool $arguments
         [ "$status" -eq 2 ]
         [ "$output" = "" ]

@@ -15,7 +15,6 @@ with_lookup()
     while IFS='|' read -r errno status sentence; do
         for command in "create --function VPN" list "revoke --yes"; do
             echo "$errno $command"
-            # shellcheck disable=SC2086 # the command's words
             with_lookup "$errno" $command --user root
             expect "$status" "" "vemo-access-token: $sentence"
         done

@@ -11,7 +11,6 @@ load common
     sql "UPDATE token SET function = CAST(readfile('$DIR/all') AS TEXT)"
     local arguments
     for arguments in "list --no-header" "list -o jsonl"; do
-        # shellcheck disable=SC2086
         tool $arguments 2>"$DIR/errors" >"$DIR/out"
         "$visible" compare <"$DIR/out" || {
             echo "of: $arguments"
