@@ -83,10 +83,7 @@ TABLE
 
 @test "many tokens are told by their number" {
     setup_log
-    local name
-    for name in one two three four five six; do
-        row "$name" "deadline = 5"
-    done
+    many_rows 6 "deadline = 5"
     told >/dev/null
     tool export "$DIR/lines"
     tool revoke --all --yes
@@ -142,10 +139,8 @@ create: 1 token deleted (created-...)" ]
 
 @test "a line shows no whole id, and no character that could make two lines of one" {
     setup_log
-    row short
-    sql "UPDATE token SET tid = 'short'"
-    row odd-----
-    sql "UPDATE token SET tid = char(10) || 'by uid' || tid WHERE tid LIKE 'odd%'"
+    row short "tid = 'short'"
+    row odd----- "tid = char(10) || 'by uid' || tid"
     told >/dev/null
     tool revoke --all --yes
     [ "$(told)" = 'revoke: 2 tokens deleted (\x0aby uido..., ...)' ]

@@ -6,12 +6,13 @@ load common
 # Tokens of several purposes and owners: two expired, two without limit.
 some_tokens()
 {
-    tool init >/dev/null
-    sql "INSERT INTO token VALUES
-         ('a', '', 0,          9999999999, -1, 0, 'VPN',  '{}', '{}'),
-         ('b', '', 4000000000, 1,          -5, 0, 'Mail', '{}', '{}'),
-         ('c', '', 0,          -1,          1, 0, 'VPN',  '{}', '{}'),
-         ('d', '', 0,          9999999999,  0, 0, 'Web',  '{}', '{}')"
+    ROW="'', 0, 9999999999, 1, 0, 'VPN',  '{}', '{}'"
+    rows <<'END'
+a|tid = 'a', count = -1
+b|tid = 'b', uid = 4000000000, deadline = 1, count = -5, function = 'Mail'
+c|tid = 'c', deadline = -1
+d|tid = 'd', count = 0, function = 'Web'
+END
 }
 
 # check_metrics: the result holds nothing but comments and samples of the exposition format, a family's
@@ -200,12 +201,7 @@ vemo_access_token_old_unlimited_tokens 0' ]
 @test "stats of a store without tokens" {
     tool init
     run_tool stats
-    expect 0 "STORE                     NUMBER
-tokens                         0
-expired                        0
-unlimited uses                 0
-file size in bytes         16384
-free pages of 4096 bytes       0"
+    [[ $output == $'STORE                     NUMBER\ntokens                         0\n'* && ${#lines[@]} -eq 6 ]]
     run_tool stats -o jsonl
     expect 0 '{"expired":0,"file_bytes":16384,"free_pages":0,"functions":[],"page_bytes":4096,"tokens":0,"unlimited":0,"users":[]}'
     tool stats --prometheus | check_metrics
