@@ -32,12 +32,14 @@ unlock()
     wait "$HOLDER"
 }
 
-# run_waiting TIMES ARGUMENTS...: runs the tool, and lets go of the lock when it has waited that often; ahead of
-# that, it gets $SIGNAL, if that is set. Fails when it has not waited.
+# run_waiting STATEMENTS TIMES ARGUMENTS...: runs the tool while another process holds the lock that the statements
+# take, and lets that go when the tool has waited that often; ahead of that, it gets $SIGNAL, if that is set. Fails
+# when it has not waited.
 run_waiting()
 {
-    local times=$1 watcher
-    shift
+    local times=$2 watcher
+    lock "$1"
+    shift 2
     rm -f "$DIR/waits" "$DIR/waited"
     mkfifo "$DIR/waits"
     local shell=$BASHPID
@@ -82,8 +84,7 @@ stored()
     local arguments expected
     while read -r arguments; do
         expected=$(tool $arguments 2>/dev/null)
-        lock "$EXCLUSIVE"
-        run_waiting 1 $arguments
+        run_waiting "$EXCLUSIVE" 1 $arguments
         expect 0 "$expected" "$([ "$arguments" != export ] || echo "vemo-access-token: 2 tokens exported")"
     done <<TABLE
 list
@@ -97,12 +98,10 @@ revoke --dry-run --all
 revoke --dry-run $ID
 TABLE
     tool purge >/dev/null
-    lock "$EXCLUSIVE"
-    run_waiting 3 doctor
+    run_waiting "$EXCLUSIVE" 3 doctor
     [ "$status" -eq 0 ]
     [ "$(tail -n 1 <<<"$output")" = "no findings" ]
-    lock "$EXCLUSIVE"
-    run_waiting 1 tune --dry-run
+    run_waiting "$EXCLUSIVE" 1 tune --dry-run
     [ "$status$stderr" = 0 ]
     [ "${lines[-1]}" = "would run: COMMIT" ]
 }
@@ -117,8 +116,7 @@ TABLE
             times=1
             [ $kind = EXCLUSIVE ] || times=3
             cp "$DIR/before" "$DB"
-            lock "${!kind}"
-            run_waiting $times $arguments
+            run_waiting "${!kind}" $times $arguments
             expect 0 "$output_then" && [ "$(stored)" = "$stored_then" ] || {
                 echo "of: $arguments, $kind; stored: $(stored)"
                 return 1
@@ -141,40 +139,33 @@ TABLE
     tool init
     local kind
     for kind in EXCLUSIVE READING; do
-        lock "${!kind}"
-        run_waiting 1 create --uid 0 --function VPN --allow Api
+        run_waiting "${!kind}" 1 create --uid 0 --function VPN --allow Api
         [ "$status$stderr" = 0 ]
         [ "$(sql "SELECT tid FROM token")" = "$output" ]
         sql "DELETE FROM token"
     done
     # What its caller ignores does not interrupt it.
-    lock "$READING"
     trap '' HUP
-    SIGNAL=HUP run_waiting 1 create --uid 0 --function VPN --allow Api
+    SIGNAL=HUP run_waiting "$READING" 1 create --uid 0 --function VPN --allow Api
     trap - HUP
     [ "$status" -eq 0 ]
     [ "$(sql "SELECT tid FROM token")" = "$output" ]
     # What does interrupt it leaves no token whose id nobody got to know.
     sql "DELETE FROM token"
-    lock "$READING"
-    SIGNAL=TERM run_waiting 1 create --uid 0 --function VPN --allow Api
+    SIGNAL=TERM run_waiting "$READING" 1 create --uid 0 --function VPN --allow Api
     expect 143 "" "vemo-access-token: interrupted; the token was taken back"
     [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }
 
 @test "a refusal that had to wait is a refusal" {
     a_store
-    lock "$EXCLUSIVE"
-    run_waiting 1 grant "$ID" Api put
+    run_waiting "$EXCLUSIVE" 1 grant "$ID" Api put
     expect 1 "" "vemo-access-token: refused: method not listed"
-    lock "$EXCLUSIVE"
-    run_waiting 1 check "$ID" Other
+    run_waiting "$EXCLUSIVE" 1 check "$ID" Other
     expect 1 "refused: API not listed"
-    lock "$EXCLUSIVE"
-    run_waiting 1 update unknown-token --uses 1
+    run_waiting "$EXCLUSIVE" 1 update unknown-token --uses 1
     expect 3 "" "vemo-access-token: there is no such token"
-    lock "$EXCLUSIVE"
-    run_waiting 1 create --uid 0 --function VPN --tid "$ID"
+    run_waiting "$EXCLUSIVE" 1 create --uid 0 --function VPN --tid "$ID"
     expect 2 "" "vemo-access-token: --tid: there is a token with this id already"
 }
 
@@ -182,16 +173,14 @@ TABLE
     a_store
     local kind wanted
     for kind in EXCLUSIVE WRITING READING; do
-        lock "${!kind}"
-        run_waiting 1 tune --wal
+        run_waiting "${!kind}" 1 tune --wal
         [ "$status$stderr" = 0 ]
         [[ $(grep "^journal" <<<"$output") =~ ^journal\ +delete\ +wal$ ]]
         [ "$(sql "PRAGMA journal_mode")" = wal ]
         wanted="token_bind_sid token_deadline token_function"
         [ "$(sql "SELECT group_concat(name, ' ') FROM (SELECT name FROM sqlite_schema
                   WHERE name LIKE 'token\__%' ESCAPE '\' ORDER BY 1)")" = "$wanted" ]
-        lock "$WRITING"
-        run_waiting 1 tune --undo
+        run_waiting "$WRITING" 1 tune --undo
         [ "$status$stderr" = 0 ]
         [ "$(sql "PRAGMA journal_mode; SELECT count(*) FROM sqlite_schema WHERE sql LIKE 'CREATE INDEX%'")" = "delete
 0" ]
@@ -207,7 +196,8 @@ TABLE
     tool tune --wal >/dev/null
     lock "$WRITING UPDATE token SET count = 7;"
     gives 5 show "$ID" --field count
-    run_waiting 1 grant "$ID" Api get
+    unlock
+    run_waiting "$WRITING UPDATE token SET count = 7;" 1 grant "$ID" Api get
     expect 0 granted
     [ "$(stored)" = 6/ ]
     lock "$READING" # with the write-ahead journal, readers are in nobody's way
