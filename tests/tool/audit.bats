@@ -81,7 +81,7 @@ doctor|
 TABLE
 }
 
-@test "many tokens are told by their number" {
+@test "of many tokens, the number is told" {
     setup_log
     many_rows 6 "deadline = 5"
     told >/dev/null
@@ -98,7 +98,7 @@ import: 6 tokens created
 purge: 6 tokens deleted" ]
 }
 
-@test "who has become root by sudo is told" {
+@test "who has become root by sudo is named" {
     setup_log
     tool init
     told >/dev/null
@@ -111,7 +111,7 @@ purge: 6 tokens deleted" ]
     done
 }
 
-@test "a change is told that is made when the command fails or is ended" {
+@test "a change is told even if the command fails or is ended then" {
     setup_log
     row token---
     told >/dev/null
@@ -129,7 +129,7 @@ create: 1 token deleted (created-...)" ]
     [ "$status" -eq 124 ]
     [ "$(told)" = "revoke: 1 token deleted (token---...)" ]
 
-    # What is undone is none.
+    # A change that is undone is not told.
     row token---
     sql "CREATE TRIGGER refuse BEFORE DELETE ON token BEGIN SELECT RAISE(ABORT, 'no'); END"
     run_tool revoke token---

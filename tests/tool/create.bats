@@ -147,7 +147,7 @@ END
     [ "$stderr" = 'vemo-access-token: --allow: "A *" stands for this name alone: "*" is no wildcard
 vemo-access-token: --allow: "A *" holds a blank, which is part of the name
 vemo-access-token: --allow: "c d" holds a blank, which is part of the name' ]
-    # Not of a token that is not there.
+    # A creation that fails tells nothing of this.
     run_tool create --uid 0 --function VPN --tid "$(sql "SELECT tid FROM token LIMIT 1")"
     expect 2 "" "vemo-access-token: --tid: there is a token with this id already"
 }
@@ -224,9 +224,9 @@ END
     tool init
     gives "$OWN" create --uid 0 --function VPN --allow Api --tid "$OWN"
     gives "${OWN/own/two}" create --uid 0 --function VPN --allow Api --tid - <<<"${OWN/own/two}"
-    # Lines that hold nothing count for nothing; neither does a missing line break.
+    # Empty lines do not matter, nor does a missing line break.
     gives "${OWN/own/tre}" create --uid 0 --function VPN --allow Api --tid - < <(printf '\n\n%s' "${OWN/own/tre}")
-    # What it may hold, and how long it may be, is the caller's business.
+    # It may hold anything, and be as long as the caller likes.
     odd="' \"Ä\\$(printf '%010000d' 0)"
     gives "$odd" create --uid 0 --function VPN --allow Api --tid - <<<"$odd"
     tool generate | tool create --uid 0 --function VPN --tid - >"$DIR/tid"
@@ -285,7 +285,7 @@ $OWN|1" ]
     [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
     [ "$output" != "$(tool generate)" ]
     [ ! -e "$VEMO_REDIRECT_DIR" ]
-    # Anybody may.
+    # Any user may.
     local user=()
     [ "$(id -u)" -ne 0 ] || user=(setpriv --reuid=65534 --regid=65534 --clear-groups)
     ! "${user[@]}" test -x "$TOOL" || "${user[@]}" env -u VEMO_REDIRECT_DIR "$TOOL" generate

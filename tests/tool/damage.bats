@@ -1,6 +1,6 @@
 #!/usr/bin/env bats
-# A database that is damaged, is none or cannot be had: one sentence, no crash, no wait, no change, and never
-# "no tokens"
+# A database that is damaged, missing or out of reach, or a file that is none: each command says so in one sentence,
+# changes nothing, and never takes it for one without tokens
 
 load common
 
@@ -9,7 +9,7 @@ READ_ONLY="$REAL_DB cannot be written to (attempt to write a readonly database);
 
 teardown()
 {
-    # What a failed test may have made inaccessible must be removed.
+    # So that bats can remove what a failed test leaves.
     [ ! -d "$VEMO_REDIRECT_DIR" ] || chmod 0700 "$VEMO_REDIRECT_DIR"
 }
 
@@ -98,7 +98,7 @@ leaf()
     a_store
     cp -p "$DB" "$DIR/sound"
     local all=. some='^(list$|show .{9}|grant|create|init|tune --wal)' unmade='^(list|show|check|grant|update|rotate|revoke|purge|stats|export|tune)'
-    # The number of tokens can be told by the index of their ids.
+    # Those that only count tokens read the index of their ids.
     local uncounted='^(list( -o.*)?$|show|check|grant|update|rotate|revoke [^-]|revoke --all --yes|purge|stats|export|import .*other|create)'
     local damage which sentence finding
     while IFS='|' read -r damage which sentence finding; do
@@ -149,7 +149,7 @@ TABLE
     [ "${lines[0]}" = "error: $REAL_DIRECTORY is not a directory" ]
 }
 
-# What it does not need, doctor and the others leave alone: here the map of pages, which shrinking needs.
+# Commands leave alone what they do not need: here the map of pages, which is for shrinking the file.
 @test "tokens can be listed as long as they can be read" {
     a_store
     cp "$DB" "$DIR/sound"
@@ -221,7 +221,7 @@ TABLE
     gives 5 show "1$ID" --field count # another token
     gives 10 list --count
     gives "10 tokens would be revoked" revoke --all --dry-run
-    # One for the owner is not root's.
+    # An owner that is NULL is not root.
     sql "UPDATE token SET uid = NULL"
     run_tool stats -o jsonl
     [[ $output == *'"users":[{"tokens":10,"uid":null,"user":""}]}' ]]
@@ -249,7 +249,7 @@ TABLE
         [ "$status" -eq 0 ]
         gives "1 token would be revoked" revoke token--- --dry-run
     done
-    # The purge compares in SQL, where a word lies behind all numbers. Programs grant such a token for ever.
+    # The purge compares in SQL, where a word is greater than all numbers. Programs grant such a token for ever.
     sql "UPDATE token SET deadline = 'some'"
     gives 0 list --expired --count
     gives "0 tokens would be purged" purge --dry-run

@@ -161,10 +161,10 @@ no findings"
     run_tool doctor -o jsonl
     [ "$status" -eq 0 ]
     [ "${lines[3]}" = '{"finding":"opening nothing: 1 token","meaning":"every call with them is refused","remedy":"update --add-allow lets them open calls; or revoke them","repaired":false,"severity":"note"}' ]
-    # An owner whom nobody could look up may be there.
+    # An owner who could not be looked up may exist.
     VEMO_TEST_LOOKUP=5 run_tool doctor
     [[ $output != *"without an owner"* ]]
-    # What is wrong comes first, and alone.
+    # A finding comes without notes.
     sql "UPDATE token SET function = '' WHERE tid LIKE 'plain%'"
     expect_finding warning "an empty purpose in 1 token (plain000)" "no call deletes such a token by its purpose" \
         "revoke them, and create others"
@@ -189,7 +189,7 @@ no findings"
     rm "$DB"
     expect_note "there is no database $REAL_DB" "$no_tokens" "vemo-access-token init"
     [ ! -e "$DB" ]
-    # With a journal there was one.
+    # A journal without a database tells that there was one.
     install -m 0600 /dev/null "$DB-journal"
     expect_finding error "there is no database $REAL_DB" "$no_tokens" "vemo-access-token init"
     rm "$DB-journal"
@@ -206,7 +206,7 @@ no findings"
 @test "modes that let others in are tightened" {
     local path name mode
     row aaaaaaaa
-    # A journal that its program has ended.
+    # With a journal that no change is using.
     sql "PRAGMA journal_mode = PERSIST; UPDATE token SET count = 2"
     while read -r path name mode; do
         chmod "$mode" "$path"
@@ -273,7 +273,7 @@ note: there is no database $REAL_DB
     meaning: there are no tokens; the first call that needs it makes it
     remedy: vemo-access-token init"
 
-    # What stands under other names is made private by nobody.
+    # A file with other names is not made private.
     rm "$VEMO_REDIRECT_DIR"
     row aaaaaaaa
     ln "$DB" second
@@ -301,7 +301,7 @@ mkdir|not a regular file
 ln -s nowhere|a symbolic link
 TABLE
     done
-    # Nor is a missing database made then.
+    # No database is made beside it either.
     rm "$DB"
     mkfifo "$DB-journal"
     run_tool doctor --repair
@@ -375,7 +375,7 @@ error: $REAL_DIRECTORY cannot be written to: Read-only file system
 }
 
 @test "directories above that others can change are left to the administrator" {
-    # And nothing below is opened: neither is a table missed, nor made.
+    # Nothing below is opened: that the table is missing is neither told nor mended.
     in_namespace 'mkdir /usr/vemo && chmod 0777 /usr/vemo && "$1" init >/dev/null && sqlite3 "$2" "DROP TABLE token" &&
         chmod 0755 "${2%/*}" && ! "$1" doctor --repair && mv /usr/vemo /usr/elsewhere && ln -s elsewhere /usr/vemo &&
         "$1" doctor' "$TOOL" "$REAL_DB"
@@ -401,7 +401,7 @@ error: /usr/vemo is a symbolic link
     expect 5 "error: $REAL_DB has mode 0750
     meaning: $NOT_PRIVATE
     remedy: chmod 0700 $REAL_DB" "vemo-access-token: the repair did not help: $REAL_DB has mode 0750"
-    # Where others can still put a journal beside it, no database is made, and nobody knows whose the journal is.
+    # Where others can still put a journal beside it, no database is made. Nobody knows whose the journal is.
     rm "$DB"
     chmod 0770 "$VEMO_REDIRECT_DIR"
     install -m 0640 /dev/null "$DB-journal"
@@ -440,7 +440,7 @@ mv $DB second && ln -s $DIR/second $DB|$REAL_DB is a symbolic link; name the pla
 chmod 0750 session|$REAL_DIRECTORY is not root's alone
 mv session second && ln -s second session|$REAL_DIRECTORY is a symbolic link; name the place that it leads to
 TABLE
-    # Remains of an export that another one takes, or that are gone.
+    # What an export has left behind: another program takes it, or it is gone.
     while IFS='|' read -r between reason; do
         rm -rf "$DIR/"s*
         tool init >/dev/null
@@ -539,7 +539,7 @@ $undone" ]
         "tokens may be lost or wrong" \
         "$SAVE_AND_REPLACE; where export fails, import a backup or what sqlite3 can still read: see vemo-access-token(8)"
     tool export >"$DIR/exported"
-    # Where the check itself fails, it gives no report.
+    # The check itself can fail.
     sqlite3 -cmd '.dbconfig defensive off' "$DB" "
         PRAGMA writable_schema = ON;
         UPDATE sqlite_schema SET sql = 'CREATE INDEX i ON token (bind_sid COLLATE x)' WHERE name = 'i'" >"$DIR/defensive"
@@ -720,7 +720,7 @@ TABLE
     expect_repair "$REAL_DB-journal was left behind" "$meaning"
     [ "$(sql "$kept" | xargs)" = "VPN|40 ok" ]
 
-    # One of just now can be a living program's.
+    # A journal of just now can belong to a program that is running.
     cp "$DIR/half" "$DB"
     cp "$DIR/half-journal" "$DB-journal"
     touch -d "1 hour" "$DB-journal"
@@ -741,7 +741,7 @@ TABLE
 
 @test "a write-ahead journal that belongs to the database is no finding" {
     row aaaaaaaa
-    # A program that still has the database open, and one that stopped.
+    # Of a program that still has the database open, and of one that was stopped.
     sqlite3 "$DB" >/dev/null <<SQL
 PRAGMA journal_mode = WAL;
 UPDATE token SET function = 'changed';
@@ -916,7 +916,7 @@ END
     expect_repair "$what" "$meaning"
     sql "SELECT *, typeof(tid), typeof(bind_sid), typeof(function) FROM token" | diff "$DIR/texts" -
 
-    # They are left as they are where the text is another token's id.
+    # They stay as they are where the text is the id of another token.
     sql "INSERT INTO token SELECT CAST(tid AS BLOB), 's', uid, deadline, count, create_time, function, webapi_allow, extra
          FROM token WHERE tid LIKE 'sound%'"
     sql ".dump" >"$DIR/before"

@@ -40,7 +40,7 @@ END
         gives granted grant "$name$ZEROS" Api get
         fails 1 "refused: unknown token" grant "$name$ZEROS" Api get
     done
-    # Without a method, too, and down to the last use.
+    # Without a method, too.
     for arguments in Bare Api "Api ''" "Api get"; do
         eval "gives granted grant 'token---$ZEROS' $arguments"
     done
@@ -170,7 +170,7 @@ END
     [ "$(uses)" = "token---|2" ]
     VEMO_TEST_LOOKUP=0 fails 4 "granted, but there is no user of the number 0" \
         grant "token---$ZEROS" Api -o json --print-user
-    # The last one is told as it was, too.
+    # So it is with the last use.
     gives "{\"granted\":true,\"reason\":\"\",\"token\":${record/:3,/:1,}}" grant "token---$ZEROS" Api get -o json
     [ "$(uses)" = "" ]
 }

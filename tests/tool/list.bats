@@ -3,7 +3,7 @@
 
 load common
 
-# lists "NAME NAME..." ARGUMENTS...: these tokens, in this order
+# lists "NAME NAME..." ARGUMENTS...: list gives these tokens, in this order
 lists()
 {
     gives "${1// /$'\n'}" list --field tid "${@:2}"
@@ -27,7 +27,7 @@ selects()
     [ "$(state)" = "$before" ]
 }
 
-# none_matches ARGUMENTS...: nor is a table's head printed
+# none_matches ARGUMENTS...: there is no such token, and nothing is printed, not even the head of a table
 none_matches()
 {
     run_tool list "$@"
@@ -109,7 +109,7 @@ latest--  root  VPN  1  @9223372036854775807   in 1067519911NNNNN d    Api:get"
     run_tool list -o jsonl
     expect 0 "$first
 $second"
-    # Nothing of a table's makes a difference.
+    # Options for tables make no difference.
     run_tool list --output=jsonl --no-header --utc
     expect 0 "$first
 $second"
@@ -138,7 +138,7 @@ extra|{}|{"a":"ü"}
 END
     run --keep-empty-lines --separate-stderr tool list --field bind_sid
     [ "$output" = $'a b\n\n' ]
-    # It is stronger than a form.
+    # It wins over a form.
     run_tool list --field count -o json
     expect 0 "1
 -1"
@@ -255,7 +255,7 @@ END
         row "$(printf 'at%06d' $n)" "webapi_allow = '$stored'"
     done
     gives 0 list --count --opens A:m
-    # The API alone, whatever stands there: as for a grant.
+    # For the API alone, it does not matter what stands there: as for a grant.
     lists "at000006 at000007 at000008 at000009 at000010" --opens A --sort tid
     local tid allowed=
     for tid in at0000{01..10}; do
@@ -312,7 +312,7 @@ END
     gives 1 list --count --expired
     gives 2 list --count --function VPN --uid 0
     gives 0 list --count --function None
-    # All there are, whatever would be shown of them.
+    # It does not matter how many would be shown, and how.
     gives 3 list --count --limit 1 --sort tid --no-header --show-ids --epoch
 }
 
@@ -342,7 +342,7 @@ bcad|--sort create_time:desc
 bacd|--sort function:desc
 cadb|
 END
-    # A count without limit is behind the largest number.
+    # Unlimited uses are more than any number.
     sql "UPDATE token SET count = 9223372036854775806 WHERE tid LIKE 'd%'"
     selects <<<"bdca|--sort count"
 }
@@ -366,7 +366,7 @@ END
     [ "$stderr" = "vemo-access-token: 2 of 3 tokens are shown" ]
     run_tool list --limit 1 --function VPN --field tid
     expect 0 b------- "vemo-access-token: 1 of 2 tokens are shown"
-    # Nothing is left out, nothing is said.
+    # Where nothing is left out, nothing is said.
     lists "b------- a------- c-------" --limit 3
     lists "b------- a------- c-------" --limit 9223372036854775807
 }

@@ -144,13 +144,13 @@ TABLE
         [ "$(sql "SELECT tid FROM token")" = "$output" ]
         sql "DELETE FROM token"
     done
-    # What its caller ignores does not interrupt it.
+    # A signal that its caller ignores does not interrupt it.
     trap '' HUP
     SIGNAL=HUP run_waiting "$READING" 1 create --uid 0 --function VPN --allow Api
     trap - HUP
     [ "$status" -eq 0 ]
     [ "$(sql "SELECT tid FROM token")" = "$output" ]
-    # What does interrupt it leaves no token whose id nobody got to know.
+    # A signal that interrupts it leaves no token whose id nobody knows.
     sql "DELETE FROM token"
     SIGNAL=TERM run_waiting "$READING" 1 create --uid 0 --function VPN --allow Api
     expect 143 "" "vemo-access-token: interrupted; the token was taken back"
@@ -249,12 +249,12 @@ TABLE
         done < <(locked_commands | grep -E "$pattern")
         cmp "$DB" "$DIR/before"
         if [ $kind = EXCLUSIVE ]; then
-            # doctor finds it, too. That the file be moved away is no remedy.
+            # doctor finds it, too. To move the file away is no remedy.
             VEMO_TEST_HASTE=1 run_tool doctor
             [ "$status ${lines[0]}" = "5 error: $locked" ]
             [[ $output != *"move the file away"* ]]
         else
-            # What was repaired before is told, and what was not is left.
+            # It tells what it has repaired before, and leaves the rest.
             chmod 0755 "$VEMO_REDIRECT_DIR"
             VEMO_TEST_HASTE=1 run_tool doctor --repair
             [ "$status ${lines[0]}" = "5 repaired: $REAL_DIRECTORY has mode 0755" ]
@@ -268,7 +268,7 @@ warning: expired for more than an hour: 1 token (old${ID:0:5})
     done
 }
 
-@test "of a lock that stays behind a first change, it is not said that nothing was changed" {
+@test "after a first change, a lock that stays is not said to have changed nothing" {
     a_store
     local kind sentence importer locker first
     while IFS='|' read -r kind sentence; do
@@ -408,7 +408,7 @@ TABLE
 TABLE
 }
 
-@test "the old token of a rotation is brought to its end again when a call has written it back" {
+@test "the old token of a rotation ends as it should when a call has written it back" {
     local old arguments then sentence again
     while IFS=';' read -r arguments then sentence again; do
         old=$(a_token --uses 9 --ttl 2h)
@@ -424,15 +424,15 @@ TABLE
 TABLE
 }
 
-@test "unlimited uses that a program writes meanwhile are told from none, whatever its number for them" {
+@test "any negative number that a program writes meanwhile is unlimited uses" {
     local id
     id=$(a_token --uses 9)
     beside_call 1 "SELECT count(*) FROM token WHERE count = -1" "UPDATE token SET count = -2" update "$id" --unlimited
     expect 0 "1 token updated"
 }
 
-# Calls that take no lock: while there is one that waits to write the token back, the next one begins, and reads
-# what that writes. They give up after a second, or after 200, and the number of those that wrote is printed.
+# Calls that take no lock: while one waits to write the token back, the next one begins, and reads what the first
+# writes. They give up after a second, or after 200 calls. Prints how many have written.
 overlapping_calls()
 {
     exec /usr/bin/python3 -c '
@@ -471,7 +471,7 @@ print(written)' "$DB"
     [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }
 
-@test "where it cannot be told which programs have the database open, the change is no success" {
+@test "a change fails where /proc cannot be read" {
     local id error reason uses=1
     id=$(a_token)
     while IFS='|' read -r error reason; do
@@ -484,11 +484,11 @@ print(written)' "$DB"
 23|Too many open files in system
 24|Too many open files
 TABLE
-    # What it may not see is no reason to fail.
+    # What it is not allowed to see is no reason to fail.
     VEMO_TEST_PROC=13 gives "1 token revoked" revoke "$id"
 }
 
-@test "who had read a token, and ended without writing it back, is waited for and not named" {
+@test "the tool waits for a program that has read a token, and does not name it when it ends without writing" {
     local id
     id=$(a_token)
     calling
@@ -509,13 +509,13 @@ TABLE
     diff "$DIR/out" - <<< "1 token revoked"
 }
 
-@test "where nothing tells who may still write back, a change says so" {
+@test "a change says so where /proc does not tell who may still write back" {
     local id namespace=(unshare --user --map-root-user --mount)
     "${namespace[@]}" mount -t tmpfs none /proc 2>/dev/null || skip "no namespace with another /proc here"
     id=$(a_token)
     run --separate-stderr "${namespace[@]}" sh -c 'mount -t tmpfs none /proc && exec "$@"' - "$TOOL" revoke "$id"
     expect 0 "1 token revoked" "vemo-access-token: /proc does not tell who has the database open: what was read before can still be written back"
-    # And nobody knows who holds the lock.
+    # Then it is not known who holds the lock, either.
     exec 6>"$VEMO_REDIRECT_DIR.lock"
     flock 6
     VEMO_TEST_HASTE=1 run --separate-stderr "${namespace[@]}" sh -c 'mount -t tmpfs none /proc && exec "$@"' - "$TOOL" purge
@@ -612,7 +612,7 @@ $open" ]
     [ "$(wc -l <"$DIR/log")" -eq "$(grep -c '\.cpp:' <<<"$stderr")" ]
 }
 
-@test "who does not take an id holds nobody up" {
+@test "a reader that does not take an id holds nobody up" {
     tool init >/dev/null
     mkfifo "$DIR/pipe"
     exec 5<>"$DIR/pipe"

@@ -31,7 +31,7 @@ END
     cmp "$DB" "$DIR/before"
 }
 
-# Where it cannot be made sure of: all that is told of the store must be.
+# What a command tells of the store must be on the disk. Where it is not known to be, the command fails.
 @test "what is told outlasts a power cut, that others changed it too" {
     row token---
     local arguments

@@ -55,7 +55,7 @@ END
     gives "1 token revoked" revoke - <<<"aaaaaaaa"
     gives "3 tokens revoked" revoke cccccccc - < <(printf '\nbbbbbbbb\n\n\ndddddddd')
     expect_left eeeeeeee ffffffff
-    # What was listed can be nothing.
+    # A list can be empty.
     run_tool revoke - < <(tool list --show-ids --field tid --expired 2>/dev/null)
     expect 0 "0 tokens revoked" "vemo-access-token: no token matches"
     run_tool revoke --dry-run - </dev/null

@@ -23,7 +23,7 @@ kept()
     [[ $(<"$DIR/log") == *" rotate: 1 token created (${output:0:8}...), 1 token deleted (token---...); "* ]]
     [ "$(kept "s/^'$output'/'fresh'/" | sort)" = "$(sort <<<"$before")" ]
     [ "$(sql "SELECT create_time BETWEEN $now AND $(date +%s) FROM token WHERE tid = '$output'")" = 1 ]
-    # From standard input too, and whole.
+    # A whole id, from standard input.
     local first=$output
     run_tool rotate - <<<"$first"
     [ "$status" -eq 0 ]
@@ -110,11 +110,11 @@ interrupted()
     [ "$(sql "SELECT * FROM token")" = "$before" ]
     interrupted "UPDATE token SET count = count - 1 WHERE tid LIKE 'token%'" token--- --grace 1m
     [ "$(sql "SELECT * FROM token")" = "${before/|5|/|4|}" ]
-    # A call that had read it has written it back.
+    # A call that has read the old token writes it back.
     interrupted "INSERT INTO token SELECT 'token---$ZEROS', bind_sid, uid, deadline, 3, 7, function, webapi_allow, extra FROM token" \
         token---
     [ "$(sql "SELECT count, create_time FROM token")" = "3|7" ]
-    # Its last use was spent.
+    # The last use of the old token is spent.
     interrupted "DELETE FROM token WHERE tid LIKE 'token%'" token--- --grace 1m
     [ "$(sql "SELECT count(*) FROM token")" = 0 ]
 }

@@ -63,7 +63,7 @@ END
     row token--- "extra = '{\"n\":[1,0.5,null]}', bind_sid = 'session-1', count = -1"
     record='{"bind_sid":"session-1","count":-1,"create_time":1000000000,"deadline":9999999999,"extra":{"n":[1,0.5,null]},"function":"VPN","tid":"token---'$ZEROS'","uid":0,"webapi_allow":{"Api":{"method":["get"]}}}'
     gives "$record" show token--- -o jsonl
-    # Nothing of a table's makes a difference.
+    # Options for tables make no difference.
     gives "$record" show token--- -o jsonl --no-header --utc
     succeeds show token--- --output json
     [ "${#lines[@]}" -gt 10 ]
@@ -96,7 +96,7 @@ function|VPN
 webapi_allow|{"Api":{"method":["get"]}}
 extra|{"a":"ü"}
 END
-    # It is stronger than a form.
+    # It wins over a form.
     gives 0 show token--- --field uid -o json
 }
 
@@ -104,7 +104,7 @@ END
     export LC_ALL=C.UTF-8
     local text json field expires shown='a'\''b"c\d\x5cx41\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff;--'
     text=$'a\'b"c\\d\\x41\ne\tf\e[31m\xc2\x9bÄ漢\xff;--'
-    # What is not UTF-8 stays as it is stored, for what reads it to decide.
+    # What is not UTF-8 stays as it is stored; whoever reads it decides.
     json=$'a\'b\\"c\\\\d\\\\x41\\ne\\tf\\u001b[31m\\u009bÄ漢\xff;--'
     tool init
     tid=$(tool create --uid 0 --function "$text" --bind-sid "$text" --allow "$text:$text" --extra '{"\u001b[31m":"\n"}')
@@ -131,7 +131,7 @@ END
     json=${json//$'\xff'/'\xff'}
     [ "${lines[7]}" = "webapi_allow  {\"$json\":{\"method\":[\"$json\"]}}" ]
     [ "${lines[8]}" = 'extra         {"\u001b[31m":"\n"}' ]
-    # Where the locale knows ASCII alone, nothing else is trusted.
+    # In a locale of ASCII alone, all else is escaped.
     [[ "$(LC_ALL=C tool show "$tid" --no-header)" == *'\xc2\x9b\xc3\x84\xe6\xbc\xa2\xff'* ]]
 }
 
@@ -152,12 +152,12 @@ END
     sql "INSERT INTO token SELECT tid || 'x', '', 0, 9999999999, 1, 2, 'VPN', '{}', '{}' FROM token;
          INSERT INTO token SELECT 'prefix-~', '', 0, 9999999999, 1, 3, 'VPN', '{}', '{}' FROM token LIMIT 1"
     fails 2 'TID: several tokens begin with "prefix--"; give more of the id' show prefix--
-    # More of it is not repeated: it may be all but a character of the id.
+    # A longer beginning is not repeated: it may be the id but for one character.
     fails 2 'TID: several tokens begin with "prefix--..."; give more of the id' show "prefix--${ZEROS%0}"
     shows_at 1 "prefix--$ZEROS"
     shows_at 2 "prefix--${ZEROS}x"
     shows_at 3 prefix-~
-    # Nor does it matter which bytes follow, UTF-8 or not.
+    # It does not matter which bytes follow, UTF-8 or not.
     row another- "tid = CAST(x'616e6f746865722dff' AS TEXT) || tid, create_time = 4"
     shows_at 4 another-
     row another-
@@ -188,7 +188,7 @@ END
     row second-- "create_time = 2"
     shows_at 1 - <<<"first---$ZEROS"
     shows_at 2 - <<<second--
-    # Lines that hold nothing count for nothing; neither does a missing line break.
+    # Empty lines do not matter, nor does a missing line break.
     shows_at 2 - < <(printf '\n\n%s' "second--$ZEROS")
     shows_at 2 - < <(printf '%s\n\n' "second--$ZEROS")
 }

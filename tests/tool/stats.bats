@@ -57,7 +57,7 @@ Web            1
          0  root       3
 4000000000             1"
     [ "$(stat -c %s "$DB")" -eq 16384 ]
-    # What is expired is counted, not purged.
+    # Expired tokens are counted, not purged.
     [ "$(sql "SELECT count(*) FROM token")" -eq 4 ]
 }
 
@@ -138,7 +138,7 @@ vemo_access_token_old_unlimited_tokens 2'
     tool stats --prometheus | check_metrics
     local metrics=$output
     gives "$metrics" stats -o metrics
-    # Those that have expired do not expire soon.
+    # Expired tokens do not count as expiring.
     sql "UPDATE token SET webapi_allow = '{\"Api\":{\"method\":[]}}', create_time = strftime('%s', 'now') WHERE tid < 'c';
          UPDATE token SET deadline = strftime('%s', 'now') + iif(tid = 'a', 86000, 7 * 86400 - 60) WHERE tid IN ('a', 'd');
          UPDATE token SET uid = 4000000001 WHERE tid = 'a'"
@@ -166,7 +166,7 @@ vemo_access_token_old_unlimited_tokens 0' ]
     [ "$(grep function= <<<"$output")" = 'vemo_access_token_function_tokens{function="a\\xff"} 4' ]
 }
 
-# Of one bad sample, the collector refuses the whole file.
+# For one bad sample, the collector refuses the whole file.
 @test "metrics stay valid where a purpose is no valid UTF-8, and owners are no numbers" {
     some_tokens
     # Stray bytes, half a surrogate pair, and beyond the last code point; two purposes stay two.

@@ -49,7 +49,7 @@ $id" # the result
     [ "$(sql "SELECT tid, function FROM token")" = "$id|TAG" ]
 }
 
-@test "a prompt can be left with nothing" {
+@test "a prompt can be answered with nothing" {
     row token---
     local reply
     for reply in $'\r' $'\x04'; do
@@ -124,7 +124,7 @@ TABLE
     [ "$(cat "$DIR/result")" = "1 token revoked" ]
 }
 
-@test "nothing is asked where it is clear, or nobody to ask" {
+@test "nothing is asked where it is clear what to do, or where there is nobody to ask" {
     rows <<'END'
 token---
 another-
@@ -149,7 +149,7 @@ END
     local id expired
     id=$(a_token --ttl 90m | cut -c1-8)
     expired=$(a_token | cut -c1-8)
-    # Both times are half an hour from showing otherwise.
+    # Both times show the same for half an hour.
     sql "UPDATE token SET deadline = strftime('%s', 'now') - 5400 WHERE tid LIKE '$expired%'"
 
     on_terminal --columns 200 -- list --no-header --epoch
@@ -240,7 +240,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
     [ "$(grep -o ü <<<"$output" | wc -l)" -eq 70 ]
 }
 
-# They are what is copied or compared; other columns can give way.
+# Short values are what people copy or compare; other columns can become narrower.
 @test "short values are not broken for the sake of long ones, and words only where they are very long" {
     local id
     id=$(a_token --allow "$(printf 'Example.Long%.0s' {1..20})" --allow Api:get,list --bind-sid "$(printf 's%.0s' {1..100})")
@@ -320,7 +320,7 @@ TABLE
         done <"$1"' -- "$DIR/commands" "$DB"
 }
 
-@test "what tokens and arguments hold cannot command the terminal" {
+@test "no text of a token or an argument can control the terminal" {
     tool init
     ID=$(tool create --uid 0 --function "$EVIL" --bind-sid "$EVIL" --allow "$EVIL:$EVIL" \
         --extra '{"x": "\u001b[31m\u007f\u009b\u202e\udb40\udc41"}')
@@ -331,7 +331,7 @@ TABLE
         in_all_forms "$locale"
         cp "$DIR/copy" "$DB"
         "$BATS_TEST_DIRNAME/visible.py" check <<<"$output"
-        # As text and as JSON.
+        # In texts and in JSON.
         [[ $output == *'x\x1b[31my\x07\x7f\xc2\x9b2Jz\x9b31m\xe2\x80\xaeabc'* ]]
         [[ $output == *'x\u001b[31my\u0007\u007f\u009b2Jz\udc9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\udb40\udc41\ufe0f'* ]]
         [[ $output == *"run sql failed"* ]]
@@ -339,11 +339,11 @@ TABLE
         [ "$locale" = C.UTF-8 ] || [[ $output == *'\udb40\udc41\ufe0f\u00db\ud800\udc00'* ]]
     done
     [[ $output == *Û* ]]
-    # Elsewhere a value comes out as it is.
+    # Without a terminal, a value comes out as it is.
     gives "$EVIL" show "$ID" --field function
 }
 
-@test "what is read by people stays readable on the terminal" {
+@test "text of any language stays readable on the terminal" {
     local name=$'Zoe\u0308 Ünal, สมชาย, नमस्ते, שלום, مرحبا, 日本'
     tool init
     tool create --uid 0 --function "$name" >/dev/null
@@ -368,7 +368,7 @@ bar()
     }
 }
 
-@test "export, import and tune show a progress bar on a terminal, which is none of the result" {
+@test "export, import and tune show a progress bar on a terminal, which is not part of the result" {
     many_rows 2
     on_terminal -- export "$DIR/lines"
     bar Exporting
@@ -384,7 +384,7 @@ vemo-access-token: 2 tokens exported"
     expect 0 "${lines[0]}"
     [[ $(head -n 1 "$DIR/result") =~ ^WHAT\ +BEFORE\ +AFTER$ ]]
 
-    # One that does not come to its end is ended before the reason is told.
+    # A bar that does not get full is ended before the reason is told.
     sql "DELETE FROM token WHERE rowid = 1"
     on_terminal -- import "$DIR/lines"
     [[ ${lines[0]} == $'\r'"Importing ["* ]]
@@ -396,7 +396,7 @@ vemo-access-token: $DIR/lines: line 2 has the id of a token that is there alread
     expect 0 "${lines[0]}
 2 tokens imported"
 
-    # The words of a table are as where there is room.
+    # A table that is wider than the terminal keeps its words.
     on_terminal --columns 20 -- tune --undo
     [[ ${lines[0]} == *$'\rTuning [########################################] 100 %' ]]
     [[ $output == *$'\nlook for expired tokens, as every call does  '* ]]
@@ -419,7 +419,7 @@ vemo-access-token: $DIR/lines: line 2 has the id of a token that is there alread
 vemo-access-token: 2 tokens exported"
 }
 
-@test "a terminal that was stopped holds up nobody but the tool itself" {
+@test "a terminal that was stopped holds up the tool alone" {
     many_rows 300
     tool export "$DIR/file"
     sql "DELETE FROM token"

@@ -6,7 +6,7 @@ load common
 ROW="'', 0, 9999999999, 1, 0, 'VPN', '{}', '{}'"
 LINE='{"bind_sid":"","count":1,"create_time":0,"deadline":9999999999,"extra":{},"function":"VPN","tid":"TID","uid":0,"webapi_allow":{}}'
 
-# For VEMO_TEST_CALLS: the file system does not know files without a name.
+# For VEMO_TEST_CALLS: the file system has no files without a name.
 NAMELESS='openat O_TMPFILE|95'
 
 # a_tid NAME: the id of the token of that name
@@ -72,7 +72,7 @@ odd_tokens()
     expect_left A B
 }
 
-@test "an export of a selection is a whole one of these tokens" {
+@test "an export of a selection is a whole export of these tokens" {
     local arguments letters
     rows <<'END'
 A|uid = 4294967294, create_time = 7
@@ -177,28 +177,28 @@ TABLE
     [ "$(ls "$VEMO_REDIRECT_DIR")" = "${DB##*/}
 ${DB##*/}-backup
 ${DB##*/}-wal" ]
-    # Elsewhere the names are anybody's.
+    # In other directories any name may be used.
     for file in "$DIR/${DB##*/}" "$DIR/vemo-access-token.lock" "$VEMO_REDIRECT_DIR/backup"; do
         run_tool export "$file"
         expect 0 "" "vemo-access-token: 1 token exported"
     done
 }
 
-@test "an export does not take the place of the lock while there is none, either" {
+@test "an export does not take the place of the lock, even while there is none" {
     in_namespace 'mount -t tmpfs tmpfs /run && "$1" init >/dev/null && rm /run/* &&
         "$1" export /run/another.lock && "$1" export /run/vemo-access-token.lock' "$TOOL"
     expect 2 "" "vemo-access-token: 0 tokens exported
 vemo-access-token: /run/vemo-access-token.lock belongs to the database; choose another name"
 }
 
-@test "what others linked into a directory of theirs is not imported" {
+@test "a file that others can have linked into their directory is not imported" {
     tool init
     chmod 0755 "$DIR" # whatever the umask
     mkdir -m 0777 "$DIR/theirs"
     written A | whole >"$DIR/secret"
     local linked="has other names besides, and others can change its directory; copy it to a place of yours"
     local make calls sentence theirs=$DIR/theirs/file secret=$DIR/secret
-    # Nor if they take it away again when it has been opened, or put another one there, or do that while it is opened.
+    # They can also remove or replace it before or after it is opened.
     while IFS='|' read -r make calls sentence; do
         rm -f "$theirs"
         $make "$secret" "$theirs"
@@ -210,13 +210,13 @@ ln|fstat:rm $theirs && touch $theirs|$linked
 cp|openat file:rm $theirs && mkfifo $theirs|is not a regular file
 cp|openat file:ln -sf $secret $theirs|is a symbolic link; name the place that it leads to
 TABLE
-    # But a file that is theirs alone is.
+    # A file that has no other name is imported.
     rm "$theirs"
     cp "$secret" "$theirs"
     gives "1 token imported" import "$theirs"
 }
 
-@test "an export leaves alone what is not its own beside it, and removes what one has left behind" {
+@test "an export leaves a file of another alone, and removes what an export has left behind" {
     row A
     touch "$DIR/file"
     local in_the_way="vemo-access-token: $DIR/file.part is in the way: another export is writing it, or it is none's"
@@ -240,7 +240,7 @@ TABLE
     [ ! -e "$DIR/file.part" ]
 }
 
-@test "what an export writes has no name, and where it needs one, nobody takes it for remains" {
+@test "an export writes a file without a name; where it needs a name, no other export takes the file" {
     row A
     mkdir "$DIR/out"
     VEMO_TEST_CALLS="fdopen|ls $DIR/out >$DIR/names" run_tool export "$DIR/out/file"
@@ -258,7 +258,7 @@ file.part" ]
     [ "$(stat -c %a "$DIR/out/file")" = 600 ]
 }
 
-@test "an export with a name of its own leaves nothing when it fails, and never what is another's" {
+@test "where an export needs a name, it leaves nothing when it fails, and leaves the files of others alone" {
     row A
     local another="is in the way: another export is writing it, or it is none's" there calls sentence left
     while IFS=% read -r there calls sentence left; do
@@ -285,7 +285,7 @@ there%flock|11%file.part $another%another
 TABLE
 }
 
-@test "a file that is not on the disk, or its name, is no success" {
+@test "an export fails when the file or its name does not get to the disk" {
     row A
     mkdir "$DIR/elsewhere"
     VEMO_TEST_SYNC=$DIR/elsewhere run_tool export "$DIR/elsewhere/file"
@@ -296,7 +296,7 @@ TABLE
     [ "$(ls "$DIR/elsewhere")" = "" ]
 }
 
-@test "a token that an import would not make again is told, and no export without it passes for a whole one" {
+@test "an export names a token that cannot be imported again, and is not whole without it" {
     row A "uid = 7"
     row B
     cp "$DB" "$DIR/sound"
@@ -352,7 +352,7 @@ vemo-access-token: nothing exported; without 1 token, the file would not be whol
     fi
 }
 
-@test "an export names each token that is missing in it, in every field that can be wrong" {
+@test "an export names each token that is missing in it" {
     rows <<'END'
 A|count = 'x', extra = ''
 B
@@ -520,7 +520,7 @@ sed '1s/$/\x00{broken/'~1 holds a NUL byte
 sed '1s/^/\x00/'~1 holds a NUL byte
 sed "2s/{}/$deep/"~2 is nested too deeply for JSON
 TABLE
-    # No other line's number is told.
+    # The message tells no other line's number.
     sed '2s/.*/{/' "$DIR/whole" >"$DIR/file"
     run_tool import "$DIR/file"
     [[ $stderr != *"Line 1"* ]]
@@ -558,7 +558,7 @@ TABLE
     gives "0 tokens imported; 2 tokens there already" import --skip-existing "$DIR/file"
     expect_left A B
     [ "$(sql "SELECT count FROM token ORDER BY tid" | xargs)" = "7 1" ]
-    # What stands twice in the file is a fault of the file.
+    # An id that stands twice in the file is an error.
     written C C | whole >"$DIR/file"
     refuses_file "line 2 has the id of line 1" --skip-existing
 }
@@ -615,7 +615,7 @@ link/file|link is a symbolic link; name the place that it leads to
 --force directory|unknown option "--force"
 TABLE
     [ "$(id -u)" -eq 0 ] || refuses import <<<"forbidden|forbidden: Permission denied"
-    # Nor is a database made for a bad one.
+    # No database is made for a bad file.
     rm "$DB"
     echo x >file
     run_tool import file

@@ -54,7 +54,7 @@ expect_tokens()
 ok" ]
 }
 
-@test "tune makes three indexes and says before and after, measured" {
+@test "tune makes three indexes, and measures before and after" {
     a_store
     run_tool tune
     expect_change no yes delete delete
@@ -127,7 +127,7 @@ TABLE
     expect_tokens
 }
 
-@test "tune keeps what is there of it already" {
+@test "tune keeps an index that is there already" {
     a_store
     sql "CREATE INDEX token_deadline ON token (deadline)"
     run_tool tune

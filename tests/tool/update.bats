@@ -44,7 +44,7 @@ ROW="'session-1', 0, 9999999999, 5, 1000000000, 'VPN', '{\"Api\":{\"method\":[\"
 END
 }
 
-@test "names that are seldom meant are told, and taken" {
+@test "a name with a wildcard or a blank is taken, with a warning" {
     row token---
     run_tool update token--- --allow 'Api:*'
     expect 0 "1 token updated" 'vemo-access-token: --allow: "*" stands for this name alone: "*" is no wildcard'
@@ -75,7 +75,7 @@ END
     [ "$(sql "SELECT deadline FROM token")" = 9999999999 ]
 }
 
-@test "what a token opens is replaced, added to and taken from" {
+@test "what a token opens can be replaced, extended and reduced" {
     row token---
     while IFS='|' read -r stored arguments result; do
         echo "$stored $arguments"
@@ -101,7 +101,7 @@ END
 END
 }
 
-@test "what a token does not open cannot be taken from it, and then nothing changes" {
+@test "what a token does not open cannot be removed, and then nothing changes" {
     row token---
     refuses update <<'END'
 token--- --remove-allow Other|--remove-allow: the token does not list "Other"
@@ -114,7 +114,7 @@ token--- --uses 9 --add-allow More --remove-allow Other|--remove-allow: the toke
 END
 }
 
-@test "malformed entries are left alone, refused where they are named, and can be replaced" {
+@test "malformed entries stay as they are, cannot be changed in part, and can be replaced" {
     malformed="what the token opens is malformed and cannot be changed in part; replace it with --allow"
     row token---
     while IFS='|' read -r stored arguments result; do
@@ -250,7 +250,7 @@ expired-|5|7" ]
     gives allowed check expired- Api get
 }
 
-@test "a note is changed alone, and what cannot hold one stays" {
+@test "--note changes the note alone, and malformed data stay as they are" {
     row token--- "extra = '{\"a\":[1.5,\"ü\"],\"note\":{}}'"
     gives "1 token updated" update token--- --note $'"new"\n'
     [ "$(sql "SELECT extra FROM token")" = '{"a":[1.5,"ü"],"note":"\"new\"\n"}' ]

@@ -33,7 +33,7 @@ cannot_print()
 }
 
 # into_closed_pipe ARGUMENTS...: standard output is a pipe that nobody reads any more. A shell may have
-# been told to ignore the signal of that; the tool is started as by one that has not.
+# been told to ignore SIGPIPE; the tool is started as if it had not.
 into_closed_pipe()
 {
     mkfifo "$DIR/pipe"
@@ -173,7 +173,7 @@ Examples:
     gives "$version" list -V
 }
 
-@test "arguments that cannot be are told in one sentence that names them, and nothing is done" {
+@test "bad arguments end in one sentence that names them, and nothing is done" {
     row expired- "deadline = 1"
     refuses <<'TABLE'
 |say what to do; "vemo-access-token --help" lists the commands
@@ -235,7 +235,7 @@ TABLE
     expect 2 "" 'vemo-access-token: unknown command "café"'
 }
 
-@test "arguments may stand before, between and behind options, also where POSIX is asked for" {
+@test "arguments may stand before, between and behind options, also with POSIXLY_CORRECT" {
     local id arguments
     id=$(a_token --allow Api:get)
     for arguments in "$id Api get -o json" "-o json $id Api get" "$id -ojson Api get" "$id Api --output=json get" \
@@ -259,10 +259,10 @@ TABLE
     [ "$(tool list --field bind_sid)" = "" ]
 }
 
-# At each limit the program ends in the loader, as that says; for want of memory, as the tool says; or as ever.
+# At each limit the program ends in the loader, with its message; for lack of memory, with the tool's; or as usual.
 # The loader itself crashes where it has no memory for a table of its own, and does so when it only lists the
 # libraries.
-@test "memory that is short from the start is told, and ends in no crash" {
+@test "a lack of memory from the start is told, and causes no crash" {
     local limit enough=0 statuses=" "
     ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
     [[ $(ldd "$TOOL" 2>&1) != *"not a dynamic executable"* ]] || skip "valgrind takes more memory"
@@ -301,7 +301,7 @@ TABLE
     [ "$(sql "SELECT count(*) FROM token")" -eq 2 ]
 }
 
-@test "who is not root is told so before anything is tried" {
+@test "a user who is not root is told so, and nothing is tried" {
     local uid=65534
     [ "$(id -u)" -eq 0 ] || uid=$(id -u)
     echo '{}' >"$DIR/lines"
@@ -388,7 +388,7 @@ TABLE
     run cannot_print "" - create --verbose --uid 0 --function VPN
     [[ $output == *"got:      status 4"* ]]
     [ "$(sql "SELECT count(*) FROM token")" -eq 1 ]
-    # Nor one that is larger than any buffer.
+    # A result that is larger than any buffer.
     many_rows 300
     for arguments in "list --show-ids" "list -o json --show-ids" "list --field tid --show-ids"; do
         cannot_print "No space left on device" /dev/full $arguments
@@ -405,7 +405,7 @@ TABLE
     expect 141 ""
 }
 
-@test "streams that are closed at the start do not turn into the database or the lock" {
+@test "neither the database nor the lock takes the place of a stream that is closed at the start" {
     local id closed listing listed complaint
     id=$(a_token)
     cp "$DB" "$DIR/before"
@@ -419,7 +419,7 @@ TABLE
         [ "$output" = "$complaint" ]
         cmp "$DB" "$DIR/before"
         [ ! -s "$VEMO_REDIRECT_DIR.lock" ]
-        # While it waits for the lock, all three are there, and nothing more than them.
+        # While it waits for the lock, all three are open, on nothing but /dev/null.
         VEMO_TEST_WAITS=$DIR/waits flock "$VEMO_REDIRECT_DIR.lock" bash -c 'exec 8<>"$VEMO_TEST_WAITS"
             { exec '"$closed"' 3>&- 8>&-; exec "$@"; } &
             read -r -u 8
@@ -593,12 +593,12 @@ TABLE
     local id
     id=$(a_token)
     fails 2 "unexpected argument \"${id:0:8}...\"" show "$id" "$id$id"
-    # As in SQLite's reason.
+    # SQLite's reason can hold it.
     sql "CREATE TRIGGER refuse BEFORE INSERT ON token BEGIN SELECT RAISE(ABORT, 'no (not $id)'); END"
     fails 4 "$REAL_DB failed: no (not ${id:0:4}...)" create --uid 0 --function VPN
     sql "DROP TRIGGER refuse; CREATE TRIGGER refuse BEFORE INSERT ON token BEGIN SELECT RAISE(ABORT, '$id'); END"
     fails 4 "$REAL_DB failed: ${id:0:8}..." create --uid 0 --function VPN
-    # One that is not a text is masked, too: 8 characters of 4 bytes at most, and the end of the line.
+    # An id that is no text is masked, too: 8 characters of at most 4 bytes, and the end of the line.
     sql "UPDATE token SET tid = CAST(x'61' || x'$(printf '9b%.0s' {1..140})' AS TEXT)"
     [ "$(tool list --field tid | wc -c)" -eq 33 ]
     fails 2 "--sort: \"a$(printf '\\x9b%.0s' {1..31})...\" is not a field of a token" \

@@ -1,15 +1,15 @@
 #!/usr/bin/env bats
-# Users by name: the user database has none, or it fails.
+# Users by name: the user database does not have the name, or it fails.
 
 load common
 
-# Each look-up ends with an errno.
+# with_lookup ERRNO ARGUMENTS...: run_tool, where each look-up of a user ends with that
 with_lookup()
 {
     VEMO_TEST_LOOKUP=$1 run_tool "${@:2}"
 }
 
-@test "a user database that fails is not one without the user" {
+@test "a user database that fails is told from one without the user" {
     row token---
     before=$(state)
     while IFS='|' read -r errno status sentence; do
@@ -40,7 +40,7 @@ END
     [ "$(sql "SELECT DISTINCT count FROM token")" = 1 ]
 }
 
-@test "a user database may have much to say of a user" {
+@test "the entry of a user may be long" {
     row token---
     with_lookup 34 list --user root --count # ERANGE, while the buffer is short
     expect 0 1

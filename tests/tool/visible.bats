@@ -17,7 +17,7 @@ load common
             return 1
         }
     done
-    # A byte that is no UTF-8 stays in what goes on to programs.
+    # What goes to programs keeps a byte that is no UTF-8.
     sql "UPDATE token SET function = function || CAST(x'9b' AS TEXT)"
     printf '\x9b\n' >>"$DIR/all"
     tool list --field function | cmp - "$DIR/all"
