@@ -70,10 +70,12 @@ later---  4294967294  VPN         unlimited  $(at $((now + 200000)))  in 2 d    
 }
 
 @test "times are in local time, in UTC or in seconds" {
-    row winter-- "deadline = strftime('%s', '2099-01-25 09:00:00')"
-    row summer-- "deadline = strftime('%s', '2099-07-23 09:00:00')"
-    row before-- "deadline = -1"
-    columns='s/.* 1  (.*)  (in|expired) .*/\1/'
+    local columns='s/.* 1  (.*)  (in|expired) .*/\1/'
+    rows <<'END'
+winter--|deadline = strftime('%s', '2099-01-25 09:00:00')
+summer--|deadline = strftime('%s', '2099-07-23 09:00:00')
+before--|deadline = -1
+END
     [ "$(tool list --no-header | sed -E "$columns")" = "\
 1970-01-01 00:59:59
 2099-01-25 10:00:00
