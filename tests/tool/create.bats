@@ -295,6 +295,6 @@ $OWN|1" ]
     tool init
     VEMO_TEST_SYNC=file fails 4 "$REAL_DB failed: disk I/O error" create --uid 0 --function VPN
     VEMO_TEST_SYNC=directory run_tool create --uid 0 --function VPN
-    expect 4 "" "vemo-access-token: ${REAL_DB%/*}: Input/output error; the change was made, and cannot be taken back: ${REAL_DB%/*}: Input/output error"
+    expect 4 "" "vemo-access-token: $REAL_DIRECTORY: Input/output error; the change was made, and cannot be taken back: $REAL_DIRECTORY: Input/output error"
     [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }

@@ -16,7 +16,7 @@ expect_complete()
 
 @test "init makes the directory, the file and the table, and finds them the next time" {
     run_tool init
-    expect 0 "made the directory ${REAL_DB%/*}
+    expect 0 "made the directory $REAL_DIRECTORY
 made the file $REAL_DB
 made the table of tokens"
     expect_complete
@@ -80,10 +80,10 @@ made the table of tokens" init
         [ ! -e "$DB" ]
     done <<TABLE
 open /|24|/: Too many open files
-mkdirat session|30|${REAL_DB%/*}: Read-only file system
-mkdirat session|touch $VEMO_REDIRECT_DIR|${REAL_DB%/*}: Not a directory
-openat .|24|${REAL_DB%/*}: Too many open files; the change was made, but a power cut can undo it
-fsync|5|${REAL_DB%/*}: Input/output error; the change was made, but a power cut can undo it
+mkdirat session|30|$REAL_DIRECTORY: Read-only file system
+mkdirat session|touch $VEMO_REDIRECT_DIR|$REAL_DIRECTORY: Not a directory
+openat .|24|$REAL_DIRECTORY: Too many open files; the change was made, but a power cut can undo it
+fsync|5|$REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it
 openat vemo-access-token.db|28|$REAL_DB: No space left on device
 TABLE
 }
@@ -97,7 +97,7 @@ TABLE
         VEMO_TEST_CALLS="$call|$command" gives "$(printf '%b' "$output_then")" init
     done <<TABLE
 mkdirat session|mkdir -m 0700 $VEMO_REDIRECT_DIR|made the file $REAL_DB\nmade the table of tokens
-openat vemo-access-token.db|cp -p $DIR/made $DB|made the directory ${REAL_DB%/*}
+openat vemo-access-token.db|cp -p $DIR/made $DB|made the directory $REAL_DIRECTORY
 TABLE
     expect_complete
 }
@@ -122,7 +122,7 @@ TABLE
     in_namespace 'umask 0022; "$1" init &&
         stat -c %a /usr/vemo /usr/vemo/etc /usr/vemo/etc/private /usr/vemo/etc/private/session && "$1" init &&
         "$1" doctor' "$TOOL"
-    expect 0 "made the directory ${REAL_DB%/*}
+    expect 0 "made the directory $REAL_DIRECTORY
 made the file $REAL_DB
 made the table of tokens
 755
@@ -136,17 +136,17 @@ no findings"
 @test "init tells what it made although the rest fails" {
     install -m 0644 /dev/null "$VEMO_REDIRECT_DIR.lock"
     run_tool init
-    expect 4 "made the directory ${REAL_DB%/*}" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
+    expect 4 "made the directory $REAL_DIRECTORY" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
     rm -r "$VEMO_REDIRECT_DIR"
     chmod 0600 "$VEMO_REDIRECT_DIR.lock"
     VEMO_TEST_HASTE=1 run --separate-stderr flock "$VEMO_REDIRECT_DIR.lock" "$TOOL" init
     [ "$status" -eq 4 ]
-    [ "$output" = "made the directory ${REAL_DB%/*}" ]
+    [ "$output" = "made the directory $REAL_DIRECTORY" ]
     [[ $stderr == *" stayed locked by flock (process "*") for 5 seconds" ]] # and not that nothing was changed
 }
 
 @test "init makes no table before the file is on the disk, and tells what a power cut can undo" {
-    local sentence="vemo-access-token: ${REAL_DB%/*}: Input/output error; the change was made, but a power cut can undo it"
+    local sentence="vemo-access-token: $REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
     VEMO_TEST_SYNC=directory run_tool init
     expect 4 "" "$sentence"

@@ -189,15 +189,15 @@ END
     chmod 0755 "$VEMO_REDIRECT_DIR"
     NO_COLOR=1 on_terminal -- doctor
     [ "$status" -eq 5 ]
-    [ "$(grep -v '^ ' <<<"$output")" = "error: ${REAL_DB%/*} has mode 0755
+    [ "$(grep -v '^ ' <<<"$output")" = "error: $REAL_DIRECTORY has mode 0755
 warning: a deadline of 0 or less in 1 token (token---)" ]
     NO_COLOR= on_terminal -- doctor
     [ "$status" -eq 5 ]
-    [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[31merror${ESC}[0m: ${REAL_DB%/*} has mode 0755
+    [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[31merror${ESC}[0m: $REAL_DIRECTORY has mode 0755
 ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
     on_terminal -- doctor --repair
     [ "$status" -eq 5 ]
-    [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[32mrepaired${ESC}[0m: ${REAL_DB%/*} has mode 0755
+    [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[32mrepaired${ESC}[0m: $REAL_DIRECTORY has mode 0755
 ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
     on_terminal --shell '"$0" doctor >"$1"' -- "$DIR/result"
     expect 5 ""

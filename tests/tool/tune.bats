@@ -103,7 +103,7 @@ ok" ]
     while IFS='|' read -r arguments journal made; do
         a_store
         VEMO_TEST_SYNC=directory run_tool tune $arguments
-        expect 4 "" "vemo-access-token: ${REAL_DB%/*}: Input/output error; the change was made, but a power cut can undo it"
+        expect 4 "" "vemo-access-token: $REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
         [ "$(sql "PRAGMA journal_mode") $(indexes | wc -l)" = "$journal $made" ]
         rm -r "$VEMO_REDIRECT_DIR"
     done <<'TABLE'

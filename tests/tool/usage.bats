@@ -231,8 +231,7 @@ tune -o|unknown option "-o"
 list --sort $'a\e[31m\nb\x7f'|--sort: "a\x1b[31m\x0ab\x7f" is not a field of a token
 list --sort $'Ä\xc2\x9b31m'|--sort: "Ä\xc2\x9b31m" is not a field of a token
 TABLE
-    LC_ALL=C run_tool café # only of a terminal anything is known
-    expect 2 "" 'vemo-access-token: unknown command "café"'
+    LC_ALL=C fails 2 'unknown command "café"' café # only of a terminal anything is known
 }
 
 @test "arguments may stand before, between and behind options, also with POSIXLY_CORRECT" {
