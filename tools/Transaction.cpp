@@ -310,7 +310,7 @@ std::optional<std::string> Transaction::queryWithin(std::chrono::milliseconds lo
     });
     const std::string strErr = queryAsFarAsItGoes(strSql, rows);
     {
-        const std::lock_guard guard(mutex);
+        const std::lock_guard<std::mutex> guard(mutex);
         blEnded = true;
     }
     ended.notify_one();
