@@ -4,6 +4,13 @@ namespace {
 
 const int ENDING_SIGNALS[] = {SIGHUP, SIGINT, SIGQUIT, SIGTERM, SIGXFSZ};
 
+volatile sig_atomic_t g_nWaiting = 0; // the signal that an EndingPause has held up
+
+void keepWaiting(int nSignal)
+{
+    g_nWaiting = nSignal;
+}
+
 } // namespace
 
 namespace tool {
@@ -18,6 +25,19 @@ void handleEndingSignals(void (*handle)(int), void (*before)(int))
             action.sa_flags = static_cast<int>(SA_RESETHAND); // and calls that wait are not begun anew
             sigaction(nSignal, &action, nullptr);
         }
+    }
+}
+
+EndingPause::EndingPause()
+{
+    handleEndingSignals(keepWaiting);
+}
+
+EndingPause::~EndingPause()
+{
+    handleEndingSignals(SIG_DFL, keepWaiting);
+    if (g_nWaiting) {
+        raise(g_nWaiting);
     }
 }
 

@@ -11,6 +11,16 @@ namespace tool {
 // coming does what it does by default. Those that are ignored stay so.
 void handleEndingSignals(void (*handle)(int), void (*before)(int) = SIG_DFL);
 
+// While it lives, the first of these signals waits: it ends the process when this object goes. The second
+// ends it at once.
+class EndingPause {
+public:
+    EndingPause();
+    ~EndingPause();
+    EndingPause(const EndingPause&) = delete;
+    EndingPause& operator=(const EndingPause&) = delete;
+};
+
 // Holds all signals up while it lives.
 class SignalPause {
 public:

@@ -186,6 +186,7 @@ void Transaction::commit()
         audit::note("changed or deleted", {}, nChanges);
     }
     m_blCommitting = 0 != nChanges;
+    m_pause.emplace();
     query("COMMIT");
     if (0 != nChanges) {
         settleChange();

@@ -15,6 +15,7 @@
 
 #include "Audit.h"
 #include "CallLock.h"
+#include "Signals.h"
 #include "Sql.h"
 #include "internal/AccessTokenDbApi.h"
 
@@ -82,7 +83,10 @@ private:
     std::string run(const std::string& strSql, const std::function<void(Row)>& take);
     bool holdsNull();
 
-    audit::Teller m_teller; // the last that goes: the database is closed, and nobody waits for the lock
+    // The last that go, when the database is closed and nobody waits for the lock: a change that is made is
+    // told, and then a signal that has come meanwhile ends the process.
+    std::optional<EndingPause> m_pause;
+    audit::Teller m_teller;
     const Access m_access;
     std::optional<CallLock> m_lock;
     bool m_blMadeFile = false;

@@ -129,6 +129,13 @@ create: 1 token deleted (created-...)" ]
     [ "$status" -eq 124 ]
     [ "$(told)" = "revoke: 1 token deleted (token---...)" ]
 
+    # The change is made, and is just getting to the disk.
+    row token---
+    # shellcheck disable=SC2016 # the tool's shell knows its parent
+    VEMO_TEST_CALLS='fsync|kill -TERM $PPID' run_tool revoke token---
+    [ "$status" -eq 143 ]
+    [ "$(told)" = "revoke: 1 token deleted (token---...)" ]
+
     # A change that is undone is not told.
     row token---
     sql "CREATE TRIGGER refuse BEFORE DELETE ON token BEGIN SELECT RAISE(ABORT, 'no'); END"
