@@ -202,12 +202,20 @@ int64_t parseTime(const std::string& strText)
     if (strText[0] == '@') {
         return parseNumber(strText.substr(1), 0, INT64_MAX);
     }
-    for (const char* szFormat :
-         {"%Y-%m-%d", "%Y-%m-%d %H:%M", "%Y-%m-%dT%H:%M", "%Y-%m-%d %H:%M:%S", "%Y-%m-%dT%H:%M:%S"}) {
+    const bool blUtc = !strText.empty() && 'Z' == strText.back();
+    const std::string strTime = strText.substr(0, strText.size() - (blUtc ? 1 : 0));
+    // strptime() also takes fewer digits, so that 26-12-31 would be in the year 26, and blanks anywhere.
+    std::string strShape = strTime;
+    std::replace_if(
+        strShape.begin(), strShape.end(), [](char c) { return '0' <= c && c <= '9'; }, '0');
+    for (const auto& [szShape, szFormat] : {std::pair("0000-00-00", "%Y-%m-%d"),
+                                            {"0000-00-00 00:00", "%Y-%m-%d %H:%M"},
+                                            {"0000-00-00T00:00", "%Y-%m-%dT%H:%M"},
+                                            {"0000-00-00 00:00:00", "%Y-%m-%d %H:%M:%S"},
+                                            {"0000-00-00T00:00:00", "%Y-%m-%dT%H:%M:%S"}}) {
         struct tm tmTime = {};
-        const char* szRest = strptime(strText.c_str(), szFormat, &tmTime);
-        const bool blUtc = szRest && 0 == strcmp(szRest, "Z");
-        if (!szRest || (*szRest && !blUtc)) {
+        const char* szRest = strShape == szShape ? strptime(strTime.c_str(), szFormat, &tmTime) : nullptr;
+        if (!szRest || *szRest) {
             continue;
         }
         const struct tm tmAsked = tmTime;

@@ -395,6 +395,7 @@ more|unexpected argument "more"
 --limit 9223372036854775808|--limit: "9223372036854775808" is not a number from 1 to 9223372036854775807
 --created-before soon|--created-before: "soon" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
 --created-after ''|--created-after: "" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
+--created-after 26-12-31|--created-after: "26-12-31" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
 --opens :m|--opens: ":m" names no API: write API or API:METHOD,METHOD
 --opens A:|--opens: "A:" has an empty method: write API or API:METHOD,METHOD
 --columns ''|--columns: "" is not a column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
