@@ -86,7 +86,7 @@ int revokeNamed(const RevokeOptions& options)
 {
     const std::vector<std::string> strNames = readAll(options.strTids);
     const Named named = options.blDryRun ? lookUpNamed(strNames) : removeNamed(strNames);
-    if (!options.blDryRun) {
+    if (!options.blDryRun && !named.strTids.empty()) {
         tool::outlastRevoked(named.strTids);
     }
     report(named.strTids.size(), "revoked", options.blDryRun);
@@ -202,7 +202,9 @@ int revokeMany(const RevokeOptions& options)
         const auto strTids = strBack.empty() ? findBack(store, "true") : std::exchange(strBack, {});
         return store.removeTids(strTids);
     };
-    tool::outlastRevoked({isUndone, revokeAgain});
+    if (!revoked.empty()) {
+        tool::outlastRevoked({isUndone, revokeAgain});
+    }
     report(revoked.size(), "revoked", false);
     return tool::EXIT_STATUS_DONE;
 }

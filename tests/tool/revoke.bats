@@ -62,6 +62,11 @@ END
     expect 0 "0 tokens would be revoked" "vemo-access-token: no token matches"
     run_tool revoke - - < <(printf 'ffffffff\nunknown1\nunknown2\n')
     expect 0 "1 token revoked" "vemo-access-token: 2 ids are unknown"
+    # Somebody has the database open, but of nothing that was revoked nothing can come back.
+    run_tool revoke unknown1 8<"$DB"
+    expect 0 "0 tokens revoked" "vemo-access-token: 1 id is unknown"
+    run_tool revoke --function none --yes 8<"$DB"
+    expect 0 "0 tokens revoked" ""
     fails 2 "TID: an id on standard input holds a NUL byte" revoke - < <(printf 'eeeeeeee\0x\n')
     expect_left eeeeeeee
 }
