@@ -270,7 +270,7 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
     const auto stopped = [&imported](tool::ExitStatus status, const std::string& strFact) {
         return tool::Failure(status, strFact,
                              tool::countText(imported.nCreated, "token") +
-                                 " imported; the command can be repeated without harm");
+                                 " imported before that; the command can be repeated without harm");
     };
     try {
         const Contents contents = readFile(strFile, [&](Line line) {
@@ -287,7 +287,7 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
     } catch (const tool::BadValue& bad) {
         throw stopped(tool::EXIT_STATUS_USAGE, nameOf(strFile) + ": " + bad.what());
     } catch (const tool::Failure& failure) {
-        throw stopped(failure.status(), failure.fact());
+        throw stopped(failure.status(), failure.what()); // which tells what became of its own step
     }
 }
 

@@ -147,9 +147,9 @@ uint64_t removeInSteps(const std::string& strTitle, const std::string& strWhere,
         if (0 == nRemoved) {
             throw;
         }
-        throw tool::Failure(failure.status(), failure.fact(),
+        throw tool::Failure(failure.status(), failure.what(), // which tells what became of its own step
                             tool::countText(nRemoved, "token") +
-                                " are gone already; repeat the command for the rest");
+                                " were gone before that; repeat the command for the rest");
     }
     return nRemoved;
 }
