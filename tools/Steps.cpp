@@ -53,13 +53,13 @@ bool Steps::next(const Use& use)
         const bool blIds =
             Order::ById == m_order || store.number("SELECT wr FROM pragma_table_list('token')");
         const std::string strKey = blIds ? "tid" : "rowid";
-        const std::string strBehind = m_strLast.empty() ? "true" : strKey + " > " + m_strLast;
+        const std::string strBehind = strKey + (m_strLast.empty() ? " IS NOT NULL" : " > " + m_strLast);
         const std::string strBound =
             store.text("SELECT " + (blIds ? SQL_QUOTED_TID : strKey) + " FROM token WHERE " + strBehind +
                        " ORDER BY " + strKey + " LIMIT 1 OFFSET " + std::to_string(m_nTokens - 1));
         m_blEnd = strBound.empty();
         const std::string strUpTo = m_blEnd ? "true" : strKey + " <= " + strBound;
-        // An id that is NULL comes before all others.
+        // All that have a NULL for an id, whose order tells nothing, come with the first.
         use(store,
             "(" + (blIds && m_strLast.empty() ? "tid IS NULL OR " + strUpTo : strBehind + " AND " + strUpTo) +
                 ")");

@@ -250,6 +250,16 @@ END
     gives 1 list --count --no-owner --opens A:m
 }
 
+@test "tokens without an id, which another program's table can hold, hide no others" {
+    row token---
+    sql "CREATE TABLE other AS SELECT * FROM token; DROP TABLE token; ALTER TABLE other RENAME TO token;
+         WITH RECURSIVE number(n) AS (SELECT 1 UNION ALL SELECT n + 1 FROM number WHERE n < 300)
+         INSERT INTO token SELECT NULL, $ROW FROM number"
+    gives 301 list --count
+    fails 4 "$REAL_DB holds a token that cannot be read; \"vemo-access-token doctor\" finds it" list
+    gives "301 tokens revoked" revoke --all --yes
+}
+
 @test "a token opens nothing where that cannot be read" {
     for stored in '' 'no JSON' '[]' 'null' '"A"' '{"A":1}' '{"A":{}}' '{"A":{"method":"m"}}' '{"A":{"method":[["m"]]}}' \
         "$(printf '{"A":%.0s' {1..1001})1$(printf '}%.0s' {1..1001})"; do
