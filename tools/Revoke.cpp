@@ -16,6 +16,8 @@
 
 namespace {
 
+const size_t NAMED_MAX = 5000; // one transaction of so many holds others up for less than a second
+
 struct RevokeOptions {
     std::vector<std::string> strTids;
     tool::Selection selection;
@@ -85,6 +87,11 @@ Named removeNamed(const std::vector<std::string>& strNames)
 int revokeNamed(const RevokeOptions& options)
 {
     const std::vector<std::string> strNames = readAll(options.strTids);
+    if (strNames.size() > NAMED_MAX) {
+        throw tool::Failure(tool::EXIT_STATUS_USAGE,
+                            "TID: more than " + std::to_string(NAMED_MAX) + " ids would hold all programs up",
+                            "revoke them some at a time");
+    }
     const Named named = options.blDryRun ? lookUpNamed(strNames) : removeNamed(strNames);
     if (!options.blDryRun && !named.strTids.empty()) {
         tool::outlastRevoked(named.strTids);

@@ -70,6 +70,8 @@ END
     beside revoke --created-before @1000010000 --yes
     [ "$(cat "$DIR/output")" = "9999 tokens revoked" ]
     [ "$(sql "SELECT count(*) FROM token WHERE create_time < 1000010000")" = 0 ]
+    run_tool revoke - < <(tool list --show-ids --field tid --limit 5001 2>/dev/null)
+    expect 2 "" "vemo-access-token: TID: more than 5000 ids would hold all programs up; revoke them some at a time"
     run_tool import "$BATS_FILE_TMPDIR/exported"
     expect 2 "" "vemo-access-token: $BATS_FILE_TMPDIR/exported: more than 10000 tokens would hold all programs up; nothing of \
 this file was imported; --in-steps lets them through"
