@@ -6,16 +6,10 @@
 #include "AccessTokenUtil.h"
 #include "internal/AccessTokenDbApi.h"
 #include "internal/AccessTokenLog.h"
+#include "internal/JsonAccess.h"
 #include "internal/JsonText.h"
 
-using VEMO_ACCESS_TOKEN::checkJsonType;
-using VEMO_ACCESS_TOKEN::checkPermission;
-using VEMO_ACCESS_TOKEN::ErrnoKeeper;
-using VEMO_ACCESS_TOKEN::fillDefaultValue;
-using VEMO_ACCESS_TOKEN::textOrNull;
-using VEMO_ACCESS_TOKEN::tokenGenerate;
-using VEMO_ACCESS_TOKEN::tokenType;
-using VEMO_ACCESS_TOKEN::toString;
+using namespace VEMO_ACCESS_TOKEN;
 
 namespace {
 
@@ -271,7 +265,7 @@ int AccessTokenApi::cleanExpireToken(bool blLogErr)
         return 0;
     }
     if (!m_pDb || 0 > m_pDb->cleanExpireToken(blLogErr)) {
-        if (VEMO_ACCESS_TOKEN::debugInfoGet()) {
+        if (debugInfoGet()) {
             VEMO_ATOKEN_FAIL("run fail 0 > m_pDb->cleanExpireToken(blLogErr)", VEMO_ATOKEN_HERE);
         }
         return -1;
@@ -311,11 +305,13 @@ Refused:
 int AccessTokenApi::tokenCountDegrade(Json::Value& jToken)
 {
     std::string strTid;
+    const Json::Value* pCount = nullptr;
     Json::Int64 nCount = 0;
 
     VEMO_ATOKEN_CHECK_GOTO(jToken.type() != Json::objectValue, Error);
-    VEMO_ATOKEN_CHECK_GOTO(!jToken.isMember("count"), Error);
-    nCount = jToken["count"].asInt64();
+    pCount = findMember(jToken, "count");
+    VEMO_ATOKEN_CHECK_GOTO_AS(!pCount, "!jToken.isMember(\"count\")", Error);
+    nCount = pCount->asInt64();
     if (0 > nCount) {
         return 0;
     }

@@ -12,28 +12,13 @@
 #include "internal/AccessTokenDbApi.h"
 #include "internal/AccessTokenLog.h"
 #include "internal/EffectiveUidKeeper.h"
-#include "internal/FieldType.h"
+#include "internal/Fields.h"
 #include "internal/JsonAccess.h"
 #include "internal/JsonText.h"
 #include "internal/SqlText.h"
 #include "plibc.h"
 
-using VEMO_ACCESS_TOKEN::appendTail;
-using VEMO_ACCESS_TOKEN::appendValue;
-using VEMO_ACCESS_TOKEN::debugInfoGet;
-using VEMO_ACCESS_TOKEN::EffectiveUidKeeper;
-using VEMO_ACCESS_TOKEN::ErrnoKeeper;
-using VEMO_ACCESS_TOKEN::fieldType;
-using VEMO_ACCESS_TOKEN::findMember;
-using VEMO_ACCESS_TOKEN::fromString;
-using VEMO_ACCESS_TOKEN::Rendering;
-using VEMO_ACCESS_TOKEN::renderingOf;
-using VEMO_ACCESS_TOKEN::SqlArgument;
-using VEMO_ACCESS_TOKEN::SqliteText;
-using VEMO_ACCESS_TOKEN::textOf;
-using VEMO_ACCESS_TOKEN::textOrNull;
-using VEMO_ACCESS_TOKEN::tokenType;
-using VEMO_ACCESS_TOKEN::toString;
+using namespace VEMO_ACCESS_TOKEN;
 
 namespace {
 
@@ -46,41 +31,25 @@ void waitForLock()
     usleep(LOCK_WAIT_USEC);
 }
 
-// Returns the record's member, and adds a missing one. Names of fields are not copied: records point at the
-// names in the library, which is therefore never unloaded.
-Json::Value& recordMember(Json::Value& jToken, const char* szName)
-{
-    static const Json::StaticString rgFieldName[] = {
-#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) Json::StaticString(#name),
-#include "internal/vemo-access-token-data-member"
-#undef VEMO_ATOKEN_DATA_MEMBER
-    };
-    for (const Json::StaticString& fieldName : rgFieldName) {
-        if (0 == strcmp(fieldName.c_str(), szName)) {
-            return jToken[fieldName];
-        }
-    }
-    return jToken[szName]; // a field that a caller has added to tokenType()
-}
-
-int FillField(Json::Value& jToken, char** column_name, char** column_value, int idx)
+int FillField(Json::Value& jToken, char** column_name, char** column_value, int idx, const Column& column)
 {
     VEMO_ATOKEN_CHECK_RETURN(jToken.type() != Json::objectValue && jToken.type() != Json::nullValue, -1);
     VEMO_ATOKEN_CHECK_RETURN(0 > idx, -1);
     const char* szName = column_name[idx];
-    const Json::Value* pType = fieldType(szName);
+    const Json::Value* pType = column.pEntry ? &(*column.pEntry)[0U] : fieldType(szName);
     VEMO_ATOKEN_CHECK_RETURN_AS(!pType, "!jTokenType.isMember(strName)", -1);
 
     const char* szValue = column_value[idx];
     const std::string_view strType = textOf(*pType);
+    Json::Value& jMember = column.pMember ? *column.pMember : jToken[szName];
     if (strType == "string") {
-        recordMember(jToken, szName) = szValue;
+        jMember = szValue;
     } else if (strType == "int") {
-        recordMember(jToken, szName) = static_cast<Json::Int>(strtol(szValue, nullptr, 10));
+        jMember = static_cast<Json::Int>(strtol(szValue, nullptr, 10));
     } else if (strType == "long long") {
-        recordMember(jToken, szName) = static_cast<Json::Int64>(strtoll(szValue, nullptr, 10));
+        jMember = static_cast<Json::Int64>(strtoll(szValue, nullptr, 10));
     } else if (Rendering::Json == renderingOf(strType)) {
-        fromString(szValue, recordMember(jToken, szName));
+        fromString(szValue, jMember);
     } else {
         VEMO_ATOKEN_FAIL("type error, strType=%s", VEMO_ATOKEN_HERE, pType->asString().c_str());
         return -1;
@@ -93,9 +62,12 @@ int FillToken(Json::Value* pjToken, int n_column, char** column_value, char** co
     int iTmp = 0;
 
     VEMO_ATOKEN_CHECK_RETURN(NULL == column_name || NULL == column_value, -1);
+    const auto rgColumn = addFields(*pjToken, n_column, column_name);
     for (int i = 0; i < n_column; ++i) {
         VEMO_ATOKEN_CHECK_RETURN(NULL == column_name[i] || NULL == column_value[i], -1);
-        VEMO_ATOKEN_CHECK_RETURN(0 > (iTmp = FillField(*pjToken, column_name, column_value, i)), -1);
+        const Column column = i < FIELDS ? rgColumn[static_cast<size_t>(i)] : Column();
+        VEMO_ATOKEN_CHECK_RETURN_AS(0 > (iTmp = FillField(*pjToken, column_name, column_value, i, column)),
+                                    "0 > (iTmp = FillField(*pjToken, column_name, column_value, i))", -1);
     }
     return 0;
 }
@@ -297,9 +269,10 @@ int AccessTokenDbApi::tokenSave(Json::Value& jParam, bool blCreate)
 
     VEMO_ATOKEN_DEBUG("tokenSave, blCreate=%d, jParam=%s", VEMO_ATOKEN_HERE, blCreate,
                       toString(jParam).c_str());
+    strSqlPrefix.reserve(256); // all of it, at once
+    const auto rgMember = fieldMembers(jParam);
 #define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
-    const Json::Value* p_##name = findMember(jParam, #name);                                                 \
-    if (!p_##name) {                                                                                         \
+    if (!rgMember[FIELD_##name]) {                                                                           \
         VEMO_ATOKEN_FAILED("!jParam.isMember(\"" #name "\")", VEMO_ATOKEN_HERE_IN_LIST);                     \
         return -1;                                                                                           \
     }
@@ -310,7 +283,8 @@ int AccessTokenDbApi::tokenSave(Json::Value& jParam, bool blCreate)
     strSqlPrefix.append(") VALUES (");
     VEMO_ATOKEN_CHECK_RETURN(0 > SqlExpandMemberSymbol(strSqlPrefix), -1);
 
-#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) , SqlArgument<renderingOf(type)>(*p_##name).get()
+#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
+    , SqlArgument<renderingOf(type)>(*rgMember[FIELD_##name]).get()
     const SqliteText szSql(sqlite3_mprintf(strSqlPrefix.c_str()
 #include "internal/vemo-access-token-data-member"
                                                ));
@@ -408,13 +382,11 @@ int AccessTokenDbApi::SqlMakeByMatchField(std::string& strField, Json::Value& jP
     const Json::Value* pType = fieldType(strField);
     VEMO_ATOKEN_CHECK_RETURN_AS(!pType, "!jTokenType.isMember(strField)", -1);
     const Rendering rendering = renderingOf(textOf(*pType));
-    if (!appendValue(rendering, jParam, strCondition)) {
-        VEMO_ATOKEN_FAILED(Rendering::Json == rendering
-                               ? "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.toString().c_str()))"
-                               : "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.asString().c_str()))",
-                           VEMO_ATOKEN_HERE);
-        return -1;
-    }
+    VEMO_ATOKEN_CHECK_RETURN_AS(!appendValue(rendering, jParam, strCondition),
+                                Rendering::Json == rendering
+                                    ? "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.toString().c_str()))"
+                                    : "NULL == (szSql = sqlite3_mprintf(\"%q\", jParam.asString().c_str()))",
+                                -1);
     strSqlWhereOut.append(strCondition);
     return 0;
 }
@@ -433,13 +405,12 @@ int AccessTokenDbApi::SqlMakeByListField(const char* szField, Json::Value& jList
     // There is no separator between the elements: 'a''b' is one text, a'b, and 12 one number. So only a
     // list of one element matches as intended. Callers depend on it.
     for (Json::ArrayIndex i = 0; i < jElements.size(); ++i) {
-        if (!appendValue(rendering, jElements[i], strList)) {
-            VEMO_ATOKEN_FAILED(Rendering::Json == rendering
-                                   ? "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].toString().c_str()))"
-                                   : "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].asString().c_str()))",
-                               VEMO_ATOKEN_HERE);
-            return -1;
-        }
+        VEMO_ATOKEN_CHECK_RETURN_AS(
+            !appendValue(rendering, jElements[i], strList),
+            Rendering::Json == rendering
+                ? "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].toString().c_str()))"
+                : "NULL == (szSql = sqlite3_mprintf(\"%q\", jList[i].asString().c_str()))",
+            -1);
     }
     if (!jList.empty()) {
         strSqlWhereOut.append(szField).append(" in (").append(strList).append(" )");
@@ -473,6 +444,7 @@ int AccessTokenDbApi::tokenGet(Json::Value& jTokenParam, Json::Value& jTokenArra
     std::string strSql;
     std::string strStatement = "SELECT ";
 
+    strStatement.reserve(512); // as a rule all of it, at once
     VEMO_ATOKEN_CHECK_RETURN(jTokenParam.type() != Json::objectValue, -1);
     VEMO_ATOKEN_CHECK_RETURN(
         jTokenArrayOut.type() != Json::nullValue && jTokenArrayOut.type() != Json::arrayValue, -1);
@@ -485,7 +457,7 @@ int AccessTokenDbApi::tokenGet(Json::Value& jTokenParam, Json::Value& jTokenArra
     if (!strSql.empty()) {
         strStatement.append(" WHERE ").append(strSql);
     }
-    m_strSql = strStatement.append(";");
+    m_strSql.swap(strStatement.append(";"));
 
     VEMO_ATOKEN_CHECK_RETURN(0 > runSql(FillList, &jTokenArrayOut), -1);
     if (!m_strErr.empty()) {
@@ -526,7 +498,7 @@ int AccessTokenDbApi::tokenDelete(Json::Value& jTokenParam, bool bAll)
     if (!strSql.empty()) {
         strStatement.append(" WHERE ").append(strSql);
     }
-    m_strSql = strStatement.append(";");
+    m_strSql.swap(strStatement.append(";"));
 
     VEMO_ATOKEN_CHECK_RETURN(0 > (err = runSql()), -1);
     if (!m_strErr.empty()) {

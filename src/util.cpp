@@ -4,7 +4,7 @@
 #include <ctime>
 
 #include "internal/AccessTokenLog.h"
-#include "internal/FieldType.h"
+#include "internal/Fields.h"
 #include "internal/JsonAccess.h"
 #include "internal/JsonText.h"
 #include "vemorandom.h"
@@ -15,12 +15,12 @@ std::atomic<bool> g_blLogToStdout(false);
 std::atomic<bool> g_blDebugInfo(false);
 
 struct TypeCheck {
-    const char* szType;
+    std::string_view strType;
     bool (Json::Value::*pAccepts)() const;
 };
 
 // These are more types than the fields have today, so that fields of any of them can be added.
-const TypeCheck g_rgTypeCheck[] = {
+constexpr TypeCheck g_rgTypeCheck[] = {
     {"int", &Json::Value::isIntegral},
     {"long long", &Json::Value::isIntegral},
     {"uid_t", &Json::Value::isIntegral},
@@ -34,7 +34,7 @@ const TypeCheck g_rgTypeCheck[] = {
 const TypeCheck* findTypeCheck(std::string_view strType)
 {
     for (const TypeCheck& check : g_rgTypeCheck) {
-        if (strType == check.szType) {
+        if (strType == check.strType) {
             return &check;
         }
     }
@@ -92,29 +92,27 @@ Json::Value& tokenType()
     return jTokenType;
 }
 
-const Json::Value* fieldType(std::string_view strField)
-{
-    const Json::Value* pEntry = findMember(tokenType(), strField);
-    return pEntry ? &(*pEntry)[0U] : nullptr;
-}
-
 int checkJsonType(Json::Value& jTokenParam)
 {
     VEMO_ATOKEN_CHECK_RETURN(!jTokenParam.isObject(), -1);
 
-    for (auto it = jTokenParam.begin(); it != jTokenParam.end(); ++it) {
-        const std::string strName = it.name();
-        const Json::Value* pType = fieldType(strName);
-        if (!pType) {
+    const Json::Value& jTypes = tokenType();
+    auto itType = jTypes.begin();
+    const auto typesEnd = jTypes.end();
+    const auto end = jTokenParam.end();
+    for (auto it = jTokenParam.begin(); it != end; ++it) {
+        const std::string_view strName = nameOf(it);
+        const Json::Value* pEntry = findNext(itType, typesEnd, strName);
+        if (!pEntry) {
             continue;
         }
-        const TypeCheck* pCheck = findTypeCheck(textOf(*pType));
+        const TypeCheck* pCheck = findTypeCheck(textOf((*pEntry)[0U]));
         if (!pCheck) {
-            VEMO_ATOKEN_FAIL("type not found!!, key=%s", VEMO_ATOKEN_HERE, strName.c_str());
+            VEMO_ATOKEN_FAIL("type not found!!, key=%s", VEMO_ATOKEN_HERE, strName.data());
             return -1;
         }
         if (!((*it).*pCheck->pAccepts)()) {
-            VEMO_ATOKEN_FAIL("type failed, jmList[i]=%s, jTokenParam=%s", VEMO_ATOKEN_HERE, strName.c_str(),
+            VEMO_ATOKEN_FAIL("type failed, jmList[i]=%s, jTokenParam=%s", VEMO_ATOKEN_HERE, strName.data(),
                              toString(jTokenParam).c_str());
             return -1;
         }
@@ -124,8 +122,9 @@ int checkJsonType(Json::Value& jTokenParam)
 
 int fillDefaultValue(Json::Value& jToken, bool blCheck)
 {
+    const auto rgMember = fieldMembers(jToken);
 #define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value)                                                   \
-    if (!findMember(jToken, #name)) {                                                                        \
+    if (!rgMember[FIELD_##name]) {                                                                           \
         if (blCheck) {                                                                                       \
             VEMO_ATOKEN_LOG("lost data member=%s", VEMO_ATOKEN_HERE_IN_LIST, #name);                         \
             return -1;                                                                                       \

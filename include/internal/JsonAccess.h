@@ -15,6 +15,26 @@ inline const Json::Value* findMember(const Json::Value& jObject, std::string_vie
     return jObject.find(strName.data(), strName.data() + strName.size());
 }
 
+// Returns the member's name at an iterator of an object. The object owns it; a NUL follows it.
+inline std::string_view nameOf(const Json::ValueIteratorBase& it)
+{
+    const char* szEnd = nullptr;
+    const char* szBegin = it.memberName(&szEnd);
+    return {szBegin, static_cast<size_t>(szEnd - szBegin)};
+}
+
+// Finds a member from the iterator it on, and moves it past the member. Faster than findMember for one name
+// after the other, in the order of an object's members, which is that of their names.
+inline const Json::Value* findNext(Json::Value::const_iterator& it, const Json::Value::const_iterator& end,
+                                   std::string_view strName)
+{
+    int nOrder = 1;
+    while (it != end && 0 < (nOrder = strName.compare(nameOf(it)))) {
+        ++it;
+    }
+    return 0 == nOrder ? &*it++ : nullptr;
+}
+
 // Returns the text of a string, or an empty text for any other value. The value owns it.
 inline std::string_view textOf(const Json::Value& jValue)
 {

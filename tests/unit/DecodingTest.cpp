@@ -1,5 +1,6 @@
 // Rows of the database as records.
 
+#include <algorithm>
 #include <climits>
 #include <new>
 
@@ -351,6 +352,47 @@ TEST_F(Decoding, AppendsEachRowAsAFreshRecord)
     EXPECT_EQ(
         json(R"(["first",{"tid":"a","count":2},{"uid":3},{},{},{},{"count":2,"extra":{}},{"extra":null}])"),
         m_jArray);
+}
+
+// The library decodes a row of all fields in a faster way, of which nothing may show.
+TEST_F(Decoding, TakesARowOfAllFieldsAsAnyOther)
+{
+    Row row;
+    for (const Field& field : fields()) {
+        row.names.push_back(field.szName);
+        row.values.push_back("7");
+    }
+    Row reversed = row;
+    std::reverse(reversed.names.begin(), reversed.names.end());
+    Row more = row;
+    more.names.push_back("count");
+    more.values.push_back("8");
+    Row unnamed = row;
+    unnamed.names.back() = nullptr;
+    Row withoutValue = row;
+    withoutValue.values.back() = nullptr;
+
+    const Json::Value jRecord =
+        json(R"({"tid":"7","bind_sid":"7","uid":7,"deadline":7,"count":7,"create_time":7,
+                                         "function":"7","webapi_allow":7,"extra":7})");
+    Json::Value jMore = jRecord;
+    jMore["count"] = 8;
+    Json::Value jText = jRecord;
+    jText["extra"] = "7";
+    EXPECT_EQ(0, decode(row));
+    EXPECT_EQ(0, decode(reversed));
+    EXPECT_EQ(0, decode(more));
+    tokenType()["extra"][0] = "string";
+    EXPECT_EQ(0, decode(row));
+    EXPECT_EQ((std::vector<Json::Value>{jRecord, jRecord, jMore, jText}),
+              std::vector<Json::Value>(m_jArray.begin(), m_jArray.end()));
+
+    expectRefused(unnamed, allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED}));
+    expectRefused(withoutValue, allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED}));
+    tokenType()["extra"][0] = "bool";
+    expectRefused(row, columnLines(fail(STORE, "type error, strType=bool")));
+    tokenType().removeMember("extra");
+    expectRefused(row, columnLines(failed(STORE, NO_FIELD)));
 }
 
 // A row that another program made: any value in any column, and the column's default time, which is text.

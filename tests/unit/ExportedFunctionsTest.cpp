@@ -11,6 +11,7 @@
 #include <filesystem>
 #include <thread>
 
+#include "AccessTokenUtil.h"
 #include "Statements.h"
 #include "StoreTest.h"
 #include "vemo-access-token.h"
@@ -391,13 +392,20 @@ bool isGranted()
 
 TEST_F(Exported, GrantInHandlersAtTheEndOfTheProcess)
 {
-    EXPECT_EXIT(
-        {
-            isGranted();
-            atexit([] { _exit(isGranted() ? 0 : 1); });
-            exit(2);
-        },
-        ::testing::ExitedWithCode(0), "");
+    const auto grantAtExit = [] { atexit([] { _exit(isGranted() ? 0 : 1); }); };
+    query("UPDATE token SET count = -1");
+    // The library keeps something from the first grant on, also for a handler that was there before it.
+    for (const bool blBefore : {false, true}) {
+        EXPECT_EXIT(
+            {
+                VEMO_ACCESS_TOKEN::tokenType();
+                blBefore ? grantAtExit() : void();
+                isGranted();
+                blBefore ? void() : grantAtExit();
+                exit(2);
+            },
+            ::testing::ExitedWithCode(0), "");
+    }
 }
 
 // Grants when it is destroyed.
