@@ -72,10 +72,15 @@ void Store::grow(int nTokens)
 
 void Store::makeIndexes()
 {
-    use();
-    BareEngine().run("CREATE INDEX token_deadline ON token (deadline);"
-                     "CREATE INDEX token_bind_sid ON token (bind_sid);"
+    makeDeadlineIndex();
+    BareEngine().run("CREATE INDEX token_bind_sid ON token (bind_sid);"
                      "CREATE INDEX token_function ON token (function);");
+}
+
+void Store::makeDeadlineIndex()
+{
+    use();
+    BareEngine().run("CREATE INDEX token_deadline ON token (deadline);");
 }
 
 void Store::useWriteAheadLog()

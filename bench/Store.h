@@ -29,8 +29,10 @@ public:
     // Adds tokens until there are nTokens.
     void grow(int nTokens);
 
-    // What an administrator can do (`vemo-access-token tune`).
+    // What an administrator may do from outside: all that "tune" or "tune --wal" does, and what "tune
+    // --deadline-only" does.
     void makeIndexes();
+    void makeDeadlineIndex();
     void useWriteAheadLog();
 
     const std::string& directory() const { return m_strDirectory; }

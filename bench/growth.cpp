@@ -1,12 +1,14 @@
-// What a grant costs as the number of tokens grows, without and with an administrator's indexes.
+// What a grant costs as the number of tokens grows, without and with an administrator's indexes, and what
+// the indexes cost that only deletions use.
 //
-// Calls alternate with calls on a store of ten tokens, so that changes of the machine's speed do not change
-// the ratio. The first call after a change of the store does not count: the processor's caches hold the other
-// one.
+// A store takes turns with one of ten tokens, or of fewer indexes, so that the ratio of the two is not that
+// of two moments of the machine. The call that comes first in a turn finds the processor's caches as the
+// other store left them, and does not count.
 
 #include <benchmark/benchmark.h>
 
 #include <algorithm>
+#include <fstream>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -62,11 +64,62 @@ void growth(benchmark::State& state, Place place, bool blIndexes, int nTokens)
     state.counters["ratio"] = many.percentile(50) / few.percentile(50);
 }
 
+// The bytes that this process has written, as the kernel counts them.
+double bytesWritten()
+{
+    std::ifstream file("/proc/self/io");
+    std::string strName;
+    double dBytes = 0;
+    while (file >> strName >> dBytes && strName != "wchar:") {
+    }
+    return dBytes;
+}
+
+// Grants and deletions with the index on the deadline alone beside those with all three.
+void indexes(benchmark::State& state, Place place, int nTokens)
+{
+    const auto pOne = makeStore(place, false, nTokens);
+    pOne->makeDeadlineIndex();
+    const auto pThree = makeStore(place, true, nTokens);
+    Samples grants[2];
+    Samples deletions[2];
+    Samples written[2];
+    Samples firsts;
+    int nCall = 0;
+    for (auto _ : state) {
+        for (const bool blThree : {false, true}) {
+            const Store& store = blThree ? *pThree : *pOne;
+            store.use();
+            deletions[blThree].time(
+                [] { return VemoAccessTokenDeleteByBindSid("a session without tokens"); });
+            grant(store, nCall * 7919 % nTokens, firsts);
+            const double dBefore = bytesWritten();
+            grant(store, (nCall + 1) * 7919 % nTokens, grants[blThree]);
+            written[blThree].add(bytesWritten() - dBefore);
+        }
+        nCall += 2;
+        state.SetIterationTime(grants[true].last());
+    }
+    for (const bool blThree : {false, true}) {
+        const std::string strPrefix = blThree ? "three_" : "one_";
+        state.counters[strPrefix + "us"] = grants[blThree].percentile(50) * 1e6;
+        state.counters[strPrefix + "kB"] = written[blThree].percentile(50) / 1e3;
+        state.counters[strPrefix + "delete_us"] = deletions[blThree].percentile(50) * 1e6;
+    }
+}
+
 } // namespace
 
 void registerBenchmarks()
 {
     for (const Place place : {Place::Memory, Place::Disk}) {
+        for (const int nTokens : {1000, 10000, 100000}) {
+            const std::string strName =
+                std::string("Growth/") + nameOf(place) + "/indexes/" + std::to_string(nTokens);
+            benchmark::RegisterBenchmark(strName.c_str(), indexes, place, nTokens)
+                ->UseManualTime()
+                ->Iterations(300);
+        }
         for (const bool blIndexes : {false, true}) {
             for (const int nTokens : {10, 100, 1000, 10000, 100000, 1000000}) {
                 const std::string strName = std::string("Growth/") + nameOf(place) +

@@ -197,6 +197,18 @@ def growth_table(results):
          for tokens in ("10", "100", "1000", "10000", "100000", "1000000")])
 
 
+def indexes_table(results):
+    rows = []
+    for (place, kind, tokens), cell in results["growth"].cells.items():
+        if kind == "indexes":
+            rows.append([f"{int(tokens):,}, {place}", microseconds(cell["one_us"]), microseconds(cell["three_us"]),
+                         f"{cell['three_us'] / cell['one_us']:.2f}", f"{cell['one_kB']:.0f} kB",
+                         f"{cell['three_kB']:.0f} kB", microseconds(cell["one_delete_us"]),
+                         microseconds(cell["three_delete_us"])])
+    return table(["Tokens", "grant, one index", "three", "ratio", "written, one", "three", "deletion, one", "three"],
+                 rows)
+
+
 def contention_table(results):
     return table(
         ["Journal", "Calls", "Processes", "Grants/s", "Median", "99th percentile", "Failed", "False failures",
@@ -325,6 +337,7 @@ def main():
          + breakdown_table(results, "System calls", ("opens", "closes", "reads", "writes", "syncs", "locks", "unlinks",
                                                     "stats", "others"))),
         ("Growth", growth_table(results)),
+        ("Indexes", indexes_table(results)),
         ("Contention", contention_table(results)),
     ]
     plot_overhead(results, directory)
