@@ -22,6 +22,7 @@ const char* const INDEXED[] = {"deadline", "bind_sid", "function"};
 const int MEASUREMENTS = 5;
 
 struct Options {
+    bool blDeadlineOnly = false;
     bool blWal = false;
     bool blUndo = false;
     bool blDryRun = false;
@@ -71,11 +72,12 @@ Figures measured(Store& store, bool blWrite)
     return lines;
 }
 
-std::string indexStatement(const std::string& strField, bool blUndo)
+std::string indexStatement(const std::string& strField, const Options& options)
 {
     const std::string strName = "token_" + strField;
-    return blUndo ? "DROP INDEX IF EXISTS " + strName
-                  : "CREATE INDEX IF NOT EXISTS " + strName + " ON token (" + strField + ")";
+    const bool blWanted = !options.blUndo && (!options.blDeadlineOnly || strField == "deadline");
+    return blWanted ? "CREATE INDEX IF NOT EXISTS " + strName + " ON token (" + strField + ")"
+                    : "DROP INDEX IF EXISTS " + strName;
 }
 
 // The journal first: other programs' connections can stand in its way, and then nothing has changed.
@@ -87,7 +89,7 @@ std::vector<std::string> statements(const Options& options)
     }
     strStatements.push_back("BEGIN IMMEDIATE");
     for (const std::string strField : INDEXED) {
-        strStatements.push_back(indexStatement(strField, options.blUndo));
+        strStatements.push_back(indexStatement(strField, options));
     }
     strStatements.push_back("COMMIT");
     return strStatements;
@@ -165,10 +167,13 @@ void addTune(Commands& commands)
     auto pOptions = std::make_shared<Options>();
     Command& command = commands.add("tune", "add indexes for a large store; says before and after, measured",
                                     [pOptions] { return tune(*pOptions); });
+    command.flag("--deadline-only", pOptions->blDeadlineOnly,
+                 "no index but that on the deadline, for programs that never delete by session or purpose");
     command.flag("--wal", pOptions->blWal,
                  "the write-ahead journal too, for programs that hold their connection");
     command.flag("--undo", pOptions->blUndo, "remove the indexes and the write-ahead journal");
     command.exclude("--undo", "--wal");
+    command.exclude("--undo", "--deadline-only");
     command.flag("--dry-run", pOptions->blDryRun, "only measure, and tell what would be run");
     command.flag("--no-header", pOptions->blNoHeader, "no line of titles above the table");
     command.example("--dry-run");

@@ -173,7 +173,7 @@ nothing --d                          => nothing,--d'
 
 @test "zsh completes commands, options, values and files, and neither ids nor free texts" {
     # Nor an option that an earlier one excludes.
-    completes zsh 'vemo-access-token tune --wal --|--dry-run|--help|--no-header|--verbose|--version
+    completes zsh 'vemo-access-token tune --wal --|--deadline-only|--dry-run|--help|--no-header|--verbose|--version
 vemo-access-token update x --allow A --ttl 1h --|--allow|--bind-sid|--extra|--help|--note|--unlimited|--uses|--verbose|--version'
 }
 

@@ -31,7 +31,7 @@ without_times()
     sed -E 's/[0-9]+\.[0-9][0-9] ms/T/g; s/  +/|/g; s/\|$//' <<<"$output"
 }
 
-# expect_change INDEX INDEX JOURNAL JOURNAL [OTHERS]: the last run told whether there was an index on the
+# expect_change INDEX INDEX JOURNAL JOURNAL [OTHERS [OTHERS]]: the last run told whether there was an index on the
 # deadline (and OTHERS, if they differ) and what the journal was, before and after
 expect_change()
 {
@@ -42,8 +42,8 @@ look for a session's tokens|T|T
 look for a purpose's tokens|T|T
 journal|$3|$4
 index token_deadline|$1|$2
-index token_bind_sid|${5-$1}|$2
-index token_function|${5-$1}|$2
+index token_bind_sid|${5-$1}|${6-$2}
+index token_function|${5-$1}|${6-$2}
 write a small change|T|T" ]
 }
 
@@ -77,6 +77,18 @@ ok" ]
     expect_change no no delete delete
     expect_tokens
     [ "$(sql "PRAGMA user_version")" -eq 7 ]
+}
+
+@test "tune --deadline-only makes the index that grants need, and drops the others" {
+    a_store
+    local before
+    for before in no yes; do
+        run_tool tune --deadline-only
+        expect_change $before yes delete delete $before no
+        [ "$(indexes)" = token_deadline:deadline ]
+        tool tune
+    done
+    expect_tokens
 }
 
 @test "tune --wal sets the write-ahead journal, too" {
@@ -169,6 +181,7 @@ $(echo -e "$statements")" ]
             [ "$(ls -A "$VEMO_REDIRECT_DIR")" = vemo-access-token.db ]
         done <<TABLE
 |${CREATED//$'\n'/\\n}
+--deadline-only|would run: BEGIN IMMEDIATE\\nwould run: CREATE INDEX IF NOT EXISTS token_deadline ON token (deadline)\\nwould run: DROP INDEX IF EXISTS token_bind_sid\\nwould run: DROP INDEX IF EXISTS token_function\\nwould run: COMMIT
 --wal|would run: PRAGMA journal_mode = wal\\n${CREATED//$'\n'/\\n}
 --undo|would run: PRAGMA journal_mode = delete\\nwould run: BEGIN IMMEDIATE\\nwould run: DROP INDEX IF EXISTS token_deadline\\nwould run: DROP INDEX IF EXISTS token_bind_sid\\nwould run: DROP INDEX IF EXISTS token_function\\nwould run: COMMIT
 TABLE

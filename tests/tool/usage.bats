@@ -94,7 +94,7 @@ export|--uid --user --function --bind-sid --created-before --created-after --ope
 import|--partial --skip-existing --in-steps
 init|
 doctor|--repair -o,--output
-tune|--wal --undo --dry-run --no-header
+tune|--deadline-only --wal --undo --dry-run --no-header
 help|
 TABLE
 }
@@ -226,6 +226,7 @@ stats --prometheus -o metrics|--prometheus excludes --output
 stats VPN|unexpected argument "VPN"
 tune --wal --undo|--wal excludes --undo
 tune --undo --wal --dry-run|--undo excludes --wal
+tune --undo --deadline-only|--undo excludes --deadline-only
 tune deadline|unexpected argument "deadline"
 tune -o|unknown option "-o"
 list --sort $'a\e[31m\nb\x7f'|--sort: "a\x1b[31m\x0ab\x7f" is not a field of a token

@@ -39,7 +39,7 @@ _vemo_access_token()
         purge) options='--dry-run' ;;
         stats) options="--prometheus $table_form" ;;
         doctor) options="--repair $form" ;;
-        tune) options='--wal --undo --dry-run --no-header' ;;
+        tune) options='--deadline-only --wal --undo --dry-run --no-header' ;;
         import) options='--partial --skip-existing --in-steps' ;;
         export) options=$selection ;;
         generate | init | help) options= ;;

@@ -119,6 +119,7 @@ __vemo_access_token_option import in-steps 'Let programs through in between'
 
 __vemo_access_token_option doctor repair 'Repair what can be'
 
+__vemo_access_token_option tune deadline-only 'No index but that on the deadline'
 __vemo_access_token_option tune wal 'The write-ahead journal too'
 __vemo_access_token_option tune undo 'Remove the indexes and the write-ahead journal'
 __vemo_access_token_option tune dry-run 'Only measure, and tell what would be run'
