@@ -3,9 +3,11 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <functional>
 #include <memory>
 #include <set>
+#include <thread>
 
 #include "Arguments.h"
 #include "ChangedTokens.h"
@@ -16,7 +18,9 @@
 
 namespace {
 
-const size_t NAMED_MAX = 5000; // one transaction of so many holds others up for less than a second
+const size_t NAMES_MAX = 100000;                   // which take 100 MB
+const size_t NAMES_OF_A_STEP = 1000;               // one transaction
+const std::chrono::milliseconds BETWEEN_STEPS(12); // programs that wait for the database try each 10 ms
 
 struct RevokeOptions {
     std::vector<std::string> strTids;
@@ -53,44 +57,91 @@ struct Named {
     uint64_t nUnknown = 0;
 };
 
-Named findNamed(tool::Store& store, const std::vector<std::string>& strNames)
+// The failure of a step, which tells what became of that, behind others.
+tool::Failure ofStep(const tool::Failure& failure, uint64_t nRemoved)
+{
+    return 0 == nRemoved ? failure
+                         : tool::Failure(failure.status(), failure.what(),
+                                         tool::countText(nRemoved, "token") +
+                                             " were gone before that; repeat the command for the rest");
+}
+
+// before: names of those are not unknown, though they are there no longer.
+Named findNamed(tool::Store& store, const std::vector<std::string>& strNames, const Named& before)
 {
     Named named;
     for (const std::string& strName : strNames) {
         const auto jToken = store.findByPrefix(strName);
+        const auto pBefore = before.strTids.lower_bound(strName);
         if (jToken) {
             named.strTids.insert((*jToken)["tid"].asString());
-        } else {
+        } else if (before.strTids.end() == pBefore || 0 != pBefore->compare(0, strName.size(), strName)) {
             ++named.nUnknown;
         }
     }
     return named;
 }
 
+void add(Named& named, Named more)
+{
+    named.strTids.merge(more.strTids);
+    named.nUnknown += more.nUnknown;
+}
+
+// Calls use() with some names after the others, and lets other programs through.
+template <typename Use>
+void eachStep(const std::vector<std::string>& strNames, Use use)
+{
+    for (size_t i = 0; i < strNames.size(); i += NAMES_OF_A_STEP) {
+        if (0 != i) {
+            std::this_thread::sleep_for(BETWEEN_STEPS);
+        }
+        const auto pFirst = strNames.begin() + static_cast<std::ptrdiff_t>(i);
+        const size_t nNames = std::min(NAMES_OF_A_STEP, strNames.size() - i);
+        use(std::vector<std::string>(pFirst, pFirst + static_cast<std::ptrdiff_t>(nNames)));
+    }
+}
+
 Named lookUpNamed(const std::vector<std::string>& strNames)
 {
-    tool::Store store(tool::Store::Access::Read);
-    return findNamed(store, strNames);
+    Named named;
+    eachStep(strNames, [&named](const std::vector<std::string>& strSome) {
+        tool::Store store(tool::Store::Access::Read);
+        add(named, findNamed(store, strSome, named));
+    });
+    return named;
 }
 
 Named removeNamed(const std::vector<std::string>& strNames)
 {
-    tool::Store store(tool::Store::Access::Write);
-    const Named named = findNamed(store, strNames);
-    for (const std::string& strTid : named.strTids) {
-        store.removeTid(strTid);
+    if (strNames.size() > NAMES_OF_A_STEP) {
+        lookUpNamed(strNames); // a name that stands for several fails before any is gone
     }
-    store.commit();
-    return named;
+    Named removed;
+    eachStep(strNames, [&removed](const std::vector<std::string>& strSome) {
+        Named now;
+        try {
+            tool::Store store(tool::Store::Access::Write);
+            now = findNamed(store, strSome, removed);
+            for (const std::string& strTid : now.strTids) {
+                store.removeTid(strTid);
+            }
+            store.commit();
+        } catch (const tool::Failure& failure) {
+            throw ofStep(failure, removed.strTids.size());
+        }
+        add(removed, std::move(now));
+    });
+    return removed;
 }
 
 int revokeNamed(const RevokeOptions& options)
 {
     const std::vector<std::string> strNames = readAll(options.strTids);
-    if (strNames.size() > NAMED_MAX) {
+    if (strNames.size() > NAMES_MAX) {
         throw tool::Failure(tool::EXIT_STATUS_USAGE,
-                            "TID: more than " + std::to_string(NAMED_MAX) + " ids would hold all programs up",
-                            "revoke them some at a time");
+                            "TID: there are more than " + std::to_string(NAMES_MAX) + " ids",
+                            "revoke them some at a time, or by what they have in common");
     }
     const Named named = options.blDryRun ? lookUpNamed(strNames) : removeNamed(strNames);
     if (!options.blDryRun && !named.strTids.empty()) {
@@ -151,12 +202,7 @@ uint64_t removeInSteps(const std::string& strTitle, const std::string& strWhere,
             progress.step(nNow);
         }
     } catch (const tool::Failure& failure) {
-        if (0 == nRemoved) {
-            throw;
-        }
-        throw tool::Failure(failure.status(), failure.what(), // which tells what became of its own step
-                            tool::countText(nRemoved, "token") +
-                                " were gone before that; repeat the command for the rest");
+        throw ofStep(failure, nRemoved);
     }
     return nRemoved;
 }
