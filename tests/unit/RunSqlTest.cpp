@@ -244,7 +244,9 @@ TEST_F(RunSql, PurgeTakesDeadlinesBeforeNow)
         EXPECT_EQ(0, m_db.cleanExpireToken(false)); // with none to delete
         for (const bool blLog : {false, true}) {
             insert(R"({"tid":"old","deadline":-1})");
+            seam().calls.clear();
             EXPECT_EQ(0, api().cleanExpireToken(blLog));
+            EXPECT_EQ((Texts{PURGE}), seam().statements());
             EXPECT_EQ("", countOf("old"));
         }
     }
