@@ -18,95 +18,12 @@ const char* const BAD_METHOD =
     "jToken[\"webapi_allow\"][szWebapiName][\"method\"].type() != Json::arrayValue";
 
 // Two APIs and two methods of one of them; compact, since log lines show it.
-const char* const RECORD = R"({"webapi_allow":{"A":{"method":["get","list"]},"Empty":{"method":[]}}})";
+const std::string RECORD = R"({"webapi_allow":{"A":{"method":["get","list"]},"Empty":{"method":[]}}})";
 
-struct Case {
-    const char* szRecord;
-    const char* szApi;
-    const char* szMethod;
-    int nResult;
-    const char* szCondition = nullptr; // of the failure line, when there is one
-};
-
-const Case CASES[] = {
-    {RECORD, "A", "get", 1},
-    {RECORD, "A", "list", 1},
-    {RECORD, "A", "set", 0},
-    {RECORD, "A", "Get", 0},
-    {RECORD, "A", "ge", 0},
-    {RECORD, "A", "gets", 0},
-    {RECORD, "A", "get ", 0},
-    {RECORD, "A", "*", 0},
-    {RECORD, "A", "%s%n%m", 0},
-    {RECORD, "Empty", "get", 0},
-    // Without a method, an API that is listed is enough.
-    {RECORD, "A", nullptr, 1},
-    {RECORD, "A", "", 1},
-    {RECORD, "Empty", nullptr, 1},
-    {R"({"webapi_allow":{"A":["get"]}})", "A", nullptr, 1},
-    {R"({"webapi_allow":{"A":null}})", "A", "", 1},
-    {R"({"webapi_allow":{"A":{}}})", "A", nullptr, 1},
-    {R"({"webapi_allow":{"A":{"method":"get"}}})", "A", "", 1},
-    {R"({"webapi_allow":{"A":{"method":["*"]}}})", "A", "get", 0},
-    {R"({"webapi_allow":{"A":{"method":[""]}}})", "A", "get", 0},
-    {R"({"webapi_allow":{"A":{"method":["get\u0000"]}}})", "A", "get", 0},
-    {R"({"webapi_allow":{"A":{"method":["get","get"]}}})", "A", "get", 1},
-    {R"({"webapi_allow":{"A":{"method":["get"],"methods":["set"]}}})", "A", "set", 0},
-    // Elements are read as text, up to the one that matches.
-    {R"({"webapi_allow":{"A":{"method":[5,"get",{}]}}})", "A", "5", 1},
-    {R"({"webapi_allow":{"A":{"method":[5,"get",{}]}}})", "A", "get", 1},
-    // Nothing but webapi_allow is looked at.
-    {R"({"count":0,"deadline":-1,"tid":5,"webapi_allow":{"A":{"method":["get"]}}})", "A", "get", 1},
-
-    {RECORD, "B", "get", -1},
-    {RECORD, "B", nullptr, -1},
-    {RECORD, "a", "get", -1},
-    {RECORD, "Emp", "get", -1},
-    {RECORD, "Empty2", "get", -1},
-    {RECORD, "%s%n", "%m", -1},
-    {R"({"webapi_allow":{"A\u0000":{"method":["get"]}}})", "A", "get", -1},
-    {R"({"webapi_allow":{}})", "A", "get", -1},
-    {R"({"A":{"method":["get"]},"webapi_allow":{}})", "A", "get", -1},
-
-    {"null", "A", "get", -1, NO_OBJECT},
-    {"[]", "A", "get", -1, NO_OBJECT},
-    {R"("webapi_allow")", "A", "get", -1, NO_OBJECT},
-    {"null", nullptr, nullptr, -1, NO_OBJECT},
-    {RECORD, nullptr, "get", -1, NO_NAME},
-    {RECORD, "", "get", -1, NO_NAME},
-    {RECORD, nullptr, nullptr, -1, NO_NAME},
-    {R"({"webapi_allow":{"":{"method":["get"]}}})", "", "get", -1, NO_NAME},
-    {"{}", nullptr, "get", -1, NO_NAME},
-    {"{}", "A", "get", -1, NO_ALLOW},
-    {R"({"extra":{}})", "A", "", -1, NO_ALLOW},
-    {R"({"webapi_allow":null})", "A", "get", -1, BAD_ALLOW},
-    {R"({"webapi_allow":["A"]})", "A", "get", -1, BAD_ALLOW},
-    {R"({"webapi_allow":"{}"})", "A", nullptr, -1, BAD_ALLOW},
-    {R"({"webapi_allow":{"A":null}})", "A", "get", -1, BAD_ENTRY},
-    {R"({"webapi_allow":{"A":["get"]}})", "A", "get", -1, BAD_ENTRY},
-    {R"({"webapi_allow":{"A":{}}})", "A", "get", -1, NO_METHOD},
-    {R"({"webapi_allow":{"A":{"Method":["get"]}}})", "A", "get", -1, NO_METHOD},
-    {R"({"webapi_allow":{"A":{"method":null}}})", "A", "get", -1, BAD_METHOD},
-    {R"({"webapi_allow":{"A":{"method":"get"}}})", "A", "get", -1, BAD_METHOD},
-    {R"({"webapi_allow":{"A":{"method":{"get":1}}}})", "A", "get", -1, BAD_METHOD},
-};
-
-// What is logged of a case.
-Texts linesOf(const Case& row, bool blDebug, int nErrno)
+// A record whose API A has this entry.
+std::string entry(const std::string& strEntry)
 {
-    Texts lines = row.szCondition ? Texts{failed(UTIL, row.szCondition, nErrno)} : Texts{};
-    if (!blDebug || 1 == row.nResult) {
-        return lines;
-    }
-    if (!row.szCondition) {
-        const std::string strMethod = 0 == row.nResult ? std::string(" , method=") + row.szMethod + "," : "";
-        lines.push_back(ordinary(UTIL, std::string("webapi=") + row.szApi + strMethod +
-                                           " not in allow list, jToken=" + row.szRecord));
-    }
-    if (-1 == row.nResult) {
-        lines.push_back(ordinary(UTIL, std::string("jToken=") + row.szRecord));
-    }
-    return lines;
+    return R"({"webapi_allow":{"A":)" + strEntry + "}}";
 }
 
 class Permission : public SeamTest {};
@@ -115,18 +32,84 @@ TEST_F(Permission, IsDecidedAndExplainedInDebugMode)
 {
     for (const bool blDebug : {false, true}) {
         debugInfo(blDebug);
-        for (const Case& row : CASES) {
-            const int nErrno = blDebug ? EACCES : 0;
-            SCOPED_TRACE(::testing::Message()
-                         << row.szRecord << " " << (row.szApi ? row.szApi : "(null)") << " "
-                         << (row.szMethod ? row.szMethod : "(null)") << " " << blDebug);
-            Json::Value jToken = json(row.szRecord);
+        const int nErrno = blDebug ? EACCES : 0;
+        // szCondition is that of the failure line, when there is one.
+        const auto decides = [&](const std::string& strRecord, const char* szApi, const char* szMethod,
+                                 int nResult, const char* szCondition = nullptr) {
+            SCOPED_TRACE(::testing::Message() << strRecord << " " << (szApi ? szApi : "(null)") << " "
+                                              << (szMethod ? szMethod : "(null)") << " " << blDebug);
+            Texts lines = szCondition ? Texts{failed(UTIL, szCondition, nErrno)} : Texts{};
+            if (blDebug && 1 != nResult && !szCondition) {
+                const std::string strMethod = 0 == nResult ? std::string(" , method=") + szMethod + "," : "";
+                lines.push_back(ordinary(UTIL, std::string("webapi=") + szApi + strMethod +
+                                                   " not in allow list, jToken=" + strRecord));
+            }
+            if (blDebug && -1 == nResult) {
+                lines.push_back(ordinary(UTIL, "jToken=" + strRecord));
+            }
+            Json::Value jToken = json(strRecord);
             errno = nErrno;
-            EXPECT_EQ(row.nResult, checkPermission(jToken, row.szApi, row.szMethod));
+            EXPECT_EQ(nResult, checkPermission(jToken, szApi, szMethod));
             EXPECT_EQ(nErrno, errno);
-            EXPECT_LINES(linesOf(row, blDebug, nErrno));
-            EXPECT_EQ(json(row.szRecord), jToken);
+            EXPECT_LINES(lines);
+            EXPECT_EQ(json(strRecord), jToken);
+        };
+        decides(RECORD, "A", "get", 1);
+        decides(RECORD, "A", "list", 1);
+        for (const char* szMethod : {"set", "Get", "ge", "gets", "get ", "*", "%s%n%m"}) {
+            decides(RECORD, "A", szMethod, 0);
         }
+        decides(RECORD, "Empty", "get", 0);
+        decides(entry(R"({"method":["*"]})"), "A", "get", 0);
+        decides(entry(R"({"method":[""]})"), "A", "get", 0);
+        decides(entry(R"({"method":["get\u0000"]})"), "A", "get", 0);
+        decides(entry(R"({"method":["get","get"]})"), "A", "get", 1);
+        decides(entry(R"({"method":["get"],"methods":["set"]})"), "A", "set", 0);
+        // Elements are read as text, up to the one that matches.
+        decides(entry(R"({"method":[5,"get",{}]})"), "A", "5", 1);
+        decides(entry(R"({"method":[5,"get",{}]})"), "A", "get", 1);
+        // Nothing but webapi_allow is looked at.
+        decides(R"({"count":0,"deadline":-1,"tid":5,"webapi_allow":{"A":{"method":["get"]}}})", "A", "get",
+                1);
+
+        for (const char* szApi : {"B", "a", "Emp", "Empty2", "%s%n"}) {
+            decides(RECORD, szApi, "get", -1);
+            decides(RECORD, szApi, nullptr, -1);
+        }
+        decides(R"({"webapi_allow":{"A\u0000":{"method":["get"]}}})", "A", "get", -1);
+        decides(R"({"webapi_allow":{}})", "A", "get", -1);
+        decides(R"({"A":{"method":["get"]},"webapi_allow":{}})", "A", "get", -1);
+
+        for (const char* szRecord : {"null", "[]", R"("webapi_allow")"}) {
+            decides(szRecord, "A", "get", -1, NO_OBJECT);
+            decides(szRecord, nullptr, nullptr, -1, NO_OBJECT);
+        }
+        decides(RECORD, nullptr, "get", -1, NO_NAME);
+        decides(RECORD, "", "get", -1, NO_NAME);
+        decides(RECORD, nullptr, nullptr, -1, NO_NAME);
+        decides(R"({"webapi_allow":{"":{"method":["get"]}}})", "", "get", -1, NO_NAME);
+        decides("{}", nullptr, "get", -1, NO_NAME);
+        decides("{}", "A", "get", -1, NO_ALLOW);
+        decides(R"({"extra":{}})", "A", "", -1, NO_ALLOW);
+        decides(R"({"webapi_allow":null})", "A", "get", -1, BAD_ALLOW);
+        decides(R"({"webapi_allow":["A"]})", "A", "get", -1, BAD_ALLOW);
+        decides(R"({"webapi_allow":"{}"})", "A", nullptr, -1, BAD_ALLOW);
+        // Without a method, an API that is listed is enough, whatever its entry is.
+        const std::pair<const char*, const char*> entries[] = {
+            {"null", BAD_ENTRY},
+            {R"(["get"])", BAD_ENTRY},
+            {"{}", NO_METHOD},
+            {R"({"Method":["get"]})", NO_METHOD},
+            {R"({"method":null})", BAD_METHOD},
+            {R"({"method":"get"})", BAD_METHOD},
+            {R"({"method":{"get":1}})", BAD_METHOD},
+        };
+        for (const auto& [szEntry, szCondition] : entries) {
+            decides(entry(szEntry), "A", "get", -1, szCondition);
+            decides(entry(szEntry), "A", nullptr, 1);
+            decides(entry(szEntry), "A", "", 1);
+        }
+        decides(RECORD, "Empty", nullptr, 1);
     }
 }
 
