@@ -299,6 +299,7 @@ TEST_F(Server, ServesAClientThatReadsLate)
 
 TEST_F(Server, ClosesTheOldestIdleConnectionToMakeRoom)
 {
+    const Socket oldest = client("", 2);
     std::vector<Socket> idle;
     for (int i = 0; i < 768; ++i) {
         idle.push_back(client("", 1));
@@ -307,21 +308,21 @@ TEST_F(Server, ClosesTheOldestIdleConnectionToMakeRoom)
     EXPECT_TRUE(idle[0].isOpen());
     const Socket one = client("", 1);
     settle();
-    EXPECT_EQ("end", idle[0].receive());
-    const auto areOpen = [&idle](size_t nFirst) {
-        return std::all_of(idle.begin() + static_cast<ptrdiff_t>(nFirst), idle.end(),
-                           [](const Socket& socket) { return socket.isOpen(); });
-    };
-    EXPECT_TRUE(areOpen(1));
-    for (int i = 0; i < 256; ++i) {
+    EXPECT_EQ("end", idle[0].receive()) << "the oldest of the user who has too many";
+    for (int i = 0; i < 254; ++i) {
         idle.push_back(client("", 2));
     }
+    settle(); // by the last connection that there is room for
+    EXPECT_TRUE(oldest.isOpen());
+    EXPECT_TRUE(std::all_of(idle.begin() + 1, idle.end(), [](const Socket& each) { return each.isOpen(); }));
+    idle.push_back(client("", 2));
     settle();
+    EXPECT_EQ("end", oldest.receive()) << "the oldest of all";
     EXPECT_EQ("401", client(NO_CALL, 3).status());
     one.send(NO_CALL);
     EXPECT_EQ("401", one.status());
-    EXPECT_FALSE(areOpen(1));
-    EXPECT_TRUE(areOpen(768)) << "those of the other user are younger";
+    EXPECT_TRUE(
+        std::all_of(idle.begin() + 768, idle.end(), [](const Socket& each) { return each.isOpen(); }));
 }
 
 TEST_F(Server, AsksOnceForCallsWithTheSameKey)
