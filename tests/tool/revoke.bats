@@ -9,10 +9,10 @@ six_tokens()
     rows <<'END'
 aaaaaaaa|bind_sid = 's1', create_time = 0
 bbbbbbbb|bind_sid = 's2', create_time = 0
-cccccccc|bind_sid = 's1', create_time = 0, uid = 1000
-dddddddd|bind_sid = 's2', create_time = 0, uid = 1000, function = 'Mail'
-eeeeeeee|bind_sid = 's1', create_time = 0, uid = 1000, function = 'Mail'
-ffffffff|create_time = 0, uid = 1000, function = 'it''s'
+cccccccc|bind_sid = 's1', create_time = 0, uid = 65534
+dddddddd|bind_sid = 's2', create_time = 0, uid = 65534, function = 'Mail'
+eeeeeeee|bind_sid = 's1', create_time = 0, uid = 65534, function = 'Mail'
+ffffffff|create_time = 0, uid = 65534, function = 'it''s'
 END
 }
 
@@ -86,7 +86,7 @@ END
 --function "it's"|f
 --function vpn|
 --bind-sid s1|ace
---uid 1000 --function Mail --bind-sid s1|e
+--uid 65534 --function Mail --bind-sid s1|e
 --user root --created-before @1 --opens Other|
 --all|abcdef
 TABLE
@@ -106,7 +106,10 @@ TABLE
 aaaaaaaa|1 token
 aaaaaaaa bbbbbbbb unknown-|2 tokens
 unknown-|0 tokens
---no-owner --uid 4294967294|1 token
+--no-owner|1 token
+--opens Other|0 tokens
+--expired|1 token
+--created-after @1|0 tokens
 --unlimited|1 token
 --expiring 1h|1 token
 --created-before @1|6 tokens
