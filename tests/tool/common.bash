@@ -120,12 +120,13 @@ on_terminal()
     run --separate-stderr "$BATS_TEST_DIRNAME/terminal.py" --modes "$DIR/modes" "$@"
 }
 
-# in_namespace COMMANDS ARGUMENTS...: bash executes them as root of a namespace where a file system in memory lies over
-# /usr; there the tool works on the real path, and nothing is there yet
+# in_namespace COMMANDS ARGUMENTS...: bash executes them as root of a namespace where file systems in memory lie over
+# /usr and /run; there the tool works on the real paths, and nothing is there yet
 in_namespace()
 {
     local overlay='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
-        mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr'
+        mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr &&
+        mount -t tmpfs tmpfs /run'
     [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
     mkdir "$DIR/layer"
     unshare --user --map-root-user --mount bash -c "$overlay" "$DIR/layer" 2>/dev/null ||

@@ -75,8 +75,7 @@ paths()
 
 # As the drop-in has it for services, on the real path.
 @test "without a capability, root takes a token through its life" {
-    in_namespace 'mount -t tmpfs tmpfs /run
-        tool=(setpriv --bounding-set=-all --inh-caps=-all --ambient-caps=-all "$1")
+    in_namespace 'tool=(setpriv --bounding-set=-all --inh-caps=-all --ambient-caps=-all "$1")
         "${tool[@]}" init && id=$("${tool[@]}" create --uid 0 --function VPN --allow Api) &&
             "${tool[@]}" grant "$id" Api && "${tool[@]}" doctor' "$TOOL"
     echo "$output" "${stderr-}"
