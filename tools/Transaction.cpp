@@ -60,10 +60,13 @@ std::pair<std::string, std::string> explained(const std::string& strErr)
     if (contains(strErr, "file is not a database")) {
         return {"is not a token database, or is damaged (" + strErr + ")", ""};
     }
-    if (contains(strErr, "readonly database")) {
-        if (0 != access(tool::databaseDirectory().c_str(), W_OK) && EROFS == errno) {
-            return {"is on a file system that is read-only", "\"mount -o remount,rw\" makes that writable"};
-        }
+    // With a write-ahead journal it cannot even be read where no file can be made beside it.
+    const bool blReadOnly = contains(strErr, "readonly database");
+    if ((blReadOnly || contains(strErr, "unable to open database file")) &&
+        0 != access(tool::databaseDirectory().c_str(), W_OK) && EROFS == errno) {
+        return {"is on a file system that is read-only", "\"mount -o remount,rw\" makes that writable"};
+    }
+    if (blReadOnly) {
         return {"cannot be written to (" + strErr + ")", "\"vemo-access-token doctor\" says why"};
     }
     if (contains(strErr, "malformed")) {

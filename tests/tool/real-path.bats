@@ -157,4 +157,10 @@ while 0 == rename(-100, sys.argv[1].encode(), -100, sys.argv[2].encode(), 2): # 
     expect 4 "" "vemo-access-token: $REAL_DB is on a file system that is read-only; \"mount -o remount,rw\" makes that writable"
     run_inside show "$id" --field count
     expect 0 1
+    inside mount -o remount,bind,rw "$REAL_DIRECTORY"
+    run_inside tune --wal
+    [ "$status" -eq 0 ]
+    inside mount -o remount,bind,ro "$REAL_DIRECTORY"
+    run_inside show "$id" --field count
+    expect 4 "" "vemo-access-token: $REAL_DB is on a file system that is read-only; \"mount -o remount,rw\" makes that writable"
 }
