@@ -2,10 +2,12 @@
 
 #include <bsd/readpassphrase.h>
 #include <fcntl.h>
+#include <sys/ioctl.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <iostream>
@@ -70,6 +72,16 @@ bool isTerminal(FILE* pStream)
     const bool blTerminal = isatty(fileno(pStream));
     errno = nError;
     return blTerminal;
+}
+
+size_t terminalWidth(FILE* pStream)
+{
+    if (!isTerminal(pStream)) {
+        return SIZE_MAX;
+    }
+    struct winsize size = {};
+    ioctl(fileno(pStream), TIOCGWINSZ, &size); // it stays as it is where that is not known
+    return size.ws_col ? size.ws_col : 80;
 }
 
 bool isColoured(FILE* pStream)

@@ -25,6 +25,9 @@ void restoreStdout();
 
 bool isTerminal(FILE* pStream);
 
+// The columns of the terminal that a stream goes to. Elsewhere there is no end of them.
+size_t terminalWidth(FILE* pStream);
+
 // Whether what goes to a stream may be coloured: a terminal, and no NO_COLOR in the environment.
 bool isColoured(FILE* pStream);
 

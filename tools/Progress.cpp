@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <cstring>
 #include <system_error>
 
 #include "Console.h"
@@ -9,7 +10,7 @@
 
 namespace {
 
-const int BAR_WIDTH = 40;
+const size_t BAR_WIDTH = 40; // at most
 const std::chrono::milliseconds DRAW_AGAIN_AFTER(50);
 
 } // namespace
@@ -59,18 +60,26 @@ void Progress::draw() const
 {
     const uint64_t nDone = std::min<uint64_t>(m_nDone, m_nTotal); // some can come meanwhile
     const int nPercent = m_nTotal ? static_cast<int>(100 * nDone / m_nTotal) : 100;
-    const int nFilled = BAR_WIDTH * nPercent / 100;
+    const std::string strPercent = std::to_string(nPercent);
+    // All on one line, or each time it is drawn it would begin another; so does what fills the last column.
+    const size_t nWidth = terminalWidth(stderr) - 1;
+    const size_t nTaken = m_strTitle.size() + strlen(" [] 100 %");
+    const size_t nBar = std::min(BAR_WIDTH, nWidth - std::min(nWidth, nTaken));
+    std::string strBar(nBar * static_cast<size_t>(nPercent) / 100, '#');
+    strBar.resize(nBar, ' ');
+    std::string strLine =
+        m_strTitle + " [" + strBar + "] " + std::string(3 - strPercent.size(), ' ') + strPercent + " %";
+    strLine.resize(std::min(strLine.size(), nWidth));
     const double dSeconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - m_start).count();
-    std::string strSpeed;
     if (dSeconds > 1 && nDone) {
         const double dRate = static_cast<double>(nDone) / dSeconds;
         const auto nLeft = static_cast<uint64_t>(static_cast<double>(m_nTotal - nDone) / dRate);
-        strSpeed = ", " + std::to_string(static_cast<uint64_t>(dRate)) + "/s, " + std::to_string(nLeft) +
-                   " s left\033[K"; // what stood there may be longer
+        const std::string strSpeed =
+            ", " + std::to_string(static_cast<uint64_t>(dRate)) + "/s, " + std::to_string(nLeft) + " s left";
+        strLine += strLine.size() + strSpeed.size() <= nWidth ? strSpeed : "";
+        strLine += "\033[K"; // what stood there may be longer
     }
-    fprintf(stderr, "\r%s [%s%s] %3d %%%s", m_strTitle.c_str(),
-            std::string(static_cast<size_t>(nFilled), '#').c_str(),
-            std::string(static_cast<size_t>(BAR_WIDTH - nFilled), ' ').c_str(), nPercent, strSpeed.c_str());
+    fprintf(stderr, "\r%s", strLine.c_str());
 }
 
 } // namespace tool

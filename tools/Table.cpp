@@ -1,6 +1,5 @@
 #include "Table.h"
 
-#include <sys/ioctl.h>
 #include <wchar.h>
 
 #include <algorithm>
@@ -18,17 +17,6 @@ const size_t LEFT_OUT = SIZE_MAX; // the width of a column that is not shown
 const size_t WORD_MAX = 40;       // columns; longer words are broken
 const char* const RED = "\033[31m";
 const char* const NO_COLOUR = "\033[0m";
-
-// The columns of the terminal that the result goes to. Elsewhere there is no end of them.
-size_t terminalWidth()
-{
-    if (!tool::isTerminal(tool::resultStream())) {
-        return SIZE_MAX;
-    }
-    struct winsize size = {};
-    ioctl(fileno(tool::resultStream()), TIOCGWINSZ, &size); // it stays as it is where that is not known
-    return size.ws_col ? size.ws_col : 80;
-}
 
 size_t columnsOf(wchar_t cWide)
 {
@@ -232,13 +220,13 @@ std::string Table::text(size_t nTerminal, bool blColoured) const
 
 void Table::print() const
 {
-    tool::print(text(terminalWidth(), isColoured(resultStream())));
+    tool::print(text(terminalWidth(resultStream()), isColoured(resultStream())));
 }
 
 void Table::print(const std::vector<std::string>& strCells, bool blRed)
 {
     if (m_nPrinted.empty()) {
-        m_nPrinted = widthsWithin(terminalWidth());
+        m_nPrinted = widthsWithin(terminalWidth(resultStream()));
         tool::print(titles(m_nPrinted));
     }
     tool::print(lineText({printableCells(strCells), blRed && isColoured(resultStream())}, m_nPrinted));

@@ -396,9 +396,11 @@ vemo-access-token: $DIR/lines: line 2 has the id of a token that is there alread
     expect 0 "${lines[0]}
 2 tokens imported"
 
-    # A table that is wider than the terminal keeps its words.
+    # The bar stays on its line. A table that is wider than the terminal keeps its words.
+    on_terminal --columns 10 -- tune --undo
+    [[ ${lines[0]} == *$'\rTuning []' ]]
     on_terminal --columns 20 -- tune --undo
-    [[ ${lines[0]} == *$'\rTuning [########################################] 100 %' ]]
+    [[ ${lines[0]} == *$'\rTuning [####] 100 %' ]]
     [[ $output == *$'\nlook for expired tokens, as every call does  '* ]]
 }
 
