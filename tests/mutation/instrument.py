@@ -297,6 +297,8 @@ class Source:
 
     def expression(self, cursor, condition=False):
         cursor = inside(cursor)
+        if cursor.location.file and cursor.location.file.name != str(self.path):
+            return  # an entry of the field list, in a table
         children = list(cursor.get_children())
         operator = self.operator(cursor, children)
         if cursor.kind == Kind.CALL_EXPR and cursor.spelling.startswith("VEMO_ATOKEN_CHECK_"):

@@ -40,9 +40,7 @@ extern int Error, Failed, Refused; // the labels, as arguments
 const unsigned int UID_ERR = 4294967295U;
 const int VEMO_ATOKEN_LENGTH_MIN = 127, SQLITE_OK = 0, F_OK = 0;
 
-// The parameters of the field list's macro, and what one of its expansions declares.
+// The parameters of the field list's macro, and its field.
 extern const char* type;
 extern int value;
-#define VEMO_ATOKEN_DATA_MEMBER(name, type, column, value) extern const Json::Value* p_##name;
-#include "internal/vemo-access-token-data-member"
-#undef VEMO_ATOKEN_DATA_MEMBER
+enum { FIELD___name };
