@@ -42,9 +42,9 @@ const Json::Value* fieldType(std::string_view strField)
     return pEntry ? &(*pEntry)[0U] : nullptr;
 }
 
-std::array<const Json::Value*, FIELDS> fieldMembers(const Json::Value& jObject)
+FieldMembers fieldMembers(const Json::Value& jObject)
 {
-    std::array<const Json::Value*, FIELDS> rgMember;
+    FieldMembers rgMember;
     if (!jObject.isObject()) {
         findMember(jObject, ""); // throws unless it is null
     }
@@ -56,13 +56,13 @@ std::array<const Json::Value*, FIELDS> fieldMembers(const Json::Value& jObject)
     return rgMember;
 }
 
-std::array<Column, FIELDS> addFields(Json::Value& jRecord, int n_column, char** column_name)
+Columns addFields(Json::Value& jRecord, int n_column, char** column_name)
 {
     if (FIELDS != n_column) {
         return {};
     }
     static const Json::Value& jBlank = *new Json::Value(blankRecord());
-    std::array<Column, FIELDS> rgColumn;
+    Columns rgColumn;
     const auto rgEntry = fieldMembers(tokenType());
     Json::Value jNew = jBlank;
     auto it = jNew.begin();

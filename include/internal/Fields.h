@@ -23,7 +23,8 @@ const Json::Value* fieldType(std::string_view strField);
 
 // Returns the members of an object, or of null, that are fields; null for a missing one. Finds them faster
 // than findMember does, and throws Json::LogicError as it does.
-std::array<const Json::Value*, FIELDS> fieldMembers(const Json::Value& jObject);
+typedef std::array<const Json::Value*, FIELDS> FieldMembers;
+FieldMembers fieldMembers(const Json::Value& jObject);
 
 // What a column of a row is decoded with. Null: still to be found.
 struct Column {
@@ -33,7 +34,8 @@ struct Column {
 
 // Adds all fields to an empty record, and finds the columns of a row, if these are the fields in their order.
 // That is faster than one by one. Otherwise returns nulls.
-std::array<Column, FIELDS> addFields(Json::Value& jRecord, int n_column, char** column_name);
+typedef std::array<Column, FIELDS> Columns;
+Columns addFields(Json::Value& jRecord, int n_column, char** column_name);
 
 } // namespace VEMO_ACCESS_TOKEN
 

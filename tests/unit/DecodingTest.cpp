@@ -360,25 +360,26 @@ TEST_F(Decoding, TakesARowOfAllFieldsAsAnyOther)
     Row row;
     for (const Field& field : fields()) {
         row.names.push_back(field.szName);
-        row.values.push_back("7");
     }
+    row.values = {"1", "2", "3", "4", "5", "6", "7", "8", "9"};
     Row reversed = row;
     std::reverse(reversed.names.begin(), reversed.names.end());
+    std::reverse(reversed.values.begin(), reversed.values.end());
     Row more = row;
     more.names.push_back("count");
-    more.values.push_back("8");
+    more.values.push_back("0");
     Row unnamed = row;
     unnamed.names.back() = nullptr;
     Row withoutValue = row;
     withoutValue.values.back() = nullptr;
 
     const Json::Value jRecord =
-        json(R"({"tid":"7","bind_sid":"7","uid":7,"deadline":7,"count":7,"create_time":7,
-                                         "function":"7","webapi_allow":7,"extra":7})");
+        json(R"({"tid":"1","bind_sid":"2","uid":3,"deadline":4,"count":5,"create_time":6,
+                                         "function":"7","webapi_allow":8,"extra":9})");
     Json::Value jMore = jRecord;
-    jMore["count"] = 8;
+    jMore["count"] = 0;
     Json::Value jText = jRecord;
-    jText["extra"] = "7";
+    jText["extra"] = "9";
     EXPECT_EQ(0, decode(row));
     EXPECT_EQ(0, decode(reversed));
     EXPECT_EQ(0, decode(more));
