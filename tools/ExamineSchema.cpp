@@ -131,7 +131,8 @@ bool holdsComment(const std::string& strSql)
     return std::string::npos != strSql.find("/*") || std::string::npos != strSql.find("--");
 }
 
-void examineColumns(Store& store, Findings& findings)
+// Returns whether they are those that the library makes.
+bool examineColumns(Store& store, Findings& findings)
 {
     std::string strOwn;
     AccessTokenDbApi().SqlExpandCreateTable(strOwn);
@@ -142,7 +143,7 @@ void examineColumns(Store& store, Findings& findings)
     const std::string strMore = holdsComment(strSql) ? "a comment" : lacking(strFound, strMade);
     const std::string strLess = lacking(strMade, strFound);
     if (strMore.empty()) {
-        return; // then it lacks nothing: it has all the columns, and none that is defined in another way
+        return true; // then it lacks nothing: it has all the columns, and none that is defined in another way
     }
     findings.push_back(
         {Finding::Severity::Error,
@@ -151,7 +152,7 @@ void examineColumns(Store& store, Findings& findings)
          "calls can fail, spend no use, report what did not happen, or take one token for another",
          tool::REMEDY_SAVE_AND_REPLACE,
          {}});
-    examineDuplicates(findings);
+    return false;
 }
 
 // Finds what a query names, of a kind that can be dropped.
@@ -251,16 +252,23 @@ namespace tool {
 
 bool examineSchema(Findings& findings)
 {
+    bool blOwn = false;
+    {
+        Store store(Store::Access::Read);
+        if (!examineKind(store, findings)) {
+            return false;
+        }
+        examineTriggers(store, findings);
+        examineOddIndexes(store, findings);
+        if (!examineMissing(store, findings)) {
+            return false;
+        }
+        blOwn = examineColumns(store, findings);
+    }
+    if (!blOwn) {
+        examineDuplicates(findings);
+    }
     Store store(Store::Access::Read);
-    if (!examineKind(store, findings)) {
-        return false;
-    }
-    examineTriggers(store, findings);
-    examineOddIndexes(store, findings);
-    if (!examineMissing(store, findings)) {
-        return false;
-    }
-    examineColumns(store, findings);
     examineEncoding(store, findings);
     return true;
 }

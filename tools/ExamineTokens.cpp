@@ -276,25 +276,25 @@ void examineObjects(Findings& findings)
     const tool::ObjectReader reader;
     tool::Memo<Flaws> flaws([&reader](const std::string& strText) { return flawsOf(reader, strText); });
     tool::Steps steps(Store::Access::Glance, "Examining", tool::Steps::Order::ByRow);
-    tool::Rows rows;
+    const auto examine = [&](const tool::Row& row) {
+        const auto addIf = [&row](bool blFlawed, TokenNames& names) {
+            if (blFlawed) {
+                names.add(row[0]);
+            }
+        };
+        const Flaws allow = flaws.of(*row[1]);
+        const Flaws extra = flaws.of(*row[2]);
+        const bool blBroken = allow.blBroken || extra.blBroken;
+        addIf(blBroken, broken);
+        addIf(!blBroken && allow.blOdd, odd);
+        addIf(!blBroken && allow.blThrowing, throwing);
+        addIf(allow.blDeep || extra.blDeep, deep);
+    };
     while (steps.next([&](Store& store, const std::string& strThose) {
-        rows = store.query("SELECT tid, webapi_allow, extra FROM token WHERE " + strThose +
-                           " AND (webapi_allow <> '{}' OR extra <> '{}') AND NOT " + anyNull());
+        store.eachRow("SELECT tid, webapi_allow, extra FROM token WHERE " + strThose +
+                          " AND (webapi_allow <> '{}' OR extra <> '{}') AND NOT " + anyNull(),
+                      examine);
     })) {
-        for (const tool::Row& row : rows) {
-            const auto addIf = [&row](bool blFlawed, TokenNames& names) {
-                if (blFlawed) {
-                    names.add(row[0]);
-                }
-            };
-            const Flaws allow = flaws.of(*row[1]);
-            const Flaws extra = flaws.of(*row[2]);
-            const bool blBroken = allow.blBroken || extra.blBroken;
-            addIf(blBroken, broken);
-            addIf(!blBroken && allow.blOdd, odd);
-            addIf(!blBroken && allow.blThrowing, throwing);
-            addIf(allow.blDeep || extra.blDeep, deep);
-        }
     }
     const auto add = [&](const TokenNames& names, Finding::Severity severity, const std::string& strWhat,
                          const std::string& strMeaning, const std::string& strRemedy) {

@@ -34,6 +34,9 @@ tool::Walk walkMaking()
     return walk;
 }
 
+// The byte that SQLite locks while a transaction changes something: a part of its file format.
+const off_t RESERVED_BYTE = 0x40000001;
+
 // The database, or the journal with this suffix, if it is a regular file.
 tool::Descriptor openBeside(const std::string& strSuffix)
 {
@@ -84,6 +87,17 @@ std::string lastBytes(const std::string& strSuffix, size_t cbWanted)
 {
     const Descriptor file = openBeside(strSuffix);
     return bytesAt(file, lseek(file.get(), 0, SEEK_END) - static_cast<off_t>(cbWanted), cbWanted);
+}
+
+bool isBeingChanged()
+{
+    const Descriptor file = openBeside("");
+    struct flock lock = {};
+    lock.l_type = F_RDLCK;
+    lock.l_whence = SEEK_SET;
+    lock.l_start = RESERVED_BYTE;
+    lock.l_len = 1;
+    return 0 == fcntl(file.get(), F_GETLK, &lock) && F_UNLCK != lock.l_type;
 }
 
 void requireDatabase(bool blCreate)

@@ -32,6 +32,10 @@ std::optional<struct stat> statusOf(const std::string& strPath);
 std::string firstBytes(const std::string& strSuffix, size_t cbWanted);
 std::string lastBytes(const std::string& strSuffix, size_t cbWanted);
 
+// Whether another process is just changing the database with a rollback journal. Not while this process has
+// it open, either.
+bool isBeingChanged();
+
 // Fails, with the reason, unless the database can be opened, or made if blCreate.
 void requireDatabase(bool blCreate);
 

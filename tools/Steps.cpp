@@ -7,15 +7,26 @@
 
 namespace {
 
-// How long a step is to take, and how many tokens it has at first and at most. What is written must get to
-// the disk each time, so there are fewer steps for that.
-const std::chrono::milliseconds READING(50);
-const std::chrono::milliseconds WRITING(100);
+// How long a step is to take, and how many tokens it has at first and at most.
+const std::chrono::milliseconds STEP(100);
 const size_t TOKENS_FIRST = 250;
-const size_t TOKENS_MAX = 64000;
+const size_t TOKENS_MAX = 16000; // however small they are: large ones can follow
 
 // Programs that wait for the database try each 10 ms; in between, one of them has it.
 const std::chrono::milliseconds PAUSE(12);
+
+// Where a program is at a change, a step waits for its end, for so long at most. A reader that came in its
+// way would cost it more than the time of a step: the library begins its purge anew, which without an index
+// reads all tokens.
+const std::chrono::milliseconds FOR_OTHERS(1000);
+
+void letOthersChange()
+{
+    typedef std::chrono::steady_clock Clock;
+    for (const auto end = Clock::now() + FOR_OTHERS; tool::isBeingChanged() && Clock::now() < end;) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    }
+}
 
 uint64_t countAll()
 {
@@ -46,6 +57,9 @@ bool Steps::next(const Use& use)
         return false;
     }
     std::this_thread::sleep_until(m_ended + PAUSE);
+    if (Store::Access::Write != m_access) {
+        letOthersChange();
+    }
     const Clock::time_point start = Clock::now();
     {
         Store store(m_access);
@@ -75,10 +89,9 @@ bool Steps::next(const Use& use)
     if (m_progress) {
         m_progress->step(m_nTokens);
     }
-    const std::chrono::milliseconds wanted = Store::Access::Write == m_access ? WRITING : READING;
-    if (m_ended - start > 2 * wanted) {
+    if (m_ended - start > 2 * STEP) {
         m_nTokens = std::max(TOKENS_FIRST, m_nTokens / 2);
-    } else if (m_ended - start < wanted) {
+    } else if (m_ended - start < STEP) {
         m_nTokens = std::min(TOKENS_MAX, m_nTokens * 2);
     }
     return true;
