@@ -1,6 +1,6 @@
 #!/usr/bin/python3
-"""The tool on many tokens, beside a program that creates one each 100 ms: how long each command takes, its memory, and
-how long it keeps the other waiting. Prints a table.
+"""The tool on many tokens: how long each command takes alone, and beside a program that creates a token each 100 ms; its
+memory, and how long it keeps the other waiting. Prints a table.
 
 usage: many.py TOOL CREATIONS DIRECTORY [TOKENS]
 TOOL and CREATIONS (tests/tool/creations.cpp): built with the redirection linked in. DIRECTORY: for the store, of some
@@ -17,8 +17,8 @@ import time
 TOOL, CREATIONS = map(os.path.abspath, sys.argv[1:3])
 DIRECTORY = sys.argv[3]
 TOKENS = int(sys.argv[4]) if len(sys.argv) > 4 else 1000000
-COMMANDS = (["list", "--count"], ["stats"], ["list", "-o", "jsonl"], ["list", "--limit", "20"], ["export", "FILE"],
-            ["doctor"], ["revoke", "--function", "Mail", "--yes"], ["import", "--in-steps", "FILE"])
+READING = (["list", "--count"], ["stats"], ["list", "-o", "jsonl"], ["list", "--limit", "20"], ["export", "FILE"], ["doctor"])
+CHANGING = (["revoke", "--function", "Mail", "--yes"], ["import", "--in-steps", "FILE"])
 
 
 def make_store(path):
@@ -45,26 +45,47 @@ def make_store(path):
 
 
 def run(command):
-    """Seconds, kilobytes, and what the other program says."""
-    with subprocess.Popen([CREATIONS, "100"], stdin=subprocess.PIPE, stdout=subprocess.PIPE) as beside:
-        start = time.monotonic()
-        tool = subprocess.Popen([TOOL, *command], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
-                                stderr=subprocess.DEVNULL)
+    """Seconds and kilobytes."""
+    start = time.monotonic()
+    with subprocess.Popen([TOOL, *command], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
+                          stderr=subprocess.DEVNULL) as tool:
         _, status, usage = os.wait4(tool.pid, 0)
-        seconds = time.monotonic() - start
         tool.returncode = os.waitstatus_to_exitcode(status)
-        calls, there, longest = beside.communicate()[0].split()
     if tool.returncode not in (0, 5):
         sys.exit(f"{command[0]} ended with {tool.returncode}")
-    return seconds, usage.ru_maxrss, int(calls), int(calls) - int(there), int(longest)
+    return time.monotonic() - start, usage.ru_maxrss
+
+
+def run_beside(command):
+    """The same, and what the other program says."""
+    with subprocess.Popen([CREATIONS, "100"], stdin=subprocess.PIPE, stdout=subprocess.PIPE) as beside:
+        seconds, kilobytes = run(command)
+        calls, there, longest = map(int, beside.communicate()[0].split())
+    return seconds, kilobytes, calls, calls - there, longest
+
+
+def make_empty():
+    subprocess.run([TOOL, "init"], check=True, stdout=subprocess.DEVNULL)
 
 
 os.mkdir(DIRECTORY, 0o755)
 os.environ["VEMO_REDIRECT_DIR"] = os.path.join(DIRECTORY, "session")
-subprocess.run([TOOL, "init"], check=True, stdout=subprocess.DEVNULL)
-make_store(os.path.join(DIRECTORY, "session/vemo-access-token.db"))
+database = os.path.join(DIRECTORY, "session/vemo-access-token.db")
+make_empty()
+make_store(database)
 exported = os.path.join(DIRECTORY, "exported")
-print(f"{TOKENS} tokens\n\n| Command | Seconds | Memory, MB | Calls beside it | lost | longest, ms |\n|---|---|---|---|---|---|")
-for command in COMMANDS:
-    seconds, kilobytes, calls, lost, longest = run([exported if word == "FILE" else word for word in command])
-    print(f"| `{' '.join(command)}` | {seconds:.1f} | {kilobytes / 1024:.0f} | {calls} | {lost} | {longest} |", flush=True)
+print(f"{TOKENS} tokens\n\n| Command | Seconds alone | beside | Memory, MB | Calls beside | lost | longest, ms |\n"
+      "|---|---|---|---|---|---|---|")
+for words in READING + CHANGING:
+    arguments = [exported if word == "FILE" else word for word in words]
+    if words in CHANGING:
+        alone = ""
+    else:
+        alone = f"{run(arguments)[0]:.1f}"
+    seconds, kilobytes, calls, lost, longest = run_beside(arguments)
+    print(f"| `{' '.join(words)}` | {alone} | {seconds:.1f} | {kilobytes / 1024:.0f} | {calls} | {lost} | {longest} |",
+          flush=True)
+os.unlink(database)
+make_empty()
+seconds, kilobytes = run(["import", "--in-steps", exported])
+print(f"| the same into an empty store | {seconds:.1f} | | {kilobytes / 1024:.0f} | | | |")

@@ -57,8 +57,8 @@ std::vector<std::string> objectNames()
 }
 
 struct Token {
-    Json::Value jToken;
-    std::string strFlaw;
+    std::string strLine; // of the export, or why it is not in it
+    bool blFlawed;
 };
 
 struct Exported {
@@ -82,28 +82,29 @@ Exported writeLines(const tool::Selection& selection, bool blProgress, Write wri
     Exported exported;
     std::vector<Token> tokens;
     tool::Memo<std::string> flaws(tool::flawOfStored);
-    const auto take = [&](Json::Value jToken, const tool::Row& columns) {
+    const auto take = [&](const Json::Value& jToken, const tool::Row& columns) {
         std::string strFlaw = *columns[0];
         for (size_t i = 0; strFlaw.empty() && i < strObjects.size(); ++i) {
             const std::string& strText = flaws.of(*columns[i + 1]);
             strFlaw = strText.empty() ? "" : "\"" + strObjects[i] + "\" " + strText;
         }
-        tokens.push_back({std::move(jToken), strFlaw});
+        tokens.push_back({strFlaw.empty() ? tool::compactJson(jToken) + "\n"
+                                          : "token " + tool::masked(jToken["tid"].asString()) +
+                                                " cannot be exported: " + strFlaw,
+                          !strFlaw.empty()});
     };
     tool::Steps steps(tool::Store::Access::Glance);
     while (steps.next([&](tool::Store& store, const std::string& strThose) {
         store.eachToken(strThose + " AND " + strSelected, strColumns, take);
     })) {
         for (const Token& token : tokens) {
-            if (token.strFlaw.empty()) {
-                const std::string strLine = tool::compactJson(token.jToken) + "\n";
-                end.add(strLine);
-                write(strLine);
-                ++exported.nTokens;
-            } else {
-                tool::complain("token " + tool::masked(token.jToken["tid"].asString()) +
-                               " cannot be exported: " + token.strFlaw);
+            if (token.blFlawed) {
+                tool::complain(token.strLine);
                 ++exported.nLeftOut;
+            } else {
+                end.add(token.strLine);
+                write(token.strLine);
+                ++exported.nTokens;
             }
             progress.step();
         }

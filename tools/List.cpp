@@ -68,9 +68,9 @@ uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
         tool::Rows rows;
         const auto read = [&](tool::Store& store, const std::string& strThose) {
             const std::string strFrom = " FROM token WHERE " + strThose + " AND " + strSelected;
-            nTokens += store.number("SELECT count(*)" + strFrom);
             rows = store.query(std::string("SELECT ") + tool::SQL_QUOTED_TID + ", " + keyOf(options.order) +
                                ", rowid" + strFrom + strOrder);
+            nTokens += options.nLimit ? store.number("SELECT count(*)" + strFrom) : rows.size();
         };
         if (!steps.next(read)) {
             return nTokens;
@@ -99,6 +99,7 @@ typedef std::multimap<std::string, Json::Value> Tokens; // by their ids, as SQL
 Tokens tokensOf(std::vector<tool::SortedIds::Id> ids)
 {
     Tokens tokens;
+    tool::letOthersChange();
     tool::Store store(tool::Store::Access::Read);
     const auto add = [&](const std::string& strWhere) {
         store.eachToken(strWhere, std::string(", ") + tool::SQL_QUOTED_TID,

@@ -15,18 +15,7 @@ const size_t TOKENS_MAX = 16000; // however small they are: large ones can follo
 // Programs that wait for the database try each 10 ms; in between, one of them has it.
 const std::chrono::milliseconds PAUSE(12);
 
-// Where a program is at a change, a step waits for its end, for so long at most. A reader that came in its
-// way would cost it more than the time of a step: the library begins its purge anew, which without an index
-// reads all tokens.
 const std::chrono::milliseconds FOR_OTHERS(1000);
-
-void letOthersChange()
-{
-    typedef std::chrono::steady_clock Clock;
-    for (const auto end = Clock::now() + FOR_OTHERS; tool::isBeingChanged() && Clock::now() < end;) {
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
-    }
-}
 
 uint64_t countAll()
 {
@@ -48,6 +37,14 @@ Steps::Steps(Store::Access access, const std::string& strTitle, Order order)
 {
     if (!strTitle.empty()) {
         m_progress.emplace(strTitle, countAll, true, MANY);
+    }
+}
+
+void letOthersChange()
+{
+    typedef std::chrono::steady_clock Clock;
+    for (const auto end = Clock::now() + FOR_OTHERS; isBeingChanged() && Clock::now() < end;) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
 }
 

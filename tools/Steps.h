@@ -51,6 +51,11 @@ private:
     Clock::time_point m_ended; // the last step
 };
 
+// Waits while another program is at a change, for a second at most: for those who read many tokens, and have
+// no database open. A reader in the way of a change costs it more than the time of the reading: the library
+// begins its purge anew, which without an index reads all tokens.
+void letOthersChange();
+
 } // namespace tool
 
 #endif
