@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cctype>
-#include <map>
 #include <set>
 #include <string>
 #include <vector>
@@ -19,14 +18,6 @@ namespace {
 
 using fuzz::Texts;
 
-const std::map<std::string, void (*)(tool::Commands&)> COMMANDS = {
-    {"create", tool::addCreate}, {"generate", tool::addGenerate}, {"list", tool::addList},
-    {"show", tool::addShow},     {"check", tool::addCheck},       {"grant", tool::addGrant},
-    {"update", tool::addUpdate}, {"revoke", tool::addRevoke},     {"purge", tool::addPurge},
-    {"stats", tool::addStats},   {"export", tool::addExport},     {"import", tool::addImport},
-    {"init", tool::addInit},     {"doctor", tool::addDoctor},     {"tune", tool::addTune},
-    {"rotate", tool::addRotate}, {"help", tool::addHelp}};
-
 const std::set<std::string> READERS = {"list", "show", "check", "stats", "export", "generate", "help", ""};
 
 Texts argumentsOf(std::string_view strLines)
@@ -38,10 +29,23 @@ Texts argumentsOf(std::string_view strLines)
     return strArguments;
 }
 
+// Of a name there is a command of, or of "generate".
+const tool::CommandEntry& entryOf(const std::string& strName)
+{
+    const tool::CommandEntry* pFound = nullptr;
+    for (const tool::CommandEntry& entry : tool::COMMANDS) {
+        if (entry.szName == strName || (!pFound && entry.szName == std::string("generate"))) {
+            pFound = &entry;
+        }
+    }
+    return *pFound;
+}
+
 // The command, if the arguments begin with one; or else "".
 std::string commandOf(const Texts& strArguments)
 {
-    return strArguments.size() > 1 && COMMANDS.count(strArguments[1]) ? strArguments[1] : "";
+    return strArguments.size() > 1 && entryOf(strArguments[1]).szName == strArguments[1] ? strArguments[1]
+                                                                                         : "";
 }
 
 // Each option and argument gets exactly its texts from the command line, or the command fails.
@@ -63,7 +67,7 @@ int run(const Texts& strArguments, const std::string& strInput)
     // Making all commands would take most of the time.
     const std::string strCommand = commandOf(strArguments);
     tool::Commands commands;
-    COMMANDS.at(strCommand.empty() ? "generate" : strCommand)(commands);
+    entryOf(strCommand).add(commands);
     const int nStatus = fuzz::runTool(commands, strArguments);
     if (!strCommand.empty()) {
         checkReading(commands.all().front(), strArguments, nStatus);
@@ -71,20 +75,18 @@ int run(const Texts& strArguments, const std::string& strInput)
     return nStatus;
 }
 
-// COMMANDS holds all commands of the tool.
-void checkCommands()
+void checkNames()
 {
     tool::Commands commands;
-    tool::addAll(commands);
-    FUZZ_REQUIRE(commands.all().size() == COMMANDS.size());
-    for (const tool::Command& command : commands.all()) {
-        FUZZ_REQUIRE(COMMANDS.count(command.name()));
+    for (const tool::CommandEntry& entry : tool::COMMANDS) {
+        entry.add(commands);
+        FUZZ_REQUIRE(commands.all().back().name() == entry.szName);
     }
 }
 
 void prepare()
 {
-    checkCommands();
+    checkNames();
     fuzz::setFileTexts(
         R"({"a":[1]})",
         R"({"tid":")" + fuzz::tid("FromAFile") +

@@ -132,25 +132,24 @@ void addHelp(Commands& commands)
     command.example("list");
 }
 
-void addAll(Commands& commands)
-{
-    addCreate(commands);
-    addGenerate(commands);
-    addList(commands);
-    addShow(commands);
-    addCheck(commands);
-    addGrant(commands);
-    addUpdate(commands);
-    addRotate(commands);
-    addRevoke(commands);
-    addPurge(commands);
-    addStats(commands);
-    addExport(commands);
-    addImport(commands);
-    addInit(commands);
-    addDoctor(commands);
-    addTune(commands);
-    addHelp(commands);
-}
+const std::array<CommandEntry, 17> COMMANDS = {{
+    {"create", addCreate},
+    {"generate", addGenerate},
+    {"list", addList},
+    {"show", addShow},
+    {"check", addCheck},
+    {"grant", addGrant},
+    {"update", addUpdate},
+    {"rotate", addRotate},
+    {"revoke", addRevoke},
+    {"purge", addPurge},
+    {"stats", addStats},
+    {"export", addExport},
+    {"import", addImport},
+    {"init", addInit},
+    {"doctor", addDoctor},
+    {"tune", addTune},
+    {"help", addHelp},
+}};
 
 } // namespace tool

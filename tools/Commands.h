@@ -3,6 +3,7 @@
 #ifndef TOOLS_COMMANDS_H
 #define TOOLS_COMMANDS_H
 
+#include <array>
 #include <deque>
 #include <string>
 
@@ -52,7 +53,11 @@ void addTune(Commands& commands);
 void addHelp(Commands& commands);
 
 // All of these, in the order that the help text has.
-void addAll(Commands& commands);
+struct CommandEntry {
+    const char* szName;
+    void (*add)(Commands&);
+};
+extern const std::array<CommandEntry, 17> COMMANDS;
 
 } // namespace tool
 

@@ -93,7 +93,7 @@ Exported writeLines(const tool::Selection& selection, bool blProgress, Write wri
                                                 " cannot be exported: " + strFlaw,
                           !strFlaw.empty()});
     };
-    tool::Steps steps(tool::Store::Access::Glance);
+    tool::Steps steps(tool::Store::Access::Glance, "", tool::Steps::Order::ById, tool::Steps::KEPT_MAX);
     while (steps.next([&](tool::Store& store, const std::string& strThose) {
         store.eachToken(strThose + " AND " + strSelected, strColumns, take);
     })) {

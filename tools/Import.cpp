@@ -27,7 +27,7 @@ namespace {
 
 // What one transaction takes: it holds others up for less than half a second.
 const size_t TOKENS_AT_ONCE = 10000;
-const size_t TOKENS_OF_A_STEP = 2000;
+const size_t TOKENS_OF_A_STEP = 4000;
 const std::chrono::milliseconds BETWEEN_STEPS(12); // programs that wait try each 10 ms
 
 struct Options {

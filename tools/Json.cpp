@@ -72,7 +72,7 @@ Reading readBy(Json::CharReader& reader, const std::string& strText, Json::Value
         return reader.parse(strText.data(), strText.data() + strText.size(), &jValue, &strReport);
     };
     try {
-        // A text is bad when it is so twice: the reader takes a number for none when memory runs out.
+        // Twice: when memory runs out, the reader rejects numbers that are valid.
         return parse() || parse() ? Reading::Whole : Reading::Bad;
     } catch (const Json::RuntimeError& error) {
         if (!strstr(error.what(), "stackLimit")) {

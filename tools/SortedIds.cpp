@@ -11,7 +11,7 @@
 
 namespace {
 
-const size_t GROUP_MAX = 1000;
+const size_t GROUP_MAX = 4000;
 
 // Of 16 MB, not of 2: parts of this size are sorted in memory and merged, and a few of them at once.
 const char* const SORT_IN = "PRAGMA cache_size = -16000";

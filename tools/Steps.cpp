@@ -7,15 +7,13 @@
 
 namespace {
 
-// How long a step is to take, and how many tokens it has at first and at most.
+// How long a step is to take, and how many tokens it has at first.
 const std::chrono::milliseconds STEP(100);
 const size_t TOKENS_FIRST = 250;
-const size_t TOKENS_MAX = 16000; // however small they are: large ones can follow
 
 // Programs that wait for the database try each 10 ms; in between, one of them has it.
 const std::chrono::milliseconds PAUSE(12);
-
-const std::chrono::milliseconds FOR_OTHERS(1000);
+const std::chrono::milliseconds FOR_OTHERS(1000); // at most
 
 uint64_t countAll()
 {
@@ -32,8 +30,8 @@ uint64_t countAll()
 
 namespace tool {
 
-Steps::Steps(Store::Access access, const std::string& strTitle, Order order)
-    : m_access(access), m_order(order), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
+Steps::Steps(Store::Access access, const std::string& strTitle, Order order, size_t nMax)
+    : m_access(access), m_order(order), m_nMax(nMax), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
 {
     if (!strTitle.empty()) {
         m_progress.emplace(strTitle, countAll, true, MANY);
@@ -89,7 +87,7 @@ bool Steps::next(const Use& use)
     if (m_ended - start > 2 * STEP) {
         m_nTokens = std::max(TOKENS_FIRST, m_nTokens / 2);
     } else if (m_ended - start < STEP) {
-        m_nTokens = std::min(TOKENS_MAX, m_nTokens * 2);
+        m_nTokens = std::min(m_nMax, m_nTokens * 2);
     }
     return true;
 }

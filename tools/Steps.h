@@ -27,9 +27,14 @@ public:
         ByRow,
     };
 
+    // However small tokens are: large ones can follow. And for those who keep the tokens of a step in memory.
+    static constexpr size_t TOKENS_MAX = 16000;
+    static constexpr size_t KEPT_MAX = 4000;
+
     // access: Glance, or Write where something is to change. With a title, a bar shows how far they are where
-    // there are many tokens.
-    explicit Steps(Store::Access access, const std::string& strTitle = "", Order order = Order::ById);
+    // there are many tokens. A step has nMax of them at most.
+    explicit Steps(Store::Access access, const std::string& strTitle = "", Order order = Order::ById,
+                   size_t nMax = TOKENS_MAX);
 
     // Looks at the next tokens, which fulfil a condition in SQL. The transaction ends, with what was changed
     // on the disk, when the function returns.
@@ -45,6 +50,7 @@ private:
     std::optional<Progress> m_progress;
     const Store::Access m_access;
     const Order m_order;
+    const size_t m_nMax;
     size_t m_nTokens;      // of a step
     std::string m_strLast; // the id or row that the last step ended with, as SQL
     bool m_blEnd = false;

@@ -107,7 +107,7 @@ std::string rewritten(const std::string& strText, Write write)
         wchar_t cWide = L'\0';
         mbstate_t state = {};
         const size_t cbRead = mbrtowc(&cWide, szOdd, cbOdd, &state); // 0 for a NUL
-        // What is too large is an error's number, or none that UTF-8 goes to.
+        // The numbers of errors exceed any valid length. UTF-8 ends at 0x10ffff.
         const bool blValid = cbRead <= cbOdd && (isAscii(cWide) || (utf8() && cWide <= 0x10ffff));
         const size_t cbCharacter = blValid && cbRead ? cbRead : 1;
         write(strOut, std::string_view(szOdd, cbCharacter), blValid ? cWide : INVALID);

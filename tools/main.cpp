@@ -39,7 +39,9 @@ int main(int nArguments, char** rgArguments)
         tool::completeStreams();
         setlocale(LC_CTYPE, ""); // how wide characters are
         tool::Commands commands;
-        tool::addAll(commands);
+        for (const tool::CommandEntry& entry : tool::COMMANDS) {
+            entry.add(commands);
+        }
         return commands.run(nArguments, rgArguments);
     } catch (const tool::Failure& failure) {
         tool::complain(failure.what());

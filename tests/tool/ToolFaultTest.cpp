@@ -11,6 +11,7 @@
 #include "Figures.h"
 #include "Operations.h"
 #include "Scene.h"
+#include "tools/Commands.h"
 
 namespace {
 
@@ -188,6 +189,16 @@ TEST(ToolInit, PutsTheDirectoryOnTheDiskBeforeWhatStandsInIt)
         EXPECT_EQ(scene.storeDirectory(), strSynced[1]);
     } catch (const NoAnswers& exception) {
         GTEST_SKIP() << exception.what();
+    }
+}
+
+TEST(ToolFaults, AreMetByEachCommand)
+{
+    for (const tool::CommandEntry& entry : tool::COMMANDS) {
+        const auto isIt = [&entry](const Command& command) {
+            return command.strArguments[0] == entry.szName;
+        };
+        EXPECT_TRUE(!commandsThat(isIt).empty() || entry.szName == std::string("help")) << entry.szName;
     }
 }
 

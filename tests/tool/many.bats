@@ -86,7 +86,7 @@ this file was imported; --in-steps lets them through"
     VEMO_TEST_SYNC=directory run_tool import --in-steps - < <(head -n 4500 "$BATS_FILE_TMPDIR/exported" && echo none)
     expect 4 "" "vemo-access-token: /usr/vemo/etc/private/session: Input/output error; the change was made, but a power cut can \
 undo it; 0 tokens imported before that; the command can be repeated without harm"
-    [ "$(sql "SELECT count(*) FROM token")" = 2000 ]
+    [ "$(sql "SELECT count(*) FROM token")" = 4000 ]
     sql "DELETE FROM token"
     run_tool import --in-steps - < <(head -n 4500 "$BATS_FILE_TMPDIR/exported" && echo none)
     [[ "$status $stderr" == "2 vemo-access-token: standard input: line 4501 is not "*"; 4000 tokens imported before that; the \
