@@ -20,6 +20,7 @@
 #include "Json.h"
 #include "Masking.h"
 #include "Progress.h"
+#include "Steps.h"
 #include "Store.h"
 #include "Values.h"
 
@@ -28,7 +29,6 @@ namespace {
 // What one transaction takes: it holds others up for less than half a second.
 const size_t TOKENS_AT_ONCE = 10000;
 const size_t TOKENS_OF_A_STEP = 4000;
-const std::chrono::milliseconds BETWEEN_STEPS(12); // programs that wait try each 10 ms
 
 struct Options {
     bool blPartial = false;
@@ -265,7 +265,7 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
     const auto create = [&] {
         createTokens(lines, strFile, true, progress, imported);
         lines.clear();
-        std::this_thread::sleep_for(BETWEEN_STEPS);
+        std::this_thread::sleep_for(tool::BETWEEN_STEPS);
     };
     const auto stopped = [&imported](tool::ExitStatus status, const std::string& strFact) {
         return tool::Failure(status, strFact,

@@ -64,7 +64,8 @@ uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
                    ", rowid LIMIT " + std::to_string(*options.nLimit);
     }
     uint64_t nTokens = 0;
-    for (tool::Steps steps(tool::Store::Access::Glance, "Sorting");;) {
+    const size_t nMax = blNumber ? tool::Steps::TOKENS_MAX : tool::Steps::KEPT_MAX; // texts can be long
+    for (tool::Steps steps(tool::Store::Access::Glance, "Sorting", tool::Steps::Order::ById, nMax);;) {
         tool::Rows rows;
         const auto read = [&](tool::Store& store, const std::string& strThose) {
             const std::string strFrom = " FROM token WHERE " + strThose + " AND " + strSelected;

@@ -18,6 +18,10 @@ public:
     // Valid until the next call.
     const Value& of(const std::string& strText)
     {
+        if (strText.size() > TEXT_MAX) {
+            m_long = m_make(strText);
+            return m_long;
+        }
         const auto pKnown = m_known.find(strText);
         if (pKnown != m_known.end()) {
             return pKnown->second;
@@ -31,9 +35,11 @@ public:
 
 private:
     static constexpr size_t TEXTS_MAX = 1000;
+    static constexpr size_t TEXT_MAX = 1000; // bytes: long texts take memory, and hardly come again
 
     const std::function<Value(const std::string&)> m_make;
     std::unordered_map<std::string, Value> m_known;
+    Value m_long = {}; // of the last long text
 };
 
 } // namespace tool

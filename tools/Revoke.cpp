@@ -3,7 +3,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <chrono>
 #include <functional>
 #include <memory>
 #include <set>
@@ -18,9 +17,8 @@
 
 namespace {
 
-const size_t NAMES_MAX = 100000;                   // which take 100 MB
-const size_t NAMES_OF_A_STEP = 1000;               // one transaction
-const std::chrono::milliseconds BETWEEN_STEPS(12); // programs that wait for the database try each 10 ms
+const size_t NAMES_MAX = 100000;     // which take less than 100 MB of memory
+const size_t NAMES_OF_A_STEP = 1000; // one transaction
 
 struct RevokeOptions {
     std::vector<std::string> strTids;
@@ -94,7 +92,7 @@ void eachStep(const std::vector<std::string>& strNames, Use use)
 {
     for (size_t i = 0; i < strNames.size(); i += NAMES_OF_A_STEP) {
         if (0 != i) {
-            std::this_thread::sleep_for(BETWEEN_STEPS);
+            std::this_thread::sleep_for(tool::BETWEEN_STEPS);
         }
         const auto pFirst = strNames.begin() + static_cast<std::ptrdiff_t>(i);
         const size_t nNames = std::min(NAMES_OF_A_STEP, strNames.size() - i);

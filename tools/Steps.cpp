@@ -11,8 +11,6 @@ namespace {
 const std::chrono::milliseconds STEP(100);
 const size_t TOKENS_FIRST = 250;
 
-// Programs that wait for the database try each 10 ms; in between, one of them has it.
-const std::chrono::milliseconds PAUSE(12);
 const std::chrono::milliseconds FOR_OTHERS(1000); // at most
 
 uint64_t countAll()
@@ -31,7 +29,11 @@ uint64_t countAll()
 namespace tool {
 
 Steps::Steps(Store::Access access, const std::string& strTitle, Order order, size_t nMax)
-    : m_access(access), m_order(order), m_nMax(nMax), m_nTokens(TOKENS_FIRST), m_ended(Clock::now() - PAUSE)
+    : m_access(access),
+      m_order(order),
+      m_nMax(nMax),
+      m_nTokens(TOKENS_FIRST),
+      m_ended(Clock::now() - BETWEEN_STEPS)
 {
     if (!strTitle.empty()) {
         m_progress.emplace(strTitle, countAll, true, MANY);
@@ -51,7 +53,7 @@ bool Steps::next(const Use& use)
     if (m_blEnd) {
         return false;
     }
-    std::this_thread::sleep_until(m_ended + PAUSE);
+    std::this_thread::sleep_until(m_ended + BETWEEN_STEPS);
     if (Store::Access::Write != m_access) {
         letOthersChange();
     }

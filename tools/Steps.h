@@ -27,7 +27,7 @@ public:
         ByRow,
     };
 
-    // However small tokens are: large ones can follow. And for those who keep the tokens of a step in memory.
+    // The most tokens of a step: large ones can follow small ones. Fewer where a step is kept in memory.
     static constexpr size_t TOKENS_MAX = 16000;
     static constexpr size_t KEPT_MAX = 4000;
 
@@ -56,6 +56,9 @@ private:
     bool m_blEnd = false;
     Clock::time_point m_ended; // the last step
 };
+
+// Programs that wait for the database try each 10 ms; between two steps, one of them has it.
+const std::chrono::milliseconds BETWEEN_STEPS(12);
 
 // Waits while another program is at a change, for a second at most: for those who read many tokens, and have
 // no database open. A reader in the way of a change costs it more than the time of the reading: the library

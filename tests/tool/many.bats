@@ -101,3 +101,12 @@ command can be repeated without harm" && $stderr != *nothing* ]]
     beside purge
     [ "$(cat "$DIR/output")" = "0 tokens purged" ]
 }
+
+@test "large tokens take little memory, too" {
+    sql "DELETE FROM token;
+        WITH RECURSIVE c(n) AS (SELECT 1 UNION ALL SELECT n + 1 FROM c WHERE n < 600)
+        INSERT INTO token SELECT printf('%0127d', n), '', 0, 1990000000, 1, 1, 'f', '{}',
+            '{\"a\":\"' || n || printf('%0100000d', 1) || '\"}' FROM c"
+    [ "$(ulimit -v 64000 && "$TOOL" export 2>/dev/null | wc -l)" = 601 ]
+    (ulimit -v 64000 && "$TOOL" doctor >/dev/null)
+}

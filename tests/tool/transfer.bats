@@ -132,8 +132,8 @@ TABLE
 
 @test "export to a place where no file can be made ends in a sentence that names it" {
     row A
-    mkdir "$DIR/work" "$DIR/work/out" "$DIR/work/there"
-    cd "$DIR/work"
+    mkdir "$DIR/place" "$DIR/place/out" "$DIR/place/there"
+    cd "$DIR/place"
     mkfifo fifo
     ln -s out/file link
     ln -s there here
@@ -584,8 +584,8 @@ TABLE
 
 @test "a file that cannot be read is refused, and named" {
     tool init
-    mkdir "$DIR/work"
-    cd "$DIR/work"
+    mkdir "$DIR/place"
+    cd "$DIR/place"
     ln -s loop loop
     mkdir directory
     mkfifo fifo
