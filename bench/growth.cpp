@@ -1,9 +1,12 @@
-// What a grant costs as the number of tokens grows, without and with an administrator's indexes, and what
-// the indexes cost that only deletions use.
+// What a grant costs as the number of tokens grows, without and with an administrator's indexes, beside the
+// bare engine's; and what the indexes cost that only deletions use.
 //
 // A store takes turns with one of ten tokens, or of fewer indexes, so that the ratio of the two is not that
 // of two moments of the machine. The call that comes first in a turn finds the processor's caches as the
-// other store left them, and does not count.
+// other store left them, and does not count. Each benchmark of growth reports
+//
+//   median_us, few_us   of the library's grants in the two stores
+//   ratio, bare_ratio   of the two medians: the library's, and the bare engine's
 
 #include <benchmark/benchmark.h>
 
@@ -22,14 +25,25 @@ namespace {
 
 const int FEW = 10;
 
-void grant(const Store& store, int nToken, Samples& samples)
+// Both grant in the store that is in use.
+void grant(int nToken, Samples& samples)
 {
     std::string strTid = tokenOf(nToken).strTid;
     Json::Value jToken;
-    store.use();
     if (0 != samples.time([&] { return VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken); })) {
         throw std::runtime_error("the grant failed");
     }
+}
+
+void grantBare(int nToken, Samples& samples)
+{
+    const std::string strTid = tokenOf(nToken).strTid;
+    samples.time([&] {
+        BareEngine engine;
+        engine.purge();
+        engine.grant(strTid);
+        return 0;
+    });
 }
 
 std::unique_ptr<Store> makeStore(Place place, bool blIndexes, int nTokens)
@@ -42,26 +56,42 @@ std::unique_ptr<Store> makeStore(Place place, bool blIndexes, int nTokens)
     return pStore;
 }
 
+// The two take turns at being first. A different token each time: the pages of one would stay in the caches.
+void grantByBoth(const Store& store, int nTokens, int nTurn, Samples& ours, Samples& bare)
+{
+    Samples first;
+    int nToken = 3 * nTurn;
+    const auto next = [&nToken, nTokens] { return nToken++ * 7919 % nTokens; };
+    store.use();
+    grant(next(), first);
+    if (nTurn % 2) {
+        grantBare(next(), bare);
+    }
+    grant(next(), ours);
+    if (!(nTurn % 2)) {
+        grantBare(next(), bare);
+    }
+}
+
 void growth(benchmark::State& state, Place place, bool blIndexes, int nTokens)
 {
     const auto pMany = makeStore(place, blIndexes, nTokens);
     const auto pFew = makeStore(place, blIndexes, FEW);
     Samples many;
     Samples few;
-    Samples firsts;
-    int nCall = 0;
+    Samples bareMany;
+    Samples bareFew;
+    int nTurn = 0;
     for (auto _ : state) {
-        // A different token each time: the pages of one would stay in the caches.
-        grant(*pMany, nCall * 7919 % nTokens, firsts);
-        grant(*pMany, (nCall + 1) * 7919 % nTokens, many);
-        grant(*pFew, nCall % FEW, firsts);
-        grant(*pFew, (nCall + 1) % FEW, few);
-        nCall += 2;
+        grantByBoth(*pMany, nTokens, nTurn, many, bareMany);
+        grantByBoth(*pFew, FEW, nTurn, few, bareFew);
+        ++nTurn;
         state.SetIterationTime(many.last());
     }
     state.counters["median_us"] = many.percentile(50) * 1e6;
     state.counters["few_us"] = few.percentile(50) * 1e6;
     state.counters["ratio"] = many.percentile(50) / few.percentile(50);
+    state.counters["bare_ratio"] = bareMany.percentile(50) / bareFew.percentile(50);
 }
 
 // The bytes that this process has written, as the kernel counts them.
@@ -92,9 +122,9 @@ void indexes(benchmark::State& state, Place place, int nTokens)
             store.use();
             deletions[blThree].time(
                 [] { return VemoAccessTokenDeleteByBindSid("a session without tokens"); });
-            grant(store, nCall * 7919 % nTokens, firsts);
+            grant(nCall * 7919 % nTokens, firsts);
             const double dBefore = bytesWritten();
-            grant(store, (nCall + 1) * 7919 % nTokens, grants[blThree]);
+            grant((nCall + 1) * 7919 % nTokens, grants[blThree]);
             written[blThree].add(bytesWritten() - dBefore);
         }
         nCall += 2;

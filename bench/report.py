@@ -1,10 +1,11 @@
 #!/usr/bin/python3
 """Makes a report of what the benchmark programs measured.
 
-usage: report.py DIRECTORY
+usage: report.py DIRECTORY [EARLIER...]
 
-Reads the programs' results (NAME.json) in the directory, prints the table of ratios, and writes there
-report.md with all tables, and the plots.
+Reads the programs' results (NAME.json) in the directory, prints the table of ratios that have a goal, and
+writes there report.md with all tables, the plots, and results.json: all figures of this run. EARLIER are such
+files of other runs, on other machines perhaps: ratios are then given as ranges over all runs.
 """
 
 import json
@@ -22,6 +23,9 @@ from matplotlib import pyplot  # noqa: E402
 GOAL_OPERATIONS = ("Create", "CreateByTid", "GrantEx.saved", "GrantEx.deleted", "DeleteByTid", "DeleteByBindSid",
                    "DeleteByFunction")
 GOAL_OVERHEAD = {"memory": 1.08, "disk": 1.03}
+GOAL_GROWTH = 1.02  # the library's growth beside the bare engine's
+
+PROGRAMS = ("overhead", "listing", "breakdown", "growth", "contention", "peers", "gate")
 
 HALF_CHANGE = "no half change; the last one may be undone"
 RETURNED = "what returned is kept"
@@ -60,25 +64,40 @@ GATE_GOALS = (  # what, beside what, the least ratio
 )
 
 
-class Results:
-    """The counters of each benchmark, by the parts of its name that follow the program's."""
+NOT_COUNTERS = ("family_index", "per_family_instance_index", "repetitions", "repetition_index", "threads", "iterations",
+                "real_time", "cpu_time")
 
-    def __init__(self, directory, name):
-        path = os.path.join(directory, name + ".json")
-        self.context = {}
-        self.cells = {}
-        if not os.path.exists(path):
-            return
-        with open(path, encoding="utf-8") as file:
-            content = json.load(file)
-        self.context = content["context"]
-        for benchmark in content["benchmarks"]:
-            if benchmark.get("error_occurred"):
-                sys.exit(f"{benchmark['name']}: {benchmark['error_message']}")
-            if benchmark.get("aggregate_name", "median") != "median":
-                continue
-            name = benchmark["run_name"].split("/iterations:")[0]
-            self.cells[tuple(name.split("/")[1:])] = benchmark
+
+def figures(content):
+    """The counters of each benchmark, by its name without the program's."""
+    cells = {}
+    for benchmark in content["benchmarks"]:
+        if benchmark.get("error_occurred"):
+            sys.exit(f"{benchmark['name']}: {benchmark['error_message']}")
+        if benchmark.get("aggregate_name", "median") == "median":
+            name = benchmark["run_name"].split("/iterations:")[0].partition("/")[2]
+            cells[name] = {counter: float(f"{value:.5g}") for counter, value in benchmark.items()
+                           if isinstance(value, (int, float)) and counter not in NOT_COUNTERS}
+    return cells
+
+
+def measured(directory):
+    """What a run measured, as results.json keeps it."""
+    results = {}
+    context = {}
+    for program in PROGRAMS:
+        path = os.path.join(directory, program + ".json")
+        if os.path.exists(path):
+            with open(path, encoding="utf-8") as file:
+                content = json.load(file)
+            results[program] = figures(content)
+            context = context or content["context"]
+    return {"machine": machine(context, "peers" in results), **results}
+
+
+def cells_of(results, program):
+    """The same by the parts of the names."""
+    return {tuple(name.split("/")): cell for name, cell in results.get(program, {}).items()}
 
 
 def table(header, rows):
@@ -98,8 +117,16 @@ def percent(value):
     return f"{100 * value:.2f} %" if value else "0"
 
 
-def verdict(ratio, goal):
-    return "" if goal is None else f"{goal:g}: {'met' if round(ratio, 3) <= goal else 'missed'}"
+def span(values, digits):
+    low, high = (f"{value:.{digits}f}" for value in (min(values), max(values)))
+    return low if low == high else f"{low} to {high}"
+
+
+def verdict(met):
+    """Of a goal, in each run."""
+    if all(met):
+        return "met"
+    return f"met in {sum(met)} of {len(met)} runs" if any(met) else "missed"
 
 
 def output_of(command):
@@ -109,13 +136,13 @@ def output_of(command):
         return ""
 
 
-def machine(results):
-    context = results["overhead"].context
+def machine(context, peers):
     with open("/proc/cpuinfo", encoding="utf-8") as file:
-        model = re.search(r"model name\s*: (.*)", file.read())
+        processor = dict(re.findall(r"^(model name|cpu family|model)\s*: (.*)$", file.read(), re.MULTILINE))
+    name = f"{processor['model name']} (family {processor['cpu family']}, model {processor['model']})" \
+        if "model name" in processor else platform.machine()
     lines = [
-        f"{model.group(1) if model else platform.machine()}, {context['num_cpus']} processors, "
-        f"Linux {platform.release().split('-')[0]}",
+        f"{name}, {context['num_cpus']} processors, Linux {platform.release().split('-')[0]}",
         ", ".join(
             f"{name}: {output_of(['df', '--output=fstype', os.environ.get(variable, default)]).split()[-1]}"
             for name, variable, default in (
@@ -126,43 +153,55 @@ def machine(results):
         f"libvemoaccesstoken {context['library']}, {context['compiler']}, SQLite {context['sqlite']}, "
         f"jsoncpp {context['jsoncpp']}",
     ]
-    if results["peers"].cells:
+    if peers:
         redis = re.search(r"v=(\S+)", output_of(["redis-server", "--version"]))
         directory = output_of(["pg_config", "--bindir"]).strip()
         postgresql = re.search(r"[\d.]+", output_of([f"{directory}/postgres", "--version"]))
         lines.append(f"Redis {redis.group(1)}, PostgreSQL {postgresql.group()}")
-    return "".join(f"- {line}\n" for line in lines)
+    return lines
 
 
-def ratios(results):
-    rows = []
-
-    def add(what, ours, beside, ratio, goal=None):
-        rows.append([what, ours, beside, f"{ratio:.3f}", verdict(ratio, goal)])
-
-    for (operation, place, tokens), cell in results["overhead"].cells.items():
-        add(f"{operation}, {place}, {int(tokens):,} tokens", microseconds(cell["ours_us"]),
-            f"bare engine {microseconds(cell['bare_us'])}", cell["ratio"],
-            GOAL_OVERHEAD[place] if tokens == "10" and operation in GOAL_OPERATIONS else None)
-    listing = results["listing"].cells
-    time, memory = listing[("time",)], listing[("memory",)]
-    add("tokenList, 100,000 tokens", f"{time['ours_us'] / 1000:.0f} ms",
-        f"sqlite3_exec {time['bare_us'] / 1000:.0f} ms", time["ratio"], 1.5)
-    add("its peak memory", f"{memory['peak_kB'] / 1000:.1f} MB", f"the values {memory['values_kB'] / 1000:.1f} MB",
-        memory["ratio"], 1.1)
-    for (place, kind, tokens), cell in results["growth"].cells.items():
+def comparisons(results):
+    """Of a run: what, ours, beside, their ratio, and the most that it should be, or None."""
+    for (operation, place, tokens), cell in cells_of(results, "overhead").items():
+        yield (f"{operation}, {place}, {int(tokens):,} tokens", microseconds(cell["ours_us"]),
+               f"bare engine {microseconds(cell['bare_us'])}", cell["ratio"],
+               GOAL_OVERHEAD[place] if tokens == "10" and operation in GOAL_OPERATIONS else None)
+    for (place, kind, tokens), cell in cells_of(results, "growth").items():
         if tokens == "1000000":
-            add(f"grant at 1,000,000 tokens, {kind}, {place}", microseconds(cell["median_us"]),
-                f"at 10 tokens {microseconds(cell['few_us'])}", cell["ratio"], 1.3 if kind == "indexed" else None)
-    peers = results["peers"].cells
+            yield (f"growth of a grant from 10 to 1,000,000 tokens, {kind}, {place}", f"{cell['ratio']:.2f}",
+                   f"bare engine {cell['bare_ratio']:.2f}", cell["ratio"] / cell["bare_ratio"],
+                   GOAL_GROWTH if kind == "indexed" else None)
+    for (what,), cell in cells_of(results, "listing").items():
+        if what == "time":
+            yield ("tokenList, 100,000 tokens", f"{cell['ours_us'] / 1000:.0f} ms",
+                   f"sqlite3_exec {cell['bare_us'] / 1000:.0f} ms", cell["ratio"], 1.5)
+        else:
+            yield ("its peak memory", f"{cell['peak_kB'] / 1000:.1f} MB",
+                   f"the values {cell['values_kB'] / 1000:.1f} MB", cell["ratio"], 1.1)
+    peers = results.get("peers")
     for ours, peer, goal in PEER_GOALS if peers else ():
-        ours_us, peer_us = peers[(ours,)]["median_us"], peers[(peer,)]["median_us"]
-        add(ours, microseconds(ours_us), f"{peer} {microseconds(peer_us)}", ours_us / peer_us, goal)
+        yield (ours, microseconds(peers[ours]["median_us"]), f"{peer} {microseconds(peers[peer]['median_us'])}",
+               peers[ours]["median_us"] / peers[peer]["median_us"], goal)
+
+
+def ratios(runs, is_shown):
+    """The figures of the first run, with the ratios of all."""
+    spans = {}
+    for results in runs:
+        for what, _, _, ratio, _ in comparisons(results):
+            spans.setdefault(what, []).append(ratio)
+    rows = []
+    for what, ours, beside, _, goal in comparisons(runs[0]):
+        if is_shown(what, goal):
+            rows.append([what, ours, beside, span(spans[what], 3),
+                         "" if goal is None else f"{goal:g}: "
+                         + verdict([round(ratio, 3) <= goal for ratio in spans[what]])])
     return table(["Measured", "Ours", "Beside", "Ratio", "Goal"], rows)
 
 
 def peers_table(results):
-    cells = results["peers"].cells
+    cells = cells_of(results, "peers")
     return table(
         ["Grant", "Median", "99th percentile", "At a power cut"],
         [[name, microseconds(cells[(slug,)]["median_us"]), microseconds(cells[(slug,)]["p99_us"]), promise]
@@ -170,7 +209,7 @@ def peers_table(results):
 
 
 def gate_table(results):
-    cells = results["gate"].cells
+    cells = cells_of(results, "gate")
     rows = []
     for ours, other, goal in GATE_GOALS:
         rate, beside = (cells[tuple(name.split("/"))]["per_second"] for name in (ours, other))
@@ -187,8 +226,8 @@ def gate_table(results):
 
 def growth_table(results):
     def text(place, kind, tokens):
-        cell = results["growth"].cells[(place, kind, tokens)]
-        return f"{microseconds(cell['median_us'])} ({cell['ratio']:.2f})"
+        cell = cells_of(results, "growth")[(place, kind, tokens)]
+        return f"{microseconds(cell['median_us'])} ({cell['ratio']:.2f}; {cell['bare_ratio']:.2f})"
 
     return table(
         ["Tokens", "memory, plain", "memory, indexed", "disk, plain", "disk, indexed"],
@@ -199,7 +238,7 @@ def growth_table(results):
 
 def indexes_table(results):
     rows = []
-    for (place, kind, tokens), cell in results["growth"].cells.items():
+    for (place, kind, tokens), cell in cells_of(results, "growth").items():
         if kind == "indexes":
             rows.append([f"{int(tokens):,}, {place}", microseconds(cell["one_us"]), microseconds(cell["three_us"]),
                          f"{cell['three_us'] / cell['one_us']:.2f}", f"{cell['one_kB']:.0f} kB",
@@ -216,12 +255,12 @@ def contention_table(results):
         [[*key, f"{cell['grants_per_second']:.0f}", f"{cell['median_us'] / 1000:.1f} ms",
           f"{cell['p99_us'] / 1000:.1f} ms"]
          + [percent(cell[counter]) for counter in ("failed", "false_failures", "beyond_count")]
-         for key, cell in results["contention"].cells.items()])
+         for key, cell in cells_of(results, "contention").items()])
 
 
 def breakdown_table(results, title, names, suffix=""):
     return table([title, *names], [[", ".join(key)] + [f"{cell[name + suffix]:.0f}" for name in names]
-                                   for key, cell in results["breakdown"].cells.items()])
+                                   for key, cell in cells_of(results, "breakdown").items()])
 
 
 def save(figure, directory, name):
@@ -247,7 +286,7 @@ def finish_panels(panels, titles, xlabel, base=None):
 
 
 def plot_overhead(results, directory):
-    cells = results["overhead"].cells
+    cells = cells_of(results, "overhead")
     names = [operation for operation, place, tokens in cells if (place, tokens) == ("memory", "10")]
     figure, axes = pyplot.subplots(figsize=(9, 4.5))
     for offset, place in ((-0.2, "memory"), (0.2, "disk")):
@@ -266,7 +305,7 @@ def plot_growth(results, directory):
     figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5), sharey=True)
     for axes, place in zip(panels, ("memory", "disk")):
         for kind in ("plain", "indexed"):
-            plot_lines(axes, results["growth"].cells, (place, kind), "median_us", 1e-3, marker="o", label=kind)
+            plot_lines(axes, cells_of(results, "growth"), (place, kind), "median_us", 1e-3, marker="o", label=kind)
         axes.set_yscale("log")
         axes.legend()
     finish_panels(panels, ("A grant in memory", "A grant on disk"), "tokens", base=10)
@@ -275,7 +314,7 @@ def plot_growth(results, directory):
 
 
 def plot_contention(results, directory):
-    cells = results["contention"].cells
+    cells = cells_of(results, "contention")
     figure, panels = pyplot.subplots(2, 2, figsize=(9, 7))
     panels = panels.flatten()
     for axes, counter, factor in zip(
@@ -294,7 +333,7 @@ def plot_contention(results, directory):
 
 
 def plot_gate(results, directory):
-    cells = results["gate"].cells
+    cells = cells_of(results, "gate")
     figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5))
     for series in ("write-ahead", "rollback", "redis"):
         label = "Redis, appendfsync always" if series == "redis" else f"gate, {series} journal"
@@ -309,7 +348,7 @@ def plot_gate(results, directory):
 
 
 def plot_peers(results, directory):
-    cells = results["peers"].cells
+    cells = cells_of(results, "peers")
     names = [slug for slug in PEERS if (slug,) in cells][::-1]
     figure, axes = pyplot.subplots(figsize=(9, 5))
     medians = [cells[(name,)]["median_us"] for name in names]
@@ -324,13 +363,22 @@ def plot_peers(results, directory):
 
 
 def main():
-    if len(sys.argv) != 2:
-        sys.exit("usage: report.py DIRECTORY")
+    if len(sys.argv) < 2:
+        sys.exit("usage: report.py DIRECTORY [EARLIER...]")
     directory = sys.argv[1]
-    names = ("overhead", "listing", "breakdown", "growth", "contention", "peers", "gate")
-    results = {name: Results(directory, name) for name in names}
+    results = measured(directory)
+    with open(os.path.join(directory, "results.json"), "w", encoding="utf-8") as file:
+        json.dump(results, file, indent=1)
+        file.write("\n")
+    runs = [results]
+    for path in sys.argv[2:]:
+        with open(path, encoding="utf-8") as file:
+            runs.append(json.load(file))
+    machines = dict.fromkeys("".join(f"- {line}\n" for line in run["machine"]) for run in runs)
+    goals = ratios(runs, lambda what, goal: goal is not None or what.endswith(", 10 tokens"))
     sections = [
-        ("Ratios", machine(results) + "\n" + ratios(results)),
+        ("Goals", "\n".join(machines) + "\n" + goals),
+        ("All ratios", ratios(runs, lambda what, goal: True)),
         ("Where the time of a grant goes",
          breakdown_table(results, "Grant (µs)", ("open", "purge", "select", "save", "close", "library", "total"), "_us")
          + "\n"
@@ -343,16 +391,16 @@ def main():
     plot_overhead(results, directory)
     plot_growth(results, directory)
     plot_contention(results, directory)
-    if results["peers"].cells:
+    if "peers" in results:
         sections.append(("Peers", peers_table(results)))
         plot_peers(results, directory)
-    if results["gate"].cells:
+    if "gate" in results:
         sections.append(("The gate", gate_table(results)))
         plot_gate(results, directory)
     with open(os.path.join(directory, "report.md"), "w", encoding="utf-8") as file:
         file.write("\n".join(f"## {title}\n\n{text}" for title, text in sections))
-    print(sections[0][1])
-    print(f"All tables, plots and raw results are in {directory}.")
+    print(goals)
+    print(f"All tables, plots and figures are in {directory}.")
 
 
 if __name__ == "__main__":

@@ -1,6 +1,6 @@
 # shellcheck shell=bash
 # Sourced by the other scripts: installs what is missing of the Debian packages that they need. They say what they
-# need, and for what, with need; install_needed tells what is missing and installs it. On a terminal it asks first.
+# need, and for what, with need.
 
 missing=()  # packages
 purposes=() # lines "PURPOSE: PACKAGE..." of those
@@ -30,8 +30,11 @@ size_of()
             END { printf "%.1f MB to fetch, %.1f MB on the disk\n", bytes / 1e6, kilobytes / 1e3 }'
 }
 
+# install_needed TIME: says how long the script takes on two cores with all packages there, and what is missing, and
+# installs that. On a terminal it asks first.
 install_needed()
 {
+    echo "This takes $1."
     [ ${#missing[@]} -gt 0 ] || return 0
     local purpose answer=y sudo=()
     if [ "$(id -u)" -ne 0 ]; then
