@@ -13,12 +13,12 @@ namespace {
 std::string ownersThatAreGone()
 {
     std::set<Json::Int64> nUids;
-    for (tool::Steps steps(tool::Store::Access::Glance);
-         steps.next([&nUids](tool::Store&store, const std::string&strThose) {
-             store.eachRow(
-                 "SELECT DISTINCT uid FROM token WHERE typeof(uid) = 'integer' AND " + strThose,
-                 [&nUids](const tool::Row& row) { nUids.insert(strtoll(row[0]->c_str(), nullptr, 10)); });
-         });) {
+    tool::Steps steps(tool::Store::Access::Glance);
+    while (steps.next([&nUids](tool::Store& store, const std::string& strThose) {
+        store.eachRow(
+            "SELECT DISTINCT uid FROM token WHERE typeof(uid) = 'integer' AND " + strThose,
+            [&nUids](const tool::Row& row) { nUids.insert(strtoll(row[0]->c_str(), nullptr, 10)); });
+    })) {
     }
     std::string strUids;
     for (const Json::Int64 nUid : nUids) {
@@ -153,7 +153,7 @@ uint64_t countSelected(const Selection& selection)
     uint64_t nTokens = 0;
     Steps steps(Store::Access::Glance);
     while (steps.next([&](Store& store, const std::string& strThose) {
-        nTokens += store.number("SELECT count(*) FROM token WHERE " + strThose + " AND " + strSelected);
+        nTokens += store.count(strThose + " AND " + strSelected);
     })) {
     }
     return nTokens;

@@ -112,8 +112,8 @@ void examineDuplicates(Findings& findings)
     tool::TokenNames names;
     tool::Steps steps(Store::Access::Glance);
     while (steps.next([&](Store& step, const std::string& strThose) {
-        step.eachRow("SELECT tid FROM token WHERE " + strThose + " GROUP BY tid HAVING count(*) > 1",
-                     [&](const tool::Row& row) { names.add(row[0]); });
+        step.eachTid(strThose + " GROUP BY tid HAVING count(*) > 1",
+                     [&](const auto& strTid) { names.add(strTid); });
     })) {
     }
     if (names.count()) {

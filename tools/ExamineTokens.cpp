@@ -219,8 +219,8 @@ void examineRows(bool blTableSound, Findings& findings)
         const tool::Row isThere = store.query(strSql + " FROM token WHERE " + strThose)[0];
         for (size_t i = 0; i < checks.size(); ++i) {
             if (isThere[i] == "1") {
-                store.eachRow("SELECT tid FROM token WHERE " + strThose + " AND " + checks[i].strWhere,
-                              [&](const tool::Row& row) { names[i].add(row[0]); });
+                store.eachTid(strThose + " AND " + checks[i].strWhere,
+                              [&](const auto& strTid) { names[i].add(strTid); });
             }
         }
     })) {

@@ -60,8 +60,8 @@ uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
     const std::string strSelected = options.selection.sql();
     std::string strOrder;
     if (options.nLimit) {
-        strOrder = std::string(" ORDER BY 2") + (options.order.blDescending ? " DESC" : "") +
-                   ", rowid LIMIT " + std::to_string(*options.nLimit);
+        strOrder = std::string(" ORDER BY 2") + (options.order.blDescending ? " DESC" : "") + ", 3 LIMIT " +
+                   std::to_string(*options.nLimit);
     }
     uint64_t nTokens = 0;
     const size_t nMax = blNumber ? tool::Steps::TOKENS_MAX : tool::Steps::KEPT_MAX; // texts can be long
@@ -70,7 +70,7 @@ uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
         const auto read = [&](tool::Store& store, const std::string& strThose) {
             const std::string strFrom = " FROM token WHERE " + strThose + " AND " + strSelected;
             rows = store.query(std::string("SELECT ") + tool::SQL_QUOTED_TID + ", " + keyOf(options.order) +
-                               ", rowid" + strFrom + strOrder);
+                               (store.hasRowIds() ? ", rowid" : ", 0") + strFrom + strOrder);
             nTokens += options.nLimit ? store.number("SELECT count(*)" + strFrom) : rows.size();
         };
         if (!steps.next(read)) {
@@ -108,7 +108,9 @@ Tokens tokensOf(std::vector<tool::SortedIds::Id> ids)
                             tokens.emplace(*columns[0], std::move(jToken));
                         });
     };
-    add("rowid IN (" + listOf(ids, [](const auto& id) { return std::to_string(id.nRow); }) + ")");
+    if (store.hasRowIds()) {
+        add("rowid IN (" + listOf(ids, [](const auto& id) { return std::to_string(id.nRow); }) + ")");
+    }
     ids.erase(
         std::remove_if(ids.begin(), ids.end(), [&tokens](const auto& id) { return tokens.count(id.strTid); }),
         ids.end());

@@ -188,13 +188,9 @@ uint64_t removeInSteps(const std::string& strTitle, const std::string& strWhere,
         tool::Steps steps(tool::Store::Access::Write);
         uint64_t nNow = 0;
         while (steps.next([&](tool::Store& store, const std::string& strThose) {
-            const std::string strFrom = " FROM token WHERE " + strThose + " AND " + strWhere;
-            nNow = 0;
-            store.eachRow("SELECT tid" + strFrom, [&](const tool::Row& row) {
-                gone(row[0].value_or(""));
-                ++nNow;
-            });
-            store.remove(strThose + " AND " + strWhere);
+            const std::string strNow = strThose + " AND " + strWhere;
+            store.eachTid(strNow, [&](const auto& strTid) { gone(strTid.value_or("")); });
+            nNow = store.remove(strNow);
         })) {
             nRemoved += nNow;
             progress.step(nNow);
@@ -231,12 +227,11 @@ int revokeMany(const RevokeOptions& options)
 
     const auto findBack = [&](tool::Store& store, const std::string& strThose) {
         std::vector<std::string> strTids;
-        store.eachRow("SELECT tid FROM token WHERE " + strThose + " AND " + strWhere,
-                      [&](const tool::Row& row) {
-                          if (isOneOf(revoked, row[0].value_or(""))) {
-                              strTids.push_back(*row[0]);
-                          }
-                      });
+        store.eachTid(strThose + " AND " + strWhere, [&](const auto& strTid) {
+            if (isOneOf(revoked, strTid.value_or(""))) {
+                strTids.push_back(strTid.value_or(""));
+            }
+        });
         return strTids;
     };
     std::vector<std::string> strBack;

@@ -17,9 +17,8 @@ uint64_t countAll()
 {
     uint64_t nTokens = 0;
     tool::Steps steps(tool::Store::Access::Glance);
-    while (steps.next([&nTokens](tool::Store& store, const std::string& strThose) {
-        nTokens += store.number("SELECT count(*) FROM token WHERE " + strThose);
-    })) {
+    while (steps.next(
+        [&nTokens](tool::Store& store, const std::string& strThose) { nTokens += store.count(strThose); })) {
     }
     return nTokens;
 }
@@ -60,9 +59,7 @@ bool Steps::next(const Use& use)
     const Clock::time_point start = Clock::now();
     {
         Store store(m_access);
-        // A table that a stranger made can be one WITHOUT ROWID.
-        const bool blIds =
-            Order::ById == m_order || store.number("SELECT wr FROM pragma_table_list('token')");
+        const bool blIds = Order::ById == m_order || !store.hasRowIds();
         const std::string strKey = blIds ? "tid" : "rowid";
         const std::string strBehind = strKey + (m_strLast.empty() ? " IS NOT NULL" : " > " + m_strLast);
         const std::string strBound =

@@ -65,6 +65,22 @@ void Store::eachToken(const std::string& strWhere, const std::string& strColumns
     });
 }
 
+uint64_t Store::count(const std::string& strWhere)
+{
+    return number("SELECT count(*) FROM token WHERE " + strWhere);
+}
+
+void Store::eachTid(const std::string& strWhere,
+                    const std::function<void(const std::optional<std::string>& strTid)>& take)
+{
+    eachRow("SELECT tid FROM token WHERE " + strWhere, [&take](const Row& row) { take(row[0]); });
+}
+
+bool Store::hasRowIds()
+{
+    return 0 == number("SELECT wr FROM pragma_table_list('token')");
+}
+
 bool Store::has(const std::string& strTid)
 {
     return !query(sqlText("SELECT 1 FROM token WHERE tid = %Q LIMIT 1", strTid.c_str())).empty();
@@ -168,9 +184,8 @@ void Store::copy(const std::string& strTid, const std::string& strNewTid, int64_
 uint64_t Store::remove(const std::string& strWhere)
 {
     std::vector<std::string> strTids;
-    eachRow("SELECT tid FROM token WHERE " + strWhere + " ORDER BY tid LIMIT " +
-                std::to_string(audit::PREFIXES_MAX),
-            [&strTids](const Row& row) { strTids.push_back(row[0].value_or("")); });
+    eachTid(strWhere + " ORDER BY tid LIMIT " + std::to_string(audit::PREFIXES_MAX),
+            [&strTids](const auto& strTid) { strTids.push_back(strTid.value_or("")); });
     query("DELETE FROM token WHERE " + strWhere);
     const uint64_t nRemoved = number("SELECT changes()");
     audit::note("deleted", strTids, nRemoved);

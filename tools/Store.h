@@ -29,6 +29,14 @@ public:
     typedef std::function<void(Json::Value jToken, const Row& columns)> TakeToken;
     void eachToken(const std::string& strWhere, const std::string& strColumns, const TakeToken& take);
 
+    // How many tokens a condition in SQL selects; and the id of each, which is nothing for NULL.
+    uint64_t count(const std::string& strWhere);
+    void eachTid(const std::string& strWhere,
+                 const std::function<void(const std::optional<std::string>& strTid)>& take);
+
+    // Whether rows have numbers: those of a table that a stranger made need not.
+    bool hasRowIds();
+
     // Whether there is a token of an id.
     bool has(const std::string& strTid);
 

@@ -572,6 +572,7 @@ $undone" ]
         remake "$old" "$new"
         expect_no_repair error "the table of tokens is not the one that the library makes: it $differences" \
             "calls can fail, spend no use, report what did not happen, or take one token for another" "$SAVE_AND_REPLACE"
+        [ "$(tool list --sort tid --limit 1 --field tid --show-ids 2>/dev/null)" = "aaaaaaaa$ZEROS" ]
         save_and_replace
     done <<'TABLE'
 tid TEXT primary key NOT NULL|tid TEXT|has "tid TEXT", and lacks "tid TEXT primary key NOT NULL"
