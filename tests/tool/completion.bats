@@ -19,7 +19,7 @@ options_of()
 # Files to complete, and in the tool's place a program that tells that it was called.
 prepare()
 {
-    COMPLETION=$BATS_TEST_DIRNAME/../../tools/completion
+    COMPLETION=${TOOL%/tests/*}/tools/completion
     mkdir -p "$DIR/bin" "$DIR/home" "$DIR/files/backups"
     touch "$DIR/files/data file.json" "$DIR/files/backups/tokens"
     printf '#!/bin/sh\ntouch "%s/called"\n' "$DIR" >"$DIR/bin/vemo-access-token"
