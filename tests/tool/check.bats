@@ -83,10 +83,8 @@ END
 }
 
 @test "a malformed token is told as far as the call touches what is wrong with it, by check and grant alike" {
-    local columns arguments result before
     row token---
     while IFS='~' read -r columns arguments result; do
-        echo "$columns $arguments"
         sql "DELETE FROM token"
         row token--- "count = 5, extra = '{}', $columns"
         before=$(sql "SELECT * FROM token")

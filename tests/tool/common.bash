@@ -50,10 +50,11 @@ text_of()
 }
 
 # run_tool ARGUMENTS...: sets $status, $output (standard output), $lines (those of it that are not empty) and $stderr.
-# It does what "run --separate-stderr" does, in a third of the time.
+# It does what "run --separate-stderr" does, in a third of the time. The arguments are shown when a test fails.
 run_tool()
 {
     local streams=$BATS_TEST_TMPDIR.streams
+    echo "vemo-access-token $*"
     status=0
     "$TOOL" "$@" >"$streams" 2>"$streams.errors" || status=$?
     text_of output "$streams"
@@ -106,7 +107,6 @@ refuses()
     local arguments sentence before
     before=$(state)
     while IFS='|' read -r arguments sentence; do
-        echo "$arguments"
         eval "run_tool $* $arguments" </dev/null
         expect 2 "" "vemo-access-token: $sentence"
     done

@@ -39,7 +39,6 @@ OWN=own-$(printf '%0123d' 0)
 
 @test "a note stands in the token's data" {
     tool init
-    local arguments stored
     while IFS='|' read -r arguments stored; do
         [ "$(column extra "$(eval "a_token $arguments")")" = "$stored" ]
     done <<'END'
@@ -52,7 +51,6 @@ END
 
 @test "create prints its record as JSON, as show does" {
     tool init
-    local form
     for form in json jsonl; do
         succeeds create --uid 0 --function VPN --allow A:m --note ü -o $form
         [ "$output" = "$(tool show "$(sql "SELECT tid FROM token")" -o $form)" ]
@@ -63,9 +61,9 @@ END
 }
 
 @test "create refuses options that it cannot use, and touches nothing" {
-    local no_api='names no API: write API or API:METHOD,METHOD'
-    local no_method='has an empty method: write API or API:METHOD,METHOD'
-    local a_token="create --uid 0 --function VPN"
+    no_api='names no API: write API or API:METHOD,METHOD'
+    no_method='has an empty method: write API or API:METHOD,METHOD'
+    a_token="create --uid 0 --function VPN"
     refuses <<END
 create --function VPN|--uid or --user is required
 create --uid 0|--function is required
@@ -127,10 +125,8 @@ END
 }
 
 @test "what is seldom meant is told, and done" {
-    local arguments doubt
     tool init
     while IFS='|' read -r arguments doubt; do
-        echo "$arguments"
         eval "run_tool create --uid 0 --function VPN $arguments"
         [ "$status" -eq 0 ]
         [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
@@ -286,7 +282,7 @@ $OWN|1" ]
     [ "$output" != "$(tool generate)" ]
     [ ! -e "$VEMO_REDIRECT_DIR" ]
     # Any user may.
-    local user=()
+    user=()
     [ "$(id -u)" -ne 0 ] || user=(setpriv --reuid=65534 --regid=65534 --clear-groups)
     ! "${user[@]}" test -x "$TOOL" || "${user[@]}" env -u VEMO_REDIRECT_DIR "$TOOL" generate
 }

@@ -66,10 +66,7 @@ all_fail()
     [ ! -f "$DB" ] || cp -f "$DB" "$DIR/before"
     before=$(ls -Al "$VEMO_REDIRECT_DIR" 2>&1 || true)
     while read -r arguments; do
-        fails 4 "$1" $arguments </dev/null || {
-            echo "of: $arguments"
-            return 1
-        }
+        fails 4 "$1" $arguments </dev/null
     done < <(commands | grep -E -- "${2-.}")
     [ ! -f "$DB" ] || cmp "$DB" "$DIR/before"
     [ "$(ls -Al "$VEMO_REDIRECT_DIR" 2>&1 || true)" = "$before" ]
@@ -97,10 +94,9 @@ leaf()
 @test "each command says what is wrong with the database, and changes nothing" {
     a_store
     cp -p "$DB" "$DIR/sound"
-    local all=. some='^(list$|show .{9}|grant|create|init|tune --wal)' unmade='^(list|show|check|grant|update|rotate|revoke|purge|stats|export|tune)'
+    all=. some='^(list$|show .{9}|grant|create|init|tune --wal)' unmade='^(list|show|check|grant|update|rotate|revoke|purge|stats|export|tune)'
     # Those that only count tokens read the index of their ids.
-    local uncounted='^(list( -o.*)?$|show|check|grant|update|rotate|revoke [^-]|revoke --all --yes|purge|stats|export|import .*other|create)'
-    local damage which sentence finding
+    uncounted='^(list( -o.*)?$|show|check|grant|update|rotate|revoke [^-]|revoke --all --yes|purge|stats|export|import .*other|create)'
     while IFS='|' read -r damage which sentence finding; do
         echo "$damage"
         rm -rf "$VEMO_REDIRECT_DIR"
@@ -190,9 +186,8 @@ TABLE
 @test "a database or a directory that may not be read or written" {
     [ "$(id -u)" -ne 0 ] || skip "root may read and write everything"
     a_store
-    local writing='^(grant|update|revoke [^-]|revoke --all --yes|create|import .*other)'
+    writing='^(grant|update|revoke [^-]|revoke --all --yes|create|import .*other)'
     chmod 0000 "$DB"
-    local arguments
     while read -r arguments; do
         fails 4 "$REAL_DB cannot be opened: Permission denied" $arguments
     done < <(commands)
@@ -235,7 +230,6 @@ TABLE
 
 @test "a word in the place of a number" {
     row token---
-    local field
     for field in uid deadline count create_time; do
         sql "UPDATE token SET uid = 0, deadline = 32503680000, count = 5, create_time = 1;
              UPDATE token SET $field = 'some'"
@@ -255,7 +249,6 @@ TABLE
 
 @test "a number that is no user's" {
     row token---
-    local uid
     for uid in 4294967296 -4294967296 -1 9223372036854775807; do # the first two are 0 in 32 bits
         sql "UPDATE token SET uid = $uid, count = -1"
         run_tool list --no-header --epoch
@@ -266,7 +259,6 @@ TABLE
 
 @test "garbage in the journals hides no tokens" {
     a_store
-    local journal
     for journal in journal wal; do
         head -c 100 /dev/urandom >"$DB-$journal"
         gives 10 list --count

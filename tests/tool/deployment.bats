@@ -43,7 +43,6 @@ paths()
 
 @test "systemd has nothing to say against the units, and leaves the tasks little of root's power" {
     command -v systemd-analyze >/dev/null || skip "systemd-analyze is not installed"
-    local task
     mkdir "$DIR/units" "$DIR/units/service.service.d"
     cp "$DEPLOYMENT/systemd/uses-access-tokens.conf" "$DIR/units/service.service.d"
     printf '[Service]\nExecStart=/bin/true\nProtectSystem=strict\nCapabilityBoundingSet=\n' >"$DIR/units/service.service"
@@ -119,7 +118,6 @@ paths()
 }
 
 @test "a backup is root's alone, can be imported, and is one of seven" {
-    local id day
     id=$(a_token)
     mkdir "$DIR/backups"
     touch "$DIR/backups/of-mine.jsonl"
@@ -128,7 +126,6 @@ paths()
     done
     STATE_DIRECTORY=$DIR/backups task backup
     [ "$status-$output" = 0- ]
-    local file
     file=$(echo "$DIR"/backups/20[2-8]*.jsonl)
     [ "$(echo "$DIR"/backups/*)" = "$(printf "%s " "$file" "$DIR"/backups/2099-01-0{3..8}T000000Z.jsonl)$DIR/backups/of-mine.jsonl" ]
     [ "$(stat -c %a "$file")" = 600 ]
@@ -161,7 +158,6 @@ logout()
 }
 
 @test "the end of a session revokes its tokens, and no others" {
-    local boot others arguments
     boot=$(</proc/sys/kernel/random/boot_id)
     logout
     [ "$told" = "" ] # there is no store
@@ -188,10 +184,9 @@ TABLE
 }
 
 @test "the end of a session tells of tokens that it could not revoke, and does not wait for them" {
-    local boot
     boot=$(</proc/sys/kernel/random/boot_id)
     a_token --bind-sid "$boot-42" >/dev/null
-    local start=$SECONDS
+    start=$SECONDS
     exec 8<>"$VEMO_REDIRECT_DIR.lock"
     flock 8
     logout

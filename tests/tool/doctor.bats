@@ -128,7 +128,7 @@ END
 }
 
 @test "what is worth knowing of a sound store is told in numbers, and is no finding" {
-    local now="strftime('%s', 'now')"
+    now="strftime('%s', 'now')"
     rows <<END
 plain
 soon1|deadline = $now + 86000
@@ -173,9 +173,9 @@ no findings"
 # --- the place
 
 @test "what is missing of the store is made" {
-    local no_store="there is no store yet: no token can be created, and every call fails"
-    local no_tokens="there are no tokens; the first call that needs it makes it"
-    local no_table="every call fails: the table is made together with the file, and never later"
+    no_store="there is no store yet: no token can be created, and every call fails"
+    no_tokens="there are no tokens; the first call that needs it makes it"
+    no_table="every call fails: the table is made together with the file, and never later"
     expect_note "there is no directory $REAL_DIRECTORY" "$no_store" "vemo-access-token init"
     [ ! -e "$VEMO_REDIRECT_DIR" ]
     run_tool doctor --repair
@@ -204,7 +204,6 @@ no findings"
 }
 
 @test "modes that let others in are tightened" {
-    local path name mode
     row aaaaaaaa
     # With a journal that no change is using.
     sql "PRAGMA journal_mode = PERSIST; UPDATE token SET count = 2"
@@ -229,7 +228,7 @@ END
 @test "owners other than root are replaced" {
     [ "$(id -u)" -eq 0 ] || skip "only root can give files away"
     row aaaaaaaa
-    local meaning="its owner can read and change every token, and may have done so"
+    meaning="its owner can read and change every token, and may have done so"
     chown 4000000000 "$DB"
     expect_finding error "$REAL_DB belongs to uid 4000000000" "$meaning" "chown root $REAL_DB, and look at the tokens"
     expect_repair "$REAL_DB belongs to uid 4000000000" "$meaning"
@@ -241,10 +240,9 @@ END
 }
 
 @test "what stands in the place of the directory or the file is left to the administrator, and not opened" {
-    local directory="the tokens stand elsewhere, or nowhere|find out who made it; move the database to a directory of that name"
-    local file="programs work on another file than this one, or on none|find out who made it; move the database to this name"
-    local links="the tokens can be reached under another name, and a journal of that name is not found|find -samefile tells the other names; remove those"
-    local change kind finding meaning remedy before
+    directory="the tokens stand elsewhere, or nowhere|find out who made it; move the database to a directory of that name"
+    file="programs work on another file than this one, or on none|find out who made it; move the database to this name"
+    links="the tokens can be reached under another name, and a journal of that name is not found|find -samefile tells the other names; remove those"
     while IFS='|' read -r change kind finding; do
         echo "$change"
         rm -rf "$DIR/"*
@@ -287,7 +285,6 @@ note: there is no database $REAL_DB
 
 @test "what stands in the place of a journal and is none is left to the administrator, and not opened" {
     row aaaaaaaa
-    local suffix make kind
     for suffix in journal wal shm; do
         while IFS='|' read -r make kind; do
             $make "$DB-$suffix"
@@ -315,8 +312,8 @@ TABLE
     chmod 0720 "$VEMO_REDIRECT_DIR"
     expect_finding error "$REAL_DIRECTORY has mode 0720" "$NOT_PRIVATE" "chmod 0700 $REAL_DIRECTORY"
     chmod 0700 "$VEMO_REDIRECT_DIR"
-    local others="the next program to open the database changes other files, too"
-    local remedy="find out who made it; remove it while no program runs"
+    others="the next program to open the database changes other files, too"
+    remedy="find out who made it; remove it while no program runs"
     # The end of a journal that names another file.
     (umask 077 && printf 'x\331\325\005\371\040\241\143\327' >"$DB-journal")
     expect_no_repair error "$REAL_DB-journal is one of several that belong together" "$others" "$remedy"
@@ -335,7 +332,7 @@ TABLE
 @test "attributes that forbid changes are left to the administrator" {
     row aaaaaaaa
     chattr +a "$DB" 2>/dev/null || skip "no right to set attributes, or a file system without them"
-    local wrong=""
+    wrong=""
     expect_finding error "$REAL_DB is append-only" "$NO_CHANGE" "chattr -a $REAL_DB" || wrong=1
     chattr -a "$DB"
     chattr +i "$DB" "$VEMO_REDIRECT_DIR"
@@ -425,7 +422,6 @@ error: there is no database $REAL_DB
 }
 
 @test "what others change in the middle of a repair is not followed" {
-    local between reason
     while IFS='|' read -r between reason; do
         rm -rf "$DIR/"s*
         tool init >/dev/null
@@ -463,7 +459,6 @@ TABLE
 
 @test "a place that cannot be looked at is a finding" {
     tool init
-    local call
     for call in "openat session" "open $REAL_DIRECTORY" fstatvfs; do
         VEMO_TEST_CALLS="$call|24" expect_finding error "$REAL_DIRECTORY: Too many open files" \
             "programs fail in the same way" "mend the cause; or $REPLACE"
@@ -486,7 +481,7 @@ error: $REAL_DIRECTORY: Too many levels of symbolic links
 
 @test "what an export into the private directory left behind is removed, but not while it is written" {
     row aaaaaaaa
-    local meaning="an export was cut off; the file can hold whole ids"
+    meaning="an export was cut off; the file can hold whole ids"
     install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
     run flock "$VEMO_REDIRECT_DIR/backup.part" "$TOOL" doctor
     [ "$output" = "no findings" ]
@@ -494,7 +489,7 @@ error: $REAL_DIRECTORY: Too many levels of symbolic links
     expect_finding warning "$REAL_DIRECTORY/backup.part was left behind" "$meaning" "remove it"
     chmod 0640 "$DB"
     VEMO_TEST_SYNC=directory run_tool doctor --repair
-    local undone="vemo-access-token: cannot repair: $REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
+    undone="vemo-access-token: cannot repair: $REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
     [ "$status $stderr" = "5 $undone
 $undone" ]
     install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
@@ -508,7 +503,6 @@ $undone" ]
 
 @test "what is left of a file system is enough for a change and for another file, or is not" {
     tool init
-    local room
     for room in "16 4096 0 0" "65536 1 2 1"; do
         VEMO_TEST_ROOM=$room expect_sound
     done
@@ -549,7 +543,6 @@ $undone" ]
 @test "a page that is not one is damage, told on one line and without sending the reader in a circle" {
     many_rows 100
     # The roots of the table and of its index stand on pages 3 and 4; a leaf comes last.
-    local page
     cp "$DB" "$DIR/sound"
     for page in 3 4 "$(sql "PRAGMA page_count")"; do
         cp "$DIR/sound" "$DB"
@@ -566,7 +559,6 @@ $undone" ]
 @test "a table that is not the library's is left to the administrator, and can be replaced" {
     row aaaaaaaa
     row bbbbbbbb
-    local old new differences
     while IFS='|' read -r old new differences; do
         echo "$new"
         remake "$old" "$new"
@@ -595,7 +587,6 @@ TABLE
 }
 
 @test "the library's table in other words is none of another kind, and what only looks like it is" {
-    local made comment
     row aaaaaaaa
     made=$(sql "SELECT sql FROM sqlite_schema WHERE name = 'token'")
     for comment in '/*(*/' $'--(\n'; do
@@ -635,8 +626,8 @@ TABLE
     row aaaaaaaa
     row bbbbbbbb
     tool export "$DIR/backup"
-    local made_up="programs read what it makes up, and their changes fail or go elsewhere"
-    local fails="every call that reads or writes a token fails" statements what meaning
+    made_up="programs read what it makes up, and their changes fail or go elsewhere"
+    fails="every call that reads or writes a token fails"
     while IFS='|' read -r statements what meaning; do
         sql "$statements"
         expect_no_repair error "$what" "${!meaning}" "$REPLACE"
@@ -651,7 +642,6 @@ TABLE
 
 @test "triggers and indexes that take part in changes are left to the administrator, and can be dropped" {
     row aaaaaaaa
-    local kind trigger index meaning statement names dropped remedy
     trigger="a trigger on the table of tokens|it runs in every change that it is for: calls can report what did not happen, change other tokens, fail, or never end"
     index="an index on the table of tokens that does not only find them|changes can fail, and a grant can delete other tokens: those that a unique index takes for the same"
     while IFS='|' read -r kind statement names dropped; do
@@ -705,8 +695,8 @@ TABLE
 # --- journals
 
 @test "a journal that was left behind is a finding, and undone by looking" {
-    local kept="SELECT function, count(*) FROM token GROUP BY 1; PRAGMA integrity_check"
-    local meaning="a program or the machine stopped in the middle of a change"
+    kept="SELECT function, count(*) FROM token GROUP BY 1; PRAGMA integrity_check"
+    meaning="a program or the machine stopped in the middle of a change"
     half_change
     touch -d "1 hour ago" "$DB-journal"
     expect_finding warning "$REAL_DB-journal was left behind" "$meaning" \
@@ -782,7 +772,6 @@ SQL
 # --- tokens
 
 @test "tokens that the library does not write are left to the administrator, and can be mended or revoked" {
-    local deep
     deep=$(printf '{"a":%.0s' {1..100})7$(printf '}%.0s' {1..100})
     rows <<TABLE
 uid-high|uid = 4294967296
@@ -813,7 +802,6 @@ deep---1|extra = '{"b":$deep}'
 deep---2|webapi_allow = '{"A":{"method":[],"x":$deep}}'
 sound---|count = '7'
 TABLE
-    local findings
     findings=$(cat <<'END'
 error: no whole number where there should be one in 4 tokens (number-1, number-2, number-3, number-4)
     meaning: it is read as another number, 0 for a word: deadline or uses are not what they seem
@@ -851,7 +839,6 @@ END
     expect 5 "$findings"
     run_tool doctor --repair
     expect 5 "$findings"
-    local name
     for name in object-1 object-4 object-7 nested-1 nested-2 no-list1 deep---2; do
         tool update "$name" --allow A:get,put
     done
@@ -866,8 +853,8 @@ END
 
 @test "an id that no call can name is left to the administrator, and its token can be deleted" {
     row sound
-    local condition="typeof(tid) = 'text' AND (tid = '' OR instr(tid, char(0)))" value
-    local remedy="sqlite3 $REAL_DB \"DELETE FROM token WHERE $condition\""
+    condition="typeof(tid) = 'text' AND (tid = '' OR instr(tid, char(0)))"
+    remedy="sqlite3 $REAL_DB \"DELETE FROM token WHERE $condition\""
     for value in "''" "char(0)" "'aaaaaaaa' || char(0) || '$ZEROS'"; do
         row aaaaaaaa "tid = $value"
         run_tool doctor --repair
@@ -893,16 +880,16 @@ null---5|extra = NULL
 null---6|webapi_allow = '[]', extra = NULL
 null---7|webapi_allow = '[]', uid = NULL
 END
-    local what="a NULL in 8 tokens (null---0, null---1, null---2, null---3, null---4, ...)"
-    local meaning="such a token cannot be read or granted, and every listing that meets it fails"
+    what="a NULL in 8 tokens (null---0, null---1, null---2, null---3, null---4, ...)"
+    meaning="such a token cannot be read or granted, and every listing that meets it fails"
     expect_finding error "$what" "$meaning" "delete them: vemo-access-token doctor --repair"
     expect_repair "$what" "$meaning"
     expect_left sound
 }
 
 @test "texts are made of bytes in place of a text, which no look-up finds" {
-    local what="bytes where there should be a text in 3 tokens (bytes-1x, bytes-2x, bytes-3x)"
-    local meaning="no look-up by that field finds such a token"
+    what="bytes where there should be a text in 3 tokens (bytes-1x, bytes-2x, bytes-3x)"
+    meaning="no look-up by that field finds such a token"
     rows <<'END'
 sound
 bytes-1x|tid = tid || 'x'
@@ -927,9 +914,9 @@ END
 }
 
 @test "a backlog of expired tokens is purged, but not what was meant to last for ever" {
-    local backlog="expired for more than an hour: 6 tokens (expired1, expired2, expired3, expired4, expired5, ...)
+    backlog="expired for more than an hour: 6 tokens (expired1, expired2, expired3, expired4, expired5, ...)
     meaning: no program has called since, or its purges fail"
-    local never='warning: a deadline of 0 or less in 1 token (meant-to)
+    never='warning: a deadline of 0 or less in 1 token (meant-to)
     meaning: there is no value for "never": the next purge deletes them
     remedy: update --ttl gives them time'
     rows <<'END'
@@ -960,9 +947,9 @@ $never"
 aaaaaaaa|deadline = 1
 bbbbbbbb|deadline = 0
 END
-    local never='{"finding":"a deadline of 0 or less in 1 token (bbbbbbbb)","meaning":"there is no value for \"never\": the next purge deletes them","remedy":"update --ttl gives them time","repaired":false,"severity":"warning"}'
-    local old='{"finding":"expired for more than an hour: 1 token (aaaaaaaa)","meaning":"no program has called since, or its purges fail","remedy":"vemo-access-token purge","repaired":false,"severity":"warning"}'
-    local mode="{\"finding\":\"$REAL_DB has mode 0750\",\"meaning\":\"$NOT_PRIVATE\",\"remedy\":\"chmod 0700 $REAL_DB\",\"repaired\":false,\"severity\":\"error\"}"
+    never='{"finding":"a deadline of 0 or less in 1 token (bbbbbbbb)","meaning":"there is no value for \"never\": the next purge deletes them","remedy":"update --ttl gives them time","repaired":false,"severity":"warning"}'
+    old='{"finding":"expired for more than an hour: 1 token (aaaaaaaa)","meaning":"no program has called since, or its purges fail","remedy":"vemo-access-token purge","repaired":false,"severity":"warning"}'
+    mode="{\"finding\":\"$REAL_DB has mode 0750\",\"meaning\":\"$NOT_PRIVATE\",\"remedy\":\"chmod 0700 $REAL_DB\",\"repaired\":false,\"severity\":\"error\"}"
     chmod 0750 "$DB"
     run_tool doctor -o jsonl
     expect 5 "$mode

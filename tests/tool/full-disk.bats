@@ -24,7 +24,6 @@ on_full_disk()
 FULL="vemo-access-token: /usr/vemo/etc/private/session/vemo-access-token.db failed: database or disk is full"
 
 @test "what has no room on the disk is not done, and says so" {
-    local i
     for i in {100..400}; do
         printf '{"bind_sid":"","count":1,"create_time":0,"deadline":9999999999,"extra":{},"function":"VPN",'
         printf '"tid":"%0127d","uid":0,"webapi_allow":{}}\n' "$i"

@@ -19,7 +19,6 @@ uses()
 }
 
 @test "a grant spends one use and changes nothing else; the last one deletes the token, and 0 is a last use like 1" {
-    local arguments name
     rows <<'END'
 token---
 most----|count = 9223372036854775807
@@ -53,7 +52,6 @@ token---
 last----|count = 1
 END
     all_tokens >"$DIR/before"
-    local arguments reason
     while IFS='|' read -r arguments reason; do
         run_tool check $arguments
         expect 1 "refused: $reason"
@@ -71,7 +69,6 @@ END
 }
 
 @test "a grant needs the whole id, which may come from standard input" {
-    local tid hint
     row token---
     while IFS='|' read -r tid hint; do
         fails 1 "refused: unknown token$hint" grant "$tid" Api get
@@ -154,7 +151,6 @@ END
 }
 
 @test "a grant gives JSON, with the token as it was, but for its id" {
-    local form record
     row token---
     for form in json jsonl; do
         record=$(tool show token--- -o jsonl | sed "s/\"tid\":\"[^\"]*\",//")

@@ -27,7 +27,6 @@ made the table of tokens"
 }
 
 @test "the modes are those of private files whatever the umask" {
-    local mask
     for mask in 0000 0077 0277 0777; do
         rm -rf "$VEMO_REDIRECT_DIR"
         run --separate-stderr bash -c 'umask "$1" && "$0" init' "$TOOL" "$mask"
@@ -71,7 +70,6 @@ made the table of tokens" init
 }
 
 @test "init says why it cannot make what is missing, and what a power cut can undo" {
-    local call act sentence
     while IFS='|' read -r call act sentence; do
         rm -rf "$VEMO_REDIRECT_DIR"
         VEMO_TEST_CALLS="$call|$act" run_tool init
@@ -91,7 +89,6 @@ TABLE
 @test "init does not say that it made what another program makes in the same moment" {
     tool init
     cp -p "$DB" "$DIR/made"
-    local call command output_then
     while IFS='|' read -r call command output_then; do
         rm -r "$VEMO_REDIRECT_DIR"
         VEMO_TEST_CALLS="$call|$command" gives "$(printf '%b' "$output_then")" init
@@ -103,7 +100,6 @@ TABLE
 }
 
 @test "init says what has the name of the table, and makes none beside it" {
-    local statement sentence
     while IFS='|' read -r statement sentence; do
         rm -rf "$VEMO_REDIRECT_DIR"
         tool init
@@ -146,7 +142,7 @@ no findings"
 }
 
 @test "init makes no table before the file is on the disk, and tells what a power cut can undo" {
-    local sentence="vemo-access-token: $REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
+    sentence="vemo-access-token: $REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
     VEMO_TEST_SYNC=directory run_tool init
     expect 4 "" "$sentence"

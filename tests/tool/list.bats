@@ -16,7 +16,6 @@ selects()
     local letters arguments before
     before=$(state)
     while IFS='|' read -r letters arguments; do
-        echo "$arguments"
         if [ "$letters" ]; then
             letters=${letters//?/&------- }
             eval "lists '${letters% }' $arguments $*"
@@ -60,7 +59,6 @@ later---  4294967294  VPN         unlimited  $(at $((now + 200000)))  in 2 d    
     tool init
     run_tool list -o json
     expect 0 "[]" "vemo-access-token: no token matches"
-    local arguments
     for arguments in "" "-o jsonl" "--field uid"; do
         none_matches $arguments
     done
@@ -70,7 +68,7 @@ later---  4294967294  VPN         unlimited  $(at $((now + 200000)))  in 2 d    
 }
 
 @test "times are in local time, in UTC or in seconds" {
-    local columns='s/.* 1  (.*)  (in|expired) .*/\1/'
+    columns='s/.* 1  (.*)  (in|expired) .*/\1/'
     rows <<'END'
 winter--|deadline = strftime('%s', '2099-01-25 09:00:00')
 summer--|deadline = strftime('%s', '2099-07-23 09:00:00')
@@ -269,7 +267,7 @@ END
     gives 0 list --count --opens A:m
     # For the API alone, it does not matter what stands there: as for a grant.
     lists "at000006 at000007 at000008 at000009 at000010" --opens A --sort tid
-    local tid allowed=
+    allowed=
     for tid in at0000{01..10}; do
         [ "$(tool check $tid A m)" = "refused: malformed token" ]
         [ "$(tool check $tid A)" != allowed ] || allowed+=" $tid"

@@ -54,7 +54,6 @@ options_of()
 }
 
 @test "the page describes each command's options, all of them and no others" {
-    local common command
     common=$(section DESCRIPTION | grep '^\.It' | long_options)
     [ "$common" = "--help
 --verbose
@@ -91,7 +90,7 @@ locked()
 @test "what the page explains under diagnostics is what the tool says" {
     ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
     [[ $(ldd "$TOOL" 2>&1) != *"not a dynamic executable"* ]] || skip "valgrind takes more memory"
-    local sentence calls not_root=(env -u VEMO_REDIRECT_DIR)
+    not_root=(env -u VEMO_REDIRECT_DIR)
     [ "$(id -u)" -ne 0 ] || not_root+=(setpriv --reuid=65534 --regid=65534 --clear-groups)
     "${not_root[@]}" test -x "$TOOL" || skip "uid 65534 cannot reach the build directory"
     while IFS='|' read -r sentence calls; do
@@ -192,7 +191,6 @@ tool_on_path()
 }
 
 @test "the examples of the page do what it says, one after the other" {
-    local block i
     mkdir "$DIR/blocks"
     tool_on_path
     tool init
@@ -234,7 +232,6 @@ tool_on_path()
     before=$(all)
 
     # What the new machine is asked, and what becomes of it.
-    local fault
     while read -r fault; do
         echo "$fault"
         rm -rf "$DIR/new"

@@ -47,7 +47,6 @@ beside()
 }
 
 @test "reading many tokens takes little memory and holds nobody up" {
-    local arguments lines
     while read -r lines arguments; do
         # shellcheck disable=SC2086 # several arguments
         beside $arguments

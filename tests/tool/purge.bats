@@ -34,7 +34,6 @@ END
 # What a command tells of the store must be on the disk. Where it is not known to be, the command fails.
 @test "what is told outlasts a power cut, that others changed it too" {
     row token---
-    local arguments
     while read -r arguments; do
         VEMO_TEST_SYNC=directory fails 4 \
             "$REAL_DIRECTORY: Input/output error; a power cut can undo what others changed last" $arguments
@@ -56,7 +55,6 @@ TABLE
 
 @test "purge gives the space of what it deletes back" {
     tool init
-    local size
     size=$(stat -c %s "$DB")
     many_rows 100 "deadline = 1, extra = hex(zeroblob(1000))"
     [ "$(stat -c %s "$DB")" -gt 200000 ]

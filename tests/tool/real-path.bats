@@ -63,7 +63,7 @@ made the table of tokens"
     run_inside create --user root --function VPN --allow Api:get --ttl 90m
     [ "$status$stderr" = 0 ]
     [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
-    local id=$output
+    id=$output
     run_inside list --no-header
     [ "$status" -eq 0 ]
     [[ $output =~ ^${id:0:8}\ \ root\ \ VPN\ +1\ \ [0-9]{4}-[0-9]{2}-[0-9]{2}\ [0-9:]{8}\ \ in\ 1\ h\ +Api:get$ ]]
@@ -114,7 +114,7 @@ warning: /usr/vemo/etc/private belongs to uid 0 and has mode 0775
     [ "$(inside stat -c '%u %a' /usr/vemo/secret)" = "1 604" ]
     inside rm "$REAL_DB"
     run_inside init
-    local round swap='import ctypes, sys
+    swap='import ctypes, sys
 rename = ctypes.CDLL(None).renameat2
 while 0 == rename(-100, sys.argv[1].encode(), -100, sys.argv[2].encode(), 2): # exchanges the two
     pass'
@@ -132,7 +132,7 @@ while 0 == rename(-100, sys.argv[1].encode(), -100, sys.argv[2].encode(), 2): # 
     setpriv --reuid=65534 --clear-groups test -x "$PLAIN" || skip "uid 65534 cannot reach the build directory"
     # As a program of mode 4755 would run it. But AddressSanitizer's search for leaks must trace the process, which
     # is not possible then; and a script in the tool's place would make its effective uid the real one again.
-    local arguments as=--euid=65534
+    as=--euid=65534
     if grep -q __asan_init "$PLAIN" || [[ $(ldd "$PLAIN" 2>&1) == *"not a dynamic executable"* ]]; then
         as=--reuid=65534
     fi
@@ -150,7 +150,7 @@ while 0 == rename(-100, sys.argv[1].encode(), -100, sys.argv[2].encode(), 2): # 
 @test "a disk that may not be written to is a failure, and nothing was changed" {
     run_inside init
     run_inside create --uid 0 --function VPN --allow Api:get
-    local id=$output
+    id=$output
     inside mount --bind "$REAL_DIRECTORY" "$REAL_DIRECTORY"
     inside mount -o remount,bind,ro "$REAL_DIRECTORY"
     run_inside grant "$id" Api get

@@ -32,7 +32,6 @@ END
 }
 
 @test "revoke takes prefixes of 8 characters or more, and whole ids whatever their length" {
-    local tid
     tool init
     for tid in Abcdefgh1 Abcdefgh2 abcdefgh1 Xbcdefgh Xbcdefghi short -begins-with-a-dash; do
         row "$tid" "tid = '$tid'"
@@ -72,7 +71,6 @@ END
 }
 
 @test "selectors choose the tokens, and those that fit all of several" {
-    local selectors revoked left
     six_tokens
     cp "$DB" "$DIR/six"
     while IFS='|' read -r selectors revoked; do
@@ -93,7 +91,6 @@ TABLE
 }
 
 @test "--dry-run tells how many, asks nothing and changes nothing" {
-    local arguments number
     six_tokens
     sql "UPDATE token SET uid = 4294967294 WHERE tid LIKE 'a%'; UPDATE token SET count = -1 WHERE tid LIKE 'b%';
          UPDATE token SET deadline = 5 WHERE tid LIKE 'c%';
@@ -123,8 +120,8 @@ TABLE
     six_tokens
     row Abcdefgh1
     row Abcdefgh2
-    local nobody="repeat with --yes: there is nobody to ask"
-    local ways="say which tokens: by TID, by options that select, or --all"
+    nobody="repeat with --yes: there is nobody to ask"
+    ways="say which tokens: by TID, by options that select, or --all"
     refuses revoke <<TABLE
 --all|$nobody
 --uid 0|$nobody

@@ -13,7 +13,6 @@ kept()
 }
 
 @test "rotate moves a token to a fresh id, to the byte, and prints that" {
-    local before now
     row token---
     row another-
     before=$(kept "s/^'token---$ZEROS'/'fresh'/")
@@ -24,14 +23,13 @@ kept()
     [ "$(kept "s/^'$output'/'fresh'/" | sort)" = "$(sort <<<"$before")" ]
     [ "$(sql "SELECT create_time BETWEEN $now AND $(date +%s) FROM token WHERE tid = '$output'")" = 1 ]
     # A whole id, from standard input.
-    local first=$output
+    first=$output
     run_tool rotate - <<<"$first"
     [ "$status" -eq 0 ]
     [ "$(sql "SELECT group_concat(tid, ' ') FROM (SELECT tid FROM token ORDER BY rowid)")" = "another-$ZEROS $output" ]
 }
 
 @test "--grace leaves the old token for a time, and never gives it more" {
-    local grace left
     while IFS='|' read -r grace left; do
         rm -rf "$VEMO_REDIRECT_DIR"
         row token--- "deadline = strftime('%s', 'now') + 7200"
@@ -60,14 +58,13 @@ token--1 --grace 0|--grace: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 
 token--1 --grace -1|--grace: "-1" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
 token--1 token--2|unexpected argument "token--2"
 END
-    local before
     before=$(state)
     fails 3 "there is no such token" rotate unknown-
     [ "$(state)" = "$before" ]
 }
 
 @test "where the fresh id cannot be printed, the old token is as it was" {
-    local grace before reason="cannot write the result: No space left on device"
+    reason="cannot write the result: No space left on device"
     row token---
     before=$(sql "SELECT * FROM token")
     for grace in "" "--grace 1m" "--grace 365250d"; do
@@ -103,7 +100,6 @@ interrupted()
 }
 
 @test "an interrupt takes the rotation back, but no use that was spent meanwhile" {
-    local before
     row token---
     before=$(sql "SELECT * FROM token")
     interrupted "" token---

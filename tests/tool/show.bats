@@ -102,7 +102,7 @@ END
 
 @test "texts are stored as they are given, and come through exactly in JSON and harmless in tables" {
     export LC_ALL=C.UTF-8
-    local text json field expires shown='a'\''b"c\d\x5cx41\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff;--'
+    shown='a'\''b"c\d\x5cx41\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff;--'
     text=$'a\'b"c\\d\\x41\ne\tf\e[31m\xc2\x9bÄ漢\xff;--'
     # What is not UTF-8 stays as it is stored; whoever reads it decides.
     json=$'a\'b\\"c\\\\d\\\\x41\\ne\\tf\\u001b[31m\\u009bÄ漢\xff;--'
@@ -215,7 +215,6 @@ END
 }
 
 @test "show spends and purges nothing, and says so where there is no such token" {
-    local form tid before
     row a------- "deadline = -1"
     row b------- "count = 0"
     before=$(state)

@@ -82,7 +82,7 @@ Web   1
     some_tokens
     run_tool stats -o jsonl
     expect 0 '{"expired":2,"file_bytes":16384,"free_pages":0,"functions":[{"function":"VPN","tokens":2},{"function":"Mail","tokens":1},{"function":"Web","tokens":1}],"page_bytes":4096,"tokens":4,"unlimited":2,"users":[{"tokens":3,"uid":0,"user":"root"},{"tokens":1,"uid":4000000000,"user":""}]}'
-    local line=$output
+    line=$output
     run_tool stats --output json
     [ "$status" -eq 0 ]
     [ "${lines[0]}" = "{" ]
@@ -136,7 +136,7 @@ vemo_access_token_no_api_tokens 4
 # TYPE vemo_access_token_old_unlimited_tokens gauge
 vemo_access_token_old_unlimited_tokens 2'
     tool stats --prometheus | check_metrics
-    local metrics=$output
+    metrics=$output
     gives "$metrics" stats -o metrics
     # Expired tokens do not count as expiring.
     sql "UPDATE token SET webapi_allow = '{\"Api\":{\"method\":[]}}', create_time = strftime('%s', 'now') WHERE tid < 'c';
@@ -188,7 +188,6 @@ vemo_access_token_old_unlimited_tokens 0' ]
     some_tokens
     sql "PRAGMA auto_vacuum = NONE; VACUUM; UPDATE token SET extra = hex(zeroblob(20000));
          UPDATE token SET extra = '{}'"
-    local free size
     free=$(sql "PRAGMA freelist_count")
     size=$(stat -c %s "$DB")
     [ "$free" -gt 30 ]

@@ -26,7 +26,6 @@ below()
 }
 
 @test "an id is asked for, and not shown" {
-    local id shown arguments
     id=$(a_token --allow Api --unlimited)
     while IFS='|' read -r arguments shown; do
         VEMO_TEST_WIPED=$DIR/wiped on_terminal --answer "Token id: " "$id"$'\r' -- $arguments
@@ -51,7 +50,6 @@ $id" # the result
 
 @test "a prompt can be answered with nothing" {
     row token---
-    local reply
     for reply in $'\r' $'\x04'; do
         on_terminal --answer "Token id: " "$reply" -- show -
         expect 2 "Token id: 
@@ -92,7 +90,6 @@ modes: as before" ]
 }
 
 @test "many tokens are revoked when the answer is yes, and left alone at any other" {
-    local reply selection
     rows <<'END'
 first|bind_sid = 's'
 second|bind_sid = 's'
@@ -146,7 +143,6 @@ END
 }
 
 @test "expired tokens are red" {
-    local id expired
     id=$(a_token --ttl 90m | cut -c1-8)
     expired=$(a_token | cut -c1-8)
     # Both times show the same for half an hour.
@@ -158,7 +154,7 @@ END
     [[ ${lines[0]} == "${ESC}[31m$expired  root  VPN "*"${ESC}[0m" ]]
     [[ ${lines[1]} == "$id  root  VPN "* ]]
     [[ ${lines[1]} != *"$ESC"* ]]
-    local coloured=$output
+    coloured=$output
     on_terminal --columns 200 -- list --no-header --epoch --verbose
     expect 0 "$coloured"
     on_terminal --columns 400 -- show "$expired" --no-header
@@ -205,7 +201,6 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
 }
 
 @test "long values go on in the next line, and lose nothing" {
-    local id function allow
     function=$(printf 'function-%.0s' {1..10})
     allow=Example.$(printf 'Long%.0s' {1..20}):get,list,$(printf 'put%.0s' {1..20})
     tool init
@@ -220,13 +215,12 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
     [ "$(wc -L <<<"$output")" -eq 60 ]
     # A terminal that does not know its width is taken for one of 80 columns.
     on_terminal --columns 80 -- list
-    local known=$output
+    known=$output
     on_terminal --columns 0 -- list
     expect 0 "$known"
     on_terminal --columns 60 -- show "$id"
     [ "$status" -eq 0 ]
     [ "$(awk 'length > 60' <<<"$output")" = "" ]
-    local values
     values=$(below VALUE)
     [[ $values == "$id"'session-\x070'* ]]
     [[ $values == *"$function$(tool show "$id" --field webapi_allow){}" ]]
@@ -242,7 +236,6 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
 
 # Short values are what people copy or compare; other columns can become narrower.
 @test "short values are not broken for the sake of long ones, and words only where they are very long" {
-    local id
     id=$(a_token --allow "$(printf 'Example.Long%.0s' {1..20})" --allow Api:get,list --bind-sid "$(printf 's%.0s' {1..100})")
     sql "UPDATE token SET function = 'nightly backup', uid = 1, deadline = $(($(date +%s) + 1000 * 86400 + 600))"
     on_terminal --columns 60 -- list --utc
@@ -252,7 +245,6 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
     on_terminal --columns 10 -- stats
     [[ $output == *$'\nfree pages of 4096 bytes       0\n'* && $output == *$'\n  1  daemon       1' ]]
     on_terminal --columns 24 -- show "$id"
-    local field
     for field in tid bind_sid uid deadline count create_time function webapi_allow extra; do
         grep -q "^$field  " <<<"$output"
     done
@@ -262,7 +254,6 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
 
 @test "a list leaves out what a terminal has no room for, unless it was asked for" {
     row token--- "deadline = $(($(date +%s) + 1000 * 86400 + 600)), bind_sid = 'session-1'"
-    local columns titles
     while IFS='|' read -r columns titles; do
         on_terminal --columns "$columns" -- list
         [ "${lines[0]}" = "$titles" ]
@@ -325,7 +316,6 @@ TABLE
     ID=$(tool create --uid 0 --function "$EVIL" --bind-sid "$EVIL" --allow "$EVIL:$EVIL" \
         --extra '{"x": "\u001b[31m\u007f\u009b\u202e\udb40\udc41"}')
     row doomed-- "tid = '${EVIL:6}', deadline = 0"
-    local locale
     for locale in C C.UTF-8; do
         cp "$DB" "$DIR/copy"
         in_all_forms "$locale"
@@ -344,10 +334,9 @@ TABLE
 }
 
 @test "text of any language stays readable on the terminal" {
-    local name=$'Zoe\u0308 Ünal, สมชาย, नमस्ते, שלום, مرحبا, 日本'
+    name=$'Zoe\u0308 Ünal, สมชาย, नमस्ते, שלום, مرحبا, 日本'
     tool init
     tool create --uid 0 --function "$name" >/dev/null
-    local arguments
     for arguments in list "list -o json" "list --field function" "stats --prometheus" export; do
         on_terminal --columns 200 -- $arguments
         [ "$status" -eq 0 ]
@@ -425,7 +414,6 @@ vemo-access-token: 2 tokens exported"
     many_rows 300
     tool export "$DIR/file"
     sql "DELETE FROM token"
-    local arguments
     for arguments in "import $DIR/file" tune; do
         # It is stopped as soon as the bar shows, and let go when another program has worked.
         /usr/bin/python3 - "$TOOL" $arguments >"$DIR/id" <<'END'

@@ -56,7 +56,6 @@ odd_tokens()
     expect 0 "$(written A | whole)" "vemo-access-token: 1 token exported"
     row B "bind_sid = 's', uid = 1000, deadline = 1, count = -1, create_time = 5, function = 'Mail',
            webapi_allow = '{\"Example.File\":{\"method\":[\"get\"]}}', extra = '{\"a\":[1.5,\"é\"]}'"
-    local text
     text=$({
         written A
         printf '%s"%s"%s\n' '{"bind_sid":"s","count":-1,"create_time":5,"deadline":1,"extra":{"a":[1.5,"é"]},"function":"Mail","tid":' \
@@ -73,7 +72,6 @@ odd_tokens()
 }
 
 @test "an export of a selection is a whole export of these tokens" {
-    local arguments letters
     rows <<'END'
 A|uid = 4294967294, create_time = 7
 B|count = -1, webapi_allow = '{"Api":{"method":["get"]}}'
@@ -98,7 +96,6 @@ TABLE
 }
 
 @test "export replaces a file in one step by one of mode 0600, whatever the umask" {
-    local mask
     row A
     mkdir "$DIR/out"
     cd "$DIR/out"
@@ -119,7 +116,7 @@ TABLE
 @test "an export that fails leaves what was there, and nothing else" {
     many_rows 10
     mkdir "$DIR/out"
-    local limited='trap "" XFSZ; ulimit -f 1; exec "$0" "$@"'
+    limited='trap "" XFSZ; ulimit -f 1; exec "$0" "$@"'
     run --separate-stderr bash -c "$limited" "$TOOL" export "$DIR/out/file"
     expect 4 "" "vemo-access-token: $DIR/out/file: File too large"
     [ "$(ls -A "$DIR/out")" = "" ]
@@ -137,7 +134,7 @@ TABLE
     mkfifo fifo
     ln -s out/file link
     ln -s there here
-    local irregular="is not a regular file; to write to a pipe, write to standard output"
+    irregular="is not a regular file; to write to a pipe, write to standard output"
     refuses export <<TABLE
 out|out $irregular
 fifo|fifo $irregular
@@ -160,7 +157,6 @@ TABLE
     ln "$DB-wal" "$DIR/linked-wal"
     ln "$VEMO_REDIRECT_DIR.lock" "$DIR/linked-lock"
     cp "$DB" "$DIR/before"
-    local file
     for file in "$REAL_DB" "$DB" "$DB-journal" "$DB-wal" "$DB-shm" "$DB-backup" "$DIR/linked" "$DIR/linked-wal" \
         "$DIR/linked-lock" "$VEMO_REDIRECT_DIR.lock"; do
         fails 2 "$file belongs to the database; choose another name" export "$file"
@@ -188,8 +184,8 @@ vemo-access-token: /run/vemo-access-token.lock belongs to the database; choose a
     chmod 0755 "$DIR" # whatever the umask
     mkdir -m 0777 "$DIR/theirs"
     written A | whole >"$DIR/secret"
-    local linked="has other names besides, and others can change its directory; copy it to a place of yours"
-    local make calls sentence theirs=$DIR/theirs/file secret=$DIR/secret
+    linked="has other names besides, and others can change its directory; copy it to a place of yours"
+    theirs=$DIR/theirs/file secret=$DIR/secret
     # They can also remove or replace it before or after it is opened.
     while IFS='|' read -r make calls sentence; do
         rm -f "$theirs"
@@ -211,7 +207,7 @@ TABLE
 @test "an export leaves a file of another alone, and removes what an export has left behind" {
     row A
     touch "$DIR/file"
-    local in_the_way="vemo-access-token: $DIR/file.part is in the way: another export is writing it, or it is none's"
+    in_the_way="vemo-access-token: $DIR/file.part is in the way: another export is writing it, or it is none's"
     install -m 0601 /dev/null "$DIR/file.part"
     run_tool export "$DIR/file"
     expect 4 "" "$in_the_way"
@@ -252,7 +248,7 @@ file.part" ]
 
 @test "where an export needs a name, it leaves nothing when it fails, and leaves the files of others alone" {
     row A
-    local another="is in the way: another export is writing it, or it is none's" there calls sentence left
+    another="is in the way: another export is writing it, or it is none's"
     while IFS=% read -r there calls sentence left; do
         rm -rf "$DIR/out"
         mkdir "$DIR/out"
@@ -293,7 +289,7 @@ TABLE
     row B
     cp "$DB" "$DIR/sound"
     echo old >"$DIR/file"
-    local keeps="; \"sqlite3 $REAL_DB '.backup FILE'\" keeps all" change reason told
+    keeps="; \"sqlite3 $REAL_DB '.backup FILE'\" keeps all"
     while IFS='~' read -r change reason; do
         echo "$change"
         sql "UPDATE token SET $change WHERE tid LIKE 'B%'"
@@ -329,7 +325,7 @@ TABLE
 @test "a number that is too large comes back as the library reads it, or is told" {
     row A0000000 "extra = '{\"a\":1e400,\"b\":[-1e400]}'"
     run_tool show A0000000 --field extra
-    local read=$output
+    read=$output
     run_tool export "$DIR/file"
     if [ "$read" = '{"a":Infinity,"b":[-Infinity]}' ]; then
         expect 0 "" "vemo-access-token: 1 token exported"
@@ -363,7 +359,7 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
 # --- import
 
 @test "tokens come back from an export as they were, whatever they hold" {
-    local count=$((500 * ${VEMO_TEST_FACTOR-1}))
+    count=$((500 * ${VEMO_TEST_FACTOR-1}))
     odd_tokens $count
     all_rows >"$DIR/rows"
     [ "$(wc -l <"$DIR/rows")" -eq $((1 + count)) ]
@@ -377,7 +373,6 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
 
 @test "tokens move through a pipe to a machine that has no database yet" {
     odd_tokens 10
-    local there
     there=$(all_rows)
     mkdir -m 0700 "$DIR/other"
     run --separate-stderr bash -c '"$0" export 2>/dev/null | VEMO_REDIRECT_DIR=$1 "$0" import -' "$TOOL" "$DIR/other"
@@ -389,7 +384,6 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
 
 @test "an object nested as deeply as create takes comes back from an export" {
     tool init
-    local deep
     deep=$(printf '{"a":%.0s' {1..999})1$(printf '}%.0s' {1..999})
     tool create --uid 0 --function VPN --extra "$deep"
     tool export "$DIR/file"
@@ -409,7 +403,6 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
     tool init
     cp "$DB" "$DIR/before"
     written A B | whole >"$DIR/whole"
-    local edit tokens flaw
     while IFS=';' read -r edit tokens flaw; do
         echo "$edit"
         eval "$edit" <"$DIR/whole" >"$DIR/file"
@@ -440,7 +433,6 @@ TABLE
     tool init
     cp "$DB" "$DIR/before"
     written A B | whole >"$DIR/whole"
-    local edit reason option deep
     deep=$(printf '{"a":%.0s' {1..1000})1$(printf '}%.0s' {1..1000})
     while IFS='~' read -r edit reason; do
         echo "$edit"

@@ -81,7 +81,6 @@ ok" ]
 
 @test "tune --deadline-only makes the index that grants need, and drops the others" {
     a_store
-    local before
     for before in no yes; do
         run_tool tune --deadline-only
         expect_change $before yes delete delete $before no
@@ -111,7 +110,6 @@ ok" ]
 }
 
 @test "what tune has changed when it fails is told" {
-    local arguments journal made
     while IFS='|' read -r arguments journal made; do
         a_store
         VEMO_TEST_SYNC=directory run_tool tune $arguments
@@ -158,12 +156,10 @@ TABLE
 }
 
 @test "tune --dry-run tells what it would do, and changes nothing at all" {
-    local mode arguments statements
     a_store
     for mode in delete wal; do
         sql "PRAGMA journal_mode = $mode" >/dev/null
         cp "$DB" "$DIR/before"
-        local changed
         changed=$(stat -c %y "$DB")
         while IFS='|' read -r arguments statements; do
             succeeds tune --dry-run $arguments
@@ -192,7 +188,6 @@ TABLE
     a_store
     tool tune
     [[ $(sql "EXPLAIN QUERY PLAN DELETE FROM token where deadline < strftime('%s', 'now');") == *"USING "*"INDEX token_deadline (deadline<?)"* ]]
-    local column
     for column in bind_sid function; do
         [[ $(sql "EXPLAIN QUERY PLAN SELECT * FROM token WHERE $column='x';") == *"USING INDEX token_$column ($column=?)"* ]]
     done

@@ -6,10 +6,9 @@ load common
 ROW="'session-1', 0, 9999999999, 5, 1000000000, 'VPN', '{\"Api\":{\"method\":[\"get\"]}}', '{\"n\":[1,\"ü\"]}'"
 
 @test "each option changes its field, and no other" {
-    local arguments columns="bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra"
+    columns="bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra"
     echo '{"file":1}' >"$DIR/extra"
     while IFS='|' read -r arguments set; do
-        echo "$arguments"
         rm -rf "$VEMO_REDIRECT_DIR"
         rows <<<"token---
 likewise|$set
@@ -67,7 +66,6 @@ END
 @test "what a token opens can be replaced, extended and reduced" {
     row token---
     while IFS='|' read -r stored arguments result; do
-        echo "$stored $arguments"
         sql "UPDATE token SET webapi_allow = '$stored'"
         gives "1 token updated" update token--- $arguments
         [ "$(sql "SELECT webapi_allow FROM token")" = "$result" ]
@@ -94,7 +92,6 @@ END
     malformed="what the token opens is malformed and cannot be changed in part; replace it with --allow"
     row token---
     while IFS='|' read -r stored arguments result; do
-        echo "$stored $arguments"
         sql "UPDATE token SET webapi_allow = '$stored'"
         run_tool update token--- $arguments
         if [ "$result" ]; then
@@ -161,7 +158,7 @@ END
 }
 
 @test "update refuses arguments that it cannot use, and changes nothing" {
-    local passed="has passed; to take the token back, revoke it"
+    passed="has passed; to take the token back, revoke it"
     row token---
     row second-1
     row second-2 "tid = 'second-1x'"
@@ -248,7 +245,6 @@ expired-|5|7" ]
     [ "$(tool list --columns note -o csv --no-header)" = $'"""new""\n"' ]
     run_tool update token--- --note ""
     [ "$(sql "SELECT extra FROM token")" = '{"a":[1.5,"ü"]}' ]
-    local stored
     for stored in '' '[]' null '{"a":1'; do
         sql "UPDATE token SET extra = '$stored'"
         refuses update <<'TABLE'

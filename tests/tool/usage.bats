@@ -61,7 +61,7 @@ log_lines_only()
     [ "$(grep -E '.{81}' <<<"$output")" = "" ]
     [[ $output == *"Exit status: 0 done or granted, 1 refused (grant, check), 2 usage,
 3 no such token, 4 store or permission failure, 5 doctor has findings."* ]]
-    local help=$output
+    help=$output
     for arguments in -h help; do
         gives "$help" $arguments
     done
@@ -70,9 +70,7 @@ log_lines_only()
 }
 
 @test "--help of a command names each of its flags and no others, and fits 80 columns" {
-    local command flags
     while IFS='|' read -r command flags; do
-        echo "$command"
         succeeds "$command" --help
         [[ $output == "Usage: vemo-access-token $command [OPTIONS]"* ]]
         [ "$(grep -E '.{81}' <<<"$output")" = "" ]
@@ -141,7 +139,6 @@ Examples:
 }
 
 @test "the two examples of each command's help do what they should" {
-    local command example
     mkdir "$DIR/bin"
     ln -s "$TOOL" "$DIR/bin/vemo-access-token"
     PATH=$DIR/bin:$PATH
@@ -165,7 +162,7 @@ Examples:
 @test "--version is the same everywhere" {
     succeeds --version
     [[ $output =~ ^vemo-access-token\ [0-9]+\.[0-9]+\.[0-9]+$ ]]
-    local version=$output
+    version=$output
     gives "$version" -V
     for command in $COMMANDS; do
         gives "$version" "$command" --version
@@ -236,7 +233,6 @@ TABLE
 }
 
 @test "arguments may stand before, between and behind options, also with POSIXLY_CORRECT" {
-    local id arguments
     id=$(a_token --allow Api:get)
     for arguments in "$id Api get -o json" "-o json $id Api get" "$id -ojson Api get" "$id Api --output=json get" \
         "-vo json -- $id Api get"; do
@@ -246,7 +242,6 @@ TABLE
 
 # Brackets, quotes, equals signs and the like mean nothing here: neither lists nor escapes.
 @test "arguments reach the commands byte for byte" {
-    local text id
     tool init
     for text in '[a,b]' '[]' '"x"' "'x'" '{a}' 'a=b' '=' '-' '--' '--all' '-v' '%%' '\\n' ' ' $'a\nb' $'\x9b' '!#:+'; do
         id=$(tool create --uid 0 --function "$text" --bind-sid="$text" --allow "Api" --extra "{\"x\": 1}")
@@ -263,7 +258,7 @@ TABLE
 # The loader itself crashes where it has no memory for a table of its own, and does so when it only lists the
 # libraries.
 @test "a lack of memory from the start is told, and causes no crash" {
-    local limit enough=0 statuses=" "
+    enough=0 statuses=" "
     ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
     [[ $(ldd "$TOOL" 2>&1) != *"not a dynamic executable"* ]] || skip "valgrind takes more memory"
     for limit in $(seq 5000 16 12000); do
@@ -288,7 +283,6 @@ TABLE
 }
 
 @test "names and ids in brackets are names and ids" {
-    local one other
     one=$(a_token)
     other=$(a_token)
     run_tool revoke "[${one:0:8},${other:0:8},$ZEROS]"
@@ -302,10 +296,9 @@ TABLE
 }
 
 @test "a user who is not root is told so, and nothing is tried" {
-    local uid=65534
+    uid=65534
     [ "$(id -u)" -eq 0 ] || uid=$(id -u)
     echo '{}' >"$DIR/lines"
-    local arguments
     while read -r arguments; do
         plain $arguments </dev/null
         expect 4 "" "vemo-access-token: only root may do this: the token database belongs to root, and the effective uid is $uid"
@@ -341,7 +334,6 @@ TABLE
 }
 
 @test "--verbose shows the library's log lines, on standard error only" {
-    local id
     id=$(a_token --allow Api:get)
     sql "UPDATE token SET webapi_allow = '[]'"
     run_tool check "$id" Api get
@@ -367,7 +359,6 @@ TABLE
 }
 
 @test "a result that cannot be written is a failure" {
-    local id file reason made
     id=$(a_token --allow Api --uses 100)
     while IFS='|' read -r file reason; do
         for arguments in --help --version "list --help" generate list "list -o json" "list --field uid" \
@@ -406,7 +397,6 @@ TABLE
 }
 
 @test "neither the database nor the lock takes the place of a stream that is closed at the start" {
-    local id closed listing listed complaint
     id=$(a_token)
     cp "$DB" "$DIR/before"
     mkfifo "$DIR/waits"
@@ -444,7 +434,6 @@ TABLE
 @test "what is sorted does not get into temporary files" {
     many_rows 2500 "bind_sid = printf('%03000d', rowid), function = printf('%03000d', rowid), uid = rowid, deadline = deadline - rowid"
     mkdir "$DIR/tmp"
-    local arguments made
     for arguments in stats "list --sort function --limit 1" "tune --dry-run" "tune" doctor "revoke --all --yes"; do
         made=$(TMPDIR=$DIR/tmp "$BATS_TEST_DIRNAME/made_in.py" "$DIR/tmp" "$TOOL" $arguments 2>/dev/null)
         [ "$made" = "" ] || {
@@ -455,18 +444,12 @@ TABLE
 }
 
 @test "no id appears on standard error, nor where ids are masked" {
-    local id other
     id=$(a_token --allow Api:get --unlimited)
     other=_${id:1} # no character of an id
     tool export "$DIR/lines"
     while read -r arguments; do
         run_tool $arguments
-        [[ $output$stderr != *"${id:1:20}"* ]] || {
-            echo "$arguments"
-            echo "output: $output"
-            echo "stderr: $stderr"
-            return 1
-        }
+        [[ $output$stderr != *"${id:1:20}"* ]]
     done <<TABLE
 list
 list -o json
@@ -513,11 +496,7 @@ in_wrong_places()
         [ "$status" -eq 2 ]
         [ "$output" = "" ]
         [[ $stderr == "vemo-access-token: "* ]]
-        [[ $stderr != *"${id:8:20}"* ]] || {
-            echo "$arguments"
-            echo "stderr: $stderr"
-            return 1
-        }
+        [[ $stderr != *"${id:8:20}"* ]]
     done <<TABLE
 $id
 list $id
@@ -575,7 +554,6 @@ TABLE
 # Superfluous arguments are named, but this one may be an id that got there by mistake. One of somebody's own can
 # hold slashes, as Base64 does.
 @test "no id appears on standard error when it stands in a wrong place" {
-    local id
     row token---
     in_wrong_places "$(printf 'Own+id-%08d/' {1..8})=="
     id=$(a_token)
@@ -590,7 +568,6 @@ TABLE
 }
 
 @test "no id appears on standard error when a sentence repeats it" {
-    local id
     id=$(a_token)
     fails 2 "unexpected argument \"${id:0:8}...\"" show "$id" "$id$id"
     # SQLite's reason can hold it.

@@ -14,7 +14,6 @@ with_lookup()
     before=$(state)
     while IFS='|' read -r errno status sentence; do
         for command in "create --function VPN" list "revoke --yes"; do
-            echo "$errno $command"
             with_lookup "$errno" $command --user root
             expect "$status" "" "vemo-access-token: $sentence"
         done
