@@ -95,8 +95,7 @@ END
             gives granted grant "token---$ZEROS" $arguments
             [ "$(sql "SELECT count IN (-1, 4) FROM token")" != 0 ]
         else
-            run_tool check token--- $arguments
-            expect 1 "refused: $result"
+            ends 1 "refused: $result" check token--- $arguments
             fails 1 "refused: $result" grant "token---$ZEROS" $arguments
             fails 1 "refused: $result" grant --print-user "token---$ZEROS" $arguments
             [ "$(sql "SELECT * FROM token")" = "$before" ]
@@ -142,10 +141,8 @@ TABLE
     row token---
     for form in json jsonl; do
         gives '{"allowed":true,"reason":""}' check token--- Api get -o $form
-        run_tool check token--- Api put --output=$form
-        expect 1 '{"allowed":false,"reason":"method not listed"}'
-        run_tool check unknown-token Api -o $form
-        expect 1 '{"allowed":false,"reason":"unknown token"}'
+        ends 1 '{"allowed":false,"reason":"method not listed"}' check token--- Api put --output=$form
+        ends 1 '{"allowed":false,"reason":"unknown token"}' check unknown-token Api -o $form
     done
     gives allowed check token--- Api get -o table
 }

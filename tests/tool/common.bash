@@ -93,6 +93,20 @@ gives()
     expect 0 "$1"
 }
 
+# says OUTPUT SENTENCE ARGUMENTS...: the same, but for that sentence on standard error
+says()
+{
+    run_tool "${@:3}"
+    expect 0 "$1" "vemo-access-token: $2"
+}
+
+# ends STATUS OUTPUT ARGUMENTS...: the tool ends with that status, prints that, and nothing on standard error
+ends()
+{
+    run_tool "${@:3}"
+    expect "$1" "$2"
+}
+
 # fails STATUS SENTENCE ARGUMENTS...: the tool ends with that status and that sentence, and prints no result
 fails()
 {

@@ -152,8 +152,7 @@ TABLE
     spoil 2 /dev/zero
     cp "$DB" "$DIR/before"
     gives 10 list --count
-    run_tool export "$DIR/exported"
-    expect 0 "" "vemo-access-token: 10 tokens exported"
+    fails 0 "10 tokens exported" export "$DIR/exported"
     [ "$(wc -l <"$DIR/exported")" -eq 11 ]
     run_tool doctor
     [ "$status" -eq 5 ]

@@ -42,8 +42,7 @@ expect_no_repair()
 {
     expect_finding "$@"
     local found=$output
-    run_tool doctor --repair
-    expect 5 "$found"
+    ends 5 "$found" doctor --repair
 }
 
 # expect_sound: doctor finds nothing
@@ -835,10 +834,8 @@ warning: JSON of more than 100 levels in 2 tokens (deep---1, deep---2)
     remedy: revoke them, or update --allow and --extra
 END
     )
-    run_tool doctor
-    expect 5 "$findings"
-    run_tool doctor --repair
-    expect 5 "$findings"
+    ends 5 "$findings" doctor
+    ends 5 "$findings" doctor --repair
     for name in object-1 object-4 object-7 nested-1 nested-2 no-list1 deep---2; do
         tool update "$name" --allow A:get,put
     done

@@ -53,8 +53,7 @@ last----|count = 1
 END
     all_tokens >"$DIR/before"
     while IFS='|' read -r arguments reason; do
-        run_tool check $arguments
-        expect 1 "refused: $reason"
+        ends 1 "refused: $reason" check $arguments
         fails 1 "refused: $reason" grant $arguments
         fails 1 "refused: $reason" grant --print-user $arguments
     done <<END
@@ -159,10 +158,8 @@ END
     record=${record/:4,/:3,}
     gives "{\"granted\":true,\"reason\":\"\",\"token\":$record,\"user\":\"root\"}" \
         grant "token---$ZEROS" Api get -o json --print-user
-    run_tool grant "token---$ZEROS" Api put -o json --print-user
-    expect 1 '{"granted":false,"reason":"method not listed"}'
-    run_tool grant token--- Api get -o json
-    expect 1 '{"granted":false,"reason":"unknown token"}'
+    ends 1 '{"granted":false,"reason":"method not listed"}' grant "token---$ZEROS" Api put -o json --print-user
+    ends 1 '{"granted":false,"reason":"unknown token"}' grant token--- Api get -o json
     [ "$(uses)" = "token---|2" ]
     VEMO_TEST_LOOKUP=0 fails 4 "granted, but there is no user of the number 0" \
         grant "token---$ZEROS" Api -o json --print-user

@@ -142,13 +142,11 @@ no findings"
 }
 
 @test "init makes no table before the file is on the disk, and tells what a power cut can undo" {
-    sentence="vemo-access-token: $REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
+    sentence="$REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
-    VEMO_TEST_SYNC=directory run_tool init
-    expect 4 "" "$sentence"
+    VEMO_TEST_SYNC=directory fails 4 "$sentence" init
     [ -f "$DB" ]
     [ ! -s "$DB" ]
-    VEMO_TEST_SYNC=directory run_tool init
-    expect 4 "" "$sentence"
+    VEMO_TEST_SYNC=directory fails 4 "$sentence" init
     [ -s "$DB" ]
 }

@@ -29,8 +29,7 @@ selects()
 # none_matches ARGUMENTS...: there is no such token, and nothing is printed, not even the head of a table
 none_matches()
 {
-    run_tool list "$@"
-    expect 0 "" "vemo-access-token: no token matches"
+    fails 0 "no token matches" list "$@"
 }
 
 # at SECONDS: as tables show a time
@@ -57,8 +56,7 @@ later---  4294967294  VPN         unlimited  $(at $((now + 200000)))  in 2 d    
 
 @test "where there are no tokens, list says so and succeeds" {
     tool init
-    run_tool list -o json
-    expect 0 "[]" "vemo-access-token: no token matches"
+    says "[]" "no token matches" list -o json
     for arguments in "" "-o jsonl" "--field uid"; do
         none_matches $arguments
     done
@@ -361,21 +359,18 @@ END
     row a------- "deadline = 9000000002"
     row b------- "deadline = 9000000001"
     row c------- "deadline = 9000000003, function = 'Other'"
-    note="vemo-access-token: 1 of 3 tokens are shown"
-    run_tool list --limit 1 --field tid
-    expect 0 b------- "$note"
-    run_tool list --limit 1 --sort deadline:desc --field function
-    expect 0 Other "$note"
+    note="1 of 3 tokens are shown"
+    says b------- "$note" list --limit 1 --field tid
+    says Other "$note" list --limit 1 --sort deadline:desc --field function
     run_tool list --limit 1 --no-header
     [ "$status" -eq 0 ]
     [ "${#lines[@]}" -eq 1 ]
     [[ $output == "b-------  root  VPN "* ]]
-    [ "$stderr" = "$note" ]
+    [ "$stderr" = "vemo-access-token: $note" ]
     run_tool list --limit 2 -o jsonl
     [ "${#lines[@]}" -eq 2 ]
     [ "$stderr" = "vemo-access-token: 2 of 3 tokens are shown" ]
-    run_tool list --limit 1 --function VPN --field tid
-    expect 0 b------- "vemo-access-token: 1 of 2 tokens are shown"
+    says b------- "1 of 2 tokens are shown" list --limit 1 --function VPN --field tid
     # Where nothing is left out, nothing is said.
     lists "b------- a------- c-------" --limit 3
     lists "b------- a------- c-------" --limit 9223372036854775807

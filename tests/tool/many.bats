@@ -90,8 +90,7 @@ undo it; 0 tokens imported before that; the command can be repeated without harm
     run_tool import --in-steps - < <(head -n 4500 "$BATS_FILE_TMPDIR/exported" && echo none)
     [[ "$status $stderr" == "2 vemo-access-token: standard input: line 4501 is not "*"; 4000 tokens imported before that; the \
 command can be repeated without harm" && $stderr != *nothing* ]]
-    run_tool import --in-steps "$BATS_FILE_TMPDIR/exported"
-    expect 0 "26000 tokens imported; 4000 tokens there already"
+    gives "26000 tokens imported; 4000 tokens there already" import --in-steps "$BATS_FILE_TMPDIR/exported"
     [ "$(sql "SELECT count(*) FROM token WHERE function LIKE 'purpose %'")" = $TOKENS ]
     sql "UPDATE token SET deadline = 5 WHERE create_time < 1000015000"
     beside doctor --repair

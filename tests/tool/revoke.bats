@@ -22,10 +22,8 @@ END
     gives "1 token revoked" revoke aaaaaaaa
     gives "2 tokens revoked" revoke bbbbbbbb dddddddd bbbbbbbb
     expect_left cccccccc eeeeeeee expired- ffffffff
-    run_tool revoke aaaaaaaa
-    expect 0 "0 tokens revoked" "vemo-access-token: 1 id is unknown"
-    run_tool revoke aaaaaaaa expired- bbbbbbbb
-    expect 0 "1 token revoked" "vemo-access-token: 2 ids are unknown"
+    says "0 tokens revoked" "1 id is unknown" revoke aaaaaaaa
+    says "1 token revoked" "2 ids are unknown" revoke aaaaaaaa expired- bbbbbbbb
     gives "3 tokens revoked" revoke --all --yes
     gives "0 tokens revoked" revoke --all --yes
     gives "0 tokens revoked" revoke --function VPN --yes
@@ -43,8 +41,7 @@ END
     gives "1 token revoked" revoke -- -begins-
     # A prefix matches as it is written.
     for tid in Abcdefg% Abcdefg_ "Abcdefg'" 'Abcdefg*' ABCDEFGH bcdefgh1 Abcdefgh11; do
-        run_tool revoke "$tid"
-        expect 0 "0 tokens revoked" "vemo-access-token: 1 id is unknown"
+        says "0 tokens revoked" "1 id is unknown" revoke "$tid"
     done
     expect_left Abcdefgh1 Xbcdefghi
 }
@@ -55,17 +52,12 @@ END
     gives "3 tokens revoked" revoke cccccccc - < <(printf '\nbbbbbbbb\n\n\ndddddddd')
     expect_left eeeeeeee ffffffff
     # A list can be empty.
-    run_tool revoke - < <(tool list --show-ids --field tid --expired 2>/dev/null)
-    expect 0 "0 tokens revoked" "vemo-access-token: no token matches"
-    run_tool revoke --dry-run - </dev/null
-    expect 0 "0 tokens would be revoked" "vemo-access-token: no token matches"
-    run_tool revoke - - < <(printf 'ffffffff\nunknown1\nunknown2\n')
-    expect 0 "1 token revoked" "vemo-access-token: 2 ids are unknown"
+    says "0 tokens revoked" "no token matches" revoke - < <(tool list --show-ids --field tid --expired 2>/dev/null)
+    says "0 tokens would be revoked" "no token matches" revoke --dry-run - </dev/null
+    says "1 token revoked" "2 ids are unknown" revoke - - < <(printf 'ffffffff\nunknown1\nunknown2\n')
     # Somebody has the database open, but of nothing that was revoked nothing can come back.
-    run_tool revoke unknown1 8<"$DB"
-    expect 0 "0 tokens revoked" "vemo-access-token: 1 id is unknown"
-    run_tool revoke --function none --yes 8<"$DB"
-    expect 0 "0 tokens revoked" ""
+    says "0 tokens revoked" "1 id is unknown" revoke unknown1 8<"$DB"
+    gives "0 tokens revoked" revoke --function none --yes 8<"$DB"
     fails 2 "TID: an id on standard input holds a NUL byte" revoke - < <(printf 'eeeeeeee\0x\n')
     expect_left eeeeeeee
 }

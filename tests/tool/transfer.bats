@@ -49,11 +49,9 @@ odd_tokens()
 
 @test "export writes each token as a line of JSON, its id included, and an end, and purges nothing" {
     tool init
-    run_tool export
-    expect 0 "$(whole </dev/null)" "vemo-access-token: 0 tokens exported"
+    says "$(whole </dev/null)" "0 tokens exported" export
     row A
-    run_tool export
-    expect 0 "$(written A | whole)" "vemo-access-token: 1 token exported"
+    says "$(written A | whole)" "1 token exported" export
     row B "bind_sid = 's', uid = 1000, deadline = 1, count = -1, create_time = 5, function = 'Mail',
            webapi_allow = '{\"Example.File\":{\"method\":[\"get\"]}}', extra = '{\"a\":[1.5,\"é\"]}'"
     text=$({
@@ -61,12 +59,9 @@ odd_tokens()
         printf '%s"%s"%s\n' '{"bind_sid":"s","count":-1,"create_time":5,"deadline":1,"extra":{"a":[1.5,"é"]},"function":"Mail","tid":' \
             "$(a_tid B)" ',"uid":1000,"webapi_allow":{"Example.File":{"method":["get"]}}}'
     } | whole)
-    run_tool export
-    expect 0 "$text" "vemo-access-token: 2 tokens exported"
-    run_tool export -
-    expect 0 "$text" "vemo-access-token: 2 tokens exported"
-    run_tool export "$DIR/file"
-    expect 0 "" "vemo-access-token: 2 tokens exported"
+    says "$text" "2 tokens exported" export
+    says "$text" "2 tokens exported" export -
+    fails 0 "2 tokens exported" export "$DIR/file"
     [ "$(cat "$DIR/file")" = "$text" ]
     expect_left A B
 }
@@ -167,8 +162,7 @@ ${DB##*/}-backup
 ${DB##*/}-wal" ]
     # In other directories any name may be used.
     for file in "$DIR/${DB##*/}" "$DIR/vemo-access-token.lock" "$VEMO_REDIRECT_DIR/backup"; do
-        run_tool export "$file"
-        expect 0 "" "vemo-access-token: 1 token exported"
+        fails 0 "1 token exported" export "$file"
     done
 }
 
@@ -207,20 +201,18 @@ TABLE
 @test "an export leaves a file of another alone, and removes what an export has left behind" {
     row A
     touch "$DIR/file"
-    in_the_way="vemo-access-token: $DIR/file.part is in the way: another export is writing it, or it is none's"
+    in_the_way="$DIR/file.part is in the way: another export is writing it, or it is none's"
     install -m 0601 /dev/null "$DIR/file.part"
-    run_tool export "$DIR/file"
-    expect 4 "" "$in_the_way"
+    fails 4 "$in_the_way" export "$DIR/file"
     chmod 0600 "$DIR/file.part"
     if [ "$(id -u)" -eq 0 ]; then
         chown 1 "$DIR/file.part"
-        run_tool export "$DIR/file"
-        expect 4 "" "$in_the_way"
+        fails 4 "$in_the_way" export "$DIR/file"
         chown 0 "$DIR/file.part"
     fi
     run flock "$DIR/file.part" "$TOOL" export "$DIR/file"
     [ "$status" -eq 4 ]
-    [ "$output" = "$in_the_way" ]
+    [ "$output" = "vemo-access-token: $in_the_way" ]
     [ ! -s "$DIR/file" ]
     run_tool export "$DIR/file"
     [ "$status" -eq 0 ]
@@ -409,8 +401,7 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
         run_tool import "$DIR/file"
         expect 2 "" "vemo-access-token: $DIR/file: $flaw; nothing of this file was imported; --partial imports what is there"
         cmp "$DB" "$DIR/before"
-        run_tool import --partial - <"$DIR/file"
-        expect 0 "$tokens imported" "vemo-access-token: standard input: $flaw; the whole lines were imported"
+        says "$tokens imported" "standard input: $flaw; the whole lines were imported" import --partial - <"$DIR/file"
         cp "$DIR/before" "$DB"
     done <<'TABLE'
 head -c 0;0 tokens;the export has no end
@@ -569,8 +560,7 @@ TABLE
 @test "import tells of expired tokens, and keeps them" {
     tool init
     written A B C | sed '1s/9999999999/1/; 2s/9999999999/-1/' | whole >"$DIR/file"
-    run_tool import "$DIR/file"
-    expect 0 "3 tokens imported" "vemo-access-token: 2 of them expired: the next call of a program purges those"
+    says "3 tokens imported" "2 of them expired: the next call of a program purges those" import "$DIR/file"
     expect_left A B C
 }
 

@@ -43,8 +43,7 @@ END
 
 @test "a name with a wildcard or a blank is taken, with a warning" {
     row token---
-    run_tool update token--- --allow 'Api:*'
-    expect 0 "1 token updated" 'vemo-access-token: --allow: "*" stands for this name alone: "*" is no wildcard'
+    says "1 token updated" '--allow: "*" stands for this name alone: "*" is no wildcard' update token--- --allow 'Api:*'
     run_tool update token--- --add-allow 'B c'
     expect 0 "1 token updated" 'vemo-access-token: --add-allow: "B c" holds a blank, which is part of the name'
     [ "$(sql "SELECT webapi_allow FROM token")" = '{"Api":{"method":["*"]},"B c":{"method":[]}}' ]

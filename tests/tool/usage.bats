@@ -285,8 +285,7 @@ TABLE
 @test "names and ids in brackets are names and ids" {
     one=$(a_token)
     other=$(a_token)
-    run_tool revoke "[${one:0:8},${other:0:8},$ZEROS]"
-    expect 0 "0 tokens revoked" "vemo-access-token: 1 id is unknown"
+    says "0 tokens revoked" "1 id is unknown" revoke "[${one:0:8},${other:0:8},$ZEROS]"
     [ "$(sql "SELECT count(*) FROM token")" -eq 2 ]
     cd "$DIR"
     tool export x
@@ -336,8 +335,7 @@ TABLE
 @test "--verbose shows the library's log lines, on standard error only" {
     id=$(a_token --allow Api:get)
     sql "UPDATE token SET webapi_allow = '[]'"
-    run_tool check "$id" Api get
-    expect 1 "refused: malformed token"
+    ends 1 "refused: malformed token" check "$id" Api get
     run_tool check -v "$id" Api get
     [ "$status" -eq 1 ]
     [ "$output" = "refused: malformed token" ]
