@@ -146,24 +146,3 @@ TABLE
     done
     gives allowed check token--- Api get -o table
 }
-
-@test "check refuses arguments that it cannot use" {
-    row second-1
-    row second-2 "tid = 'second-1' || 'x'"
-    refuses check <<'END'
-|TID is required
-second-1|API is required
-second-1 ''|API: must not be empty
-second-1 '' get|API: must not be empty
-'' Api|TID: the id is empty
-second Api|TID: "second" is too short: give the id or its first 8 characters, or more
-second-1 Api|TID: several tokens begin with "second-1"; give more of the id
-second-1 Api get put|unexpected argument "put"
-second-1 Api -o xml|--output: "xml" is not a form: table, json or jsonl
-second-1 Api --utc|unknown option "--utc"
-- Api|TID: there is no id on standard input
-- Api < <(printf '\n')|TID: there is no id on standard input
-- Api < <(printf 'a\nb\n')|TID: there is more than one id on standard input
-- Api < <(printf 'second-1\0')|TID: an id on standard input holds a NUL byte
-END
-}

@@ -149,6 +149,18 @@ in_namespace()
         "$DIR/layer" "${@:2}"
 }
 
+# commands_of_tool: the commands that help lists
+commands_of_tool()
+{
+    tool --help | sed -n '/^Commands:/,/^$/s/^  \([a-z]\{1,\}\) .*/\1/p'
+}
+
+# options_of [COMMAND]: the long options that help lists, of a command or of the tool itself
+options_of()
+{
+    tool "$@" --help | sed -nE 's/^  (-[a-zA-Z],)?(--[a-z-]+).*/\2/p' | LC_ALL=C sort
+}
+
 # need_store: makes the store, if there is none
 need_store()
 {

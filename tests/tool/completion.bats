@@ -4,18 +4,6 @@
 
 load common
 
-# What help says of the tool itself or of a command.
-commands_of_tool()
-{
-    tool --help | sed -n '/^Commands:/,/^$/s/^  \([a-z]\{1,\}\) .*/\1/p'
-}
-
-# options_of [COMMAND]
-options_of()
-{
-    tool "$@" --help | sed -nE 's/^  (-[a-zA-Z],)?(--[a-z-]+).*/\2/p'
-}
-
 # Files to complete, and in the tool's place a program that tells that it was called.
 prepare()
 {
@@ -121,9 +109,9 @@ completes()
     prepare
     {
         echo "vemo-access-token |$(commands_of_tool | LC_ALL=C sort | paste -sd '|')"
-        echo "vemo-access-token --|$(options_of | LC_ALL=C sort | paste -sd '|')"
+        echo "vemo-access-token --|$(options_of | paste -sd '|')"
         for command in $(commands_of_tool); do
-            echo "vemo-access-token $command --|$(options_of "$command" | LC_ALL=C sort | paste -sd '|')"
+            echo "vemo-access-token $command --|$(options_of "$command" | paste -sd '|')"
         done
         echo "$OFFERED${2:+$'\n'$2}"
     } >"$DIR/expected"

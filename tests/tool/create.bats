@@ -60,45 +60,6 @@ END
     [ "$output" = "$(sql "SELECT tid FROM token")" ]
 }
 
-@test "create refuses options that it cannot use, and touches nothing" {
-    no_api='names no API: write API or API:METHOD,METHOD'
-    no_method='has an empty method: write API or API:METHOD,METHOD'
-    a_token="create --uid 0 --function VPN"
-    refuses <<END
-create --function VPN|--uid or --user is required
-create --uid 0|--function is required
-create --uid 0 --user root --function VPN|--uid excludes --user
-create --uid 0 --function ''|--function: must not be empty
-create --uid x --function VPN|--uid: "x" is not a number from 0 to 4294967294
-create --uid -1 --function VPN|--uid: "-1" is not a number from 0 to 4294967294
-create --uid 4294967295 --function VPN|--uid: "4294967295" is not a number from 0 to 4294967294
-create --uid '' --function VPN|--uid: "" is not a number from 0 to 4294967294
-create --user no-such-user --function VPN|--user: there is no user "no-such-user"
-create --user '' --function VPN|--user: there is no user ""
-create --uid 0 --function VPN --uses 0|--uses: "0" is not a number from 1 to 9223372036854775807
-create --uid 0 --function VPN --uses -1|--uses: "-1" is not a number from 1 to 9223372036854775807
-create --uid 0 --function VPN --uses 1.5|--uses: "1.5" is not a number from 1 to 9223372036854775807
-create --uid 0 --function VPN --uses 9223372036854775808|--uses: "9223372036854775808" is not a number from 1 to 9223372036854775807
-create --uid 0 --function VPN --uses 2 --unlimited|--uses excludes --unlimited
-create --uid 0 --function|--function: needs a value
-create --uid 0 --uid 1 --function VPN|--uid: can be given once only
-create --uid 0 --function VPN -o csv|--output: "csv" is not a form: table, json or jsonl
-create --uid 0 --function VPN --count|unknown option "--count"
-create --uid 0 --function VPN more|unexpected argument "more"
-create --function= --uid 0|--function: must not be empty
-$a_token --allow|--allow: needs a value
-$a_token --allow A --allow ''|--allow: "" $no_api
-$a_token --allow A --allow :|--allow: ":" $no_api
-$a_token --allow A --allow :m|--allow: ":m" $no_api
-$a_token --allow A:|--allow: "A:" $no_method
-$a_token --allow A:,|--allow: "A:," $no_method
-$a_token --allow A:m,|--allow: "A:m," $no_method
-$a_token --allow A:,m|--allow: "A:,m" $no_method
-$a_token --allow A:m,,n|--allow: "A:m,,n" $no_method
-generate more|unexpected argument "more"
-END
-}
-
 @test "--allow takes an API, with methods behind a colon, and may be repeated" {
     tool init
     while IFS='|' read -r arguments stored; do
@@ -180,42 +141,6 @@ END
     [ "$(tool show "$tid" --field extra)" = "$(nested 1000)" ]
 }
 
-@test "an --extra that is not a JSON object, or whose file cannot be used, is refused" {
-    tool init
-    cd "$DIR"
-    printf '[1]' >array
-    printf '{"a":' >broken
-    printf '{\n"a":\n}' >lines
-    printf '{"a":"b\0c"}' >nul
-    printf '{}\0' >nul-behind
-    : >empty
-    nested 1001 >deep
-    refuses create --uid 0 --function VPN --extra <<END
-'[]'|--extra: is not a JSON object
-'[{"a":1}]'|--extra: is not a JSON object
-''|--extra: is not JSON: Column 1 Syntax error: value, object or array expected.
-'{'|--extra: is not JSON: Column 2 Missing '}' or object member name
-'{"a":1,}'|--extra: is not JSON: Column 8 Missing '}' or object member name
-'{"a" 1}'|--extra: is not JSON: Column 6 Missing ':' after object member name
-'{"a":1} x'|--extra: is not JSON: Column 9 Extra non-whitespace after JSON value.
-'{"a":1,"a":2}'|--extra: is not JSON: Column 8 Duplicate key: 'a'
-'{a:1}'|--extra: is not JSON: Column 2 Missing '}' or object member name
-'{} //'|--extra: is not JSON: Column 4 Extra non-whitespace after JSON value.
-1|--extra: is not JSON: Column 1 A valid JSON document must be either an array or an object value.
-null|--extra: is not JSON: Column 1 A valid JSON document must be either an array or an object value.
-@missing|--extra: missing: No such file or directory
-@$DIR|--extra: $DIR: Is a directory
-@nul|--extra: nul holds a NUL byte
-@nul-behind|--extra: nul-behind holds a NUL byte
-@array|--extra: is not a JSON object
-@broken|--extra: is not JSON: Column 6 Syntax error: value, object or array expected.
-@lines|--extra: is not JSON: Line 3, Column 1 Syntax error: value, object or array expected.
-@empty|--extra: is not JSON: Column 1 Syntax error: value, object or array expected.
-@deep|--extra: is nested too deeply for JSON
-@|--extra: "@" names no file
-END
-}
-
 @test "create takes an id of the caller's own" {
     tool init
     gives "$OWN" create --uid 0 --function VPN --allow Api --tid "$OWN"
@@ -231,25 +156,6 @@ ${OWN/own/two}
 ${OWN/own/tre}
 $odd
 $(cat "$DIR/tid")" ]
-}
-
-@test "an own id that is too short, taken or none is refused, and nothing changes" {
-    a_token --tid "$OWN"
-    row expired- "deadline = 1"
-    refuses create --uid 0 --function Other --tid <<END
-"${OWN%0}"|--tid: an id needs 127 characters at least, this one has 126
-"$OWN"|--tid: there is a token with this id already
-''|--tid: the id is empty
--|--tid: there is no id on standard input
-- <&-|--tid: there is no id on standard input
-- < <(printf '\n\n')|--tid: there is no id on standard input
-- < <(printf '$OWN\n${OWN/own/two}\n')|--tid: there is more than one id on standard input
-- < <(printf '$OWN\0\n')|--tid: an id on standard input holds a NUL byte
-- < <(printf '\0$OWN')|--tid: an id on standard input holds a NUL byte
-- <<<short|--tid: an id needs 127 characters at least, this one has 5
-END
-    # It may come from an unset variable.
-    refuses <<<"create --uid 0 --function VPN --tid=|--tid: the id is empty"
 }
 
 @test "create purges expired tokens, and may use the id of one again" {

@@ -132,23 +132,6 @@ END
     [ "$(all_tokens)" = "" ]
 }
 
-@test "grant refuses arguments that it cannot use, and purges nothing then" {
-    row token---
-    row expired- "deadline = -1"
-    refuses grant <<END
-|TID is required
-token---$ZEROS|API is required
-token---$ZEROS ''|API: must not be empty
-'' Api|TID: the id is empty
-token---$ZEROS Api get put|unexpected argument "put"
-token---$ZEROS Api --field|unknown option "--field"
-- Api|TID: there is no id on standard input
-- Api < <(printf '\n\n')|TID: there is no id on standard input
-- Api < <(printf 'token---$ZEROS\ntoken---$ZEROS\n')|TID: there is more than one id on standard input
-- Api < <(printf 'token---$ZEROS\0')|TID: an id on standard input holds a NUL byte
-END
-}
-
 @test "a grant gives JSON, with the token as it was, but for its id" {
     row token---
     for form in json jsonl; do

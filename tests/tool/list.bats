@@ -304,10 +304,6 @@ USES  NOTE  TID
    1  7     a-------
    1        b-------"
     gives $'0  0\n0  0' list --columns uid,uid --no-header
-    refuses list --columns uid <<END
--o json|--columns is for tables and CSV
---field function|--columns is for tables and CSV
-END
 }
 
 @test "--count counts what is selected, and says no more" {
@@ -374,43 +370,6 @@ END
     # Where nothing is left out, nothing is said.
     lists "b------- a------- c-------" --limit 3
     lists "b------- a------- c-------" --limit 9223372036854775807
-}
-
-@test "list refuses options that it cannot use" {
-    refuses list <<'END'
-more|unexpected argument "more"
---unknown|unknown option "--unknown"
---uid 0 --user root|--uid excludes --user
---uid root|--uid: "root" is not a number from 0 to 4294967294
---uid '0 or 1=1'|--uid: "0 or 1=1" is not a number from 0 to 4294967294
---uid 4294967295|--uid: "4294967295" is not a number from 0 to 4294967294
---user no-such-user|--user: there is no user "no-such-user"
---limit ''|--limit: "" is not a number from 1 to 9223372036854775807
---expiring 0|--expiring: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
---expiring soon|--expiring: "soon" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
---sort colour|--sort: "colour" is not a field of a token
---sort tid:asc|--sort: "tid:asc" is not a field of a token
---sort :desc|--sort: ":desc" is not a field of a token
---sort ''|--sort: "" is not a field of a token
---limit 0|--limit: "0" is not a number from 1 to 9223372036854775807
---limit -1|--limit: "-1" is not a number from 1 to 9223372036854775807
---limit ten|--limit: "ten" is not a number from 1 to 9223372036854775807
---limit 9223372036854775808|--limit: "9223372036854775808" is not a number from 1 to 9223372036854775807
---created-before soon|--created-before: "soon" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
---created-after ''|--created-after: "" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
---created-after 26-12-31|--created-after: "26-12-31" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599
---opens :m|--opens: ":m" names no API: write API or API:METHOD,METHOD
---opens A:|--opens: "A:" has an empty method: write API or API:METHOD,METHOD
---columns ''|--columns: "" is not a column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
---columns tid,|--columns: "" is not a column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
---columns name|--columns: "name" is not a column: tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra
--o xml|--output: "xml" is not a form: table, json, jsonl or csv
--o JSON|--output: "JSON" is not a form: table, json, jsonl or csv
---field name|--field: "name" is not a field of a token
---sort tid --sort uid|--sort: can be given once only
---limit|--limit: needs a value
---utc --epoch|--utc excludes --epoch
-END
 }
 
 @test "an allowance that cannot be read as such is shown as JSON" {

@@ -29,12 +29,6 @@ long_options()
     grep -oE 'Fl -[a-z][a-z-]*' | sed 's/^Fl /-/' | LC_ALL=C sort -u
 }
 
-# options_of [COMMAND]: the long options that help lists
-options_of()
-{
-    tool "$@" --help | sed -nE 's/^  (-[a-zA-Z],)?(--[a-z-]+).*/\2/p' | LC_ALL=C sort
-}
-
 @test "mandoc has nothing to say against the page" {
     command -v mandoc >/dev/null || skip "mandoc is not installed"
     run mandoc -T lint -W warning "$PAGE"
@@ -49,8 +43,7 @@ options_of()
 }
 
 @test "the page describes the commands that there are" {
-    diff <(described | LC_ALL=C sort) \
-        <(tool --help | sed -n '/^Commands:/,/^$/s/^  \([a-z]\{1,\}\) .*/\1/p' | LC_ALL=C sort)
+    diff <(described | LC_ALL=C sort) <(commands_of_tool | LC_ALL=C sort)
 }
 
 @test "the page describes each command's options, all of them and no others" {

@@ -107,38 +107,3 @@ unknown-|0 tokens
 TABLE
     cmp "$DB" "$DIR/six"
 }
-
-@test "revoke refuses arguments that it cannot use, and revokes nothing then" {
-    six_tokens
-    row Abcdefgh1
-    row Abcdefgh2
-    nobody="repeat with --yes: there is nobody to ask"
-    ways="say which tokens: by TID, by options that select, or --all"
-    refuses revoke <<TABLE
---all|$nobody
---uid 0|$nobody
---user root|$nobody
---function VPN|$nobody
---bind-sid s1|$nobody
---bind-sid unknown|$nobody
-|$ways
---yes|$ways
---dry-run|$ways
-aaaaaaaa --all|$ways
-aaaaaaaa --uid 0|$ways
---all --function VPN --yes|$ways
---yes --bind-sid ""|--bind-sid: must not be empty
---yes --uid abc|--uid: "abc" is not a number from 0 to 4294967294
---yes --uid ""|--uid: "" is not a number from 0 to 4294967294
---yes --uid -1|--uid: "-1" is not a number from 0 to 4294967294
---yes --uid 4294967295|--uid: "4294967295" is not a number from 0 to 4294967294
---yes --uid "0 or 1=1"|--uid: "0 or 1=1" is not a number from 0 to 4294967294
---yes --user no-such-user|--user: there is no user "no-such-user"
---yes --user root --uid 0|--user excludes --uid
---yes --nonsense|unknown option "--nonsense"
-aaaaaaaa Abcdefgh|TID: several tokens begin with "Abcdefgh"; give more of the id
---dry-run aaaaaaaa Abcdefgh|TID: several tokens begin with "Abcdefgh"; give more of the id
-aaaaaaaa Abcdefg|TID: "Abcdefg" is too short: give the id or its first 8 characters, or more
-aaaaaaaa ""|TID: the id is empty
-TABLE
-}

@@ -24,6 +24,7 @@ kept()
     [ "$(sql "SELECT create_time BETWEEN $now AND $(date +%s) FROM token WHERE tid = '$output'")" = 1 ]
     # A whole id, from standard input.
     first=$output
+    fails 3 "there is no such token" rotate token---
     run_tool rotate - <<<"$first"
     [ "$status" -eq 0 ]
     [ "$(sql "SELECT group_concat(tid, ' ') FROM (SELECT tid FROM token ORDER BY rowid)")" = "another-$ZEROS $output" ]
@@ -43,24 +44,6 @@ kept()
 2h1m|72.0
 365250d|72.0
 TABLE
-}
-
-@test "what cannot be rotated stays as it is" {
-    row expired- "deadline = 5"
-    row token--1
-    row token--2
-    refuses rotate <<'END'
-token--|TID: "token--" is too short: give the id or its first 8 characters, or more
-''|TID: the id is empty
--|TID: there is no id on standard input
-expired-|the token has expired; "vemo-access-token update" can give it time
-token--1 --grace 0|--grace: "0" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
-token--1 --grace -1|--grace: "-1" is not a duration: write 90s, 15m, 8h, 2d12h or 1w
-token--1 token--2|unexpected argument "token--2"
-END
-    before=$(state)
-    fails 3 "there is no such token" rotate unknown-
-    [ "$(state)" = "$before" ]
 }
 
 @test "where the fresh id cannot be printed, the old token is as it was" {

@@ -78,7 +78,6 @@ END
 token---$ZEROS,\"a,b\""
     gives 0 show token--- -o csv --columns uid --no-header
     gives $'UID  SESSION\n  0  a,b' show token--- --columns uid,session
-    refuses show token--- --columns uid <<<"-o json|--columns is for tables and CSV"
 }
 
 @test "--field gives one field as it is stored" {
@@ -191,27 +190,6 @@ END
     # Empty lines do not matter, nor does a missing line break.
     shows_at 2 - < <(printf '\n\n%s' "second--$ZEROS")
     shows_at 2 - < <(printf '%s\n\n' "second--$ZEROS")
-}
-
-@test "show refuses arguments that it cannot use" {
-    tool init
-    refuses show <<END
-|TID is required
-- <$DIR|standard input: Is a directory
--|TID: there is no id on standard input
-- <&-|TID: there is no id on standard input
-- < <(printf '\n\n')|TID: there is no id on standard input
-- < <(printf 'token---\ntoken---\n')|TID: there is more than one id on standard input
-- < <(printf 'token---\0\n')|TID: an id on standard input holds a NUL byte
-- < <(printf '\0')|TID: an id on standard input holds a NUL byte
-- <<<first|TID: "first" is too short: give the id or its first 8 characters, or more
-''|TID: the id is empty
-token---0 token---1|unexpected argument "token---1"
-token---0 --show-ids|unknown option "--show-ids"
-token---0 -o yaml|--output: "yaml" is not a form: table, json, jsonl or csv
-token---0 --field TID|--field: "TID" is not a field of a token
-token---0 --epoch --utc|--epoch excludes --utc
-END
 }
 
 @test "show spends and purges nothing, and says so where there is no such token" {
