@@ -15,6 +15,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <new>
+#include <sstream>
 
 #include "Interpose.h"
 #include "internal/ErrnoKeeper.h"
@@ -60,23 +61,25 @@ std::string withoutLineNumbers(std::string strText)
     return strText;
 }
 
-// Writes a line down. szFormat may contain "%m".
-void logged(const std::string& strPriority, const char* szFormat, va_list args)
+// Writes a line down. szFormat may contain "%m". A line in the system log must have its priority and, behind
+// its place, errno unless that is 0. These are left out then, so that it reads as on standard output.
+void logged(const int* pnPriority, const char* szFormat, va_list args)
 {
-    const ErrnoKeeper keeper;
+    const int nErrno = errno;
     char* szText = nullptr;
     if (0 > vasprintf(&szText, szFormat, args)) {
         throw std::bad_alloc();
     }
-    seam().lines.push_back(strPriority + withoutLineNumbers(szText));
+    std::string strLine = withoutLineNumbers(szText);
     free(szText);
-}
-
-std::string octal(mode_t mode)
-{
-    char szMode[16];
-    snprintf(szMode, sizeof(szMode), "%04o", mode);
-    return szMode;
+    const size_t nMessage = strLine.find(' ') + 1;
+    const std::string strErrno = pnPriority && 0 != nErrno ? std::string("(") + strerror(nErrno) + ")" : "";
+    const bool blErrno = 0 == strLine.compare(nMessage, strErrno.size(), strErrno);
+    strLine.erase(nMessage, blErrno ? strErrno.size() : 0);
+    seam().lines.push_back(std::string(blErrno ? "" : "without errno: ") +
+                           (pnPriority && LOG_ERR != *pnPriority ? "of another priority: " : "") + strLine);
+    seam().blInSystemLog = pnPriority;
+    errno = nErrno;
 }
 
 // A callback of the library, which is to find errno as the library left it.
@@ -167,9 +170,9 @@ int access(const char* szPath, int nMode) noexcept
 
 int chmod(const char* szPath, mode_t mode) noexcept
 {
-    return CALLED_BY_LIBRARY && fails("chmod", std::string(szPath) + " " + octal(mode))
-               ? -1
-               : NEXT(chmod)(szPath, mode);
+    std::ostringstream arguments;
+    arguments << szPath << " 0" << std::oct << mode;
+    return CALLED_BY_LIBRARY && fails("chmod", arguments.str()) ? -1 : NEXT(chmod)(szPath, mode);
 }
 
 int open(const char* szPath, int nFlags, ...)
@@ -224,7 +227,7 @@ int printf(const char* szFormat, ...)
     va_list args;
     va_start(args, szFormat);
     if (blLibrary) {
-        logged("", szFormat, args);
+        logged(nullptr, szFormat, args);
     } else {
         nResult = vprintf(szFormat, args);
     }
@@ -238,7 +241,7 @@ void syslog(int nPriority, const char* szFormat, ...)
     va_list args;
     va_start(args, szFormat);
     if (blLibrary) {
-        logged("<" + std::to_string(nPriority) + ">", szFormat, args);
+        logged(&nPriority, szFormat, args);
         errno = EDESTADDRREQ; // as on a system without a log daemon
     } else {
         vsyslog(nPriority, szFormat, args);

@@ -32,8 +32,10 @@ struct Seam {
     std::vector<std::string> statements() const;
 
     // What the library logged, with the line numbers of source files as '#', since they may change:
-    // "util.cpp:# ...". A line in the system log begins with its priority: "<3>util.cpp:# ...".
+    // "util.cpp:# ...". Those in the system log read as they would on standard output, if they are as they
+    // must be there; and whether the last one went there.
     std::vector<std::string> lines;
+    bool blInSystemLog = false;
 
     // Functions that fail: the numbers (from 1) of the calls that do, and the errno they leave. They are
     // geteuid (answers (uid_t)-1), seteuid, access, open, chmod, sqlite3_mprintf (no memory), getrandom,

@@ -1,13 +1,17 @@
 #include "StoreTest.h"
 
+#include <sys/wait.h>
+#include <unistd.h>
+
 #include <cstdlib>
-#include <cstring>
 #include <filesystem>
 
 #include "AccessTokenUtil.h"
 #include "internal/ErrnoKeeper.h"
 
 namespace {
+
+bool g_blStdout = true; // where the library logs to
 
 int appendRow(void* pRows, int nColumns, char** szValues, char**)
 {
@@ -33,16 +37,25 @@ class OneTestPerProcess : public ::testing::EmptyTestEventListener {
 
 } // namespace
 
+// Runs a test twice: with the log in the system log, in a child, and then with the log on standard output.
 int main(int nArguments, char** szArguments)
 {
     ::testing::InitGoogleTest(&nArguments, szArguments);
     ::testing::UnitTest::GetInstance()->listeners().Append(new OneTestPerProcess);
+    if (!::testing::GTEST_FLAG(list_tests)) {
+        const pid_t pid = fork();
+        int nStatus = -1;
+        g_blStdout = 0 != pid;
+        if (g_blStdout && (pid != waitpid(pid, &nStatus, 0) || 0 != nStatus)) {
+            return EXIT_FAILURE;
+        }
+    }
     return RUN_ALL_TESTS();
 }
 
 void SeamTest::SetUp()
 {
-    VEMO_ACCESS_TOKEN::logToStdout(m_blStdout);
+    VEMO_ACCESS_TOKEN::logToStdout(m_blStdout && g_blStdout);
     reset();
 }
 
@@ -86,11 +99,6 @@ Texts StoreTest::query(const std::string& strSql) const
     sqlite3_free(szError);
     sqlite3_close(pDb);
     return rows;
-}
-
-std::string StoreTest::countOf(const std::string& strTid) const
-{
-    return joined(query("SELECT count FROM token WHERE tid = '" + strTid + "'"), " ");
 }
 
 void TableTest::SetUp()

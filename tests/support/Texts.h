@@ -3,33 +3,64 @@
 #ifndef TESTS_TEXTS_H
 #define TESTS_TEXTS_H
 
+#include <gtest/gtest.h>
 #include <json/json.h>
 
 #include <cerrno>
+#include <cstring>
+#include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "Seam.h"
 
 typedef std::vector<std::string> Texts;
 
-Texts operator+(Texts left, const Texts& right);
+inline Texts operator+(Texts left, const Texts& right)
+{
+    left.insert(left.end(), right.begin(), right.end());
+    return left;
+}
 
 // The texts with a separator between.
-std::string joined(const Texts& texts, const char* szSeparator);
+inline std::string joined(const Texts& texts, const char* szSeparator)
+{
+    std::string strJoined;
+    for (const std::string& strText : texts) {
+        strJoined.append(&strText == &texts.front() ? "" : szSeparator).append(strText);
+    }
+    return strJoined;
+}
 
 // JSON text as a value (the text is well-formed), and a value as compact text.
-Json::Value json(const std::string& strText);
-std::string text(const Json::Value& jValue);
+inline Json::Value json(const std::string& strText)
+{
+    const std::unique_ptr<Json::CharReader> pReader(Json::CharReaderBuilder().newCharReader());
+    Json::Value jValue;
+    std::string strErrors;
+    EXPECT_TRUE(pReader->parse(strText.data(), strText.data() + strText.size(), &jValue, &strErrors))
+        << strErrors << strText;
+    return jValue;
+}
 
-// The files that log lines come from.
-const char* const UTIL = "util.cpp";
-const char* const STORE = "AccessTokenSqlite.cpp";
-const char* const SERVICE = "AccessTokenApi.cpp";
-const char* const WRAPPER = "AccessTokenWrapper.cpp";
+inline std::string text(const Json::Value& jValue)
+{
+    Json::StreamWriterBuilder builder;
+    builder["indentation"] = "";
+    return Json::writeString(builder, jValue);
+}
 
-// The field list at one of its lines.
-std::string fieldList(int nLine);
+// The files that log lines come from; the field list comes with a line.
+const char* const UTIL = "util.cpp:#";
+const char* const STORE = "AccessTokenSqlite.cpp:#";
+const char* const SERVICE = "AccessTokenApi.cpp:#";
+const char* const WRAPPER = "AccessTokenWrapper.cpp:#";
+
+inline std::string fieldList(int nLine)
+{
+    return "include/internal/vemo-access-token-data-member:" + std::to_string(nLine);
+}
 
 // Statements. Values stand in them as they are quoted.
 inline const std::string PURGE = "DELETE FROM token where deadline < strftime('%s', 'now');";
@@ -40,29 +71,60 @@ inline const std::string SCHEMA =
 inline const std::string SELECT =
     "SELECT tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra FROM token ";
 
-std::string selectSql(const std::string& strTid);
-std::string deleteSql(const std::string& strField, const std::string& strValue);
+inline std::string selectSql(const std::string& strTid)
+{
+    return SELECT + " WHERE  (tid='" + strTid + "' );";
+}
 
-// The lines of the log, as the seam holds them. strFile is a source file, whose line numbers read '#', or the
-// field list at a line. An ordinary line;
-std::string ordinary(const std::string& strFile, const std::string& strMessage);
+inline std::string deleteSql(const std::string& strField, const std::string& strValue)
+{
+    return "DELETE FROM token WHERE  (" + strField + " in ('" + strValue + "' ) );";
+}
+
+// The lines of the log, as the seam holds them. An ordinary line;
+inline std::string ordinary(const std::string& strFile, const std::string& strMessage)
+{
+    return strFile + " " + strMessage + "\n";
+}
+
 // a failure line with a message of its own, written while errno is nErrno;
-std::string fail(const std::string& strFile, const std::string& strMessage, int nErrno = 0);
+inline std::string fail(const std::string& strFile, const std::string& strMessage, int nErrno = 0)
+{
+    return ordinary(strFile, "(" + strFile + ")(" + strerror(nErrno) + ")" + strMessage + "\n");
+}
+
 // the failure line of a condition;
-std::string failed(const std::string& strFile, const std::string& strCondition, int nErrno = 0);
+inline std::string failed(const std::string& strFile, const std::string& strCondition, int nErrno = 0)
+{
+    return fail(strFile, "Failed [" + strCondition + "], err=" + strerror(nErrno), nErrno);
+}
+
 // those of several conditions, which report one failure on its way up;
-Texts allFailed(const std::string& strFile, const Texts& conditions, int nErrno = 0);
-// what the store logs of a statement that fails at its first try;
-Texts failureOf(const std::string& strSql, const std::string& strError, int nErrno = 0);
-// and lines in the system log, which shows errno ahead of the message as well.
-Texts inSystemLog(Texts lines, int nErrno);
+inline Texts allFailed(const std::string& strFile, const Texts& conditions, int nErrno = 0)
+{
+    Texts lines;
+    for (const std::string& strCondition : conditions) {
+        lines.push_back(failed(strFile, strCondition, nErrno));
+    }
+    return lines;
+}
+
+// and what the store logs of a statement that fails at its first try.
+inline Texts failureOf(const std::string& strSql, const std::string& strError, int nErrno = 0)
+{
+    return {ordinary(STORE, "i=0,run sql failed, error=" + strError + ", sql=" + strSql),
+            fail(STORE, "run sql failed, sql=" + strSql, nErrno)};
+}
 
 // What the store logs when it may not become root, and so cannot open the database for a statement.
 const std::string NOT_ROOT = failed(STORE, "0 > seteuid(0)", EPERM);
 const Texts NOT_OPENED = {NOT_ROOT, failed(STORE, "0 > initDb()", EPERM)};
 
 // The lines logged since the last call.
-Texts takeLines();
+inline Texts takeLines()
+{
+    return std::exchange(seam().lines, {});
+}
 
 // Expects these lines, texts or one list of them; and that a call returns -1 and logs them.
 #define EXPECT_LINES(...) EXPECT_EQ((Texts{__VA_ARGS__}), takeLines())

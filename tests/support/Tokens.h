@@ -21,19 +21,93 @@ struct Field {
 };
 
 // In the field list's order.
-const std::vector<Field>& fields();
+inline const std::vector<Field>& fields()
+{
+    static const Json::Value jNow = static_cast<Json::Int64>(NOW);
+    static const Json::Value jEmpty(Json::objectValue);
+    static const std::vector<Field> rgField = {
+        {"tid", 2, "string", "tid TEXT primary key NOT NULL", "INVALID_TOKEN_ID", R"("new")", "5"},
+        {"bind_sid", 4, "string", "bind_sid TEXT", "", R"("S'2")", "null"},
+        {"uid", 6, "long long", "uid INTEGER", 4294967295U, "0", R"("0")"},
+        {"deadline", 8, "long long", "deadline INTEGER default -1", -1, "3600", "1.5"},
+        {"count", 10, "long long", "count INTEGER default 1", 1, "-1", R"("5")"},
+        {"create_time", 14, "long long", "create_time INTEGER default CURRENT_TIMESTAMP", jNow, "-5", "[]"},
+        {"function", 16, "string", "function TEXT NOT NULL", "VEMO_ACCESS_TOKEN", R"("")", "{}"},
+        {"webapi_allow", 18, "Json::objectValue", "webapi_allow TEXT", jEmpty, R"({"B":{}})", "[]"},
+        {"extra", 22, "Json::objectValue", "extra TEXT", jEmpty, R"({"z":null})", R"("{}")"},
+    };
+    return rgField;
+}
 
 // The record of a token: that of most tests, with the members of strChanges (JSON) in place of its own.
-Json::Value token(const std::string& strChanges = "{}");
+inline Json::Value token(const std::string& strChanges = "{}")
+{
+    Json::Value jToken = json(
+        R"({"tid":"t","bind_sid":"S1","uid":1000,"deadline":9999999999,"count":3,"create_time":1690000000,
+            "function":"VPN","webapi_allow":{"Api":{"method":["get","post"]},"Odd":{"method":[{}]}},
+            "extra":{"note":"it's mine"}})");
+    const Json::Value jChanges = json(strChanges);
+    for (const std::string& strName : jChanges.getMemberNames()) {
+        jToken[strName] = jChanges[strName];
+    }
+    return jToken;
+}
 
-// The same without one member, and as a row of the table.
-Json::Value without(const char* szMember, Json::Value jToken = token());
-std::string row(const Json::Value& jToken);
+// The same with another count.
+inline Json::Value counted(Json::Int64 nCount)
+{
+    return token("{\"count\":" + std::to_string(nCount) + "}");
+}
 
-// The statement that saves a record: strVerb is INSERT or REPLACE.
-std::string saveSql(const std::string& strVerb, const Json::Value& jToken);
+// A record without one member; with a value of a wrong type for a field.
+inline Json::Value without(const char* szMember, Json::Value jToken = token())
+{
+    jToken.removeMember(szMember);
+    return jToken;
+}
+
+inline Json::Value withWrong(const Field& field)
+{
+    Json::Value jToken = token();
+    jToken[field.szName] = json(field.szWrong);
+    return jToken;
+}
+
+// The values of a record's fields as texts, with szQuote around those that SQL quotes, and quotes doubled.
+inline Texts values(const Json::Value& jToken, const std::string& strQuote)
+{
+    Texts texts;
+    for (const Field& field : fields()) {
+        const Json::Value& jValue = jToken[field.szName];
+        std::string strText = jValue.isObject() ? text(jValue) : jValue.asString();
+        if (std::string("long long") != field.szType && !strQuote.empty()) {
+            for (size_t n = 0; std::string::npos != (n = strText.find(strQuote, n)); n += 2) {
+                strText.insert(n, strQuote);
+            }
+            strText = strQuote + strText + strQuote;
+        }
+        texts.push_back(strText);
+    }
+    return texts;
+}
+
+// A record as a row of the table, and the statement that saves it: strVerb is INSERT or REPLACE.
+inline std::string row(const Json::Value& jToken)
+{
+    return joined(values(jToken, ""), "|");
+}
+
+inline std::string saveSql(const std::string& strVerb, const Json::Value& jToken)
+{
+    return strVerb +
+           " INTO token (tid,bind_sid,uid,deadline,count,create_time,function,webapi_allow,extra) VALUES (" +
+           joined(values(jToken, "'"), ",") + ")";
+}
 
 // A token id of 127 characters, the fewest that a caller may choose, which starts with strStart.
-std::string tid(const std::string& strStart = "");
+inline std::string tid(const std::string& strStart = "")
+{
+    return strStart + std::string(127 - strStart.size(), 'x');
+}
 
 #endif

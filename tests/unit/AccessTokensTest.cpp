@@ -92,7 +92,7 @@ TEST_F(TokensTest, SayWhatHappenedToAGrant)
 {
     // The first tries of the statement get the answers. The count is szStored then.
     const auto says = [&](const char* szCount, const std::string& strStatement,
-                          const std::vector<Answer>& answers, AccessTokens::Answer answer,
+                          const std::vector<SqlAnswer>& answers, AccessTokens::Answer answer,
                           const char* szStored) {
         SCOPED_TRACE(szCount + (" " + strStatement));
         query("DELETE FROM token");
@@ -176,6 +176,7 @@ TEST_F(TokensTest, ThrowWhatTheyCannotDo)
 TEST_F(TokensTest, SayWhyTheyCannotHaveTheLock)
 {
     insert();
+    VEMO_ACCESS_TOKEN::logToStdout(true);
     const CallLock lock;
     const AccessTokens tokens(std::chrono::milliseconds(0));
     const std::string strReason = "/run/vemo-access-token.lock: Connection timed out";

@@ -292,16 +292,4 @@ TEST_F(Creation, TriesNoOtherIdWhenTheGeneratedOneExists)
     EXPECT_EQ(1u, seam().statements().size());
 }
 
-TEST_F(Creation, ReportsFailureAfterWaitingForALockAlthoughTheTokenIsThere)
-{
-    failStatements("INSERT", LOCKED);
-    EXPECT_FAILURE(createByTid(), fail(STORE, "sql error, sql=" + saveSql("INSERT", record()), EIO),
-                   failed(SERVICE, CREATE_FAILED, EIO), summary());
-    EXPECT_EQ((Texts{row(record())}), rows());
-    failStatements("INSERT", LOCKED);
-    EXPECT_EQ(-1, createGenerated());
-    EXPECT_EQ(4u, takeLines().size());
-    EXPECT_EQ(2u, rows().size());
-}
-
 } // namespace

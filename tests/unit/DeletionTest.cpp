@@ -6,7 +6,6 @@
 
 namespace {
 
-const std::string STORE_FAILED = "0 > (err = m_pDb->tokenDelete(jParam))";
 const std::string ARRAY_FAILED = "0 > (err = tokenDeleteByArray(strVector, szName))";
 const std::string NO_STRING = "jType[szName][0].asString() != \"string\"";
 
@@ -126,26 +125,6 @@ TEST_F(Deletion, RefusesListsValuesAndNames)
     EXPECT_FAILURE(byName("1000", "uid"), failed(SERVICE, NO_STRING, EACCES), arraySummary("uid", "1000"),
                    failed(SERVICE, ARRAY_FAILED, EACCES), nameSummary("uid", "1000"));
     EXPECT_EQ(Texts{}, seam().statements());
-}
-
-TEST_F(Deletion, TellsEachStepOfAFailure)
-{
-    const auto refused = [](const std::string& strSql) {
-        return failureOf(strSql, DISK_ERROR.szError, EIO) + Texts{failed(STORE, "0 > (err = runSql())", EIO)};
-    };
-    const Texts above = {failed(SERVICE, STORE_FAILED, EIO), arraySummary("tid", "a"),
-                         failed(SERVICE, ARRAY_FAILED, EIO), nameSummary("tid", "a")};
-    failStatements("DELETE", DISK_ERROR, 3);
-    EXPECT_FAILURE(byTid("a"), refused(deleteSql("tid", "a")) + above);
-    EXPECT_FAILURE(byTids({"a", "b", "c"}),
-                   refused(deleteSql("tid", "a''b''c")) +
-                       Texts{failed(SERVICE, STORE_FAILED, EIO), arraySummary("tid", "a,b,c")});
-    EXPECT_FAILURE(api().tokenDeleteAll(), refused("DELETE FROM token;"));
-    EXPECT_EQ("a a'b b c", tids());
-    // A statement that had to wait has taken effect.
-    failStatements("DELETE", LOCKED);
-    EXPECT_FAILURE(byTid("a"), Texts{fail(STORE, "sql error, sql=" + deleteSql("tid", "a"), EIO)} + above);
-    EXPECT_EQ("a'b b c", tids());
 }
 
 } // namespace

@@ -17,13 +17,6 @@ const std::string DELETE_T = deleteSql("tid", "t");
 const std::string NOT_PERMITTED =
     failed(SERVICE, "0 > (err = checkPermission(jToken, szWebapiName, szWebapiMethod))");
 
-Json::Value counted(Json::Int64 nCount)
-{
-    Json::Value jToken = token();
-    jToken["count"] = nCount;
-    return jToken;
-}
-
 std::string refused(const std::string& strTid, const std::string& strApi, const std::string& strMethod)
 {
     return ordinary(SERVICE, "token grant failed!!, strTid=" + strTid + ", szWebapiName=" + strApi +
@@ -170,43 +163,6 @@ TEST_F(Grant, RefusesRecordsThatAreMalformed)
         EXPECT_FAILURE(grant("t", "Api", nullptr), part.second);
         EXPECT_EQ(UNTOUCHED, m_jToken);
     }
-}
-
-// A statement that had to wait for a lock has taken effect, and yet the grant is refused.
-TEST_F(Grant, FailsWithTheStoreAndLeavesTheCallersRecordAlone)
-{
-    const Texts lookup = {failed(STORE, "0 > tokenGet(jParam, jTokenArray)", EIO),
-                          failed(SERVICE, "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))", EIO),
-                          failed(SERVICE, "0 > (err = tokenGetByTid(strTid, jToken))", EIO)};
-    const Texts save = {failed(SERVICE, "0 > m_pDb->tokenUpdate(jToken)", EIO),
-                        ordinary(SERVICE, "tokenSaveByOverwrite failed, jToken=" + text(counted(1))),
-                        failed(SERVICE, "0 > tokenSaveByOverwrite(jToken)", EIO),
-                        failed(SERVICE, "0 > tokenCountDegrade(jToken)", EIO)};
-    const Texts remove = {failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))", EIO),
-                          ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=t"),
-                          failed(SERVICE, "0 > (err = tokenDeleteByArray(strVector, szName))", EIO),
-                          ordinary(SERVICE, "tokenDeleteByName failed, name=tid, strValue=t"),
-                          failed(SERVICE, "0 > tokenDeleteByTid(strTid)", EIO),
-                          failed(SERVICE, "0 > tokenCountDegrade(jToken)", EIO)};
-    // The statement that fails starts with szStart.
-    const auto fails = [&](const char* szStart, const std::string& strSql, const std::string& strCondition,
-                           int nCount, const char* szAfterLock, const Texts& lines) {
-        for (const bool blLock : {false, true}) {
-            SCOPED_TRACE(szStart);
-            query("DELETE FROM token");
-            insert(text(counted(nCount)));
-            failStatements(szStart, blLock ? LOCKED : DISK_ERROR);
-            EXPECT_FAILURE(grant(), (blLock ? Texts{fail(STORE, "sql error, sql=" + strSql, EIO)}
-                                            : failureOf(strSql, "disk I/O error", EIO) +
-                                                  Texts{failed(STORE, strCondition, EIO)}) +
-                                        lines);
-            EXPECT_EQ(UNTOUCHED, m_jToken);
-            EXPECT_EQ(blLock ? szAfterLock : std::to_string(nCount), countOf());
-        }
-    };
-    fails("SELECT", SELECT_T, "0 > runSql(FillList, &jTokenArrayOut)", 2, "2", lookup);
-    fails("REPLACE", saveSql("REPLACE", counted(1)), "0 > runSql()", 2, "1", save);
-    fails("DELETE", DELETE_T, "0 > (err = runSql())", 1, "", remove);
 }
 
 // Nothing is locked between the lookup and the change: another process may come in between.

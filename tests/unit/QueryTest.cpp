@@ -330,7 +330,7 @@ TEST_F(Query, DeletesNothingWhereSqliteRefusesTheStatement)
         EXPECT_EQ("near \")\": syntax error", m_db.m_strErr);
         EXPECT_LINES(failureOf(strSql, m_db.m_strErr, EIO) + Texts{failed(STORE, RUN_DELETE_FAILED, EIO)});
     }
-    const Lock lock(path());
+    const Lock lock(path(), 1000);
     errno = 0;
     EXPECT_EQ(-1, remove("{}", true));
     EXPECT_EQ(500u, seam().callsOf({"usleep"}).size());

@@ -135,7 +135,7 @@ TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
 TEST_F(RunSql, TriesAgainOnlyAfterLocks)
 {
     // One answer for each try. szError is that of the failure line, null when the statement succeeds.
-    const auto runs = [&](const char* szName, const std::vector<Answer>& answers, const char* szErrAfter,
+    const auto runs = [&](const char* szName, const std::vector<SqlAnswer>& answers, const char* szErrAfter,
                           const char* szError) {
         for (const bool blCallback : {false, true}) {
             SCOPED_TRACE(::testing::Message() << szName << " " << blCallback);
@@ -197,7 +197,7 @@ TEST_F(RunSql, GivesUpAfter500Tries)
     for (const bool blDebug : {false, true}) {
         debugInfo(blDebug);
         Texts calls, errors, lines;
-        std::vector<Answer> answers;
+        std::vector<SqlAnswer> answers;
         for (int i = 0; i < 500; ++i) {
             calls.insert(calls.end(), {"sqlite3_exec " + UPDATE, "usleep 10000"});
             errors.push_back("database is locked (" + std::to_string(i) + ")");
@@ -260,7 +260,7 @@ TEST_F(RunSql, PurgeFailsWithTheLinesThatWereAskedFor)
     const std::string strLocked = tryLine(0, "database is locked", PURGE);
     const Texts refused = failureOf(PURGE, "disk I/O error", EIO);
     const struct {
-        Answer answer;
+        SqlAnswer answer;
         Texts always, debug; // the store's lines
         std::string strOwn;
         const char* szLeft;

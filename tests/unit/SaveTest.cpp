@@ -233,7 +233,7 @@ TEST_F(Save, FailsWithItsStatement)
 {
     const std::string strSql = saveSql("REPLACE", token());
     {
-        const Lock lock(path());
+        const Lock lock(path(), 1000);
         EXPECT_EQ(-1, save(token()));
     }
     EXPECT_LINES(ordinary(STORE, "i=500,run sql failed, error=database is locked, sql=" + strSql),

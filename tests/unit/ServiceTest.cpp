@@ -15,6 +15,7 @@ static_assert(!std::is_copy_constructible_v<AccessTokenApi> && !std::is_copy_ass
 namespace {
 
 const std::string RUN_FAILED = "0 > runSql(FillList, &jTokenArrayOut)";
+const Json::Value UNTOUCHED = "what the caller had";
 
 class ServiceObject : public StoreTest {};
 
@@ -70,77 +71,136 @@ TEST_F(ServiceObject, KeepsErrnoAtItsEndAndTriesTwiceToClose)
     EXPECT_LINES(failed(STORE, "SQLITE_OK != sqlite3_close(m_pDb)", EIO));
 }
 
-// An object whose store could not be allocated.
-TEST_F(ServiceObject, FailsInEachOperationThatNeedsAStoreWithoutOne)
-{
-    seam().fail("operator new", 0);
-    AccessTokenApi api;
-    EXPECT_EQ((Texts{"operator new"}), seam().calls);
-    EXPECT_LINES(ordinary(SERVICE, "new AccessTokenDbApi failed"));
-
-    unsigned int uid = 1026;
-    std::string strTid = tid();
-    std::string strA = "a";
-    Texts strVector{"a"};
-    Json::Value jNull;
-    Json::Value jObject(Json::objectValue);
-    Json::Value jArray(Json::arrayValue);
-    Json::Value jLastUse = token(R"({"tid":"a","count":1})");
-    Json::Value jToken = token(R"({"tid":"a","count":2})");
-    const std::string strCreate =
-        "tokenCreate failed, tid=" + strTid + ", uid=1026, strFunction=a, jTokenOption=null";
-    const std::string strSave = "tokenSaveByOverwrite failed, jToken=" + text(jLastUse);
-    const auto byArray = [](const std::string& strName) {
-        return Texts{"!m_pDb", "tokenDeleteByArray failed, name=" + strName + ", strVector=a"};
-    };
-    const auto byName = [&](const std::string& strName) {
-        return byArray(strName) + Texts{"0 > (err = tokenDeleteByArray(strVector, szName))",
-                                        "tokenDeleteByName failed, name=" + strName + ", strValue=a"};
-    };
-    // The messages are conditions, and the operations' own lines, which say "failed".
-    const auto fails = [](int nResult, const Texts& messages) {
-        EXPECT_EQ(-1, nResult);
+// Below the service there is no store, SQLite refuses a statement, or a statement had to wait for a lock and
+// has taken effect. Each step tells of it, up to the operation.
+class FailedStore : public TableTest {
+protected:
+    // Conditions of the service, and its operations' own lines, which say "failed".
+    static Texts lines(const Texts& messages, int nErrno)
+    {
         Texts lines;
         for (const std::string& strMessage : messages) {
             const bool blOwnLine = std::string::npos != strMessage.find(" failed, ");
-            lines.push_back(blOwnLine ? ordinary(SERVICE, strMessage) : failed(SERVICE, strMessage));
+            lines.push_back(blOwnLine ? ordinary(SERVICE, strMessage) : failed(SERVICE, strMessage, nErrno));
         }
-        EXPECT_LINES(lines);
-    };
-    errno = 0;
-    fails(api.tokenCreateByTid(uid, strA, jNull, strTid), {"!m_pDb", strCreate});
-    fails(api.tokenList(jObject, jArray), {"!m_pDb"});
-    fails(api.tokenGetByTid(strA, jNull), {"!m_pDb"});
-    fails(api.tokenGetByTidArray(strVector, jArray), {"!m_pDb"});
-    fails(api.tokenUpdateByTid(strA, jObject), {"!m_pDb", "0 > (nCount = tokenGetByTid(strTid, jToken))"});
-    fails(api.tokenSaveByOverwrite(jLastUse), {"!m_pDb", strSave});
-    fails(api.tokenDeleteByArray(strVector, "tid"), byArray("tid"));
-    fails(api.tokenDeleteByName(strA, "tid"), byName("tid"));
-    fails(api.tokenDeleteByTid(strA), byName("tid"));
-    fails(api.tokenDeleteByBindSid(strA), byName("bind_sid"));
-    fails(api.tokenDeleteByFunction(strA), byName("function"));
-    fails(api.tokenDeleteByTidArray(strVector), byArray("tid"));
-    fails(api.tokenDeleteAll(), {"!m_pDb"});
-    fails(api.cleanExpireToken(true), {"!m_pDb"});
-    fails(api.cleanExpireToken(false), {});
-    fails(api.tokenGrant(strA, "Api", "get", jNull), {"!m_pDb", "0 > (err = tokenGetByTid(strTid, jToken))"});
-    fails(api.tokenCountDegrade(jToken), {"!m_pDb", strSave, "0 > tokenSaveByOverwrite(jToken)"});
-    fails(api.tokenCountDegrade(jLastUse), byName("tid") + Texts{"0 > tokenDeleteByTid(strTid)"});
-    EXPECT_EQ(-1, api.tokenCreate(uid, strA, jNull, strA));
-    EXPECT_EQ(3u, takeLines().size()); // they hold a random id
-    EXPECT_EQ("a", strA);
-    EXPECT_EQ(Json::Value(), jNull);
-    EXPECT_EQ(Json::Value(Json::arrayValue), jArray);
+        return lines;
+    }
+};
 
-    VEMO_ACCESS_TOKEN::debugInfo(true);
+TEST_F(FailedStore, FailsEachOperation)
+{
+    unsigned int uid = 1026;
+    std::string strTid = "t", strLast = "last", strSid = "S1", strFunction = "VPN", strNew = tid();
+    Texts tids{"t"};
+    Json::Value jNull;
+    Json::Value jAll(Json::objectValue);
+    Json::Value jArray(Json::arrayValue);
+    Json::Value jOut = UNTOUCHED;
+    Json::Value jToken = counted(2);
+    Json::Value jSaved = counted(1);
+    Json::Value jLastUse = token(R"({"tid":"last","count":1})");
+    const std::string strInsert =
+        saveSql("INSERT", json(R"({"bind_sid":"","count":1,"create_time":1700000000,"deadline":1700086400,
+                                   "extra":{},"function":"VPN","tid":")" +
+                               strNew + R"(","uid":1026,"webapi_allow":{}})"));
+    const std::string strReplace = saveSql("REPLACE", jSaved);
+
+    // The conditions above a statement: in the store, and the last at the service's call of the store.
+    const Texts toCreate = {"0 > runSql()", "0 > m_pDb->tokenCreate(jParam)"};
+    const Texts toUpdate = {"0 > runSql()", "0 > m_pDb->tokenUpdate(jToken)"};
+    const Texts toDelete = {"0 > (err = runSql())", "0 > (err = m_pDb->tokenDelete(jParam))"};
+    const Texts toList = {RUN_FAILED, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)"};
+    const Texts toGetAll = {RUN_FAILED, "0 > m_pDb->tokenGet(jParam, jTokenArrayOut)"};
+    const Texts toGet = {RUN_FAILED, "0 > tokenGet(jParam, jTokenArray)",
+                         "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))"};
+    // What the service logs above that.
+    const Texts created = {"tokenCreate failed, tid=" + strNew +
+                           ", uid=1026, strFunction=VPN, jTokenOption=null"};
+    const Texts saved = {"tokenSaveByOverwrite failed, jToken=" + text(jSaved)};
+    const Texts overwritten = saved + Texts{"0 > tokenSaveByOverwrite(jToken)"};
+    const auto byArray = [](const std::string& strName, const std::string& strValue) {
+        return Texts{"tokenDeleteByArray failed, name=" + strName + ", strVector=" + strValue};
+    };
+    const auto byName = [&](const std::string& strName, const std::string& strValue) {
+        return byArray(strName, strValue) +
+               Texts{"0 > (err = tokenDeleteByArray(strVector, szName))",
+                     "tokenDeleteByName failed, name=" + strName + ", strValue=" + strValue};
+    };
+    const Texts lastUsed = byName("tid", "last") + Texts{"0 > tokenDeleteByTid(strTid)"};
+    const Texts degraded = {"0 > tokenCountDegrade(jToken)"};
+
+    seam().fail("operator new", 0);
+    AccessTokenApi apiWithoutStore;
+    EXPECT_EQ((Texts{"operator new"}), seam().calls);
+    EXPECT_LINES(ordinary(SERVICE, "new AccessTokenDbApi failed"));
+    const auto fails = [&](const std::function<int(AccessTokenApi&)>& operate, const std::string& strSql,
+                           const Texts& conditions, const Texts& above) {
+        SCOPED_TRACE(strSql + joined(above, " "));
+        const Texts inStore(conditions.begin(), conditions.end() - 1);
+        const Texts inService = lines(Texts{conditions.back()} + above, EIO);
+        query("DELETE FROM token");
+        insert(R"({"count":2})");
+        insert(R"({"tid":"last","count":1})");
+        const Texts before = rows();
+        seam().calls.clear();
+        failStatements(strSql, DISK_ERROR);
+        EXPECT_FAILURE(operate(api()), failureOf(strSql, DISK_ERROR.szError, EIO) +
+                                           allFailed(STORE, inStore, EIO) + inService);
+        EXPECT_EQ(before, rows());
+        failStatements(strSql, LOCKED);
+        EXPECT_FAILURE(operate(api()), Texts{fail(STORE, "sql error, sql=" + strSql, EIO)} +
+                                           allFailed(STORE, Texts(inStore.begin() + 1, inStore.end()), EIO) +
+                                           inService);
+        EXPECT_EQ(0 == strSql.find("SELECT"), before == rows());
+        EXPECT_EQ(UNTOUCHED, jOut);
+        if (strSql == seam().statements().front()) { // without a store, nothing comes before
+            reset();
+            EXPECT_FAILURE(operate(apiWithoutStore), lines(Texts{"!m_pDb"} + above, 0));
+            EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
+        }
+    };
+#define CALL(operation) [&](AccessTokenApi& a) { return a.operation; }
+    fails(CALL(tokenCreateByTid(uid, strFunction, jNull, strNew)), strInsert, toCreate, created);
+    fails(CALL(tokenList(jAll, jArray)), SELECT + ";", toList, {});
+    fails(CALL(tokenGetByTid(strTid, jNull)), selectSql("t"), toGet, {});
+    fails(CALL(tokenGetByTidArray(tids, jArray)), SELECT + " WHERE  (tid in ('t' ) );", toGetAll, {});
+    fails(CALL(tokenUpdateByTid(strTid, jAll)), selectSql("t"), toGet,
+          {"0 > (nCount = tokenGetByTid(strTid, jToken))"});
+    fails(CALL(tokenUpdateByTid(strTid, jSaved)), strReplace, toUpdate, overwritten);
+    fails(CALL(tokenSaveByOverwrite(jSaved)), strReplace, toUpdate, saved);
+    fails(CALL(tokenDeleteByArray(tids, "tid")), deleteSql("tid", "t"), toDelete, byArray("tid", "t"));
+    fails(CALL(tokenDeleteByTidArray(tids)), deleteSql("tid", "t"), toDelete, byArray("tid", "t"));
+    fails(CALL(tokenDeleteByName(strTid, "tid")), deleteSql("tid", "t"), toDelete, byName("tid", "t"));
+    fails(CALL(tokenDeleteByTid(strTid)), deleteSql("tid", "t"), toDelete, byName("tid", "t"));
+    fails(CALL(tokenDeleteByBindSid(strSid)), deleteSql("bind_sid", "S1"), toDelete,
+          byName("bind_sid", "S1"));
+    fails(CALL(tokenDeleteByFunction(strFunction)), deleteSql("function", "VPN"), toDelete,
+          byName("function", "VPN"));
+    fails(CALL(tokenGrant(strTid, "Api", "get", jOut)), selectSql("t"), toGet,
+          {"0 > (err = tokenGetByTid(strTid, jToken))"});
+    fails(CALL(tokenGrant(strTid, "Api", "get", jOut)), strReplace, toUpdate, overwritten + degraded);
+    fails(CALL(tokenGrant(strLast, "Api", "get", jOut)), deleteSql("tid", "last"), toDelete,
+          lastUsed + degraded);
+    fails(CALL(tokenCountDegrade(jToken = counted(2))), strReplace, toUpdate, overwritten);
+    fails(CALL(tokenCountDegrade(jLastUse)), deleteSql("tid", "last"), toDelete, lastUsed);
+#undef CALL
+    failStatements("DELETE", DISK_ERROR);
+    EXPECT_FAILURE(api().tokenDeleteAll(), failureOf("DELETE FROM token;", DISK_ERROR.szError, EIO) +
+                                               Texts{failed(STORE, "0 > (err = runSql())", EIO)});
+
     errno = 0;
-    EXPECT_FAILURE(api.cleanExpireToken(false),
+    EXPECT_FAILURE(apiWithoutStore.tokenDeleteAll(), failed(SERVICE, "!m_pDb"));
+    EXPECT_EQ(-1, apiWithoutStore.tokenCreate(uid, strFunction, jNull, strTid));
+    EXPECT_EQ(3u, takeLines().size()); // they hold a random id
+    EXPECT_EQ("t", strTid);
+    EXPECT_FAILURE(apiWithoutStore.cleanExpireToken(true), failed(SERVICE, "!m_pDb"));
+    EXPECT_EQ(-1, apiWithoutStore.cleanExpireToken(false));
+    VEMO_ACCESS_TOKEN::debugInfo(true);
+    EXPECT_FAILURE(apiWithoutStore.cleanExpireToken(false),
                    fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)"));
-    // Some operations need none.
-    EXPECT_EQ(0, api.VectorParamToJson(strVector, "tid", jNull));
-    Json::Value jUnlimited = json(R"({"count":-1})");
-    EXPECT_EQ(0, api.tokenCountDegrade(jUnlimited));
-    EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
+    // These need none.
+    EXPECT_EQ(0, apiWithoutStore.VectorParamToJson(tids, "tid", jAll));
+    EXPECT_EQ(0, apiWithoutStore.tokenCountDegrade(jToken = counted(-1)));
 }
 
 // Looking tokens up. QueryTest shows how filters become statements.
@@ -151,13 +211,6 @@ protected:
         TableTest::SetUp();
         insert();
         insert(R"({"tid":"a'b","deadline":1})"); // no lookup cares about deadlines
-    }
-
-    // What is logged of a statement that failed at its first try.
-    static Texts broken(const std::string& strSql, const Texts& inStore, const std::string& strInService)
-    {
-        return failureOf(strSql, DISK_ERROR.szError, EIO) + allFailed(STORE, inStore, EIO) +
-               Texts{failed(SERVICE, strInService, EIO)};
     }
 
     Json::Value m_jOut = json(R"({"left":"over"})");
@@ -178,9 +231,6 @@ TEST_F(Lookup, ListsWhatTheFilterSelects)
         EXPECT_EQ(Json::Value(5), m_jArray[0]);
         EXPECT_EQ(token(), m_jArray[1]);
         EXPECT_EQ(strSql + ";", seam().statements().back());
-        failStatements("SELECT", DISK_ERROR);
-        EXPECT_FAILURE(api().tokenList(jFilter, m_jArray),
-                       broken(strSql + ";", {RUN_FAILED}, "0 > m_pDb->tokenGet(jFilter, jTokenArrayOut)"));
     }
 }
 
@@ -220,8 +270,7 @@ TEST_F(Lookup, GetsATokenByItsId)
     m_jOut = json(R"({"left":"over"})");
     EXPECT_EQ(-1, api().tokenGetByTid(strTid, m_jOut));
     EXPECT_EQ(json("{}"), m_jOut);
-    EXPECT_LINES(broken(selectSql("t"), {RUN_FAILED, "0 > tokenGet(jParam, jTokenArray)"},
-                        "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))"));
+    takeLines();
     errno = 0;
     m_jOut = json(R"({"left":"over"})");
     EXPECT_EQ(-1, api().tokenGetByTid(strTid = "", m_jOut));
@@ -261,11 +310,6 @@ TEST_F(Lookup, GetsOneTokenByAListOfIds)
     }
     EXPECT_FAILURE(api().tokenGetByTidArray(none, m_jArray), failed(SERVICE, "0 >= strTidVector.size()"));
     EXPECT_EQ(Texts{}, seam().calls);
-    failStatements("SELECT", DISK_ERROR);
-    EXPECT_FAILURE(api().tokenGetByTidArray(none = {"t"}, m_jArray),
-                   broken(SELECT + " WHERE  (tid in ('t' ) );", {RUN_FAILED},
-                          "0 > m_pDb->tokenGet(jParam, jTokenArrayOut)"));
-    EXPECT_EQ(json("[5]"), m_jArray);
 }
 
 TEST_F(Lookup, MakesListsForFilters)

@@ -6,8 +6,6 @@
 
 namespace {
 
-const std::string GET_ONE_FAILED = "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))";
-const std::string GET_BY_TID_FAILED = "0 > (nCount = tokenGetByTid(strTid, jToken))";
 const std::string SAVE_FAILED = "0 > tokenSaveByOverwrite(jToken)";
 
 std::string overwritten(const Field& field)
@@ -144,32 +142,6 @@ TEST_F(Update, RefusesBadArguments)
     }
     EXPECT_THROW(update(R"({"count":18446744073709551615})"), Json::LogicError);
     EXPECT_EQ((Texts{row(token())}), rows());
-}
-
-TEST_F(Update, ReportsAFailedStore)
-{
-    const Texts lookup = {failed(STORE, "0 > tokenGet(jParam, jTokenArray)", EIO),
-                          failed(SERVICE, GET_ONE_FAILED, EIO), failed(SERVICE, GET_BY_TID_FAILED, EIO)};
-    const Texts save = {failed(SERVICE, "0 > m_pDb->tokenUpdate(jToken)", EIO), overwriteFailed(token()),
-                        failed(SERVICE, SAVE_FAILED, EIO)};
-    const std::string strReplace = saveSql("REPLACE", token());
-    failStatements("SELECT", DISK_ERROR);
-    EXPECT_FAILURE(update("{}"), failureOf(selectSql("t"), "disk I/O error", EIO) +
-                                     Texts{failed(STORE, "0 > runSql(FillList, &jTokenArrayOut)", EIO)} +
-                                     lookup);
-    failStatements("REPLACE", DISK_ERROR);
-    EXPECT_FAILURE(update("{}"), failureOf(strReplace, "disk I/O error", EIO) +
-                                     Texts{failed(STORE, "0 > runSql()", EIO)} + save);
-    EXPECT_EQ((Texts{row(token())}), rows());
-    // Nothing is written after a read that had to wait; a write that had to wait has been made.
-    failStatements("SELECT", LOCKED);
-    EXPECT_FAILURE(update(R"({"count":5})"),
-                   Texts{fail(STORE, "sql error, sql=" + selectSql("t"), EIO)} + lookup);
-    EXPECT_EQ("3", countOf());
-    failStatements("REPLACE", LOCKED);
-    EXPECT_EQ(-1, update(R"({"count":5})"));
-    EXPECT_EQ(4u, takeLines().size());
-    EXPECT_EQ("5", countOf());
 }
 
 // No transaction holds reading and writing together.
