@@ -1,5 +1,3 @@
-#include "Confinement.h"
-
 #include <dirent.h>
 #include <fcntl.h>
 #include <sqlite3.h>
@@ -12,10 +10,9 @@
 #include <cstdio>
 #include <cstring>
 
-#include "AccessTokenDefine.h"
 #include "CallLock.h"
 #include "Interpose.h"
-#include "Require.h"
+#include "Library.h"
 
 namespace {
 
@@ -23,35 +20,26 @@ bool g_blConfined = false;
 sqlite3* g_pOffered = nullptr;
 int g_nExtraFile = -1;
 int g_nTokensFile = -1;
-FILE* g_pResult = nullptr;
-FILE* g_pComplaints = nullptr;
+
+// A stream in memory.
+struct Capture {
+    char* szText = nullptr;
+    size_t cbText = 0;
+    FILE* pStream = open_memstream(&szText, &cbText);
+
+    std::string take()
+    {
+        fflush(pStream);
+        const std::string strTaken(szText, cbText);
+        rewind(pStream);
+        return strTaken;
+    }
+};
+
+Capture g_result;
+Capture g_complaints;
 FILE* g_pStdout = nullptr;
 FILE* g_pStderr = nullptr;
-std::string g_strResult;
-std::string g_strComplaints;
-
-ssize_t capture(void* pText, const char* szText, size_t cbText)
-{
-    static_cast<std::string*>(pText)->append(szText, cbText);
-    return static_cast<ssize_t>(cbText);
-}
-
-FILE* capturing(std::string& strText)
-{
-    cookie_io_functions_t functions = {};
-    functions.write = capture;
-    FILE* pStream = fopencookie(&strText, "w", functions);
-    FUZZ_REQUIRE(pStream);
-    return pStream;
-}
-
-std::string taken(FILE* pStream, std::string& strText)
-{
-    fflush(pStream);
-    std::string strTaken;
-    strTaken.swap(strText);
-    return strTaken;
-}
 
 int fileOf(const std::string& strText)
 {
@@ -94,16 +82,13 @@ int inputFile(const char* szName)
 
 namespace fuzz {
 
-const char* const EXTRA_FILE = "extra.json";
-const char* const TOKENS_FILE = "tokens.jsonl";
-
 Confinement::Confinement()
 {
     g_blConfined = true;
     g_pStdout = stdout;
     g_pStderr = stderr;
-    stdout = g_pResult ? g_pResult : stdout;
-    stderr = g_pComplaints ? g_pComplaints : stderr;
+    stdout = g_result.pStream;
+    stderr = g_complaints.pStream;
 }
 
 Confinement::~Confinement()
@@ -132,23 +117,14 @@ void setFileTexts(const std::string& strExtra, const std::string& strTokens)
     g_nTokensFile = fileOf(strTokens);
 }
 
-void captureStreams()
-{
-    g_pResult = capturing(g_strResult);
-    g_pComplaints = capturing(g_strComplaints);
-    setvbuf(g_pComplaints, nullptr, _IONBF, 0);
-    stdout = g_pResult;
-    stderr = g_pComplaints;
-}
-
 std::string takeResult()
 {
-    return taken(g_pResult, g_strResult);
+    return g_result.take();
 }
 
 std::string takeComplaints()
 {
-    return taken(g_pComplaints, g_strComplaints);
+    return g_complaints.take();
 }
 
 } // namespace fuzz

@@ -2,21 +2,17 @@
 
 #include <algorithm>
 #include <cctype>
+#include <map>
+#include <optional>
 #include <set>
-#include <string>
-#include <vector>
 
-#include "AccessTokenDefine.h"
-#include "AccessTokenUtil.h"
-#include "Commands.h"
-#include "Console.h"
-#include "Library.h"
-#include "PlainReading.h"
+#include "Command.h"
 #include "ToolStore.h"
 
 namespace {
 
 using fuzz::Texts;
+typedef tool::Command::Parameter Parameter;
 
 const std::set<std::string> READERS = {"list", "show", "check", "stats", "export", "generate", "help", ""};
 
@@ -48,51 +44,115 @@ std::string commandOf(const Texts& strArguments)
                                                                                          : "";
 }
 
-// Each option and argument gets exactly its texts from the command line, or the command fails.
-void checkReading(const tool::Command& command, const Texts& strArguments, int nStatus)
+// The texts given to each option and argument, by its name; "" for a flag.
+typedef std::map<std::string, Texts> Reading;
+
+Reading readingOf(const tool::Command& command)
 {
-    fuzz::Reading reading;
-    const Texts strBehindName(strArguments.begin() + 2, strArguments.end());
-    if (fuzz::readPlainly(command, strBehindName, reading)) {
-        FUZZ_REQUIRE(reading == fuzz::readingOf(command));
-    } else {
-        FUZZ_REQUIRE(tool::EXIT_STATUS_USAGE == nStatus);
+    Reading reading;
+    for (const tool::Command::Word& word : command.words()) {
+        reading[word.pParameter->strName].push_back(word.strText);
     }
+    return reading;
+}
+
+template <typename IsIt>
+const Parameter* find(const std::vector<Parameter>& parameters, IsIt isIt)
+{
+    const auto pFound = std::find_if(parameters.begin(), parameters.end(), isIt);
+    return parameters.end() == pFound ? nullptr : &*pFound;
+}
+
+// What the command should read from the arguments behind its name, without getopt, by plain comparisons.
+// Nothing if they are not valid.
+std::optional<Reading> readPlainly(const tool::Command& command, const Texts& strArguments)
+{
+    Reading reading;
+    auto itNext = strArguments.begin() + 2;
+    const auto add = [&](const Parameter* pParameter, const std::string& strText) {
+        if (!pParameter || (!pParameter->blRepeated && reading.count(pParameter->strName))) {
+            return false;
+        }
+        reading[pParameter->strName].push_back(strText);
+        return true;
+    };
+    // An option whose text, if it takes one, is the next argument.
+    const auto addNext = [&](const Parameter* pOption) {
+        const bool blText = pOption && !pOption->strType.empty();
+        return !(blText && strArguments.end() == itNext) && add(pOption, blText ? *itNext++ : "");
+    };
+    // "--name=text", "--name text" or "--name"
+    const auto addLong = [&](const std::string& strNext) {
+        const size_t nEquals = strNext.find('=');
+        const Parameter* pOption = find(command.options(), [&](const Parameter& each) {
+            return each.strName == strNext.substr(0, nEquals);
+        });
+        if (pOption && std::string::npos != nEquals) {
+            return !pOption->strType.empty() && add(pOption, strNext.substr(nEquals + 1));
+        }
+        return addNext(pOption);
+    };
+    // "-otext", "-o text", "-o" or several flags "-ox"
+    const auto addShort = [&](const std::string& strNext) {
+        bool blGood = true;
+        for (size_t n = 1; blGood && n < strNext.size(); ++n) {
+            const Parameter* pOption = find(command.options(), [&](const Parameter& each) {
+                return each.cShort && each.cShort == strNext[n];
+            });
+            if (pOption && !pOption->strType.empty() && n + 1 < strNext.size()) {
+                return add(pOption, strNext.substr(n + 1));
+            }
+            blGood = addNext(pOption);
+        }
+        return blGood;
+    };
+    for (bool blOptions = true; strArguments.end() != itNext;) {
+        const std::string strNext = *itNext++;
+        if (blOptions && strNext == "--") {
+            blOptions = false;
+            continue;
+        }
+        const Parameter* pArgument = find(command.arguments(), [&](const Parameter& each) {
+            return each.blRepeated || !reading.count(each.strName);
+        });
+        const bool blOption = blOptions && strNext.size() > 1 && strNext[0] == '-';
+        if (!(!blOption           ? add(pArgument, strNext)
+              : strNext[1] == '-' ? addLong(strNext)
+                                  : addShort(strNext))) {
+            return std::nullopt;
+        }
+    }
+    return reading;
 }
 
 // The exit status.
 int run(const Texts& strArguments, const std::string& strInput)
 {
-    const fuzz::Input input(strInput);
     // Making all commands would take most of the time.
     const std::string strCommand = commandOf(strArguments);
     tool::Commands commands;
     entryOf(strCommand).add(commands);
-    const int nStatus = fuzz::runTool(commands, strArguments);
-    if (!strCommand.empty()) {
-        checkReading(commands.all().front(), strArguments, nStatus);
+    const int nStatus = fuzz::runTool(commands, strArguments, strInput);
+    if (!strCommand.empty()) { // each option and argument gets exactly its texts, or the command fails
+        const auto reading = readPlainly(commands.all().front(), strArguments);
+        FUZZ_REQUIRE(reading ? *reading == readingOf(commands.all().front())
+                             : tool::EXIT_STATUS_USAGE == nStatus);
     }
     return nStatus;
 }
 
-void checkNames()
+void prepare()
 {
     tool::Commands commands;
     for (const tool::CommandEntry& entry : tool::COMMANDS) {
         entry.add(commands);
         FUZZ_REQUIRE(commands.all().back().name() == entry.szName);
     }
-}
-
-void prepare()
-{
-    checkNames();
     fuzz::setFileTexts(
         R"({"a":[1]})",
         R"({"tid":")" + fuzz::tid("FromAFile") +
             R"(","bind_sid":"","uid":0,"deadline":4102444800,"count":1,"create_time":1,"function":"f",)"
             R"("webapi_allow":{},"extra":{}})");
-    fuzz::captureStreams();
 }
 
 bool has(const Texts& strArguments, const std::string& strArgument)
@@ -123,25 +183,13 @@ bool endsWith(const std::string& strText, const std::string& strEnd)
            0 == strText.compare(strText.size() - strEnd.size(), strEnd.size(), strEnd);
 }
 
-// Notes on a file that was imported. The next file may fail, so they can precede a complaint.
-bool isNote(const std::string& strLine)
-{
-    const std::string strStart = "vemo-access-token: ";
-    if (0 != strLine.compare(0, strStart.size(), strStart)) {
-        return false;
-    }
-    const size_t nNumberEnd = strLine.find_first_not_of("0123456789", strStart.size());
-    const bool blNumber = nNumberEnd != strStart.size() && nNumberEnd != std::string::npos;
-    return endsWith(strLine, "; the whole lines were imported\n") ||
-           (blNumber &&
-            strLine.substr(nNumberEnd) == " of them expired: the next call of a program purges those\n");
-}
-
+// Notes on a file that was imported come first, when the next file fails.
 std::string withoutNotes(std::string strComplaint)
 {
     for (;;) {
         const std::string strLine = strComplaint.substr(0, strComplaint.find('\n') + 1);
-        if (!isNote(strLine)) {
+        if (!endsWith(strLine, "; the whole lines were imported\n") &&
+            !endsWith(strLine, " of them expired: the next call of a program purges those\n")) {
             return strComplaint;
         }
         strComplaint.erase(0, strLine.size());

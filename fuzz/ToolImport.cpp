@@ -1,44 +1,36 @@
 // The text of a file to import. Either all of it is imported or nothing. What was imported can be exported
 // and imported again, and is the same without --partial if the import then succeeds.
 
-#include <string>
-#include <vector>
-
-#include "Commands.h"
-#include "Console.h"
 #include "ExportEnd.h"
 #include "Json.h"
-#include "Library.h"
 #include "ToolStore.h"
 
 namespace {
 
-int run(void (&addCommand)(tool::Commands&), std::vector<std::string> strArguments)
+int run(void (&addCommand)(tool::Commands&), const fuzz::Texts& strArguments,
+        const std::string& strInput = "")
 {
     tool::Commands commands;
     addCommand(commands);
-    strArguments.insert(strArguments.begin(), "vemo-access-token");
-    const int nStatus = fuzz::runTool(commands, strArguments);
+    const int nStatus = fuzz::runTool(commands, strArguments, strInput);
     fuzz::takeComplaints();
     return nStatus;
 }
 
-int importText(const std::string& strText)
+int importText(std::string_view strText)
 {
-    const fuzz::Input input(strText);
-    return run(tool::addImport, {"import", "-"});
+    return run(tool::addImport, {"vemo-access-token", "import", "-"}, std::string(strText));
 }
 
-int importPartially(const std::string& strText)
+int importPartially(std::string_view strText)
 {
-    const fuzz::Input input(strText);
-    return run(tool::addImport, {"import", "--partial", "-"});
+    return run(tool::addImport, {"vemo-access-token", "import", "--partial", "-"}, std::string(strText));
 }
 
 std::string exportText()
 {
     fuzz::takeResult();
-    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == run(tool::addExport, {"export", "-"}));
+    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == run(tool::addExport, {"vemo-access-token", "export", "-"}));
     return fuzz::takeResult();
 }
 
@@ -74,7 +66,7 @@ Json::Value tokensOf(std::string_view strText)
 void checkImported(fuzz::ToolStore& store, std::string_view strText)
 {
     store.clear();
-    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == importPartially(std::string(strText)));
+    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == importPartially(strText));
     const Json::Value jStored = store.tokens();
     FUZZ_REQUIRE(fuzz::text(jStored) == fuzz::text(tokensOf(strText)));
     const std::string strExported = exportText();
@@ -83,7 +75,7 @@ void checkImported(fuzz::ToolStore& store, std::string_view strText)
     FUZZ_REQUIRE(fuzz::text(store.tokens()) == fuzz::text(jStored));
     FUZZ_REQUIRE(strExported == exportText());
     store.clear();
-    const bool blWhole = tool::EXIT_STATUS_DONE == importText(std::string(strText));
+    const bool blWhole = tool::EXIT_STATUS_DONE == importText(strText);
     FUZZ_REQUIRE(fuzz::text(store.tokens()) == (blWhole ? fuzz::text(jStored) : "[]"));
 }
 
@@ -93,12 +85,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
 {
     const fuzz::Confinement confinement;
     static fuzz::ToolStore store;
-    [[maybe_unused]] static const bool blPrepared = (fuzz::captureStreams(), true);
     const std::string_view strText = fuzz::viewOf(pData, cbData);
-    const int nStatus = importPartially(std::string(strText));
+    const int nStatus = importPartially(strText);
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == nStatus || tool::EXIT_STATUS_USAGE == nStatus);
     if (tool::EXIT_STATUS_USAGE == nStatus) {
-        FUZZ_REQUIRE(tool::EXIT_STATUS_USAGE == importText(std::string(strText)));
+        FUZZ_REQUIRE(tool::EXIT_STATUS_USAGE == importText(strText));
         FUZZ_REQUIRE(!store.isChanged());
         return 0;
     }

@@ -4,12 +4,121 @@
 #define TESTS_DRAWS_H
 
 #include <cstdint>
+#include <functional>
+#include <map>
 #include <optional>
 #include <random>
 #include <string>
 #include <vector>
 
+#include "ModelFilter.h"
 #include "ModelRow.h"
+#include "TokenStore.h"
+#include "World.h"
+
+namespace {
+
+const size_t TID_MIN = 127;
+const Json::UInt USER_SIZE = 16;
+
+std::string withNul(const std::string& strHead, const std::string& strTail)
+{
+    return strHead + '\0' + strTail;
+}
+
+Json::Value parsed(const char* szText)
+{
+    Json::Value jValue;
+    Json::Reader().parse(szText, jValue);
+    return jValue;
+}
+
+// Ids that are long enough or not. Two are equal up to a NUL, and one is what two others become in a list.
+const std::string g_rgTid[] = {
+    idOf("a"),
+    idOf("b"),
+    idOf("c"),
+    idOf("d"),
+    idOf("e"),
+    idOf("it's"),
+    idOf("\xff\xfe\xc3"),
+    idOf("'; DROP TABLE token; --"),
+    idOf("a") + "'" + idOf("b"),
+    std::string(6000, 'l'),
+    withNul(idOf("a"), "tail"),
+    withNul("short", idOf("")),
+    withNul("", idOf("")),
+    "short",
+    std::string(TID_MIN - 1, 'x'),
+    "",
+};
+
+const std::string g_rgSession[] = {
+    "", "s1", "s2", "s1's2", withNul("", "hidden"), withNul("s1", "tail"), "\xc3(", "' or '1'='1", "1"};
+
+const std::string g_rgPurpose[] = {
+    "VPN", "VPN", "Mail", "VPN'Mail", "it's", "\xf0\x9f\x94\x91", withNul("", "x"), ""};
+
+const std::string g_rgWebapi[] = {"Example.Api",
+                                  "Example.Api",
+                                  "Example.Api",
+                                  "Example.Api",
+                                  "Example.Api",
+                                  "Example.File",
+                                  "a\"b\\c\n",
+                                  "\xff",
+                                  withNul("Example.Api", "x"),
+                                  ""};
+
+const std::string g_rgMethod[] = {"get", "get", "get", "get", "get", "list", "Get", "5", "it's", ""};
+
+const char* const g_rgExtra[] = {"{}", R"({"note":"it's"})", R"({"a":{"b":[1,-2,3.5,true,null,"x"]},"":0})",
+                                 R"({"n":18446744073709551615,"m":-9223372036854775808,"d":0.1})",
+                                 "{\"t\":\"\\u0000\\u0001\\n\\t\\\"\\\\/\xff\xc3\xa9\"}"};
+
+// Texts for number fields, which become part of a statement without quotes.
+const char* const g_rgNumberText[] = {"7",    "-1", "count", "uid",       TEXT_OR_TRUE,
+                                      "null", "'",  "",      "no_column", "1 1"};
+
+const unsigned int g_rgUid[] = {UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77, 4294967294, 4294967295};
+
+const Json::UInt g_rgSize[] = {0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE};
+
+// A clock that was never set or is years wrong; the end of 32 bits; the end of SQLite's dates.
+const time_t DAY = 86400;
+const time_t g_rgWrongTime[] = {-DAY - 1,
+                                -1,
+                                0,
+                                1700000000 - 1000 * DAY,
+                                1700000000 + 1000 * DAY,
+                                INT32_MAX,
+                                INT32_MAX + time_t(1),
+                                UINT32_MAX,
+                                UINT32_MAX + time_t(1),
+                                YEAR_10000 - DAY - 2,
+                                YEAR_10000 - 1,
+                                YEAR_10000};
+
+const char* const g_rgName[] = {"tid",   "tid",   "bind_sid", "function", "function", "uid",
+                                "count", "extra", "limit",    "sort_by",  "no_field", ""};
+
+const Json::Value g_jAnything =
+    parsed(R"([null, "5", "", true, 5, 5.0, 2.5, 18446744073709551615, [], {}, ["get"]])");
+
+const Json::Value g_jCount = parsed("[-1, -1, 0, 1, 2, 2, 3, 9223372036854775807, -9223372036854775808]");
+
+// As options of creations.
+const Json::Value g_jLifetime =
+    parsed(R"([-1, 0, 1, 60, 3600, 3600, 3600, 2.5, true, null, "60", 2147483647, 2147483648])");
+
+// For lists in number fields.
+const Json::Value g_jListed = parsed(R"([0, 1, 2, -1, -2, 5, 2.5, true, false, "1", null])");
+
+// As limits and offsets; the last two have more than 32 bits.
+const Json::Value g_jPosition =
+    parsed(R"([0, 1, 2, 3, 4, 5, 6, 6, 7, 7, 8, 8, 9, 100, -1, 7.5, true, "5", 4294967296, 4294967303])");
+
+} // namespace
 
 class Draws {
 public:
@@ -20,7 +129,20 @@ public:
     bool oneIn(size_t nTimes) { return 0 == below(nTimes); }
 
     // Moves it on a little now and then; rarely sets it to a wrong time for about ten operations.
-    void moveClock();
+    void moveClock()
+    {
+        if (oneIn(m_usualTime ? 10 : 1000)) {
+            const time_t wrong = oneOf(g_rgWrongTime);
+            const time_t now = worldClock();
+            worldClock() = m_usualTime.value_or(wrong);
+            m_usualTime = m_usualTime ? std::nullopt : std::optional<time_t>(now);
+            return;
+        }
+        worldClock() += oneIn(3000)  ? 100000
+                        : oneIn(100) ? 500
+                        : oneIn(4)   ? static_cast<time_t>(below(4))
+                                     : 0;
+    }
 
     // The argument of that name:
     //   tid, fresh     an id that a row has, mostly; an id that no row has, mostly
@@ -33,19 +155,11 @@ public:
     //   user, size     a buffer for the user's name
     //   made, answer   a value that the operation must not read
     //   uid, function, sid, sid_or_null, record, filter, flag, rare_flag
-    Json::Value argument(const std::string& strName);
+    Json::Value argument(const std::string& strName) const { return m_draws.at(strName)(); }
 
 private:
-    Json::Value tid();
-    Json::Value granted();
-    Json::Value webapi();
-    Json::Value option();
-    Json::Value param();
-    Json::Value record();
-    Json::Value filter();
-    Json::Value texts();
     template <typename Values>
-    auto oneOf(const Values& values)
+    auto oneOf(const Values& values) -> std::decay_t<decltype(values[0])>
     {
         return values[below(std::size(values))];
     }
@@ -53,15 +167,244 @@ private:
     {
         return jValues[static_cast<Json::ArrayIndex>(below(jValues.size()))];
     }
-    Json::Value anything();
     const Row& row() { return m_rows[below(m_rows.size())]; }
-    Json::Value allow();
-    Json::Value extra();
-    Json::Value deadline();
-    Json::Value field(const Field& field);     // a value to store, sometimes of a wrong type
-    Json::Value condition(const Field& field); // a value to filter by
-    Json::Value scalar(const Field& field);
-    void addPaging(Json::Value& jFilter);
+
+    Json::Value anything() { return oneOf(g_jAnything); }
+    Json::Value extra() { return parsed(oneOf(g_rgExtra)); }
+
+    Json::Value tid() { return m_rows.empty() || oneIn(4) ? Json::Value(oneOf(g_rgTid)) : row().columns[0]; }
+
+    Json::Value granted()
+    {
+        m_jAllow = Json::Value();
+        if (m_rows.empty() || oneIn(3)) {
+            return tid();
+        }
+        const Row& granted = row();
+        m_jAllow = granted.jRecord["webapi_allow"];
+        return granted.columns[0];
+    }
+
+    // Mostly one that the token allows: others would rarely match.
+    Json::Value webapi()
+    {
+        return m_jAllow.isObject() && !m_jAllow.empty() ? oneOf(m_jAllow.getMemberNames())
+               : oneIn(30)                              ? Json::Value()
+                                                        : Json::Value(oneOf(g_rgWebapi));
+    }
+
+    Json::Value allow()
+    {
+        Json::Value jAllow(Json::objectValue);
+        for (size_t i = oneIn(8) ? 0 : 1 + below(3); 0 < i; --i) {
+            Json::Value& jEntry = jAllow[oneOf(g_rgWebapi)];
+            if (oneIn(8)) {
+                jEntry = anything();
+                continue;
+            }
+            Json::Value jMethods(Json::arrayValue);
+            for (size_t j = 1 + below(3); 0 < j; --j) {
+                jMethods.append(oneIn(8) ? anything() : Json::Value(oneOf(g_rgMethod)));
+            }
+            jEntry = Json::Value(Json::objectValue);
+            jEntry["method"] = jMethods;
+        }
+        return jAllow;
+    }
+
+    Json::Value deadline()
+    {
+        const Json::Int64 nNow = worldClock();
+        const Json::Int64 rgDeadline[] = {
+            -1,          nNow - 1,       nNow,           nNow + 1,       nNow + 3,
+            nNow + 5000, nNow + 1000000, nNow + 1000000, nNow + 1000000, INT64_MAX};
+        return oneOf(rgDeadline);
+    }
+
+    Json::Value option()
+    {
+        if (oneIn(20)) {
+            return anything();
+        }
+        Json::Value jOption(Json::objectValue);
+        for (const Field& other : FIELDS) {
+            if (!oneIn(3)) {
+                jOption[other.szName] = field(other);
+            }
+        }
+        jOption.removeMember("deadline");
+        if (oneIn(3)) {
+            jOption["deadline"] = oneOf(g_jLifetime);
+        }
+        if (oneIn(8)) {
+            jOption["no_field"] = anything();
+        }
+        return jOption;
+    }
+
+    // A value to store, sometimes of a wrong type.
+    Json::Value field(const Field& other)
+    {
+        if (oneIn(50)) {
+            return anything();
+        }
+        switch (fieldNumber(other.szName)) {
+        case 0: return oneOf(g_rgTid);
+        case 1: return oneOf(g_rgSession);
+        case 2: return oneIn(4) ? Json::Value(Json::Int64(1) << 32) : Json::Value(oneOf(g_rgUid));
+        case 3: return deadline();
+        case 4: return oneOf(g_jCount);
+        case 5: return static_cast<Json::Int64>(worldClock());
+        case 6: return oneOf(g_rgPurpose);
+        case 7: return allow();
+        default: return extra();
+        }
+    }
+
+    Json::Value param()
+    {
+        if (oneIn(30)) {
+            return anything();
+        }
+        Json::Value jParam(Json::objectValue);
+        for (size_t i = below(4); 0 < i; --i) {
+            const Field& changed = FIELDS[oneIn(4) ? below(FIELDS.size()) : 1 + below(FIELDS.size() - 1)];
+            jParam[changed.szName] = field(changed);
+        }
+        return jParam;
+    }
+
+    Json::Value record()
+    {
+        if (oneIn(20)) {
+            return anything();
+        }
+        Json::Value jRecord(Json::objectValue);
+        const bool blFresh = m_rows.empty() || oneIn(3);
+        if (!blFresh) {
+            jRecord = row().jRecord;
+        }
+        for (const Field& changed : FIELDS) {
+            if (blFresh || oneIn(10)) {
+                jRecord[changed.szName] = field(changed);
+            }
+        }
+        if (oneIn(15)) {
+            jRecord.removeMember(FIELDS[below(FIELDS.size())].szName);
+        }
+        return jRecord;
+    }
+
+    // A value to compare a field with: mostly the value of some row.
+    Json::Value scalar(const Field& compared)
+    {
+        Json::Value jValue = field(compared);
+        if (!m_rows.empty() && !oneIn(3)) {
+            jValue = row().jRecord[compared.szName];
+        }
+        if (Kind::Number == compared.kind && oneIn(8)) {
+            jValue = oneOf(g_rgNumberText);
+        }
+        return jValue;
+    }
+
+    // A value to filter by.
+    Json::Value condition(const Field& compared)
+    {
+        const bool blList = oneIn(3) || (Kind::Json == compared.kind && !oneIn(10));
+        if (!blList) {
+            return scalar(compared);
+        }
+        Json::Value jList(Json::arrayValue);
+        if (!oneIn(3)) {
+            jList.append(scalar(compared));
+            return jList;
+        }
+        const char* const rgText[] = {"VPN", "Mail", "s1", "s2"};
+        for (size_t i = below(4); 0 < i; --i) {
+            jList.append(Kind::Number == compared.kind       ? oneOf(g_jListed)
+                         : Kind::Json == compared.kind       ? extra()
+                         : 0 == fieldNumber(compared.szName) ? Json::Value(g_rgTid[below(3)])
+                                                             : Json::Value(oneOf(rgText)));
+        }
+        return jList;
+    }
+
+    Json::Value filter()
+    {
+        if (oneIn(25)) {
+            return anything();
+        }
+        Json::Value jFilter(Json::objectValue);
+        for (size_t i = oneIn(3) ? below(4) : 1; 0 < i; --i) {
+            const Field& compared = FIELDS[below(FIELDS.size())];
+            jFilter[compared.szName] = condition(compared);
+        }
+        if (oneIn(6)) {
+            const std::string rgUnknown[] = {"no_field", "Tid", "", withNul("tid", "x")};
+            jFilter[oneOf(rgUnknown)] = anything();
+        }
+        if (oneIn(4)) {
+            addPaging(jFilter);
+        }
+        return jFilter;
+    }
+
+    void addPaging(Json::Value& jFilter)
+    {
+        if (oneIn(2)) {
+            jFilter["sort_by"] = oneIn(8) ? anything() : Json::Value(oneOf(g_rgName));
+        }
+        if (oneIn(2)) {
+            const char* const rgDirection[] = {"desc", "desc", "DESC", "asc", ""};
+            jFilter["sort_direction"] = oneIn(8) ? anything() : Json::Value(oneOf(rgDirection));
+        }
+        if (oneIn(2)) {
+            jFilter["limit"] = oneOf(g_jPosition);
+        }
+        if (oneIn(3)) {
+            jFilter["offset"] = oneOf(g_jPosition);
+        }
+    }
+
+    Json::Value texts()
+    {
+        Json::Value jTexts(Json::arrayValue);
+        for (size_t i = oneIn(3) ? below(4) : 1; 0 < i; --i) {
+            jTexts.append(oneIn(3)
+                              ? oneIn(2) ? Json::Value(oneOf(g_rgSession)) : Json::Value(oneOf(g_rgPurpose))
+                          : oneIn(2) ? Json::Value(g_rgTid[below(3)])
+                                     : tid());
+        }
+        return jTexts;
+    }
+
+    // The draw of each argument.
+    const std::map<std::string, std::function<Json::Value()>> m_draws = {
+        {"tid", [this] { return tid(); }},
+        {"fresh", [this] { return oneOf(g_rgTid); }},
+        {"granted", [this] { return granted(); }},
+        {"webapi", [this] { return webapi(); }},
+        {"method", [this] { return oneIn(10) ? Json::Value() : oneOf(g_rgMethod); }},
+        {"uid", [this] { return oneOf(g_rgUid); }},
+        {"function", [this] { return oneOf(g_rgPurpose); }},
+        {"sid", [this] { return oneOf(g_rgSession); }},
+        {"sid_or_null", [this] { return oneIn(20) ? Json::Value() : oneOf(g_rgSession); }},
+        {"name", [this] { return oneIn(20) ? Json::Value() : oneOf(g_rgName); }},
+        {"option", [this] { return option(); }},
+        {"param", [this] { return param(); }},
+        {"record", [this] { return record(); }},
+        {"filter", [this] { return filter(); }},
+        {"text", [this] { return oneIn(5) ? Json::Value("1") : texts().get(0U, "-1"); }},
+        {"texts", [this] { return texts(); }},
+        {"list", [this] { return oneIn(12) ? anything() : Json::arrayValue; }},
+        {"user", [this] { return oneIn(8) ? Json::Value() : std::string(USER_SIZE, '?'); }},
+        {"size", [this] { return oneOf(g_rgSize); }},
+        {"flag", [this] { return oneIn(2); }},
+        {"rare_flag", [this] { return oneIn(8); }},
+        {"made", [] { return "untouched"; }},
+        {"answer", [] { return "untouched"; }},
+    };
 
     std::mt19937_64 m_source;
     const std::vector<Row>& m_rows;

@@ -1,100 +1,64 @@
 #include "ModelCalls.h"
 
-#include <tuple>
 #include <utility>
 
 namespace {
 
-// A member of jCall as an argument of the parameter's type. Strings are written back after the call.
-template <typename Parameter>
-struct Argument;
-
-template <>
-struct Argument<Json::Value&> {
-    explicit Argument(Json::Value& jMember) : value(jMember) {}
-    Json::Value& value;
-};
-
-template <>
-struct Argument<std::string&> {
-    explicit Argument(Json::Value& jMember) : value(jMember.asString()), j(jMember) {}
-    ~Argument() { j = value; }
-    Argument(const Argument&) = delete;
-    Argument& operator=(const Argument&) = delete;
-    std::string value;
-    Json::Value& j;
-};
-
-// A buffer for a text, or null.
-template <>
-struct Argument<char*> {
-    explicit Argument(Json::Value& jMember)
-        : text(jMember), value(jMember.isNull() ? nullptr : text.value.data())
+// A member of jCall as an argument of a parameter of any of these types. A text is written back behind the
+// call.
+class Argument {
+public:
+    explicit Argument(Json::Value& jMember) : m_jMember(jMember) {}
+    ~Argument()
     {
-    }
-    Argument<std::string&> text;
-    char* value;
-};
-
-template <>
-struct Argument<const char*> {
-    explicit Argument(Json::Value& jMember) : value(jMember.isNull() ? nullptr : jMember.asCString()) {}
-    const char* value;
-};
-
-template <>
-struct Argument<std::vector<std::string>&> {
-    explicit Argument(Json::Value& jMember)
-    {
-        for (const Json::Value& jText : jMember) {
-            value.push_back(jText.asString());
+        if (m_blText) {
+            m_jMember = m_strText;
         }
     }
-    std::vector<std::string> value;
-};
+    Argument(const Argument&) = delete;
+    Argument& operator=(const Argument&) = delete;
 
-template <>
-struct Argument<unsigned int&> {
-    explicit Argument(Json::Value& jMember) : value(jMember.asUInt()) {}
-    unsigned int value;
-};
+    operator Json::Value&() { return m_jMember; }
+    operator std::string&()
+    {
+        m_strText = m_jMember.asString();
+        m_blText = true;
+        return m_strText;
+    }
+    operator char*() { return m_jMember.isNull() ? nullptr : static_cast<std::string&>(*this).data(); }
+    operator const char*() { return m_jMember.isNull() ? nullptr : m_jMember.asCString(); }
+    operator std::vector<std::string>&()
+    {
+        for (const Json::Value& jText : m_jMember) {
+            m_strTexts.push_back(jText.asString());
+        }
+        return m_strTexts;
+    }
+    operator unsigned int&() { return m_nNumber = m_jMember.asUInt(); }
+    operator size_t() { return m_jMember.asUInt(); }
+    operator bool() { return m_jMember.asBool(); }
 
-template <>
-struct Argument<size_t> : Argument<unsigned int&> {
-    using Argument<unsigned int&>::Argument;
-};
-
-template <>
-struct Argument<bool> {
-    explicit Argument(Json::Value& jMember) : value(jMember.asBool()) {}
-    bool value;
-};
-
-template <typename... Parameters>
-struct Types {
+private:
+    Json::Value& m_jMember;
+    bool m_blText = false;
+    std::string m_strText;
+    std::vector<std::string> m_strTexts;
+    unsigned int m_nNumber = 0;
 };
 
 template <typename Part, typename... Parameters>
-Types<Parameters...> parametersOf(int (Part::*)(Parameters...));
+std::index_sequence_for<Parameters...> indexes(int (Part::*)(Parameters...));
 template <typename Part, typename... Parameters>
-Types<Parameters...> parametersOf(int (*Part::*)(Parameters...));
+std::index_sequence_for<Parameters...> indexes(int (*Part::*)(Parameters...));
 
-template <typename Part, typename Member, typename... Parameters, size_t... I>
-int invoke(Part& part, Member member, Json::Value& jCall, const Names& szArguments, Types<Parameters...>,
+template <typename Part, typename Member, size_t... I>
+int invoke(Part& part, Member member, [[maybe_unused]] Json::Value& jCall, const Names& szArguments,
            std::index_sequence<I...>)
 {
-    if (sizeof...(Parameters) != szArguments.size()) {
+    if (sizeof...(I) != szArguments.size()) {
         throw std::logic_error("another number of arguments");
     }
-    [[maybe_unused]] std::tuple<Argument<Parameters>...> arguments(jCall[szArguments[I]]...);
-    return (part.*member)(std::get<I>(arguments).value...);
-}
-
-template <typename Part, typename Member, typename... Parameters>
-int invoke(Part& part, Member member, Json::Value& jCall, const Names& szArguments,
-           Types<Parameters...> types)
-{
-    return invoke(part, member, jCall, szArguments, types, std::index_sequence_for<Parameters...>());
+    return (part.*member)(Argument(jCall[szArguments[I]])...);
 }
 
 // A call of that member of that part of a Library or a Model.
@@ -102,7 +66,7 @@ template <typename System, typename Part, typename Member>
 Call<System> on(Part System::*part, Member member)
 {
     return [=](System& system, Json::Value& jCall, const Names& szArguments) {
-        return invoke(system.*part, member, jCall, szArguments, decltype(parametersOf(member))());
+        return invoke(system.*part, member, jCall, szArguments, decltype(indexes(member))());
     };
 }
 
