@@ -4,7 +4,7 @@
 
 #include <algorithm>
 #include <deque>
-#include <numeric>
+#include <set>
 #include <sstream>
 
 #include "Draws.h"
@@ -45,17 +45,6 @@ static std::ostream& operator<<(std::ostream& stream, const Outcome& outcome)
 
 namespace {
 
-struct Tally {
-    int64_t nSucceeded = 0;
-    int64_t nRefused = 0;
-    int64_t nThrown = 0;
-
-    void count(const Outcome& outcome)
-    {
-        ++(!outcome.strThrown.empty() ? nThrown : 0 > outcome.nResult ? nRefused : nSucceeded);
-    }
-};
-
 // Another connection than the library's.
 sqlite3* openDatabase(const std::string& strPath)
 {
@@ -66,85 +55,63 @@ sqlite3* openDatabase(const std::string& strPath)
 
 class ModelCheck : public ::testing::Test {
 protected:
-    // Draws an operation and runs it on both. Fails fatally if they do not agree.
-    void runOne()
+    // Draws operations and runs each on both, until they do not agree.
+    void runAll(const std::string& strName, int64_t nOperations)
     {
-        m_draws.moveClock();
-        const size_t nOperation = drawOperation();
-        const Operation& operation = operations()[nOperation];
+        std::vector<const Operation*> choices; // each as often as it weighs
+        for (const Operation& operation : operations()) {
+            choices.insert(choices.end(), operation.nWeight, &operation);
+        }
+        for (int64_t i = 0; i < nOperations && !HasFatalFailure(); ++i) {
+            m_draws.moveClock();
+            runOne(*choices[m_draws.below(choices.size())]);
+        }
+        if (HasFatalFailure()) {
+            return;
+        }
+        for (const Operation& operation : operations()) {
+            EXPECT_TRUE(m_succeeded.count(operation.szName)) << operation.szName << " never succeeded";
+        }
+        std::ostringstream text;
+        text << nOperations << " operations, " << nOperations - m_nRefused - m_nThrown
+             << " of them succeeded, " << m_nRefused << " were refused, " << m_nThrown << " threw; "
+             << m_nRows / nOperations << " tokens on average";
+        figure(strName, text.str());
+    }
+
+    void runOne(const Operation& operation)
+    {
         Json::Value jCall(Json::objectValue);
         for (const char* szArgument : operation.szArguments) {
             jCall[szArgument] = m_draws.argument(szArgument);
         }
-        remember(operation, jCall);
-
+        m_history.emplace_back("at " + std::to_string(worldClock()) + " " + operation.szName, jCall);
+        if (REPORTED < m_history.size()) {
+            m_history.pop_front();
+        }
         const Outcome library = operation.run(m_library, jCall);
         m_model.service.setGenerated(library.jCall.get("made", "").asString());
         const Outcome model = operation.run(m_model, jCall);
         ASSERT_EQ(model, library) << "expected is the model's\n" << history();
         ASSERT_EQ("", m_table.differenceFrom(m_model.store.rows())) << history();
-        m_tallies[nOperation].count(library);
         m_nRows += static_cast<int64_t>(m_model.store.rows().size());
-    }
-
-    void runAll(const std::string& strName, int64_t nOperations)
-    {
-        for (int64_t i = 0; i < nOperations && !HasFatalFailure(); ++i) {
-            runOne();
-        }
-        if (HasFatalFailure()) {
-            return;
-        }
-        for (size_t i = 0; i < m_tallies.size(); ++i) {
-            EXPECT_LT(0, m_tallies[i].nSucceeded) << operations()[i].szName << " never succeeded";
-        }
-        print(strName, nOperations);
-    }
-
-    size_t drawOperation()
-    {
-        size_t nDraw = m_draws.below(m_nWeights);
-        size_t i = 0;
-        while (operations()[i].nWeight <= nDraw) {
-            nDraw -= operations()[i++].nWeight;
-        }
-        return i;
-    }
-
-    void remember(const Operation& operation, const Json::Value& jCall)
-    {
-        ++m_nNumber;
-        m_history.push_back({operation.szName, worldClock(), jCall});
-        if (REPORTED < m_history.size()) {
-            m_history.pop_front();
+        if (!library.strThrown.empty()) {
+            ++m_nThrown;
+        } else if (0 > library.nResult) {
+            ++m_nRefused;
+        } else {
+            m_succeeded.insert(operation.szName);
         }
     }
 
     // The last operations, and how to repeat them.
     std::string history() const
     {
-        std::string strText = "seed " + std::to_string(seed()) + ", operation " + std::to_string(m_nNumber) +
-                              ", the last of these:\n";
-        for (const Call& call : m_history) {
-            strText.append("  at ").append(std::to_string(call.time)).append(" ").append(call.szName);
-            strText.append(" ").append(shown(call.jArguments)).append("\n");
+        std::string strText = "seed " + std::to_string(seed()) + ", the last operations:\n";
+        for (const auto& [strOperation, jCall] : m_history) {
+            strText.append("  ").append(strOperation).append(" ").append(shown(jCall)).append("\n");
         }
         return strText;
-    }
-
-    void print(const std::string& strName, int64_t nOperations) const
-    {
-        Tally all;
-        for (const Tally& tally : m_tallies) {
-            all.nSucceeded += tally.nSucceeded;
-            all.nRefused += tally.nRefused;
-            all.nThrown += tally.nThrown;
-        }
-        std::ostringstream text;
-        text << nOperations << " operations, " << all.nSucceeded << " of them succeeded, " << all.nRefused
-             << " were refused, " << all.nThrown << " threw; " << m_nRows / nOperations
-             << " tokens on average";
-        figure(strName, text.str());
     }
 
     const TokenStore m_files;
@@ -154,21 +121,11 @@ protected:
     const Table m_table{m_pDb.get()};
     Model m_model;
     Draws m_draws{seed(), m_model.store.rows()};
-    std::vector<Tally> m_tallies = std::vector<Tally>(operations().size());
-
-private:
-    struct Call {
-        const char* szName;
-        time_t time;
-        Json::Value jArguments;
-    };
-
-    const size_t m_nWeights =
-        std::accumulate(operations().begin(), operations().end(), size_t(0),
-                        [](size_t nSum, const Operation& operation) { return nSum + operation.nWeight; });
-    int64_t m_nNumber = 0;
+    std::deque<std::pair<std::string, Json::Value>> m_history;
+    std::set<std::string> m_succeeded;
+    int64_t m_nRefused = 0;
+    int64_t m_nThrown = 0;
     int64_t m_nRows = 0;
-    std::deque<Call> m_history;
 };
 
 } // namespace
