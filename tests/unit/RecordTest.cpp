@@ -192,12 +192,9 @@ TEST_F(TypeCheck, StopsAtTheFirstMemberOfAWrongType)
         Json::Value jToken = token();
         jToken[field.szName] = json(field.szOther);
         check(jToken, nullptr);
-        jToken[field.szName] = json(field.szWrong);
-        checkFails(jToken, field.szName);
-        checkFails(jToken, field.szName, EACCES);
+        checkFails(withWrong(field), field.szName, EACCES);
     }
     checkFails(json(R"({"uid":"0","tid":1,"count":1,"bind_sid":""})"), "tid"); // in the order of the names
-    checkFails(json(R"({"uid":"0","bind_sid":5})"), "bind_sid");
     checkFails(json(R"({"count":"%s%n%m%%"})"), "count");
     Json::Value jLong = json(R"({"count":"5"})");
     jLong["tid"] = std::string(200000, 'x');

@@ -131,28 +131,19 @@ TEST_F(Save, RendersEachField)
         EXPECT_EQ(strSql, m_db.m_strSql);
     };
     renders("tid", R"("it's")", "'it''s'");
-    renders("tid", R"("''")", "''''''");
     renders("tid", R"("%Q %s %n %%")", "'%Q %s %n %%'");
     renders("tid", R"("a\\\"\n;--")", "'a\\\"\n;--'");
     renders("tid", R"("x'); DROP TABLE token; --")", "'x''); DROP TABLE token; --'");
     renders("bind_sid", R"("")", "''");
-    renders("bind_sid", R"("NULL")", "'NULL'");
     renders("bind_sid", R"("cut\u0000here")", "'cut'");
     renders("uid", "4294967295", "4294967295");
     renders("uid", "null", "0");
     renders("deadline", "-9223372036854775808", "-9223372036854775808");
     renders("deadline", "9223372036854775807", "9223372036854775807");
-    renders("deadline", "true", "1");
-    renders("count", "0", "0");
     renders("count", "2.9", "2");
-    renders("create_time", "null", "0");
-    renders("function", R"("'")", "''''");
-    renders("webapi_allow", "{}", "'{}'");
     renders("webapi_allow", "null", "'null'");
     renders("webapi_allow", R"({"it's":["'"]})", R"('{"it''s":["''"]}')");
-    renders("extra", "[]", "'[]'");
     renders("extra", R"("text")", R"('"text"')");
-    renders("extra", "-1", "'-1'");
     renders("extra", R"({"b":1, "a" : {"c":true}})", R"('{"a":{"c":true},"b":1}')");
     renders("extra", R"("\u0000\u001f\n\u007fü")", "'\"\\u0000\\u001f\\n\x7fü\"'");
 }
@@ -203,43 +194,15 @@ TEST_F(Save, FailsWithoutMemoryForTheStatement)
     EXPECT_EQ(Texts{}, seam().statements());
 }
 
-TEST_F(Save, CreatesOnceAndReplacesWholeRows)
-{
-    const Json::Value jOther =
-        json(R"({"tid":"t","bind_sid":"","uid":0,"deadline":1,"count":2,"create_time":3,
-                                        "function":"","webapi_allow":{},"extra":{}})");
-    EXPECT_EQ(0, save(token()));
-    EXPECT_FAILURE(save(jOther, true), failureLines(m_db.m_strSql, "UNIQUE constraint failed: token.tid"));
-    EXPECT_EQ("UNIQUE constraint failed: token.tid", m_db.m_strErr);
-    EXPECT_EQ((Texts{row(token())}), rows());
-    EXPECT_EQ(0, save(jOther));
-    EXPECT_EQ((Texts{row(jOther)}), rows());
-}
-
-// Callers see a failure although the row is there; that stays.
-TEST_F(Save, FailsAfterALockThatWasWaitedOut)
-{
-    const Lock lock(path(), 2);
-    EXPECT_EQ(-1, save(token(), true));
-    const std::string strSql = saveSql("INSERT", token());
-    EXPECT_LINES(fail(STORE, "sql error, sql=" + strSql));
-    EXPECT_EQ(Texts(3, strSql), seam().statements());
-    EXPECT_EQ("database is locked", m_db.m_strErr);
-    EXPECT_EQ(strSql, m_db.m_strSql);
-    EXPECT_EQ(token(), stored());
-}
-
 TEST_F(Save, FailsWithItsStatement)
 {
     const std::string strSql = saveSql("REPLACE", token());
-    {
-        const Lock lock(path(), 1000);
-        EXPECT_EQ(-1, save(token()));
-    }
-    EXPECT_LINES(ordinary(STORE, "i=500,run sql failed, error=database is locked, sql=" + strSql),
-                 fail(STORE, "run sql failed, sql=" + strSql), failed(STORE, "0 > runSql()"));
-    EXPECT_EQ(Texts{}, rows());
+    failStatements("REPLACE", LOCKED); // callers see a failure, although the row is there
+    EXPECT_FAILURE(save(token()), fail(STORE, "sql error, sql=" + strSql, EIO));
+    EXPECT_EQ("database is locked", m_db.m_strErr);
+    EXPECT_EQ(token(), stored());
     query("DROP TABLE token");
+    errno = 0;
     EXPECT_FAILURE(save(token()), failureLines(strSql, "no such table: token"));
 
     EXPECT_EQ(0, m_db.freeDb());
@@ -247,57 +210,9 @@ TEST_F(Save, FailsWithItsStatement)
     EXPECT_FAILURE(save(token()), NOT_OPENED + Texts{failed(STORE, "0 > runSql()", EPERM)});
 }
 
-TEST_F(Save, TracesInDebugMode)
-{
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    for (const bool blCreate : {true, false}) {
-        const std::string strSql = saveSql(blCreate ? "INSERT" : "REPLACE", token());
-        EXPECT_EQ(0, save(token(), blCreate));
-        EXPECT_LINES(ordinary(STORE, std::string("tokenSave, blCreate=") + (blCreate ? "1" : "0") +
-                                         ", jParam=" + text(token())),
-                     ordinary(STORE, "run sql=" + strSql), ordinary(STORE, "run sql=" + strSql),
-                     ordinary(STORE, "change rv=1, run sql=" + strSql));
-    }
-    Json::Value jNull;
-    EXPECT_FAILURE(m_db.tokenCreate(jNull), ordinary(STORE, "tokenSave, blCreate=1, jParam=null"),
-                   failed(fieldList(2), "!jParam.isMember(\"tid\")"));
-}
-
 // What was saved comes back
 
-TEST_F(Save, KeepsJsonValues)
-{
-    for (const char* szValue :
-         {"{}", R"({"":""})", R"({"a":{},"b":[],"c":null,"d":[[],{},[{}]],"e":[null,true,false]})",
-          R"({"it's":"it''s","\"":"\\\"/"})", R"({"größe":"日本語 😀","\u0001":"\u2028\ud83d\ude00"})",
-          R"({"min":-9223372036854775808,"max":9223372036854775807,"unsigned":18446744073709551615})",
-          R"({"limits":[-2147483649,-2147483648,2147483647,2147483648,4294967295,9223372036854775808]})",
-          R"({"text":["null","1","{}","// no comment","/* none */","%Q%lld"]})"}) {
-        SCOPED_TRACE(szValue);
-        expectSame(json(szValue));
-    }
-}
-
-// Byte for byte, as text and as name: valid UTF-8 or not, and control characters. JSON keeps NUL too.
-TEST_F(Save, KeepsBytes)
-{
-    Json::Value jValue;
-    for (const std::string& strBytes :
-         {bytesFrom(0), std::string("a\0b", 3), std::string("a\0c", 3), std::string("\0", 1),
-          std::string("a"), std::string("\xff\xfe"), std::string("\xc3"), std::string("\xc0\x80"),
-          std::string("\xed\xa0\x80"), std::string("\xf4\x90\x80\x80"), std::string("\xe2\x82"),
-          std::string("\x7f\x80\xbf")}) {
-        jValue[strBytes] = strBytes;
-    }
-    for (int nByte = 0; nByte < 256; ++nByte) {
-        const std::string strByte(1, static_cast<char>(nByte));
-        jValue["bytes"].append(strByte);
-        jValue[strByte] = nByte;
-    }
-    expectSame(jValue, bytesFrom(1));
-}
-
-TEST_F(Save, KeepsSizeAndDepth)
+TEST_F(Save, KeepsJsonOfAnySizeAndDepth)
 {
     Json::Value jDeep(Json::objectValue);
     for (int nLevel = 1; nLevel < 1000; ++nLevel) { // as deep as the reader goes
@@ -309,28 +224,60 @@ TEST_F(Save, KeepsSizeAndDepth)
     Json::Value jLarge;
     jLarge["a"] = std::string(1 << 20, '\'');
     expectSame(jLarge);
+    expectSame(json(R"({"":"","a":{},"b":[[],{},[{}]],"c":[null,true,false],"it's":"it''s","\"":"\\\"/",
+                        "größe":"日本語 😀","\u0001":"\u2028\ud83d\ude00","text":["null","1","// no comment","%Q%lld"],
+                        "n":[-9223372036854775808,-2147483649,2147483648,4294967295,18446744073709551615]})"));
+}
+
+// Byte for byte, as text and as name: valid UTF-8 or not, and control characters. JSON keeps NUL too.
+TEST_F(Save, KeepsBytes)
+{
+    Json::Value jValue;
+    for (const std::string& strBytes :
+         {bytesFrom(0), std::string("a\0b", 3), std::string("a\0c", 3), std::string("\0", 1),
+          std::string("\xc3"), std::string("\xed\xa0\x80"), std::string("\xf4\x90\x80\x80"),
+          std::string("\xe2\x82")}) {
+        jValue[strBytes] = strBytes;
+    }
+    for (int nByte = 0; nByte < 256; ++nByte) {
+        const std::string strByte(1, static_cast<char>(nByte));
+        jValue["bytes"].append(strByte);
+        jValue[strByte] = nByte;
+    }
+    expectSame(jValue, bytesFrom(1));
 }
 
 TEST_F(Save, KeepsDoublesToTheBit)
 {
     typedef std::numeric_limits<double> Limits;
-    Json::Value jToken = token();
-    std::vector<double> values = {0.0,  -0.0, 0.1,  0.1 + 0.2, 1.0 / 3, 1.0,     -1.0,   100.0, 1e15,   1e16,
-                                  1e17, 1e22, 1e23, 0x1p53,    0x1p63,  -0x1p63, 0x1p64, 1e300, -1e-300};
-    values.insert(values.end(), {Limits::max(), Limits::lowest(), Limits::min(), Limits::denorm_min(),
-                                 -Limits::denorm_min(), Limits::min() / 3, Limits::infinity(),
-                                 -Limits::infinity(), Limits::quiet_NaN()});
-    for (const double value : values) {
+    for (const double value : {-0.0,
+                               0.1,
+                               0.1 + 0.2,
+                               1.0 / 3,
+                               1.0,
+                               1e16,
+                               1e17,
+                               1e22,
+                               1e23,
+                               0x1p53,
+                               0x1p63,
+                               -0x1p63,
+                               0x1p64,
+                               -1e-300,
+                               Limits::max(),
+                               Limits::min(),
+                               Limits::denorm_min(),
+                               -Limits::infinity(),
+                               Limits::infinity(),
+                               Limits::quiet_NaN()}) {
         SCOPED_TRACE(value);
+        Json::Value jToken = token();
         jToken["extra"]["d"] = value;
-        jToken["webapi_allow"]["d"][0] = value;
         EXPECT_EQ(0, m_db.tokenUpdate(jToken));
-        const Json::Value jStored = stored();
-        for (const Json::Value& jDouble : {jStored["extra"]["d"], jStored["webapi_allow"]["d"][0]}) {
-            ASSERT_EQ(Json::realValue, jDouble.type());
-            EXPECT_TRUE(value == jDouble.asDouble() || (std::isnan(value) && std::isnan(jDouble.asDouble())));
-            EXPECT_TRUE(std::isnan(value) || std::signbit(value) == std::signbit(jDouble.asDouble()));
-        }
+        const Json::Value jStored = stored()["extra"]["d"];
+        ASSERT_EQ(Json::realValue, jStored.type());
+        const double read = jStored.asDouble();
+        EXPECT_TRUE(std::isnan(value) ? std::isnan(read) : 0 == memcmp(&value, &read, sizeof(read)));
     }
 }
 

@@ -64,24 +64,6 @@ TEST_F(TokenId, TakesCharactersInTheOrderOfTheAlphabet)
     generates(0, 246, "YZ" + strAlphabet + strAlphabet + "0");
 }
 
-TEST_F(TokenId, FailsWithTheRandomSourceUnlessThatWasInterrupted)
-{
-    std::string strTid = "before";
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    for (const int nCall : {1, 2}) { // the length, and the characters
-        reset();
-        seam().fail("getrandom", ENOSYS, nCall, INT_MAX);
-        EXPECT_GT(0, tokenGenerate(strTid));
-        EXPECT_EQ(ENOSYS, errno);
-        EXPECT_EQ("before", strTid);
-        EXPECT_EQ(Texts(static_cast<size_t>(nCall), "getrandom"), seam().calls);
-    }
-    reset();
-    seam().fail("getrandom", EINTR, 1, 3);
-    EXPECT_LE(0, tokenGenerate(strTid));
-    EXPECT_LE(127u, strTid.size());
-}
-
 class TimeAfterNow : public SeamTest {};
 
 TEST_F(TimeAfterNow, IsANumberOrADateInUtc)
