@@ -3,67 +3,88 @@
 #include <dirent.h>
 #include <dlfcn.h>
 #include <fcntl.h>
+#include <linux/filter.h>
+#include <linux/seccomp.h>
+#include <poll.h>
 #include <pwd.h>
 #include <signal.h>
 #include <sqlite3.h>
+#include <sys/ioctl.h>
 #include <sys/mman.h>
-#include <sys/socket.h>
+#include <sys/prctl.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstdarg>
-#include <cstdio>
+#include <cstddef>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
+#include <thread>
 
 #include "Heap.h"
-#include "SystemCalls.h"
+#include "Interpose.h"
+#include "Processes.h"
 
-// The tool's main function, which is compiled under this name.
-int toolMain(int nArguments, char** rgArguments);
+// The tool's main function under another name: the tests have one already.
+#define main toolMain
+#include "../../tools/main.cpp"
+#undef main
 
 namespace {
 
-// A file without a name, for what the tool writes.
-class Capture {
-public:
-    Capture() : m_nFile(memfd_create("capture", MFD_CLOEXEC)) {}
-    ~Capture() { close(m_nFile); }
-    Capture(const Capture&) = delete;
-    Capture& operator=(const Capture&) = delete;
+// Not among them: close, whose descriptor is gone whatever it answers, and the calls for locks.
+const std::vector<int> CALLS_ON_FILES = {
+#ifdef __NR_open // older ones, which not every machine has
+    __NR_open,     __NR_stat,     __NR_lstat,      __NR_access,    __NR_mkdir,
+    __NR_unlink,   __NR_rename,   __NR_chmod,      __NR_chown,     __NR_link,
+#endif
+    __NR_openat,   __NR_read,     __NR_pread64,    __NR_write,     __NR_writev,
+    __NR_pwrite64, __NR_fsync,    __NR_fdatasync,  __NR_ftruncate, __NR_lseek,
+    __NR_fstat,    __NR_statx,    __NR_newfstatat, __NR_faccessat, __NR_mkdirat,
+    __NR_linkat,   __NR_unlinkat, __NR_renameat2,  __NR_renameat,  __NR_fchmod,
+    __NR_fchmodat, __NR_fchown,   __NR_fchownat,   __NR_getrandom, __NR_getdents64};
 
-    void become(int nStream) const { dup2(m_nFile, nStream); }
-    std::string text() const
-    {
-        std::string strText(static_cast<size_t>(lseek(m_nFile, 0, SEEK_END)), '\0');
-        const ssize_t cbRead = pread(m_nFile, strText.data(), strText.size(), 0);
-        strText.resize(0 < cbRead ? static_cast<size_t>(cbRead) : 0);
-        return strText;
+const std::vector<int> CALLS_THAT_TAKE_ROOM = {
+#ifdef __NR_open
+    __NR_mkdir,     __NR_rename,  __NR_link,
+#endif
+    __NR_write,     __NR_writev,  __NR_pwrite64, __NR_ftruncate, __NR_fsync,
+    __NR_fdatasync, __NR_mkdirat, __NR_linkat,   __NR_renameat,  __NR_renameat2};
+
+bool isOneOf(const std::vector<int>& nCalls, int nCall)
+{
+    return std::find(nCalls.begin(), nCalls.end(), nCall) != nCalls.end();
+}
+
+bool takesRoom(const struct seccomp_data& call)
+{
+#ifdef __NR_open
+    if (__NR_open == call.nr) {
+        return 0 != (call.args[1] & O_CREAT);
     }
+#endif
+    return __NR_openat == call.nr ? 0 != (call.args[2] & O_CREAT) : isOneOf(CALLS_THAT_TAKE_ROOM, call.nr);
+}
 
-private:
-    const int m_nFile;
-};
-
-// A number that parent and child share.
-class SharedNumber {
-public:
-    SharedNumber()
-        : m_pn(static_cast<int64_t*>(
-              mmap(nullptr, sizeof(int64_t), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0)))
-    {
+// From now on, the calls on files of this thread, and of what it forks, wait to be answered. Returns the
+// descriptor that tells of them, or -1 where the kernel does not do that.
+int handOverCalls()
+{
+    std::vector<struct sock_filter> program = {
+        BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(struct seccomp_data, nr))};
+    for (const int nCall : CALLS_ON_FILES) {
+        program.push_back(BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<uint32_t>(nCall), 0, 1));
+        program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_USER_NOTIF));
     }
-    ~SharedNumber() { munmap(m_pn, sizeof(int64_t)); }
-    SharedNumber(const SharedNumber&) = delete;
-    SharedNumber& operator=(const SharedNumber&) = delete;
-    int64_t& operator*() const { return *m_pn; }
-
-private:
-    int64_t* const m_pn;
-};
+    program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW));
+    const struct sock_fprog filter = {static_cast<unsigned short>(program.size()), program.data()};
+    prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0); // without which only root may
+    return static_cast<int>(
+        syscall(__NR_seccomp, SECCOMP_SET_MODE_FILTER, SECCOMP_FILTER_FLAG_NEW_LISTENER, &filter));
+}
 
 bool g_blTool = false;             // whether this process is the tool
 const Fault* g_pWaiting = nullptr; // for the command to begin
@@ -75,27 +96,19 @@ void failMemory(const Fault& fault)
 }
 
 // The child: it is the tool from here on.
-[[noreturn]] void beTool(const std::vector<std::string>& strArguments, const Fault& fault, int nSocket,
-                         int64_t& nAllocations)
+[[noreturn]] void beTool(std::vector<std::string> strArguments, const Fault& fault, int64_t& nAllocations)
 {
-    std::string strName = "vemo-access-token";
-    std::vector<std::string> strTexts = strArguments;
-    std::vector<char*> rgArguments = {strName.data()};
-    for (std::string& strText : strTexts) {
-        rgArguments.push_back(strText.data());
+    strArguments.insert(strArguments.begin(), "vemo-access-token");
+    std::vector<char*> rgArguments;
+    for (std::string& strArgument : strArguments) {
+        rgArguments.push_back(strArgument.data());
     }
     rgArguments.push_back(nullptr);
-    if (fault.isOfMemory()) {
-        getpwuid(0); // glibc does not bear a lack of memory when it does that first
-    }
     if (0 != fault.nSignal) {
         signal(fault.nSignal, SIG_DFL); // which jobs in the background inherit as ignored
     }
     g_blTool = true;
     sqlite3_shutdown(); // for it to begin from nothing
-    if (!letOtherAnswer(nSocket)) {
-        _exit(EXIT_FAILURE);
-    }
     if (Fault::Kind::Parsing == fault.kind) {
         failMemory(fault);
     } else if (Fault::Kind::Memory == fault.kind) {
@@ -106,52 +119,81 @@ void failMemory(const Fault& fault)
     exit(nStatus);
 }
 
-// What becomes of a call, and how many there have been.
+// What becomes of the calls, and how many there have been.
 class Injection {
 public:
-    Injection(const Fault& fault, pid_t pid) : m_fault(fault), m_pid(pid) {}
-    int answer(const struct seccomp_data& call)
+    explicit Injection(const Fault& fault) : m_fault(fault) {}
+
+    // Answers until nobody calls any more.
+    void answerAll(int nCalls)
     {
-        const int nUndisturbed = isSync(call) ? PRETEND : CARRY_OUT;
-        if (isSync(call)) {
-            m_strSynced.push_back(fileOf(call.args[0]));
+        struct pollfd calls = {nCalls, POLLIN, 0};
+        while (0 <= poll(&calls, 1, -1) && !(calls.revents & POLLHUP)) {
+            struct seccomp_notif call = {};
+            if (0 != ioctl(nCalls, SECCOMP_IOCTL_NOTIF_RECV, &call)) {
+                continue; // it was killed meanwhile
+            }
+            const bool blSync = __NR_fsync == call.data.nr || __NR_fdatasync == call.data.nr;
+            if (blSync) {
+                m_strSynced.push_back(fileOf(call));
+            }
+            struct seccomp_notif_resp response = {};
+            response.id = call.id;
+            response.error = -errorOf(call);
+            // A sync succeeds without waiting for the disk.
+            response.flags = blSync || response.error ? 0 : SECCOMP_USER_NOTIF_FLAG_CONTINUE;
+            ioctl(nCalls, SECCOMP_IOCTL_NOTIF_SEND, &response);
         }
-        if (!isMet(call)) {
-            return nUndisturbed;
-        }
-        ++m_nCalls;
-        if (m_nCalls < m_fault.nFirst || m_fault.nLast < m_nCalls) {
-            return nUndisturbed;
+    }
+
+    int64_t calls() const { return m_nCalls; }
+    const std::vector<std::string>& synced() const { return m_strSynced; }
+
+private:
+    // The errno with which a call fails, or 0.
+    int errorOf(const struct seccomp_notif& call)
+    {
+        if (!isMet(call.data) || ++m_nCalls < m_fault.nFirst || m_fault.nLast < m_nCalls) {
+            return 0;
         }
         if (Fault::Kind::Signal == m_fault.kind) {
-            kill(m_pid, m_fault.nSignal);
-            return nUndisturbed;
+            kill(static_cast<pid_t>(call.pid), m_fault.nSignal);
+            return 0;
         }
         return Fault::Kind::Error == m_fault.kind ? EIO : ENOSPC;
     }
-    int64_t calls() const { return m_nCalls; }
-    std::vector<std::string> synced() const { return m_strSynced; }
 
-private:
     // Sentences must come through. Random numbers are drawn until they suit, so that a run can have fewer
     // calls than the one that was counted; a signal in front of the last one must come all the same.
     bool isMet(const struct seccomp_data& call) const
     {
-        return !m_fault.isOfMemory() && !isWriteToStandardError(call) &&
-               (Fault::Kind::Signal != m_fault.kind || !drawsRandomNumbers(call)) &&
-               (Fault::Kind::FullDisk != m_fault.kind || takesRoomOnDisk(call));
+        const bool blSentence =
+            (__NR_write == call.nr || __NR_writev == call.nr) && STDERR_FILENO == call.args[0];
+        return !m_fault.isOfMemory() && !blSentence &&
+               (Fault::Kind::Signal != m_fault.kind || __NR_getrandom != call.nr) &&
+               (Fault::Kind::FullDisk != m_fault.kind || takesRoom(call));
     }
-    std::string fileOf(uint64_t nDescriptor) const
+
+    static std::string fileOf(const struct seccomp_notif& call)
     {
-        return std::filesystem::read_symlink("/proc/" + std::to_string(m_pid) + "/fd/" +
-                                             std::to_string(nDescriptor));
+        return std::filesystem::read_symlink("/proc/" + std::to_string(call.pid) + "/fd/" +
+                                             std::to_string(call.data.args[0]));
     }
 
     const Fault m_fault;
-    const pid_t m_pid;
     int64_t m_nCalls = 0;
     std::vector<std::string> m_strSynced;
 };
+
+// Closes a file without a name, and returns what was written to it.
+std::string textOf(int nFile)
+{
+    std::string strText(static_cast<size_t>(lseek(nFile, 0, SEEK_END)), '\0');
+    const ssize_t cbRead = pread(nFile, strText.data(), strText.size(), 0);
+    strText.resize(0 < cbRead ? static_cast<size_t>(cbRead) : 0);
+    close(nFile);
+    return strText;
+}
 
 int syncIfTool(long nCall, int nFile)
 {
@@ -182,64 +224,71 @@ extern "C" int openat(int nDirectory, const char* szPath, int nFlags, ...)
     va_start(arguments, nFlags);
     const mode_t nMode = va_arg(arguments, mode_t);
     va_end(arguments);
-    static const auto next = reinterpret_cast<decltype(&::openat)>(dlsym(RTLD_NEXT, "openat"));
-    return next(nDirectory, szPath, nFlags, nMode);
+    return NEXT(openat)(nDirectory, szPath, nFlags, nMode);
 }
 
 // The processes of the machine are others in each run.
 extern "C" DIR* opendir(const char* szPath)
 {
-    static const auto next = reinterpret_cast<decltype(&::opendir)>(dlsym(RTLD_NEXT, "opendir"));
     if (g_blTool && 0 == strcmp(szPath, "/proc/")) {
         errno = ENOENT;
         return nullptr;
     }
-    return next(szPath);
+    return NEXT(opendir)(szPath);
 }
 
 // Each command begins by asking who runs it. Stands in front of the redirection's.
 extern "C" uid_t geteuid() noexcept
 {
-    static const auto next = reinterpret_cast<decltype(&::geteuid)>(dlsym(RTLD_NEXT, "geteuid"));
-    const uid_t uid = next();
+    const uid_t uid = NEXT(geteuid)();
     if (g_pWaiting) {
         failMemory(*g_pWaiting);
     }
     return uid;
 }
 
+bool canRunTool()
+{
+    int nCalls = -1;
+    std::thread([&] { nCalls = handOverCalls(); }).join();
+    return 0 == close(nCalls);
+}
+
 Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
 {
-    const Capture output;
-    const Capture error;
-    const SharedNumber nAllocations;
-    int rgSockets[2];
-    socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, rgSockets);
+    SharedArray<int64_t> rgAllocations(1);
+    const int nInput = open("/dev/null", O_RDONLY | O_CLOEXEC);
+    const int nOutput = memfd_create("output", MFD_CLOEXEC);
+    const int nError = memfd_create("error", MFD_CLOEXEC);
+    int nCalls = -1;
+    pid_t pid = -1;
+    if (fault.isOfMemory()) {
+        getpwuid(0); // glibc does not bear a lack of memory when it does that first
+    }
     fflush(nullptr);
-    const pid_t pid = fork();
-    if (0 == pid) {
-        dup2(open("/dev/null", O_RDONLY | O_CLOEXEC), STDIN_FILENO);
-        output.become(STDOUT_FILENO);
-        error.become(STDERR_FILENO);
-        close(rgSockets[0]);
-        beTool(strArguments, fault, rgSockets[1], *nAllocations);
-    }
-    close(rgSockets[1]);
-    Injection injection(fault, pid);
-    const bool blAnswered =
-        answerCalls(rgSockets[0], [&](const struct seccomp_data& call) { return injection.answer(call); });
-    close(rgSockets[0]);
-    int nStatus = 0;
-    waitpid(pid, &nStatus, 0);
-    if (!blAnswered) {
-        throw NoAnswers("the kernel does not let one process answer the system calls of another");
-    }
+    // What the kernel does for a thread it does for what that forks, and not for this thread.
+    std::thread([&] {
+        nCalls = handOverCalls();
+        pid = fork();
+        if (0 == pid) {
+            dup2(nInput, STDIN_FILENO);
+            dup2(nOutput, STDOUT_FILENO);
+            dup2(nError, STDERR_FILENO);
+            close(nCalls);
+            beTool(strArguments, fault, rgAllocations[0]);
+        }
+    }).join();
+    close(nInput);
+    Injection injection(fault);
+    injection.answerAll(nCalls);
+    close(nCalls);
+    const int nStatus = statusOf(pid);
     Ending ending;
     ending.nSignal = WIFSIGNALED(nStatus) ? WTERMSIG(nStatus) : 0;
     ending.nStatus = WIFEXITED(nStatus) ? WEXITSTATUS(nStatus) : 0;
-    ending.strOutput = output.text();
-    ending.strError = error.text();
+    ending.strOutput = textOf(nOutput);
+    ending.strError = textOf(nError);
     ending.strSynced = injection.synced();
-    ending.nCalls = fault.isOfMemory() ? *nAllocations : injection.calls();
+    ending.nCalls = fault.isOfMemory() ? rgAllocations[0] : injection.calls();
     return ending;
 }

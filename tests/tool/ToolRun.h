@@ -4,7 +4,6 @@
 #define TESTS_TOOL_TOOL_RUN_H
 
 #include <cstdint>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -34,12 +33,10 @@ struct Ending {
     std::vector<std::string> strSynced; // one after the other
 };
 
-// Thrown where the kernel does not let one process answer the system calls of another.
-class NoAnswers : public std::runtime_error {
-    using std::runtime_error::runtime_error;
-};
+// Whether the kernel lets one process answer the system calls of another. Otherwise the tool cannot be run.
+bool canRunTool();
 
-// Runs the tool. Nothing waits for the disk.
-Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault);
+// Nothing waits for the disk.
+Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault = {});
 
 #endif
