@@ -66,7 +66,7 @@ grep -lE 'manpages\.debian\.org/(vemo|Vemo|VEMO|AccessToken)' "$dir"/clone/build
 
 echo "Functions (< exported, or of the class that programs compile themselves; > in a SYNOPSIS):"
 {
-    cut -d ' ' -f 2 "$source/tests/package/exported-symbols.txt" | c++filt | sort -u | sed 's/(.*//'
+    sed -nE 's/^ (\(c\+\+\)")?([^(@]*).*@Base.*/\2/p' "$source/debian/libvemoaccesstoken6.symbols"
     sed -n '/^public:/,/^private:/p' "$source/include/AccessTokens.h" |
         sed -nE 's/^    [A-Za-z].* ([A-Za-z]+)\(.*/AccessTokens::\1/p'
 } | sort >"$dir/exported"
