@@ -2,17 +2,23 @@
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sqlite3.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cstring>
+#include <filesystem>
+#include <random>
+#include <set>
+#include <stdexcept>
+#include <unordered_map>
 
+#include "FaultyVfs.h"
 #include "Figures.h"
 #include "Oracle.h"
-#include "PowerJudge.h"
+#include "PowerDisk.h"
 
 #ifdef VEMO_TEST_GATE
-#include <sqlite3.h>
-
 #include "gate/Batch.h"
 #include "gate/Store.h"
 #endif
@@ -25,6 +31,127 @@ const Operation& FIRST_CREATION = operations()[0];
 const Operation& CREATION = operations()[1];
 const Operation& LISTING = operations()[9];
 const Operation& DELETION_OF_ALL = operations()[11];
+
+// What calls of the library request of the disk.
+struct Recording {
+    Files files; // found by the first call
+    std::vector<DiskCall> calls;
+};
+
+const TokenStore* g_pStore = nullptr; // while recording
+std::vector<DiskCall> g_calls;
+
+// In this program, a sync is recorded and does nothing else.
+int recordSync(int nFile)
+{
+    if (g_pStore) {
+        const std::filesystem::path path =
+            std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(nFile));
+        if (path == std::filesystem::canonical(g_pStore->directory())) {
+            g_calls.push_back({DiskCall::Kind::SyncDirectory});
+        } else {
+            g_calls.push_back({DiskCall::Kind::Sync, path.filename()});
+        }
+    }
+    return 0;
+}
+
+// The library creates the database file before SQLite's first call; SQLite creates its journal in xOpen.
+// known: the names of files that are there.
+int recordCall(std::set<std::string>& known, const FileCall& call, const std::function<int()>& real)
+{
+    const auto nBefore = static_cast<std::ptrdiff_t>(g_calls.size());
+    const int nResult = real();
+    const std::string strName = std::filesystem::path(call.strPath).filename();
+    if (SQLITE_OK != nResult || strName.empty()) {
+        return nResult;
+    }
+    if (0 == strcmp("xOpen", call.szName)) {
+        if (known.insert(strName).second) {
+            g_calls.push_back({DiskCall::Kind::Create, strName});
+        }
+    } else if (0 == strcmp("xWrite", call.szName)) {
+        g_calls.push_back({DiskCall::Kind::Write, strName, static_cast<size_t>(call.nOffset),
+                           std::string(static_cast<const char*>(call.pData), static_cast<size_t>(call.cb))});
+    } else if (0 == strcmp("xTruncate", call.szName)) {
+        g_calls.push_back({DiskCall::Kind::Truncate, strName, static_cast<size_t>(call.nArgument)});
+    } else if (0 == strcmp("xDelete", call.szName)) {
+        known.erase(strName);
+        // Before the sync of the directory, if the call made one.
+        g_calls.insert(g_calls.begin() + nBefore, {DiskCall::Kind::Unlink, strName});
+    }
+    return nResult;
+}
+
+bool isJournal(const std::string& strName)
+{
+    return std::string::npos != strName.find("-journal");
+}
+
+// A commit (the unlink of the journal) or the creation of the database.
+bool isStep(const DiskCall& call)
+{
+    return DiskCall::Kind::Unlink == call.kind ||
+           (DiskCall::Kind::Create == call.kind && !isJournal(call.strName));
+}
+
+struct PowerTally {
+    int64_t nImages = 0;
+    int64_t nWrong = 0;
+    std::string strFirstWrong;
+    // Images after a change that the library has reported, but before the directory is synced: all of them,
+    // and those in which the change is undone because its journal came back.
+    int64_t nExposed = 0;
+    int64_t nUndone = 0;
+    // Images in which the file was already truncated when the journal of that change came back: the recovery
+    // cannot restore what was cut off.
+    int64_t nDamaged = 0;
+
+    void addWrong(const std::string& strState)
+    {
+        strFirstWrong = 0 == nWrong++ ? "wrong: " + strState : strFirstWrong;
+    }
+};
+
+// What is known about one moment of a recording.
+struct Moment {
+    std::string strBefore; // the last step
+    std::string strNow;
+    bool blDurable = true;       // the directory was synced since the last step
+    bool blAcknowledged = false; // the library returned since the last step
+    bool blTruncated = false;    // the database was truncated since the last step
+
+    void pass(const DiskCall& call, const std::string& strState)
+    {
+        if (isStep(call)) {
+            *this = {strNow, strState, false};
+        } else if (DiskCall::Kind::Truncate == call.kind) {
+            blTruncated = true;
+        } else if (DiskCall::Kind::SyncDirectory == call.kind) {
+            blDurable = true;
+        } else if (DiskCall::Kind::Return == call.kind) {
+            blAcknowledged = true;
+        }
+    }
+
+    // Each image must hold the state after the last step. Until the directory is synced, the state before
+    // that step is allowed too.
+    void judge(const std::string& strState, bool blJournal, PowerTally& tally) const
+    {
+        const bool blUndone = strState != strNow;
+        const bool blMayBeUndone = !blDurable && (blJournal || STATE_MISSING == strState);
+        ++tally.nImages;
+        if (blAcknowledged && !blDurable && strNow != strBefore) {
+            ++tally.nExposed;
+            tally.nUndone += blUndone ? 1 : 0;
+        }
+        if (blUndone && strState != strBefore && blMayBeUndone && blTruncated) {
+            ++tally.nDamaged;
+        } else if (blUndone && (strState != strBefore || !blMayBeUndone)) {
+            tally.addWrong(strState);
+        }
+    }
+};
 
 PowerDisk diskAfter(const Recording& recording)
 {
@@ -45,7 +172,22 @@ protected:
 
     Recording recordOn(const Files& files, const Calls& calls)
     {
-        const Recording recording = record(m_store, files, calls);
+        m_store.setFiles(files);
+        std::set<std::string> known;
+        for (const auto& [strName, strContents] : files) {
+            known.insert(strName);
+        }
+        g_calls.clear();
+        const FaultyVfs vfs([&](const FileCall& call, const std::function<int()>& real) {
+            return recordCall(known, call, real);
+        });
+        g_pStore = &m_store;
+        for (const std::function<int()>& run : calls) {
+            EXPECT_LE(0, run());
+            g_calls.push_back({DiskCall::Kind::Return});
+        }
+        g_pStore = nullptr;
+        const Recording recording = {files, g_calls};
         // The simulated disk must agree with the real one.
         EXPECT_TRUE(m_store.files() == diskAfter(recording).files());
         return recording;
@@ -80,6 +222,29 @@ protected:
         };
     }
 
+    const std::string& stateOf(const Files& files)
+    {
+        std::string strAll;
+        for (const auto& [strName, strContents] : files) {
+            strAll.append(strName).append(1, '\0').append(strContents);
+        }
+        const std::string*& pstrState = m_stateOfImage[std::hash<std::string>()(strAll)];
+        if (!pstrState) {
+            m_store.setFiles(files);
+            pstrState = &*m_states.insert(m_store.state()).first;
+        }
+        return *pstrState;
+    }
+
+    // Some images keep nearly everything, others nearly nothing.
+    Files draw(const PowerDisk& disk)
+    {
+        const uint64_t nKeptOfFour = m_random() % 4;
+        return disk.afterPowerCut([&](size_t n) {
+            return m_random() % 4 < nKeptOfFour ? n - 1 : static_cast<size_t>(m_random() % n);
+        });
+    }
+
     // Disks after a power cut between the writing of a change and its sync: they have a journal to recover
     // from.
     std::vector<Files> drawInterrupted(const Recording& recording)
@@ -88,18 +253,93 @@ protected:
         PowerDisk disk(recording.files, Order::Kept);
         for (const DiskCall& call : recording.calls) {
             if (DiskCall::Kind::Sync == call.kind && !isJournal(call.strName)) {
-                interrupted.push_back(m_judge.draw(disk));
+                interrupted.push_back(draw(disk));
             }
             disk.take(call);
         }
         return interrupted;
     }
 
+    // The state at the start, and the state after each call of a kind.
+    std::vector<std::string> statesAfter(const Recording& recording, bool (*isOne)(const DiskCall& call))
+    {
+        PowerDisk disk(recording.files, Order::Kept);
+        std::vector<std::string> states = {stateOf(recording.files)};
+        for (const DiskCall& call : recording.calls) {
+            disk.take(call);
+            if (isOne(call)) {
+                states.push_back(stateOf(disk.files()));
+            }
+        }
+        return states;
+    }
+
+    // Cuts the power at the start and after each call. Each moment has the images of the two extremes,
+    // everything kept and only what was synced kept, and nDraws random images for each change that is not
+    // synced. Calls passed() after each call, and image() for each image.
+    void visit(const Recording& recording, Order order, int64_t nDraws,
+               const std::function<void(const DiskCall&, const PowerDisk&)>& passed,
+               const std::function<void(const Files&)>& image)
+    {
+        PowerDisk disk(recording.files, order);
+        const auto cutPower = [&] {
+            image(disk.files());
+            image(disk.afterPowerCut(&onlySynced));
+            for (int64_t nLeft = nDraws * static_cast<int64_t>(disk.pending()); 0 < nLeft; --nLeft) {
+                image(draw(disk));
+            }
+        };
+        cutPower();
+        for (const DiskCall& call : recording.calls) {
+            disk.take(call);
+            passed(call, disk);
+            cutPower();
+        }
+    }
+
+    void judge(const Recording& recording, Order order, int64_t nDraws, PowerTally& tally)
+    {
+        Moment moment;
+        moment.strNow = stateOf(recording.files);
+        visit(
+            recording, order, nDraws,
+            [&](const DiskCall& call, const PowerDisk& disk) {
+                moment.pass(call, isStep(call) ? stateOf(disk.files()) : "");
+            },
+            [&](const Files& files) {
+                const bool blJournal = std::any_of(files.begin(), files.end(),
+                                                   [](const auto& file) { return isJournal(file.first); });
+                moment.judge(stateOf(files), blJournal, tally);
+            });
+    }
+
+    // Each image must hold everything that the returned calls have done, and all or nothing of the next call.
+    // This holds for every kind of journal.
+    PowerTally judgeReturned(const Recording& recording, int64_t nDraws)
+    {
+        const auto isReturn = [](const DiskCall& call) { return DiskCall::Kind::Return == call.kind; };
+        const std::vector<std::string> states = statesAfter(recording, isReturn);
+        auto itReturned = states.begin();
+        PowerTally tally;
+        visit(
+            recording, Order::Kept, nDraws,
+            [&](const DiskCall& call, const PowerDisk&) { itReturned += isReturn(call); },
+            [&](const Files& files) {
+                const std::string& strState = stateOf(files);
+                ++tally.nImages;
+                if (strState != *itReturned &&
+                    (itReturned + 1 == states.end() || strState != itReturned[1])) {
+                    tally.addWrong(strState);
+                }
+            });
+        return tally;
+    }
+
     PowerTally judgeAll(const std::vector<Recording>& recordings, Order order, int64_t nDraws)
     {
         PowerTally sum;
         for (const Recording& recording : recordings) {
-            m_judge.judge(recording, order, nDraws, sum);
+            judge(recording, order, nDraws, sum);
         }
         EXPECT_EQ(0, sum.nWrong) << sum.strFirstWrong;
         return sum;
@@ -108,7 +348,7 @@ protected:
     void report(const std::string& strName, const PowerTally& tally)
     {
         figure("power cut, " + strName,
-               std::to_string(tally.nImages) + " images, " + std::to_string(m_judge.different()) +
+               std::to_string(tally.nImages) + " images, " + std::to_string(m_stateOfImage.size()) +
                    " different; third states " + std::to_string(tally.nWrong) + ", damaged tokens " +
                    std::to_string(tally.nDamaged) + "; changes undone although acknowledged " +
                    std::to_string(tally.nUndone) + " of " + std::to_string(tally.nExposed) + " (" +
@@ -116,10 +356,24 @@ protected:
     }
 
     TokenStore m_store;
-    PowerJudge m_judge{m_store};
+
+private:
+    std::mt19937_64 m_random{seed()};
+    std::set<std::string> m_states;
+    std::unordered_map<size_t, const std::string*> m_stateOfImage; // by the hash of the image
 };
 
 } // namespace
+
+extern "C" int fsync(int nFile)
+{
+    return recordSync(nFile);
+}
+
+extern "C" int fdatasync(int nFile)
+{
+    return recordSync(nFile);
+}
 
 TEST_F(PowerCut, LeavesTheStateBeforeOrAfterACommit)
 {
@@ -128,7 +382,7 @@ TEST_F(PowerCut, LeavesTheStateBeforeOrAfterACommit)
         SCOPED_TRACE(operation.szName);
         const Oracle oracle(m_store, operation);
         recordings.push_back(recordOperation(operation));
-        for (const std::string& strState : m_judge.steps(recordings.back())) {
+        for (const std::string& strState : statesAfter(recordings.back(), &isStep)) {
             EXPECT_TRUE(oracle.allows(strState)) << strState;
         }
     }
@@ -152,8 +406,8 @@ TEST_F(PowerCut, UndoesNoAcknowledgedChangeButTheLast)
 TEST_F(PowerCut, CanTakeBackTheTable)
 {
     const PowerDisk disk = diskAfter(recordOn({}, {LISTING.run}));
-    EXPECT_EQ("", m_judge.stateOf(disk.files()));
-    EXPECT_EQ(STATE_NO_TABLE, m_judge.stateOf(disk.afterPowerCut(&onlySynced)));
+    EXPECT_EQ("", stateOf(disk.files()));
+    EXPECT_EQ(STATE_NO_TABLE, stateOf(disk.afterPowerCut(&onlySynced)));
 }
 
 TEST_F(PowerCut, CanMeetTheRecoveryFromAnother)
@@ -222,7 +476,7 @@ TEST_F(PowerCut, UndoesNothingThatTheGateHasAnswered)
                                                                },
                                                                checkpoint, // the log begins anew then
                                                                [&] { return batch({"large"}); }, close});
-        const PowerTally tally = m_judge.judgeReturned(recording, scaled(4));
+        const PowerTally tally = judgeReturned(recording, scaled(4));
         EXPECT_EQ(0, tally.nWrong) << szMode << ": " << tally.strFirstWrong;
         figure("power cut, grants of the gate", std::string(szMode) + ": " + std::to_string(tally.nImages) +
                                                     " images; nothing answered undone");
@@ -259,7 +513,7 @@ TEST_F(PowerCut, WouldDamageAStoreThatIsNotSynced)
                                    [&](const DiskCall& call) { return call.kind == kind; }),
                     calls.end());
         PowerTally tally;
-        m_judge.judge(recording, Order::Kept, 1, tally);
+        judge(recording, Order::Kept, 1, tally);
         EXPECT_LT(0, tally.nWrong);
     }
 }

@@ -63,7 +63,7 @@ std::string contentsOf(const std::filesystem::path& path)
 
 } // namespace
 
-// Nothing has to survive a crash of the machine, so nothing is synced. Weak, because PowerRecorder defines
+// Nothing has to survive a crash of the machine, so nothing is synced. Weak, because PowerCutTest defines
 // its own.
 extern "C" __attribute__((weak)) int fsync(int)
 {
