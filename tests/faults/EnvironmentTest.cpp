@@ -1,15 +1,6 @@
 // What operations do in a bad environment: one row for each environment.
 
-#include <gtest/gtest.h>
-#include <signal.h>
-#include <sys/resource.h>
-#include <sys/stat.h>
-#include <sys/wait.h>
-#include <unistd.h>
-
 #include <cstdio>
-#include <cstring>
-#include <functional>
 
 #include "AccessTokenApi.h"
 #include "AccessTokenUtil.h"
@@ -17,7 +8,6 @@
 #include "Operations.h"
 #include "Oracle.h"
 #include "ProcessState.h"
-#include "Processes.h"
 #include "ShortWaits.h"
 
 namespace {

@@ -26,21 +26,17 @@ int answerOf(Fault fault, const FileCall& call)
     return SQLITE_OK;
 }
 
-// Of the calls in which the fault can happen, nFirst to nLast fail.
-struct Injection {
-    Fault fault = Fault::Error;
-    int64_t nFirst = 0;
-    int64_t nLast = -1;
-    int64_t nCalls = 0;
+class IoFault : public ::testing::TestWithParam<std::pair<std::string, Fault>> {};
 
-    int operator()(const FileCall& call, const std::function<int()>& real)
-    {
+} // namespace
+
+TEST_P(IoFault, LeavesAStateThatTheCallerKnows)
+{
+    const Fault fault = GetParam().second;
+    Injection injection;
+    const FaultyVfs vfs([&](const FileCall& call, const std::function<int()>& real) {
         const int nAnswer = answerOf(fault, call);
-        if (SQLITE_OK == nAnswer) {
-            return real();
-        }
-        ++nCalls;
-        if (nCalls < nFirst || nLast < nCalls) {
+        if (SQLITE_OK == nAnswer || !injection.fails()) {
             return real();
         }
         if (Fault::TornWrite == fault) {
@@ -50,24 +46,8 @@ struct Injection {
             real(); // whatever close answers, the descriptor is gone
         }
         return nAnswer;
-    }
-};
-
-class IoFault : public ::testing::TestWithParam<std::pair<std::string, Fault>> {};
-
-} // namespace
-
-TEST_P(IoFault, LeavesAStateThatTheCallerKnows)
-{
-    const auto& [strName, fault] = GetParam();
-    Injection injection;
-    const FaultyVfs vfs(
-        [&](const FileCall& call, const std::function<int()>& real) { return injection(call, real); });
-    Injector injector;
-    injector.arm = [&, kind = fault](int64_t nFirst, int64_t nLast) { injection = {kind, nFirst, nLast, 0}; };
-    injector.disarm = [&] { injection.nLast = 0; };
-    injector.calls = [&] { return injection.nCalls; };
-    failEachOfAll("I/O faults", strName, injector);
+    });
+    failEachOfAll("I/O faults", GetParam().first, injection);
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, IoFault,

@@ -27,29 +27,21 @@ void failEachAllocation(const Operation& operation, bool blOwnThread = false)
     const TokenStore store;
     getpwuid(NOBODY_KNOWN);     // loads the user databases, which stay in memory
     int64_t cbHeld = INT64_MAX; // after an undisturbed run
-    bool blDisturbed = false;
-    Injector injector;
-    injector.arm = [&](int64_t nFirst, int64_t nLast) {
-        blDisturbed = 0 != nFirst;
-        Heap::failFrom(nFirst, nLast);
-    };
-    injector.disarm = &Heap::failNone;
-    injector.calls = &Heap::allocations;
-    injector.run = [&](const std::function<void()>& judge) {
+    g_allocations.run = [&](const std::function<void()>& judge) {
         if (blOwnThread) {
             std::thread(judge).join();
         } else {
             judge();
         }
         EXPECT_FALSE(g_blCrossedSqlite);
-        const int64_t cbLive = Heap::liveBytes();
+        const int64_t cbLive = g_cbLive;
         cbHeld = INT64_MAX == cbHeld ? cbLive : cbHeld;
         EXPECT_GE(cbHeld, cbLive); // less, when something that was kept has been given up
-        if (!blDisturbed) {
+        if (0 == g_allocations.nFirst) {
             EXPECT_EQ(cbHeld, cbLive);
         }
     };
-    const int64_t nAllocations = failEach(store, operation, injector);
+    const int64_t nAllocations = failEach(store, operation, g_allocations);
     figure("memory faults",
            std::string(operation.szName) + ": " + std::to_string(nAllocations) + " allocations");
 }

@@ -108,19 +108,23 @@ std::string Oracle::judge(const std::function<void()>& arm, const std::function<
     return strWrong.empty() ? "" : strWrong + "log: " + std::string(Log::text()).substr(0, 2000);
 }
 
-int64_t failEach(const TokenStore& store, const Operation& operation, const Injector& injector)
+int64_t failEach(const TokenStore& store, const Operation& operation, Injection& injection)
 {
     SCOPED_TRACE(operation.szName);
     const Oracle oracle(store, operation);
     const auto judge = [&](int64_t nFirst, int64_t nLast) {
         std::string strWrong;
-        injector.run([&] {
-            strWrong = oracle.judge([&] { injector.arm(nFirst, nLast); }, injector.disarm, injector.uidAfter);
+        injection.nFirst = nFirst;
+        injection.nLast = nLast;
+        injection.nCalls = 0;
+        injection.run([&] {
+            strWrong = oracle.judge([&] { injection.blRunning = true; }, [&] { injection.blRunning = false; },
+                                    injection.uidAfter);
         });
         EXPECT_EQ("", strWrong) << "call " << nFirst << " to " << nLast;
     };
     judge(0, -1);
-    const int64_t nCalls = injector.calls();
+    const int64_t nCalls = injection.nCalls;
     for (int64_t nCall = 1; nCall <= nCalls; ++nCall) {
         judge(nCall, nCall);
         judge(nCall, INT64_MAX);
@@ -129,12 +133,12 @@ int64_t failEach(const TokenStore& store, const Operation& operation, const Inje
     return nCalls;
 }
 
-void failEachOfAll(const std::string& strKind, const std::string& strName, const Injector& injector)
+void failEachOfAll(const std::string& strKind, const std::string& strName, Injection& injection)
 {
     const TokenStore store;
     int64_t nRuns = 0;
     for (const Operation& operation : operations()) {
-        nRuns += 2 * failEach(store, operation, injector) + 2;
+        nRuns += 2 * failEach(store, operation, injection) + 2;
     }
     figure(strKind, strName + ": " + std::to_string(nRuns) + " runs of 12 operations");
 }

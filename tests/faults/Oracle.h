@@ -51,21 +51,24 @@ private:
     int m_nResult;
 };
 
-// Makes the calls nFirst to nLast of a run fail.
-struct Injector {
-    std::function<void(int64_t nFirst, int64_t nLast)> arm;
-    std::function<void()> disarm;
-    std::function<int64_t()> calls; // of the last run
+// Which calls of a run fail. A test asks whether the next one does.
+struct Injection {
+    int64_t nFirst = 0; // of those that fail
+    int64_t nLast = -1;
+    bool blRunning = false;
+    int64_t nCalls = 0; // of the last run
     std::function<uid_t()> uidAfter = [] { return UID_CALLER; };
     // Calls judge(), which makes one run. A test can do more around it.
     std::function<void(const std::function<void()>& judge)> run = [](const auto& judge) { judge(); };
+
+    bool fails() { return blRunning && nFirst <= ++nCalls && nCalls <= nLast; }
 };
 
 // Judges an operation without a fault; then, for each call that it made, with that call failing, and with
 // that call and all later ones failing; and without a fault again. Returns the number of calls.
-int64_t failEach(const TokenStore& store, const Operation& operation, const Injector& injector);
+int64_t failEach(const TokenStore& store, const Operation& operation, Injection& injection);
 
 // The same for all operations; prints the number of runs.
-void failEachOfAll(const std::string& strKind, const std::string& strName, const Injector& injector);
+void failEachOfAll(const std::string& strKind, const std::string& strName, Injection& injection);
 
 #endif

@@ -15,27 +15,18 @@
 
 namespace {
 
-struct Injection {
-    const char* szFunction = "";
-    int64_t nFirst = 0;
-    int64_t nLast = -1;
-    int64_t nCalls = 0;
-    bool blUidUnknown = false; // at the last time of asking
-    bool blUidRaised = false;  // to 0
-    bool blUidLost = false;    // raised while unknown, or the last try to put it back failed
-
-    bool fails(const char* szName)
-    {
-        if (0 != strcmp(szName, szFunction)) {
-            return false;
-        }
-        ++nCalls;
-        errno = EACCES;
-        return nFirst <= nCalls && nCalls <= nLast;
-    }
-};
-
 Injection g_injection;
+const char* g_szFunction = "";
+bool g_blUidUnknown = false; // at the last time of asking
+bool g_blUidRaised = false;  // to 0
+bool g_blUidLost = false;    // raised while unknown, or the last try to put it back failed
+
+bool fails(const char* szName)
+{
+    const bool blFails = 0 == strcmp(szName, g_szFunction) && g_injection.fails();
+    errno = blFails ? EACCES : errno;
+    return blFails;
+}
 
 class SystemCallFault : public ::testing::TestWithParam<const char*> {};
 
@@ -45,28 +36,28 @@ extern "C" {
 
 uid_t geteuid() noexcept
 {
-    g_injection.blUidUnknown = g_injection.fails("geteuid");
-    return g_injection.blUidUnknown ? static_cast<uid_t>(-1) : NEXT(geteuid)();
+    g_blUidUnknown = fails("geteuid");
+    return g_blUidUnknown ? static_cast<uid_t>(-1) : NEXT(geteuid)();
 }
 
 int seteuid(uid_t uid) noexcept
 {
-    const bool blFails = g_injection.fails("seteuid");
+    const bool blFails = fails("seteuid");
     if (0 == uid) {
-        g_injection.blUidRaised = !blFails;
+        g_blUidRaised = !blFails;
     }
-    g_injection.blUidLost = g_injection.blUidRaised && (0 == uid ? g_injection.blUidUnknown : blFails);
+    g_blUidLost = g_blUidRaised && (0 == uid ? g_blUidUnknown : blFails);
     return blFails ? -1 : NEXT(seteuid)(uid);
 }
 
 int access(const char* szPath, int nMode) noexcept
 {
-    return g_injection.fails("access") ? -1 : NEXT(access)(szPath, nMode);
+    return fails("access") ? -1 : NEXT(access)(szPath, nMode);
 }
 
 int chmod(const char* szPath, mode_t mode) noexcept
 {
-    return g_injection.fails("chmod") ? -1 : NEXT(chmod)(szPath, mode);
+    return fails("chmod") ? -1 : NEXT(chmod)(szPath, mode);
 }
 
 #define OPEN(name)                                                                                           \
@@ -76,7 +67,7 @@ int chmod(const char* szPath, mode_t mode) noexcept
         va_start(args, nFlags);                                                                              \
         const mode_t mode = (nFlags & O_CREAT) ? va_arg(args, mode_t) : 0;                                   \
         va_end(args);                                                                                        \
-        return g_injection.fails("open") ? -1 : NEXT(name)(szPath, nFlags, mode);                            \
+        return fails("open") ? -1 : NEXT(name)(szPath, nFlags, mode);                                        \
     }
 OPEN(open)
 OPEN(open64)
@@ -85,16 +76,9 @@ OPEN(open64)
 
 TEST_P(SystemCallFault, LeavesAStateThatTheCallerKnows)
 {
-    bool blUidLost = false;
-    Injector injector;
-    injector.arm = [&](int64_t nFirst, int64_t nLast) { g_injection = {GetParam(), nFirst, nLast}; };
-    injector.disarm = [&] {
-        g_injection.szFunction = "";
-        blUidLost = g_injection.blUidLost;
-    };
-    injector.calls = [] { return g_injection.nCalls; };
-    injector.uidAfter = [&] { return blUidLost ? 0 : UID_CALLER; };
-    failEachOfAll("system calls", GetParam(), injector);
+    g_szFunction = GetParam();
+    g_injection.uidAfter = [] { return g_blUidLost ? 0 : UID_CALLER; };
+    failEachOfAll("system calls", g_szFunction, g_injection);
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, SystemCallFault,

@@ -92,7 +92,9 @@ const Fault* g_pWaiting = nullptr; // for the command to begin
 void failMemory(const Fault& fault)
 {
     g_pWaiting = nullptr;
-    Heap::failFrom(fault.nFirst, fault.nLast);
+    g_allocations.nFirst = fault.nFirst;
+    g_allocations.nLast = fault.nLast;
+    g_allocations.blRunning = true;
 }
 
 // The child: it is the tool from here on.
@@ -115,14 +117,14 @@ void failMemory(const Fault& fault)
         g_pWaiting = &fault;
     }
     const int nStatus = toolMain(static_cast<int>(rgArguments.size() - 1), rgArguments.data());
-    nAllocations = Heap::allocations();
+    nAllocations = g_allocations.nCalls;
     exit(nStatus);
 }
 
 // What becomes of the calls, and how many there have been.
-class Injection {
+class SystemCalls {
 public:
-    explicit Injection(const Fault& fault) : m_fault(fault) {}
+    explicit SystemCalls(const Fault& fault) : m_fault(fault) {}
 
     // Answers until nobody calls any more.
     void answerAll(int nCalls)
@@ -146,7 +148,7 @@ public:
         }
     }
 
-    int64_t calls() const { return m_nCalls; }
+    int64_t count() const { return m_nCalls; }
     const std::vector<std::string>& synced() const { return m_strSynced; }
 
 private:
@@ -279,8 +281,8 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
         }
     }).join();
     close(nInput);
-    Injection injection(fault);
-    injection.answerAll(nCalls);
+    SystemCalls calls(fault);
+    calls.answerAll(nCalls);
     close(nCalls);
     const int nStatus = statusOf(pid);
     Ending ending;
@@ -288,7 +290,7 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
     ending.nStatus = WIFEXITED(nStatus) ? WEXITSTATUS(nStatus) : 0;
     ending.strOutput = textOf(nOutput);
     ending.strError = textOf(nError);
-    ending.strSynced = injection.synced();
-    ending.nCalls = fault.isOfMemory() ? rgAllocations[0] : injection.calls();
+    ending.strSynced = calls.synced();
+    ending.nCalls = fault.isOfMemory() ? rgAllocations[0] : calls.count();
     return ending;
 }
