@@ -13,7 +13,6 @@
 #include <deque>
 #include <optional>
 #include <random>
-#include <stdexcept>
 #include <thread>
 #include <vector>
 
@@ -24,7 +23,6 @@
 #include "ProcessState.h"
 #include "Processes.h"
 #include "StormCalls.h"
-#include "internal/AccessTokenDbApi.h"
 
 namespace {
 
@@ -57,24 +55,6 @@ extern "C" int fstat(int nFile, struct stat* pStatus) noexcept
 }
 
 namespace {
-
-// Whether SQLite's locks on the database stop another process. The child asks the kernel, because SQLite in a
-// forked child relies on what it knew in the parent.
-bool isLockedBySqlite(const std::string& strDatabase)
-{
-    const off_t FIRST_LOCK_BYTE = 0x40000000;
-    const off_t LOCK_BYTES = 512;
-    return endsWell(startProcess([&] {
-        struct flock lock = {};
-        lock.l_type = F_WRLCK;
-        lock.l_start = FIRST_LOCK_BYTE;
-        lock.l_len = LOCK_BYTES;
-        const int nFile = open(strDatabase.c_str(), O_RDWR | O_CLOEXEC);
-        if (0 != fcntl(nFile, F_GETLK, &lock) || F_UNLCK == lock.l_type) {
-            throw std::runtime_error("not locked");
-        }
-    }));
-}
 
 class SerialisingLock : public ::testing::Test {
 protected:
@@ -253,22 +233,6 @@ TEST_F(SerialisingLock, MayHaveTheFirstDescriptor)
     errno = EBADF;
     EXPECT_EQ(0, lockOnce());
     EXPECT_EQ(STDIN_FILENO, open("/dev/null", O_RDONLY));
-}
-
-// Why the lock file must not be the database: closing any descriptor of a file drops all locks that SQLite
-// holds on it in this process.
-TEST_F(SerialisingLock, OnTheDatabaseTakesItsLocksAway)
-{
-    m_calls.prepare({});
-    AccessTokenDbApi db;
-    ASSERT_EQ(0, db.initDb());
-    ASSERT_EQ(0, db.runSqlEx("BEGIN IMMEDIATE", nullptr, nullptr));
-    EXPECT_TRUE(isLockedBySqlite(m_calls.store().path()));
-    ASSERT_EQ(0, chmod(m_calls.store().path().c_str(), 0600)); // the lock refuses what is open to others
-    {
-        const CallLock lock(m_calls.store().path().c_str());
-    }
-    EXPECT_FALSE(isLockedBySqlite(m_calls.store().path()));
 }
 
 // Others could hold a lock forever on a file that they can open.

@@ -12,6 +12,7 @@
 #include "FaultyVfs.h"
 #include "Figures.h"
 #include "ProcessState.h"
+#include "ShortWaits.h"
 #include "SmallStore.h"
 
 namespace {

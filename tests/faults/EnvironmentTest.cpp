@@ -184,7 +184,7 @@ std::string outcomeOf(const TokenStore& store, const Operation& operation, const
     const auto arm = [&] {
         leave = enter(store);
         strModeBefore = modeOf(store.path());
-        takeWaits();
+        g_nWaits = 0;
     };
     const auto disarm = [&] {
         strMode = modeOf(store.path());
@@ -196,8 +196,8 @@ std::string outcomeOf(const TokenStore& store, const Operation& operation, const
     if (0 > nResult) {
         strDetails += ": " + Log::firstLine();
     }
-    if (const int nWaits = takeWaits()) {
-        strDetails += ", " + std::to_string(nWaits / (operation.blPurges ? 2 : 1)) + " waits";
+    if (0 != g_nWaits) {
+        strDetails += ", " + std::to_string(g_nWaits / (operation.blPurges ? 2 : 1)) + " waits";
     }
     if (!strWrong.empty()) {
         strDetails += "; WRONG: " + strWrong;

@@ -7,14 +7,16 @@
 //   VEMO_TEST_CALLS   lines "CALL|ERRNO": all these calls fail; or "CALL|COMMAND": ahead of the first, the
 //                     command does what another program could. CALL is the name of a function below that
 //                     asks fails(), with that of its file behind it, if it has one.
+//   VEMO_TEST_HASTE   waiting for a locked database takes no time
 // And these name files that get what nobody sees otherwise:
+//   VEMO_TEST_WAITS   a line each time the library waits for a locked database; as a rule a fifo, so that who
+//                     holds the lock can let go just then
 //   VEMO_TEST_WIPED   texts that are wiped from memory
 //   VEMO_TEST_SYSLOG  for each log line its priority, and whether the lock is "held" or "free" then; of lines
 //                     that tell of changes also the text, which does not get into the log of the machine
 // What is opened to be handed on to other programs ends the tool.
 
 #include <dirent.h>
-#include <dlfcn.h>
 #include <fcntl.h>
 #include <pwd.h>
 #include <sqlite3.h>
@@ -33,16 +35,9 @@
 #include <string>
 
 #include "CallLock.h"
-
-#define SCRIPTED extern "C" __attribute__((visibility("default")))
+#include "Interpose.h"
 
 namespace {
-
-template <typename... Arguments>
-int next(const char* szFunction, Arguments... arguments)
-{
-    return reinterpret_cast<int (*)(Arguments...)>(dlsym(RTLD_NEXT, szFunction))(arguments...);
-}
 
 bool fails(const std::string& strCall)
 {
@@ -87,8 +82,8 @@ int sync(int nFile)
     return 0;
 }
 
-template <typename Key>
-int lookUp(const char* szFunction, Key key, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+template <typename Function, typename Key>
+int lookUp(Function* pNext, Key key, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
            struct passwd** ppEntry)
 {
     const char* szError = getenv("VEMO_TEST_LOOKUP");
@@ -96,7 +91,7 @@ int lookUp(const char* szFunction, Key key, struct passwd* pEntry, char* szBuffe
         *ppEntry = nullptr;
         return atoi(szError);
     }
-    return next(szFunction, key, pEntry, szBuffer, cbBuffer, ppEntry);
+    return pNext(key, pEntry, szBuffer, cbBuffer, ppEntry);
 }
 
 void writeLine(int nPriority, const char* szFormat, va_list args)
@@ -143,7 +138,7 @@ __attribute__((constructor)) void chooseVfs()
 } // namespace
 
 // The library writes its lines by the one, the tool by the other where it is hardened.
-SCRIPTED void syslog(int nPriority, const char* szFormat, ...)
+extern "C" INTERPOSED void syslog(int nPriority, const char* szFormat, ...)
 {
     va_list args;
     va_start(args, szFormat);
@@ -151,7 +146,7 @@ SCRIPTED void syslog(int nPriority, const char* szFormat, ...)
     va_end(args);
 }
 
-SCRIPTED void __syslog_chk(int nPriority, int, const char* szFormat, ...)
+extern "C" INTERPOSED void __syslog_chk(int nPriority, int, const char* szFormat, ...)
 {
     va_list args;
     va_start(args, szFormat);
@@ -159,38 +154,38 @@ SCRIPTED void __syslog_chk(int nPriority, int, const char* szFormat, ...)
     va_end(args);
 }
 
-SCRIPTED void explicit_bzero(void* pMemory, size_t cbMemory)
+extern "C" INTERPOSED void explicit_bzero(void* pMemory, size_t cbMemory)
 {
     wipe(pMemory, cbMemory);
 }
 
 // How a hardened build calls it.
-SCRIPTED void __explicit_bzero_chk(void* pMemory, size_t cbMemory, size_t)
+extern "C" INTERPOSED void __explicit_bzero_chk(void* pMemory, size_t cbMemory, size_t)
 {
     wipe(pMemory, cbMemory);
 }
 
-SCRIPTED int fsync(int nFile)
+extern "C" INTERPOSED int fsync(int nFile)
 {
     return sync(nFile);
 }
 
-SCRIPTED int fdatasync(int nFile)
+extern "C" INTERPOSED int fdatasync(int nFile)
 {
     return sync(nFile);
 }
 
-SCRIPTED int open(const char* szPath, int nFlags, ...)
+extern "C" INTERPOSED int open(const char* szPath, int nFlags, ...)
 {
     va_list args;
     va_start(args, nFlags);
     const mode_t mode = (nFlags & (O_CREAT | O_TMPFILE)) ? va_arg(args, mode_t) : 0;
     va_end(args);
     requireOwn(szPath, nFlags);
-    return fails("open " + std::string(szPath)) ? -1 : next("open", szPath, nFlags, mode);
+    return fails("open " + std::string(szPath)) ? -1 : NEXT(open)(szPath, nFlags, mode);
 }
 
-SCRIPTED int openat(int nDirectory, const char* szName, int nFlags, ...)
+extern "C" INTERPOSED int openat(int nDirectory, const char* szName, int nFlags, ...)
 {
     va_list args;
     va_start(args, nFlags);
@@ -198,28 +193,27 @@ SCRIPTED int openat(int nDirectory, const char* szName, int nFlags, ...)
     va_end(args);
     requireOwn(szName, nFlags);
     const std::string strName = O_TMPFILE == (nFlags & O_TMPFILE) ? "O_TMPFILE" : szName;
-    return fails("openat " + strName) ? -1 : next("openat", nDirectory, szName, nFlags, mode);
+    return fails("openat " + strName) ? -1 : NEXT(openat)(nDirectory, szName, nFlags, mode);
 }
 
-SCRIPTED int mkdirat(int nDirectory, const char* szName, mode_t mode)
+extern "C" INTERPOSED int mkdirat(int nDirectory, const char* szName, mode_t mode)
 {
-    return fails("mkdirat " + std::string(szName)) ? -1 : next("mkdirat", nDirectory, szName, mode);
+    return fails("mkdirat " + std::string(szName)) ? -1 : NEXT(mkdirat)(nDirectory, szName, mode);
 }
 
-SCRIPTED int fstat(int nFile, struct stat* pStatus)
+extern "C" INTERPOSED int fstat(int nFile, struct stat* pStatus)
 {
-    return fails("fstat") ? -1 : next("fstat", nFile, pStatus);
+    return fails("fstat") ? -1 : NEXT(fstat)(nFile, pStatus);
 }
 
-SCRIPTED int fstatat(int nDirectory, const char* szName, struct stat* pStatus, int nFlags)
+extern "C" INTERPOSED int fstatat(int nDirectory, const char* szName, struct stat* pStatus, int nFlags)
 {
-    return fails("fstatat " + std::string(szName)) ? -1
-                                                   : next("fstatat", nDirectory, szName, pStatus, nFlags);
+    return fails("fstatat " + std::string(szName)) ? -1 : NEXT(fstatat)(nDirectory, szName, pStatus, nFlags);
 }
 
-SCRIPTED int fstatvfs(int nFile, struct statvfs* pStatus)
+extern "C" INTERPOSED int fstatvfs(int nFile, struct statvfs* pStatus)
 {
-    const int nResult = fails("fstatvfs") ? -1 : next("fstatvfs", nFile, pStatus);
+    const int nResult = fails("fstatvfs") ? -1 : NEXT(fstatvfs)(nFile, pStatus);
     const char* szRoom = getenv("VEMO_TEST_ROOM");
     if (szRoom) {
         sscanf(szRoom, "%lu %lu %lu %lu", &pStatus->f_bfree, &pStatus->f_frsize, &pStatus->f_files,
@@ -228,53 +222,63 @@ SCRIPTED int fstatvfs(int nFile, struct statvfs* pStatus)
     return nResult;
 }
 
-SCRIPTED int fchown(int nFile, uid_t uid, gid_t gid)
+extern "C" INTERPOSED int fchown(int nFile, uid_t uid, gid_t gid)
 {
-    return fails("fchown") ? -1 : next("fchown", nFile, uid, gid);
+    return fails("fchown") ? -1 : NEXT(fchown)(nFile, uid, gid);
 }
 
-SCRIPTED int fchmod(int nFile, mode_t mode)
+extern "C" INTERPOSED int fchmod(int nFile, mode_t mode)
 {
-    return fails("fchmod") ? -1 : next("fchmod", nFile, mode);
+    return fails("fchmod") ? -1 : NEXT(fchmod)(nFile, mode);
 }
 
-SCRIPTED int renameat(int nDirectory, const char* szName, int nNewDirectory, const char* szNewName)
+extern "C" INTERPOSED int renameat(int nDirectory, const char* szName, int nNewDirectory,
+                                   const char* szNewName)
 {
     return fails("renameat " + std::string(szName))
                ? -1
-               : next("renameat", nDirectory, szName, nNewDirectory, szNewName);
+               : NEXT(renameat)(nDirectory, szName, nNewDirectory, szNewName);
 }
 
-SCRIPTED int flock(int nFile, int nOperation)
+extern "C" INTERPOSED int flock(int nFile, int nOperation)
 {
-    return fails("flock") ? -1 : next("flock", nFile, nOperation);
+    return fails("flock") ? -1 : NEXT(flock)(nFile, nOperation);
 }
 
-SCRIPTED FILE* fdopen(int nFile, const char* szMode)
+extern "C" INTERPOSED FILE* fdopen(int nFile, const char* szMode)
 {
-    static const auto pNext = reinterpret_cast<decltype(&::fdopen)>(dlsym(RTLD_NEXT, "fdopen"));
-    return fails("fdopen") ? nullptr : pNext(nFile, szMode);
+    return fails("fdopen") ? nullptr : NEXT(fdopen)(nFile, szMode);
 }
 
-SCRIPTED DIR* opendir(const char* szPath)
+extern "C" INTERPOSED DIR* opendir(const char* szPath)
 {
-    static const auto pNext = reinterpret_cast<decltype(&::opendir)>(dlsym(RTLD_NEXT, "opendir"));
     const char* szError = getenv("VEMO_TEST_PROC");
     if (szError && 0 == strcmp(szPath, "/proc/")) {
         errno = atoi(szError);
         return nullptr;
     }
-    return pNext(szPath);
+    return NEXT(opendir)(szPath);
 }
 
-SCRIPTED int getpwnam_r(const char* szName, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
-                        struct passwd** ppEntry)
+extern "C" INTERPOSED int getpwnam_r(const char* szName, struct passwd* pEntry, char* szBuffer,
+                                     size_t cbBuffer, struct passwd** ppEntry)
 {
-    return lookUp("getpwnam_r", szName, pEntry, szBuffer, cbBuffer, ppEntry);
+    return lookUp(NEXT(getpwnam_r), szName, pEntry, szBuffer, cbBuffer, ppEntry);
 }
 
-SCRIPTED int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
-                        struct passwd** ppEntry)
+extern "C" INTERPOSED int getpwuid_r(uid_t uid, struct passwd* pEntry, char* szBuffer, size_t cbBuffer,
+                                     struct passwd** ppEntry)
 {
-    return lookUp("getpwuid_r", uid, pEntry, szBuffer, cbBuffer, ppEntry);
+    return lookUp(NEXT(getpwuid_r), uid, pEntry, szBuffer, cbBuffer, ppEntry);
+}
+
+extern "C" INTERPOSED int usleep(useconds_t nMicroseconds)
+{
+    const char* szFile = getenv("VEMO_TEST_WAITS");
+    const int nFile = szFile ? NEXT(open)(szFile, O_WRONLY | O_NONBLOCK | O_CLOEXEC) : -1;
+    if (0 <= nFile) {
+        [[maybe_unused]] const ssize_t nWritten = write(nFile, "\n", 1);
+        close(nFile);
+    }
+    return getenv("VEMO_TEST_HASTE") ? 0 : NEXT(usleep)(nMicroseconds);
 }
