@@ -81,7 +81,7 @@ std::string Oracle::judge(const std::function<void()>& arm, const std::function<
     prepareStore(m_store, m_operation);
     Log::clear();
     static_cast<void>(seteuid(UID_CALLER));
-    ProcessState processBefore = ProcessState::now();
+    const std::string strProcess = processState();
 
     arm();
     const Ending ending = run();
@@ -94,8 +94,13 @@ std::string Oracle::judge(const std::function<void()>& arm, const std::function<
     if (0 <= ending.nResult && ending.nResult != m_nResult) {
         strWrong += "another result: " + std::to_string(ending.nResult) + "; ";
     }
-    processBefore.uidEffective = strstr(Log::text(), "open sqlite failed") ? 0 : uidAfter();
-    strWrong += processBefore.differenceTo(ProcessState::now());
+    if (geteuid() != (strstr(Log::text(), "open sqlite failed") ? 0 : uidAfter())) {
+        strWrong += "another effective uid; ";
+    }
+    const std::string strProcessAfter = processState();
+    if (strProcessAfter != strProcess) {
+        strWrong += "the process changed: " + strProcess + "to: " + strProcessAfter + "; ";
+    }
     if (0 != sqlite3_memory_used()) {
         strWrong += "SQLite still holds memory; ";
     }

@@ -1,13 +1,12 @@
 #include "ProcessState.h"
 
-#include <sys/stat.h>
 #include <syslog.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cstdarg>
 #include <cstdio>
 #include <filesystem>
+#include <fstream>
 #include <set>
 
 namespace {
@@ -15,63 +14,29 @@ namespace {
 char g_szLog[1 << 16];
 size_t g_cchLog = 0;
 
-mode_t currentUmask()
-{
-    const mode_t mode = ::umask(0);
-    ::umask(mode);
-    return mode;
-}
+} // namespace
 
-std::string blockedSignals()
+std::string processState()
 {
-    sigset_t blocked;
-    sigprocmask(SIG_SETMASK, nullptr, &blocked);
-    std::string strBlocked;
-    for (int nSignal = 1; nSignal < NSIG; ++nSignal) {
-        strBlocked.append(1 == sigismember(&blocked, nSignal) ? "1" : "0");
-    }
-    return strBlocked;
-}
-
-// The open descriptors, each with the file that it refers to.
-std::string openDescriptors()
-{
-    std::set<std::string> descriptors;
+    std::set<std::string> parts = {std::filesystem::current_path()};
     for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
         std::error_code ignored; // that of the iteration itself is gone already
         const std::string strTarget = std::filesystem::read_symlink(entry.path(), ignored);
         if (0 != strTarget.compare(0, 6, "/proc/")) {
-            descriptors.insert(entry.path().filename().string() + "=" + strTarget);
+            parts.insert(entry.path().filename().string() + "=" + strTarget);
         }
     }
-    std::string strDescriptors;
-    for (const std::string& strDescriptor : descriptors) {
-        strDescriptors.append(strDescriptor).append(" ");
+    std::ifstream status("/proc/thread-self/status");
+    for (std::string strLine; std::getline(status, strLine);) {
+        if (0 == strLine.find("Umask:") || 0 == strLine.find("SigBlk:")) {
+            parts.insert(strLine);
+        }
     }
-    return strDescriptors;
-}
-
-template <typename Value>
-std::string difference(const char* szName, const Value& before, const Value& after)
-{
-    return before == after ? "" : std::string(szName) + " changed; ";
-}
-
-} // namespace
-
-ProcessState ProcessState::now()
-{
-    return {geteuid(), currentUmask(), std::filesystem::current_path().string(), blockedSignals(),
-            openDescriptors()};
-}
-
-std::string ProcessState::differenceTo(const ProcessState& other) const
-{
-    return difference("effective uid", uidEffective, other.uidEffective) +
-           difference("umask", umask, other.umask) +
-           difference("working directory", strDirectory, other.strDirectory) +
-           difference("signal mask", strBlockedSignals, other.strBlockedSignals) +
-           difference("open descriptors", strDescriptors, other.strDescriptors);
+    std::string strState;
+    for (const std::string& strPart : parts) {
+        strState.append(strPart).append(" ");
+    }
+    return strState;
 }
 
 void Log::clear()
