@@ -1,4 +1,4 @@
-// What calls of other programs can still do to a change that has been made.
+// Calls of other programs can still undo a change after it was made. This file watches for that.
 
 #ifndef TOOLS_AFTERMATH_H
 #define TOOLS_AFTERMATH_H
@@ -13,20 +13,22 @@ namespace tool {
 
 // A change that has been made.
 struct Change {
-    // Whether it was undone; looks in transactions of its own.
+    // Whether other calls have undone the change. Opens transactions of its own.
     std::function<bool()> isUndone;
 
-    // Makes it again where it was undone, in a transaction, and returns how often it was.
+    // Makes the change again where it was undone, within the caller's transaction. Returns how many times it
+    // had been undone: for how many tokens.
     std::function<uint64_t(Store&)> makeAgain;
 };
 
-// A call that takes no lock, and that had read a token before it was changed here, can write it back as it
-// was. Looks again, right after the change, until no call can do so: each has closed the database since, or
-// has had all the time that a call can take. Where calls that follow each other undo it again and again,
-// keeps them from writing for as long as one can take.
+// A call that takes no lock can have read a token before the change. It then writes the old token back. This
+// function looks until no call can do so any more: each process has closed the database since the change, or
+// has had the time that the longest call takes. It makes the change again where it was undone. When calls
+// undo it again and again, it holds the lock and a transaction, so that nobody can write, for as long as the
+// longest call takes.
 //
-// Tells on standard error how often that was, by a sentence such as "a token came back 3 times ...", and
-// which programs have had the database open all the time.
+// Says on standard error how often the change was undone ("a token came back 3 times ..."), and which
+// programs had the database open all the time. Throws Failure.
 void outlastCalls(const Change& change, const std::string& strUndone, const std::string& strDone);
 
 } // namespace tool

@@ -16,7 +16,8 @@
 
 namespace tool {
 
-// For Command::option and the like: keeps the text; or refuses the empty one and keeps the others.
+// For Command::option and its siblings: the first stores the text; the second refuses an empty text and
+// stores any other.
 Command::Take into(std::string& strTarget);
 Command::Take notEmptyInto(std::string& strTarget);
 
@@ -24,10 +25,11 @@ Command::Take notEmptyInto(std::string& strTarget);
 void addAllowances(Command& command, const std::string& strName, std::vector<Allowance>& allowances,
                    const std::string& strDescription);
 
-// Names in them that are seldom meant, a sentence about each: they are compared byte by byte.
+// A sentence about each name that the user probably did not mean, such as one with a "*": names are compared
+// byte by byte. strName is the option's name.
 std::vector<std::string> doubtsAbout(const std::string& strName, const std::vector<Allowance>& allowances);
 
-// Which tokens: those that fulfil all that is asked for.
+// Selects the tokens that fulfil all conditions that are set.
 struct Selection {
     std::optional<unsigned int> nUid;
     std::optional<std::string> strFunction;
@@ -35,20 +37,20 @@ struct Selection {
     std::optional<int64_t> nCreatedBefore; // seconds since the epoch
     std::optional<int64_t> nCreatedAfter;
     std::vector<Allowance> opens;
-    std::optional<int64_t> nExpiring; // within so many seconds
+    std::optional<int64_t> nExpiring; // in seconds from now: the token expires within this time
     bool blExpired = false;
     bool blUnlimited = false;
     bool blNoOwner = false;
 
-    // Whether it asks for nothing, and so selects all.
+    // Whether no condition is set, so that all tokens are selected.
     bool empty() const;
 
-    // As a condition in SQL. To know which owners are gone, it looks at the store and up all users.
+    // The selection as a condition in SQL. With blNoOwner, this reads the store and looks up all owners.
     std::string sql() const;
 };
 void addSelection(Command& command, Selection& selection);
 
-// How many tokens there are of them.
+// How many tokens the selection has.
 uint64_t countSelected(const Selection& selection);
 
 // --uid and --user, which exclude each other.
@@ -57,28 +59,28 @@ void addUser(Command& command, std::optional<unsigned int>& nUid);
 // --uses and --unlimited, which exclude each other, as a token's count.
 void addUses(Command& command, std::optional<int64_t>& nCount);
 
-// The lifetime that an option names.
+// --ttl, the lifetime in seconds.
 void addTtl(Command& command, std::optional<int64_t>& nTtl);
 
 void addExtra(Command& command, std::optional<Json::Value>& jExtra);
 
-// The administrator's note on a token, which stands in its data.
+// --note, the administrator's note on a token. It is kept in the token's field "extra".
 void addNote(Command& command, std::optional<std::string>& strNote);
 
-// Writes a note into a token's data, an object; "" removes it.
+// Writes a note into a token's "extra", which must be an object; "" removes the note.
 void setNote(Json::Value& jExtra, const std::string& strNote);
 
 // The argument TID.
 void addTid(Command& command, std::string& strTid);
 
-// The ids that an argument of a name stands for: itself, or for "-" the lines of standard input, of which
-// there can be none.
+// The ids that the argument strName stands for: the argument itself, or for "-" the lines of standard input,
+// which can be empty.
 std::vector<std::string> readTids(const std::string& strName, const std::string& strArgument);
 
-// The same for commands that take one id. Fails when there is none.
+// The id that the argument strName of a command stands for. Fails unless there is exactly one.
 std::string readTid(const std::string& strName, const std::string& strArgument);
 
-// What is said of an id that no token has.
+// The failure for an id that no token has.
 Failure noSuchToken();
 
 } // namespace tool

@@ -1,9 +1,9 @@
-// The lines in the system log that tell who has changed what: one for each change that stays, with the
-// facility LOG_AUTHPRIV, such as
+// The system log says who has changed what: one line for each change that was committed, with the facility
+// LOG_AUTHPRIV, such as
 //
 //     revoke: 2 tokens deleted (21IRmWbM..., Zk3T0qVd...); by uid 1000 (sudo), login uid 1000
 //
-// Whole ids never stand there. A process has one change at a time.
+// A line never holds a whole id. A process makes one change at a time.
 
 #ifndef TOOLS_AUDIT_H
 #define TOOLS_AUDIT_H
@@ -15,29 +15,29 @@
 namespace tool {
 namespace audit {
 
-// Prefixes of ids that a line shows; where there are more tokens, it tells only how many.
+// A line shows this many prefixes of ids at most; for more tokens, it only says how many they are.
 const size_t PREFIXES_MAX = 5;
 
-// Whose changes those that follow are.
+// Names the command in the lines that follow.
 void setCommand(const std::string& strCommand);
 
-// What a change that is being made does to a token, in one word such as "created"; and to several, of whose
-// ids some may be missing where there are more than PREFIXES_MAX.
+// Notes what the change that is being made does to a token, in one word such as "created". The second one
+// notes it for nTokens tokens; strTids may hold fewer ids if there are more tokens than PREFIXES_MAX.
 void note(const char* szDone, const std::string& strTid);
 void note(const char* szDone, const std::vector<std::string>& strTids, uint64_t nTokens);
 
-// Whether something was noted that is neither made nor forgotten.
+// Whether there are notes of a change that was neither made nor forgotten yet.
 bool hasNotes();
 
-// The change is made, with all that was noted of it, or perhaps so. Takes no memory.
+// To be called when the change is committed, or may be: what was noted is now made. Takes no memory.
 enum class Certainty { Certain, Perhaps };
 void made(Certainty certainty = Certainty::Certain);
 
-// Writes the line of a change that was made, and forgets what is not. To be called where no lock is held and
-// no transaction is open: it waits for whoever reads the log.
+// Writes the line of the change that was made, and forgets all notes. Call it without any lock or open
+// transaction: it waits until the system log takes the line.
 void tell();
 
-// Does that in the end.
+// Calls tell() when it is destroyed.
 class Teller {
 public:
     Teller() = default;

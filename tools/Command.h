@@ -14,11 +14,11 @@ struct option; // of <getopt.h>
 
 namespace tool {
 
-// Names of options are "--name" or "-n,--name", those of arguments "NAME". What an option or argument
-// stores to must outlive the command.
+// The names of options are "--name" or "-n,--name", those of arguments are "NAME". The variables that options
+// and arguments are stored in must outlive the command.
 class Command {
 public:
-    // What it does when all arguments have been read; returns the exit status.
+    // Does the command's work, after all arguments were read. Returns the exit status.
     typedef std::function<int()> Run;
 
     Command(std::string strName, std::string strDescription, Run run);
@@ -26,23 +26,24 @@ public:
     void flag(const std::string& strName, bool& blFlag, const std::string& strDescription);
     void flag(const std::string& strName, std::function<void()> set, const std::string& strDescription);
 
-    // Takes the text of each occurrence; a BadValue becomes a usage failure that names the option.
+    // Takes the text of an option or argument, once for each time it is given. If it throws BadValue, the
+    // command fails with a usage failure that names the option.
     typedef std::function<void(const std::string&)> Take;
 
     // An option, or an argument.
     struct Parameter {
         std::string strName; // "--name" or "NAME"
-        std::string strType; // of an option; "" for a flag, which takes no text
+        std::string strType; // what help calls the option's text; "" for a flag, which has none
         std::string strDescription;
         Take take;
-        bool blRepeated; // may be given more than once, as flags may
+        bool blRepeated; // may be given more than once; so may flags
         bool blRequired = false;
         char cShort = '\0'; // none
         std::vector<std::string> strExcluded = {};
         bool blGiven = false; // on the command line
     };
 
-    // A text of the command line; "" of a flag.
+    // An option or argument of the command line, with its text; "" for a flag.
     struct Word {
         Parameter* pParameter;
         std::string strText;
@@ -53,15 +54,15 @@ public:
     void repeatedOption(const std::string& strName, const std::string& strType, Take take,
                         const std::string& strDescription);
 
-    // The next argument, or all that are left.
+    // Each call adds the next argument. The last one stands for all arguments that are left.
     void argument(const std::string& strName, Take take, const std::string& strDescription);
     void optionalArgument(const std::string& strName, Take take, const std::string& strDescription);
     void remainingArguments(const std::string& strName, Take take, const std::string& strDescription);
 
-    // A command line that help shows, from behind the command's name.
+    // An example for help, without the program's and the command's name.
     void example(const std::string& strArguments);
 
-    // Of those that have been added, by "--name" or "NAME".
+    // For options and arguments that were added before. The names are "--name" or "NAME".
     void require(const std::string& strName);
     void exclude(const std::string& strName, const std::string& strOther);
 
@@ -71,24 +72,25 @@ public:
     const std::vector<Parameter>& arguments() const { return m_arguments; }
     std::string help() const;
 
-    // Notes the texts of a command line that begins with the command's name, byte for byte. Throws Failure
-    // where it cannot be read, or about what stands before that; what is missing or excluded is for take().
+    // Reads a command line that begins with the command's name, and keeps the texts byte for byte. Throws
+    // Failure for what cannot be read, and if Take refuses a text before that. take() checks what is required
+    // and excluded.
     void read(int nArguments, char** rgArguments);
 
-    // What was read, in its order.
+    // What was read, in the order of the command line.
     const std::vector<Word>& words() const { return m_words; }
 
     // Whether an option was read.
     bool has(const std::string& strName) const;
 
-    // Checks what is required and excluded, and hands each text to its Take, in the order of the command
+    // Checks what is required and excluded, and passes each text to its Take, in the order of the command
     // line. Throws Failure.
     void take();
 
     int run() const { return m_run(); }
 
 private:
-    Parameter* find(const std::string& strName); // nullptr: there is none
+    Parameter* find(const std::string& strName); // or nullptr
     void addOption(const std::string& strNames, Parameter parameter);
     void addWord(Parameter& parameter, const char* szText);
     void addOptionText(Parameter& option, const char* szText);
@@ -108,7 +110,7 @@ private:
     std::vector<Parameter> m_options;
     std::vector<Parameter> m_arguments;
     std::vector<std::string> m_strExamples;
-    std::vector<Word> m_words; // as read
+    std::vector<Word> m_words;
 };
 
 // Adds an option whose text parse() reads into target.
@@ -121,7 +123,8 @@ void addParsed(Command& command, const std::string& strName, const std::string& 
         strDescription);
 }
 
-// Two columns of a help text, of 80 together: names, and what they are.
+// A line of a help text, at most 80 columns wide: a name, and what it is. It continues on more lines where
+// needed.
 std::string helpLine(const std::string& strName, const std::string& strDescription);
 
 } // namespace tool

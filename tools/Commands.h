@@ -15,7 +15,7 @@ class Commands {
 public:
     enum class Needs { Root, Nothing };
 
-    // Adds a command. run keeps alive what the options are stored in. The command stays where it is.
+    // Adds a command. run owns the variables that the options are stored in. The reference stays valid.
     Command& add(const std::string& strName, const std::string& strDescription, const Command::Run& run,
                  Needs needs = Needs::Root);
 
@@ -26,7 +26,7 @@ public:
 
     std::string help() const;
 
-    // The command of a name. Throws Failure where there is none.
+    // Finds a command by its name. Throws Failure if there is none.
     Command& find(const std::string& strName);
 
 private:
@@ -52,7 +52,7 @@ void addDoctor(Commands& commands);
 void addTune(Commands& commands);
 void addHelp(Commands& commands);
 
-// All of these, in the order that the help text has.
+// All commands, in the order of the help text.
 struct CommandEntry {
     const char* szName;
     void (*add)(Commands&);

@@ -1,5 +1,5 @@
-// The streams: results on standard output, everything else on standard error, and the questions that
-// are asked on a terminal.
+// Standard streams: results go to standard output, everything else to standard error. Questions are asked on
+// a terminal.
 
 #ifndef TOOLS_CONSOLE_H
 #define TOOLS_CONSOLE_H
@@ -12,49 +12,50 @@
 
 namespace tool {
 
-// Gives the process all three streams, so that no file that is opened later takes the place of one that
-// was closed. Writing to a stream that was closed fails.
+// Opens each standard stream that is closed, so that no file that is opened later gets its number. Writing to
+// such a stream fails.
 void completeStreams();
 
-// Where results go: the standard output that the process was started with.
+// The stream for results: the standard output that the process was started with.
 FILE* resultStream();
 
-// Lets what others print to stdout go to another stream, or no longer. Results go where they did.
+// Sends what other code prints to stdout to another stream, or ends that. Results still go to standard
+// output.
 void divertStdout(FILE* pStream);
 void restoreStdout();
 
 bool isTerminal(FILE* pStream);
 
-// The columns of the terminal that a stream goes to. Elsewhere there is no end of them.
+// The columns of the terminal that a stream is; SIZE_MAX for a stream that is no terminal.
 size_t terminalWidth(FILE* pStream);
 
-// Whether what goes to a stream may be coloured: a terminal, and no NO_COLOR in the environment.
+// Whether output to a stream may be coloured: it is a terminal, and NO_COLOR is unset or empty.
 bool isColoured(FILE* pStream);
 
-// Writes to the result what holds nothing that cannot be seen, or is JSON. What a terminal cannot show of it
-// is escaped as in JSON; it takes no memory to write ASCII.
+// Writes a text to the result. The text must be JSON, or hold visible characters only. What a terminal cannot
+// show is escaped as in JSON. Takes no memory if the text is ASCII.
 void print(const std::string& strText);
 
-// What standard error shows of a text: to a terminal, printable.
+// The text as standard error shows it: made printable for a terminal.
 std::string errorLine(const std::string& strText);
 
 // Writes a line "vemo-access-token: ..." to standard error.
 void complain(const std::string& strSentence);
 
-// Writes the one about memory, and takes none for that.
+// Writes the line "vemo-access-token: out of memory", and takes no memory for it.
 void complainOfMemory();
 
-// Writes out what is still buffered. Fails when the result could not be written.
+// Writes out what is buffered. Fails if a part of the result could not be written, now or before.
 void flushResult();
 
-// A line of the result: to a terminal, printable.
+// A line of the result, made printable for a terminal. The second one writes it.
 std::string resultLine(const std::string& strText);
 void printLine(const std::string& strText);
 
-// The lines of standard input; on a terminal one line, asked for and not shown.
+// Reads the lines of standard input. On a terminal it asks for one line, which is not shown.
 std::vector<std::string> readSecrets(const std::string& strPrompt);
 
-// Asks on the terminal, which standard input and standard error must be.
+// Asks a yes-or-no question. Standard input and standard error must be a terminal.
 bool confirm(const std::string& strQuestion);
 
 } // namespace tool

@@ -1,5 +1,5 @@
-// Files and directories by descriptors: what was looked at is what is worked on, whatever others rename or
-// link meanwhile.
+// Work on files and directories by descriptors: a check and the work after it are about the same file, even
+// if others rename or link files meanwhile.
 
 #ifndef TOOLS_DESCRIPTOR_H
 #define TOOLS_DESCRIPTOR_H
@@ -13,7 +13,7 @@
 
 namespace tool {
 
-// Closes what it has opened.
+// Owns a descriptor, and closes it.
 class Descriptor {
 public:
     explicit Descriptor(int nFile = -1) : m_nFile(nFile) {}
@@ -23,13 +23,13 @@ public:
 
     bool isOpen() const { return 0 <= m_nFile; }
     int get() const { return m_nFile; }
-    int release() { return std::exchange(m_nFile, -1); } // hands it on
+    int release() { return std::exchange(m_nFile, -1); } // the caller now owns it
 
 private:
     int m_nFile;
 };
 
-// While it lives, files and directories get the mode that they are made with.
+// While this object lives, files and directories get exactly the mode that they are made with.
 class UmaskOff {
 public:
     UmaskOff() : m_before(umask(0)) {}
@@ -41,51 +41,52 @@ private:
     const mode_t m_before;
 };
 
-// A way down a path, from "/" or the current directory. Each directory is opened in the one above it, and
-// none through a symbolic link.
+// Walks down a path from "/" or the current directory, step by step. Opens each directory in the one above
+// it, and follows no symbolic link.
 class Walk {
 public:
-    // Throws Failure where not even the first of them can be opened.
+    // Throws Failure if the first directory cannot be opened.
     explicit Walk(const std::string& strPath);
 
-    // Whether all directories of the path have been stepped to.
+    // Whether step() was called for all directories of the path.
     bool isDone() const { return std::string::npos == m_nNext; }
 
-    // Opens the next one. Returns false, with errno set, where that is not possible: ENOENT there is none,
-    // ELOOP it is a symbolic link, ENOTDIR it is something else.
+    // Opens the next directory. Returns false if that is not possible, with errno set: ENOENT if there is
+    // none, ELOOP if it is a symbolic link, ENOTDIR if it is something else.
     bool step();
 
-    // Makes the one that a step found missing, with this mode whatever the umask, and opens it. Returns
-    // false, with errno set, where that is not possible.
+    // Makes the directory that step() found missing, with this mode whatever the umask is, and opens it.
+    // Returns false, with errno set, if that is not possible. When it returns true, a power cut does not undo
+    // it.
     bool make(mode_t mode);
 
-    // Whether it was that, and not another process, that made the last one. Once make() has succeeded, no
-    // power cut undoes it.
+    // Whether the last directory was made by make(), and not by another process.
     bool hasMade() const { return m_blMade; }
 
-    // The last one that was opened or, when a step failed, that was not.
+    // The path of the last directory that was opened; after a failed step, of the one that could not be
+    // opened.
     const std::string& path() const { return m_strPath; }
 
-    // The last one that was opened, to be worked in and looked at, no more.
+    // The last directory that was opened, by O_PATH: good for calls such as openat() and fstat(), but not to
+    // read or sync it.
     Descriptor& directory() { return m_directory; }
 
 private:
     bool openNamed();
 
     const std::string m_strWhole;
-    size_t m_nNext; // where the next name begins; npos behind the last
+    size_t m_nNext; // where the next name begins; npos after the last name
     std::string m_strPath;
-    std::string m_strName; // of the directory that path() ends with
+    std::string m_strName; // the last name in path()
     Descriptor m_directory;
     bool m_blMade = false;
 };
 
-// What is said of a path when errno tells why it, or the directory of it that a walk reached, cannot be
-// opened.
+// The message for a path that cannot be opened: errno says why, and strReached is how far a walk came.
 BadValue badPath(const std::string& strPath, const std::string& strReached);
 
-// The place of a file: its directory, to be worked in, and its name there. Throws BadValue, which names the
-// path.
+// The place of a file: its directory, open for calls such as openat(), and its name there. Throws BadValue,
+// which names the path.
 struct FilePlace {
     explicit FilePlace(const std::string& strPath);
 
@@ -93,28 +94,29 @@ struct FilePlace {
     std::string strName;
 };
 
-// What lstat tells of a name in a directory; zeros, with errno set, where it tells nothing.
+// The status of a name in a directory, as by lstat; all zeros, with errno set, if that fails.
 struct stat statusAt(const Descriptor& directory, const std::string& strName);
 
-// Whether two descriptions are those of one file.
+// Whether two statuses are of the same file.
 bool isSame(const struct stat& one, const struct stat& other);
 
-// Opens a file of a directory for reading, without waiting, if it is a regular one. Returns none, with errno
-// set, where it is not: EINVAL for what is no regular file. Nothing else is opened.
+// Opens a regular file of a directory for reading, without waiting. Returns a closed Descriptor, with errno
+// set, if that fails: ELOOP for a symbolic link, EISDIR for a directory, EINVAL for any other file that is
+// not regular.
 Descriptor openRegular(const Descriptor& directory, const std::string& strName);
 
-// The same by its path, for data of the caller's. Throws BadValue, which names the path; also of a file with
-// several names in a directory of others, who can have put another's secret there.
+// Opens a regular file that the caller names, for reading. Throws BadValue, which names the path. Also
+// refuses a file with several hard links in a directory that others can write: they could have linked a file
+// that they may not read.
 Descriptor openToRead(const std::string& strPath);
 
-// Waits until the disk has the names that stand in a directory. Returns false, with errno set, where it
-// cannot.
+// Syncs the names in a directory to the disk. Returns false, with errno set, on failure.
 bool syncNames(const Descriptor& directory);
 
-// Whether others than root and the caller can put something else in the place of what stands in a directory.
+// Whether anybody but root and the caller can replace the files in a directory.
 bool canOthersWrite(const struct stat& directory);
 
-// What fstat tells. Throws Failure.
+// The status of an open file. Throws Failure.
 struct stat statusOf(const Descriptor& file);
 
 } // namespace tool

@@ -1,4 +1,4 @@
-// What can be wrong with the place of the database and with what it holds.
+// Looks for everything that can be wrong with the directory and file of the database, and with its contents.
 
 #ifndef TOOLS_EXAMINATION_H
 #define TOOLS_EXAMINATION_H
@@ -13,28 +13,29 @@ namespace tool {
 
 struct Finding {
     enum class Severity {
-        Error,   // makes calls fail, or do something else than they report
-        Warning, // can do so
-        Note,    // is worth knowing, and nothing wrong
+        Error,   // calls fail, or do not do what they report
+        Warning, // calls may fail, or not do what they report
+        Note,    // worth knowing, but nothing is wrong
     };
 
     Severity severity;
     std::string strWhat;
     std::string strMeaning;
     std::string strRemedy;
-    std::function<void()> repair; // empty where an administrator must decide; throws Failure
+    std::function<void()> repair; // empty if an administrator must decide; throws Failure
 };
 
 typedef std::vector<Finding> Findings;
 
-// Whether there are none but notes.
+// Whether all findings are notes.
 bool areNotes(const Findings& findings);
 
-// What helps where a database cannot stay. Its journals belong to it, so it goes with its directory.
+// Remedies for a database that cannot stay. The whole directory is replaced, because the journals belong to
+// the database.
 extern const char* const REMEDY_REPLACE;
 extern const char* const REMEDY_SAVE_AND_REPLACE;
 
-// The tokens that a finding is about: how many, and the names of the first.
+// The tokens that a finding is about: their number, and the first characters of some ids.
 class TokenNames {
 public:
     void add(const std::optional<std::string>& strTid);
@@ -46,24 +47,24 @@ private:
     std::string m_strNames;
 };
 
-// Everything that is wrong now. What cannot be looked at because of one finding is left out.
+// Finds everything that is wrong now. Leaves out what cannot be examined because of another finding.
 Findings examine();
 
-// Its parts, which add to the findings. The first returns whether the database can be opened.
+// The two parts of examine(). They add to the findings. The first returns whether the database can be opened.
 bool examinePlace(Findings& findings);
 void examineStore(Findings& findings);
 
-// Parts of the place: whether a directory or a file can be written to, and the rest of what keeps programs
-// from writing.
+// Parts of examinePlace(): whether one directory or file can be written to; whether the file system, the
+// database file and the free space let programs write.
 void examineWritability(const std::string& strPath, Findings& findings);
 void examineFileSystem(Findings& findings);
 
-// Parts of the store: the table and what belongs to it, and the tokens. The first returns whether the tokens
-// can be read; the second repairs only those of a sound table.
+// Parts of examineStore(): the table, with its indexes and triggers, and the tokens. The first returns
+// whether the tokens can be read. The second offers repairs only if the table is sound.
 bool examineSchema(Findings& findings);
 void examineTokens(bool blTableSound, Findings& findings);
 
-// Notes about the tokens.
+// Adds notes about the tokens.
 void examineUse(Findings& findings);
 
 } // namespace tool

@@ -1,6 +1,6 @@
-// The last line of an export, by which an import knows that it has all of it:
+// The last line of an export. It tells an import that the export is complete:
 //   {"end":{"sha256":"...","tokens":3}}
-// with the SHA-256 of all bytes in front of the line and the number of tokens there. No token looks like it.
+// It holds the SHA-256 of all bytes before it, and the number of tokens. No token looks like it.
 
 #ifndef TOOLS_EXPORT_END_H
 #define TOOLS_EXPORT_END_H
@@ -17,15 +17,16 @@ class ExportEnd {
 public:
     ExportEnd();
 
-    // Takes the next bytes in front of the end.
+    // Takes the next bytes of the export.
     void add(const std::string& strBytes);
 
-    // The end behind these bytes.
+    // The end line for the bytes so far.
     Json::Value json(uint64_t nTokens) const;
 
     static bool is(const Json::Value& jLine);
 
-    // What is wrong with an end behind these bytes, as the rest of a sentence that begins with it; or "".
+    // Compares an end line with the bytes so far. Returns what is wrong as the rest of a sentence about the
+    // line, or "".
     std::string flawOf(const Json::Value& jEnd, uint64_t nTokens) const;
 
 private:

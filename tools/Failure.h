@@ -19,7 +19,7 @@ enum ExitStatus {
 
 class Failure : public std::runtime_error {
 public:
-    // The hint is for whoever called the command; it ends the sentence.
+    // The hint tells the user what to do or what the failure means. It ends the sentence.
     Failure(ExitStatus status, const std::string& strFact, const std::string& strHint = "")
         : std::runtime_error(strFact + (strHint.empty() ? "" : "; " + strHint)),
           m_status(status),
@@ -34,17 +34,17 @@ private:
     std::string m_strFact;
 };
 
-// Others held the database for too long: a failure that passes.
+// Other programs held the lock or the database for too long. The command may succeed later.
 class LockedFailure : public Failure {
     using Failure::Failure;
 };
 
-// A value that cannot be used; who knows where it came from says so in front of the reason.
+// A value that cannot be used. Whoever catches it adds where the value came from, before the reason.
 class BadValue : public std::runtime_error {
     using std::runtime_error::runtime_error;
 };
 
-// What convert() gives; a BadValue in it becomes a usage failure that names the argument.
+// Returns what convert() returns. Turns a BadValue into a usage failure that begins with the argument's name.
 template <typename Convert>
 auto convertArgument(const std::string& strName, Convert convert)
 {

@@ -1,4 +1,5 @@
-// How the id of a new token reaches who asked for it. A token whose id nobody got to know is taken back.
+// Delivers the id of a new token to the user. If that fails, the token is deleted again, because nobody knows
+// its id.
 
 #ifndef TOOLS_HANDOVER_H
 #define TOOLS_HANDOVER_H
@@ -11,15 +12,16 @@
 
 namespace tool {
 
-// A fresh id.
+// Makes a new id. Throws Failure.
 std::string newTid();
 
-// Undoes what a transaction has done, in one of its own, and returns what to say of that; "" when there was
+// Undoes a committed transaction, within the caller's. Returns what to say about that, or "" if there was
 // nothing to undo.
 typedef std::function<std::string(Store&)> Undo;
 
-// Commits the transaction, and prints the result, which holds the id. When it cannot be printed, or a signal
-// comes before that, undoes the transaction, and fails or ends by the signal.
+// Commits the transaction, then prints the result, which holds the id. If the result cannot be printed, or if
+// a signal comes before that, it undoes the transaction. Then it throws Failure, or ends the process by the
+// signal.
 void handOver(std::unique_ptr<Store> pStore, const std::string& strResult, const Undo& undo);
 
 } // namespace tool

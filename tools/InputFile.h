@@ -1,4 +1,4 @@
-// A regular file, as a stream.
+// A stream that reads a regular file.
 
 #ifndef TOOLS_INPUT_FILE_H
 #define TOOLS_INPUT_FILE_H
@@ -20,7 +20,7 @@ public:
           m_buffer(openToRead(strPath).release(), std::ios_base::in | std::ios_base::binary)
     {
         rdbuf(&m_buffer);
-        exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts a text short
+        exceptions(std::ios_base::badbit); // else lack of memory would go unnoticed and shorten a text
     }
 
 private:

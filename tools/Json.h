@@ -1,4 +1,4 @@
-// JSON texts, in and out.
+// Reads and writes JSON.
 
 #ifndef TOOLS_JSON_H
 #define TOOLS_JSON_H
@@ -10,13 +10,13 @@
 
 namespace tool {
 
-// How deep the library reads what is nested.
+// The library reads objects and arrays nested up to this depth.
 const int NESTED_MAX = 1000;
 
 // Reads one JSON object, strictly. Throws BadValue.
 Json::Value parseObject(const std::string& strText, int nNestedMax = NESTED_MAX);
 
-// The same for many, without making a reader for each.
+// Reads many JSON objects like parseObject(), with one reader.
 class ObjectReader {
 public:
     explicit ObjectReader(int nNestedMax = NESTED_MAX);
@@ -26,16 +26,16 @@ private:
     const std::unique_ptr<Json::CharReader> m_pReader;
 };
 
-// How deep a JSON text is nested, sound or not; an object alone is one level.
+// How deep a text is nested, valid JSON or not; an object alone is one level.
 int nestingOf(const std::string& strText);
 
-// Why the library does not read all of a text that a token holds, as the rest of a sentence; "" when it does.
+// Why the library cannot read a stored text completely, as the rest of a sentence; "" if it can.
 std::string flawOfStored(const std::string& strText);
 
-// On one line. As all JSON that is written, it escapes what cannot be seen.
+// The value on one line. Like all JSON of the tool, invisible characters are escaped.
 std::string compactJson(const Json::Value& jValue);
 
-// For people, with line breaks and indentation.
+// The value with line breaks and indentation, for people.
 std::string styledJson(const Json::Value& jValue);
 
 } // namespace tool

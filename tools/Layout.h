@@ -1,4 +1,4 @@
-// How tokens are shown: as a table, as JSON or as single fields.
+// How tokens are shown: as a table, CSV, JSON or a single field.
 
 #ifndef TOOLS_LAYOUT_H
 #define TOOLS_LAYOUT_H
@@ -18,40 +18,42 @@ struct Layout {
     enum class Form { Table, Json, JsonLines };
 
     Form form = Form::Table;
-    bool blCsv = false; // a table as CSV
+    bool blCsv = false; // with Form::Table: print CSV
     bool blNoHeader = false;
     bool blUtc = false;
     bool blEpoch = false;
     bool blShowIds = false;
-    std::string strField;         // this one only; "" for all
-    std::vector<size_t> nColumns; // of a table, as they are numbered here; empty for the usual ones
+    std::string strField;         // print only this field; "" for all
+    std::vector<size_t> nColumns; // indexes of COLUMNS; empty for the usual columns
 };
 
-// The name of a field, if it is one. Throws BadValue.
+// Checks that a text is the name of a field, and returns it. Throws BadValue.
 std::string parseField(const std::string& strText);
 
-// The form of a name. Throws BadValue, which lists the names that a command has.
+// Reads the name of a form. Throws BadValue, which lists szForms, the names that the command takes.
 Layout::Form parseForm(const std::string& strText, const char* szForms);
 
 // Adds -o to a command, or --no-header.
 void addForm(Command& command, Layout& layout);
 void addNoHeader(Command& command, Layout& layout);
 
-// Adds what commands that show tokens have besides: CSV, --field, --columns, --utc, --epoch.
+// Adds the options that all commands share that show tokens: -o with CSV, --no-header, --columns, --field,
+// --utc, --epoch.
 void addTokenOptions(Command& command, Layout& layout);
 
-// Prints tokens one after the other, their ids masked unless the layout shows them.
+// Prints tokens one after the other. Masks their ids unless the layout says otherwise.
 class TokenPrinter {
 public:
     explicit TokenPrinter(const Layout& layout);
 
-    // Whether all tokens must be measured first: a table is as wide as it needs to be.
+    // Whether measure() must be called for all tokens before print(), because the columns of a table fit
+    // their contents.
     bool measures() const;
     void measure(Json::Value& jToken);
 
     void print(Json::Value& jToken);
 
-    // To be called behind the last.
+    // To be called after the last token.
     void end();
 
 private:
@@ -66,7 +68,7 @@ private:
     bool m_blFirst = true;
 };
 
-// A token in full as JSON, with its end of line.
+// A token in full as JSON, with a line feed at the end.
 std::string recordText(const Json::Value& jToken, Layout::Form form);
 
 // Prints one token in full.

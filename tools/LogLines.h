@@ -1,4 +1,4 @@
-// The log lines that the library writes while a command runs.
+// Holds the library's log lines while a command runs.
 
 #ifndef TOOLS_LOG_LINES_H
 #define TOOLS_LOG_LINES_H
@@ -8,9 +8,10 @@
 
 namespace tool {
 
-// Keeps them while it lives and writes them in the end: on standard error, to a terminal printable, or to the
-// system log. So no reader who does not read, of either, holds up the command in the middle of a change, and
-// with it everybody else. To be made before the first result; a process has one at a time.
+// Keeps the log lines in memory while it lives. Its destructor writes them to standard error, made printable
+// for a terminal, or to the system log. So a reader that does not read them cannot stop the command in the
+// middle of a change, and other programs with it. Make it before the first result is printed; a process has
+// one at a time.
 class LogLines {
 public:
     explicit LogLines(bool blShown);

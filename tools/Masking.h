@@ -1,4 +1,4 @@
-// Ids are credentials: what is shown of them, and of what may be one.
+// Ids are credentials. These functions make what messages show of ids, and of texts that may be ids.
 
 #ifndef TOOLS_MASKING_H
 #define TOOLS_MASKING_H
@@ -8,24 +8,24 @@
 
 namespace tool {
 
-// What an argument may name a token by, at least.
+// The shortest prefix of an id by which an argument may name a token.
 const size_t PREFIX_MIN = 8;
 
-// An id's first characters: enough to tell tokens apart, but not to use one.
+// The first PREFIX_MIN characters of an id: enough to tell tokens apart, but not to use one.
 std::string masked(const std::string& strTid);
 
-// The same with "..." where more follows.
+// masked(), with "..." if the id is longer.
 std::string shortened(const std::string& strTid);
 
-// In quotation marks, for sentences that repeat an argument or a part of one. What is as long as an id may be
-// one in a wrong place, and is shortened.
+// A text in quotation marks, for messages that repeat an argument. A text that is as long as an id is
+// shortened, because it may be an id in the wrong place.
 std::string quoted(const std::string& strText);
 
-// The same for the name of a file: each part of the path is shortened that is so long; all are, where the
-// whole still is.
+// A path for messages: each part that is as long as an id is shortened. If the path is still as long as an
+// id, all parts are shortened.
 std::string shownPath(const std::string& strPath);
 
-// What a library says of what it was given, with what it quotes of that shortened in the same way.
+// A library's error text. What it quotes is shortened if it is as long as an id.
 std::string shownReason(const std::string& strReason);
 
 } // namespace tool

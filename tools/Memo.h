@@ -1,4 +1,4 @@
-// What a function makes of a text, remembered for texts that come again, as those of many tokens do.
+// Remembers what a function makes of a text, because many tokens hold the same texts.
 
 #ifndef TOOLS_MEMO_H
 #define TOOLS_MEMO_H
@@ -35,11 +35,11 @@ public:
 
 private:
     static constexpr size_t TEXTS_MAX = 1000;
-    static constexpr size_t TEXT_MAX = 1000; // bytes: long texts take memory, and hardly come again
+    static constexpr size_t TEXT_MAX = 1000; // bytes; long texts take much memory and seldom repeat
 
     const std::function<Value(const std::string&)> m_make;
     std::unordered_map<std::string, Value> m_known;
-    Value m_long = {}; // of the last long text
+    Value m_long = {}; // for the last text that was too long to remember
 };
 
 } // namespace tool

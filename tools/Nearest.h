@@ -1,4 +1,4 @@
-// What somebody may have meant who wrote a name that there is not.
+// Suggests a name to a user who wrote one that does not exist.
 
 #ifndef TOOLS_NEAREST_H
 #define TOOLS_NEAREST_H
@@ -8,12 +8,12 @@
 
 namespace tool {
 
-// How many characters must be inserted, deleted, replaced or exchanged with the next one to make one word of
-// another.
+// The fewest edits that make one word of the other. An edit inserts, deletes or replaces a character, or
+// swaps two neighbours.
 size_t distance(const std::string& strOne, const std::string& strOther);
 
-// A question for the name that is nearest to a word: did you mean "list"? It is "" where none is near: more
-// than a third of the longer one would have to change.
+// A question such as: did you mean "list"? Names the most similar name. Returns "" if even that name takes
+// more edits than a third of the longer word's length.
 std::string didYouMean(const std::string& strWord, const std::vector<std::string>& strNames);
 
 } // namespace tool

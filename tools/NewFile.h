@@ -11,20 +11,21 @@
 
 namespace tool {
 
-// What stands behind a file's name until it is complete, where it must have one.
+// The suffix of the temporary name, where a file needs one until it is complete.
 const char* const UNFINISHED_SUFFIX = ".part";
 
-// What an export of such a name has left behind, open and locked; none, with errno set, where there is none
-// or one is writing it, or where it is something else: EEXIST. Keep it open while it is removed.
+// Opens and locks a temporary file that an earlier export left behind under this name. Returns a closed
+// Descriptor, with errno set, if there is none, if an export is writing it (EWOULDBLOCK), or if it is
+// something else (EEXIST, or the error of openRegular()). The caller keeps it open until it has removed the
+// file.
 Descriptor lockRemains(const Descriptor& directory, const std::string& strName);
 
-// Removes it. Returns false, with errno set, where it cannot.
+// Removes such a file. Returns true if none is left; otherwise false, with errno set.
 bool removeRemains(const Descriptor& directory, const std::string& strName);
 
-// All members throw Failure. Only its owner can read the file. Until it is complete it has no name, and
-// whatever ends the process ends it, too. On file systems that do not know files without a name it has
-// another one; a signal that can be caught removes that, and so does the next file of this name. A process
-// has one at a time.
+// Only the file's owner can read it. Until it is complete it has no name, so it goes with the process. Where
+// the file system needs a name, it has a temporary one, which is removed by signals that can be caught, or by
+// the next NewFile of the same name. A process has one NewFile at a time. All members throw Failure.
 class NewFile {
 public:
     explicit NewFile(const std::string& strPath);
@@ -34,7 +35,7 @@ public:
 
     void write(const std::string& strText);
 
-    // Once it returns, a power cut leaves the file.
+    // Gives the file its name. When this returns, the file outlasts a power cut.
     void complete();
 
 private:
@@ -46,7 +47,7 @@ private:
 
     const std::string m_strPath;
     const FilePlace m_place;
-    const std::string m_strUnfinished; // its name until it is complete
+    const std::string m_strUnfinished; // the temporary name
     std::unique_ptr<FILE, int (*)(FILE*)> m_pStream{nullptr, fclose};
 };
 

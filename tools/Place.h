@@ -1,4 +1,4 @@
-// Where the database stands: its directory, its file and what belongs beside it.
+// The place of the database: its directory, its file, and the files beside it.
 
 #ifndef TOOLS_PLACE_H
 #define TOOLS_PLACE_H
@@ -12,45 +12,45 @@
 
 namespace tool {
 
-// The private directory that holds the database, and the name of that in it.
+// The private directory of the database, and the name of the database file in it.
 std::string databaseDirectory();
 std::string databaseName();
 
-// Opens that directory, whatever the way to it; none, with errno set, where that is not possible. Takes no
-// memory.
+// Opens the private directory, also through symbolic links. Returns a closed Descriptor, with errno set, if
+// that fails. Takes no memory.
 Descriptor openDirectory();
 
-// What stands behind that in the names of its journals.
+// The suffixes of the database's journals.
 const char* const JOURNAL_SUFFIXES[] = {"-journal", "-wal", "-shm"};
 
-// What lstat tells of a path; nothing when there is no such file. Throws Failure.
+// The status of a path, as by lstat; nothing if there is no such file. Throws Failure.
 std::optional<struct stat> statusOf(const std::string& strPath);
 
-// The first and the last bytes of the database, or of the journal with this suffix; zeros where there are
-// none, it cannot be read or is no regular file. Those of the database not while this process has it
-// open: its locks would be lost.
+// The first or last bytes of the journal with this suffix; "" means the database itself. Zeros where the file
+// has none, or if it cannot be read or is not a regular file. Do not read the database's bytes while this
+// process has it open: closing the file drops SQLite's locks.
 std::string firstBytes(const std::string& strSuffix, size_t cbWanted);
 std::string lastBytes(const std::string& strSuffix, size_t cbWanted);
 
-// Whether another process is just changing the database with a rollback journal. Not while this process has
-// it open, either.
+// Whether another process is changing a database with a rollback journal now. Do not call this while this
+// process has the database open, for the same reason.
 bool isBeingChanged();
 
-// Fails, with the reason, unless the database can be opened, or made if blCreate.
+// Fails unless the database can be opened or, with blCreate, made.
 void requireDatabase(bool blCreate);
 
-// Makes the private directory, and those above it, where they are missing. Returns whether it was
-// made.
+// Makes the private directory, and the directories above it, if they are missing. Returns whether the private
+// directory was made.
 bool makeDirectory();
 
-// Makes the file of the database, empty, where it is missing. Returns whether it was made.
+// Makes an empty database file if there is none. Returns whether it was made.
 bool makeFile();
 
-// Waits until the disk has the directory as it is now. Fails, and says what that means. Takes no memory: a
-// change that has been made must not be lost sight of for want of some.
+// Syncs the private directory. Fails with szMeaning, which says what a failure means. Takes no memory to
+// sync, so that lack of memory cannot hide a change that was made.
 void syncDirectory(const char* szMeaning);
 
-// What commands that need root say to others; fails for them.
+// Fails unless the effective user is root.
 void requireRoot();
 
 } // namespace tool

@@ -1,4 +1,4 @@
-// Other processes, as root sees them in /proc: who holds the lock, and who has the database open.
+// Other processes, from /proc: who holds a lock, and who has the database open. Needs root.
 
 #ifndef TOOLS_PROCESSES_H
 #define TOOLS_PROCESSES_H
@@ -8,18 +8,18 @@
 
 namespace tool {
 
-// Who holds a lock of flock(2) on a file: "vpnd (process 4711)"; "another process" where nobody is known.
+// Who holds a lock on a file, such as "vpnd (process 4711)"; "another process" if that is not known.
 std::string lockHolders(const std::string& strFile);
 
-// Whether /proc tells of processes.
+// Whether /proc is mounted.
 bool canSeeProcesses();
 
-// The descriptors that other processes have of the database, as paths in /proc; and whether one still is
-// that. The first throws Failure.
+// The descriptors by which other processes have the database open, as paths in /proc; and whether such a path
+// still leads to the database. The first throws Failure.
 std::vector<std::string> databaseDescriptors();
 bool isOfDatabase(const std::string& strDescriptor);
 
-// The processes that some such descriptors belong to, each named once.
+// The processes that own such descriptors, each named once.
 std::string ownersText(const std::vector<std::string>& strDescriptors);
 
 } // namespace tool

@@ -1,4 +1,4 @@
-// A progress bar on standard error, where that is a terminal, with the rate and the time left.
+// A progress bar on standard error, if that is a terminal, with the rate and the time left.
 
 #ifndef TOOLS_PROGRESS_H
 #define TOOLS_PROGRESS_H
@@ -12,14 +12,14 @@
 
 namespace tool {
 
-const uint64_t MANY = 10000; // tokens: what reads or changes fewer is done before a bar could be read
+const uint64_t MANY = 10000; // tokens; work on fewer is too short for a bar
 
-// A thread of its own draws it: a terminal that was stopped holds up only that. The end of the object waits
-// for the thread, so whoever works on the store makes it before the store.
+// A thread draws the bar, so a stopped terminal stops only the thread. The destructor waits for the thread:
+// make a Progress before the Store, so that it is destroyed after the store is closed.
 class Progress {
 public:
-    // count: tells how many steps there are, and is only asked where a bar can be shown; it is where there
-    // are at least nLeast.
+    // count() returns the number of steps. It is called only if a bar can be shown. The bar is shown from
+    // nLeast steps on.
     Progress(const std::string& strTitle, const std::function<uint64_t()>& count, bool blWanted = true,
              uint64_t nLeast = 0);
     ~Progress();

@@ -1,4 +1,4 @@
-// The signals that end a process unless it handles them.
+// Handles the signals that end a process by default.
 
 #ifndef TOOLS_SIGNALS_H
 #define TOOLS_SIGNALS_H
@@ -7,12 +7,12 @@
 
 namespace tool {
 
-// Has those handled that so far do what they do by default, or what else is named, each once: its second
-// coming does what it does by default. Those that are ignored stay so.
+// Handles these signals with handle(), each once: the second signal of a kind has its default effect. Changes
+// only signals whose handler is before; so ignored signals stay ignored.
 void handleEndingSignals(void (*handle)(int), void (*before)(int) = SIG_DFL);
 
-// While it lives, the first of these signals waits: it ends the process when this object goes. The second
-// ends it at once.
+// While this object lives, these signals wait. Its destructor then ends the process by the last of them. A
+// second signal of the same kind ends the process at once.
 class EndingPause {
 public:
     EndingPause();
@@ -21,7 +21,7 @@ public:
     EndingPause& operator=(const EndingPause&) = delete;
 };
 
-// Holds all signals up while it lives.
+// Blocks all signals of the thread while it lives.
 class SignalPause {
 public:
     SignalPause();

@@ -1,5 +1,6 @@
-// Ids of tokens in an order. They stand in a file without a name, for a million of them take more memory than
-// the tool may, and it is in the private directory, for they are credentials.
+// Sorts the ids of tokens. They are kept in a temporary file, because a million ids take more memory than the
+// tool may use. The file has no name and is in the private directory, because ids are credentials. If that
+// directory cannot be written to, the ids are sorted in memory.
 
 #ifndef TOOLS_SORTED_IDS_H
 #define TOOLS_SORTED_IDS_H
@@ -23,14 +24,14 @@ public:
     explicit SortedIds(bool blDescending);
 
     struct Id {
-        std::string strTid; // as SQL
+        std::string strTid; // as an SQL literal
         int64_t nRow;
     };
 
-    // Takes an id, and what it is sorted by: a number or a text. Equals come by their rows.
+    // Takes an id and its sort key, a number or a text. Ids with equal keys are in the order of their rows.
     void add(const Id& id, const std::string& strKey, bool blNumber);
 
-    // Hands them out in their order, the first nLimit of them, in groups.
+    // Calls use() with the first nLimit ids in order, in groups.
     void each(uint64_t nLimit, const std::function<void(const std::vector<Id>& ids)>& use);
 
 private:

@@ -1,4 +1,4 @@
-// Parts of statements.
+// Helpers for SQL statements.
 
 #ifndef TOOLS_SQL_H
 #define TOOLS_SQL_H
@@ -9,17 +9,18 @@
 
 namespace tool {
 
-// A row's columns as texts; nothing where it is NULL.
+// The columns of a row as texts; nothing for NULL.
 typedef std::vector<std::optional<std::string>> Row;
 typedef std::vector<Row> Rows;
 
-// The SQL that sqlite3_mprintf makes of a format: %Q quotes and escapes a text.
+// Formats SQL as sqlite3_mprintf() does: %Q quotes and escapes a text.
 std::string sqlText(const char* szFormat, ...);
 
-// The fields of a token, in their order.
+// The names of a token's fields, in the order of the columns.
 std::vector<std::string> fieldNames();
 
-// In a statement, an id as SQL has it, whatever it is; one that can be compared with "tid".
+// An SQL expression for a row's id as an SQL literal, whatever type the id has. Other statements can compare
+// "tid" with that literal.
 extern const char* const SQL_QUOTED_TID;
 
 } // namespace tool

@@ -1,4 +1,4 @@
-// What the store holds, in numbers.
+// Counts what the store holds.
 
 #ifndef TOOLS_STATISTICS_H
 #define TOOLS_STATISTICS_H
@@ -18,7 +18,7 @@ struct Group {
 };
 
 struct UserGroup {
-    std::optional<Json::Int64> nUid; // nothing for a NULL
+    std::optional<Json::Int64> nUid; // nothing for NULL
     uint64_t nTokens;
 };
 
@@ -26,10 +26,10 @@ struct Statistics {
     uint64_t nTokens;
     uint64_t nExpired;
     uint64_t nUnlimited;
-    uint64_t nExpiringInDay; // from now
+    uint64_t nExpiringInDay; // from now; expired tokens do not count
     uint64_t nExpiringInWeek;
     uint64_t nOpeningNothing;
-    uint64_t nOldUnlimited; // older than a year, with any number of uses
+    uint64_t nOldUnlimited; // of unlimited uses, and older than a year
     std::vector<Group> functions;
     std::vector<UserGroup> users;
     uint64_t nFileBytes;
@@ -37,11 +37,10 @@ struct Statistics {
     uint64_t nPageBytes;
 };
 
-// Counts the tokens, in steps. Throws Failure.
+// Counts the tokens in steps. Throws Failure.
 Statistics collectStatistics();
 
-// How many tokens have an owner who is not a user of this machine. Owners whom the user database fails to
-// look up are none of them.
+// How many tokens have an owner who is not a user of this machine. Does not count owners whose look-up fails.
 uint64_t countWithoutOwner(const Statistics& statistics);
 
 } // namespace tool

@@ -1,8 +1,8 @@
-// All tokens, some at a time.
+// Works on all tokens in steps, a part of them in each.
 //
-// Between two steps others can change tokens, and nobody waits long for one. Tokens do not depend on each
-// other, so steps in the order of the ids are as good as one look at all tokens: one that is there throughout
-// comes exactly once, and one that comes or goes meanwhile once or not at all.
+// Other programs can change tokens between two steps, so nobody waits long for one. Tokens do not depend on
+// each other, so steps in the order of ids are as good as one transaction: a token that exists all the time
+// comes exactly once; a token that is created or deleted meanwhile comes once or not at all.
 
 #ifndef TOOLS_STEPS_H
 #define TOOLS_STEPS_H
@@ -22,26 +22,27 @@ class Steps {
 public:
     enum class Order {
         ById,
-        // As the table lies on the disk, which is several times as fast. But a token that another program
-        // changes meanwhile moves, and can come twice or not at all.
+        // In the order of the table on the disk, which is several times as fast. But a token that another
+        // program changes meanwhile moves, and can come twice or not at all.
         ByRow,
     };
 
-    // The most tokens of a step: large ones can follow small ones. Fewer where a step is kept in memory.
+    // The most tokens of a step. TOKENS_MAX is bounded, because large tokens can follow small ones. KEPT_MAX
+    // is for steps whose tokens stay in memory.
     static constexpr size_t TOKENS_MAX = 16000;
     static constexpr size_t KEPT_MAX = 4000;
 
-    // access: Glance, or Write where something is to change. With a title, a bar shows how far they are where
-    // there are many tokens. A step has nMax of them at most.
+    // access is Glance, or Write to change tokens. With a title, a progress bar is shown if there are many
+    // tokens. A step has at most nMax tokens.
     explicit Steps(Store::Access access, const std::string& strTitle = "", Order order = Order::ById,
                    size_t nMax = TOKENS_MAX);
 
-    // Looks at the next tokens, which fulfil a condition in SQL. The transaction ends, with what was changed
-    // on the disk, when the function returns.
+    // Works on the tokens of a step, which strThose, a condition in SQL, selects. After it returns, the
+    // transaction ends, and its changes are on the disk.
     typedef std::function<void(Store&, const std::string& strThose)> Use;
 
-    // Returns false, and calls nothing, when there are no more. What it returns true for outlasts a power
-    // cut, as do the changes of others that it met.
+    // Does the next step. Returns false, without calling use(), if there are no more tokens. When it returns
+    // true, the changes of this step outlast a power cut, and so does all that it read.
     bool next(const Use& use);
 
 private:
@@ -51,18 +52,18 @@ private:
     const Store::Access m_access;
     const Order m_order;
     const size_t m_nMax;
-    size_t m_nTokens;      // of a step
-    std::string m_strLast; // the id or row that the last step ended with, as SQL
+    size_t m_nTokens;      // of the next step
+    std::string m_strLast; // the id or row number at the end of the last step, as SQL
     bool m_blEnd = false;
-    Clock::time_point m_ended; // the last step
+    Clock::time_point m_ended; // when the last step ended
 };
 
-// Programs that wait for the database try each 10 ms; between two steps, one of them has it.
+// Programs that wait for the database try every 10 ms, so one of them gets it between two steps.
 const std::chrono::milliseconds BETWEEN_STEPS(12);
 
-// Waits while another program is at a change, for a second at most: for those who read many tokens, and have
-// no database open. A reader in the way of a change costs it more than the time of the reading: the library
-// begins its purge anew, which without an index reads all tokens.
+// Waits while another program changes the database, at most for a second. For commands that read many tokens;
+// call it while this process does not have the database open. A reader that delays a change costs it more
+// than the time of the reading: the library repeats its purge, which reads all tokens if there is no index.
 void letOthersChange();
 
 } // namespace tool

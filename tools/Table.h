@@ -12,29 +12,29 @@ namespace tool {
 class Table {
 public:
     enum class Kind {
-        Short, // is never broken
-        Long,  // goes on in the next line where a terminal has no more room, and breaks between words
-        Right, // short, aligned to the right
+        Short, // always on one line
+        Long,  // on several lines, broken between words, if the terminal is too narrow
+        Right, // like Short, aligned to the right
     };
     struct Column {
-        const char* szTitle; // ASCII; a long column is at least as wide, which any character must fit into
+        const char* szTitle; // ASCII, at least as wide as any character
         Kind kind;
-        bool blSpare = false; // left out where a terminal has no room for all, the last one first
+        bool blSpare = false; // left out if the terminal is too narrow, the last such column first
     };
 
     Table(const std::vector<Column>& columns, bool blHeader);
 
-    // Adds a line, its texts made printable. A red one is so where there are colours.
+    // Adds a line; its texts are made printable. A red line is red only where colours are used.
     void add(const std::vector<std::string>& strCells, bool blRed = false);
 
-    // The table for a terminal of so many columns; where it has no line, no titles either.
+    // The table for a terminal of nTerminal columns. A table without lines is "", without titles.
     std::string text(size_t nTerminal, bool blColoured) const;
 
     // Writes the table to the result.
     void print() const;
 
-    // For a table of more lines than there is memory for: all are measured, and then each is written, the
-    // titles ahead of the first. What has grown meanwhile goes on in the next line.
+    // For a table that is too large for memory: first measure all lines, then print each. The first print()
+    // prints the titles too. A text that has become longer in between continues on the next line.
     void measure(const std::vector<std::string>& strCells);
     void print(const std::vector<std::string>& strCells, bool blRed);
 
@@ -50,10 +50,10 @@ private:
 
     const std::vector<Column> m_columns;
     const bool m_blHeader;
-    std::vector<size_t> m_nWidths; // that a column can use, and that it has to have
-    std::vector<size_t> m_nLeast;
+    std::vector<size_t> m_nWidths; // of the columns, without line breaks
+    std::vector<size_t> m_nLeast;  // of the columns, with line breaks between all words
     std::vector<Line> m_lines;
-    std::vector<size_t> m_nPrinted; // the widths, once a line was written
+    std::vector<size_t> m_nPrinted; // the widths that print() uses, set by its first call
 };
 
 } // namespace tool

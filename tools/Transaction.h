@@ -1,8 +1,8 @@
-// The token database through the library's store, in a transaction of the tool's own.
+// Opens the token database through the library's store, in a transaction of the tool.
 //
-// The library's operations report failure when they had to wait for a lock, although they took effect.
-// Here all waiting happens where a transaction begins and where it is committed, and there the result
-// is exact. So what a command says is what happened.
+// The library's operations report a failure when they had to wait for a lock, even if they took effect. Here,
+// all waiting happens when a transaction begins and when it is committed, and the results of both are exact.
+// So what a command says is what happened.
 
 #ifndef TOOLS_TRANSACTION_H
 #define TOOLS_TRANSACTION_H
@@ -21,57 +21,57 @@
 
 namespace tool {
 
-// All members throw Failure. What is not committed is undone when the object ends.
+// The destructor undoes what was not committed. All members throw Failure.
 class Transaction {
 public:
     enum class Access {
-        Glance, // nothing changes meanwhile
-        Read,   // the same, and what is seen outlasts a power cut
-        Locked, // no transaction, but the lock that programs take for a call
-        Write,  // nobody else writes meanwhile; with that lock
+        Glance, // nothing changes while it is open
+        Read,   // like Glance, and what is read outlasts a power cut
+        Locked, // no transaction, but the lock of CallLock.h
+        Write,  // nobody else writes while it is open; holds the lock too
     };
 
-    // What to do where there is no database.
+    // What to do if there is no database.
     enum class Missing { Fail, Make };
 
     explicit Transaction(Access access, Missing missing = Missing::Fail);
 
-    // Whether the file was missing, and was made.
+    // Whether this object made the database file, because it was missing.
     bool hasMadeFile() const { return m_blMadeFile; }
 
-    // Waits, for 5 s at most, until the change can be written. It outlasts a power cut. Others that take the
-    // lock can change tokens when this object is gone.
+    // Commits; waits at most 5 s for other programs. The change then outlasts a power cut. Programs that take
+    // the lock must wait until this object is destroyed.
     void commit();
 
-    // Any statement.
+    // Runs any statement and returns its rows.
     Rows query(const std::string& strSql);
 
-    // The same for one that gives many rows: takes them one by one.
+    // Runs a statement and passes its rows to take(), one by one.
     void eachRow(const std::string& strSql, const std::function<void(Row)>& take);
 
-    // The same for a statement that can give rows before it fails; returns why it did, or "".
+    // Runs a statement that may fail after some rows. Adds the rows; returns the error, or "".
     std::string queryAsFarAsItGoes(const std::string& strSql, Rows& rows);
 
-    // The same for one that is interrupted when it takes longer; returns nothing then.
+    // Like queryAsFarAsItGoes(), but interrupts the statement after this time, and then returns nothing.
     std::optional<std::string> queryWithin(std::chrono::milliseconds longest, const std::string& strSql,
                                            Rows& rows);
 
-    // The first column of a query's first row, as text and as a number of 0 or more.
+    // The first column of the first row, as text ("" if there is no row) or as a number of 0 or more.
     std::string text(const std::string& strSql);
     uint64_t number(const std::string& strSql);
 
-    // What there is under the name of the table of tokens: "table", "view" or "virtual table"; "" for
-    // nothing.
+    // What has the name of the table of tokens: "table", "view" or "virtual table"; "" for nothing.
     std::string tableKind();
 
-    // Whether there is a table of tokens, and fails where something else is in its place.
+    // Whether there is a table of tokens. Fails if something else has its name.
     bool hasTable();
 
-    // Makes the table where it is missing, and returns whether it was. Without a transaction.
+    // Makes the table if it is missing, and returns whether it was made. Call it outside a transaction.
     bool makeTable();
 
 protected:
-    // The database, for the library's operations; and what one returned, which must not be an error.
+    // The library's store; and a check of the result of one of its operations, which fails if the result is
+    // an error.
     AccessTokenDbApi& db() { return m_db; }
     void require(int nResult);
 
@@ -83,8 +83,8 @@ private:
     std::string run(const std::string& strSql, const std::function<void(Row)>& take);
     bool holdsNull();
 
-    // The last that go, when the database is closed and nobody waits for the lock: a change that is made is
-    // told, and then a signal that has come meanwhile ends the process.
+    // These two are destroyed last, after the database is closed and the lock is free: first the system log
+    // gets the line about a committed change, then a signal that has come meanwhile ends the process.
     std::optional<EndingPause> m_pause;
     audit::Teller m_teller;
     const Access m_access;

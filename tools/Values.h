@@ -1,4 +1,4 @@
-// What people write on a command line, as the store's values and back. The readers throw BadValue.
+// Converts what people write on a command line to the store's values, and back. The parsers throw BadValue.
 
 #ifndef TOOLS_VALUES_H
 #define TOOLS_VALUES_H
@@ -12,24 +12,25 @@
 
 namespace tool {
 
-// A number from nMin to nMax, in decimal.
+// A decimal number from nMin to nMax.
 int64_t parseNumber(const std::string& strText, int64_t nMin, int64_t nMax);
 
-// A user's number, and that of a user of this machine. Throws Failure where the user database fails.
+// A uid; or the uid of a user of this machine, by name. The second throws Failure if the user database fails.
 unsigned int parseUid(const std::string& strText);
 unsigned int parseUser(const std::string& strName);
 
-// The name of a user; nothing, or a Failure, where this machine does not know the user. Both throw Failure
-// where the user database fails. The third is for lists, which do without the name in either case.
+// The name of a user. If this machine does not know the user, the first returns nothing and the second throws
+// Failure. Both throw Failure if the user database fails. The third is for lists: it returns nothing in both
+// cases, and remembers names.
 std::optional<std::string> findUserName(Json::Int64 nUid);
 std::string userName(Json::Int64 nUid);
 std::optional<std::string> userNameIfKnown(Json::Int64 nUid);
 
-// Seconds in a text such as "90m", "1d12h" or "45" (seconds); from a second to a thousand years.
+// The seconds of a duration such as "90m", "1d12h" or "45" (seconds): from one second to a thousand years.
 int64_t parseDuration(const std::string& strText);
 
-// Seconds since the epoch: "@1767225600", "2026-12-31", "2026-12-31 23:59", "2026-12-31T23:59:59",
-// the last three with a "Z" behind them in UTC, otherwise in local time.
+// Seconds since the epoch, from "@1767225600", "2026-12-31", "2026-12-31 23:59" or "2026-12-31T23:59:59". The
+// last three are in local time, or in UTC with a "Z" at the end.
 int64_t parseTime(const std::string& strText);
 
 // "1 token", "2 tokens".
@@ -48,10 +49,10 @@ struct Allowance {
 };
 Allowance parseAllowance(const std::string& strText);
 
-// As a token's webapi_allow.
+// The value of a token's webapi_allow.
 Json::Value allowanceJson(const std::vector<Allowance>& allowances);
 
-// A JSON object, or that of a file for "@FILE".
+// A JSON object, or for "@FILE" the JSON object in the file.
 Json::Value parseExtra(const std::string& strText);
 
 } // namespace tool

@@ -1,8 +1,8 @@
-// What of a text can be seen, and how the rest is written.
+// Tells visible characters from others, and escapes the others.
 //
-// The rest could command a terminal, change the order of what it shows, or make two texts look alike that
-// are not: control characters, those that only format, all blanks but the plain one, and others without a
-// look of their own. Letters of all scripts can be seen, and so can the marks on them.
+// Invisible characters could command a terminal, change the order of its text, or make two different texts
+// look the same. These are control and format characters, all blanks but the plain one, and other characters
+// that show nothing. Letters of all scripts, and the marks on them, are visible.
 
 #ifndef TOOLS_VISIBLE_H
 #define TOOLS_VISIBLE_H
@@ -11,23 +11,24 @@
 
 namespace tool {
 
-// What the reader of a text can show.
+// The characters that the reader of a text can show.
 enum class Charset { Utf8, Ascii };
 
-// What the locale says of that.
+// The character set of the locale.
 Charset localeCharset();
 
-// Text for people: \xNN for each byte of what cannot be seen or shown, and of what is no UTF-8. A backslash
-// that would begin such a group is \x5c.
+// Text for people: each byte of a character that is invisible or that the charset lacks, and each byte that
+// is not valid UTF-8, becomes \xNN. A backslash that would look like such an escape becomes \x5c.
 std::string printable(const std::string& strText, Charset charset = Charset::Utf8);
 
-// The same for what is no UTF-8 alone.
+// The text with \xNN for each byte that is not valid UTF-8; everything else stays.
 std::string validUtf8(const std::string& strText);
 
-// The same JSON with \uNNNN for what cannot be seen. What is no UTF-8 stays.
+// The same JSON with \uNNNN for invisible characters. Bytes that are not valid UTF-8 stay.
 std::string visibleJson(const std::string& strJson);
 
-// For a terminal, \uNNNN for what it cannot show of such JSON, and \udcNN for a byte that is no UTF-8.
+// Such JSON for a terminal: \uNNNN for each character that the terminal cannot show, and \udcNN for each byte
+// that is not valid UTF-8.
 std::string showableJson(const std::string& strJson, Charset charset);
 
 } // namespace tool
