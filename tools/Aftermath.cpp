@@ -13,20 +13,21 @@ namespace {
 
 typedef std::chrono::steady_clock Clock;
 
-// A statement waits for a lock 500 times 10 ms at most; a second is for what stands around that.
+// A call writes a token back by one statement, which waits for a lock 500 times 10 ms at most. One more
+// second is for the rest of the call.
 const std::chrono::seconds CALL_MAX(6);
 const std::chrono::milliseconds LOOK_AGAIN_AFTER(10);
 const std::chrono::microseconds LOOK_FOR_CLOSED_AFTER(100);
-const int RESTORED_MAX = 20; // then there is always a call that has read what another has just written back
+const int RESTORED_MAX = 20; // after that, some call has always read what another has just written back
 
-// One that was closed and opened again between two looks seems to be the old one.
+// Removes the closed descriptors. One that was closed and opened again between two looks counts as open.
 void forgetClosed(std::vector<std::string>& strOpen)
 {
     const auto isClosed = [](const std::string& strDescriptor) { return !tool::isOfDatabase(strDescriptor); };
     strOpen.erase(std::remove_if(strOpen.begin(), strOpen.end(), isClosed), strOpen.end());
 }
 
-// Waits until all are closed, or for so long.
+// Waits until all descriptors are closed, at most as long as wait says.
 void waitForClosed(std::vector<std::string>& strOpen, Clock::duration wait)
 {
     for (const auto end = Clock::now() + wait; !strOpen.empty() && Clock::now() < end;) {
@@ -35,8 +36,8 @@ void waitForClosed(std::vector<std::string>& strOpen, Clock::duration wait)
     }
 }
 
-// Looks until who has the database open has closed it, or has had all the time that a call can take; but
-// returns true at once where the change was undone.
+// Watches until each process that has the database open has closed it, or has had the time of the longest
+// call. Returns true at once if the change was undone.
 bool isUndoneMeanwhile(const tool::Change& change, std::vector<std::string>& strOpen)
 {
     strOpen = tool::databaseDescriptors();
@@ -50,7 +51,7 @@ bool isUndoneMeanwhile(const tool::Change& change, std::vector<std::string>& str
         if (blLast) {
             return false;
         }
-        // It takes turns with the other programs, whom a look at many tokens keeps from committing.
+        // A look at many tokens keeps others from committing. So the pause is as long as the look was.
         waitForClosed(strOpen, std::max<Clock::duration>(LOOK_AGAIN_AFTER, Clock::now() - start));
     }
 }
@@ -63,8 +64,8 @@ uint64_t restore(const tool::Change& change)
     return nUndone;
 }
 
-// The same until nothing is to be done, and then keeps others from writing: a call that is under way gives
-// up, and one that begins reads what is there now.
+// Restores the change until it is complete, and then keeps all others from writing. A call that is under way
+// then gives up, and a call that begins reads the tokens as they are now.
 uint64_t restoreAndHold(const tool::Change& change, std::vector<std::string>& strOpen)
 {
     uint64_t nUndone = 0;
@@ -81,7 +82,7 @@ uint64_t restoreAndHold(const tool::Change& change, std::vector<std::string>& st
     }
 }
 
-// Returns who has had the database open all the time.
+// Returns the descriptors of those who had the database open all the time.
 std::vector<std::string> outlast(const tool::Change& change, uint64_t& nUndone)
 {
     std::vector<std::string> strOpen;

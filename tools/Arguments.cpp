@@ -8,8 +8,8 @@
 
 namespace {
 
-// The uids of all owners who are no users, as SQL. No user is looked up while the store is in use: that can
-// take long.
+// The uids of all owners who are not users of this machine, as SQL. Users are looked up after the store is
+// closed, because a look-up can take long.
 std::string ownersThatAreGone()
 {
     std::set<Json::Int64> nUids;

@@ -24,12 +24,12 @@ struct Note {
 };
 
 std::string g_strCommand;
-std::vector<Note> g_notes;     // of the change that is being made
-std::vector<Note> g_notesMade; // of those that are
+std::vector<Note> g_notes;     // of the change under way
+std::vector<Note> g_notesMade; // of committed changes
 bool g_blMade = false;
 bool g_blPerhaps = false;
 
-// An id's first characters; nothing of one that has no more.
+// The first characters of an id; only "..." for an id that has no more.
 std::string prefixOf(const std::string& strTid)
 {
     const bool blWhole = tool::masked(strTid).size() == strTid.size();
@@ -61,7 +61,7 @@ std::string textOf(const Note& note)
     return strText + ")";
 }
 
-// What was done, in words.
+// The committed changes in words.
 std::string changeText()
 {
     std::string strText;
@@ -71,7 +71,7 @@ std::string changeText()
     return (g_blPerhaps ? "perhaps " : "") + (strText.empty() ? "the store was changed" : strText);
 }
 
-// The uid that a text is; nothing for any other text, and for what stands for no user.
+// The uid in a text. Nothing for any other text, and for the number that stands for no user.
 std::optional<uid_t> uidOf(const char* szText)
 {
     uid_t uid = UID_ERR;
@@ -81,8 +81,7 @@ std::optional<uid_t> uidOf(const char* szText)
                                                                      : std::nullopt;
 }
 
-// Who called the tool. What sudo tells is a text of the caller's, who was root already; the login uid is the
-// kernel's.
+// Who called the tool. The caller, root already, may have set SUDO_UID; the login uid is the kernel's.
 std::string callerText()
 {
     const char* const szSudo = getenv("SUDO_UID");
@@ -96,7 +95,7 @@ std::string callerText()
 
 void write(const char* szText)
 {
-    openlog("vemo-access-token", 0, LOG_USER); // whatever the program was called as
+    openlog("vemo-access-token", 0, LOG_USER); // also if the program was called by another name
     syslog(LOG_AUTHPRIV | LOG_NOTICE, "%s", szText);
 }
 

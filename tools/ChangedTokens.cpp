@@ -6,7 +6,7 @@
 
 namespace {
 
-// Those of the tokens that are there.
+// The ids of those tokens that are in the store again.
 std::vector<std::string> findBack(tool::Store& store, const std::set<std::string>& strTids)
 {
     std::vector<std::string> strBack;
@@ -18,21 +18,21 @@ std::vector<std::string> findBack(tool::Store& store, const std::set<std::string
     return strBack;
 }
 
-// Whether a number of uses is one from before the one that was set: no grant adds uses, takes a limit away or
-// brings one. Negative ones are without a limit; of these, -1 is the one that is set.
+// Whether a number of uses is from before the change. A grant only lowers a number; it never adds uses, and
+// never adds or removes a limit. Negative numbers mean no limit.
 bool isOldCount(int64_t nCount, int64_t nSet)
 {
     return (nCount < 0) != (nSet < 0) || nCount > nSet;
 }
 
-// As texts: a NaN in it is not equal to itself.
+// Compares as texts, because a NaN in a value is not equal to itself.
 bool isSame(const Json::Value& jLeft, const Json::Value& jRight)
 {
     return tool::compactJson(jLeft) == tool::compactJson(jRight);
 }
 
-// Whether a record is one from before the change: a call that had read it has written it back, with a use
-// less. It cannot be told from one whose uses were raised here, and spent since.
+// Whether a call has written back a record that it had read before the change, with one use less. Such a
+// record looks like one whose uses were raised here and spent since; that counts as undone too.
 bool isUndone(const Json::Value& jNow, const Json::Value& jBefore, const Json::Value& jChange)
 {
     for (const std::string& strName : jChange.getMemberNames()) {

@@ -13,10 +13,10 @@ namespace {
 const size_t NAME_WIDTH = 28;
 const size_t HELP_WIDTH = 80;
 
-// What getopt_long() gives for the first option, above all characters.
+// The value of getopt_long() for the first long option; it is above all characters.
 const int FIRST_OPTION = 256;
 
-const int AN_ARGUMENT = 1; // what it gives for an argument that is no option
+const int AN_ARGUMENT = 1; // its value for an argument that is not an option
 
 tool::Failure usageFailure(const std::string& strSentence, const std::string& strHint = "")
 {
@@ -31,8 +31,7 @@ std::string longNameOf(const std::string& strArgument)
                : "";
 }
 
-// A line, with words behind it, and more lines behind a margin of the same width for those that it has no
-// room for.
+// Appends words to a line. What does not fit continues on new lines, each after the margin.
 std::string wrapped(std::string strLine, const std::string& strMargin, const std::string& strWords)
 {
     std::string strText;
@@ -158,10 +157,10 @@ void Command::addArgument(const char* szText)
     addWord(*pNext, szText);
 }
 
-// What getopt_long() knows of the options.
+// The options as getopt_long() takes them.
 std::string Command::shortOptions() const
 {
-    std::string strShort = "-:"; // arguments are told in their places, and what is wrong by us
+    std::string strShort = "-:"; // "-": arguments come in their places; ":": getopt_long() prints no messages
     for (const Parameter& each : m_options) {
         if (0 != each.cShort) {
             strShort += each.cShort;
@@ -182,7 +181,7 @@ std::vector<struct option> Command::longOptions() const
     return rgLong;
 }
 
-// The option that getopt_long() means.
+// The option that a value of getopt_long() stands for.
 Command::Parameter& Command::optionOf(int nFound)
 {
     if (FIRST_OPTION <= nFound) {
@@ -205,7 +204,7 @@ void Command::addFound(int nFound)
     }
 }
 
-// Whole names only: what is short for one option today may be short for two tomorrow.
+// Refuses abbreviated names: what stands for one option today may stand for two in a later version.
 void Command::requireLongName(const std::string& strName)
 {
     if (strName.empty() || find(strName)) {
@@ -222,12 +221,12 @@ void Command::readWords(int nArguments, char** rgArguments)
 {
     const std::string strShort = shortOptions();
     const std::vector<struct option> rgLong = longOptions();
-    optind = 0; // unlike 1 it makes getopt_long() forget what it has read before
+    optind = 0; // 0, unlike 1, resets getopt_long() completely
     int nNext = 1;
     for (; nNext < nArguments; nNext = optind) {
         requireLongName(longNameOf(rgArguments[nNext]));
         const int nFound = getopt_long(nArguments, rgArguments, strShort.c_str(), rgLong.data(), nullptr);
-        if (-1 == nFound) { // the one argument that it does not tell: "--"
+        if (-1 == nFound) { // at "--", the only argument that it does not return
             ++nNext;
             break;
         }
@@ -243,7 +242,7 @@ void Command::read(int nArguments, char** rgArguments)
     try {
         readWords(nArguments, rgArguments);
     } catch (const Failure&) {
-        takeWords(); // of several faults, the first is told
+        takeWords(); // of several faults, report the first
         throw;
     }
 }

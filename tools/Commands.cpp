@@ -18,7 +18,7 @@ const char* const VERSION_TEXT = "vemo-access-token " VEMO_ATOKEN_VERSION "\n";
 const char* const HELP = "print this help and exit";
 const char* const VERSION = "print the version and exit";
 
-// Tells also of changes that are made without opening the store.
+// Also logs changes that are made without opening the store.
 int runAudited(const tool::Command& command)
 {
     tool::audit::setCommand(command.name());
@@ -46,7 +46,7 @@ Command& Commands::add(const std::string& strName, const std::string& strDescrip
     };
     Command& command =
         m_commands.emplace_back(strName, strDescription, Needs::Root == needs ? runAsRoot : run);
-    // run() looks for these two, ahead of what is missing or excluded.
+    // run() handles these two before anything that is missing or excluded.
     const auto nothing = [] {};
     command.flag("-h,--help", nothing, HELP);
     command.flag("-V,--version", nothing, VERSION);

@@ -19,7 +19,7 @@ namespace {
 
 FILE* g_pResult = stdout;
 
-// What the stream's reader can show: only of a terminal anything is known.
+// The characters that the stream's reader can show. Only a terminal is known to have a limit.
 tool::Charset charsetOf(FILE* pStream)
 {
     return tool::isTerminal(pStream) ? tool::localeCharset() : tool::Charset::Utf8;
@@ -47,7 +47,7 @@ void completeStreams()
             open("/dev/null", O_RDONLY | O_CLOEXEC); // takes the lowest number
         }
     }
-    std::cin.exceptions(std::ios_base::badbit); // it would hide that memory ran out, and cut lines short
+    std::cin.exceptions(std::ios_base::badbit); // else lack of memory would go unnoticed and shorten lines
 }
 
 FILE* resultStream()
@@ -68,7 +68,7 @@ void restoreStdout()
 
 bool isTerminal(FILE* pStream)
 {
-    const int nError = errno; // a failure to write is told in the end, by flushResult()
+    const int nError = errno; // flushResult() reports an earlier failure to write
     const bool blTerminal = isatty(fileno(pStream));
     errno = nError;
     return blTerminal;
@@ -80,7 +80,7 @@ size_t terminalWidth(FILE* pStream)
         return SIZE_MAX;
     }
     struct winsize size = {};
-    ioctl(fileno(pStream), TIOCGWINSZ, &size); // it stays as it is where that is not known
+    ioctl(fileno(pStream), TIOCGWINSZ, &size); // leaves zeros if the size is not known
     return size.ws_col ? size.ws_col : 80;
 }
 
@@ -118,7 +118,7 @@ void complainOfMemory()
 void flushResult()
 {
     fflush(g_pResult);
-    if (ferror(g_pResult)) { // then, or before
+    if (ferror(g_pResult)) { // now or before
         throw Failure(EXIT_STATUS_STORE, std::string("cannot write the result: ") + strerror(errno));
     }
 }
@@ -147,7 +147,7 @@ std::vector<std::string> readSecrets(const std::string& strPrompt)
         for (std::string strLine; std::getline(std::cin, strLine);) {
             strLines.push_back(strLine);
         }
-        if (ferror(stdin)) { // the last line can be cut off, and more of them be missing
+        if (ferror(stdin)) { // the last line may be cut off, and more lines may be missing
             throw Failure(EXIT_STATUS_USAGE, std::string("standard input: ") + strerror(errno));
         }
     }
@@ -159,7 +159,7 @@ bool confirm(const std::string& strQuestion)
     fprintf(stderr, "%s [y/N] ", printable(strQuestion, charsetOf(stderr)).c_str());
     std::string strAnswer;
     if (!std::getline(std::cin, strAnswer)) {
-        fputc('\n', stderr); // that an answer would have ended with
+        fputc('\n', stderr); // in place of the line feed of an answer
     }
     return 0 == strcasecmp(strAnswer.c_str(), "y") || 0 == strcasecmp(strAnswer.c_str(), "yes");
 }

@@ -57,7 +57,7 @@ Json::Value recordOf(const Options& options)
     return jToken;
 }
 
-// Writes the token, but for the end of the transaction.
+// Writes the token, without committing yet.
 std::unique_ptr<tool::Store> prepare(const Json::Value& jToken)
 {
     auto pStore = std::make_unique<tool::Store>(tool::Store::Access::Write, tool::Store::Missing::Make);
@@ -69,7 +69,7 @@ std::unique_ptr<tool::Store> prepare(const Json::Value& jToken)
     return pStore;
 }
 
-// What the caller may not have meant.
+// Sentences about what the user probably did not mean.
 std::vector<std::string> doubtsAbout(const Options& options)
 {
     if (options.allowances.empty()) {
@@ -85,7 +85,7 @@ int create(const Options& options)
     }
     const Json::Value jToken = recordOf(options);
     const std::string strTid = jToken["tid"].asString();
-    // Now, when a lack of memory does no harm yet.
+    // Made before the token is: lack of memory does no harm here.
     const std::string strResult = tool::Layout::Form::Table == options.layout.form
                                       ? tool::resultLine(strTid)
                                       : tool::recordText(jToken, options.layout.form);

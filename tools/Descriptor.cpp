@@ -14,8 +14,8 @@ namespace {
 const int DIRECTORY_FLAGS = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 const mode_t OTHERS_WRITE_MODE = 0022;
 
-// Whether an open file has the name by which it was opened, and no other. Both by one call: others, who gave
-// it that name, can take it away again, and one is left then, too.
+// Whether an open file has this name and no other. One call must tell both: those who gave it the name could
+// remove the name between two calls, and the link count would be 1 again.
 bool hasThisNameOnly(const tool::Descriptor& file, const tool::FilePlace& place)
 {
     const struct stat named = tool::statusAt(place.directory, place.strName);
@@ -71,7 +71,7 @@ bool Walk::openNamed()
 {
     Descriptor next(openat(m_directory.get(), m_strName.c_str(), DIRECTORY_FLAGS));
     if (!next.isOpen()) {
-        const int nError = errno; // ENOTDIR is what the kernel says of a symbolic link, too
+        const int nError = errno; // the kernel says ENOTDIR for a symbolic link, too
         errno = S_ISLNK(statusAt(m_directory, m_strName).st_mode) ? ELOOP : nError;
         return false;
     }
@@ -91,7 +91,7 @@ BadValue badPath(const std::string& strPath, const std::string& strReached)
 
 FilePlace::FilePlace(const std::string& strPath)
 {
-    const size_t nName = strPath.rfind('/') + 1; // 0 where there is none: npos is one less
+    const size_t nName = strPath.rfind('/') + 1; // 0 if there is no slash, because npos + 1 is 0
     Walk walk(strPath.substr(0, nName));
     while (!walk.isDone()) {
         if (!walk.step()) {
@@ -121,7 +121,7 @@ Descriptor openRegular(const Descriptor& directory, const std::string& strName)
         errno = S_ISLNK(mode) ? ELOOP : S_ISDIR(mode) ? EISDIR : mode ? EINVAL : errno;
         return Descriptor();
     }
-    // It can have become another thing since.
+    // The file can have been replaced since.
     Descriptor file(openat(directory.get(), strName.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
     if (file.isOpen() && !S_ISREG(statusOf(file).st_mode)) {
         errno = EINVAL;

@@ -105,8 +105,8 @@ bool repair(const Finding& finding)
     }
 }
 
-// Repairs what can be repaired, and looks again. Returns whether that helped: no repair failed, and what was
-// repaired is not found any more.
+// Repairs what can be repaired, and examines again. Returns whether that helped: something was repaired, no
+// repair failed, and nothing that was repaired is found again.
 bool repairOnce(tool::Findings& repaired, tool::Findings& left)
 {
     tool::Findings tried;
@@ -135,7 +135,7 @@ int doctor(const Options& options)
     tool::Findings repaired;
     tool::Findings left = tool::examine();
     while (options.blRepair && repairOnce(repaired, left)) {
-        // What a repair lets doctor look at can need the next.
+        // After a repair, more can be examined, and may need repair too.
     }
     report(repaired, left, options.layout);
     return tool::areNotes(left) ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_FINDINGS;

@@ -28,8 +28,8 @@ using tool::Store;
 
 const mode_t PRIVATE_MODE = 0700;
 const mode_t OTHERS_MODE = 0077;
-const size_t WRITE_VERSION = 18; // where the database says what its writers must know: 2 at most
-const size_t READ_VERSION = 19;  // the same of its readers: 2 is the write-ahead journal
+const size_t WRITE_VERSION = 18; // offset of the file format version for writing: SQLite knows up to 2
+const size_t READ_VERSION = 19;  // offset of the version for reading: 2 is the write-ahead journal
 const size_t HEADER_BYTES = READ_VERSION + 1;
 
 std::string octal(mode_t mode)
@@ -49,7 +49,7 @@ bool isPrivate(const struct stat& status)
     throw tool::Failure(tool::EXIT_STATUS_STORE, strReason);
 }
 
-// The private directory, if it is reached through directories alone in which only root can replace anything.
+// Opens the private directory. Fails unless only root can replace anything on the way to it.
 Descriptor openTrustedDirectory()
 {
     tool::Walk walk(tool::databaseDirectory());
@@ -68,7 +68,7 @@ Descriptor openTrustedDirectory()
     return directory;
 }
 
-// A file of that directory, which must be root's alone by now: nobody can have put a link in its place.
+// Opens a file of that directory, which must be root's alone by now: nobody can have put a link in its place.
 Descriptor openTrustedFile(const std::string& strSuffix)
 {
     const Descriptor directory = openTrustedDirectory();
@@ -93,7 +93,7 @@ void requireCall(bool blDone, const std::string& strPath)
     }
 }
 
-// Makes what open() gives root's alone.
+// Makes a file or directory, which open() opens, root's alone.
 template <typename Open>
 void makePrivate(const std::string& strPath, const Open& open)
 {
@@ -103,8 +103,8 @@ void makePrivate(const std::string& strPath, const Open& open)
     tool::settleChange();
 }
 
-// The repair of owner and mode of the database, or of a journal with this suffix. Only in a directory that is
-// root's alone is it certain that this is the one: that is repaired first.
+// The repair of owner and mode of the database, or of the journal with this suffix. Only in a directory that
+// is root's alone is it certain that this is the right file, so the directory is repaired first.
 std::function<void()> repairOf(const std::string& strSuffix, const struct stat& status)
 {
     const auto directory = tool::statusOf(tool::databaseDirectory());
@@ -116,7 +116,7 @@ std::function<void()> repairOf(const std::string& strSuffix, const struct stat& 
     };
 }
 
-// Owner and mode of what should be root's alone. The repair is for both.
+// Examines owner and mode of a path that should be root's alone. The repair is for both.
 void examinePrivacy(const std::string& strPath, const struct stat& status,
                     const std::function<void()>& repair, Findings& findings)
 {
@@ -134,7 +134,8 @@ void examinePrivacy(const std::string& strPath, const struct stat& status,
     }
 }
 
-// What cannot be opened as a directory. Returns whether there may be files all the same.
+// Reports a path that cannot be opened as a directory, for the reason in errno. Returns whether there may be
+// files all the same.
 bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings)
 {
     const std::function<void()> none;
@@ -162,8 +163,8 @@ bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings
 }
 
 struct Directory {
-    bool blFiles;   // there may be some in it
-    bool blTrusted; // only root can put anything in their place
+    bool blFiles;   // it may hold files
+    bool blTrusted; // only root can replace them
 };
 
 Directory examineDirectory(Findings& findings)
@@ -176,7 +177,7 @@ Directory examineDirectory(Findings& findings)
         }
         const struct stat status = tool::statusOf(walk.directory());
         if (walk.isDone()) {
-            // What stands in it is looked at when it is root's.
+            // The database is opened only if nobody else can write to this directory.
             const auto repair = [] { makePrivate(tool::databaseDirectory(), openTrustedDirectory); };
             examinePrivacy(walk.path(), status, blTrusted ? repair : std::function<void()>(), findings);
             blTrusted = blTrusted && !tool::canOthersWrite(status);
@@ -194,15 +195,15 @@ Directory examineDirectory(Findings& findings)
     return {true, blTrusted};
 }
 
-// Whether a journal names another one, of a change to several databases at once, in its end. Whoever opens
-// the database opens and deletes what is named there. No program that uses tokens makes such a change.
+// Whether a journal names a super-journal at its end, which belongs to a change to several databases. Whoever
+// opens the database opens and deletes the named file. No program that uses tokens makes such a change.
 bool isOfSeveral(const std::string& strSuffix)
 {
     const std::string strMark = "\xd9\xd5\x05\xf9\x20\xa1\x63\xd7";
     return tool::lastBytes(strSuffix, strMark.size()) == strMark;
 }
 
-// Returns whether the database can be opened: whoever opens it opens what has these names, too.
+// Examines the journals. Returns whether the database can be opened, which also opens the journals.
 bool examineBeside(Findings& findings)
 {
     bool blHarmless = true;
@@ -243,13 +244,13 @@ bool examineBeside(Findings& findings)
     return blHarmless;
 }
 
-// Returns whether the file can be opened. A missing one can be made if blMake.
+// Examines the database file. Returns whether it can be opened. The repair makes a missing file, if blMake.
 bool examineFile(bool blMake, Findings& findings)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH;
     const auto status = tool::statusOf(strPath);
     if (!status) {
-        // A journal without its database is the rest of one that was there.
+        // A journal without a database is left from a database that was there.
         const bool blFirst = std::none_of(
             std::begin(tool::JOURNAL_SUFFIXES), std::end(tool::JOURNAL_SUFFIXES),
             [&strPath](const char* szSuffix) { return tool::statusOf(strPath + szSuffix).has_value(); });
@@ -297,8 +298,8 @@ void examineVersion(const std::string& strHeader, Findings& findings)
          {}});
 }
 
-// Returns whether the database can be opened without harm. Whoever opens it takes the changes in a
-// write-ahead journal for its own.
+// Returns whether the database can be opened without harm: SQLite applies the changes in a write-ahead
+// journal to the database beside it, even if the journal does not belong to it.
 bool examineForeignJournal(const std::string& strHeader, Findings& findings)
 {
     const std::string strPath = VEMO_ATOKEN_DB_PATH "-wal";
@@ -313,7 +314,7 @@ bool examineForeignJournal(const std::string& strHeader, Findings& findings)
     return false;
 }
 
-// What an export leaves behind that was cut off by a power cut.
+// Looks for temporary files of exports that a power cut ended.
 void examineRemains(Findings& findings)
 {
     typedef std::filesystem::directory_iterator Entry;
@@ -331,12 +332,12 @@ void examineRemains(Findings& findings)
                  }});
         }
     }
-    if (error && error != std::errc::no_such_file_or_directory) { // behind a link that leads nowhere
+    if (error && error != std::errc::no_such_file_or_directory) { // it may be a link to nowhere
         fail(tool::databaseDirectory() + ": " + error.message());
     }
 }
 
-// Whoever can open the file of the lock can stop all programs that take it.
+// Whoever can open the lock file can stop all programs that take the lock.
 void examineLock(Findings& findings)
 {
     const std::string strPath = CallLock::FILE_OF_ALL;
@@ -363,7 +364,7 @@ bool examinePlace(Findings& findings)
         return false;
     }
     examineRemains(findings);
-    // Others could put a journal there in the moment in which the database is opened, or made.
+    // Elsewhere, others could add a journal just before the database is opened or made.
     const bool blOpens = examineBeside(findings) && blTrusted;
     const bool blFile = examineFile(blOpens, findings);
     examineFileSystem(findings);

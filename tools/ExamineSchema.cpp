@@ -1,4 +1,4 @@
-// What can be wrong with the table of tokens, and with what else the database holds that changes what
+// What can be wrong with the table of tokens, and with everything else in the database that changes what
 // programs do.
 
 #include <algorithm>
@@ -19,7 +19,7 @@ using tool::Store;
 const char* const TRIGGERS = "SELECT name FROM sqlite_schema WHERE type = 'trigger' "
                              "AND tbl_name = 'token' COLLATE NOCASE ORDER BY 1";
 
-// Those that somebody made, and that are more than a list of columns.
+// Indexes that somebody made and that do more than list columns.
 const char* const ODD_INDEXES =
     "SELECT name FROM pragma_index_list('token') AS list WHERE origin = 'c' AND (\"unique\" OR partial "
     "OR EXISTS (SELECT 1 FROM pragma_index_info(list.name) WHERE cid < 0)) ORDER BY 1";
@@ -33,7 +33,7 @@ std::string joined(const std::vector<std::string>& strParts)
     return strJoined;
 }
 
-// A shell's command that runs statements on the database.
+// A shell command that runs SQL on the database.
 std::string sqliteCommand(const std::string& strSql)
 {
     std::string strQuoted;
@@ -43,7 +43,7 @@ std::string sqliteCommand(const std::string& strSql)
     return "sqlite3 " VEMO_ATOKEN_DB_PATH " '" + strQuoted + "'";
 }
 
-// With one space wherever there is any, and none around.
+// The text with each run of spaces as one space, and none at its ends.
 std::string compressed(const std::string& strText)
 {
     std::string strCompressed;
@@ -66,9 +66,9 @@ std::string lowered(std::string strText)
     return strText;
 }
 
-// The columns and constraints of a CREATE TABLE statement, and what stands behind them, each under its text
-// in small letters. Their order means nothing to programs. Quotes and comments are not looked at: the
-// library's statement has none, so a statement that has some differs from it however it is taken apart.
+// The columns and constraints of a CREATE TABLE statement, and what follows them. The keys are their texts in
+// lower case. Their order means nothing to programs. Quotes and comments are not parsed: the library's
+// statement has none, so a statement with some differs from it however it is split.
 std::map<std::string, std::string> definitions(const std::string& strSql)
 {
     std::map<std::string, std::string> strDefinitions;
@@ -93,7 +93,7 @@ std::map<std::string, std::string> definitions(const std::string& strSql)
     return strDefinitions;
 }
 
-// The definitions of the first that the second has not, as a list of quotations.
+// The definitions that the first map has and the second lacks, quoted.
 std::string lacking(const std::map<std::string, std::string>& strDefinitions,
                     const std::map<std::string, std::string>& strOthers)
 {
@@ -106,7 +106,7 @@ std::string lacking(const std::map<std::string, std::string>& strDefinitions,
     return joined(strQuoted);
 }
 
-// Ids are unique in the library's table, so only in another there can be two of the same.
+// Ids are unique in the library's table, so only another table can have two tokens with the same id.
 void examineDuplicates(Findings& findings)
 {
     tool::TokenNames names;
@@ -125,13 +125,13 @@ void examineDuplicates(Findings& findings)
     }
 }
 
-// What stands in a comment can look like a definition, or hide one. The library's text has none.
+// A comment can look like a definition, or hide one. The library's statement has none.
 bool holdsComment(const std::string& strSql)
 {
     return std::string::npos != strSql.find("/*") || std::string::npos != strSql.find("--");
 }
 
-// Returns whether they are those that the library makes.
+// Returns whether the table has exactly the columns that the library makes.
 bool examineColumns(Store& store, Findings& findings)
 {
     std::string strOwn;
@@ -143,7 +143,7 @@ bool examineColumns(Store& store, Findings& findings)
     const std::string strMore = holdsComment(strSql) ? "a comment" : lacking(strFound, strMade);
     const std::string strLess = lacking(strMade, strFound);
     if (strMore.empty()) {
-        return true; // then it lacks nothing: it has all the columns, and none that is defined in another way
+        return true; // then strLess is empty too: each of the library's columns exists, as the library has it
     }
     findings.push_back(
         {Finding::Severity::Error,
@@ -155,7 +155,7 @@ bool examineColumns(Store& store, Findings& findings)
     return false;
 }
 
-// Finds what a query names, of a kind that can be dropped.
+// Reports the objects that a query names, with the statements that drop them.
 void examineObjects(Store& store, const std::string& strQuery, const std::string& strKind,
                     const std::string& strWhat, const std::string& strMeaning, Findings& findings)
 {

@@ -18,24 +18,23 @@ using tool::Store;
 const std::chrono::milliseconds CHECK_MAX(500);
 const time_t JOURNAL_AGE_MAX = 10; // seconds; a change takes far less
 
-// Whether a journal stands there that holds half a change: one that was carried out is removed, or its
-// beginning wiped.
+// Whether there is a journal with half a change: after a change, SQLite deletes or clears its journal.
 bool isJournalFull()
 {
     return tool::firstBytes("-journal", 1)[0] != '\0';
 }
 
-// Whether no living program can be writing it any more.
+// Whether the journal is too old for a program that is still writing it.
 bool isJournalOld()
 {
     const auto status = tool::statusOf(VEMO_ATOKEN_DB_PATH "-journal");
     return status && time(nullptr) - status->st_mtime > JOURNAL_AGE_MAX;
 }
 
-// In a table of tokens, the index that its ids are found by.
+// The index of the ids, which belongs to the primary key.
 const char* const INDEX_OF_IDS = "(SELECT name FROM pragma_index_list('token') WHERE origin = 'pk')";
 
-// Reads each token by its id, and looks for each row that its id leads to it. Returns what is wrong.
+// Reads each token by its id, and checks that the id of each row leads back to it. Returns what is wrong.
 std::string damageOfParts()
 {
     std::string strRead = "SELECT 0";
@@ -49,7 +48,7 @@ std::string damageOfParts()
         strErr = store.queryAsFarAsItGoes(strRead + " FROM token WHERE " + strThose, rows);
     })) {
     }
-    // ids lead to all rows
+    // Now the other way: look up the id of each row in the index.
     tool::Steps byRow(Store::Access::Glance, "Comparing", tool::Steps::Order::ByRow);
     while (strErr.empty() && byRow.next([&](Store& store, const std::string& strThose) {
         const std::string strIndex = store.text("SELECT " + std::string(INDEX_OF_IDS));
@@ -70,8 +69,8 @@ std::string damageOfParts()
     return strErr;
 }
 
-// Returns "" where nothing is. A whole check takes some seconds for each million tokens, for which others
-// could not commit where there is no write-ahead journal.
+// Returns what is damaged, or "". A whole check takes some seconds for a million tokens. Without a
+// write-ahead journal, others cannot commit in that time, so a long check is done in parts.
 std::string damage()
 {
     tool::Rows rows;
@@ -114,12 +113,12 @@ bool examineIntegrity(Findings& findings)
     return false;
 }
 
-// Returns whether it is whole.
+// Returns whether the database is undamaged.
 bool examineDatabase(Findings& findings)
 {
     const bool blLeftBehind = isJournalFull() && isJournalOld();
     {
-        const Store opened(Store::Access::Read); // which undoes a half change
+        const Store opened(Store::Access::Read); // this undoes half a change
     }
     if (blLeftBehind) {
         findings.push_back({Finding::Severity::Warning, VEMO_ATOKEN_DB_PATH "-journal was left behind",
@@ -141,7 +140,7 @@ void examineStore(Findings& findings)
     if (blWhole && blReadable) {
         examineTokens(findings.size() == nBefore, findings);
     }
-    if (areNotes(findings)) { // what is wrong comes first
+    if (areNotes(findings)) { // notes are only for a store in which nothing is wrong
         examineUse(findings);
     }
 }

@@ -20,17 +20,17 @@ using tool::TokenNames;
 
 const int64_t BACKLOG_AGE_MAX = 3600; // seconds; every call purges
 const uint64_t TOKENS_WITHOUT_INDEX = 10000;
-const int NESTING_MAX = 100; // that a stack of 64 KiB has room for
+const int NESTING_MAX = 100; // levels that a stack of 64 KiB has room for
 
-// A finding about those tokens that a condition in SQL holds for.
+// A finding about the tokens that fulfil a condition in SQL.
 struct Check {
     std::string strWhere;
     Finding::Severity severity;
-    std::string strWhat; // in front of the tokens
+    std::string strWhat; // the text before the tokens
     std::string strMeaning;
     std::string strRemedy;
-    std::string strRepair;        // the statement that repairs them; empty where an administrator must decide
-    std::string strRepaired = {}; // which of them; empty: all
+    std::string strRepair;        // the statement that repairs; empty if an administrator must decide
+    std::string strRepaired = {}; // the condition of the tokens to repair; empty: strWhere
 };
 
 bool isAny(const Json::Value&)
@@ -48,8 +48,8 @@ bool isText(const Json::Value& jDefault)
     return jDefault.isString();
 }
 
-// A condition that holds for a row where the test holds for any field whose default is of a kind. The
-// test is SQL with a "?" for the field.
+// A condition in SQL that holds for a row if a test holds for any field whose default is of a kind. The test
+// is SQL with "?" in place of the field.
 std::string anyField(bool (*isOfKind)(const Json::Value&), const std::string& strTest)
 {
     std::string strWhere;
@@ -189,7 +189,8 @@ void execute(const std::string& strStatement, const std::string& strWhere)
     }
 }
 
-// Whatever is wrong with the table takes part in a repair, so it goes first.
+// Adds a finding. It has no repair unless the table is sound, because whatever is wrong with the table, such
+// as a trigger, would take part in the repair.
 void report(const Check& check, const TokenNames& names, bool blTableSound, Findings& findings)
 {
     Finding finding = {check.severity, check.strWhat + names.text(), check.strMeaning, check.strRemedy, {}};
@@ -204,7 +205,7 @@ void report(const Check& check, const TokenNames& names, bool blTableSound, Find
     findings.push_back(finding);
 }
 
-// All in one pass over the table, and another for each finding.
+// Runs all checks in one pass over the table. Reads a step's tokens again for each check that finds some.
 void examineRows(bool blTableSound, Findings& findings)
 {
     const std::vector<Check> checks = {nulls(),     numbers(),  texts(),    users(),     unnamed(),
@@ -232,24 +233,24 @@ void examineRows(bool blTableSound, Findings& findings)
     }
 }
 
-// Whether an API's entry is one that opens calls that name a method.
+// Whether an API's entry can open calls that name a method.
 bool isEntry(const Json::Value& jEntry)
 {
     return jEntry.isObject() && jEntry["method"].isArray();
 }
 
-// Whether a method of the list cannot be read as a text.
+// Whether the list of methods holds something that cannot be read as a text.
 bool holdsNoMethod(const Json::Value& jEntry)
 {
     const auto isNone = [](const Json::Value& jMethod) { return jMethod.isArray() || jMethod.isObject(); };
     return isEntry(jEntry) && std::any_of(jEntry["method"].begin(), jEntry["method"].end(), isNone);
 }
 
-// What a text can be, and should not.
+// What can be wrong with a JSON text of a token.
 struct Flaws {
     bool blDeep = false;
     bool blBroken = false;
-    bool blOdd = false; // this and the next as what a token opens
+    bool blOdd = false; // blOdd and blThrowing: only if it is the field webapi_allow
     bool blThrowing = false;
 };
 

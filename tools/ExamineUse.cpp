@@ -1,5 +1,4 @@
-// What is worth knowing of the tokens of a sound store: in numbers, for those who use them are no concern of
-// its.
+// Notes about the tokens of a sound store. Only numbers, because who uses the tokens is not doctor's concern.
 
 #include "Examination.h"
 #include "Statistics.h"

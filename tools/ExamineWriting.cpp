@@ -18,13 +18,13 @@ namespace {
 using tool::Finding;
 using tool::Findings;
 
-const uint64_t ROOM_MIN = 65536; // bytes: the journal of a small change, and the pages that it adds
+const uint64_t ROOM_MIN = 65536; // bytes for the journal of a small change and the pages that it adds
 
 const char* const UNCHANGEABLE = "no token can be created, changed or granted";
 
-// What chattr(1) sets to forbid changes.
+// Attributes, set by chattr(1), that forbid changes.
 const struct {
-    uint64_t nBit; // of statx
+    uint64_t nBit; // in stx_attributes
     const char* szName;
     const char* szRemedy;
 } FORBIDDING[] = {
@@ -32,8 +32,8 @@ const struct {
     {STATX_ATTR_APPEND, "append-only", "chattr -a "},
 };
 
-// What look() fills in about a name's file, whatever that is: nothing is read of it, so nothing waits for
-// another end.
+// The status that look() fills in for a path, whatever kind of file it is. Opens the file with O_PATH, so it
+// cannot wait for the other end of a pipe.
 template <typename Status, typename Look>
 Status lookAt(const std::string& strPath, Look look)
 {
@@ -56,8 +56,8 @@ uint64_t attributesOf(const std::string& strPath)
 void examineRoom(const struct statvfs& status, Findings& findings)
 {
     const std::string strPath = tool::databaseDirectory();
-    // Programs run as root, whom the file system gives its reserve too. Some have no number of files to run
-    // out of.
+    // Programs run as root, which may also use the reserve of the file system, so f_bfree counts. Some file
+    // systems have no limit on files: they report 0 of them.
     const bool blRoom = uint64_t{status.f_bfree} * status.f_frsize >= ROOM_MIN;
     const bool blFiles = 0 == status.f_files || 0 != status.f_ffree;
     if (!blRoom || !blFiles) {
@@ -101,7 +101,7 @@ void examineFileSystem(Findings& findings)
 {
     const auto fileSystem = lookAt<struct statvfs>(databaseDirectory(), fstatvfs);
     if (fileSystem.f_flag & ST_RDONLY) {
-        return; // a finding about the directory
+        return; // reported by examineWritability() for the directory
     }
     const auto status = statusOf(VEMO_ATOKEN_DB_PATH);
     if (status && S_ISREG(status->st_mode)) {

@@ -23,7 +23,7 @@ struct Options {
     std::string strFile = "-";
 };
 
-// In SQL, why a token cannot be exported: an import would not make it what it is.
+// An expression in SQL: why a token cannot be exported, because an import would change it; '' if it can.
 std::string flawInSql()
 {
     std::string strSql = "CASE";
@@ -57,7 +57,7 @@ std::vector<std::string> objectNames()
 }
 
 struct Token {
-    std::string strLine; // of the export, or why it is not in it
+    std::string strLine; // the line of the export, or why the token is left out
     bool blFlawed;
 };
 
@@ -66,7 +66,7 @@ struct Exported {
     uint64_t nLeftOut = 0;
 };
 
-// Writes a line for each token and, behind all of them, the end.
+// Writes a line for each token, and after them the end line if none was left out.
 template <typename Write>
 Exported writeLines(const tool::Selection& selection, bool blProgress, Write write)
 {
@@ -118,7 +118,7 @@ Exported writeLines(const tool::Selection& selection, bool blProgress, Write wri
 
 Exported print(const tool::Selection& selection)
 {
-    // On one terminal the two would get mixed.
+    // On one terminal, the bar and the tokens would get mixed.
     const bool blProgress = !tool::isTerminal(tool::resultStream());
     const Exported exported = writeLines(selection, blProgress, tool::print);
     tool::flushResult();

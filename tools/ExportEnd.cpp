@@ -24,7 +24,7 @@ void ExportEnd::add(const std::string& strBytes)
 
 Json::Value ExportEnd::json(uint64_t nTokens) const
 {
-    SHA2_CTX digest = m_digest; // its end destroys it
+    SHA2_CTX digest = m_digest; // SHA256End() destroys its argument
     char szDigest[SHA256_DIGEST_STRING_LENGTH];
     Json::Value jEnd;
     jEnd[END][SHA256] = SHA256End(&digest, szDigest);

@@ -64,7 +64,7 @@ int check(const Options& options)
     return strReason.empty() ? tool::EXIT_STATUS_DONE : tool::EXIT_STATUS_REFUSED;
 }
 
-// The owner's name, when the use has been spent.
+// The owner's name, after the use was spent.
 std::string owner(int64_t nUid)
 {
     try {
@@ -77,10 +77,10 @@ std::string owner(int64_t nUid)
 struct Outcome {
     grant::Verdict verdict;
     int64_t nUid;
-    Json::Value jToken; // but for its id, where it is granted and asked for
+    Json::Value jToken; // without its id; set only if granted and asked for
 };
 
-// In one transaction with the look-up, so that no other grant spends the same use.
+// Looks up the token and spends the use in one transaction, so that no other grant can spend the same use.
 Outcome spendUse(const std::string& strTid, const Options& options)
 {
     tool::Store store(tool::Store::Access::Write);

@@ -10,14 +10,14 @@
 
 namespace {
 
-volatile sig_atomic_t g_nSignal = 0; // that came since the token was made
+volatile sig_atomic_t g_nSignal = 0; // the signal that came since handOver() began, or 0
 
 void noteSignal(int nSignal)
 {
     g_nSignal = nSignal;
 }
 
-// Returns what to say of it.
+// Undoes the change. Returns what to say about that.
 std::string takeBack(const tool::Undo& undo)
 {
     const std::string strChange = tool::hasChanged() ? "was made" : "may have been made";
@@ -31,7 +31,7 @@ std::string takeBack(const tool::Undo& undo)
     }
 }
 
-// Commits, and prints the id of a token that is there now.
+// Commits, and prints the id of a token that exists now.
 void complete(std::unique_ptr<tool::Store> pStore, const std::string& strResult)
 {
     pStore->commit();
@@ -39,9 +39,9 @@ void complete(std::unique_ptr<tool::Store> pStore, const std::string& strResult)
     if (g_nSignal) {
         throw tool::Failure(tool::EXIT_STATUS_STORE, "interrupted");
     }
-    signal(SIGPIPE, SIG_IGN); // for write() to fail, where nobody reads
+    signal(SIGPIPE, SIG_IGN); // without a reader, write() fails instead
     tool::print(strResult);
-    tool::flushResult(); // a signal ends the wait for who reads it
+    tool::flushResult(); // a signal ends the wait for a slow reader
 }
 
 } // namespace
@@ -63,7 +63,7 @@ void handOver(std::unique_ptr<Store> pStore, const std::string& strResult, const
     try {
         complete(std::move(pStore), strResult);
     } catch (const LockedFailure&) {
-        throw; // there is no token
+        throw; // then the token was not created
     } catch (const Failure& failure) {
         const std::string strDone = takeBack(undo);
         if (!g_nSignal) {

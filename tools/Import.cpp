@@ -26,7 +26,7 @@
 
 namespace {
 
-// What one transaction takes: it holds others up for less than half a second.
+// The most tokens of a transaction, so that it stops other programs for less than half a second.
 const size_t TOKENS_AT_ONCE = 10000;
 const size_t TOKENS_OF_A_STEP = 4000;
 
@@ -37,13 +37,13 @@ struct Options {
     std::vector<std::string> strFiles;
 };
 
-// A token of a file, and the line that it stands on.
+// A token of a file, and the number of its line.
 struct Line {
     size_t nNumber;
     Json::Value jToken;
 };
 
-// How a file was read: how many tokens it has, and why it is not a whole export; "" when it is one.
+// What was read of a file: the number of its tokens, and why it is not a complete export, or "".
 struct Contents {
     uint64_t nTokens = 0;
     std::string strFlaw = "the export has no end";
@@ -56,8 +56,8 @@ typedef std::function<void(Line line)> Take;
     throw tool::Failure(tool::EXIT_STATUS_USAGE, strFile + ": " + strerror(errno));
 }
 
-// Throws BadValue unless a record is one that the store can hold: what programs save there is not always what
-// they could create.
+// Throws BadValue unless the store can hold the record. Does not ask whether it could be created: programs
+// also save tokens that they could not create.
 void checkRecord(const Json::Value& jToken)
 {
     for (const std::string& strName : tool::fieldNames()) {
@@ -84,7 +84,7 @@ void checkRecord(const Json::Value& jToken)
     }
 }
 
-// The sentence about a file that is not imported.
+// The failure for a file that is not imported.
 tool::Failure badFile(const std::string& strFile, const std::string& strReason, const std::string& strHint)
 {
     return tool::Failure(tool::EXIT_STATUS_USAGE,
@@ -101,7 +101,7 @@ Json::Value objectOf(const std::string& strText)
     return tool::parseObject(strText, tool::NESTED_MAX + 1); // objects in a record
 }
 
-// Whether a last line, without a line feed, is the beginning of one.
+// Whether the last line, which has no line feed, is only the beginning of a record.
 bool isCutOff(const std::string& strText)
 {
     try {
@@ -112,7 +112,7 @@ bool isCutOff(const std::string& strText)
     }
 }
 
-// Throws BadValue at a bad line.
+// Throws BadValue for a bad line.
 Contents readLines(std::istream& stream, const Take& take)
 {
     Contents contents;
@@ -154,7 +154,7 @@ Contents readLines(std::istream& stream, const Take& take)
 Contents readStream(std::istream& stream, const std::string& strFile, const Take& take)
 {
     try {
-        stream.exceptions(std::ios_base::badbit); // or it hides that memory ran out, and cuts a line short
+        stream.exceptions(std::ios_base::badbit); // else lack of memory would go unnoticed and shorten a line
         const Contents contents = readLines(stream, take);
         if (!ferror(stdin)) {
             return contents;
@@ -183,7 +183,7 @@ Contents readFile(const std::string& strFile, const Take& take)
     return readStream(*file, nameOf(strFile), take);
 }
 
-// The same where nothing of the file is imported yet.
+// Reads a file before anything of it is imported. Throws a Failure that says so.
 Contents readAhead(const std::string& strFile, const Options& options, const Take& take)
 {
     try {
@@ -201,10 +201,10 @@ Contents readAhead(const std::string& strFile, const Options& options, const Tak
 struct Imported {
     uint64_t nCreated = 0;
     uint64_t nSkipped = 0;
-    uint64_t nExpired = 0; // of those that were created
+    uint64_t nExpired = 0; // of nCreated
 };
 
-// In one transaction. Those that are there already are left as they are, or make it fail.
+// Creates tokens in one transaction. An existing token is skipped if blSkip, and a failure otherwise.
 void createTokens(const std::vector<Line>& lines, const std::string& strFile, bool blSkip,
                   tool::Progress& progress, Imported& imported)
 {
@@ -251,8 +251,8 @@ Contents importAtOnce(const std::string& strFile, const Options& options, Import
     return contents;
 }
 
-// A file is read once ahead, to see that it is whole. Of a stream that turns out not to be, a part is
-// imported.
+// A file is first read without importing anything, to check that it is complete. A stream cannot be read
+// twice: if it turns out incomplete, a part has been imported.
 Contents importInSteps(const std::string& strFile, const Options& options, Imported& imported)
 {
     uint64_t nTokens = 0;
@@ -287,7 +287,7 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
     } catch (const tool::BadValue& bad) {
         throw stopped(tool::EXIT_STATUS_USAGE, nameOf(strFile) + ": " + bad.what());
     } catch (const tool::Failure& failure) {
-        throw stopped(failure.status(), failure.what()); // which tells what became of its own step
+        throw stopped(failure.status(), failure.what()); // its message says what became of its own step
     }
 }
 

@@ -19,7 +19,7 @@ Made makeStore()
 {
     tool::Store store(tool::Store::Access::Locked, tool::Store::Missing::Make);
     const bool blFile = store.hasMadeFile();
-    return {blFile, store.makeTable() || blFile}; // the library makes it with a file that it finds missing
+    return {blFile, store.makeTable() || blFile}; // the library makes the table together with a missing file
 }
 
 int init()

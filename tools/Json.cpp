@@ -18,13 +18,13 @@ public:
     {
         Json::StreamWriterBuilder builder;
         builder["indentation"] = szIndentation;
-        // What the store can hold comes out as it is: doubles that JSON has no name for, and bytes that are
-        // not valid UTF-8. All digits of doubles come in any case.
+        // Writes all that the store can hold: doubles without a form in JSON (NaN, infinity), and bytes that
+        // are not valid UTF-8. Doubles have all their digits by default.
         builder["useSpecialFloats"] = true;
         builder["emitUTF8"] = true;
         m_pWriter.reset(builder.newStreamWriter());
         m_stream.exceptions(
-            std::ios_base::badbit); // or it hides that memory ran out, and cuts the text short
+            std::ios_base::badbit); // else lack of memory would go unnoticed and shorten the text
     }
 
     std::string write(const Json::Value& jValue)
@@ -37,19 +37,19 @@ public:
 
 private:
     std::unique_ptr<Json::StreamWriter> m_pWriter;
-    std::ostringstream m_stream; // one for all texts: it takes as long to make as a token to write
+    std::ostringstream m_stream; // reused: making one takes as long as writing a token
 };
 
 std::unique_ptr<Json::CharReader> makeReader(int nNestedMax)
 {
     Json::CharReaderBuilder builder;
     Json::CharReaderBuilder::strictMode(&builder.settings_);
-    builder["allowSpecialFloats"] = true; // as compactJson writes them
+    builder["allowSpecialFloats"] = true; // compactJson() writes them
     builder["stackLimit"] = nNestedMax;
     return std::unique_ptr<Json::CharReader>(builder.newCharReader());
 }
 
-// The first error of the reader's report, each of which stands behind a "*" and on several lines.
+// The first error of the reader's report, as one line. In the report, "*" begins an error of several lines.
 std::string firstError(const std::string& strReport)
 {
     std::istringstream words(strReport);
@@ -58,7 +58,7 @@ std::string firstError(const std::string& strReport)
     for (std::string strWord; words >> strWord && (strWord != "*" || strError.empty());) {
         strError += strWord == "*" ? "" : (strError.empty() ? "" : " ") + strWord;
     }
-    const std::string strFirstLine = "Line 1, "; // of one line there is nothing to tell
+    const std::string strFirstLine = "Line 1, "; // needless where there is only one line
     return 0 == strError.compare(0, strFirstLine.size(), strFirstLine) ? strError.substr(strFirstLine.size())
                                                                        : strError;
 }
@@ -72,7 +72,7 @@ Reading readBy(Json::CharReader& reader, const std::string& strText, Json::Value
         return reader.parse(strText.data(), strText.data() + strText.size(), &jValue, &strReport);
     };
     try {
-        // Twice: when memory runs out, the reader rejects numbers that are valid.
+        // Parses twice, because the reader rejects valid numbers when memory runs out.
         return parse() || parse() ? Reading::Whole : Reading::Bad;
     } catch (const Json::RuntimeError& error) {
         if (!strstr(error.what(), "stackLimit")) {
@@ -111,7 +111,7 @@ Json::Value ObjectReader::read(const std::string& strText) const
 std::string flawOfStored(const std::string& strText)
 {
     static const std::unique_ptr<Json::CharReader> pReader = [] {
-        Json::CharReaderBuilder builder; // as lenient as the library's
+        Json::CharReaderBuilder builder; // as lenient as the library's reader
         builder["allowSpecialFloats"] = true;
         return std::unique_ptr<Json::CharReader>(builder.newCharReader());
     }();

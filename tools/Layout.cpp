@@ -30,7 +30,7 @@ std::string userText(const Json::Value& jUid)
     return tool::userNameIfKnown(jUid.asInt64()).value_or(jUid.asString());
 }
 
-// "Example.File:get,list Example.User"; an entry that cannot be read as such, as JSON.
+// Such as "Example.File:get,list Example.User"; an entry that is not of this kind is shown as JSON.
 std::string allowText(const Json::Value& jAllow)
 {
     if (!jAllow.isObject()) {
@@ -56,7 +56,7 @@ bool isExpired(const Json::Value& jToken, time_t nNow)
     return jToken["deadline"].asInt64() < nNow;
 }
 
-// The note that the administrator has made of a token.
+// The administrator's note on a token.
 std::string noteOf(const Json::Value& jToken)
 {
     const Json::Value& jExtra = jToken["extra"];
@@ -64,7 +64,7 @@ std::string noteOf(const Json::Value& jToken)
     return jNote.isString() ? jNote.asString() : jNote.isNull() ? "" : tool::compactJson(jNote);
 }
 
-// What a table can show of a token.
+// A column of the table of tokens.
 struct Column {
     const char* szName; // for --columns
     tool::Table::Column title;
@@ -140,7 +140,7 @@ std::vector<size_t> columnsOf(const Layout& layout)
     return nColumns;
 }
 
-// Of those that were chosen, none is spare.
+// The columns of the table. None that the user has chosen is spare.
 std::vector<tool::Table::Column> titlesOf(const Layout& layout)
 {
     std::vector<tool::Table::Column> titles;
@@ -158,7 +158,7 @@ void requireTableForColumns(const Layout& layout)
     }
 }
 
-// As RFC 4180 has it, but that lines end with a line feed alone.
+// A line of CSV as in RFC 4180, but it ends with a line feed only.
 std::string csvLine(const std::vector<std::string>& strCells)
 {
     std::string strLine;
@@ -178,7 +178,7 @@ std::string csvLine(const std::vector<std::string>& strCells)
     return strLine;
 }
 
-// For scripts: as it is stored.
+// Prints a field as it is stored, for scripts.
 void printField(const Json::Value& jToken, const std::string& strField)
 {
     const Json::Value& jValue = jToken[strField];
@@ -319,7 +319,7 @@ void TokenPrinter::print(Json::Value& jToken)
         break;
     case Layout::Form::JsonLines: tool::print(compactJson(jToken) + "\n"); break;
     case Layout::Form::Json: {
-        // As the only one of a list, without the brackets around it.
+        // Written as a list of one token, without the brackets of the list.
         Json::Value jTokens;
         jTokens.append(jToken);
         const std::string strList = styledJson(jTokens);
@@ -351,7 +351,7 @@ void TokenPrinter::end()
 
 namespace {
 
-// As the only one of a list.
+// Prints a token as a list of one.
 void printAsOnly(Json::Value jToken, Layout layout)
 {
     layout.blShowIds = true;

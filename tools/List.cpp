@@ -14,7 +14,7 @@
 
 namespace {
 
-// A field to sort by, and whether downwards.
+// A field to sort by, and the direction.
 struct Order {
     std::string strField;
     bool blDescending;
@@ -45,15 +45,14 @@ Order parseOrder(const std::string& strText)
     return order;
 }
 
-// What tokens are sorted by, in SQL: their field, but that more uses than any number sort behind all numbers.
+// The sort key in SQL: the field itself, but unlimited uses sort after all numbers of uses.
 std::string keyOf(const Order& order)
 {
     return order.strField == "count" ? "iif(count < 0, " + std::to_string(INT64_MAX) + ", count)"
                                      : order.strField;
 }
 
-// Puts the ids of the tokens in order, or but for those that the limit leaves out. Returns how many there
-// are.
+// Adds the ids of the selected tokens, up to the limit. Returns how many tokens are selected.
 uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
 {
     const bool blNumber = VEMO_ACCESS_TOKEN::tokenType()[options.order.strField][1].isIntegral();
@@ -93,10 +92,10 @@ std::string listOf(const std::vector<tool::SortedIds::Id>& ids, Part part)
     return strList;
 }
 
-typedef std::multimap<std::string, Json::Value> Tokens; // by their ids, as SQL
+typedef std::multimap<std::string, Json::Value> Tokens; // by their ids as SQL literals
 
-// Those of the ids that are there. A row is found sooner than an id; but a token that a program has changed
-// since is in another row.
+// Reads those tokens of the ids that still exist. Looks for their rows first, which is faster than by their
+// ids; then for the ids of tokens that a program has changed since, and that moved to another row.
 Tokens tokensOf(std::vector<tool::SortedIds::Id> ids)
 {
     Tokens tokens;
@@ -120,7 +119,7 @@ Tokens tokensOf(std::vector<tool::SortedIds::Id> ids)
     return tokens;
 }
 
-// Hands out the tokens of the ids, in their order, but those that are gone.
+// Calls use() with the tokens of the ids, in their order. Leaves out tokens that are gone.
 template <typename Use>
 void eachOf(tool::SortedIds& ids, const ListOptions& options, Use use)
 {
@@ -150,7 +149,7 @@ int list(const ListOptions& options)
         eachOf(ids, options, [&printer](Json::Value& jToken) { printer.measure(jToken); });
     }
     {
-        // On one terminal the two would get mixed.
+        // On one terminal, the bar and the tokens would get mixed.
         const bool blProgress = !tool::isTerminal(tool::resultStream());
         tool::Progress progress(
             "Listing", [nTokens] { return nTokens; }, blProgress, tool::MANY);

@@ -28,7 +28,7 @@ LogLines::~LogLines()
     fclose(m_pStream);
     const std::unique_ptr<char, decltype(&free)> pOwner(m_szLines, free);
     try {
-        std::istringstream lines(m_szLines ? m_szLines : ""); // none where memory ran out
+        std::istringstream lines(m_szLines ? m_szLines : ""); // null if memory ran out
         for (std::string strLine; std::getline(lines, strLine);) {
             if (m_blShown) {
                 fprintf(stderr, "%s\n", errorLine(strLine).c_str());
@@ -37,7 +37,7 @@ LogLines::~LogLines()
             }
         }
     } catch (const std::bad_alloc&) {
-        // what is to be told of that, the command does
+        // The command itself reports lack of memory.
     }
 }
 

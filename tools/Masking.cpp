@@ -4,20 +4,20 @@
 
 namespace {
 
-const size_t CHARACTER_MAX = 4; // bytes of one in UTF-8
+const size_t CHARACTER_MAX = 4; // bytes of a character in UTF-8
 
 bool isLikeId(const std::string& strText)
 {
     return strText.size() >= VEMO_ATOKEN_LENGTH_MIN;
 }
 
-// The text, unless it is as long as an id.
+// The text, shortened if it is as long as an id.
 std::string unlessId(const std::string& strText)
 {
     return isLikeId(strText) ? tool::shortened(strText) : strText;
 }
 
-// The path with what show() makes of each of its parts.
+// The path, with show() applied to each of its parts.
 template <typename Show>
 std::string withParts(const std::string& strPath, Show show)
 {
@@ -44,7 +44,7 @@ std::string masked(const std::string& strTid)
     for (const char c : strTid) {
         const bool blContinued = (static_cast<unsigned char>(c) & 0xc0) == 0x80; // UTF-8
         const bool blEnough = !blContinued && ++nCharacters > PREFIX_MIN;
-        if (blEnough || cbMasked == PREFIX_MIN * CHARACTER_MAX) { // bytes that continue nothing are none
+        if (blEnough || cbMasked == PREFIX_MIN * CHARACTER_MAX) { // stray UTF-8 bytes are not characters
             break;
         }
         ++cbMasked;
@@ -66,7 +66,7 @@ std::string quoted(const std::string& strText)
 std::string shownPath(const std::string& strPath)
 {
     const std::string strShown = withParts(strPath, unlessId);
-    // An id can hold slashes itself, as Base64 does.
+    // An id that contains slashes, as Base64 can, is split into parts too short to look like an id.
     return isLikeId(strShown) ? unlessId(withParts(strPath, shortened)) : strShown;
 }
 

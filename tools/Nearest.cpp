@@ -8,8 +8,8 @@ namespace tool {
 
 size_t distance(const std::string& strOne, const std::string& strOther)
 {
-    // Of the beginnings of the one that are two, one and no characters shorter than what is looked at, each
-    // to all beginnings of the other.
+    // line[j] is the distance from the first i characters of strOne to the first j of strOther. The lines
+    // above are those of i - 1 and i - 2.
     typedef std::vector<size_t> Line;
     std::array<Line, 3> lines;
     lines.fill(Line(strOther.size() + 1));
@@ -36,7 +36,7 @@ std::string didYouMean(const std::string& strWord, const std::vector<std::string
     for (const std::string& strName : strNames) {
         const size_t nLongest = std::max(strName.size(), strWord.size());
         if (nLongest - std::min(strName.size(), strWord.size()) > nLongest / 3) {
-            continue; // an argument in a wrong place can be very long
+            continue; // skips the work for a very long argument in the wrong place
         }
         const size_t nDistance = distance(strWord, strName);
         if (nDistance < nNearest && nDistance <= nLongest / 3) {

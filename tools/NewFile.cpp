@@ -19,7 +19,7 @@ namespace {
 
 const mode_t FILE_MODE = S_IRUSR | S_IWUSR;
 
-// What a signal removes: a name in a directory.
+// What a signal handler removes: this name in this directory.
 int g_nDirectory = -1;
 std::atomic<const char*> g_szUnfinished = nullptr;
 
@@ -31,7 +31,7 @@ void removeUnfinished()
     }
 }
 
-// Handles a signal once; its second coming does what it does by default.
+// Handles a signal. Its handler is reset when it comes, so raise() has the default effect.
 void removeAndEnd(int nSignal)
 {
     removeUnfinished();
@@ -47,8 +47,9 @@ tool::FilePlace placeOf(const std::string& strPath)
     }
 }
 
-// Locks an open file, as an export does while it writes one. Returns whether nobody else has it locked and a
-// name in a directory is still its own; errno tells why not: EEXIST when that is another's by now.
+// Locks an open file, as an export does while it writes the file. Returns whether nobody else has locked it
+// and it still has its name in the directory. On failure, errno is EWOULDBLOCK if another process has locked
+// it, and EEXIST if the name is now another file's.
 bool lockNamed(const tool::Descriptor& file, const tool::Descriptor& directory, const std::string& strName)
 {
     errno = EEXIST;
@@ -56,14 +57,14 @@ bool lockNamed(const tool::Descriptor& file, const tool::Descriptor& directory, 
            tool::isSame(tool::statusOf(file), tool::statusAt(directory, strName));
 }
 
-// Whether a path leads to a file.
+// Whether a path leads to the file of a status.
 bool isAt(const struct stat& status, const std::string& strPath)
 {
     struct stat other = {};
     return 0 == stat(strPath.c_str(), &other) && tool::isSame(status, other);
 }
 
-// Whether a name belongs to the database: it, its journals and the lock, whatever the way to them is called.
+// Whether a place is that of the database, one of its journals or the lock file, whatever path leads there.
 bool isOfDatabase(const tool::FilePlace& place, const struct stat& status)
 {
     const struct stat directory = tool::statusOf(place.directory);
@@ -110,11 +111,11 @@ NewFile::NewFile(const std::string& strPath)
     const UmaskOff umaskOff;
     Descriptor file(openat(m_place.directory.get(), ".", O_WRONLY | O_TMPFILE | O_CLOEXEC, FILE_MODE));
     if (!file.isOpen()) {
-        file = makeNamed(); // which fails, too, unless it is that the file system knows no such files
+        file = makeNamed(); // for file systems without O_TMPFILE; any other error comes again
     }
     m_pStream.reset(file.isOpen() ? fdopen(file.get(), "w") : nullptr);
     if (!m_pStream) {
-        removeUnfinished(); // no destructor runs
+        removeUnfinished(); // the destructor does not run
         fail();
     }
     file.release();
@@ -122,10 +123,10 @@ NewFile::NewFile(const std::string& strPath)
 
 NewFile::~NewFile()
 {
-    removeUnfinished(); // before others can take it for remains
+    removeUnfinished(); // while it is locked, so that no other export takes it for left behind
 }
 
-// Fails where no file may be put.
+// Fails if no file may be put there.
 void NewFile::requirePlace() const
 {
     const struct stat status = statusAt(m_place.directory, m_place.strName);
@@ -144,7 +145,8 @@ void NewFile::requirePlace() const
     }
 }
 
-// The lock on it tells that it is being written. Until it has that, another export can take it for remains.
+// Makes a file with the temporary name. Its lock tells other exports that it is being written. Just before it
+// is locked, another export can remove it as left behind; then this fails.
 Descriptor NewFile::makeNamed()
 {
     removeRemains(m_place.directory, m_strUnfinished);
@@ -177,7 +179,7 @@ void NewFile::complete()
     }
 }
 
-// A name that is taken already is replaced in one step, for which the file needs another one.
+// Gives the complete file its name. To replace another file in one step, it needs the temporary name first.
 bool NewFile::giveName()
 {
     const int nDirectory = m_place.directory.get();
@@ -186,9 +188,9 @@ bool NewFile::giveName()
         if (link(m_place.strName)) {
             return true;
         }
-        flock(fileno(m_pStream.get()), LOCK_EX); // it is no remains
+        flock(fileno(m_pStream.get()), LOCK_EX); // so that no other export takes it for left behind
         removeRemains(m_place.directory, m_strUnfinished);
-        if (!link(m_strUnfinished)) { // nor did the name above fail because it is taken
+        if (!link(m_strUnfinished)) { // fails too if the first link() failed although the name was free
             return false;
         }
         g_nDirectory = nDirectory;

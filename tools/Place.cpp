@@ -21,7 +21,7 @@ const mode_t PARENT_MODE = 0755;
     throw tool::Failure(tool::EXIT_STATUS_STORE, tool::shownPath(strPath) + ": " + strerror(errno), strHint);
 }
 
-// The way to the private directory, which must not lead through a symbolic link. Makes what is missing of it.
+// Walks to the private directory, and makes what is missing of the path. Fails at a symbolic link.
 tool::Walk walkMaking()
 {
     tool::Walk walk(tool::databaseDirectory());
@@ -34,16 +34,16 @@ tool::Walk walkMaking()
     return walk;
 }
 
-// The byte that SQLite locks while a transaction changes something: a part of its file format.
+// The byte that SQLite locks while a transaction writes; a part of SQLite's file format.
 const off_t RESERVED_BYTE = 0x40000001;
 
-// The database, or the journal with this suffix, if it is a regular file.
+// Opens the database, or the journal with this suffix, if it is a regular file.
 tool::Descriptor openBeside(const std::string& strSuffix)
 {
     return tool::openRegular(tool::openDirectory(), tool::databaseName() + strSuffix);
 }
 
-// Zeros where there are none.
+// Bytes that cannot be read are zeros.
 std::string bytesAt(const tool::Descriptor& file, off_t nOffset, size_t cbWanted)
 {
     std::string strBytes(cbWanted, '\0');

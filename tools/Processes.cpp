@@ -38,8 +38,7 @@ std::string processesText(const std::set<std::string>& strPids)
     return strText;
 }
 
-// A file as /proc/locks names it: the numbers of its device, and its own. No file has the numbers of one that
-// cannot be looked at.
+// A file's device and inode, as in /proc/locks. Those of a file that cannot be examined match no lock.
 std::string lockName(const std::string& strFile)
 {
     struct stat status = {};
@@ -55,8 +54,8 @@ bool isNumber(const std::string& strText)
     return strText.find_first_not_of("0123456789") == std::string::npos;
 }
 
-// The names in a directory; none where it cannot be read, because its process has ended, say. Throws Failure
-// where nothing can be read now.
+// The names in a directory; none if it cannot be read, for example because its process has ended. Throws
+// Failure if this process lacks memory or descriptors to read it.
 std::vector<std::string> namesIn(const std::string& strDirectory)
 {
     std::vector<std::string> strNames;
@@ -74,14 +73,14 @@ std::vector<std::string> namesIn(const std::string& strDirectory)
     return strNames;
 }
 
-// The name of the file that a symbolic link leads to; "" where it cannot be read.
+// The name of the file that a symbolic link leads to; "" if it cannot be read.
 std::string nameBehind(const std::string& strLink)
 {
     std::error_code error;
     return std::filesystem::read_symlink(strLink, error).filename();
 }
 
-// The database's own name: what stands in its place can be a link.
+// The name of the database file itself, because its path can be a symbolic link.
 std::string realName()
 {
     const tool::Descriptor database(open(VEMO_ATOKEN_DB_PATH, O_PATH | O_CLOEXEC));
@@ -120,7 +119,7 @@ std::vector<std::string> databaseDescriptors()
         if (!isNumber(strPid) || strPid == std::to_string(getpid())) {
             continue;
         }
-        // Each thread can have descriptors of its own, and the first one can have ended.
+        // Each thread can have descriptors of its own, and the first thread may have ended.
         const std::string strTasks = PROC + strPid + "/task/";
         for (const std::string& strTask : namesIn(strTasks)) {
             const std::string strDirectory = strTasks + strTask + "/fd/";
@@ -136,7 +135,7 @@ std::vector<std::string> databaseDescriptors()
 
 bool isOfDatabase(const std::string& strDescriptor)
 {
-    // By its name first: to look at what stands on a network can take for ever.
+    // Compares the name first: a status of a file on a network can take forever.
     static const std::string strName = realName();
     std::error_code error;
     return nameBehind(strDescriptor) == strName &&

@@ -28,10 +28,10 @@ Progress::Progress(const std::string& strTitle, const std::function<uint64_t()>&
         return;
     }
     draw();
-    const SignalPause pause; // which the thread inherits: signals are for those who clean up
+    const SignalPause pause; // the thread inherits it, so that signals go to the main thread, which cleans up
     try {
         m_thread = std::thread([this] { drawAgain(); });
-    } catch (const std::system_error&) { // then it is drawn again in the end only
+    } catch (const std::system_error&) { // then the bar is drawn again only at the end
     }
 }
 
@@ -58,10 +58,11 @@ void Progress::drawAgain()
 
 void Progress::draw() const
 {
-    const uint64_t nDone = std::min<uint64_t>(m_nDone, m_nTotal); // some can come meanwhile
+    const uint64_t nDone = std::min<uint64_t>(m_nDone, m_nTotal); // tokens can be added meanwhile
     const int nPercent = m_nTotal ? static_cast<int>(100 * nDone / m_nTotal) : 100;
     const std::string strPercent = std::to_string(nPercent);
-    // All on one line, or each time it is drawn it would begin another; so does what fills the last column.
+    // The bar must stay on one line, or each drawing would begin a new one. Text in the last column would
+    // also begin a new line.
     const size_t nWidth = terminalWidth(stderr) - 1;
     const size_t nTaken = m_strTitle.size() + strlen(" [] 100 %");
     const size_t nBar = std::min(BAR_WIDTH, nWidth - std::min(nWidth, nTaken));
@@ -77,7 +78,7 @@ void Progress::draw() const
         const std::string strSpeed =
             ", " + std::to_string(static_cast<uint64_t>(dRate)) + "/s, " + std::to_string(nLeft) + " s left";
         strLine += strLine.size() + strSpeed.size() <= nWidth ? strSpeed : "";
-        strLine += "\033[K"; // what stood there may be longer
+        strLine += "\033[K"; // clears the rest of a longer line
     }
     fprintf(stderr, "\r%s", strLine.c_str());
 }

@@ -1,4 +1,4 @@
-// revoke and purge: takes tokens back.
+// revoke and purge: delete tokens.
 
 #include <unistd.h>
 
@@ -17,7 +17,7 @@
 
 namespace {
 
-const size_t NAMES_MAX = 100000;     // which take less than 100 MB of memory
+const size_t NAMES_MAX = 100000;     // their ids take less than 100 MB of memory
 const size_t NAMES_OF_A_STEP = 1000; // one transaction
 
 struct RevokeOptions {
@@ -55,7 +55,8 @@ struct Named {
     uint64_t nUnknown = 0;
 };
 
-// The failure of a step, which tells what became of that, behind others.
+// The failure of a step, with the number of tokens that earlier steps removed. The message says already what
+// became of the step itself.
 tool::Failure ofStep(const tool::Failure& failure, uint64_t nRemoved)
 {
     return 0 == nRemoved ? failure
@@ -64,7 +65,7 @@ tool::Failure ofStep(const tool::Failure& failure, uint64_t nRemoved)
                                              " were gone before that; repeat the command for the rest");
 }
 
-// before: names of those are not unknown, though they are there no longer.
+// Looks up tokens by their names. Names of tokens in before, which are deleted, do not count as unknown.
 Named findNamed(tool::Store& store, const std::vector<std::string>& strNames, const Named& before)
 {
     Named named;
@@ -86,7 +87,7 @@ void add(Named& named, Named more)
     named.nUnknown += more.nUnknown;
 }
 
-// Calls use() with some names after the others, and lets other programs through.
+// Calls use() with groups of the names, and lets other programs work between two groups.
 template <typename Use>
 void eachStep(const std::vector<std::string>& strNames, Use use)
 {
@@ -113,7 +114,7 @@ Named lookUpNamed(const std::vector<std::string>& strNames)
 Named removeNamed(const std::vector<std::string>& strNames)
 {
     if (strNames.size() > NAMES_OF_A_STEP) {
-        lookUpNamed(strNames); // a name that stands for several fails before any is gone
+        lookUpNamed(strNames); // so a name that stands for several tokens fails before any is deleted
     }
     Named removed;
     eachStep(strNames, [&removed](const std::vector<std::string>& strSome) {
@@ -156,8 +157,7 @@ int revokeNamed(const RevokeOptions& options)
     return tool::EXIT_STATUS_DONE;
 }
 
-// Whether the administrator wants it. Tokens that come or go meanwhile do not matter: those that are
-// there in the end are revoked, and counted.
+// Asks the administrator. Tokens may come or go meanwhile: those that are there in the end are revoked.
 bool isWanted(const tool::Selection& selection)
 {
     if (!tool::isTerminal(stdin) || !tool::isTerminal(stderr)) {
@@ -167,8 +167,8 @@ bool isWanted(const tool::Selection& selection)
     return 0 == nTokens || tool::confirm("Revoke " + tool::countText(nTokens, "token") + "?");
 }
 
-// Hashes of the ids of tokens: a million ids themselves would take much memory. That a new token has the hash
-// of one of them has a chance of one in 10^13 then.
+// Hashes of ids, because a million ids would take much memory. The chance that a new token has the same hash
+// as one of a million revoked tokens is less than one in 10^13.
 typedef std::vector<size_t> Hashes;
 
 size_t hashOf(const std::string& strTid)
@@ -176,8 +176,8 @@ size_t hashOf(const std::string& strTid)
     return std::hash<std::string>()(strTid);
 }
 
-// Deletes those that fulfil a condition, in steps that let others through. Calls gone() for each, and returns
-// how many they were.
+// Deletes the tokens that a condition in SQL selects, in steps that let other programs work. Calls gone() for
+// each id. Returns how many were deleted.
 uint64_t removeInSteps(const std::string& strTitle, const std::string& strWhere,
                        const std::function<uint64_t()>& count,
                        const std::function<void(const std::string&)>& gone)
@@ -201,7 +201,7 @@ uint64_t removeInSteps(const std::string& strTitle, const std::string& strWhere,
     return nRemoved;
 }
 
-// In ascending order.
+// hashes must be sorted.
 bool isOneOf(const Hashes& hashes, const std::string& strTid)
 {
     return std::binary_search(hashes.begin(), hashes.end(), hashOf(strTid));
@@ -262,7 +262,7 @@ int revoke(const RevokeOptions& options)
         throw tool::Failure(tool::EXIT_STATUS_USAGE,
                             "say which tokens: by TID, by options that select, or --all");
     }
-    // A script's empty variable shall not revoke all that is bound to no session.
+    // An empty variable in a script must not revoke all tokens that are bound to no session.
     if (options.selection.strSid == "") {
         throw tool::Failure(tool::EXIT_STATUS_USAGE, "--bind-sid: must not be empty");
     }

@@ -1,4 +1,4 @@
-// rotate: gives a token a fresh id.
+// rotate: gives a token a new id.
 
 #include <algorithm>
 #include <ctime>
@@ -19,13 +19,13 @@ struct Options {
 };
 
 struct Rotation {
-    std::string strTid; // the fresh one
+    std::string strTid; // the new id
     Json::Value jBefore;
-    bool blKept = false;                    // the old token, which has a last grace
-    Json::Value jChange{Json::objectValue}; // of it
+    bool blKept = false;                    // whether the old token stays until its grace ends
+    Json::Value jChange{Json::objectValue}; // to the old token
 };
 
-// Makes the copy and brings the old token to its end, but for the end of the transaction.
+// Makes the copy, and deletes the old token or shortens its life, without committing yet.
 std::unique_ptr<tool::Store> prepare(const std::string& strName, const Options& options, Rotation& rotation)
 {
     auto pStore = std::make_unique<tool::Store>(tool::Store::Access::Write);
@@ -55,7 +55,8 @@ std::unique_ptr<tool::Store> prepare(const std::string& strName, const Options& 
     return pStore;
 }
 
-// Nobody knows the fresh id, so nothing has become of its token. What calls have made of the old one stays.
+// Undoes the rotation. Nobody knows the new id, so nobody has used its token. What calls have done to the old
+// token meanwhile stays.
 std::string undo(tool::Store& store, const Rotation& rotation)
 {
     if (!store.find(rotation.strTid)) {

@@ -4,7 +4,7 @@ namespace {
 
 const int ENDING_SIGNALS[] = {SIGHUP, SIGINT, SIGQUIT, SIGTERM, SIGXFSZ};
 
-volatile sig_atomic_t g_nWaiting = 0; // the signal that an EndingPause has held up
+volatile sig_atomic_t g_nWaiting = 0; // the last signal that an EndingPause has held up
 
 void keepWaiting(int nSignal)
 {
@@ -22,7 +22,7 @@ void handleEndingSignals(void (*handle)(int), void (*before)(int))
         sigaction(nSignal, nullptr, &action);
         if (before == action.sa_handler) {
             action.sa_handler = handle;
-            action.sa_flags = static_cast<int>(SA_RESETHAND); // and calls that wait are not begun anew
+            action.sa_flags = static_cast<int>(SA_RESETHAND); // it interrupts system calls that wait
             sigaction(nSignal, &action, nullptr);
         }
     }

@@ -13,10 +13,10 @@ namespace {
 
 const size_t GROUP_MAX = 4000;
 
-// Of 16 MB, not of 2: parts of this size are sorted in memory and merged, and a few of them at once.
+// 16 MB instead of 2: SQLite sorts parts of this size in memory, and merges them from the file.
 const char* const SORT_IN = "PRAGMA cache_size = -16000";
 
-// A database that ends with its connection. SQLite makes a file of it when it grows beyond some megabytes.
+// Opens a database that ends with its connection. Beyond some megabytes, SQLite puts it into a file.
 sqlite3* opened()
 {
     static const std::string strDirectory = tool::databaseDirectory();
@@ -75,7 +75,7 @@ void SortedIds::add(const Id& id, const std::string& strKey, bool blNumber)
 void SortedIds::each(uint64_t nLimit, const std::function<void(const std::vector<Id>& ids)>& use)
 {
     run([&] {
-        // Without a LIMIT: SQLite would put all into a tree instead of sorting them.
+        // Has no LIMIT: with one, SQLite would insert all rows into a tree instead of sorting them.
         grant::Statement sorted(m_pDb.get(), m_blDescending
                                                  ? "SELECT tid, place FROM ids ORDER BY key DESC, place"
                                                  : "SELECT tid, place FROM ids ORDER BY key, place");

@@ -16,7 +16,7 @@ namespace {
 const int64_t DAY = 86400; // seconds
 const int64_t YEAR = 365 * DAY;
 
-// Conditions in SQL.
+// These two return conditions in SQL.
 std::string expiringWithin(int64_t nSeconds)
 {
     tool::Selection expiring;
@@ -37,7 +37,7 @@ Json::Int64 numberOf(const std::optional<std::string>& strText)
     return strtoll(strText.value_or("").c_str(), nullptr, 10);
 }
 
-// Those of a name, with the most tokens first.
+// The groups, those with the most tokens first; equal ones by name or uid.
 template <typename Group, typename Name>
 std::vector<Group> groupsOf(const std::map<Name, uint64_t>& counts)
 {
@@ -96,7 +96,7 @@ uint64_t countWithoutOwner(const Statistics& statistics)
         try {
             nTokens += group.nUid && !findUserName(*group.nUid) ? group.nTokens : 0;
         } catch (const Failure&) {
-            // nobody knows
+            // Does not count, because nobody knows.
         }
     }
     return nTokens;

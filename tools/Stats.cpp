@@ -87,7 +87,7 @@ Json::Value jsonOf(const Statistics& statistics)
     return jStatistics;
 }
 
-// A label's value in the exposition format, which is UTF-8.
+// The value of a label in Prometheus' text format, which is UTF-8.
 std::string label(const std::string& strValue)
 {
     std::string strEscaped;
@@ -120,7 +120,8 @@ void printMetrics(const Statistics& statistics)
     printMetric(strPrefix + "database_page_bytes", "Size of a page of the database file.",
                 statistics.nPageBytes);
     printFamily(strPrefix + "function_tokens", "Tokens by the purpose they were made for.");
-    // Purposes that differ can read the same, and over a metric that is there twice the collector fails.
+    // Different purposes can have the same label, and the collector fails if a metric comes twice. So such
+    // purposes are added up.
     std::map<std::string, uint64_t> nTokensOf;
     for (const Group& group : statistics.functions) {
         nTokensOf[label(group.strName)] += group.nTokens;

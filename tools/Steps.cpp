@@ -7,7 +7,7 @@
 
 namespace {
 
-// How long a step is to take, and how many tokens it has at first.
+// The time that a step should take. The first step has TOKENS_FIRST tokens, and no step has fewer.
 const std::chrono::milliseconds STEP(100);
 const size_t TOKENS_FIRST = 250;
 
@@ -67,7 +67,7 @@ bool Steps::next(const Use& use)
                        " ORDER BY " + strKey + " LIMIT 1 OFFSET " + std::to_string(m_nTokens - 1));
         m_blEnd = strBound.empty();
         const std::string strUpTo = m_blEnd ? "true" : strKey + " <= " + strBound;
-        // All that have a NULL for an id, whose order tells nothing, come with the first.
+        // Tokens whose id is NULL have no place in the order; they come in the first step.
         use(store,
             "(" + (blIds && m_strLast.empty() ? "tid IS NULL OR " + strUpTo : strBehind + " AND " + strUpTo) +
                 ")");

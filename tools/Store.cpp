@@ -10,12 +10,12 @@
 
 namespace {
 
-// What sorts behind all texts that begin with a prefix, as SQL. Any bytes may follow that.
+// The first value, as SQL, that sorts after all texts that begin with a prefix of any bytes.
 std::string sqlBehind(std::string strPrefix)
 {
     strPrefix.resize(strPrefix.find_last_not_of('\xff') + 1);
     if (strPrefix.empty()) {
-        return "x''"; // a blob sorts behind all texts
+        return "x''"; // a blob sorts after all texts
     }
     ++strPrefix.back();
     return tool::sqlText("%Q", strPrefix.c_str());
@@ -51,7 +51,7 @@ void Store::eachToken(const std::string& strWhere, const std::string& strColumns
         Json::Value jToken;
         for (size_t i = 0; i < strNames.size(); ++i) {
             if (!row[i]) {
-                fail("query aborted"); // as the library, which cannot read such a token
+                fail("query aborted"); // the library fails in the same way
             }
             Json::Value& jValue = jToken[strNames[i]];
             switch (types[i]) {
@@ -157,7 +157,7 @@ void Store::update(const std::string& strTid, const Json::Value& jChange)
     audit::note("updated", strTid);
 }
 
-// "name='value'", with the value written and quoted as the library does.
+// Such as "name='value'", with the value written and quoted as the library does.
 std::string Store::equation(std::string strName, Json::Value jValue)
 {
     std::string strEquation;

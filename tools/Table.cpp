@@ -13,24 +13,24 @@
 namespace {
 
 const char* const SEPARATOR = "  ";
-const size_t LEFT_OUT = SIZE_MAX; // the width of a column that is not shown
+const size_t LEFT_OUT = SIZE_MAX; // the "width" of a column that is not shown
 const size_t WORD_MAX = 40;       // columns; longer words are broken
 const char* const RED = "\033[31m";
 const char* const NO_COLOUR = "\033[0m";
 
 size_t columnsOf(wchar_t cWide)
 {
-    return static_cast<size_t>(std::max(wcwidth(cWide), 0)); // none for a mark on another
+    return static_cast<size_t>(std::max(wcwidth(cWide), 0)); // 0 for a combining mark
 }
 
-// Calls use(character, its bytes) for each of a printable text, until that returns false.
+// Calls use(character, size in bytes) for each character of a printable text, until use() returns false.
 template <typename Use>
 void eachOf(std::string_view strText, Use use)
 {
     while (!strText.empty()) {
         wchar_t cWide = L'\0';
         mbstate_t state = {};
-        // An error is a large number, but printable texts have none.
+        // mbrtowc() returns large numbers for errors, but printable texts have none.
         const size_t cb = std::min(mbrtowc(&cWide, strText.data(), strText.size(), &state), strText.size());
         if (!use(cWide, cb)) {
             return;
@@ -39,14 +39,14 @@ void eachOf(std::string_view strText, Use use)
     }
 }
 
-// What of a text stands on one line.
+// The part of a text that is on one line.
 struct Piece {
     size_t cbShown;
     size_t nWidth;  // the columns that it takes
-    size_t cbTaken; // with the blank that it breaks at
+    size_t cbTaken; // cbShown, with the blank at which the line breaks
 };
 
-// The words of what fits into so many columns; of a longer word, a part.
+// The words that fit into nColumns; if not even the first word fits, a part of it.
 Piece firstOf(std::string_view strText, size_t nColumns)
 {
     Piece fitting = {};
@@ -76,7 +76,7 @@ size_t widthOf(std::string_view strText)
     return firstOf(strText, SIZE_MAX).nWidth;
 }
 
-// How wide the longest word is that a line does not break in.
+// The width of the longest word, in which a line does not break; WORD_MAX at most.
 size_t longestWord(std::string_view strText)
 {
     size_t nLongest = 0;
@@ -127,13 +127,13 @@ void Table::add(const std::vector<std::string>& strCells, bool blRed)
     m_lines.push_back({printableCells(strCells), blRed});
 }
 
-// How wide each column is, so that a line fits. What cannot be broken is as wide as it has to be. The others
-// have equal shares of the rest, but no less than their titles and words need; what one does not need is for
-// those that need more.
+// The width of each column, so that a line fits into the terminal. Spare columns are left out if there is no
+// room. Others that are not Long keep their width. Long columns get equal shares of the rest, but at least
+// what their titles and words need. What one column does not need is shared by the others.
 std::vector<size_t> Table::widthsWithin(size_t nTerminal) const
 {
     std::vector<size_t> nWidths = m_nWidths;
-    std::vector<size_t> nLong; // numbers of columns
+    std::vector<size_t> nLong; // indexes of the Long columns
     size_t nTaken = 0;
     size_t nNeeded = 0;
     const auto least = [&](size_t i) {
@@ -190,7 +190,7 @@ std::string Table::lineText(const Line& line, const std::vector<size_t>& nWidths
             if (LEFT_OUT == nWidths[i]) {
                 continue;
             }
-            // Any character fits into as much as the title needs.
+            // The title's width is the least, because any character fits into it.
             const Piece piece = firstOf(strRests[i], std::max(nWidths[i], strlen(m_columns[i].szTitle)));
             const std::string strBlanks(nWidths[i] - std::min(nWidths[i], piece.nWidth), ' ');
             strText += Kind::Right == m_columns[i].kind ? strBlanks : "";

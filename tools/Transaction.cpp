@@ -24,7 +24,7 @@
 
 namespace {
 
-// Who takes a query's rows, and what stopped that.
+// Takes the rows of a query, and keeps the exception that stopped that.
 struct Taker {
     const std::function<void(tool::Row)>& take;
     std::exception_ptr pStopped;
@@ -41,7 +41,7 @@ int giveRow(void* pTaker, int nColumns, char** rgValue, char**)
         taker.take(std::move(row));
         return 0;
     } catch (...) {
-        taker.pStopped = std::current_exception(); // the caller is a C function
+        taker.pStopped = std::current_exception(); // must not leave through SQLite, which is C
         return -1;
     }
 }
@@ -51,7 +51,7 @@ bool contains(const std::string& strErr, const char* szText)
     return std::string::npos != strErr.find(szText);
 }
 
-// What SQLite says, as a fact about the database and a hint at what helps.
+// An error of SQLite, as a fact about the database and a hint at what helps.
 std::pair<std::string, std::string> explained(const std::string& strErr)
 {
     if (contains(strErr, "no such table: token")) {
@@ -60,7 +60,7 @@ std::pair<std::string, std::string> explained(const std::string& strErr)
     if (contains(strErr, "file is not a database")) {
         return {"is not a token database, or is damaged (" + strErr + ")", ""};
     }
-    // With a write-ahead journal it cannot even be read where no file can be made beside it.
+    // With a write-ahead journal, the database cannot even be read if no file can be made beside it.
     const bool blReadOnly = contains(strErr, "readonly database");
     if ((blReadOnly || contains(strErr, "unable to open database file")) &&
         0 != access(tool::databaseDirectory().c_str(), W_OK) && EROFS == errno) {
@@ -78,7 +78,7 @@ std::pair<std::string, std::string> explained(const std::string& strErr)
     return {"failed: " + strErr, ""};
 }
 
-// In SQL, opens(webapi_allow, API, METHOD): whether a token opens a call; of a method "", of the API alone.
+// In SQL, opens(webapi_allow, API, METHOD): whether a token opens a call; METHOD "" asks for the API alone.
 void opens(sqlite3_context* pContext, int, sqlite3_value** rgValue)
 {
     try {
@@ -93,7 +93,7 @@ void opens(sqlite3_context* pContext, int, sqlite3_value** rgValue)
             VEMO_ACCESS_TOKEN::checkPermission(jToken, strTexts[1].c_str(), strTexts[2].c_str());
         sqlite3_result_int(pContext, 0 < nOpens);
     } catch (const Json::LogicError&) {
-        sqlite3_result_int(pContext, 0); // what stands among the methods cannot be read as one
+        sqlite3_result_int(pContext, 0); // the list of methods holds something that is not a text
     } catch (const std::bad_alloc&) {
         sqlite3_result_error_nomem(pContext);
     }
@@ -102,7 +102,7 @@ void opens(sqlite3_context* pContext, int, sqlite3_value** rgValue)
 // As long as the library waits for the database.
 const std::chrono::seconds LOCK_WAIT(5);
 
-// What it means that a command which changes something did not get a lock.
+// The hint if a command that changes tokens did not get a lock.
 const char* meaningOfLocked()
 {
     return tool::hasChanged() ? "" : "nothing was changed";
@@ -148,12 +148,12 @@ Transaction::Transaction(Access access, Missing missing) : m_access(access)
         sqlite3_create_function(m_db.m_pDb, "opens", 3, SQLITE_UTF8, nullptr, opens, nullptr, nullptr)) {
         throw std::bad_alloc();
     }
-    query("PRAGMA temp_store = MEMORY"); // what is sorted holds purposes and sessions, and stays private
+    query("PRAGMA temp_store = MEMORY"); // temporary files would hold purposes and sessions
     if (Access::Write == access) {
         beginWriting(missing);
     } else if (Access::Locked != access) {
         query("BEGIN");
-        query("SELECT count(*) FROM sqlite_schema"); // takes the lock
+        query("SELECT count(*) FROM sqlite_schema"); // SQLite takes its lock at the first read
     }
     if (Access::Read == access) {
         syncDirectory("a power cut can undo what others changed last");
@@ -162,13 +162,13 @@ Transaction::Transaction(Access access, Missing missing) : m_access(access)
 
 void Transaction::beginWriting(Missing missing)
 {
-    // A database without anything is one that another program is just making, or was kept from making:
-    // the table comes after the file. Whoever is first makes it.
+    // An empty database is one that another program is making, or failed to make: the file comes before the
+    // table. Whoever comes first makes the table.
     if (Missing::Make == missing && 0 == number("SELECT count(*) FROM sqlite_schema")) {
         makeTable();
     }
     if (!hasTable()) {
-        fail("no such table: token"); // before an empty file becomes a database without one
+        fail("no such table: token"); // before BEGIN makes an empty file a database without a table
     }
     query("BEGIN IMMEDIATE");
 }
@@ -195,7 +195,7 @@ void Transaction::commit()
         settleChange();
     } else {
         if (audit::hasNotes()) {
-            audit::made(); // the use of an unlimited token, which changes nothing
+            audit::made(); // a grant of an unlimited token, which changes nothing
         }
         syncDirectory("a power cut can undo what others changed last");
     }
@@ -208,11 +208,12 @@ void Transaction::fail(const std::string& strErr)
         throw LockedFailure(EXIT_STATUS_STORE, strPath + "stayed locked by another process for 5 seconds",
                             Access::Read == m_access || Access::Glance == m_access ? "" : meaningOfLocked());
     }
-    // No statement failed but there was no memory for its text, or for a row.
+    // These mean that memory ran out: an error without a text, and "query aborted" when no token has a NULL,
+    // which would also cause it.
     if (strErr.empty() || (contains(strErr, "query aborted") && !holdsNull())) {
         throw std::bad_alloc();
     }
-    // SQLite shortens the file when the change is made already, and can fail of that.
+    // After a change is committed, SQLite shortens the file, and reports an error if that fails.
     const bool blPerhaps = m_blCommitting && contains(strErr, "disk I/O error");
     if (blPerhaps) {
         audit::made(audit::Certainty::Perhaps);
@@ -222,7 +223,7 @@ void Transaction::fail(const std::string& strErr)
                   blPerhaps ? "the change may have been made" : strHint);
 }
 
-// Whether there is a token that cannot be read.
+// Whether a token has a NULL, so that it cannot be read.
 bool Transaction::holdsNull()
 {
     std::string strAny = "0";
@@ -261,7 +262,7 @@ bool Transaction::makeTable()
     if (hasTable()) {
         return false;
     }
-    // What the link leads to may be another's.
+    // The file that the link leads to may belong to another program.
     const auto status = statusOf(VEMO_ATOKEN_DB_PATH);
     if (status && S_ISLNK(status->st_mode)) {
         throw Failure(EXIT_STATUS_STORE,
@@ -269,9 +270,9 @@ bool Transaction::makeTable()
                                           "table of tokens",
                       "find out who made it");
     }
-    query("PRAGMA auto_vacuum = FULL"); // as the library has it; within a transaction it does nothing
+    query("PRAGMA auto_vacuum = FULL"); // as in the library; has no effect within a transaction
     query("BEGIN IMMEDIATE");
-    require(m_db.createTable()); // unless another program just has
+    require(m_db.createTable()); // does nothing if another program has just made it
     query("COMMIT");
     settleChange();
     return true;
@@ -304,7 +305,7 @@ std::optional<std::string> Transaction::queryWithin(std::chrono::milliseconds lo
     std::condition_variable ended;
     bool blEnded = false;
     bool blInterrupted = false;
-    const SignalPause pause; // which the thread inherits: signals are for those who clean up
+    const SignalPause pause; // the thread inherits it, so that signals go to the main thread, which cleans up
     std::thread watch([&] {
         std::unique_lock guard(mutex);
         blInterrupted = !ended.wait_for(guard, longest, [&blEnded] { return blEnded; });
@@ -322,7 +323,7 @@ std::optional<std::string> Transaction::queryWithin(std::chrono::milliseconds lo
     return blInterrupted && !strErr.empty() ? std::nullopt : std::optional(strErr);
 }
 
-// Returns why the statement failed, or "".
+// Runs a statement. Returns why it failed, or "".
 std::string Transaction::run(const std::string& strSql, const std::function<void(Row)>& take)
 {
     Taker taker = {take, nullptr};

@@ -29,7 +29,7 @@ struct Options {
     bool blNoHeader = false;
 };
 
-// The time of a statement, in milliseconds, as text: the shortest of several, which other programs prolong.
+// The milliseconds of a statement, as text: the shortest of several times, since others can only prolong it.
 std::string timeOf(Store& store, const std::string& strSql)
 {
     typedef std::chrono::duration<double, std::milli> Milliseconds;
@@ -52,7 +52,7 @@ bool hasIndex(Store& store, const std::string& strField)
 
 typedef std::vector<std::pair<std::string, std::string>> Figures;
 
-// What a store does, and how fast; with the same words before and after.
+// What the store has, and how fast it is, in the same words before and after.
 Figures measured(Store& store, bool blWrite)
 {
     Figures lines = {
@@ -65,7 +65,7 @@ Figures measured(Store& store, bool blWrite)
         lines.emplace_back("index token_" + strField, hasIndex(store, strField) ? "yes" : "no");
     }
     if (blWrite) {
-        // It changes nothing, and costs what any small change does.
+        // This changes nothing, but costs as much as any small change.
         const std::string strVersion = store.text("PRAGMA user_version");
         lines.emplace_back("write a small change", timeOf(store, "PRAGMA user_version = " + strVersion));
     }
@@ -80,7 +80,7 @@ std::string indexStatement(const std::string& strField, const Options& options)
                     : "DROP INDEX IF EXISTS " + strName;
 }
 
-// The journal first: other programs' connections can stand in its way, and then nothing has changed.
+// The journal comes first: connections of others can prevent its change, and then nothing has changed.
 std::vector<std::string> statements(const Options& options)
 {
     std::vector<std::string> strStatements;
@@ -101,7 +101,7 @@ void execute(Store& store, const Options& options, tool::Progress& progress)
     const std::vector<std::string> strStatements = statements(options);
     for (const std::string& strStatement : strStatements) {
         const std::string strResult = store.text(strStatement);
-        // Of all statements only that of the journal gives a row. It can do nothing without an error.
+        // Only the statement for the journal returns a row. It can have no effect without reporting an error.
         if (!strResult.empty() && strResult != strJournal) {
             throw tool::Failure(tool::EXIT_STATUS_STORE,
                                 "the journal cannot be made \"" + strJournal + "\" here");
@@ -119,7 +119,7 @@ Figures look()
     return measured(store, false);
 }
 
-// What is, and what would be done.
+// Prints the state of the store, and the statements that would be run.
 int tell(const Options& options)
 {
     tool::Table table({{"WHAT", Kind::Short}, {"NOW", Kind::Short}}, !options.blNoHeader);
@@ -133,7 +133,7 @@ int tell(const Options& options)
     return tool::EXIT_STATUS_DONE;
 }
 
-// Returns what was before and what is after.
+// Tunes the store. Returns the figures before and after.
 std::pair<Figures, Figures> change(const Options& options)
 {
     tool::Progress progress("Tuning", [&options] { return statements(options).size(); });

@@ -122,7 +122,8 @@ Json::Value changedAllow(const Json::Value& jToken, const Options& options)
     return jAllow;
 }
 
-// The token's data after the change. Of a text that cannot be read as a whole, a part would be lost.
+// The field "extra" after the change. A note cannot be added to a text that the library cannot read
+// completely: the rest would be lost.
 Json::Value changedExtra(tool::Store& store, const Json::Value& jToken, const Options& options)
 {
     Json::Value jExtra = options.jExtra.value_or(jToken["extra"]);
@@ -140,7 +141,7 @@ Json::Value changedExtra(tool::Store& store, const Json::Value& jToken, const Op
     return jExtra;
 }
 
-// The fields that change.
+// The new values of the fields that change.
 Json::Value changeOf(tool::Store& store, const Json::Value& jToken, const Options& options)
 {
     Json::Value jChange(Json::objectValue);
@@ -165,7 +166,7 @@ Json::Value changeOf(tool::Store& store, const Json::Value& jToken, const Option
     return jChange;
 }
 
-// Makes the change of a token again, for as long as calls can write it back as it was.
+// Makes the change again for as long as calls can write the token back as it was.
 void updateAgain(const Json::Value& jBefore, const Json::Value& jChange)
 {
     const std::optional<Json::Value> jNow = tool::outlastUpdated(jBefore, jChange);
@@ -180,7 +181,7 @@ void updateAgain(const Json::Value& jBefore, const Json::Value& jChange)
     }
 }
 
-// Returns the token as it was.
+// Changes the token. Returns it as it was before.
 Json::Value updateToken(const std::string& strTid, const Options& options, Json::Value& jChange)
 {
     tool::Store store(tool::Store::Access::Write);

@@ -51,8 +51,9 @@ std::string count(int64_t nSeconds)
     return std::to_string(nSeconds / DAY) + " d";
 }
 
-// Some user databases answer so for "no such user", instead of success without an entry. The other answers
-// that the manual allows for it (EBADF, EPERM) are more often real failures.
+// Whether a result of getpwnam_r() means that there is no such user. Some user databases return ENOENT or
+// ESRCH for that, not success without an entry. The other errors that the manual allows for it (EBADF, EPERM)
+// are more often real failures.
 bool isNotFound(int nError)
 {
     return 0 == nError || ENOENT == nError || ESRCH == nError;
@@ -63,7 +64,7 @@ struct User {
     uid_t uid;
 };
 
-// The user whom a look-up with a buffer finds. Throws Failure when the user database fails.
+// Looks up a user, with a buffer that is as large as needed. Throws Failure if the user database fails.
 template <typename Lookup>
 std::optional<User> lookUp(const std::string& strWho, Lookup lookup)
 {
@@ -91,7 +92,7 @@ std::string userOfNumber(Json::Int64 nUid)
     return "user of the number " + std::to_string(nUid);
 }
 
-// The number in decimal that a text begins with, if it does; szText is then behind it.
+// Reads the decimal number at the beginning of a text, and moves szText past it. Nothing if there is none.
 std::optional<int64_t> readNumber(const char*& szText, const char* szEnd)
 {
     int64_t nNumber = 0;
@@ -140,7 +141,7 @@ unsigned int parseUser(const std::string& strName)
 std::optional<std::string> findUserName(Json::Int64 nUid)
 {
     const uid_t uid = static_cast<uid_t>(nUid);
-    if (uid != nUid) { // it would be narrowed to another's number
+    if (uid != nUid) { // it would become the number of another user
         return std::nullopt;
     }
     const auto found =
@@ -159,7 +160,7 @@ std::string userName(Json::Int64 nUid)
 
 std::optional<std::string> userNameIfKnown(Json::Int64 nUid)
 {
-    static std::map<Json::Int64, std::optional<std::string>> known; // a look-up can go over the network
+    static std::map<Json::Int64, std::optional<std::string>> known; // a look-up can use the network
     if (known.size() == KNOWN_MAX) {
         known.clear();
     }
@@ -168,7 +169,7 @@ std::optional<std::string> userNameIfKnown(Json::Int64 nUid)
         try {
             pKnown->second = findUserName(nUid);
         } catch (const Failure&) {
-            // it has a number
+            // The caller shows the number instead.
         }
     }
     return pKnown->second;
@@ -176,7 +177,7 @@ std::optional<std::string> userNameIfKnown(Json::Int64 nUid)
 
 int64_t parseDuration(const std::string& strText)
 {
-    // A number alone is in seconds.
+    // A number without a unit is in seconds.
     const bool blBare = strText.find_first_not_of("0123456789") == std::string::npos;
     const std::string strParts = blBare ? strText + "s" : strText;
     const char* szRest = strParts.data();
@@ -184,7 +185,7 @@ int64_t parseDuration(const std::string& strText)
     int64_t nTotal = 0;
     while (szRest != szEnd) {
         const auto nNumber = readNumber(szRest, szEnd);
-        const int64_t nUnit = secondsOf(*szRest); // at the end stands a NUL
+        const int64_t nUnit = secondsOf(*szRest); // a NUL at the end
         if (!nNumber || *nNumber < 0 || 0 == nUnit || *nNumber > (DURATION_MAX - nTotal) / nUnit) {
             failOnDuration(strText);
         }
@@ -204,7 +205,8 @@ int64_t parseTime(const std::string& strText)
     }
     const bool blUtc = !strText.empty() && 'Z' == strText.back();
     const std::string strTime = strText.substr(0, strText.size() - (blUtc ? 1 : 0));
-    // strptime() also takes fewer digits, so that 26-12-31 would be in the year 26, and blanks anywhere.
+    // strptime() also takes fewer digits, so that 26-12-31 would be in the year 26, and blanks anywhere. So
+    // the shape is checked first.
     std::string strShape = strTime;
     std::replace_if(
         strShape.begin(), strShape.end(), [](char c) { return '0' <= c && c <= '9'; }, '0');
@@ -221,8 +223,8 @@ int64_t parseTime(const std::string& strText)
         const struct tm tmAsked = tmTime;
         tmTime.tm_isdst = -1;
         const time_t nTime = blUtc ? timegm(&tmTime) : mktime(&tmTime);
-        // 31 June, and the hour that a clock leaps over, come back as another time. A day that lacks its
-        // midnight has another beginning.
+        // mktime() turns 31 June, and an hour that a change of clocks skips, into another time: these are
+        // refused. But a day without midnight may begin later.
         const bool blDay = 0 == strcmp(szFormat, "%Y-%m-%d");
         if (tmTime.tm_mday == tmAsked.tm_mday &&
             (blDay || (tmTime.tm_hour == tmAsked.tm_hour && tmTime.tm_min == tmAsked.tm_min))) {

@@ -14,15 +14,15 @@
 
 namespace {
 
-const wchar_t INVALID = -1; // a byte that is no UTF-8
+const wchar_t INVALID = -1; // stands for a byte that is not valid UTF-8
 
 struct Range {
     wchar_t cFirst;
     wchar_t cLast;
 };
 
-// What the C library takes for printable and cannot be seen. By Unicode: the categories Cf (format), Zs
-// (blanks) and Co (private use, which looks like anything), and what is ignored by default.
+// Characters that the C library calls printable, but that cannot be seen. By Unicode: the categories Cf
+// (format), Zs (blanks) and Co (private use, which can look like anything), and those ignored by default.
 const Range INVISIBLE[] = {
     {0x00a0, 0x00a0},    // no-break space
     {0x00ad, 0x00ad},    // soft hyphen
@@ -68,11 +68,11 @@ bool isAscii(wchar_t cWide)
     return static_cast<unsigned int>(cWide) < 0x80;
 }
 
-// In the locale that rewritten() sets.
+// Needs the locale that rewritten() sets.
 bool isVisible(wchar_t cWide)
 {
     const auto holds = [cWide](const Range& range) { return range.cFirst <= cWide && cWide <= range.cLast; };
-    return iswprint(static_cast<wint_t>(cWide)) && // which INVALID is not
+    return iswprint(static_cast<wint_t>(cWide)) && // false for INVALID
            std::none_of(std::begin(INVISIBLE), std::end(INVISIBLE), holds);
 }
 
@@ -81,14 +81,14 @@ bool isShown(wchar_t cWide, tool::Charset charset)
     return isAscii(cWide) || tool::Charset::Utf8 == charset;
 }
 
-// What stands for itself in any case. A backslash can begin an escape.
+// Whether a character is always written as it is. A backslash is not, because it can begin an escape.
 bool isPlain(char c)
 {
     return ' ' <= c && c <= '~' && c != '\\';
 }
 
-// The text with what write() makes of each character, which is handed over with its bytes. Where the machine
-// has no locale for UTF-8, or no memory for it, only ASCII is valid.
+// Replaces each character of a text by what write() makes of it; write() gets the character and its bytes. If
+// the machine has no UTF-8 locale, or no memory for it, only ASCII is valid.
 template <typename Write>
 std::string rewritten(const std::string& strText, Write write)
 {
@@ -97,7 +97,7 @@ std::string rewritten(const std::string& strText, Write write)
     const char* szRest = strText.data();
     const char* const szEnd = szRest + strText.size();
     for (;;) {
-        // At once, most of it goes several times as fast.
+        // Copying plain text in one go is several times as fast.
         const char* const szOdd = std::find_if_not(szRest, szEnd, isPlain);
         strOut.append(szRest, szOdd);
         if (szOdd == szEnd) {
@@ -107,7 +107,7 @@ std::string rewritten(const std::string& strText, Write write)
         wchar_t cWide = L'\0';
         mbstate_t state = {};
         const size_t cbRead = mbrtowc(&cWide, szOdd, cbOdd, &state); // 0 for a NUL
-        // The numbers of errors exceed any valid length. UTF-8 ends at 0x10ffff.
+        // mbrtowc() returns numbers above any valid length for errors. UTF-8 ends at 0x10ffff.
         const bool blValid = cbRead <= cbOdd && (isAscii(cWide) || (utf8() && cWide <= 0x10ffff));
         const size_t cbCharacter = blValid && cbRead ? cbRead : 1;
         write(strOut, std::string_view(szOdd, cbCharacter), blValid ? cWide : INVALID);
@@ -133,7 +133,7 @@ void appendUnit(std::string& strOut, unsigned int nUnit)
     strOut += szEscape;
 }
 
-// A character as JSON escapes it: in UTF-16.
+// Appends a character as JSON escapes it, in UTF-16.
 void appendUnits(std::string& strOut, wchar_t cWide)
 {
     const unsigned int nCharacter = static_cast<unsigned int>(cWide);
@@ -157,7 +157,7 @@ Charset localeCharset()
 std::string printable(const std::string& strText, Charset charset)
 {
     return rewritten(strText, [charset](std::string& strOut, std::string_view strBytes, wchar_t cWide) {
-        const bool blLikeEscape = '\\' == cWide && 'x' == strBytes.data()[1]; // at the end stands a NUL
+        const bool blLikeEscape = '\\' == cWide && 'x' == strBytes.data()[1]; // a NUL at the end
         if (isVisible(cWide) && isShown(cWide, charset) && !blLikeEscape) {
             strOut += strBytes;
         } else {
@@ -180,7 +180,7 @@ std::string validUtf8(const std::string& strText)
 std::string visibleJson(const std::string& strJson)
 {
     return rewritten(strJson, [](std::string& strOut, std::string_view strBytes, wchar_t cWide) {
-        if (isVisible(cWide) || INVALID == cWide || '\n' == cWide) { // JSON's own lines
+        if (isVisible(cWide) || INVALID == cWide || '\n' == cWide) { // the line breaks of styled JSON
             strOut += strBytes;
         } else {
             appendUnits(strOut, cWide);

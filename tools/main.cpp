@@ -14,7 +14,7 @@
 
 namespace {
 
-// What no handler catches: there was no memory for the handler, or for the exception itself.
+// For exceptions that no handler catches: there was no memory for the handler, or for the exception.
 void endWithoutMemory()
 {
     try {
@@ -22,7 +22,7 @@ void endWithoutMemory()
             throw;
         }
     } catch (const std::bad_alloc&) {
-        // the same
+        // Memory ran out as well.
     } catch (...) {
         abort();
     }
@@ -37,7 +37,7 @@ int main(int nArguments, char** rgArguments)
     std::set_terminate(endWithoutMemory);
     try {
         tool::completeStreams();
-        setlocale(LC_CTYPE, ""); // how wide characters are
+        setlocale(LC_CTYPE, ""); // for the character set and the widths of characters
         tool::Commands commands;
         for (const tool::CommandEntry& entry : tool::COMMANDS) {
             entry.add(commands);
@@ -48,7 +48,7 @@ int main(int nArguments, char** rgArguments)
         return failure.status();
     } catch (const std::bad_alloc&) {
         tool::complainOfMemory();
-    } catch (const Json::RuntimeError&) { // how jsoncpp tells the same
+    } catch (const Json::RuntimeError&) { // how jsoncpp reports lack of memory
         tool::complainOfMemory();
     } catch (const std::exception& exception) {
         tool::complain(exception.what());
