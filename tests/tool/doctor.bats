@@ -7,55 +7,92 @@ REPLACE='stop the programs, move the directory away, run "vemo-access-token init
 SAVE_AND_REPLACE='stop the programs, save the tokens with "vemo-access-token export", move the directory away, run "vemo-access-token init" and import them'
 NOT_PRIVATE="others than root can use it, and ids are credentials"
 NO_CHANGE="no token can be created, changed or granted"
+ELSEWHERE="the tokens stand elsewhere, or nowhere|find out who made it; move the database to a directory of that name"
+NO_TOKENS="there are no tokens; the first call that needs it makes it"
+ALL_RIGHT="no findings"
 
-# expect_finding SEVERITY WHAT MEANING REMEDY: doctor finds that, and nothing else
-expect_finding()
+# finds STATUS FINDINGS [ARGUMENTS...]: doctor ends with that and tells these findings, each of them here on one line
+# "SEVERITY: WHAT|MEANING|REMEDY". On standard error it says $SENTENCE, if that is set.
+finds()
 {
-    run_tool doctor
-    expect 5 "$1: $2
-    meaning: $3
-    remedy: $4"
+    run_tool doctor "${@:3}"
+    output=${output//$'\n    meaning: '/|}
+    output=${output//$'\n    remedy: '/|}
+    expect "$1" "$2" "${SENTENCE:+vemo-access-token: $SENTENCE}"
 }
 
-# expect_note WHAT MEANING REMEDY: doctor tells that, and finds nothing
-expect_note()
-{
-    run_tool doctor
-    expect 0 "note: $1
-    meaning: $2
-    remedy: $3
-no findings"
-}
-
-# expect_repair WHAT MEANING: doctor repairs that, and then there is nothing left
-expect_repair()
-{
-    run_tool doctor --repair
-    expect 0 "repaired: $1
-    meaning: $2
-no findings"
-    expect_sound
-}
-
-# expect_no_repair SEVERITY WHAT MEANING REMEDY: doctor finds that, and leaves it to the administrator
-expect_no_repair()
-{
-    expect_finding "$@"
-    local found=$output
-    ends 5 "$found" doctor --repair
-}
-
-# expect_sound: doctor finds nothing
 expect_sound()
 {
-    gives "no findings" doctor
+    gives "$ALL_RIGHT" doctor
 }
 
-# expect_first SEVERITY WHAT: doctor's first finding
+# expect_first FINDING: doctor's first line
 expect_first()
 {
     run_tool doctor
-    [ "$status $stderr${lines[0]}" = "5 $1: $2" ]
+    [ "$status $stderr${lines[0]}" = "5 $1" ]
+}
+
+# fresh: a store of two tokens and a backup of them, and nothing else in $DIR
+fresh()
+{
+    cd "$DIR"
+    rm -rf ./*
+    if [ ! -e "$DIR.fresh" ]; then
+        rows <<<$'aaaaaaaa\nbbbbbbbb'
+        tool export backup 2>/dev/null
+        cp -rp . "$DIR.fresh"
+    fi
+    cp -rp "$DIR.fresh/." .
+}
+
+# leaves: each line of standard input is "CHANGE|SEVERITY: WHAT|MEANING|REMEDY". After the change of a fresh store,
+# doctor finds that and no more, and leaves all as it is, with --repair too. Where the remedy is commands, they help.
+leaves()
+{
+    local change finding remedy before
+    while IFS='|' read -r change finding; do
+        echo "$change"
+        fresh
+        eval "$change"
+        before=$(find "$DIR" -printf '%P %i %m %T@ %l\n')
+        finds 5 "$finding"
+        finds 5 "$finding" --repair
+        [ "$(find "$DIR" -printf '%P %i %m %T@ %l\n')" = "$before" ]
+        remedy=${finding##*|}
+        case $remedy in
+            "$SAVE_AND_REPLACE") replace_database saved ;;
+            "$REPLACE") replace_database backup ;;
+            *"sqlite3 $REAL_DB"*) eval "sqlite3 $DB${remedy##*"sqlite3 $REAL_DB"}" ;;
+            *) continue ;;
+        esac
+        expect_sound
+    done
+}
+
+# mends: the same, but with --repair all becomes right
+mends()
+{
+    local change finding
+    while IFS='|' read -r change finding; do
+        echo "$change"
+        fresh
+        eval "$change"
+        finds 5 "$finding"
+        finding=${finding#*: }
+        finds 0 "repaired: ${finding%|*}
+$ALL_RIGHT" --repair
+        expect_sound
+    done
+}
+
+# replace_database BACKUP: as the remedies say; without a backup of that name, one is made now
+replace_database()
+{
+    [ -e "$1" ] || tool export "$DIR/$1" 2>/dev/null
+    mv "$VEMO_REDIRECT_DIR" away
+    tool init
+    gives "2 tokens imported" import "$1"
 }
 
 # expect_made: the directory, the file and an empty table are there, as programs expect them
@@ -63,39 +100,6 @@ expect_made()
 {
     [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" | xargs)" = "700 700" ]
     [ "$(sql "PRAGMA auto_vacuum; SELECT count(*) FROM token" | xargs)" = "1 0" ]
-}
-
-# A store as it is when a program or the machine stops in the middle of a change: with a journal.
-half_change()
-{
-    many_rows 40 "extra = json_object('data', hex(zeroblob(1000)))"
-    # What does not fit into the cache is written before the end of the change.
-    sqlite3 "$DB" >/dev/null <<SQL
-PRAGMA cache_size = 1;
-BEGIN;
-UPDATE token SET function = 'half', extra = json_object('data', hex(randomblob(1000)));
-.shell cp "$DB" "$DIR/half"; cp "$DB-journal" "$DIR/half-journal"
-ROLLBACK;
-SQL
-    cp "$DIR/half" "$DB"
-    cp "$DIR/half-journal" "$DB-journal"
-    grep -q half "$DB"
-    [ -s "$DB-journal" ]
-}
-
-# replace_database BACKUP, save_and_replace: what the remedies of these names say; the backup holds two tokens
-replace_database()
-{
-    mv "$VEMO_REDIRECT_DIR" "$DIR/away"
-    tool init
-    gives "2 tokens imported" import "$1"
-    rm -r "$DIR/away"
-}
-
-save_and_replace()
-{
-    tool export "$DIR/saved" 2>/dev/null
-    replace_database "$DIR/saved"
 }
 
 # remake OLD NEW: another table of tokens in the place of the library's, with one for the other in its statement
@@ -108,8 +112,6 @@ remake()
          SELECT * FROM library; DROP TABLE library"
 }
 
-# --- what is well
-
 @test "a sound store gives no findings, and stays as it is" {
     rows <<END
 lasting|extra = '{"a":Infinity}', create_time = strftime('%s', 'now')
@@ -119,8 +121,8 @@ deepest|extra = '$(printf '{"a":%.0s' {1..100})7$(printf '}%.0s' {1..100})'
 brackets-in-a-text|extra = '{"a":"$(printf '[%.0s' {1..200})\\\\\\"{"}'
 END
     cp "$DB" "$DIR/before"
-    expect_sound
-    gives "no findings" doctor --repair
+    gives "$ALL_RIGHT" doctor
+    gives "$ALL_RIGHT" doctor --repair
     gives "[]" doctor -o json
     gives "" doctor -o jsonl
     cmp "$DB" "$DIR/before"
@@ -139,211 +141,141 @@ closed|webapi_allow = '{}'
 old|count = -1, create_time = $now - 365 * 86400 - 60
 younger|count = -2, create_time = $now - 365 * 86400 + 60
 END
-    run_tool doctor
-    expect 0 "note: expiring within a day: 1 token
-    meaning: who uses them is refused then
-    remedy: \"vemo-access-token list --expiring 1d\" tells which; update --ttl gives them time
-note: expiring within a week: 3 tokens
-    meaning: who uses them is refused then
-    remedy: \"vemo-access-token list --expiring 7d\" tells which; update --ttl gives them time
-note: without an owner who is a user of this machine: 1 token
-    meaning: they are granted on behalf of a number that another user can get
-    remedy: \"vemo-access-token list --no-owner\" tells which; revoke --no-owner deletes them
-note: opening nothing: 1 token
-    meaning: every call with them is refused
-    remedy: update --add-allow lets them open calls; or revoke them
-note: of unlimited uses, and older than a year: 1 token
-    meaning: whoever has got hold of one in all that time can use it
-    remedy: revoke them, and create others
-no findings"
-    gives "$output" doctor --repair
+    notes='note: expiring within a day: 1 token|who uses them is refused then|"vemo-access-token list --expiring 1d" tells which; update --ttl gives them time
+note: expiring within a week: 3 tokens|who uses them is refused then|"vemo-access-token list --expiring 7d" tells which; update --ttl gives them time
+note: without an owner who is a user of this machine: 1 token|they are granted on behalf of a number that another user can get|"vemo-access-token list --no-owner" tells which; revoke --no-owner deletes them
+note: opening nothing: 1 token|every call with them is refused|update --add-allow lets them open calls; or revoke them
+note: of unlimited uses, and older than a year: 1 token|whoever has got hold of one in all that time can use it|revoke them, and create others
+no findings'
+    finds 0 "$notes"
+    finds 0 "$notes" --repair
     run_tool doctor -o jsonl
-    [ "$status" -eq 0 ]
-    [ "${lines[3]}" = '{"finding":"opening nothing: 1 token","meaning":"every call with them is refused","remedy":"update --add-allow lets them open calls; or revoke them","repaired":false,"severity":"note"}' ]
+    [ "$status ${lines[3]}" = '0 {"finding":"opening nothing: 1 token","meaning":"every call with them is refused","remedy":"update --add-allow lets them open calls; or revoke them","repaired":false,"severity":"note"}' ]
     # An owner who could not be looked up may exist.
     VEMO_TEST_LOOKUP=5 run_tool doctor
     [[ $output != *"without an owner"* ]]
     # A finding comes without notes.
     sql "UPDATE token SET function = '' WHERE tid LIKE 'plain%'"
-    expect_finding warning "an empty purpose in 1 token (plain000)" "no call deletes such a token by its purpose" \
-        "revoke them, and create others"
+    finds 5 "warning: an empty purpose in 1 token (plain000)|no call deletes such a token by its purpose|revoke them, and create others"
 }
 
-# --- the place
+# The place.
 
 @test "what is missing of the store is made" {
-    no_store="there is no store yet: no token can be created, and every call fails"
-    no_tokens="there are no tokens; the first call that needs it makes it"
-    no_table="every call fails: the table is made together with the file, and never later"
-    expect_note "there is no directory $REAL_DIRECTORY" "$no_store" "vemo-access-token init"
+    no_store="there is no directory $REAL_DIRECTORY|there is no store yet: no token can be created, and every call fails"
+    no_file="there is no database $REAL_DB|$NO_TOKENS"
+    no_table="the database has no table of tokens|every call fails: the table is made together with the file, and never later"
+    finds 0 "note: $no_store|vemo-access-token init"$'\n'"$ALL_RIGHT"
     [ ! -e "$VEMO_REDIRECT_DIR" ]
-    run_tool doctor --repair
-    expect 0 "repaired: there is no directory $REAL_DIRECTORY
-    meaning: $no_store
-repaired: there is no database $REAL_DB
-    meaning: $no_tokens
-no findings"
+    finds 0 "repaired: $no_store"$'\n'"repaired: $no_file"$'\n'"$ALL_RIGHT" --repair
     expect_made
 
     rm "$DB"
-    expect_note "there is no database $REAL_DB" "$no_tokens" "vemo-access-token init"
+    finds 0 "note: $no_file|vemo-access-token init"$'\n'"$ALL_RIGHT"
     [ ! -e "$DB" ]
     # A journal without a database tells that there was one.
     install -m 0600 /dev/null "$DB-journal"
-    expect_finding error "there is no database $REAL_DB" "$no_tokens" "vemo-access-token init"
+    finds 5 "error: $no_file|vemo-access-token init"
     rm "$DB-journal"
-    expect_repair "there is no database $REAL_DB" "$no_tokens"
+    finds 0 "repaired: $no_file"$'\n'"$ALL_RIGHT" --repair
     expect_made
 
     : >"$DB"
-    expect_finding error "the database has no table of tokens" "$no_table" "vemo-access-token init"
+    finds 5 "error: $no_table|vemo-access-token init"
     [ ! -s "$DB" ]
-    expect_repair "the database has no table of tokens" "$no_table"
+    finds 0 "repaired: $no_table"$'\n'"$ALL_RIGHT" --repair
     expect_made
 }
 
 @test "modes that let others in are tightened" {
-    row aaaaaaaa
-    # With a journal that no change is using.
-    sql "PRAGMA journal_mode = PERSIST; UPDATE token SET count = 2"
     while read -r path name mode; do
-        chmod "$mode" "$path"
-        expect_finding error "$name has mode $mode" "$NOT_PRIVATE" "chmod 0700 $name"
-        expect_repair "$name has mode $mode" "$NOT_PRIVATE"
-        [ "$(stat -c %a "$path")" = 700 ]
-    done <<END
+        echo "chmod $mode $path|error: $name has mode $mode|$NOT_PRIVATE|chmod 0700 $name"
+    done >"$DIR.table" <<END
 $VEMO_REDIRECT_DIR $REAL_DIRECTORY 0755
 $VEMO_REDIRECT_DIR $REAL_DIRECTORY 0701
 $VEMO_REDIRECT_DIR $REAL_DIRECTORY 0710
 $DB $REAL_DB 0644
 $DB $REAL_DB 0604
 $DB $REAL_DB 0720
-$DB-journal $REAL_DB-journal 0640
 END
+    echo "install -m 0640 /dev/null $DB-journal|error: $REAL_DB-journal has mode 0640|$NOT_PRIVATE|chmod 0700 $REAL_DB-journal" >>"$DIR.table"
+    mends <"$DIR.table"
+    [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" "$DB-journal" | xargs)" = "700 700 700" ]
     chmod 0600 "$DB"
     expect_sound
 }
 
 @test "owners other than root are replaced" {
     [ "$(id -u)" -eq 0 ] || skip "only root can give files away"
-    row aaaaaaaa
     meaning="its owner can read and change every token, and may have done so"
-    chown 4000000000 "$DB"
-    expect_finding error "$REAL_DB belongs to uid 4000000000" "$meaning" "chown root $REAL_DB, and look at the tokens"
-    expect_repair "$REAL_DB belongs to uid 4000000000" "$meaning"
-    chown 4000000000:1 "$VEMO_REDIRECT_DIR"
-    expect_finding error "$REAL_DIRECTORY belongs to uid 4000000000" "$meaning" \
-        "chown root $REAL_DIRECTORY, and look at the tokens"
-    expect_repair "$REAL_DIRECTORY belongs to uid 4000000000" "$meaning"
-    [ "$(stat -c '%u %g' "$VEMO_REDIRECT_DIR")" = "0 1" ]
+    mends <<TABLE
+chown 4000000000 $DB|error: $REAL_DB belongs to uid 4000000000|$meaning|chown root $REAL_DB, and look at the tokens
+chown 4000000000:1 session|error: $REAL_DIRECTORY belongs to uid 4000000000|$meaning|chown root $REAL_DIRECTORY, and look at the tokens
+TABLE
+    [ "$(stat -c '%u %g' session)" = "0 1" ]
 }
 
-@test "what stands in the place of the directory or the file is left to the administrator, and not opened" {
-    directory="the tokens stand elsewhere, or nowhere|find out who made it; move the database to a directory of that name"
+@test "what stands in the place of the directory, the file or a journal is left to the administrator, and not opened" {
     file="programs work on another file than this one, or on none|find out who made it; move the database to this name"
-    links="the tokens can be reached under another name, and a journal of that name is not found|find -samefile tells the other names; remove those"
-    while IFS='|' read -r change kind finding; do
-        echo "$change"
-        rm -rf "$DIR/"*
-        row aaaaaaaa "deadline = 0" # which would be a finding
-        cd "$DIR"
-        eval "$change"
-        before=$(find "$DIR" -printf '%P %i %m %T@ %l\n')
-        IFS='|' read -r meaning remedy <<<"${!kind}"
-        expect_no_repair "${finding%% *}" "${finding#* }" "$meaning" "$remedy"
-        [ "$(find "$DIR" -printf '%P %i %m %T@ %l\n')" = "$before" ]
-    done <<TABLE
-mv session other; ln -s other session|directory|error $REAL_DIRECTORY is a symbolic link
-rm -r session; echo text >session|directory|error $REAL_DIRECTORY is not a directory
-mv $DB other; ln -s ../other $DB|file|error $REAL_DB is a symbolic link
-mv $DB other; ln -s ../nowhere $DB|file|error $REAL_DB is a symbolic link
-rm $DB; mkdir $DB|file|error $REAL_DB is not a regular file
+    hide='sql "UPDATE token SET deadline = 0"' # which would be a finding
+    remove="find out who made it; remove it while no program runs"
+    journal="the database takes it for a journal of its own: calls can fail, or never end|$remove"
+    others="the next program to open the database changes other files, too|$remove"
+    {
+        cat <<TABLE
+$hide; mv session other; ln -s other session|error: $REAL_DIRECTORY is a symbolic link|$ELSEWHERE
+rm -r session; echo text >session|error: $REAL_DIRECTORY is not a directory|$ELSEWHERE
+$hide; mv $DB other; ln -s ../other $DB|error: $REAL_DB is a symbolic link|$file
+mv $DB other; ln -s ../nowhere $DB|error: $REAL_DB is a symbolic link|$file
+rm $DB; mkdir $DB|error: $REAL_DB is not a regular file|$file
+ln $DB second; ln $DB third|warning: $REAL_DB has 3 hard links|the tokens can be reached under another name, and a journal of that name is not found|find -samefile tells the other names; remove those
+$hide; (umask 077; printf 'x\331\325\005\371\040\241\143\327' >$DB-journal)|error: $REAL_DB-journal is one of several that belong together|$others
+$hide; install -m 0600 /dev/null $DB-journal; ln $DB-journal second|error: $REAL_DB-journal has several hard links|$others
 TABLE
-    rm -r "$VEMO_REDIRECT_DIR"
-    mkdir other
-    ln -s other "$VEMO_REDIRECT_DIR"
-    run_tool doctor
-    expect 5 "error: $REAL_DIRECTORY is a symbolic link
-    meaning: ${directory%|*}
-    remedy: ${directory#*|}
-note: there is no database $REAL_DB
-    meaning: there are no tokens; the first call that needs it makes it
-    remedy: vemo-access-token init"
+        [ "$(id -u)" -ne 0 ] || echo "$hide; install -m 0600 -o 4000000000 /dev/null $DB-journal|error: $REAL_DB-journal belongs to uid 4000000000|the next program to open the database may take its contents for changes|$remove"
+        for suffix in journal wal shm; do
+            echo "$hide; mkfifo $DB-$suffix|error: $REAL_DB-$suffix is not a regular file|$journal"
+            echo "$hide; mkdir $DB-$suffix|error: $REAL_DB-$suffix is not a regular file|$journal"
+            echo "$hide; ln -s nowhere $DB-$suffix|error: $REAL_DB-$suffix is a symbolic link|$journal"
+        done
+    } >"$DIR.table"
+    leaves <"$DIR.table"
 
-    # A file with other names is not made private.
-    rm "$VEMO_REDIRECT_DIR"
-    row aaaaaaaa
+    # Of what is not private, nothing is opened either, and what has other names is not made private.
+    fresh
+    sql "UPDATE token SET deadline = 0"
+    chmod 0720 "$VEMO_REDIRECT_DIR"
+    finds 5 "error: $REAL_DIRECTORY has mode 0720|$NOT_PRIVATE|chmod 0700 $REAL_DIRECTORY"
+    chmod 0700 "$VEMO_REDIRECT_DIR"
+    expect_first "warning: a deadline of 0 or less in 2 tokens (aaaaaaaa, bbbbbbbb)"
     ln "$DB" second
-    ln "$DB" third
-    expect_no_repair warning "$REAL_DB has 3 hard links" "${links%|*}" "${links#*|}"
     chmod 0640 "$DB"
     run_tool doctor --repair
-    [ "$status$stderr" = 5 ]
-    [ "$(stat -c %a "$DB")" = 640 ]
-}
-
-@test "what stands in the place of a journal and is none is left to the administrator, and not opened" {
-    row aaaaaaaa
-    for suffix in journal wal shm; do
-        while IFS='|' read -r make kind; do
-            $make "$DB-$suffix"
-            expect_no_repair error "$REAL_DB-$suffix is $kind" \
-                "the database takes it for a journal of its own: calls can fail, or never end" \
-                "find out who made it; remove it while no program runs"
-            rm -d "$DB-$suffix"
-        done <<'TABLE'
-mkfifo|not a regular file
-mkdir|not a regular file
-ln -s nowhere|a symbolic link
-TABLE
-    done
-    # No database is made beside it either.
+    [ "$status$stderr $(stat -c %a "$DB")" = "5 640" ]
+    # Beside what takes the place of a journal, no database is made.
     rm "$DB"
     mkfifo "$DB-journal"
     run_tool doctor --repair
     [ "$status$stderr" = 5 ]
     [ "${lines[0]}" = "error: $REAL_DB-journal is not a regular file" ]
     [ "${lines[3]}" = "error: there is no database $REAL_DB" ]
-}
-
-@test "what others may have put there is not opened" {
-    row aaaaaaaa "deadline = 0" # which would be a finding
-    chmod 0720 "$VEMO_REDIRECT_DIR"
-    expect_finding error "$REAL_DIRECTORY has mode 0720" "$NOT_PRIVATE" "chmod 0700 $REAL_DIRECTORY"
-    chmod 0700 "$VEMO_REDIRECT_DIR"
-    others="the next program to open the database changes other files, too"
-    remedy="find out who made it; remove it while no program runs"
-    # The end of a journal that names another file.
-    (umask 077 && printf 'x\331\325\005\371\040\241\143\327' >"$DB-journal")
-    expect_no_repair error "$REAL_DB-journal is one of several that belong together" "$others" "$remedy"
-    : >"$DB-journal"
-    ln "$DB-journal" "$DIR/second"
-    expect_no_repair error "$REAL_DB-journal has several hard links" "$others" "$remedy"
-    if [ "$(id -u)" -eq 0 ]; then
-        chown 4000000000 "$DB-journal"
-        expect_no_repair error "$REAL_DB-journal belongs to uid 4000000000" \
-            "the next program to open the database may take its contents for changes" "$remedy"
-    fi
-    rm "$DB-journal"
-    expect_first warning "a deadline of 0 or less in 1 token (aaaaaaaa)"
+    rm -r "$VEMO_REDIRECT_DIR"
+    mkdir other
+    ln -s other "$VEMO_REDIRECT_DIR"
+    finds 5 "error: $REAL_DIRECTORY is a symbolic link|$ELSEWHERE
+note: there is no database $REAL_DB|$NO_TOKENS|vemo-access-token init"
 }
 
 @test "attributes that forbid changes are left to the administrator" {
     row aaaaaaaa
     chattr +a "$DB" 2>/dev/null || skip "no right to set attributes, or a file system without them"
-    wrong=""
-    expect_finding error "$REAL_DB is append-only" "$NO_CHANGE" "chattr -a $REAL_DB" || wrong=1
+    finds 5 "error: $REAL_DB is append-only|$NO_CHANGE|chattr -a $REAL_DB" || wrong=1
     chattr -a "$DB"
     chattr +i "$DB" "$VEMO_REDIRECT_DIR"
-    run_tool doctor --repair
+    finds 5 "error: $REAL_DIRECTORY is immutable|$NO_CHANGE|chattr -i $REAL_DIRECTORY
+error: $REAL_DB is immutable|$NO_CHANGE|chattr -i $REAL_DB" --repair || wrong=1
     chattr -i "$DB" "$VEMO_REDIRECT_DIR"
-    expect 5 "error: $REAL_DIRECTORY is immutable
-    meaning: $NO_CHANGE
-    remedy: chattr -i $REAL_DIRECTORY
-error: $REAL_DB is immutable
-    meaning: $NO_CHANGE
-    remedy: chattr -i $REAL_DB"
-    [ ! "$wrong" ]
+    [ ! "${wrong-}" ]
     expect_sound
 }
 
@@ -387,43 +319,32 @@ error: /usr/vemo is a symbolic link
 }
 
 @test "a repair that does not help is told, and not called one" {
-    row aaaaaaaa
     echo '#include <errno.h>
         int chmod() { return 0; } int fchmod() { return 0; } int fchmodat() { return 0; }
         int unlinkat() { errno = EPERM; return -1; }' |
-        cc -shared -fPIC -w -fno-builtin -x c -o "$DIR/no-chmod.so" - || skip "no C compiler"
+        cc -shared -fPIC -w -fno-builtin -x c -o "$DIR.no-chmod.so" - || skip "no C compiler"
+    fresh
     chmod 0750 "$DB"
-    LD_PRELOAD=$DIR/no-chmod.so run_tool doctor --repair
-    expect 5 "error: $REAL_DB has mode 0750
-    meaning: $NOT_PRIVATE
-    remedy: chmod 0700 $REAL_DB" "vemo-access-token: the repair did not help: $REAL_DB has mode 0750"
+    LD_PRELOAD=$DIR.no-chmod.so SENTENCE="the repair did not help: $REAL_DB has mode 0750" \
+        finds 5 "error: $REAL_DB has mode 0750|$NOT_PRIVATE|chmod 0700 $REAL_DB" --repair
     # Where others can still put a journal beside it, no database is made. Nobody knows whose the journal is.
     rm "$DB"
     chmod 0770 "$VEMO_REDIRECT_DIR"
     install -m 0640 /dev/null "$DB-journal"
-    LD_PRELOAD=$DIR/no-chmod.so run_tool doctor --repair
-    expect 5 "error: $REAL_DIRECTORY has mode 0770
-    meaning: $NOT_PRIVATE
-    remedy: chmod 0700 $REAL_DIRECTORY
-error: $REAL_DB-journal has mode 0640
-    meaning: $NOT_PRIVATE
-    remedy: chmod 0700 $REAL_DB-journal
-error: there is no database $REAL_DB
-    meaning: there are no tokens; the first call that needs it makes it
-    remedy: vemo-access-token init" "vemo-access-token: the repair did not help: $REAL_DIRECTORY has mode 0770"
+    LD_PRELOAD=$DIR.no-chmod.so SENTENCE="the repair did not help: $REAL_DIRECTORY has mode 0770" \
+        finds 5 "error: $REAL_DIRECTORY has mode 0770|$NOT_PRIVATE|chmod 0700 $REAL_DIRECTORY
+error: $REAL_DB-journal has mode 0640|$NOT_PRIVATE|chmod 0700 $REAL_DB-journal
+error: there is no database $REAL_DB|$NO_TOKENS|vemo-access-token init" --repair
     [ ! -e "$DB" ]
-    rm "$DB-journal"
-    chmod 0700 "$VEMO_REDIRECT_DIR"
-    tool init >/dev/null
+    fresh
     install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
-    LD_PRELOAD=$DIR/no-chmod.so run_tool doctor --repair
+    LD_PRELOAD=$DIR.no-chmod.so run_tool doctor --repair
     [ "$status $stderr" = "5 vemo-access-token: cannot repair: backup.part: Operation not permitted" ]
 }
 
 @test "what others change in the middle of a repair is not followed" {
     while IFS='|' read -r between reason; do
-        rm -rf "$DIR/"s*
-        tool init >/dev/null
+        fresh
         chmod 0640 "$DB"
         install -m 0640 /dev/null "$DB-journal" # which is repaired first
         VEMO_TEST_CALLS="fchmod|cd $DIR && $between" run_tool doctor --repair
@@ -437,8 +358,7 @@ mv session second && ln -s second session|$REAL_DIRECTORY is a symbolic link; na
 TABLE
     # What an export has left behind: another program takes it, or it is gone.
     while IFS='|' read -r between reason; do
-        rm -rf "$DIR/"s*
-        tool init >/dev/null
+        fresh
         chmod 0750 "$VEMO_REDIRECT_DIR"
         install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
         VEMO_TEST_CALLS="fchmod|$between $VEMO_REDIRECT_DIR/backup.part" run_tool doctor --repair
@@ -457,10 +377,10 @@ TABLE
 }
 
 @test "a place that cannot be looked at is a finding" {
+    cause="programs fail in the same way|mend the cause; or $REPLACE"
     tool init
     for call in "openat session" "open $REAL_DIRECTORY" fstatvfs; do
-        VEMO_TEST_CALLS="$call|24" expect_finding error "$REAL_DIRECTORY: Too many open files" \
-            "programs fail in the same way" "mend the cause; or $REPLACE"
+        VEMO_TEST_CALLS="$call|24" finds 5 "error: $REAL_DIRECTORY: Too many open files|$cause"
     done
     chmod 0750 "$VEMO_REDIRECT_DIR"
     for call in "openat ." fchown fchmod; do
@@ -469,31 +389,22 @@ TABLE
     done
     rm -r "$VEMO_REDIRECT_DIR"
     ln -s session "$VEMO_REDIRECT_DIR"
-    run_tool doctor
-    expect 5 "error: $REAL_DIRECTORY is a symbolic link
-    meaning: the tokens stand elsewhere, or nowhere
-    remedy: find out who made it; move the database to a directory of that name
-error: $REAL_DIRECTORY: Too many levels of symbolic links
-    meaning: programs fail in the same way
-    remedy: mend the cause; or $REPLACE"
+    finds 5 "error: $REAL_DIRECTORY is a symbolic link|$ELSEWHERE
+error: $REAL_DIRECTORY: Too many levels of symbolic links|$cause"
 }
 
 @test "what an export into the private directory left behind is removed, but not while it is written" {
-    row aaaaaaaa
-    meaning="an export was cut off; the file can hold whole ids"
-    install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
-    run flock "$VEMO_REDIRECT_DIR/backup.part" "$TOOL" doctor
-    [ "$output" = "no findings" ]
-    touch "$VEMO_REDIRECT_DIR/x"
-    expect_finding warning "$REAL_DIRECTORY/backup.part was left behind" "$meaning" "remove it"
+    part=$VEMO_REDIRECT_DIR/backup.part
+    mends <<<"install -m 0600 /dev/null $part; touch session/x|warning: $REAL_DIRECTORY/backup.part was left behind|an export was cut off; the file can hold whole ids|remove it"
+    [ ! -e "$part" ]
+    install -m 0600 /dev/null "$part"
+    run flock "$part" "$TOOL" doctor
+    [ "$output" = "$ALL_RIGHT" ]
     chmod 0640 "$DB"
     VEMO_TEST_SYNC=directory run_tool doctor --repair
     undone="vemo-access-token: cannot repair: $REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
     [ "$status $stderr" = "5 $undone
 $undone" ]
-    install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
-    expect_repair "$REAL_DIRECTORY/backup.part was left behind" "$meaning"
-    [ ! -e "$VEMO_REDIRECT_DIR/backup.part" ]
     # However many there are.
     (umask 077 && touch "$VEMO_REDIRECT_DIR/"{1..40}.part)
     run --separate-stderr bash -c 'ulimit -n 32 && "$0" doctor' "$TOOL"
@@ -501,42 +412,32 @@ $undone" ]
 }
 
 @test "what is left of a file system is enough for a change and for another file, or is not" {
-    tool init
-    for room in "16 4096 0 0" "65536 1 2 1"; do
-        VEMO_TEST_ROOM=$room expect_sound
+    leaves <<TABLE
+export VEMO_TEST_ROOM="65535 1 2 1"|error: the file system of $REAL_DIRECTORY has no room for a change|$NO_CHANGE|remove what is not needed there: "df $REAL_DIRECTORY" tells how full it is
+export VEMO_TEST_ROOM="16 4096 1 0"|error: the file system of $REAL_DIRECTORY has no room for another file|$NO_CHANGE|remove what is not needed there: "df -i $REAL_DIRECTORY" tells how full it is
+TABLE
+    for VEMO_TEST_ROOM in "16 4096 0 0" "65536 1 2 1"; do
+        expect_sound
     done
-    VEMO_TEST_ROOM="65535 1 2 1" expect_no_repair error "the file system of $REAL_DIRECTORY has no room for a change" \
-        "$NO_CHANGE" "remove what is not needed there: \"df $REAL_DIRECTORY\" tells how full it is"
-    VEMO_TEST_ROOM="16 4096 1 0" expect_no_repair error "the file system of $REAL_DIRECTORY has no room for another file" \
-        "$NO_CHANGE" "remove what is not needed there: \"df -i $REAL_DIRECTORY\" tells how full it is"
 }
 
-# --- the database
-
-@test "a file that is no database is a finding, and left" {
-    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
-    install -m 0600 /dev/stdin "$DB" <<<"no database, but a text that is long enough to be told from an empty one"
-    cp "$DB" "$DIR/text"
-    expect_no_repair error "$NO_DATABASE" "programs fail in the same way" "mend the cause; or $REPLACE"
-    cmp "$DB" "$DIR/text"
-}
+# The database.
 
 @test "an index that does not fit its table is damage" {
-    row aaaaaaaa "deadline = 1" # which is not looked at
-    row bbbbbbbb
+    rows <<<$'aaaaaaaa|deadline = 1\nbbbbbbbb' # of which one is not looked at
     # Newer versions of the shell protect the schema.
     sqlite3 -cmd '.dbconfig defensive off' "$DB" "
         CREATE INDEX i ON token (deadline); PRAGMA writable_schema = ON;
         UPDATE sqlite_schema SET sql = 'CREATE INDEX i ON token (uid)' WHERE name = 'i'" >"$DIR/defensive"
-    expect_no_repair error "the database is damaged: row 1 missing from index i; row 2 missing from index i" \
-        "tokens may be lost or wrong" \
-        "$SAVE_AND_REPLACE; where export fails, import a backup or what sqlite3 can still read: see vemo-access-token(8)"
+    damage="error: the database is damaged: row 1 missing from index i; row 2 missing from index i|tokens may be lost or wrong|$SAVE_AND_REPLACE; where export fails, import a backup or what sqlite3 can still read: see vemo-access-token(8)"
+    finds 5 "$damage"
+    finds 5 "$damage" --repair
     tool export >"$DIR/exported"
     # The check itself can fail.
     sqlite3 -cmd '.dbconfig defensive off' "$DB" "
         PRAGMA writable_schema = ON;
         UPDATE sqlite_schema SET sql = 'CREATE INDEX i ON token (bind_sid COLLATE x)' WHERE name = 'i'" >"$DIR/defensive"
-    expect_first error "the database is damaged: no such collation sequence: x"
+    expect_first "error: the database is damaged: no such collation sequence: x"
 }
 
 @test "a page that is not one is damage, told on one line and without sending the reader in a circle" {
@@ -555,17 +456,16 @@ $undone" ]
     done
 }
 
-@test "a table that is not the library's is left to the administrator, and can be replaced" {
-    row aaaaaaaa
-    row bbbbbbbb
+@test "a file or a table that is not the library's is left to the administrator, and can be replaced" {
+    table="the table of tokens is not the one that the library makes: it"
+    wrong="calls can fail, spend no use, report what did not happen, or take one token for another|$SAVE_AND_REPLACE"
+    made_up="programs read what it makes up, and their changes fail or go elsewhere|$REPLACE"
+    place="in the place of the table of tokens"
+    utf16='sql .dump >dump; install -m 0700 /dev/null $DB; sqlite3 -cmd "PRAGMA encoding = '\''UTF-16le'\''" $DB <dump'
+    listed='[ "$(tool list --sort tid --limit 1 --field tid --show-ids 2>/dev/null)" = "aaaaaaaa$ZEROS" ]' # first
     while IFS='|' read -r old new differences; do
-        echo "$new"
-        remake "$old" "$new"
-        expect_no_repair error "the table of tokens is not the one that the library makes: it $differences" \
-            "calls can fail, spend no use, report what did not happen, or take one token for another" "$SAVE_AND_REPLACE"
-        [ "$(tool list --sort tid --limit 1 --field tid --show-ids 2>/dev/null)" = "aaaaaaaa$ZEROS" ]
-        save_and_replace
-    done <<'TABLE'
+        echo "remake '$old' \"$new\"; $listed|error: $table $differences|$wrong"
+    done >"$DIR.table" <<'TABLE'
 tid TEXT primary key NOT NULL|tid TEXT|has "tid TEXT", and lacks "tid TEXT primary key NOT NULL"
 tid TEXT|tid TEXT COLLATE NOCASE|has "tid TEXT COLLATE NOCASE primary key NOT NULL", and lacks "tid TEXT primary key NOT NULL"
 primary key|primary key ON CONFLICT IGNORE|has "tid TEXT primary key ON CONFLICT IGNORE NOT NULL", and lacks "tid TEXT primary key NOT NULL"
@@ -575,14 +475,14 @@ extra TEXT|extra TEXT, upper TEXT AS (upper(tid)), UNIQUE (function, tid)|has "U
 extra TEXT)|extra TEXT) WITHOUT ROWID|has "WITHOUT ROWID"
 extra TEXT)|extra TEXT) STRICT|has "STRICT"
 TABLE
-    expect_sound
-    sql .dump >"$DIR/dump"
-    install -m 0700 /dev/null "$DB"
-    sqlite3 -cmd "PRAGMA encoding = 'UTF-16le'" "$DB" <"$DIR/dump"
-    expect_no_repair error "the database is in UTF-16le, and not in UTF-8" \
-        "bytes that are not UTF-8 are not kept: such an id is never found again" "$SAVE_AND_REPLACE"
-    save_and_replace
-    expect_sound
+    cat >>"$DIR.table" <<TABLE
+echo "no database, but a text that is long enough to be told from an empty one" >$DB|error: $NO_DATABASE|programs fail in the same way|mend the cause; or $REPLACE
+$utf16|error: the database is in UTF-16le, and not in UTF-8|bytes that are not UTF-8 are not kept: such an id is never found again|$SAVE_AND_REPLACE
+sql "ALTER TABLE token RENAME TO other; CREATE VIEW Token AS SELECT * FROM other"|error: a view stands $place|$made_up
+sql "DROP TABLE token; CREATE VIRTUAL TABLE token USING fts4(tid, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra)"|error: a virtual table stands $place|$made_up
+sql "ALTER TABLE token DROP COLUMN extra; ALTER TABLE token RENAME uid TO owner"|error: the table of tokens lacks columns: uid, extra|every call that reads or writes a token fails|$REPLACE
+TABLE
+    leaves <"$DIR.table"
 }
 
 @test "the library's table in other words is none of another kind, and what only looks like it is" {
@@ -600,7 +500,7 @@ TABLE
     expect_sound
     gives "all was there already" init
     printf '\003' | dd of="$DB" bs=1 seek=18 conv=notrunc status=none
-    expect_first error "the database says that only a later SQLite can write to it"
+    expect_first "error: the database says that only a later SQLite can write to it"
 }
 
 @test "tokens of the same id are found where the table allows them" {
@@ -612,52 +512,27 @@ TABLE
     run_tool doctor --repair
     [ "$status" -eq 5 ]
     [[ ${lines[0]} == "error: the table of tokens is not the one "* ]]
-    [ "${lines[3]}" = "error: several tokens of the same id: 1 token (aaaaaaaa)" ]
-    [ "${lines[4]}" = "    meaning: a grant reads one of them and saves another: their uses never end" ]
-    [ "${lines[5]}" = "    remedy: revoke them by their whole ids" ]
-    [ "${#lines[@]}" -eq 6 ]
+    [ "$(tail -n +4 <<<"$output")" = "error: several tokens of the same id: 1 token (aaaaaaaa)
+    meaning: a grant reads one of them and saves another: their uses never end
+    remedy: revoke them by their whole ids" ]
     tool revoke "aaaaaaaa$ZEROS"
-    save_and_replace
+    cd "$DIR"
+    replace_database saved
     expect_sound
 }
 
-@test "what stands in the place of the table, or lacks columns, is left to the administrator, and can be replaced" {
-    row aaaaaaaa
-    row bbbbbbbb
-    tool export "$DIR/backup"
-    made_up="programs read what it makes up, and their changes fail or go elsewhere"
-    fails="every call that reads or writes a token fails"
-    while IFS='|' read -r statements what meaning; do
-        sql "$statements"
-        expect_no_repair error "$what" "${!meaning}" "$REPLACE"
-        replace_database "$DIR/backup"
-        expect_sound
-    done <<'TABLE'
-ALTER TABLE token RENAME TO other; CREATE VIEW Token AS SELECT * FROM other|a view stands in the place of the table of tokens|made_up
-DROP TABLE token; CREATE VIRTUAL TABLE token USING fts4(tid, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra)|a virtual table stands in the place of the table of tokens|made_up
-ALTER TABLE token DROP COLUMN extra; ALTER TABLE token RENAME uid TO owner|the table of tokens lacks columns: uid, extra|fails
-TABLE
-}
-
 @test "triggers and indexes that take part in changes are left to the administrator, and can be dropped" {
-    row aaaaaaaa
-    trigger="a trigger on the table of tokens|it runs in every change that it is for: calls can report what did not happen, change other tokens, fail, or never end"
-    index="an index on the table of tokens that does not only find them|changes can fail, and a grant can delete other tokens: those that a unique index takes for the same"
-    while IFS='|' read -r kind statement names dropped; do
-        echo "$statement"
-        sql "$statement"
-        IFS='|' read -r kind meaning <<<"${!kind}"
-        remedy="sqlite3 $REAL_DB '$dropped'"
-        expect_no_repair error "$kind: $names" "$meaning" "sqlite3 $REAL_DB '.schema token' shows what it does; $remedy"
-        eval "${remedy//"$REAL_DB"/"$DB"}"
-        expect_sound
-    done <<'TABLE'
-trigger|CREATE TRIGGER t AFTER INSERT ON token BEGIN DELETE FROM token; END|"t"|DROP TRIGGER "t";
-trigger|CREATE TRIGGER b UPDATE ON token BEGIN SELECT 1; END; CREATE TRIGGER a DELETE ON TOKEN BEGIN SELECT 1; END|"a", "b"|DROP TRIGGER "a"; DROP TRIGGER "b";
-trigger|CREATE TRIGGER "it's ""$(false)""" UPDATE ON token BEGIN SELECT 1; END|"it's "$(false)""|DROP TRIGGER "it'\''s ""$(false)""";
-index|CREATE UNIQUE INDEX i ON token (function, tid)|"i"|DROP INDEX "i";
-index|CREATE INDEX i ON token (uid) WHERE count = 1|"i"|DROP INDEX "i";
-index|CREATE INDEX i ON token (uid, json(extra))|"i"|DROP INDEX "i";
+    trigger="error: a trigger on the table of tokens: "
+    runs="it runs in every change that it is for: calls can report what did not happen, change other tokens, fail, or never end"
+    index='error: an index on the table of tokens that does not only find them: "i"|changes can fail, and a grant can delete other tokens: those that a unique index takes for the same'
+    schema="sqlite3 $REAL_DB '.schema token' shows what it does; sqlite3 $REAL_DB"
+    leaves <<TABLE
+sql 'CREATE TRIGGER t AFTER INSERT ON token BEGIN DELETE FROM token; END'|$trigger"t"|$runs|$schema 'DROP TRIGGER "t";'
+sql 'CREATE TRIGGER b UPDATE ON token BEGIN SELECT 1; END; CREATE TRIGGER a DELETE ON TOKEN BEGIN SELECT 1; END'|$trigger"a", "b"|$runs|$schema 'DROP TRIGGER "a"; DROP TRIGGER "b";'
+sql 'CREATE TRIGGER "it'\''s ""\$(false)""" UPDATE ON token BEGIN SELECT 1; END'|$trigger"it's "\$(false)""|$runs|$schema 'DROP TRIGGER "it'\''s ""\$(false)""";'
+sql 'CREATE UNIQUE INDEX i ON token (function, tid)'|$index|$schema 'DROP INDEX "i";'
+sql 'CREATE INDEX i ON token (uid) WHERE count = 1'|$index|$schema 'DROP INDEX "i";'
+sql 'CREATE INDEX i ON token (uid, json(extra))'|$index|$schema 'DROP INDEX "i";'
 TABLE
     sql "CREATE TABLE own (a UNIQUE); CREATE TRIGGER of_own UPDATE ON own BEGIN DELETE FROM token; END;
          CREATE INDEX plain ON token (function, uid DESC)"
@@ -680,42 +555,59 @@ TABLE
 }
 
 @test "a large table without an index on the deadline is a finding" {
-    many_rows 10001
-    expect_no_repair warning "10001 tokens, and no index on their deadline" \
-        "every call reads the whole table for expired tokens" "vemo-access-token tune"
+    leaves <<<"many_rows 9999|warning: 10001 tokens, and no index on their deadline|every call reads the whole table for expired tokens|vemo-access-token tune"
     sql "CREATE INDEX of_another_column ON token (function, deadline)"
-    expect_first warning "10001 tokens, and no index on their deadline"
+    expect_first "warning: 10001 tokens, and no index on their deadline"
     sql "DROP INDEX of_another_column; CREATE INDEX own ON token (deadline)"
     expect_sound
     sql "DROP INDEX own; DELETE FROM token WHERE rowid = 1"
     expect_sound
 }
 
-# --- journals
+# Journals.
+
+# half_change [WHEN]: a store as it is when a program or the machine stops in the middle of a change: with a journal,
+# of an hour ago, or of then
+half_change()
+{
+    if [ ! -e "$DIR/half" ]; then
+        many_rows 40 "extra = json_object('data', hex(zeroblob(1000)))"
+        # What does not fit into the cache is written before the end of the change.
+        sqlite3 "$DB" >/dev/null <<SQL
+PRAGMA cache_size = 1;
+BEGIN;
+UPDATE token SET function = 'half', extra = json_object('data', hex(randomblob(1000)));
+.shell cp "$DB" "$DIR/half"; cp "$DB-journal" "$DIR/half-journal"
+ROLLBACK;
+SQL
+    fi
+    cp "$DIR/half" "$DB"
+    cp "$DIR/half-journal" "$DB-journal"
+    touch -d "${1-1 hour ago}" "$DB-journal"
+    grep -q half "$DB"
+    [ -s "$DB-journal" ]
+}
+
+# expect_undone: the half change is undone
+expect_undone()
+{
+    [ "$(sql "SELECT function, count(*) FROM token GROUP BY 1; PRAGMA integrity_check" | xargs)" = "VPN|40 ok" ]
+}
 
 @test "a journal that was left behind is a finding, and undone by looking" {
-    kept="SELECT function, count(*) FROM token GROUP BY 1; PRAGMA integrity_check"
-    meaning="a program or the machine stopped in the middle of a change"
+    journal="$REAL_DB-journal was left behind|a program or the machine stopped in the middle of a change"
     half_change
-    touch -d "1 hour ago" "$DB-journal"
-    expect_finding warning "$REAL_DB-journal was left behind" "$meaning" \
-        "none needed: reading the database has just undone the half change"
+    finds 5 "warning: $journal|none needed: reading the database has just undone the half change"
     [ "$(ls -A "$VEMO_REDIRECT_DIR")" = vemo-access-token.db ]
-    [ "$(sql "$kept" | xargs)" = "VPN|40 ok" ]
+    expect_undone
     expect_sound
-
-    cp "$DIR/half" "$DB"
-    cp "$DIR/half-journal" "$DB-journal"
-    touch -d "1 hour ago" "$DB-journal"
-    expect_repair "$REAL_DB-journal was left behind" "$meaning"
-    [ "$(sql "$kept" | xargs)" = "VPN|40 ok" ]
-
+    half_change
+    finds 0 "repaired: $journal"$'\n'"$ALL_RIGHT" --repair
+    expect_undone
     # A journal of just now can belong to a program that is running.
-    cp "$DIR/half" "$DB"
-    cp "$DIR/half-journal" "$DB-journal"
-    touch -d "1 hour" "$DB-journal"
+    half_change "1 hour"
     expect_sound
-    [ "$(sql "$kept" | xargs)" = "VPN|40 ok" ]
+    expect_undone
 }
 
 @test "an old journal that is empty, or that its program has ended, holds no half change" {
@@ -762,13 +654,13 @@ SQL
 
     install -m 0700 /dev/stdin "$DB-wal" <<<journal
     printf '\002' | dd of="$DB" bs=1 seek=18 conv=notrunc status=none # which says how it is written to, not read
-    expect_no_repair warning "$REAL_DB-wal does not belong to the database" \
-        "the database was copied or replaced without it, and may lack changes" \
-        "if the database is complete, remove it while no program runs"
+    for repair in "" --repair; do
+        finds 5 "warning: $REAL_DB-wal does not belong to the database|the database was copied or replaced without it, and may lack changes|if the database is complete, remove it while no program runs" $repair
+    done
     [ "$(cat "$DB-wal")" = journal ]
 }
 
-# --- tokens
+# Tokens.
 
 @test "tokens that the library does not write are left to the administrator, and can be mended or revoked" {
     deep=$(printf '{"a":%.0s' {1..100})7$(printf '}%.0s' {1..100})
@@ -801,41 +693,18 @@ deep---1|extra = '{"b":$deep}'
 deep---2|webapi_allow = '{"A":{"method":[],"x":$deep}}'
 sound---|count = '7'
 TABLE
-    findings=$(cat <<'END'
-error: no whole number where there should be one in 4 tokens (number-1, number-2, number-3, number-4)
-    meaning: it is read as another number, 0 for a word: deadline or uses are not what they seem
-    remedy: revoke them, or update what is wrong
-error: a uid that is no user's in 3 tokens (uid-high, uid-last, uid-less)
-    meaning: programs take the lower 32 bits of it for the owner: 4294967296 is root's
-    remedy: revoke them
-warning: an id of fewer than 127 bytes in 1 token (short---)
-    meaning: it was not made by the library, and may be guessed
-    remedy: revoke them, and create others
-error: a NUL byte in a text of 1 token (nul-byte)
-    meaning: programs see what stands before it, and no look-up by that field finds such a token
-    remedy: revoke them
-warning: an empty purpose in 1 token (empty---)
-    meaning: no call deletes such a token by its purpose
-    remedy: revoke them, and create others
-warning: a deadline of 0 or less in 2 tokens (never--0, never--1)
-    meaning: there is no value for "never": the next purge deletes them
-    remedy: update --ttl gives them time
-error: no JSON object where there should be one in 8 tokens (object-1, object-2, object-3, object-4, object-5, ...)
-    meaning: such a token opens nothing, or only what stands before the fault, or cannot be saved with a use less
-    remedy: revoke them, or update --allow and --extra
-error: lists of methods that hold an array or an object in 2 tokens (nested-1, nested-2)
-    meaning: the library throws an exception where it should grant or refuse, which ends a program that does not catch it
-    remedy: revoke them, or update --allow
-warning: an API without a list of methods in 2 tokens (no-list1, no-list2)
-    meaning: it is open to calls that name no method, and to no others
-    remedy: revoke them, or update --allow
-warning: JSON of more than 100 levels in 2 tokens (deep---1, deep---2)
-    meaning: a program that reads such a token in a thread of a small stack crashes: 64 KiB have room for that many levels, 128 KiB for twice as many
-    remedy: revoke them, or update --allow and --extra
-END
-    )
-    ends 5 "$findings" doctor
-    ends 5 "$findings" doctor --repair
+    findings='error: no whole number where there should be one in 4 tokens (number-1, number-2, number-3, number-4)|it is read as another number, 0 for a word: deadline or uses are not what they seem|revoke them, or update what is wrong
+error: a uid that is no user'\''s in 3 tokens (uid-high, uid-last, uid-less)|programs take the lower 32 bits of it for the owner: 4294967296 is root'\''s|revoke them
+warning: an id of fewer than 127 bytes in 1 token (short---)|it was not made by the library, and may be guessed|revoke them, and create others
+error: a NUL byte in a text of 1 token (nul-byte)|programs see what stands before it, and no look-up by that field finds such a token|revoke them
+warning: an empty purpose in 1 token (empty---)|no call deletes such a token by its purpose|revoke them, and create others
+warning: a deadline of 0 or less in 2 tokens (never--0, never--1)|there is no value for "never": the next purge deletes them|update --ttl gives them time
+error: no JSON object where there should be one in 8 tokens (object-1, object-2, object-3, object-4, object-5, ...)|such a token opens nothing, or only what stands before the fault, or cannot be saved with a use less|revoke them, or update --allow and --extra
+error: lists of methods that hold an array or an object in 2 tokens (nested-1, nested-2)|the library throws an exception where it should grant or refuse, which ends a program that does not catch it|revoke them, or update --allow
+warning: an API without a list of methods in 2 tokens (no-list1, no-list2)|it is open to calls that name no method, and to no others|revoke them, or update --allow
+warning: JSON of more than 100 levels in 2 tokens (deep---1, deep---2)|a program that reads such a token in a thread of a small stack crashes: 64 KiB have room for that many levels, 128 KiB for twice as many|revoke them, or update --allow and --extra'
+    finds 5 "$findings"
+    finds 5 "$findings" --repair
     for name in object-1 object-4 object-7 nested-1 nested-2 no-list1 deep---2; do
         tool update "$name" --allow A:get,put
     done
@@ -849,25 +718,21 @@ END
 }
 
 @test "an id that no call can name is left to the administrator, and its token can be deleted" {
-    row sound
     condition="typeof(tid) = 'text' AND (tid = '' OR instr(tid, char(0)))"
-    remedy="sqlite3 $REAL_DB \"DELETE FROM token WHERE $condition\""
-    for value in "''" "char(0)" "'aaaaaaaa' || char(0) || '$ZEROS'"; do
-        row aaaaaaaa "tid = $value"
-        run_tool doctor --repair
-        [ "$status" -eq 5 ]
-        [[ ${lines[0]} == "error: an id that is empty or holds a NUL byte in 1 token ("* ]]
-        [ "${lines[1]}" = "    meaning: no call can name such a token: it is listed, but cannot be granted or revoked" ]
-        [ "${lines[2]}" = "    remedy: $remedy" ]
-        eval "${remedy//"$REAL_DB"/"$DB"}"
-        expect_left sound
-        expect_sound
-    done
+    unnamed="no call can name such a token: it is listed, but cannot be granted or revoked"
+    while IFS='|' read -r value shown; do
+        echo "sql \"UPDATE token SET tid = $value WHERE tid LIKE 'a%'\"|error: an id that is empty or holds a NUL byte in 1 token ($shown)|$unnamed|sqlite3 $REAL_DB \"DELETE FROM token WHERE $condition\""
+    done >"$DIR.table" <<TABLE
+''|
+replace('N$ZEROS$ZEROS', 'N', char(0))|
+replace('aaaaaaaaN$ZEROS', 'N', char(0))|aaaaaaaa
+TABLE
+    leaves <"$DIR.table"
+    expect_left bbbbbbbb
 }
 
 @test "tokens with a NULL are deleted, and each of them is one finding" {
-    rows <<'END'
-sound
+    cat >"$DIR.rows" <<'END'
 null---0-long|uid = NULL
 null---1|count = NULL
 null---2|bind_sid = NULL
@@ -877,16 +742,12 @@ null---5|extra = NULL
 null---6|webapi_allow = '[]', extra = NULL
 null---7|webapi_allow = '[]', uid = NULL
 END
-    what="a NULL in 8 tokens (null---0, null---1, null---2, null---3, null---4, ...)"
-    meaning="such a token cannot be read or granted, and every listing that meets it fails"
-    expect_finding error "$what" "$meaning" "delete them: vemo-access-token doctor --repair"
-    expect_repair "$what" "$meaning"
-    expect_left sound
+    mends <<<"rows <$DIR.rows|error: a NULL in 8 tokens (null---0, null---1, null---2, null---3, null---4, ...)|such a token cannot be read or granted, and every listing that meets it fails|delete them: vemo-access-token doctor --repair"
+    expect_left aaaaaaaa bbbbbbbb
 }
 
 @test "texts are made of bytes in place of a text, which no look-up finds" {
-    what="bytes where there should be a text in 3 tokens (bytes-1x, bytes-2x, bytes-3x)"
-    meaning="no look-up by that field finds such a token"
+    bytes="bytes where there should be a text in 3 tokens (bytes-1x, bytes-2x, bytes-3x)|no look-up by that field finds such a token"
     rows <<'END'
 sound
 bytes-1x|tid = tid || 'x'
@@ -897,8 +758,8 @@ END
     sql "UPDATE token SET tid = CAST(tid AS BLOB) WHERE tid LIKE 'bytes-1%';
          UPDATE token SET bind_sid = CAST(bind_sid AS BLOB) WHERE tid LIKE 'bytes-2%';
          UPDATE token SET function = CAST(function AS BLOB) WHERE tid LIKE 'bytes-3%'"
-    expect_finding error "$what" "$meaning" "make texts of them: vemo-access-token doctor --repair"
-    expect_repair "$what" "$meaning"
+    finds 5 "error: $bytes|make texts of them: vemo-access-token doctor --repair"
+    finds 0 "repaired: $bytes"$'\n'"$ALL_RIGHT" --repair
     sql "SELECT *, typeof(tid), typeof(bind_sid), typeof(function) FROM token" | diff "$DIR/texts" -
 
     # They stay as they are where the text is the id of another token.
@@ -911,11 +772,8 @@ END
 }
 
 @test "a backlog of expired tokens is purged, but not what was meant to last for ever" {
-    backlog="expired for more than an hour: 6 tokens (expired1, expired2, expired3, expired4, expired5, ...)
-    meaning: no program has called since, or its purges fail"
-    never='warning: a deadline of 0 or less in 1 token (meant-to)
-    meaning: there is no value for "never": the next purge deletes them
-    remedy: update --ttl gives them time'
+    backlog="expired for more than an hour: 6 tokens (expired1, expired2, expired3, expired4, expired5, ...)|no program has called since, or its purges fail"
+    never='warning: a deadline of 0 or less in 1 token (meant-to)|there is no value for "never": the next purge deletes them|update --ttl gives them time'
     rows <<'END'
 sound
 meant-to-last|deadline = -1
@@ -927,17 +785,12 @@ expired5|deadline = 5
 expired6|deadline = strftime('%s', 'now') - 4000
 expired-just-now|deadline = strftime('%s', 'now') - 3000
 END
-    run_tool doctor
-    expect 5 "$never
-warning: $backlog
-    remedy: vemo-access-token purge"
-    run_tool doctor --repair
-    expect 5 "repaired: $backlog
-$never"
+    finds 5 "$never"$'\n'"warning: $backlog|vemo-access-token purge"
+    finds 5 "repaired: $backlog"$'\n'"$never" --repair
     expect_left meant-to-last sound
 }
 
-# --- how it is told
+# How it is told.
 
 @test "findings come as JSON, and say what was repaired" {
     rows <<'END'
@@ -966,5 +819,5 @@ $never"
 
 @test "control characters of a finding are made visible" {
     row $'a\e[31mb' "deadline = 1"
-    expect_first warning 'expired for more than an hour: 1 token (a\x1b[31mb0)'
+    expect_first 'warning: expired for more than an hour: 1 token (a\x1b[31mb0)'
 }
