@@ -4,8 +4,7 @@
 load common
 
 # three_tokens: two of them begin alike, and one has expired
-three_tokens()
-{
+three_tokens() {
     rows <<'END'
 token---
 second-1

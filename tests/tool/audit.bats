@@ -5,8 +5,7 @@ load common
 
 # told [CALLER]: the lines so far, without what all of them have: priority, that the lock was free, and the caller;
 # that is who runs the test, or as given
-told()
-{
+told() {
     local caller=${1-by uid $(id -u)} login line
     login=$(cat /proc/self/loginuid 2>/dev/null) || true
     case $login in
@@ -25,8 +24,7 @@ told()
     rm "$DIR/log"
 }
 
-setup_log()
-{
+setup_log() {
     unset SUDO_UID
     export VEMO_TEST_SYSLOG=$DIR/log
 }

@@ -5,8 +5,7 @@ load common
 
 # checks: each line "ARGUMENTS|RESULT" of standard input is what check answers for a call; all of them
 # change nothing
-checks()
-{
+checks() {
     local arguments result before
     before=$(state)
     while IFS='|' read -r arguments result; do

@@ -24,8 +24,7 @@ NO_FILE="there is no database $REAL_DB; \"vemo-access-token init\" makes it"
 NO_TABLE="$REAL_DB has no table of tokens; \"vemo-access-token doctor --repair\" makes it"
 NO_DATABASE="$REAL_DB is not a token database, or is damaged (file is not a database)"
 
-setup()
-{
+setup() {
     DIR=$BATS_TEST_TMPDIR
     export VEMO_REDIRECT_DIR=$DIR/session
     DB=$VEMO_REDIRECT_DIR/vemo-access-token.db
@@ -34,14 +33,12 @@ setup()
 }
 
 # tool ARGUMENTS...: the tool, as the administrator calls it
-tool()
-{
+tool() {
     "$TOOL" "$@"
 }
 
 # text_of VARIABLE FILE: sets it to what $(<FILE) is, without a process for that
-text_of()
-{
+text_of() {
     local -n text=$1
     IFS= read -r -d '' text <"$2" || true
     while [[ $text == *$'\n' ]]; do
@@ -51,8 +48,7 @@ text_of()
 
 # run_tool ARGUMENTS...: sets $status, $output (standard output), $lines (those of it that are not empty) and $stderr.
 # It does what "run --separate-stderr" does, in a third of the time. The arguments are shown when a test fails.
-run_tool()
-{
+run_tool() {
     local streams=$BATS_TEST_TMPDIR.streams
     echo "vemo-access-token $*"
     status=0
@@ -66,8 +62,7 @@ run_tool()
 }
 
 # expect STATUS OUTPUT [STDERR]: the result of run_tool, exactly
-expect()
-{
+expect() {
     if [ "$status" -ne "$1" ] || [ "$output" != "$2" ] || [ "$stderr" != "${3-}" ]; then
         echo "expected: status $1"
         echo "output:   $2"
@@ -80,44 +75,38 @@ expect()
 }
 
 # succeeds ARGUMENTS...: the tool ends with status 0 and says nothing on standard error; what it prints is $output
-succeeds()
-{
+succeeds() {
     run_tool "$@"
     expect 0 "$output"
 }
 
 # gives OUTPUT ARGUMENTS...: the tool succeeds and prints that, and nothing on standard error
-gives()
-{
+gives() {
     run_tool "${@:2}"
     expect 0 "$1"
 }
 
 # says OUTPUT SENTENCE ARGUMENTS...: the same, but for that sentence on standard error
-says()
-{
+says() {
     run_tool "${@:3}"
     expect 0 "$1" "vemo-access-token: $2"
 }
 
 # ends STATUS OUTPUT ARGUMENTS...: the tool ends with that status, prints that, and nothing on standard error
-ends()
-{
+ends() {
     run_tool "${@:3}"
     expect "$1" "$2"
 }
 
 # fails STATUS SENTENCE ARGUMENTS...: the tool ends with that status and that sentence, and prints no result
-fails()
-{
+fails() {
     run_tool "${@:3}"
     expect "$1" "" "vemo-access-token: $2"
 }
 
 # refuses [ARGUMENTS...]: each line "ARGUMENTS|SENTENCE" of standard input, behind those, is a call that fails
 # with status 2 and that sentence. The line can redirect standard input. All of the calls change nothing.
-refuses()
-{
+refuses() {
     local arguments sentence before
     before=$(state)
     while IFS='|' read -r arguments sentence; do
@@ -129,15 +118,13 @@ refuses()
 
 # on_terminal [OPTIONS OF terminal.py...] -- ARGUMENTS...: as run_tool, with all streams on a terminal; $output is what
 # it shows, and the file $DIR/modes tells of its modes
-on_terminal()
-{
+on_terminal() {
     run --separate-stderr "$BATS_TEST_DIRNAME/terminal.py" --modes "$DIR/modes" "$@"
 }
 
 # in_namespace COMMANDS ARGUMENTS...: bash executes them as root of a namespace where file systems in memory lie over
 # /usr and /run; there the tool works on the real paths, and nothing is there yet
-in_namespace()
-{
+in_namespace() {
     local overlay='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
         mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr &&
         mount -t tmpfs tmpfs /run'
@@ -150,41 +137,35 @@ in_namespace()
 }
 
 # commands_of_tool: the commands that help lists
-commands_of_tool()
-{
+commands_of_tool() {
     tool --help | sed -n '/^Commands:/,/^$/s/^  \([a-z]\{1,\}\) .*/\1/p'
 }
 
 # options_of [COMMAND]: the long options that help lists, of a command or of the tool itself
-options_of()
-{
+options_of() {
     tool "$@" --help | sed -nE 's/^  (-[a-zA-Z],)?(--[a-z-]+).*/\2/p' | LC_ALL=C sort
 }
 
 # need_store: makes the store, if there is none
-need_store()
-{
+need_store() {
     [ -e "$DB" ] || tool init >/dev/null
 }
 
 # a_token [OPTIONS...]: creates a token and prints its id
-a_token()
-{
+a_token() {
     need_store
     tool create --uid 0 --function VPN "$@"
 }
 
 # inserted NAME [COLUMN = VALUE, ...]: sets $inserted to statements that insert a token as $ROW has it, but for
 # these columns. Its id is the name and zeros.
-inserted()
-{
+inserted() {
     printf -v inserted "INSERT INTO token VALUES ('%s%0*d', %s);" "$1" $((ID_LENGTH - ${#1})) 0 "$ROW"
     [ -z "${2-}" ] || inserted+="UPDATE token SET $2 WHERE rowid = last_insert_rowid();"
 }
 
 # row NAME [COLUMN = VALUE, ...]: inserts that token behind the tool's back
-row()
-{
+row() {
     local inserted
     need_store
     inserted "$@"
@@ -192,8 +173,7 @@ row()
 }
 
 # rows: the same for each line "NAME|COLUMN = VALUE, ..." of standard input
-rows()
-{
+rows() {
     local name columns inserted statements=
     need_store
     while IFS='|' read -r name columns; do
@@ -204,16 +184,14 @@ rows()
 }
 
 # many_rows NUMBER [COLUMN = VALUE, ...]: inserts so many tokens, whose ids are numbers from 1 on
-many_rows()
-{
+many_rows() {
     need_store
     sql "BEGIN; WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < $1)
          INSERT INTO token SELECT printf('%0${ID_LENGTH}d', i), $ROW FROM n; ${2:+UPDATE token SET $2;} COMMIT"
 }
 
 # whole: the lines of standard input as a whole export, with the end behind them
-whole()
-{
+whole() {
     local lines
     lines=$(mktemp "$BATS_TEST_TMPDIR.XXXXXX")
     cat >"$lines"
@@ -223,14 +201,12 @@ whole()
 }
 
 # sql STATEMENTS: on the database, behind the tool's back
-sql()
-{
+sql() {
     sqlite3 -cmd "PRAGMA synchronous = OFF" "$DB" "$1"
 }
 
 # expect_left NAME...: these tokens are there, in order, and no others; their ids are the names and zeros
-expect_left()
-{
+expect_left() {
     local left
     left=$(sql "SELECT rtrim(tid, '0') FROM token ORDER BY 1" | xargs)
     [ "$left" = "$*" ] || {
@@ -240,8 +216,7 @@ expect_left()
 }
 
 # state: what there is of the private directory, to the byte
-state()
-{
+state() {
     [ ! -e "$VEMO_REDIRECT_DIR" ] || find "$VEMO_REDIRECT_DIR" -printf '%P %y %m %s\n' | sort
     [ ! -f "$DB" ] || sha256sum "$DB"
 }

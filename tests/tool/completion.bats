@@ -5,8 +5,7 @@
 load common
 
 # Files to complete, and in the tool's place a program that tells that it was called.
-prepare()
-{
+prepare() {
     COMPLETION=${TOOL%/tests/*}/tools/completion
     mkdir -p "$DIR/bin" "$DIR/home" "$DIR/files/backups"
     touch "$DIR/files/data file.json" "$DIR/files/backups/tokens"
@@ -20,12 +19,10 @@ prepare()
 # tab SHELL ARGUMENTS...: types each line of standard input with a tab behind it into this interactive shell, which
 # has read $DIR/setup and writes what it offers into $DIR/offered. Prints, for each line, the words that it has become,
 # and what was offered, behind bars.
-tab()
-{
+tab() {
     local line answers=(--answer '$ ' ". '$DIR/setup'"$'\r' --answer READY)
     cat >>"$DIR/setup" <<END
-told()
-{
+told() {
     offered=\$(LC_ALL=C sort -u '$DIR/offered' | sed '/^\$/d' | paste -sd '|')
     echo "\${offered:+|\$offered}EN""D"
     : >'$DIR/offered'
@@ -41,8 +38,7 @@ END
     grep -aoE '<vemo-access-token>.*END$' <<<"$output" | sed 's/END$//; s/^<//; s/></,/g; s/>//'
 }
 
-bash_tab()
-{
+bash_tab() {
     local framework=/usr/share/bash-completion/bash_completion
     [ -e "$framework" ] || skip "bash-completion is not installed"
     cat >"$DIR/setup" <<END
@@ -55,8 +51,7 @@ END
     tab bash --norc --noprofile -i
 }
 
-zsh_tab()
-{
+zsh_tab() {
     cat >"$DIR/setup" <<END
 fpath=('$COMPLETION' \$fpath)
 autoload -Uz compinit
@@ -80,8 +75,7 @@ END
 }
 
 # What fish offers; the line becomes the first where all others begin with it.
-fish_tab()
-{
+fish_tab() {
     fish --no-config -c "source '$COMPLETION/vemo-access-token.fish'
         while read --line line
             set words (string split ' ' \$line)
@@ -102,8 +96,7 @@ vemo-access-token show '
 
 # completes SHELL [LINES]: the shell offers the commands, options and values that there are, and no others, and besides
 # what the lines say; and it completes the cases
-completes()
-{
+completes() {
     local command
     command -v "$1" >/dev/null || skip "$1 is not installed"
     prepare

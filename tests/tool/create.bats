@@ -4,8 +4,7 @@
 load common
 
 # column COLUMN TID: of the token of that id
-column()
-{
+column() {
     sql "SELECT $1 FROM token WHERE tid = '$2'"
 }
 
@@ -110,8 +109,7 @@ vemo-access-token: --allow: "c d" holds a blank, which is part of the name' ]
 }
 
 # nested LEVELS: an object in an object in an object...
-nested()
-{
+nested() {
     printf '{"a":%.0s' $(seq 2 "$1")
     printf '{}'
     printf '}%.0s' $(seq 2 "$1")

@@ -7,15 +7,13 @@ load common
 MALFORMED="$REAL_DB is damaged (database disk image is malformed); \"vemo-access-token doctor\" says how badly"
 READ_ONLY="$REAL_DB cannot be written to (attempt to write a readonly database); \"vemo-access-token doctor\" says why"
 
-teardown()
-{
+teardown() {
     # So that bats can remove what a failed test leaves.
     [ ! -d "$VEMO_REDIRECT_DIR" ] || chmod 0700 "$VEMO_REDIRECT_DIR"
 }
 
 # a_store: ten tokens, on several pages; $ID is one of them, and $DIR/other holds one that is none of them
-a_store()
-{
+a_store() {
     ID=$(a_token --allow Api:get --uses 5)
     tool export 2>/dev/null | sed '$d; s/"tid":"......../"tid":"________/' | whole >"$DIR/other"
     whole </dev/null >"$DIR/none"
@@ -25,8 +23,7 @@ a_store()
 }
 
 # commands: each way to open the database, but for doctor
-commands()
-{
+commands() {
     cat <<TABLE
 list
 list --count
@@ -60,8 +57,7 @@ TABLE
 }
 
 # all_fail SENTENCE [PATTERN]: the commands that match the pattern end with that, and leave everything as it was
-all_fail()
-{
+all_fail() {
     local before arguments
     [ ! -f "$DB" ] || cp -f "$DB" "$DIR/before"
     before=$(ls -Al "$VEMO_REDIRECT_DIR" 2>&1 || true)
@@ -74,20 +70,17 @@ all_fail()
 }
 
 # spoil PAGE: random bytes or, with /dev/zero as second argument, zeroes in the place of that page
-spoil()
-{
+spoil() {
     dd if="${2-/dev/urandom}" of="$DB" bs=4096 seek=$(($1 - 1)) count=1 conv=notrunc status=none
 }
 
 # root: the page where the table begins
-root()
-{
+root() {
     sql "SELECT rootpage FROM sqlite_schema WHERE name = 'token'"
 }
 
 # leaf: a page among the tokens
-leaf()
-{
+leaf() {
     sql "SELECT max(pageno) FROM dbstat WHERE name = 'token' AND pagetype = 'leaf'"
 }
 

@@ -11,22 +11,19 @@ SESSION=/usr/vemo/etc/private/session
 LOCK=/run/vemo-access-token.lock
 
 # bin: a directory with the tool that is tested
-bin()
-{
+bin() {
     mkdir -p "$DIR/bin"
     ln -sf "$TOOL" "$DIR/bin/vemo-access-token"
     echo "$DIR/bin"
 }
 
 # task NAME ARGUMENTS...: runs one, as run_tool does the tool
-task()
-{
+task() {
     PATH=$(bin):$PATH run --separate-stderr "$DEPLOYMENT/libexec/$1" "${@:2}"
 }
 
 # paths FILE [BEGINNING]: what stands behind that on lines of the file, sorted
-paths()
-{
+paths() {
     sed -n "s,^ *${2-}/,/,p" "$DEPLOYMENT/$1" | LC_ALL=C sort
 }
 
@@ -141,8 +138,7 @@ paths()
 }
 
 # logout [NAME=VALUE...]: runs the hook as pam_exec does; $told is what it logs
-logout()
-{
+logout() {
     local hook=$DIR/revoke-session bin
     bin=$(bin)
     printf '#!/bin/sh\necho "$@" >>"%s/told"\n' "$DIR" >"$bin/logger"

@@ -13,29 +13,25 @@ ALL_RIGHT="no findings"
 
 # finds STATUS FINDINGS [ARGUMENTS...]: doctor ends with that and tells these findings, each of them here on one line
 # "SEVERITY: WHAT|MEANING|REMEDY". On standard error it says $SENTENCE, if that is set.
-finds()
-{
+finds() {
     run_tool doctor "${@:3}"
     output=${output//$'\n    meaning: '/|}
     output=${output//$'\n    remedy: '/|}
     expect "$1" "$2" "${SENTENCE:+vemo-access-token: $SENTENCE}"
 }
 
-expect_sound()
-{
+expect_sound() {
     gives "$ALL_RIGHT" doctor
 }
 
 # expect_first FINDING: doctor's first line
-expect_first()
-{
+expect_first() {
     run_tool doctor
     [ "$status $stderr${lines[0]}" = "5 $1" ]
 }
 
 # fresh: a store of two tokens and a backup of them, and nothing else in $DIR
-fresh()
-{
+fresh() {
     cd "$DIR"
     rm -rf ./*
     if [ ! -e "$DIR.fresh" ]; then
@@ -48,8 +44,7 @@ fresh()
 
 # leaves: each line of standard input is "CHANGE|SEVERITY: WHAT|MEANING|REMEDY". After the change of a fresh store,
 # doctor finds that and no more, and leaves all as it is, with --repair too. Where the remedy is commands, they help.
-leaves()
-{
+leaves() {
     local change finding remedy before
     while IFS='|' read -r change finding; do
         echo "$change"
@@ -71,8 +66,7 @@ leaves()
 }
 
 # mends: the same, but with --repair all becomes right
-mends()
-{
+mends() {
     local change finding
     while IFS='|' read -r change finding; do
         echo "$change"
@@ -87,8 +81,7 @@ $ALL_RIGHT" --repair
 }
 
 # replace_database BACKUP: as the remedies say; without a backup of that name, one is made now
-replace_database()
-{
+replace_database() {
     [ -e "$1" ] || tool export "$DIR/$1" 2>/dev/null
     mv "$VEMO_REDIRECT_DIR" away
     tool init
@@ -96,15 +89,13 @@ replace_database()
 }
 
 # expect_made: the directory, the file and an empty table are there, as programs expect them
-expect_made()
-{
+expect_made() {
     [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" | xargs)" = "700 700" ]
     [ "$(sql "PRAGMA auto_vacuum; SELECT count(*) FROM token" | xargs)" = "1 0" ]
 }
 
 # remake OLD NEW: another table of tokens in the place of the library's, with one for the other in its statement
-remake()
-{
+remake() {
     local made
     made=$(sql "SELECT sql FROM sqlite_schema WHERE name = 'token'")
     sql "ALTER TABLE token RENAME TO library; ${made/"$1"/"$2"};
@@ -568,8 +559,7 @@ TABLE
 
 # half_change [WHEN]: a store as it is when a program or the machine stops in the middle of a change: with a journal,
 # of an hour ago, or of then
-half_change()
-{
+half_change() {
     if [ ! -e "$DIR/half" ]; then
         many_rows 40 "extra = json_object('data', hex(zeroblob(1000)))"
         # What does not fit into the cache is written before the end of the change.
@@ -589,8 +579,7 @@ SQL
 }
 
 # expect_undone: the half change is undone
-expect_undone()
-{
+expect_undone() {
     [ "$(sql "SELECT function, count(*) FROM token GROUP BY 1; PRAGMA integrity_check" | xargs)" = "VPN|40 ok" ]
 }
 

@@ -5,8 +5,7 @@ load common
 
 # on_full_disk COMMANDS: bash executes them where the disk has no room left beside a store of one token, $ID, and
 # a file
-on_full_disk()
-{
+on_full_disk() {
     mkdir "$DIR/disk"
     cd "$DIR" || return
     unshare --mount --propagation private mount -t tmpfs tmpfs disk 2>/dev/null || skip "no right to mount"

@@ -7,14 +7,12 @@ ROW="'session-1', 0, 9999999999, 5, 1000000000, 'VPN',
      '{\"Api\":{\"method\":[\"get\",\"list\"]},\"Bare\":{\"method\":[]}}', '{\"n\":[0.5,\"ü\"]}'"
 
 # all_tokens: but for the order, which a saved token loses
-all_tokens()
-{
+all_tokens() {
     sql "SELECT * FROM token ORDER BY tid"
 }
 
 # uses: of each token
-uses()
-{
+uses() {
     sql "SELECT substr(tid, 1, 8), count FROM token ORDER BY tid" | xargs
 }
 

@@ -6,8 +6,7 @@ load common
 TABLE_COLUMNS="tid TEXT primary key NOT NULL,bind_sid TEXT,uid INTEGER,deadline INTEGER default -1,count INTEGER default 1,create_time INTEGER default CURRENT_TIMESTAMP,function TEXT NOT NULL,webapi_allow TEXT,extra TEXT"
 
 # expect_complete: directory, file and table are there, as programs expect them
-expect_complete()
-{
+expect_complete() {
     [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" | xargs)" = "700 700" ]
     [ "$(sql "SELECT sql FROM sqlite_schema WHERE name = 'token'")" = "CREATE TABLE token ($TABLE_COLUMNS)" ]
     [ "$(sql "PRAGMA auto_vacuum")" -eq 1 ] # FULL

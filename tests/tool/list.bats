@@ -4,15 +4,13 @@
 load common
 
 # lists "NAME NAME..." ARGUMENTS...: list gives these tokens, in this order
-lists()
-{
+lists() {
     gives "${1// /$'\n'}" list --field tid "${@:2}"
 }
 
 # selects [ARGUMENTS...]: each line "LETTERS|ARGUMENTS" of standard input, with those behind, selects these tokens, of one
 # letter each. All of the calls change nothing.
-selects()
-{
+selects() {
     local letters arguments before
     before=$(state)
     while IFS='|' read -r letters arguments; do
@@ -27,14 +25,12 @@ selects()
 }
 
 # none_matches ARGUMENTS...: there is no such token, and nothing is printed, not even the head of a table
-none_matches()
-{
+none_matches() {
     fails 0 "no token matches" list "$@"
 }
 
 # at SECONDS: as tables show a time
-at()
-{
+at() {
     date -d "@$1" '+%Y-%m-%d %H:%M:%S'
 }
 

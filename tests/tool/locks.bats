@@ -11,8 +11,7 @@ READING="BEGIN; SELECT count(*) FROM token;"
 
 # lock STATEMENTS: another process executes them and keeps the lock that they take, until stream 7 tells it
 # to commit and go
-lock()
-{
+lock() {
     rm -f "$DIR/to-holder" "$DIR/from-holder"
     mkfifo "$DIR/to-holder" "$DIR/from-holder"
     sqlite3 "$DB" <"$DIR/to-holder" >"$DIR/from-holder" 3>&- 9>&- &
@@ -26,23 +25,20 @@ lock()
 }
 
 # unlock: ends that process
-unlock()
-{
+unlock() {
     exec 7>&- 8<&-
     wait "$HOLDER"
 }
 
 # lock_calls: another process, $LOCKER, takes the lock that programs take for a call
-lock_calls()
-{
+lock_calls() {
     flock "$VEMO_REDIRECT_DIR.lock" sh -c 'echo >"$0"; exec sleep 60' "$DIR/locked" 3>&- 5<&- 9>&- &
     LOCKER=$!
     until [ -e "$DIR/locked" ]; do :; done
 }
 
 # unlock_calls: ends that process
-unlock_calls()
-{
+unlock_calls() {
     pkill -P "$LOCKER"
     wait "$LOCKER" || true
 }
@@ -50,8 +46,7 @@ unlock_calls()
 # run_waiting STATEMENTS TIMES ARGUMENTS...: runs the tool while another process holds the lock that the statements
 # take, and lets that go when the tool has waited that often; ahead of that, it gets $SIGNAL, if that is set. Fails
 # when it has not waited.
-run_waiting()
-{
+run_waiting() {
     local times=$2 watcher
     lock "$1"
     shift 2
@@ -80,8 +75,7 @@ run_waiting()
 }
 
 # a_store: a token with five uses, $ID, and an expired one; $DIR/other holds a third that is not in it
-a_store()
-{
+a_store() {
     ID=$(a_token --allow Api:get --uses 5 --ttl 90m) # for half an hour, it will show "in 1 h"
     tool export 2>/dev/null | sed '$d; s/"tid":"......../"tid":"________/' | whole >"$DIR/other"
     sql "INSERT INTO token SELECT 'old' || tid, 'old', uid, strftime('%s', 'now') - 5400, count, create_time, function,
@@ -89,8 +83,7 @@ a_store()
 }
 
 # stored: uses and session of each token
-stored()
-{
+stored() {
     sql "SELECT group_concat(count || '/' || bind_sid, ' ') FROM (SELECT * FROM token ORDER BY deadline, tid)"
 }
 
@@ -216,8 +209,7 @@ TABLE
 }
 
 # locked_commands: those that fail while the database is locked, with what they say besides
-locked_commands()
-{
+locked_commands() {
     cat <<TABLE
 list|
 show $ID|
@@ -306,8 +298,7 @@ TABLE
 }
 
 # at_once NUMBER ARGUMENTS...: prints what so many runs at the same time print, and their statuses, sorted
-at_once()
-{
+at_once() {
     local i pids=() directory
     directory=$(mktemp -d "$DIR/XXXXXX")
     for ((i = 0; i < $1; ++i)); do
@@ -341,22 +332,19 @@ at_once()
 
 # calling: a program that has read the tokens, opens no transaction and takes no lock. It does what
 # stream 7 says, and ends with it.
-calling()
-{
+calling() {
     lock ".timeout 5000
 CREATE TEMP TABLE read AS SELECT * FROM token;"
 }
 
 # until_sql NUMBER STATEMENT: waits until it gives that
-until_sql()
-{
+until_sql() {
     until [ "$(sqlite3 -cmd ".timeout 5000" "$DB" "$2")" = "$1" ]; do :; done
 }
 
 # beside_call NUMBER STATEMENT CHANGE ARGUMENTS...: as run_tool, beside such a program, which makes its change when
 # the statement gives the number, and ends
-beside_call()
-{
+beside_call() {
     calling
     "$TOOL" "${@:4}" >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
     until_sql "$1" "$2"
@@ -431,8 +419,7 @@ TABLE
 
 # Calls that take no lock: while one waits to write the token back, the next one begins, and reads what the first
 # writes. They give up after a second, or after 200 calls. Prints how many have written.
-overlapping_calls()
-{
+overlapping_calls() {
     exec /usr/bin/python3 -c '
 import sqlite3, sys, time
 def connect():

@@ -6,26 +6,22 @@ load common
 PAGE=$BATS_TEST_DIRNAME/../../man/vemo-access-token.8
 
 # section TITLE: the source between this section's title and the next
-section()
-{
+section() {
     sed -n "/^\.Sh $1\$/,/^\.Sh /p" "$PAGE" | sed 1d
 }
 
 # The commands that the section COMMANDS describes.
-described()
-{
+described() {
     section COMMANDS | sed -n 's/^\.It Ic \([a-z]*\).*/\1/p'
 }
 
 # description COMMAND: what it says of one
-description()
-{
+description() {
     section COMMANDS | sed -n "/^\.It Ic $1\( \|\$\)/,/^\.\(It Ic\|Ss\) /p" | sed '$d'
 }
 
 # The long options on standard input, each once.
-long_options()
-{
+long_options() {
     grep -oE 'Fl -[a-z][a-z-]*' | sed 's/^Fl /-/' | LC_ALL=C sort -u
 }
 
@@ -75,8 +71,7 @@ long_options()
 }
 
 # locked ARGUMENTS...: the tool, while another process holds a lock
-locked()
-{
+locked() {
     sqlite3 "$DB" "BEGIN EXCLUSIVE;" ".shell VEMO_TEST_HASTE=1 '$TOOL' $*"
 }
 
@@ -124,22 +119,19 @@ TABLE
 }
 
 # What there is on this machine.
-all()
-{
+all() {
     sql "SELECT * FROM token ORDER BY tid"
 }
 
 # Prints each literal block of the examples as a file of its own, in order.
-example_blocks()
-{
+example_blocks() {
     section EXAMPLES | sed 's/\\-/-/g; s/\\e/\\/g' |
         awk -v dir="$1" '/^\.Ed/ { file = "" } file { print >file } /^\.Bd -literal/ { file = dir "/" 100 + n++ }'
 }
 
 # Runs a command of the page, with paths and users of the test's own, and compares what it prints with
 # what the page shows of that.
-run_example()
-{
+run_example() {
     local command shown=$2 expected=0
     command=$(sed "s|/usr/vemo/etc/private/session|$VEMO_REDIRECT_DIR|g; s|/root/|$DIR/|g
                    s|/var/backups/|$DIR/|g; s|--user backup|--user daemon|; s|--user alice|--user root|" <<<"$1")
@@ -154,8 +146,7 @@ run_example()
 }
 
 # The commands of a block, each with what the page shows of its output.
-run_block()
-{
+run_block() {
     local line command= shown=
     while IFS= read -r line; do
         if [[ $line == "# "* ]]; then
@@ -171,8 +162,7 @@ run_block()
 }
 
 # tool_on_path: the tool, by its name, on this machine and on that of "ssh root@new"
-tool_on_path()
-{
+tool_on_path() {
     mkdir "$DIR/bin"
     ln -s "$TOOL" "$DIR/bin/vemo-access-token"
     PATH=$DIR/bin:$PATH

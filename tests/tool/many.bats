@@ -5,8 +5,7 @@ load common
 
 TOKENS=30000
 
-setup_file()
-{
+setup_file() {
     export VEMO_REDIRECT_DIR=$BATS_FILE_TMPDIR/many
     "$VEMO_TEST_TOOL" init >/dev/null
     sqlite3 "$VEMO_REDIRECT_DIR/vemo-access-token.db" "PRAGMA journal_mode = OFF; PRAGMA synchronous = OFF;
@@ -18,8 +17,7 @@ setup_file()
     "$VEMO_TEST_TOOL" export "$BATS_FILE_TMPDIR/exported" 2>/dev/null
 }
 
-setup()
-{
+setup() {
     DIR=$BATS_TEST_TMPDIR
     export VEMO_REDIRECT_DIR=$DIR/session
     DB=$VEMO_REDIRECT_DIR/vemo-access-token.db
@@ -30,8 +28,7 @@ setup()
 
 # beside ARGUMENTS...: runs the tool, with 64 MB in all, beside a program that creates a token each 20 ms. Each creation
 # is made, and none waits for a second.
-beside()
-{
+beside() {
     local creations absent calls there longest
     coproc creations { exec "$VEMO_TEST_CREATIONS" 20; }
     # shellcheck disable=SC2154 # coproc sets it

@@ -3,8 +3,7 @@
 
 load common
 
-setup()
-{
+setup() {
     [ "$(id -u)" -eq 0 ] || skip "needs root"
     DIR=$BATS_TEST_TMPDIR
     PLAIN=$(realpath "$(dirname "$TOOL")/../../tools/vemo-access-token")
@@ -22,8 +21,7 @@ setup()
     [ "$ready" = ready ] || skip "$(cat "$DIR/reason")"
 }
 
-teardown()
-{
+teardown() {
     [ -n "${HOLDER-}" ] || return 0
     exec 7>&-
     wait "$HOLDER" || true
@@ -31,19 +29,16 @@ teardown()
 }
 
 # inside COMMAND...: in that namespace
-inside()
-{
+inside() {
     nsenter --target "$HOLDER" --mount --root -- "$@"
 }
 
-run_inside()
-{
+run_inside() {
     run --separate-stderr nsenter --target "$HOLDER" --mount --root -- "$PLAIN" "$@"
 }
 
 # owners_and_modes: of the database and the directories above
-owners_and_modes()
-{
+owners_and_modes() {
     inside stat -c '%n %u:%g %a %F' /usr/vemo/etc /usr/vemo/etc/private "$REAL_DIRECTORY" "$REAL_DB" | sed "s,^/usr/vemo/,,"
 }
 

@@ -4,8 +4,7 @@
 load common
 
 # Tokens of two users, purposes and sessions.
-six_tokens()
-{
+six_tokens() {
     rows <<'END'
 aaaaaaaa|bind_sid = 's1', create_time = 0
 bbbbbbbb|bind_sid = 's2', create_time = 0

@@ -6,8 +6,7 @@ load common
 ROW="'s ''1''', 4294967294, 9999999999, 5, 1000000000, 'File' || char(10) || 'share', '{ \"Api\":1,\"Api\":2', '[1e400'"
 
 # kept: what a copy keeps of each token, and its own id
-kept()
-{
+kept() {
     sql "SELECT quote(tid), hex(bind_sid), uid, deadline, count, hex(function), hex(webapi_allow), hex(extra) FROM token
          ORDER BY tid" | sed "${1-}"
 }
@@ -61,8 +60,7 @@ TABLE
 
 # interrupted SQL ARGUMENTS...: rotate, whose result has no room in its pipe; once the change is made, the SQL is
 # done behind its back, and it gets a signal
-interrupted()
-{
+interrupted() {
     local pid change=$1
     shift
     mkfifo "$DIR/pipe"

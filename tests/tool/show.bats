@@ -4,8 +4,7 @@
 load common
 
 # shows_at NUMBER ARGUMENTS...: this way of giving an id finds the token of that number.
-shows_at()
-{
+shows_at() {
     gives "$1" show --field create_time "${@:2}"
 }
 

@@ -4,8 +4,7 @@
 load common
 
 # Tokens of several purposes and owners: two expired, two without limit.
-some_tokens()
-{
+some_tokens() {
     ROW="'', 0, 9999999999, 1, 0, 'VPN',  '{}', '{}'"
     rows <<'END'
 a|tid = 'a', count = -1
@@ -17,8 +16,7 @@ END
 
 # check_metrics: the result holds nothing but comments and samples of the exposition format, a family's
 # samples below its type, no sample twice, in UTF-8
-check_metrics()
-{
+check_metrics() {
     /usr/bin/python3 -c '
 import re, sys
 text = sys.stdin.buffer.read().decode("utf-8", "strict")

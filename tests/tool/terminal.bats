@@ -5,14 +5,12 @@ load common
 
 ESC=$'\e'
 
-setup_file()
-{
+setup_file() {
     export LC_ALL=C.UTF-8
 }
 
 # below TITLE: all that stands below a title of the table in $output, joined, without blanks
-below()
-{
+below() {
     awk -v title="$1" '
         NR == 1 {
             start = index($0, title)
@@ -274,8 +272,7 @@ TABLE
 EVIL=$'x\e[31my\a\x7f\xc2\x9b2Jz\x9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\U000e0041\ufe0fÛ\U00010000'
 
 # in_all_forms [LOCALE]: prints on a terminal what the tool says of tokens that hold $EVIL, in each form
-in_all_forms()
-{
+in_all_forms() {
     export EVIL ID EVIL_ID=${EVIL:6}$ZEROS NO_COLOR=1
     cat >"$DIR/commands" <<'TABLE'
 list
@@ -347,8 +344,7 @@ TABLE
 }
 
 # bar TITLE: a full one ends on the first line of $output, and it grew from an empty one
-bar()
-{
+bar() {
     local first="$1 [                                        ]   0 %"
     local last="$1 [########################################] 100 %"
     [[ ${lines[0]} == $'\r'"$first"$'\r'* ]] && [[ ${lines[0]} == *$'\r'"$last" ]] || {

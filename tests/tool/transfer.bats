@@ -10,14 +10,12 @@ LINE='{"bind_sid":"","count":1,"create_time":0,"deadline":9999999999,"extra":{},
 NAMELESS='openat O_TMPFILE|95'
 
 # a_tid NAME: the id of the token of that name
-a_tid()
-{
+a_tid() {
     printf '%s%0*d' "$1" $((ID_LENGTH - ${#1})) 0
 }
 
 # written NAME...: what export writes of these tokens, but for the end
-written()
-{
+written() {
     local name
     for name; do
         echo "${LINE/TID/$(a_tid "$name")}"
@@ -25,20 +23,17 @@ written()
 }
 
 # refuses_file REASON [OPTION...]: import refuses $DIR/file, for this reason
-refuses_file()
-{
+refuses_file() {
     fails 2 "$DIR/file: $1; nothing of this file was imported" import "${@:2}" "$DIR/file"
 }
 
-all_rows()
-{
+all_rows() {
     sql "SELECT hex(tid), hex(bind_sid), uid, deadline, count, create_time, hex(function), hex(webapi_allow), hex(extra)
          FROM token ORDER BY tid"
 }
 
 # odd_tokens NUMBER: so many tokens of odd texts, numbers and data, and one without an id
-odd_tokens()
-{
+odd_tokens() {
     local seed=${VEMO_TEST_SEED-1}
     echo "seed $seed"
     row without-id "tid = '', deadline = 1"
@@ -374,16 +369,6 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
     [ "$(stat -c %a "$DB")" = 700 ]
 }
 
-@test "an object nested as deeply as create takes comes back from an export" {
-    tool init
-    deep=$(printf '{"a":%.0s' {1..999})1$(printf '}%.0s' {1..999})
-    tool create --uid 0 --function VPN --extra "$deep"
-    tool export "$DIR/file"
-    sql "DELETE FROM token"
-    gives "1 token imported" import "$DIR/file"
-    [ "$(sql "SELECT extra FROM token")" = "$deep" ]
-}
-
 @test "import passes over blank lines, and takes an end without its line feed" {
     tool init
     printf '\n%s\n \n\t\n%s\r\n\r\n%s\n' "$(written A)" "$(written B)" "$(written C)" | whole | head -c -1 >"$DIR/file"
@@ -397,7 +382,7 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
     written A B | whole >"$DIR/whole"
     while IFS=';' read -r edit tokens flaw; do
         echo "$edit"
-        eval "$edit" <"$DIR/whole" >"$DIR/file"
+        eval "$edit" <"$DIR/whole" >"$DIR/file" || true
         run_tool import "$DIR/file"
         expect 2 "" "vemo-access-token: $DIR/file: $flaw; nothing of this file was imported; --partial imports what is there"
         cmp "$DB" "$DIR/before"
@@ -405,6 +390,7 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
         cp "$DIR/before" "$DB"
     done <<'TABLE'
 head -c 0;0 tokens;the export has no end
+VEMO_REDIRECT_DIR=$DIR/nowhere tool export 2>/dev/null;0 tokens;the export has no end
 head -n 2;2 tokens;the export has no end
 head -n 2 | head -c -1;2 tokens;the export has no end
 head -n 2 | head -c -2;1 token;the export has no end, and line 2 is cut off
@@ -425,88 +411,54 @@ TABLE
     cp "$DB" "$DIR/before"
     written A B | whole >"$DIR/whole"
     deep=$(printf '{"a":%.0s' {1..1000})1$(printf '}%.0s' {1..1000})
-    while IFS='~' read -r edit reason; do
-        echo "$edit"
-        eval "$edit" <"$DIR/whole" >"$DIR/file"
-        for option in "" --partial; do
-            run_tool import $option "$DIR/file"
-            [ "$status$output" = 2 ]
-            [[ $stderr == "vemo-access-token: $DIR/file: line "$reason"; nothing of this file was imported" ]]
+    while IFS='~' read -r -a row; do
+        for edit in "${row[@]:1}"; do
+            echo "$edit"
+            eval "$edit" <"$DIR/whole" >"$DIR/file"
+            for option in "" --partial; do
+                run_tool import $option "$DIR/file"
+                [ "$status$output" = 2 ]
+                [[ $stderr == "vemo-access-token: $DIR/file: line "${row[0]}"; nothing of this file was imported" ]]
+            done
         done
     done <<'TABLE'
-cat - <(echo)~4 stands behind the end of the export
-cat - <(written C)~4 stands behind the end of the export
-cat - <(printf '{')~4 stands behind the end of the export
-cat - "$DIR/whole"~4 stands behind the end of the export
-sed 3p~4 stands behind the end of the export
-sed '3s/}}/,"x":1}}/'~3 has no "tid"
-sed '3s/}}/},"x":1}/'~3 has no "tid"
-sed '3s/2}/-2}/'~3 has no "tid"
-sed '3s/2}/2.5}/'~3 has no "tid"
-sed '3s/:"[^"]*"/:1/'~3 has no "tid"
-sed '3s/:.*/:[1,2]}/'~3 has no "tid"
-sed '2s/"tid":"[^"]*",//'~2 has no "tid"
-sed '2s/"bind_sid":"",//'~2 has no "bind_sid"
-sed '2s/"uid":0,//'~2 has no "uid"
-sed '2s/"deadline":9999999999,//'~2 has no "deadline"
-sed '2s/"count":1,//'~2 has no "count"
-sed '2s/"create_time":0,//'~2 has no "create_time"
-sed '2s/"function":"VPN",//'~2 has no "function"
-sed '2s/,"webapi_allow":{}//'~2 has no "webapi_allow"
-sed '2s/"extra":{},//'~2 has no "extra"
-sed '2s/"tid":"[^"]*"/"tid":1/'~2 "tid" is not a string
-sed '2s/"bind_sid":""/"bind_sid":null/'~2 "bind_sid" is not a string
-sed '2s/"VPN"/["VPN"]/'~2 "function" is not a string
-sed '2s/"uid":0/"uid":"0"/'~2 "uid" is not a whole number
-sed '2s/"uid":0/"uid":9223372036854775808/'~2 "uid" is not a whole number
-sed '2s/9999999999/null/'~2 "deadline" is not a whole number
-sed '2s/9999999999/9223372036854775808/'~2 "deadline" is not a whole number
-sed '2s/"count":1/"count":1.5/'~2 "count" is not a whole number
-sed '2s/"count":1/"count":true/'~2 "count" is not a whole number
-sed '2s/"count":1/"count":Infinity/'~2 "count" is not a whole number
-sed '2s/"count":1/"count":-9223372036854775809/'~2 "count" is not a whole number
-sed '2s/"create_time":0/"create_time":{}/'~2 "create_time" is not a whole number
-sed '2s/"extra":{}/&,"other":1/'~2 "other" is not a field of a token
-sed '2s/VPN/V\\u0000N/'~2 "function" holds a NUL character
-sed '2s/"bind_sid":"/&\\u0000/'~2 "bind_sid" holds a NUL character
-sed '2s/"tid":"B/&\\u0000/'~2 "tid" holds a NUL character
-sed '2s/.*/[]/'~2 is not a JSON object
-sed '2s/.*/[&]/'~2 is not a JSON object
-sed '2s/.*/x/'~2 is not JSON: *
-sed '2s/.*/1/'~2 is not JSON: *
-sed '2s/.*/"a"/'~2 is not JSON: *
-sed '2s/.*/null/'~2 is not JSON: *
-sed '2s/.*/{/'~2 is not JSON: *
-sed '1s/}$//'~1 is not JSON: *
-sed '2s/$/,/'~2 is not JSON: *
-sed '2s/.*/&&/'~2 is not JSON: *
-sed '2s/$/ x/'~2 is not JSON: *
-sed "2s/.*/'&'/"~2 is not JSON: *
-sed '2s,^,//,'~2 is not JSON: *
-sed '2s/1//'~2 is not JSON: *
-sed '2s/VPN/\\ud800/'~2 is not JSON: *
-sed '2s/VPN/\\x/'~2 is not JSON: *
-sed '2s/"count":1/&,"count":2/'~2 is not JSON: *
-sed '2s/://'~2 is not JSON: *
-head -n 1 | cat - <(printf x)~2 is not JSON: *
-head -n 1 | cat - <(printf '{\0')~2 holds a NUL byte
-sed '1s/$/\x00/'~1 holds a NUL byte
-sed '1s/$/\x00{broken/'~1 holds a NUL byte
-sed '1s/^/\x00/'~1 holds a NUL byte
-sed "2s/{}/$deep/"~2 is nested too deeply for JSON
+4 stands behind the end of the export~cat - <(echo)~cat - <(written C)~cat - <(printf '{')~cat - "$DIR/whole"~sed 3p
+3 has no "tid"~sed '3s/}}/,"x":1}}/'~sed '3s/}}/},"x":1}/'~sed '3s/2}/-2}/'~sed '3s/2}/2.5}/'~sed '3s/:"[^"]*"/:1/'
+3 has no "tid"~sed '3s/:.*/:[1,2]}/'
+2 has no "tid"~sed '2s/"tid":"[^"]*",//'
+2 has no "bind_sid"~sed '2s/"bind_sid":"",//'
+2 has no "uid"~sed '2s/"uid":0,//'
+2 has no "deadline"~sed '2s/"deadline":9999999999,//'
+2 has no "count"~sed '2s/"count":1,//'
+2 has no "create_time"~sed '2s/"create_time":0,//'
+2 has no "function"~sed '2s/"function":"VPN",//'
+2 has no "webapi_allow"~sed '2s/,"webapi_allow":{}//'
+2 has no "extra"~sed '2s/"extra":{},//'
+2 "tid" is not a string~sed '2s/"tid":"[^"]*"/"tid":1/'
+2 "bind_sid" is not a string~sed '2s/"bind_sid":""/"bind_sid":null/'
+2 "function" is not a string~sed '2s/"VPN"/["VPN"]/'
+2 "uid" is not a whole number~sed '2s/"uid":0/"uid":"0"/'~sed '2s/"uid":0/"uid":9223372036854775808/'
+2 "deadline" is not a whole number~sed '2s/9999999999/null/'~sed '2s/9999999999/9223372036854775808/'
+2 "count" is not a whole number~sed '2s/"count":1/"count":1.5/'~sed '2s/"count":1/"count":true/'
+2 "count" is not a whole number~sed '2s/"count":1/"count":Infinity/'~sed '2s/"count":1/"count":-9223372036854775809/'
+2 "create_time" is not a whole number~sed '2s/"create_time":0/"create_time":{}/'
+2 "other" is not a field of a token~sed '2s/"extra":{}/&,"other":1/'
+2 "function" holds a NUL character~sed '2s/VPN/V\\u0000N/'
+2 "bind_sid" holds a NUL character~sed '2s/"bind_sid":"/&\\u0000/'
+2 "tid" holds a NUL character~sed '2s/"tid":"B/&\\u0000/'
+2 is not a JSON object~sed '2s/.*/[]/'~sed '2s/.*/[&]/'
+2 is not JSON: *~sed '2s/.*/x/'~sed '2s/.*/1/'~sed '2s/.*/"a"/'~sed '2s/.*/null/'~sed '2s/.*/{/'~sed '2s/$/,/'
+2 is not JSON: *~sed '2s/.*/&&/'~sed '2s/$/ x/'~sed "2s/.*/'&'/"~sed '2s,^,//,'~sed '2s/1//'~sed '2s/VPN/\\ud800/'
+2 is not JSON: *~sed '2s/VPN/\\x/'~sed '2s/"count":1/&,"count":2/'~sed '2s/://'~head -n 1 | cat - <(printf x)
+1 is not JSON: *~sed '1s/}$//'
+2 holds a NUL byte~head -n 1 | cat - <(printf '{\0')
+1 holds a NUL byte~sed '1s/$/\x00/'~sed '1s/$/\x00{broken/'~sed '1s/^/\x00/'
+2 is nested too deeply for JSON~sed "2s/{}/$deep/"
 TABLE
     # The message tells no other line's number.
     sed '2s/.*/{/' "$DIR/whole" >"$DIR/file"
     run_tool import "$DIR/file"
     [[ $stderr != *"Line 1"* ]]
-    cmp "$DB" "$DIR/before"
-}
-
-@test "an export that fails in front of a pipe imports nothing" {
-    tool init
-    cp "$DB" "$DIR/before"
-    run --separate-stderr bash -c 'VEMO_REDIRECT_DIR=$1 "$0" export 2>/dev/null | "$0" import -' "$TOOL" "$DIR/nowhere"
-    expect 2 "" "vemo-access-token: standard input: the export has no end; nothing of this file was imported; --partial imports what is there"
     cmp "$DB" "$DIR/before"
 }
 

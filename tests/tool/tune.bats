@@ -9,8 +9,7 @@ would run: CREATE INDEX IF NOT EXISTS token_bind_sid ON token (bind_sid)
 would run: CREATE INDEX IF NOT EXISTS token_function ON token (function)
 would run: COMMIT'
 
-a_store()
-{
+a_store() {
     rows <<'END'
 aaaaaaaa|bind_sid = 's'
 bbbbbbbb|uid = 1000, deadline = 1, count = -1, function = 'Mail'
@@ -19,22 +18,19 @@ END
 }
 
 # indexes: those that were made, and what they are of
-indexes()
-{
+indexes() {
     sql "SELECT list.name || ':' || group_concat(info.name) FROM pragma_index_list('token') AS list,
          pragma_index_info(list.name) AS info WHERE list.origin = 'c' GROUP BY list.name ORDER BY list.name"
 }
 
 # without_times: the result, with "T" for each time and one "|" between columns
-without_times()
-{
+without_times() {
     sed -E 's/[0-9]+\.[0-9][0-9] ms/T/g; s/  +/|/g; s/\|$//' <<<"$output"
 }
 
 # expect_change INDEX INDEX JOURNAL JOURNAL [OTHERS [OTHERS]]: the last run told whether there was an index on the
 # deadline (and OTHERS, if they differ) and what the journal was, before and after
-expect_change()
-{
+expect_change() {
     [ "$status$stderr" = 0 ]
     [ "$(without_times)" = "WHAT|BEFORE|AFTER
 look for expired tokens, as every call does|T|T
@@ -48,8 +44,7 @@ write a small change|T|T" ]
 }
 
 # The tokens are as they were.
-expect_tokens()
-{
+expect_tokens() {
     [ "$(sql "SELECT * FROM token ORDER BY tid; PRAGMA integrity_check")" = "$EXPECTED_TOKENS
 ok" ]
 }

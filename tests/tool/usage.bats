@@ -4,8 +4,7 @@
 load common
 
 # plain ARGUMENTS...: the tool as it ships, without the redirection, as a user who is not root
-plain()
-{
+plain() {
     local plain drop=()
     plain=$(dirname "$TOOL")/../../tools/vemo-access-token
     if [ "$(id -u)" -eq 0 ]; then
@@ -17,8 +16,7 @@ plain()
 
 # cannot_print REASON FILE ARGUMENTS...: the tool fails for that reason when its standard output goes there; "-"
 # closes it
-cannot_print()
-{
+cannot_print() {
     local errors=$BATS_TEST_TMPDIR.errors
     status=0 output=
     if [ "$2" = - ]; then
@@ -32,8 +30,7 @@ cannot_print()
 
 # into_closed_pipe ARGUMENTS...: standard output is a pipe that nobody reads any more. A shell may have
 # been told to ignore SIGPIPE; the tool is started as if it had not.
-into_closed_pipe()
-{
+into_closed_pipe() {
     mkfifo "$DIR/pipe"
     exec 8<>"$DIR/pipe" 9>"$DIR/pipe" 8<&-
     run --separate-stderr bash -c 'exec env --default-signal=PIPE "$@" >&9' - "$TOOL" "$@"
@@ -42,8 +39,7 @@ into_closed_pipe()
 }
 
 # log_lines_only TEXT: each line of it is one of the library's log lines
-log_lines_only()
-{
+log_lines_only() {
     local rest
     rest=$(grep -vE '^$|^[A-Za-z]+\.cpp:[0-9]+ ' <<<"$1" || true)
     [ -n "$1" ] && [ "$rest" = "" ] || {
@@ -385,8 +381,7 @@ TABLE
 }
 
 # in_wrong_places ID: calls that fail with a sentence, which must not hold the id
-in_wrong_places()
-{
+in_wrong_places() {
     local id=$1 arguments
     mkdir -p "$(dirname "$DIR/$id")"
     printf '\0' >"$DIR/$id"

@@ -4,8 +4,7 @@
 load common
 
 # with_lookup ERRNO ARGUMENTS...: run_tool, where each look-up of a user ends with that
-with_lookup()
-{
+with_lookup() {
     VEMO_TEST_LOOKUP=$1 run_tool "${@:2}"
 }
 
