@@ -15,7 +15,6 @@ END
 
 @test "the first mistake is told, and nothing is done" {
     three_tokens
-    one_excludes="create --uid 0 --user root --function VPN"
     which="say which tokens: by TID, by options that select, or --all"
     alone="repeat with --yes: there is nobody to ask"
     expired="the token has expired; \"vemo-access-token update\" can give it time"

@@ -601,8 +601,7 @@ TABLE
     head -c 65536 /dev/zero >&5
     "$TOOL" create --uid 0 --function VPN --allow Api >&5 3>&- &
     until_sql 1 "SELECT count(*) FROM token"
-    run_tool create --uid 0 --function Mail --allow Api
-    [ "$status" -eq 0 ]
+    succeeds create --uid 0 --function Mail --allow Api
     head -c 65536 <&5 >/dev/null
     wait $!
     exec 5>&-

@@ -197,8 +197,7 @@ END
     before=$(state)
     for form in table json jsonl; do
         for tid in a------- b-------; do
-            run_tool show "$tid" -o $form
-            [ "$status" -eq 0 ]
+            succeeds show "$tid" -o $form
         done
     done
     fails 3 "there is no such token" show c-------

@@ -81,8 +81,7 @@ Web   1
     run_tool stats -o jsonl
     expect 0 '{"expired":2,"file_bytes":16384,"free_pages":0,"functions":[{"function":"VPN","tokens":2},{"function":"Mail","tokens":1},{"function":"Web","tokens":1}],"page_bytes":4096,"tokens":4,"unlimited":2,"users":[{"tokens":3,"uid":0,"user":"root"},{"tokens":1,"uid":4000000000,"user":""}]}'
     line=$output
-    run_tool stats --output json
-    [ "$status" -eq 0 ]
+    succeeds stats --output json
     [ "${lines[0]}" = "{" ]
     [ "${lines[1]}" = '  "expired" : 2,' ]
     [ "$(tr -d ' \n' <<<"$output")" = "$line" ]

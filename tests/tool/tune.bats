@@ -142,8 +142,7 @@ TABLE
 
 @test "tune --no-header leaves the titles out" {
     a_store
-    run_tool tune --no-header
-    [ "$status" -eq 0 ]
+    succeeds tune --no-header
     [ "$(without_times | head -n 1)" = "look for expired tokens, as every call does|T|T" ]
     [ "${#lines[@]}" -eq 8 ]
     run_tool tune --no-header --dry-run
