@@ -1,17 +1,13 @@
-// Statements that fail, and databases that are locked.
+// Statements that fail.
 
 #ifndef TESTS_STATEMENTS_H
 #define TESTS_STATEMENTS_H
 
-#include <gtest/gtest.h>
-
 #include <cerrno>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "Seam.h"
-#include "internal/ErrnoKeeper.h"
 
 // What one try of a statement gets for an answer; it is not run. SQLITE_OK runs it.
 struct SqlAnswer {
@@ -61,35 +57,5 @@ inline void beforeStatements(const std::function<void(const std::string& strSql)
         return Seam::exec(pDb, szSql, callback, pArgument, pszError);
     };
 }
-
-// Another connection, which locks the database until the library has waited nWaits times. Then strChange
-// takes effect.
-class Lock {
-public:
-    Lock(const std::string& strPath, int nWaits, const std::string& strChange = "") : m_nWaits(nWaits)
-    {
-        const VEMO_ACCESS_TOKEN::ErrnoKeeper keeper;
-        const std::string strSql = "BEGIN EXCLUSIVE; " + strChange;
-        EXPECT_EQ(SQLITE_OK, sqlite3_open(strPath.c_str(), &m_pDb));
-        EXPECT_EQ(SQLITE_OK, sqlite3_exec(m_pDb, strSql.c_str(), nullptr, nullptr, nullptr));
-        seam().sleep = [this] {
-            if (0 == --m_nWaits) {
-                EXPECT_EQ(SQLITE_OK, sqlite3_exec(m_pDb, "COMMIT", nullptr, nullptr, nullptr));
-            }
-        };
-    }
-    ~Lock()
-    {
-        const VEMO_ACCESS_TOKEN::ErrnoKeeper keeper;
-        seam().sleep = nullptr;
-        EXPECT_EQ(SQLITE_OK, sqlite3_close(m_pDb));
-    }
-    Lock(const Lock&) = delete;
-    Lock& operator=(const Lock&) = delete;
-
-private:
-    sqlite3* m_pDb = nullptr;
-    int m_nWaits;
-};
 
 #endif

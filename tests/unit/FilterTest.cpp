@@ -286,18 +286,6 @@ TEST_F(Filter, AppendsAConditionWholeOrNotAtAll)
     EXPECT_EQ("heldtid in ('a''b''c' )", m_strOut);
 }
 
-TEST_F(Filter, ReleasesItsTextsAndTracesNothingInDebugMode)
-{
-    VEMO_ACCESS_TOKEN::debugInfo(true);
-    sqlite3_initialize();
-    const sqlite3_int64 nUsed = sqlite3_memory_used();
-    EXPECT_EQ(0, where(R"({"extra":[{},1],"tid":"a","uid":[1,2]})"));
-    EXPECT_EQ(0, condition(json(R"({"sort_by":"uid"})")));
-    EXPECT_EQ(Texts(5, "sqlite3_mprintf %q") + Texts{"sqlite3_mprintf  order by '%q'"},
-              seam().callsOf({"sqlite3_mprintf", "sqlite3_exec"}));
-    EXPECT_EQ(nUsed, sqlite3_memory_used());
-}
-
 TEST_F(Filter, SortsByATextAndInOneOfTwoDirections)
 {
     const auto appends = [&](const std::string& strFilter, const std::string& strAppended) {

@@ -201,11 +201,11 @@ TEST_F(Query, OpensTheDatabaseOnceAndWhenItIsNeeded)
 
 TEST_F(Query, ReportsFailureAfterALockThatItWaitedOut)
 {
-    const Lock lock(path(), 2);
-    EXPECT_EQ(-1, get(R"({"uid":1024})"));
+    failStatements("SELECT", LOCKED);
+    EXPECT_FAILURE(get(R"({"uid":1024})"),
+                   fail(STORE, "sql error, sql=" + SELECT + " WHERE  (uid=1024 );", EIO));
     EXPECT_EQ("Ab12 Cd34", found());
     EXPECT_EQ("database is locked", m_db.m_strErr);
-    EXPECT_LINES(fail(STORE, "sql error, sql=" + SELECT + " WHERE  (uid=1024 );"));
     failStatements("SELECT", LOCKED);
     EXPECT_EQ(-1, getOne("tid", "Ab12"));
     EXPECT_EQ(json("{}"), m_jOut);

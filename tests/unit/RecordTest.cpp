@@ -66,17 +66,6 @@ TEST_F(Defaults, CompleteARecord)
     }
 }
 
-TEST_F(Defaults, ReadTheClockForEachRecordThatHasNoTime)
-{
-    for (const time_t now : {NOW, NOW + 5, time_t(4294967296)}) {
-        seam().clock = now;
-        Json::Value jToken;
-        EXPECT_EQ(0, fillDefaultValue(jToken, false));
-        EXPECT_EQ(Json::Value(Json::Int64(now)), jToken["create_time"]);
-    }
-    EXPECT_EQ((Texts{"time", "time", "time"}), seam().calls);
-}
-
 TEST_F(Defaults, LeaveMembersAsTheyAre)
 {
     const Json::Value jGiven = json(

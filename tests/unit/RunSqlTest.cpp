@@ -172,11 +172,18 @@ TEST_F(RunSql, TriesAgainOnlyAfterLocks)
 
 TEST_F(RunSql, WaitsForAnotherConnection)
 {
-    const Lock lock(path(), 3, "DELETE FROM token WHERE tid = 'a'");
+    sqlite3* pOther = nullptr;
+    ASSERT_EQ(SQLITE_OK, sqlite3_open(path().c_str(), &pOther));
+    const auto elsewhere = [&](const char* szSql) {
+        EXPECT_EQ(SQLITE_OK, sqlite3_exec(pOther, szSql, nullptr, nullptr, nullptr));
+    };
+    elsewhere("BEGIN EXCLUSIVE; DELETE FROM token WHERE tid = 'a'");
+    seam().sleep = [&, nWaits = 3]() mutable { 0 == --nWaits ? elsewhere("COMMIT") : void(); };
     EXPECT_EQ(1, run(UPDATE));
     EXPECT_EQ("database is locked", m_db.m_strErr);
     EXPECT_EQ(Texts(3, "usleep 10000"), seam().callsOf({"usleep"}));
     EXPECT_EQ((Texts{"b|%n%s"}), query("SELECT tid, extra FROM token"));
+    sqlite3_close(pOther);
 }
 
 TEST_F(RunSql, TellsEachTryAndTheChangesInDebugMode)
