@@ -11,14 +11,11 @@
 #include <string>
 #include <vector>
 
-#include "ModelFilter.h"
-#include "ModelRow.h"
+#include "Model.h"
 #include "TokenStore.h"
-#include "World.h"
 
 namespace {
 
-const size_t TID_MIN = 127;
 const Json::UInt USER_SIZE = 16;
 
 std::string withNul(const std::string& strHead, const std::string& strTail)
@@ -26,32 +23,23 @@ std::string withNul(const std::string& strHead, const std::string& strTail)
     return strHead + '\0' + strTail;
 }
 
-Json::Value parsed(const char* szText)
-{
-    Json::Value jValue;
-    Json::Reader().parse(szText, jValue);
-    return jValue;
-}
-
 // Ids that are long enough or not. Two are equal up to a NUL, and one is what two others become in a list.
-const std::string g_rgTid[] = {
-    idOf("a"),
-    idOf("b"),
-    idOf("c"),
-    idOf("d"),
-    idOf("e"),
-    idOf("it's"),
-    idOf("\xff\xfe\xc3"),
-    idOf("'; DROP TABLE token; --"),
-    idOf("a") + "'" + idOf("b"),
-    std::string(6000, 'l'),
-    withNul(idOf("a"), "tail"),
-    withNul("short", idOf("")),
-    withNul("", idOf("")),
-    "short",
-    std::string(TID_MIN - 1, 'x'),
-    "",
-};
+const std::string g_rgTid[] = {idOf("a"),
+                               idOf("b"),
+                               idOf("c"),
+                               idOf("d"),
+                               idOf("e"),
+                               idOf("it's"),
+                               idOf("\xff\xfe\xc3"),
+                               idOf("'; DROP TABLE token; --"),
+                               idOf("a") + "'" + idOf("b"),
+                               std::string(6000, 'l'),
+                               withNul(idOf("a"), "tail"),
+                               withNul("short", idOf("")),
+                               withNul("", idOf("")),
+                               "short",
+                               std::string(TID_MIN - 1, 'x'),
+                               ""};
 
 const std::string g_rgSession[] = {
     "", "s1", "s2", "s1's2", withNul("", "hidden"), withNul("s1", "tail"), "\xc3(", "' or '1'='1", "1"};
@@ -85,7 +73,6 @@ const unsigned int g_rgUid[] = {UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77
 const Json::UInt g_rgSize[] = {0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE};
 
 // A clock that was never set or is years wrong; the end of 32 bits; the end of SQLite's dates.
-const time_t DAY = 86400;
 const time_t g_rgWrongTime[] = {-DAY - 1,
                                 -1,
                                 0,
@@ -103,20 +90,20 @@ const char* const g_rgName[] = {"tid",   "tid",   "bind_sid", "function", "funct
                                 "count", "extra", "limit",    "sort_by",  "no_field", ""};
 
 const Json::Value g_jAnything =
-    parsed(R"([null, "5", "", true, 5, 5.0, 2.5, 18446744073709551615, [], {}, ["get"]])");
+    jsonValue(R"([null, "5", "", true, 5, 5.0, 2.5, 18446744073709551615, [], {}, ["get"]])");
 
-const Json::Value g_jCount = parsed("[-1, -1, 0, 1, 2, 2, 3, 9223372036854775807, -9223372036854775808]");
+const Json::Value g_jCount = jsonValue("[-1, -1, 0, 1, 2, 2, 3, 9223372036854775807, -9223372036854775808]");
 
 // As options of creations.
 const Json::Value g_jLifetime =
-    parsed(R"([-1, 0, 1, 60, 3600, 3600, 3600, 2.5, true, null, "60", 2147483647, 2147483648])");
+    jsonValue(R"([-1, 0, 1, 60, 3600, 3600, 3600, 2.5, true, null, "60", 2147483647, 2147483648])");
 
 // For lists in number fields.
-const Json::Value g_jListed = parsed(R"([0, 1, 2, -1, -2, 5, 2.5, true, false, "1", null])");
+const Json::Value g_jListed = jsonValue(R"([0, 1, 2, -1, -2, 5, 2.5, true, false, "1", null])");
 
 // As limits and offsets; the last two have more than 32 bits.
 const Json::Value g_jPosition =
-    parsed(R"([0, 1, 2, 3, 4, 5, 6, 6, 7, 7, 8, 8, 9, 100, -1, 7.5, true, "5", 4294967296, 4294967303])");
+    jsonValue(R"([0, 1, 2, 3, 4, 5, 6, 6, 7, 7, 8, 8, 9, 100, -1, 7.5, true, "5", 4294967296, 4294967303])");
 
 } // namespace
 
@@ -170,7 +157,7 @@ private:
     const Row& row() { return m_rows[below(m_rows.size())]; }
 
     Json::Value anything() { return oneOf(g_jAnything); }
-    Json::Value extra() { return parsed(oneOf(g_rgExtra)); }
+    Json::Value extra() { return jsonValue(oneOf(g_rgExtra)); }
 
     Json::Value tid() { return m_rows.empty() || oneIn(4) ? Json::Value(oneOf(g_rgTid)) : row().columns[0]; }
 

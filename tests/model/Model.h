@@ -7,21 +7,170 @@
 #ifndef TESTS_MODEL_H
 #define TESTS_MODEL_H
 
+#include <algorithm>
+#include <cstring>
+
+#include "ModelFilter.h"
 #include "ModelRow.h"
+#include "World.h"
+
+const unsigned int UID_NOBODY = 4294967295;
+const size_t TID_MIN = 127;
+const size_t TID_MAX = 255;
+const time_t DAY = 86400;
+
+inline bool isGiven(const char* szText)
+{
+    return szText && szText[0];
+}
+
+inline bool isAlphanumeric(char c)
+{
+    return ('0' <= c && c <= '9') || ('a' <= c && c <= 'z') || ('A' <= c && c <= 'Z');
+}
+
+inline bool isObjectOrNull(const Json::Value& jValue)
+{
+    return jValue.isObject() || jValue.isNull();
+}
+
+inline bool isOfKind(Kind kind, const Json::Value& jValue)
+{
+    return Kind::Text == kind   ? jValue.isString()
+           : Kind::Json == kind ? jValue.isObject()
+                                : jValue.isIntegral();
+}
+
+// Removes rows and tells how many.
+template <typename Predicate>
+int removeIf(std::vector<Row>& rows, Predicate predicate)
+{
+    const auto end = std::remove_if(rows.begin(), rows.end(), predicate);
+    const int nRemoved = static_cast<int>(rows.end() - end);
+    rows.erase(end, rows.end());
+    return nRemoved;
+}
 
 struct ModelRules {
-    int checkJsonType(Json::Value& jToken);
-    int fillDefaultValue(Json::Value& jToken, bool blCheck);
-    int checkPermission(Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod);
+    // Fields that are there are of their type.
+    int checkJsonType(Json::Value& jToken)
+    {
+        const bool blSound =
+            jToken.isObject() && std::all_of(FIELDS.begin(), FIELDS.end(), [&](const Field& field) {
+                return !jToken.isMember(field.szName) || isOfKind(field.kind, jToken[field.szName]);
+            });
+        return blSound ? 0 : -1;
+    }
+
+    int fillDefaultValue(Json::Value& jToken, bool blCheck)
+    {
+        for (const Field& field : FIELDS) {
+            if (jToken.isMember(field.szName)) {
+                continue;
+            }
+            if (blCheck) {
+                return -1;
+            }
+            jToken[field.szName] =
+                std::string("create_time") == field.szName ? Json::Int64(worldClock()) : field.jDefault;
+        }
+        return 0;
+    }
+
+    int checkPermission(Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod)
+    {
+        const Json::Value& jRecord = jToken;
+        if (!jRecord.isObject() || !isGiven(szWebapiName)) {
+            return -1;
+        }
+        const Json::Value& jAllow = jRecord["webapi_allow"];
+        if (!jAllow.isObject() || !jAllow.isMember(szWebapiName)) {
+            return -1;
+        }
+        if (!isGiven(szWebapiMethod)) {
+            return 1;
+        }
+        const Json::Value& jEntry = jAllow[szWebapiName];
+        if (!jEntry.isObject() || !jEntry["method"].isArray()) {
+            return -1;
+        }
+        return std::any_of(jEntry["method"].begin(), jEntry["method"].end(),
+                           [&](const Json::Value& jMethod) { return jMethod.asString() == szWebapiMethod; });
+    }
 };
 
 class ModelStore {
 public:
-    int tokenSave(Json::Value& jRecord, bool blCreate);
-    int tokenGet(Json::Value& jFilter, Json::Value& jTokenArrayOut);
-    int tokenGetOne(const char* szName, std::string& strValue, Json::Value& jTokenOut);
-    int tokenDelete(Json::Value& jFilter, bool blAll);
-    int cleanExpireToken(bool blLog);
+    int tokenSave(Json::Value& jRecord, bool blCreate)
+    {
+        if (0 > ModelRules().fillDefaultValue(jRecord, true)) {
+            return -1;
+        }
+        const Row row = rowOf(jRecord);
+        const auto isSame = [&](const Row& other) { return other.columns[0] == row.columns[0]; };
+        if (blCreate && std::any_of(m_rows.begin(), m_rows.end(), isSame)) {
+            return -1;
+        }
+        removeIf(m_rows, isSame);
+        m_rows.push_back(row);
+        return 0;
+    }
+
+    int tokenGet(Json::Value& jFilter, Json::Value& jTokenArrayOut)
+    {
+        if (!jFilter.isObject() || (!jTokenArrayOut.isNull() && !jTokenArrayOut.isArray())) {
+            return -1;
+        }
+        const Where where(jFilter);
+        if (where.blRefused || isSpoiledByPaging(jFilter, where.blEmpty) || where.blBroken) {
+            return -1;
+        }
+        for (const Row& row : m_rows) {
+            if (where.matches(row)) {
+                jTokenArrayOut.append(row.jRecord);
+            }
+        }
+        return 0;
+    }
+
+    int tokenGetOne(const char* szName, std::string& strValue, Json::Value& jTokenOut)
+    {
+        if (!szName || !szName[0] || strValue.empty()) {
+            return -1;
+        }
+        jTokenOut = Json::Value(Json::objectValue);
+        Json::Value jFilter;
+        Json::Value jFound;
+        jFilter[szName] = strValue;
+        if (0 > tokenGet(jFilter, jFound)) {
+            return -1;
+        }
+        if (jFound.empty()) {
+            return 0;
+        }
+        jTokenOut = jFound[0];
+        return 1;
+    }
+
+    int tokenDelete(Json::Value& jFilter, bool blAll)
+    {
+        if (!jFilter.isObject()) {
+            return -1;
+        }
+        const Where where(jFilter);
+        if (where.blRefused || where.blBroken || (where.blEmpty && !blAll)) {
+            return -1;
+        }
+        return removeIf(m_rows, [&](const Row& row) { return where.matches(row); });
+    }
+
+    int cleanExpireToken(bool)
+    {
+        if (worldClock() < YEAR_10000) { // then there is no date to compare with
+            removeIf(m_rows, [](const Row& row) { return row.jRecord["deadline"].asInt64() < worldClock(); });
+        }
+        return 0;
+    }
 
     // In the order of the table: sorted by when they were last written.
     const std::vector<Row>& rows() const { return m_rows; }
@@ -35,21 +184,131 @@ public:
     explicit ModelService(ModelStore& store) : m_store(store) {}
 
     // Tells the model the id that the library has generated; it must look like one.
-    void setGenerated(const std::string& strTid);
-    int tokenGenerate(std::string& strTidOut);
+    void setGenerated(const std::string& strTid)
+    {
+        const bool blId = TID_MIN <= strTid.size() && strTid.size() <= TID_MAX &&
+                          std::all_of(strTid.begin(), strTid.end(), &isAlphanumeric);
+        m_strGenerated = blId ? strTid : std::string(TID_MIN, '?');
+    }
+
+    int tokenGenerate(std::string& strTidOut)
+    {
+        strTidOut = m_strGenerated;
+        return 0;
+    }
 
     int tokenCreateByTid(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
-                         std::string& strTidIn);
+                         std::string& strTidIn)
+    {
+        if (!isObjectOrNull(jTokenOption) || uid == UID_NOBODY || strFunction.empty() ||
+            strTidIn.length() < TID_MIN) {
+            return -1;
+        }
+        Json::Value jToken = jTokenOption;
+        jToken["tid"] = strTidIn;
+        jToken["uid"] = uid;
+        jToken["function"] = strFunction;
+        jToken["create_time"] = static_cast<Json::Int64>(worldClock());
+        if (jToken.isMember("deadline")) {
+            // Both are numbers of 32 bits, which the clock is until 2038.
+            jToken["deadline"] = Json::Int64(jToken["create_time"].asInt()) + jToken["deadline"].asInt();
+        } else {
+            jToken["deadline"] = jToken["create_time"].asInt64() + DAY;
+        }
+        ModelRules().fillDefaultValue(jToken, false);
+        return 0 == ModelRules().checkJsonType(jToken) ? m_store.tokenSave(jToken, true) : -1;
+    }
+
     int tokenCreate(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
-                    std::string& strTidOut);
-    int tokenList(Json::Value& jFilter, Json::Value& jTokenArrayOut);
-    int tokenGetByTid(std::string& strTid, Json::Value& jTokenOut);
-    int VectorParamToJson(std::vector<std::string>& strVector, const char* szField, Json::Value& jParamOut);
-    int tokenGetByTidArray(std::vector<std::string>& strTidVector, Json::Value& jTokenArrayOut);
-    int tokenUpdateByTid(std::string& strTid, Json::Value& jParam);
-    int tokenSaveByOverwrite(Json::Value& jToken);
-    int tokenDeleteByArray(std::vector<std::string>& strVector, const char* szName);
-    int tokenDeleteByName(std::string& strValue, const char* szName);
+                    std::string& strTidOut)
+    {
+        std::string strTid;
+        tokenGenerate(strTid);
+        if (0 > tokenCreateByTid(uid, strFunction, jTokenOption, strTid)) {
+            return -1;
+        }
+        strTidOut = strTid;
+        return 0;
+    }
+
+    int tokenList(Json::Value& jFilter, Json::Value& jTokenArrayOut)
+    {
+        if (!isObjectOrNull(jFilter) || !jTokenArrayOut.isArray()) {
+            return -1;
+        }
+        Json::Value jAll(Json::objectValue);
+        return m_store.tokenGet(jFilter.isNull() ? jAll : jFilter, jTokenArrayOut);
+    }
+
+    int tokenGetByTid(std::string& strTid, Json::Value& jTokenOut)
+    {
+        return m_store.tokenGetOne("tid", strTid, jTokenOut);
+    }
+
+    int VectorParamToJson(std::vector<std::string>& strVector, const char* szField, Json::Value& jParamOut)
+    {
+        if (!isObjectOrNull(jParamOut) || !isGiven(szField)) {
+            return -1;
+        }
+        jParamOut[szField] = Json::Value(Json::arrayValue);
+        for (const std::string& strElement : strVector) {
+            jParamOut[szField].append(strElement);
+        }
+        return 0;
+    }
+
+    int tokenGetByTidArray(std::vector<std::string>& strTidVector, Json::Value& jTokenArrayOut)
+    {
+        Json::Value jFilter;
+        if (!jTokenArrayOut.isArray() || strTidVector.empty()) {
+            return -1;
+        }
+        VectorParamToJson(strTidVector, "tid", jFilter);
+        return m_store.tokenGet(jFilter, jTokenArrayOut);
+    }
+
+    int tokenUpdateByTid(std::string& strTid, Json::Value& jParam)
+    {
+        Json::Value jToken;
+        if (!jParam.isObject()) {
+            return -1;
+        }
+        const int nFound = tokenGetByTid(strTid, jToken);
+        if (1 > nFound) {
+            return nFound;
+        }
+        for (const Field& field : FIELDS) {
+            if (jParam.isMember(field.szName)) {
+                jToken[field.szName] = jParam[field.szName];
+            }
+        }
+        return tokenSaveByOverwrite(jToken);
+    }
+
+    int tokenSaveByOverwrite(Json::Value& jToken)
+    {
+        const bool blSound =
+            0 == ModelRules().checkJsonType(jToken) && 0 == ModelRules().fillDefaultValue(jToken, true);
+        return blSound ? m_store.tokenSave(jToken, false) : -1;
+    }
+
+    int tokenDeleteByArray(std::vector<std::string>& strVector, const char* szName)
+    {
+        const size_t nField = szName ? fieldNumber(szName) : FIELDS.size();
+        if (strVector.empty() || FIELDS.size() == nField || Kind::Text != FIELDS[nField].kind) {
+            return -1;
+        }
+        Json::Value jFilter;
+        VectorParamToJson(strVector, szName, jFilter);
+        return m_store.tokenDelete(jFilter, false);
+    }
+
+    int tokenDeleteByName(std::string& strValue, const char* szName)
+    {
+        std::vector<std::string> strVector = {strValue};
+        return strValue.empty() ? -1 : tokenDeleteByArray(strVector, szName);
+    }
+
     int tokenDeleteByTid(std::string& strTid) { return tokenDeleteByName(strTid, "tid"); }
     int tokenDeleteByBindSid(std::string& strSid) { return tokenDeleteByName(strSid, "bind_sid"); }
     int tokenDeleteByFunction(std::string& strFunction) { return tokenDeleteByName(strFunction, "function"); }
@@ -57,11 +316,45 @@ public:
     {
         return tokenDeleteByArray(strTids, "tid");
     }
-    int tokenDeleteAll();
+    int tokenDeleteAll()
+    {
+        Json::Value jAll(Json::objectValue);
+        return m_store.tokenDelete(jAll, true);
+    }
+
     int cleanExpireToken(bool blLogErr) { return m_store.cleanExpireToken(blLogErr); }
     int tokenGrant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
-                   Json::Value& jTokenOut);
-    int tokenCountDegrade(Json::Value& jToken);
+                   Json::Value& jTokenOut)
+    {
+        Json::Value jToken;
+        if (!isGiven(szWebapiName) || 1 != tokenGetByTid(strTid, jToken) ||
+            1 != ModelRules().checkPermission(jToken, szWebapiName, szWebapiMethod) ||
+            0 > tokenCountDegrade(jToken)) {
+            return -1;
+        }
+        jTokenOut = jToken;
+        return 0;
+    }
+
+    int tokenCountDegrade(Json::Value& jToken)
+    {
+        if (!jToken.isObject() || !jToken.isMember("count")) {
+            return -1;
+        }
+        const Json::Int64 nCount = jToken["count"].asInt64();
+        if (0 > nCount) {
+            return 0;
+        }
+        if (1 < nCount) {
+            jToken["count"] = nCount - 1;
+            return tokenSaveByOverwrite(jToken);
+        }
+        if (!jToken.isMember("tid") || !jToken["tid"].isString()) {
+            return -1;
+        }
+        std::string strTid = jToken["tid"].asString();
+        return std::min(0, tokenDeleteByTid(strTid));
+    }
 
 private:
     ModelStore& m_store;
@@ -89,7 +382,25 @@ public:
         return purged().tokenGrant(strTid, szWebapiName, szWebapiMethod, jToken);
     }
     int grant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod, char* szUser,
-              size_t cbUser);
+              size_t cbUser)
+    {
+        Json::Value jToken;
+        if (0 > grantEx(strTid, szWebapiName, szWebapiMethod, jToken)) {
+            return -1;
+        }
+        if (!szUser || 0 == cbUser) {
+            return 0;
+        }
+        const char* szName = userName(static_cast<uid_t>(jToken["uid"].asInt64()));
+        if (!szName) {
+            return -1;
+        }
+        const size_t cchWritten = std::min(strlen(szName), cbUser - 1);
+        memcpy(szUser, szName, cchWritten);
+        szUser[cchWritten] = '\0';
+        return cchWritten < strlen(szName) ? -1 : 0;
+    }
+
     int deleteByTid(std::string& strTid) { return purged().tokenDeleteByTid(strTid); }
     int deleteByBindSid(const char* szSid)
     {

@@ -70,7 +70,7 @@ Call<System> on(Part System::*part, Member member)
     };
 }
 
-#define ON_BOTH(part, name)                                                                                  \
+#define BOTH(part, name)                                                                                     \
     on(&Library::part, &decltype(Library::part)::name), on(&Model::part, &decltype(Model::part)::name)
 
 } // namespace
@@ -78,52 +78,43 @@ Call<System> on(Part System::*part, Member member)
 const std::vector<Operation>& operations()
 {
     static const std::vector<Operation> all = {
-        {"VemoAccessTokenCreate", 6, {"uid", "function", "option", "made"}, ON_BOTH(functions, create)},
-        {"VemoAccessTokenCreateByTid",
-         6,
-         {"uid", "function", "option", "fresh"},
-         ON_BOTH(functions, createByTid)},
-        {"VemoAccessTokenGenerate", 1, {"made"}, ON_BOTH(functions, generate)},
-        {"VemoAccessTokenGrantEx",
-         10,
-         {"granted", "webapi", "method", "answer"},
-         ON_BOTH(functions, grantEx)},
-        {"VemoAccessTokenGrant",
-         10,
-         {"granted", "webapi", "method", "user", "size"},
-         ON_BOTH(functions, grant)},
-        {"VemoAccessTokenDeleteByTid", 3, {"tid"}, ON_BOTH(functions, deleteByTid)},
-        {"VemoAccessTokenDeleteByBindSid", 1, {"sid_or_null"}, ON_BOTH(functions, deleteByBindSid)},
-        {"VemoAccessTokenDeleteByFunction", 1, {"function"}, ON_BOTH(functions, deleteByFunction)},
+        {"exported Create", 6, {"uid", "function", "option", "made"}, BOTH(functions, create)},
+        {"exported CreateByTid", 6, {"uid", "function", "option", "fresh"}, BOTH(functions, createByTid)},
+        {"exported Generate", 1, {"made"}, BOTH(functions, generate)},
+        {"exported GrantEx", 10, {"granted", "webapi", "method", "answer"}, BOTH(functions, grantEx)},
+        {"exported Grant", 10, {"granted", "webapi", "method", "user", "size"}, BOTH(functions, grant)},
+        {"exported DeleteByTid", 3, {"tid"}, BOTH(functions, deleteByTid)},
+        {"exported DeleteByBindSid", 1, {"sid_or_null"}, BOTH(functions, deleteByBindSid)},
+        {"exported DeleteByFunction", 1, {"function"}, BOTH(functions, deleteByFunction)},
 
-        {"checkJsonType", 5, {"record"}, ON_BOTH(rules, checkJsonType)},
-        {"fillDefaultValue", 5, {"record", "flag"}, ON_BOTH(rules, fillDefaultValue)},
-        {"checkPermission", 5, {"record", "webapi", "method"}, ON_BOTH(rules, checkPermission)},
+        {"checkJsonType", 5, {"record"}, BOTH(rules, checkJsonType)},
+        {"fillDefaultValue", 5, {"record", "flag"}, BOTH(rules, fillDefaultValue)},
+        {"checkPermission", 5, {"record", "webapi", "method"}, BOTH(rules, checkPermission)},
 
-        {"tokenCreate", 30, {"uid", "function", "option", "made"}, ON_BOTH(service, tokenCreate)},
-        {"tokenCreateByTid", 60, {"uid", "function", "option", "fresh"}, ON_BOTH(service, tokenCreateByTid)},
-        {"tokenGrant", 50, {"granted", "webapi", "method", "answer"}, ON_BOTH(service, tokenGrant)},
-        {"tokenCountDegrade", 10, {"record"}, ON_BOTH(service, tokenCountDegrade)},
-        {"tokenUpdateByTid", 40, {"tid", "param"}, ON_BOTH(service, tokenUpdateByTid)},
-        {"tokenSaveByOverwrite", 20, {"record"}, ON_BOTH(service, tokenSaveByOverwrite)},
-        {"tokenDeleteByTid", 6, {"tid"}, ON_BOTH(service, tokenDeleteByTid)},
-        {"tokenDeleteByBindSid", 2, {"sid"}, ON_BOTH(service, tokenDeleteByBindSid)},
-        {"tokenDeleteByFunction", 1, {"function"}, ON_BOTH(service, tokenDeleteByFunction)},
-        {"tokenDeleteByName", 4, {"text", "name"}, ON_BOTH(service, tokenDeleteByName)},
-        {"tokenDeleteByArray", 4, {"texts", "name"}, ON_BOTH(service, tokenDeleteByArray)},
-        {"tokenDeleteByTidArray", 6, {"texts"}, ON_BOTH(service, tokenDeleteByTidArray)},
-        {"tokenDeleteAll", 1, {}, ON_BOTH(service, tokenDeleteAll)},
-        {"cleanExpireToken", 4, {"flag"}, ON_BOTH(service, cleanExpireToken)},
-        {"tokenList", 50, {"filter", "list"}, ON_BOTH(service, tokenList)},
-        {"tokenGetByTid", 20, {"tid", "answer"}, ON_BOTH(service, tokenGetByTid)},
-        {"tokenGetByTidArray", 15, {"texts", "list"}, ON_BOTH(service, tokenGetByTidArray)},
-        {"VectorParamToJson", 3, {"texts", "name", "param"}, ON_BOTH(service, VectorParamToJson)},
+        {"tokenCreate", 30, {"uid", "function", "option", "made"}, BOTH(service, tokenCreate)},
+        {"tokenCreateByTid", 60, {"uid", "function", "option", "fresh"}, BOTH(service, tokenCreateByTid)},
+        {"tokenGrant", 50, {"granted", "webapi", "method", "answer"}, BOTH(service, tokenGrant)},
+        {"tokenCountDegrade", 10, {"record"}, BOTH(service, tokenCountDegrade)},
+        {"tokenUpdateByTid", 40, {"tid", "param"}, BOTH(service, tokenUpdateByTid)},
+        {"tokenSaveByOverwrite", 20, {"record"}, BOTH(service, tokenSaveByOverwrite)},
+        {"tokenDeleteByTid", 6, {"tid"}, BOTH(service, tokenDeleteByTid)},
+        {"tokenDeleteByBindSid", 2, {"sid"}, BOTH(service, tokenDeleteByBindSid)},
+        {"tokenDeleteByFunction", 1, {"function"}, BOTH(service, tokenDeleteByFunction)},
+        {"tokenDeleteByName", 4, {"text", "name"}, BOTH(service, tokenDeleteByName)},
+        {"tokenDeleteByArray", 4, {"texts", "name"}, BOTH(service, tokenDeleteByArray)},
+        {"tokenDeleteByTidArray", 6, {"texts"}, BOTH(service, tokenDeleteByTidArray)},
+        {"tokenDeleteAll", 1, {}, BOTH(service, tokenDeleteAll)},
+        {"cleanExpireToken", 4, {"flag"}, BOTH(service, cleanExpireToken)},
+        {"tokenList", 50, {"filter", "list"}, BOTH(service, tokenList)},
+        {"tokenGetByTid", 20, {"tid", "answer"}, BOTH(service, tokenGetByTid)},
+        {"tokenGetByTidArray", 15, {"texts", "list"}, BOTH(service, tokenGetByTidArray)},
+        {"VectorParamToJson", 3, {"texts", "name", "param"}, BOTH(service, VectorParamToJson)},
 
-        {"tokenGet of the store", 30, {"filter", "list"}, ON_BOTH(store, tokenGet)},
-        {"tokenGetOne of the store", 15, {"name", "text", "answer"}, ON_BOTH(store, tokenGetOne)},
-        {"tokenDelete of the store", 5, {"filter", "rare_flag"}, ON_BOTH(store, tokenDelete)},
-        {"tokenSave of the store", 30, {"record", "flag"}, ON_BOTH(store, tokenSave)},
-        {"cleanExpireToken of the store", 2, {"flag"}, ON_BOTH(store, cleanExpireToken)},
+        {"tokenGet of the store", 30, {"filter", "list"}, BOTH(store, tokenGet)},
+        {"tokenGetOne of the store", 15, {"name", "text", "answer"}, BOTH(store, tokenGetOne)},
+        {"tokenDelete of the store", 5, {"filter", "rare_flag"}, BOTH(store, tokenDelete)},
+        {"tokenSave of the store", 30, {"record", "flag"}, BOTH(store, tokenSave)},
+        {"cleanExpireToken of the store", 2, {"flag"}, BOTH(store, cleanExpireToken)},
     };
     return all;
 }
