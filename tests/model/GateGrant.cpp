@@ -1,12 +1,9 @@
-#include "GateGrant.h"
-
 #include <stdexcept>
 
+#include "ModelCalls.h"
 #include "gate/Batch.h"
 #include "gate/Store.h"
-#include "internal/AccessTokenDbApi.h"
 #include "internal/JsonText.h"
-#include "vemo-access-token.h"
 
 namespace {
 

@@ -31,6 +31,11 @@ struct LibraryFunctions {
     decltype(&VemoAccessTokenDeleteByFunction) deleteByFunction = &VemoAccessTokenDeleteByFunction;
 };
 
+// What the gate does in the place of VemoAccessTokenGrantEx. Calls that it refuses on purpose go to the
+// library.
+int grantAtTheGate(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
+                   Json::Value& jToken);
+
 struct Library {
     LibraryRules rules;
     AccessTokenDbApi store;

@@ -9,7 +9,6 @@
 
 #include "Draws.h"
 #include "Figures.h"
-#include "GateGrant.h"
 #include "ModelCalls.h"
 #include "Table.h"
 #include "TokenStore.h"

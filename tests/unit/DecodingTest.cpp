@@ -111,20 +111,6 @@ protected:
     Json::Value m_jArray;
 };
 
-TEST_F(Decoding, KeepsTextUnchanged)
-{
-    std::string strBytes;
-    for (int nByte = 1; nByte < 256; ++nByte) {
-        strBytes += static_cast<char>(nByte);
-    }
-    for (const std::string& strText : Texts{"", "  a\t\n", "12", "null", "{\"a\":1}", strBytes}) {
-        SCOPED_TRACE(strText);
-        for (const char* szField : {"tid", "bind_sid", "function"}) {
-            EXPECT_EQ(Json::Value(strText), member(szField, strText));
-        }
-    }
-}
-
 TEST_F(Decoding, ReadsNumbersLeniently)
 {
     tokenType()["small"] = json("[\"int\",0]");

@@ -1,5 +1,6 @@
 // The eight exported functions: what each runs and returns, until the end of a thread and of the process.
 
+#include <malloc.h>
 #include <pthread.h>
 #include <unistd.h>
 
@@ -320,6 +321,29 @@ TEST_F(GrantWithName, FailsForUsersThatCannotBeFound)
         EXPECT_EQ(m_strUntouched, m_szUser);
         EXPECT_EQ("1", countOf());
     }
+}
+
+// Whether the name fits or not. (A sanitizer has its own allocator, and reports leaks at exit.)
+TEST_F(GrantWithName, LeaksNothing)
+{
+    const size_t cbName = 50000;
+    setUser(std::string(cbName, 'x'));
+    query("UPDATE token SET count = -1");
+    std::string strTid = "t";
+    std::vector<char> user(cbName + 1);
+    const auto grantTwice = [&] {
+        seam().calls.clear(); // their memory would count
+        seam().lines.clear();
+        EXPECT_EQ(-1, VemoAccessTokenGrant(strTid, "Api", "get", user.data(), cbName));
+        EXPECT_EQ(0, VemoAccessTokenGrant(strTid, "Api", "get", user.data(), cbName + 1));
+    };
+    grantTwice();
+    const size_t cbBefore = mallinfo2().uordblks;
+    for (int i = 0; i < 10; ++i) {
+        grantTwice();
+    }
+    EXPECT_GT(cbBefore + cbName, mallinfo2().uordblks);
+    seam().lines.clear();
 }
 
 // The end of a thread and of the process, and a thread that can keep nothing

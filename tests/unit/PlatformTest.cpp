@@ -1,6 +1,8 @@
 // The stand-ins for the platform's libraries: creating files, random numbers and strings, the user database.
 
 #include <fcntl.h>
+#include <malloc.h>
+#include <sys/mman.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -293,6 +295,17 @@ TEST_F(KernelRandom, JoinsShortReadsAndStopsAtAFailure)
 
 // The user database
 
+// A name at the end of a page, after which nothing can be read.
+char* nameAtTheEndOfMemory()
+{
+    const size_t cbPage = static_cast<size_t>(sysconf(_SC_PAGESIZE));
+    void* const pPages =
+        mmap(nullptr, 2 * cbPage, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+    char* const pEnd = static_cast<char*>(pPages) + cbPage;
+    mprotect(pEnd, cbPage, PROT_NONE);
+    return strcpy(pEnd - sizeof("alice"), "alice");
+}
+
 class User : public SeamTest {
 protected:
     void TearDown() override { VEMOUserFree(m_pUser); } // null where none was found
@@ -302,8 +315,9 @@ protected:
 
 TEST_F(User, IsFoundWithANameOfItsOwn)
 {
-    char szName[] = "alice";
-    seam().getUser = [&](uid_t, struct passwd* pEntry, char*, size_t, struct passwd** ppEntry) {
+    mallopt(M_PERTURB, 1); // memory is not 0 at first
+    char* const szName = nameAtTheEndOfMemory();
+    seam().getUser = [=](uid_t, struct passwd* pEntry, char*, size_t, struct passwd** ppEntry) {
         pEntry->pw_name = szName;
         *ppEntry = pEntry;
         return 0;
