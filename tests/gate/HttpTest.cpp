@@ -3,16 +3,12 @@
 #include <gtest/gtest.h>
 
 #include "gate/Clock.h"
-#include "gate/http/Head.h"
 #include "gate/http/Repeats.h"
 #include "gate/http/Response.h"
 
 using gate::Answer;
-using gate::Head;
 using gate::Outcome;
-using gate::Reading;
 using gate::Repeats;
-using namespace std::string_literals;
 
 namespace {
 
@@ -26,45 +22,6 @@ Answer answerOf(uint64_t nNumber, Outcome outcome, const std::string& strRecord 
 }
 
 } // namespace
-
-TEST(Head, IsReadAlikeHoweverItComes)
-{
-    const std::string strLine = "GET / HTTP/1.1\r\n";
-    const std::string strHead = strLine + "Host: gate\r\n\r\n";
-    const std::string strEmpty = strLine + "Host: gate\r\nX: \r\n\r\n";
-    const std::string strLong(gate::LINE_MAX_BYTES - strLine.size() + 2, 'x');
-    const std::string strLarge(gate::HEAD_MAX_BYTES - strEmpty.size(), 'x');
-    const std::pair<std::string, Reading> HEADS[] = {
-        {"", Reading::Incomplete},
-        {strHead.substr(0, strHead.size() - 1), Reading::Incomplete},
-        {strHead, Reading::Whole},
-        {strHead + "\0what follows"s, Reading::Whole},
-        {"\r\n" + strHead, Reading::BadRequest},
-        {strLine + "Host: gate\n\r\n", Reading::BadRequest},
-        {strLine + "Host: ga\rte\r\n\r\n", Reading::BadRequest},
-        {strLine + "Host: gate\r\r\n\r\n", Reading::BadRequest},
-        {strLine + "Host: gate\r\nX: \x01\r\n\r\n", Reading::BadRequest},
-        {"GET /" + strLong + strHead.substr(5), Reading::Whole},
-        {"GET /x" + strLong + strHead.substr(5), Reading::TargetTooLong},
-        {"GET /x" + strLong + " HTTP/1.1\n", Reading::TargetTooLong},
-        {std::string(gate::LINE_MAX_BYTES, 'x') + "\n", Reading::BadRequest},
-        {strLine + "Host: gate\r\nX: " + strLarge + "\r\n\r\n", Reading::Whole},
-        {strLine + "Host: gate\r\nX: x" + strLarge + "\r\n\r\n", Reading::HeadTooLarge},
-    };
-    for (const auto& [strBytes, wanted] : HEADS) {
-        for (const size_t nStep : {strBytes.size() + 1, strBytes.size() > 1000 ? size_t{61} : size_t{1}}) {
-            size_t cbSeen = 0;
-            size_t cbHead = 0;
-            Head head;
-            Reading reading = Reading::Incomplete;
-            for (size_t cb = 0; cb < strBytes.size() + nStep && Reading::Incomplete == reading; cb += nStep) {
-                reading = gate::readHead(std::string_view(strBytes).substr(0, cb), cbSeen, head, cbHead);
-            }
-            EXPECT_EQ(wanted, reading) << strBytes.substr(0, 200) << " by " << nStep;
-            EXPECT_EQ(Reading::Whole == wanted ? strBytes.find("\r\n\r\n") + 4 : 0, cbHead);
-        }
-    }
-}
 
 TEST(Response, EscapesNamesThatNoHeaderCanCarry)
 {

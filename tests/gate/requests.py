@@ -307,6 +307,10 @@ class Requests(scene.Scene):
                 idle[0].sendall(bytes([byte]))
             self.assertEqual(self.received(idle[0], GOOD), [GRANTED])
             told["200"] += 1
+        with self.subTest("what no head begins with, before it has ended"):
+            idle[1].sendall(b"\r\n")
+            self.assertTrue(idle[1].recv(4096).startswith(b"HTTP/1.1 400 "))
+            told["400"] += 1
         self.assertEqual(self.told() - before, told)
 
     def told(self):
