@@ -44,7 +44,7 @@ std::string findSql()
     return strSql + EXPIRED " FROM token" WHERE_TID;
 }
 
-// As the library's, and below 0 also where what stands among the methods cannot be read as one.
+// As the library's checkPermission(), and also -1 if the list of methods holds something that is not a text.
 int permission(Json::Value& jAllow, const std::string& strApi, const std::string& strMethod)
 {
     try {
@@ -103,7 +103,7 @@ bool Statement::step()
     if (SQLITE_ROW == sqlite3_step(m_pStatement)) {
         return true;
     }
-    if (SQLITE_OK != sqlite3_reset(m_pStatement)) { // tells the result of the step once more
+    if (SQLITE_OK != sqlite3_reset(m_pStatement)) { // reset returns the error of the step again
         fail();
     }
     return false;
@@ -117,7 +117,7 @@ void Statement::reset()
 const char* Statement::text(int nColumn) const
 {
     if (SQLITE_NULL == sqlite3_column_type(m_pStatement, nColumn)) {
-        return nullptr; // asked for first: a column whose text finds no memory turns into NULL
+        return nullptr; // must come first: if memory runs out, sqlite3_column_text() makes a column NULL
     }
     const auto szText = reinterpret_cast<const char*>(sqlite3_column_text(m_pStatement, nColumn));
     if (!szText) {
@@ -161,7 +161,7 @@ Verdict judge(Token& token, const std::string& strApi, const std::string& strMet
     if (0 == nPermission) {
         return Verdict::MethodNotListed;
     }
-    // What is saved with its uses lowered must be sound in all its fields.
+    // A token that is written with fewer uses must be valid in all its fields.
     return Left::Less == left(token.nCount) && !token.jExtra.isObject() ? Verdict::Malformed
                                                                         : Verdict::Granted;
 }
@@ -183,9 +183,9 @@ Tokens::Tokens(sqlite3* pDb)
 
 std::optional<Token> Tokens::find(const std::string& strTid)
 {
-    m_find.reset(); // where lack of memory ended the look-up before, it stands at its row still
+    m_find.reset(); // lack of memory may have ended the last look-up at a row
     std::optional<Token> token;
-    // All rows, as the library does: one that cannot be read makes the look-up fail, wherever it stands.
+    // Reads all rows, as the library does: any row that cannot be read makes the look-up fail.
     for (m_find.bind(1, strTid); m_find.step();) {
         if (!token) {
             token.emplace();

@@ -1,9 +1,9 @@
-// The rule of a grant for programs that hold a connection of their own: whether a token opens a call, and
-// what is left of it afterwards. Outside of the library, it stands only here. It is the library's rule to the
-// letter, with statements that are prepared once.
+// The rule of a grant, for programs with their own connections: whether a token opens a call, and what is
+// left of the token afterwards. Except for the library itself, the rule is only here. It is exactly the
+// library's rule, with statements that are prepared once.
 //
-// Transactions, locks and the purge are the caller's. What reads may stand in any transaction; what spends
-// needs one that has written nothing yet and that nobody else can write in (BEGIN IMMEDIATE).
+// The caller is responsible for transactions, locks and the purge. Reading needs no special transaction.
+// Spending needs one that nobody else can write in (BEGIN IMMEDIATE), and that the token was read in.
 
 #ifndef GRANT_TOKENS_H
 #define GRANT_TOKENS_H
@@ -20,14 +20,14 @@ struct sqlite3_stmt;
 
 namespace grant {
 
-// Those tokens whose deadline has passed by now, as the purge sees it. Use only this condition: it decides as
-// the library does where a deadline is no number.
+// The condition for expired tokens, as in the purge. Use no other: it decides as the library does even if a
+// deadline is not a number.
 extern const char* const SQL_EXPIRED;
 
-// The statement that deletes them.
+// The statement that deletes the expired tokens.
 extern const char* const SQL_PURGE;
 
-// What SQLite says of a statement that failed.
+// SQLite's error for a statement that failed.
 class Error : public std::runtime_error {
 public:
     Error(int nCode, const char* szReason) : std::runtime_error(szReason), m_nCode(nCode) {}
@@ -37,7 +37,7 @@ private:
     const int m_nCode;
 };
 
-// A statement of a connection, which must outlive it. Members throw Error, or std::bad_alloc.
+// A prepared statement. The connection must outlive it. Members throw Error or std::bad_alloc.
 class Statement {
 public:
     Statement(sqlite3* pDb, const char* szSql);
@@ -45,22 +45,22 @@ public:
     Statement(const Statement&) = delete;
     Statement& operator=(const Statement&) = delete;
 
-    // Sets a parameter, counted from 1. A text counts up to its first NUL, as in the library's statements,
-    // and must live until the statement is reset.
+    // Sets a parameter; the first is 1. A text ends at its first NUL, as in the library's statements, and
+    // must live until the statement is reset.
     Statement& bind(int nParameter, const std::string& strText);
     Statement& bind(int nParameter, int64_t nNumber);
 
-    // Runs it to its next row; returns false behind the last, and at once for a statement without rows. Then,
-    // and where it fails, it has ended and can be run again.
+    // Runs the statement to its next row. Returns false after the last row, or if it has no rows. After that,
+    // or after an error, the statement has ended and can be run again.
     bool step();
 
-    // Ends it ahead of that.
+    // Ends the statement earlier.
     void reset();
 
-    // A column of the row, counted from 0, as the library reads it: text up to the first NUL; null where it
-    // is NULL. Valid until the next step.
+    // A column of the row, as the library reads it; the first is 0. The text ends at its first NUL, and is
+    // null for NULL. It is valid until the next step.
     const char* text(int nColumn) const;
-    int64_t number(int nColumn) const; // of the text's beginning, 0 where it does not begin with a number
+    int64_t number(int nColumn) const; // at the beginning of the text; 0 if there is none
 
 private:
     [[noreturn]] void fail();
@@ -69,7 +69,7 @@ private:
     sqlite3_stmt* m_pStatement = nullptr;
 };
 
-// A token as its row has it.
+// A token as its row holds it.
 struct Token {
     std::string strTid;
     std::string strSession;
@@ -81,36 +81,35 @@ struct Token {
     Json::Value jAllow; // an object with the one member webapi_allow
     Json::Value jExtra;
     bool blExpired = false;
-    bool blReadable = true; // false where a column is NULL: nobody is granted such a token
+    bool blReadable = true; // false if a column is NULL: such a token is never granted
 
-    // The record without its tid, on one line.
+    // The record as JSON on one line, without its tid.
     std::string recordWithoutTid() const;
 };
 
 // Whether a token opens a call, and why not.
 enum class Verdict : uint8_t { Granted, Unknown, Expired, ApiNotListed, MethodNotListed, Malformed };
 
-// strApi is not empty; an empty strMethod asks for the API alone. Spends nothing. The library logs what it
-// finds malformed, which is why a gate that must not wait for a log keeps the lines away from it. token is
-// only read.
+// Spends nothing. strApi must not be empty; an empty strMethod asks for the API alone. token is only read.
+// The library logs malformed tokens: whoever must not wait for a log must discard its lines.
 Verdict judge(Token& token, const std::string& strApi, const std::string& strMethod);
 
-// What a grant leaves: nothing of the last use (a count of 0 is one last use, like 1), one use less, or all
-// of an unlimited token.
+// What a grant leaves of a token: nothing after the last use (a count of 0 is one last use, like 1), one use
+// less, or all of an unlimited token.
 enum class Left : uint8_t { Nothing, Less, All };
 Left left(int64_t nCount);
 
-// The tokens of a connection, which must outlive this object. Members throw Error, or std::bad_alloc.
+// The tokens in a database. The connection must outlive this object. Members throw Error or std::bad_alloc.
 class Tokens {
 public:
     explicit Tokens(sqlite3* pDb);
 
     std::optional<Token> find(const std::string& strTid);
 
-    // Writes how many uses are left.
+    // Writes the number of uses that are left.
     void setCount(const std::string& strTid, int64_t nCount);
 
-    // Spends one use, of which token tells how many there are.
+    // Spends one use of a token that find() has returned.
     void spend(const Token& token);
 
     // Deletes a token.
