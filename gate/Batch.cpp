@@ -17,7 +17,7 @@ gate::Figure figureOf(grant::Verdict verdict)
     return gate::GRANTED;
 }
 
-// The user whom a uid names, unless it is none or beyond what a uid can be.
+// The user of a uid; nothing for a number that cannot be a user's.
 std::optional<uid_t> userOf(int64_t nUid)
 {
     if (0 > nUid || nUid >= std::numeric_limits<uid_t>::max()) {
@@ -54,7 +54,7 @@ std::optional<Answer> Batch::call(const Request& request)
     if (grant::Verdict::Granted != verdict) {
         return refused(request, figureOf(verdict));
     }
-    // An answer names the owner, so a token of nobody's opens nothing here.
+    // An answer names the owner, so a token without an owner opens nothing here.
     const std::optional<uid_t> uid = userOf(token.nUid);
     const Owners::Owner owner = uid ? m_fOwner(*uid) : Owners::Owner{Owners::State::Nobody, ""};
     Answer answer;
@@ -65,7 +65,7 @@ std::optional<Answer> Batch::call(const Request& request)
     case Owners::State::Nobody: return refused(request, REFUSED_OWNER);
     case Owners::State::Known: break;
     }
-    // As the library's record: after the last use it still shows the count before it.
+    // As in the library's record, the count after the last use is still the one before it.
     const grant::Left left = grant::left(token.nCount);
     if (request.blRecord) {
         grant::Token shown = token;

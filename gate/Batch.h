@@ -16,28 +16,28 @@ namespace gate {
 
 class Batch {
 public:
-    // Within a transaction. fOwner tells what is known of a user; both must outlive the batch.
+    // For use within a transaction. fOwner tells what is known of a user. Both must outlive the batch.
     Batch(grant::Tokens& tokens, const std::function<Owners::Owner(uid_t)>& fOwner)
         : m_tokens(tokens), m_fOwner(fOwner)
     {
     }
 
-    // Decides on a call, and remembers the use that it spends. Nothing while the owner's name is not known:
-    // the call stays open, and nothing is spent. The calls of one token see what those ahead of them have
+    // Decides on a call, and notes the use that it spends. Returns nothing while the owner's name is not
+    // known: the call stays open, and spends nothing. Later calls of a token see the uses that earlier ones
     // left.
     std::optional<Answer> call(const Request& request);
 
-    // Writes what has been spent, each token once.
+    // Writes the uses that were spent, once for each token.
     void save();
 
-    // What has been decided, of the figures from GRANTED to REFUSED_LARGE; for when the transaction lasts.
+    // Counts the decisions: GRANTED to FAILED. To be added up when the transaction is committed.
     const Figures& figures() const { return m_figures; }
 
 private:
     struct Entry {
-        std::optional<grant::Token> token; // with the uses that are left so far
+        std::optional<grant::Token> token; // with the uses that are left
         bool blChanged = false;
-        bool blSpent = false; // its last use
+        bool blSpent = false; // its last use was spent
     };
 
     Answer refused(const Request& request, Figure figure);

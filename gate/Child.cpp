@@ -18,7 +18,7 @@ const int AWAY = 16; // above the numbers that the child expects
     throw std::system_error(errno, std::generic_category(), szWhat);
 }
 
-// In the new process, which has one thread.
+// Turns the new process into the child. The process has one thread, so it may call any function after fork().
 [[noreturn]] void become(const gate::Child& child, std::array<int, 3> rgDescriptor)
 {
     for (int& nDescriptor : rgDescriptor) {
@@ -33,8 +33,8 @@ const int AWAY = 16; // above the numbers that the child expects
     dup2(nNull, STDIN_FILENO);
     dup2(nNull, STDOUT_FILENO);
     close(nNull);
-    // What reaches both processes, such as Ctrl-C, the parent passes on in its own time. Ignored stays
-    // ignored.
+    // A signal such as that of Ctrl-C reaches both processes. The child ignores it, also after execve(): the
+    // parent tells it when to stop.
     signal(SIGINT, SIG_IGN);
     signal(SIGTERM, SIG_IGN);
     sigset_t none;

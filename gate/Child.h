@@ -1,4 +1,4 @@
-// The process that reads HTTP, as the process that holds the tokens starts it.
+// Starts the process that reads HTTP from the process that holds the tokens.
 
 #ifndef GATE_CHILD_H
 #define GATE_CHILD_H
@@ -9,17 +9,17 @@
 
 namespace gate {
 
-// Where the child finds what it is handed over.
+// The child's descriptors: the link, and the sockets for calls and for the status.
 enum ChildDescriptor { CHILD_LINK = 3, CHILD_CALLS = 4, CHILD_STATUS = 5 };
 
 struct Child {
     std::string strProgram;
-    std::string strUser;       // that it becomes
-    std::string strOnceHeader; // "": none
+    std::string strUser;       // the user that the child becomes
+    std::string strOnceHeader; // "": there is none
 };
 
-// Starts it with the sockets, which are closed here, and nothing else that is open but standard error.
-// Returns the other end of its link. Throws std::system_error.
+// Starts the child with the sockets, which this closes here, and with standard error; nothing else stays open
+// in the child. Returns the other end of its link. Throws std::system_error.
 int start(const Child& child, const Sockets& sockets);
 
 } // namespace gate

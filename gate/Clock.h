@@ -1,4 +1,4 @@
-// The monotonic clock, which both processes of the gate see alike.
+// The monotonic clock, which is the same in both processes of the gate.
 
 #ifndef GATE_CLOCK_H
 #define GATE_CLOCK_H

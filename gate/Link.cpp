@@ -12,7 +12,7 @@ namespace gate {
 
 const size_t MESSAGE_MAX = std::max(REQUEST_MAX, ANSWER_MAX);
 
-// Only the pages that messages fill take memory.
+// The buffer takes memory only for pages that messages have filled.
 Link::Link(int nSocket) : m_nSocket(nSocket), m_rgBuffer(new char[AT_ONCE * MESSAGE_MAX]) {}
 
 Link::~Link()

@@ -21,16 +21,15 @@ public:
 
     int descriptor() const { return m_nSocket; }
 
-    // Keeps a message until it is flushed.
+    // Queues a message for flush().
     void add(std::string strMessage) { m_strWaiting.push_back(std::move(strMessage)); }
     size_t waiting() const { return m_strWaiting.size(); }
 
-    // Sends what can be sent at once; the rest waits until the socket can take more. Returns false when the
-    // other end is closed.
+    // Sends what the socket takes now; the rest stays queued. Returns false if the other end is closed.
     bool flush();
 
-    // Hands over what has come, message by message, up to some number of them. Returns false when the other
-    // end is closed, and all that came before has been handed over.
+    // Calls take() with each message that has come, at most AT_ONCE of them. Returns false if the other end
+    // is closed, after all that came before was passed on.
     bool receive(const std::function<void(std::string_view)>& take);
 
 private:

@@ -7,8 +7,8 @@
 
 namespace gate {
 
-// Writes one line with a priority of syslog(3) ahead of it, as systemd reads it ("<4>"). Never blocks: a line
-// that nobody takes is dropped. Of the same text, one line a second at most.
+// Writes a line with a priority of syslog(3) before it, in systemd's form ("<4>"). Never blocks: a line that
+// cannot be written now is dropped. A text that repeats itself is written once a second at most.
 void log(int nPriority, const std::string& strText);
 
 } // namespace gate

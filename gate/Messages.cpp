@@ -43,7 +43,7 @@ std::string begin(const Head& head, size_t cbTexts)
     return strMessage;
 }
 
-// The head of a message, and the texts behind it taken one by one.
+// Reads a message: its head, and then the texts after it, one by one.
 template <typename Head>
 class Reader {
 public:
@@ -65,14 +65,14 @@ public:
         m_strRest.remove_prefix(cbText);
         return strText;
     }
-    // The same for a text that has no NUL.
+    // take() for a text that must not hold a NUL.
     std::string_view takeText(size_t cbText, size_t cbMax)
     {
         const std::string_view strText = take(cbText, cbMax);
         m_blGood = m_blGood && std::string_view::npos == strText.find('\0');
         return strText;
     }
-    // Whether all was as it should be, to the last byte.
+    // Whether all texts were valid and nothing is left over.
     bool isWhole() const { return m_blGood && m_strRest.empty(); }
 
     Head head = {};

@@ -1,8 +1,8 @@
-// What the two processes of the gate say to each other. One reads HTTP and holds no secret; the other,
-// root's, holds the tokens and reads nothing but these messages, of which it trusts no byte.
+// The messages between the two processes of the gate. One process reads HTTP and holds no secret. The other
+// runs as root, holds the tokens, and reads nothing but these messages, of which it trusts no byte.
 //
-// Each message is one packet of a SOCK_SEQPACKET pair: a head of fixed size, and behind it, without a gap,
-// texts whose sizes the head tells. Numbers are in the order of this machine.
+// Each message is one packet of a SOCK_SEQPACKET pair: a head of fixed size, and then, without gaps, the
+// texts whose sizes the head tells. Numbers have the byte order of this machine.
 
 #ifndef GATE_MESSAGES_H
 #define GATE_MESSAGES_H
@@ -16,7 +16,7 @@
 
 namespace gate {
 
-// The longest texts, in bytes. What is longer is refused before it becomes a message.
+// The longest texts, in bytes. Longer ones are refused before they become a message.
 const size_t TID_MAX = 1024;
 const size_t API_MAX = 512;
 const size_t METHOD_MAX = 512;
@@ -24,17 +24,17 @@ const size_t USER_MAX = 256;
 const size_t FUNCTION_MAX = 1024;
 const size_t RECORD_MAX = 16384;
 
-// From the one that reads HTTP.
+// What the process that reads HTTP asks for.
 enum class Ask : uint8_t {
-    Grant,  // strTid, strApi, strMethod
-    Cancel, // of the grant with the same number: whoever asked has gone
-    Health, // a look at the store
-    Figures // what has been counted
+    Grant,  // of a call: strTid, strApi, strMethod
+    Cancel, // the grant with the same number: its client has gone
+    Health, // whether tokens can be read
+    Figures // all figures
 };
 
 struct Request {
-    uint64_t nNumber = 0; // comes back with the answer; that of a grant not answered yet is not used again
-    int64_t nDue = 0;     // of the monotonic clock, in ns: a grant that has not begun then is not made
+    uint64_t nNumber = 0; // comes back with the answer; unique among grants without an answer
+    int64_t nDue = 0;     // monotonic, in ns: a grant that has not begun by then is not made
     Ask ask = Ask::Grant;
     bool blRecord = false; // the record is wanted
     std::string strTid;
@@ -45,14 +45,14 @@ struct Request {
 enum class Outcome : uint8_t {
     Granted,   // one use is spent; strUser, nUid and strFunction tell whose token it is
     Refused,   // nothing is spent
-    Failed,    // the store failed, and nothing is spent
-    Late,      // it was due, and nothing is spent
-    Cancelled, // by Ask::Cancel, and nothing is spent
-    Told,      // what Ask::Health and Ask::Figures asked for
-    Stop       // no answer: take no more calls, and end when all are answered
+    Failed,    // the store, the lock or the user database failed; nothing is spent
+    Late,      // it did not begin before nDue; nothing is spent
+    Cancelled, // by Ask::Cancel; nothing is spent
+    Told,      // the answer to Ask::Health and Ask::Figures
+    Stop       // not an answer: take no more calls, and end when all are answered
 };
 
-// What the process that holds the tokens counts. All begin at 0 when it starts.
+// What the process that holds the tokens counts, from 0 when it starts. STORE_BYTES is a size.
 enum Figure : size_t {
     GRANTED,
     REFUSED_UNKNOWN,
@@ -60,16 +60,16 @@ enum Figure : size_t {
     REFUSED_API,
     REFUSED_METHOD,
     REFUSED_MALFORMED,
-    REFUSED_OWNER, // the owner has no name
-    REFUSED_LARGE, // an answer cannot carry it
+    REFUSED_OWNER, // its owner is not a user, or the name is too long
+    REFUSED_LARGE, // too large for an answer
     FAILED,
     LATE,
     CANCELLED,
     BATCHES,
     BATCHES_FAILED,
-    WAIT_NS,   // for the locks of other programs
-    COMMIT_NS, // for commits
-    PURGED,    // expired tokens
+    WAIT_NS,   // spent waiting for the locks of other programs
+    COMMIT_NS, // spent on commits
+    PURGED,    // expired tokens that were deleted
     BATCH_LE_1,
     BATCH_LE_4,
     BATCH_LE_16,
@@ -84,10 +84,10 @@ struct Answer {
     uint64_t nNumber = 0;
     Outcome outcome = Outcome::Failed;
     bool blHealthy = false; // for Ask::Health
-    uint32_t nUid = 0;      // this and the texts: for Outcome::Granted
+    uint32_t nUid = 0;      // this and the texts are for Outcome::Granted
     std::string strUser;
     std::string strFunction;
-    std::string strRecord; // without the tid; JSON
+    std::string strRecord; // JSON, without the tid
     Figures figures = {};  // for Ask::Figures
 };
 
@@ -95,12 +95,11 @@ struct Answer {
 const size_t REQUEST_MAX = 64 + TID_MAX + API_MAX + METHOD_MAX;
 const size_t ANSWER_MAX = 64 + USER_MAX + FUNCTION_MAX + RECORD_MAX;
 
-// A message's bytes. What is written must keep the limits above.
+// The bytes of a message. Its texts must keep the limits above.
 std::string encode(const Request& request);
 std::string encode(const Answer& answer);
 
-// Nothing for what is no message: a size, a text's size or a value that cannot be. So each message has one
-// form.
+// Returns nothing for a message with a wrong size or an impossible value. So each message has one form only.
 std::optional<Request> decodeRequest(std::string_view strMessage);
 std::optional<Answer> decodeAnswer(std::string_view strMessage);
 

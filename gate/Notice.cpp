@@ -22,7 +22,7 @@ void notify(const char* szState)
     const socklen_t cbAddress =
         static_cast<socklen_t>(offsetof(struct sockaddr_un, sun_path) + strlen(szPath));
     if ('@' == szPath[0]) {
-        address.sun_path[0] = '\0'; // of the abstract kind
+        address.sun_path[0] = '\0'; // an abstract address
     }
     const int nSocket = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
     if (0 <= nSocket) {

@@ -1,4 +1,4 @@
-// What the gate tells the service manager, by the protocol of sd_notify(3). Without one, nothing happens.
+// Messages to the service manager, if there is one, by the protocol of sd_notify(3).
 
 #ifndef GATE_NOTICE_H
 #define GATE_NOTICE_H
@@ -10,7 +10,7 @@ namespace gate {
 // Sends lines such as "READY=1".
 void notify(const char* szState);
 
-// How often the service manager wants to hear "WATCHDOG=1" at least, in ns; 0 for never.
+// The longest time, in ns, that the service manager waits for the next "WATCHDOG=1"; 0: it waits for none.
 int64_t watchdogPeriod();
 
 } // namespace gate

@@ -14,10 +14,10 @@
 
 namespace {
 
-const int64_t FRESH = 10 * gate::SECOND; // a name that is older is looked up again
-const int64_t KEPT = 60 * gate::SECOND;  // and used until then, where that takes long
+const int64_t FRESH = 10 * gate::SECOND; // an older name is looked up again
+const int64_t KEPT = 60 * gate::SECOND;  // and stays in use until this age while the look-up takes long
 const int64_t FAILING_KEPT = gate::SECOND;
-const size_t OWNERS_MAX = 4096; // more than that are forgotten all at once
+const size_t OWNERS_MAX = 4096; // beyond, all are forgotten at once
 
 } // namespace
 
@@ -29,7 +29,7 @@ Owners::Owners(std::function<Owner(uid_t)> fLookUp)
     if (0 > m_nEvent) {
         throw std::system_error(errno, std::generic_category(), "eventfd");
     }
-    // It may stand still in a user database when the process ends, and ends with it.
+    // Detached, because it may be stuck in a user database when the process ends.
     std::thread([this] { run(); }).detach();
 }
 

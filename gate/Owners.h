@@ -1,4 +1,4 @@
-// The names of users, as answers carry them.
+// The names of the users that own tokens, for answers.
 
 #ifndef GATE_OWNERS_H
 #define GATE_OWNERS_H
@@ -15,31 +15,31 @@
 
 namespace gate {
 
-// Keeps names for some seconds, because a user database can be slow, and looks them up in a thread of its
-// own, because it can stall.
+// Keeps names for some seconds, because a user database can be slow. Looks them up in a thread, because a
+// user database can hang.
 class Owners {
 public:
     enum class State {
-        Asked,   // not known yet: the descriptor becomes readable when it is
+        Asked,   // not known yet; the descriptor becomes readable when it is
         Known,   // strName
-        Nobody,  // there is no such user
-        Failing, // the user database cannot tell
+        Nobody,  // there is no such user, or the name is too long
+        Failing, // the user database failed
     };
     struct Owner {
         State state = State::Asked;
         std::string strName;
         int64_t nFreshUntil = 0; // when to look again
-        int64_t nUntil = 0;      // when to believe it no more
+        int64_t nUntil = 0;      // when to stop using it
         bool blAsked = false;    // it is being looked up
     };
 
-    // fLookUp tells the state and the name; it runs in the thread.
+    // fLookUp returns the state and the name. The thread calls it.
     explicit Owners(std::function<Owner(uid_t)> fLookUp);
 
-    // What is known of a user now.
+    // Returns what is known of a user now, and starts a look-up if needed.
     Owner find(uid_t uid);
 
-    // Readable when a name that was asked for is there; clear() before looking.
+    // Readable after a look-up has ended. Call clear() before find().
     int descriptor() const { return m_nEvent; }
     void clear();
 
@@ -54,7 +54,7 @@ private:
     std::unordered_map<uid_t, Owner> m_owners;
 };
 
-// The user database of this machine.
+// Looks up a user in the user database of this machine.
 Owners::Owner lookUpOwner(uid_t uid);
 
 } // namespace gate

@@ -18,12 +18,12 @@
 namespace {
 
 const size_t BATCH_MAX = 256;
-const size_t CALLS_MAX = 4096;              // more are not taken from the socket
-const size_t ANSWERS_MAX = 4096;            // the same while so many wait to be taken
-const int64_t CALL_WAIT_MAX = gate::SECOND; // whatever is asked for
+const size_t CALLS_MAX = 4096;              // while so many wait, run() takes no more from the socket
+const size_t ANSWERS_MAX = 4096;            // the same for answers that were not sent yet
+const int64_t CALL_WAIT_MAX = gate::SECOND; // whatever the request says
 const int64_t TRY_AGAIN_AFTER = gate::MILLISECOND;
-const int64_t COMMIT_WAIT = gate::SECOND / 2; // for readers that keep a commit waiting
-const int64_t LOOK_WAIT = gate::SECOND / 2;   // for writers that keep a look at the store waiting
+const int64_t COMMIT_WAIT = gate::SECOND / 2; // how long a commit waits for readers
+const int64_t LOOK_WAIT = gate::SECOND / 2;   // how long a look at the store waits for writers
 
 gate::Figure sizeFigure(size_t nCalls)
 {
@@ -34,7 +34,7 @@ gate::Figure sizeFigure(size_t nCalls)
     return static_cast<gate::Figure>(nFigure);
 }
 
-// Calls until it returns true, or the time is over.
+// Calls fTry() until it returns true. Returns false if that takes longer than nWait.
 bool isDoneWithin(int64_t nWait, const std::function<bool()>& fTry)
 {
     for (const int64_t nEnd = gate::now() + nWait; !fTry();) {
@@ -96,7 +96,7 @@ bool Service::run()
     }
 }
 
-// How long to wait for something to happen, in ms: not at all while there is something to do.
+// How long run() may wait for an event, in ms: 0 if there is work to do.
 int Service::timeout() const
 {
     if (!m_calls.empty() && !m_nTryAt) {
@@ -118,7 +118,7 @@ void Service::take(std::string_view strMessage)
     std::optional<Request> request = decodeRequest(strMessage);
     if (!request) {
         log(LOG_ERR, "the process that reads HTTP sent what is no message");
-        _exit(EXIT_FAILURE); // who sends such things has been taken over
+        _exit(EXIT_FAILURE); // an attacker has taken that process over
     }
     switch (request->ask) {
     case Ask::Grant:
@@ -126,7 +126,7 @@ void Service::take(std::string_view strMessage)
         m_calls.push_back(std::move(*request));
         return;
     case Ask::Cancel: cancel(request->nNumber); return;
-    case Ask::Health: // not within a transaction
+    case Ask::Health: // done later, outside a transaction
         request->nDue = now() + LOOK_WAIT;
         m_looks.push_back(std::move(*request));
         return;
@@ -157,12 +157,12 @@ void Service::cancel(uint64_t nNumber)
         answer(*itParked, Outcome::Cancelled);
         m_parked.erase(itParked);
     } else {
-        return; // it has its answer already
+        return; // the call was answered already
     }
     ++m_figures[CANCELLED];
 }
 
-// One look for all who have asked. They wait while others are in the way.
+// Looks at the store once for all who have asked. They wait while other programs are in the way.
 void Service::look()
 {
     if (m_looks.empty()) {
@@ -218,14 +218,14 @@ void Service::expire()
     }
 }
 
-// Notes that others are in the way.
+// Notes that other programs are in the way, and when to try again.
 void Service::wait(int64_t nNow)
 {
     m_nWaitingSince = m_nWaitingSince ? m_nWaitingSince : nNow;
     m_nTryAt = nNow + TRY_AGAIN_AFTER;
 }
 
-// Others are in the way no more, or nobody is who waits for them.
+// Ends the wait: other programs are no longer in the way, or no call is left that waits.
 void Service::endWait()
 {
     m_figures[WAIT_NS] += m_nWaitingSince ? static_cast<uint64_t>(now() - m_nWaitingSince) : 0;
@@ -236,7 +236,7 @@ void Service::serve()
 {
     const int64_t nNow = now();
     if (m_calls.empty()) {
-        m_turn.give(); // it may have come when nobody waited any more
+        m_turn.give(); // the lock may have come after the last call had gone
         return;
     }
     if (nNow < m_nTryAt) {
@@ -267,7 +267,7 @@ void Service::serve()
     m_turn.give();
 }
 
-// All calls that wait fail, with nothing spent.
+// Answers all calls that wait with a failure. Nothing is spent.
 void Service::failAll(const std::string& strReason)
 {
     log(LOG_ERR, strReason);
@@ -281,10 +281,10 @@ void Service::failAll(const std::string& strReason)
     endWait();
 }
 
-// Within a transaction, which it ends.
+// Serves a batch of calls within a transaction, and commits it.
 void Service::serveBatch()
 {
-    // Those who have come meanwhile join, and those who have gone leave.
+    // Calls that have come meanwhile join, and calls that are too late or cancelled leave.
     receive();
     expire();
     const size_t nCalls = std::min(BATCH_MAX, m_calls.size());
@@ -323,7 +323,8 @@ void Service::serveBatch()
     ++m_figures[sizeFigure(nCalls)];
 }
 
-// That the gate is ready, and alive: this process and the other, which asks for figures each second.
+// Tells the service manager that the gate is ready, and that both processes are alive: the other process asks
+// for figures each second.
 void Service::notifyManager()
 {
     static const int64_t nPeriod = watchdogPeriod();

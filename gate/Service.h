@@ -1,4 +1,4 @@
-// The process that holds the tokens: takes what the other one asks, batch by batch.
+// The process that holds the tokens: it answers what the other process asks, batch by batch.
 
 #ifndef GATE_SERVICE_H
 #define GATE_SERVICE_H
@@ -14,13 +14,13 @@
 
 namespace gate {
 
-// An object is never destroyed: its threads may stand still in the locks and the user database of others.
+// An object is never destroyed, because its threads may be stuck at the lock or in a user database.
 class Service {
 public:
-    // link: to the other process. nSignals: a signalfd, which is readable when the service is to stop.
+    // link leads to the other process. nSignals is a signalfd: it is readable when the service is to stop.
     Service(Link& link, int nSignals);
 
-    // Serves until the other process ends. It is asked to when a signal comes. Returns whether it was.
+    // Serves until the other process ends. A signal makes it ask for that end. Returns whether it has asked.
     bool run();
 
 private:
@@ -44,14 +44,14 @@ private:
     Store m_store;
     Turn m_turn;
     Owners m_owners{lookUpOwner};
-    std::deque<Request> m_calls;   // to be decided
-    std::vector<Request> m_parked; // until their owners' names are known
-    std::vector<Request> m_batch;  // of the transaction at hand
-    std::vector<Request> m_looks;  // at the store, for those who ask for its health
+    std::deque<Request> m_calls;   // wait for a decision
+    std::vector<Request> m_parked; // wait for the names of their owners
+    std::vector<Request> m_batch;  // are in the current transaction
+    std::vector<Request> m_looks;  // ask for the health of the store
     Figures m_figures = {};
-    int64_t m_nWaitingSince = 0; // for the locks of others; 0: not waiting
+    int64_t m_nWaitingSince = 0; // when waiting for other programs' locks began; 0: not waiting
     int64_t m_nTryAt = 0;
-    int64_t m_nHeard = 0; // when the other process asked for figures
+    int64_t m_nHeard = 0; // when the other process last asked for figures
     int64_t m_nNotifyAt = 0;
     bool m_blReady = false;
     bool m_blStopping = false;

@@ -12,14 +12,13 @@ struct Sockets {
     int nStatus = -1; // for /health and /metrics; -1: none
 };
 
-// Those that the service manager hands over (sd_listen_fds(3)): the one that is named "status", and the
-// other; without names, the first is for calls. Their variables are removed from the environment. Nothing
-// where there are none. Throws std::runtime_error for what cannot be.
+// Returns the sockets that the service manager has passed (sd_listen_fds(3)): the one named "status", and the
+// other one; without names, the first is for calls. Removes their variables from the environment. Without
+// such sockets, nCalls is -1. Throws std::runtime_error if there are wrong ones.
 Sockets handedOver();
 
-// Listens at a path, with mode 0660 for the group, or 0600 where there is no such group. What stands at the
-// path is replaced at once, so that nobody is refused while another process takes over. Throws
-// std::system_error.
+// Listens at a path, with mode 0660 for the group, or 0600 if there is no such group. Replaces an existing
+// file in one step, so that no client is refused while another process takes over. Throws std::system_error.
 int listenAt(const std::string& strPath, const char* szGroup);
 
 } // namespace gate

@@ -10,8 +10,8 @@
 
 namespace {
 
-// Where a purge takes long, for want of an index, it comes less often: a fiftieth of the time is for purges.
-// No grant depends on them, since each looks at the deadline of its own token.
+// A purge takes long without an index. Purges take at most a fiftieth of the time, so long ones come less
+// often. No grant depends on them, because each grant checks the deadline of its token.
 const int64_t PURGE_EACH = gate::SECOND;
 const int64_t PURGE_SHARE = 50;
 
@@ -20,7 +20,7 @@ sqlite3* opened(AccessTokenDbApi& db)
     if (0 > db.initDb() || !db.m_pDb) {
         throw grant::Error(SQLITE_CANTOPEN, "the database cannot be opened");
     }
-    // A commit is on the disk when it returns: with a rollback journal, that takes the directory as well.
+    // A commit is on the disk when it returns. EXTRA also syncs the directory, for a rollback journal.
     for (const char* szSql : {"PRAGMA synchronous = EXTRA", "PRAGMA temp_store = MEMORY"}) {
         if (SQLITE_OK != sqlite3_exec(db.m_pDb, szSql, nullptr, nullptr, nullptr)) {
             throw grant::Error(sqlite3_extended_errcode(db.m_pDb), sqlite3_errmsg(db.m_pDb));
@@ -29,7 +29,7 @@ sqlite3* opened(AccessTokenDbApi& db)
     return db.m_pDb;
 }
 
-// Whether a statement was done, and not refused because others hold the database.
+// Runs a statement. Returns false if other programs hold the database.
 bool isDone(grant::Statement& statement)
 {
     try {
@@ -107,7 +107,7 @@ void Store::rollBack() noexcept
     try {
         m_connection->rollBack.step();
     } catch (...) {
-        m_connection.reset(); // closing undoes it too
+        m_connection.reset(); // closing the connection also undoes it
     }
 }
 

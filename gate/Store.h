@@ -11,22 +11,22 @@
 
 namespace gate {
 
-// The connection is opened when it is needed, and anew after a failure, or when another file has taken the
-// place of the database. All members but rollBack throw grant::Error.
+// The connection is opened when it is needed, and again after a failure, or if another file has replaced the
+// database. All members but rollBack throw grant::Error.
 class Store {
 public:
-    // Begins a transaction in which nobody else writes. Returns false when others hold the database now.
+    // Begins a transaction in which nobody else writes. Returns false if others hold the database now.
     bool begin();
 
     // The tokens, within a transaction.
     grant::Tokens& tokens() { return m_connection->tokens; }
 
-    // Deletes the expired tokens, within a transaction, if that was not done a second ago or less. Returns
-    // how many.
+    // Deletes the expired tokens, within a transaction, unless the last purge was less than a second ago, or
+    // less than 50 times as long ago as it took. Returns how many were deleted.
     uint64_t purge();
 
-    // Makes the transaction last, also when power is cut now. Returns false when others hold the database; it
-    // can be tried again.
+    // Commits the transaction, which then outlasts a power cut. Returns false if other programs hold the
+    // database; the caller can try again.
     bool commit();
 
     // Undoes the transaction.

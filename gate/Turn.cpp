@@ -12,8 +12,9 @@
 
 namespace {
 
-// Of the time, others have one part in fifty for themselves, long enough for one who sleeps to wake up in; or
-// one in two hundred where none has been met for a second, since each pause is one that clients wait for.
+// The gate leaves the lock to others for a fiftieth of the time, in pauses that are long enough for a
+// sleeping program to wake up. If it has met no other program for a second, it leaves only one part in 200,
+// because clients wait during each pause.
 const int64_t PAUSE = gate::MILLISECOND / 2;
 const int64_t PAUSE_EACH = 25 * gate::MILLISECOND;
 const int64_t PAUSE_EACH_ALONE = 100 * gate::MILLISECOND;
@@ -28,9 +29,7 @@ Turn::Turn() : m_nEvent(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)), m_nPauseAt(now(
     if (0 > m_nEvent) {
         throw std::system_error(errno, std::generic_category(), "eventfd");
     }
-    std::thread([this] {
-        run();
-    }).detach(); // it may wait for the lock when the process ends, and ends with it
+    std::thread([this] { run(); }).detach(); // it may still wait for the lock when the process ends
 }
 
 bool Turn::take()
@@ -84,7 +83,7 @@ void Turn::run()
 {
     for (std::unique_lock guard(m_mutex);;) {
         m_wanted.wait(guard, [this] { return m_blWanted; });
-        guard.unlock(); // while it is wanted, m_lock is this thread's
+        guard.unlock(); // while m_blWanted is set, only this thread uses m_lock
         int nError = 0;
         try {
             m_lock.emplace();

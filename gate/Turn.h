@@ -1,4 +1,4 @@
-// The gate's turns at the lock that programs take for a call.
+// The gate's turns at the lock of all programs (CallLock.h).
 
 #ifndef GATE_TURN_H
 #define GATE_TURN_H
@@ -13,19 +13,19 @@
 
 namespace gate {
 
-// Takes the lock at once where it is free. Where it is not, a thread waits in the line of those who want it,
-// so that the gate gets its turn however busy the others are. And it leaves the lock alone for a moment now
-// and then, so that the others get theirs however busy the gate is.
+// Takes the lock at once if it is free. If not, a thread waits for it in the kernel's queue, so that the gate
+// gets its turn however busy others are. The gate also leaves the lock alone for short pauses, so that others
+// get their turns however busy the gate is.
 class Turn {
 public:
     Turn();
 
-    // Whether the lock is held now. If not, try again when the descriptor is readable, or after 1 ms. Throws
-    // std::system_error when it cannot be had at all.
+    // Tries to take the lock, and returns whether it is held now. If not, try again when the descriptor is
+    // readable, or after 1 ms. Throws std::system_error if the lock cannot be taken at all.
     bool take();
 
-    // Frees the lock, if it is held. While the thread still waits for it, it comes later, and the descriptor
-    // tells: whoever has no use for it any more gives it again then.
+    // Frees the lock if it is held. If the thread still waits for it, the lock comes later, and the
+    // descriptor becomes readable: call give() again then, if no call needs the lock.
     void give();
 
     int descriptor() const { return m_nEvent; }
@@ -38,10 +38,10 @@ private:
     std::condition_variable m_wanted;
     std::optional<CallLock> m_lock;
     bool m_blWanted = false; // the thread waits for the lock
-    int m_nError = 0;        // why it could not have it
-    int64_t m_nPauseAt;      // when to leave the lock alone
+    int m_nError = 0;        // why the thread could not take the lock
+    int64_t m_nPauseAt;      // when the next pause is due
     int64_t m_nPauseUntil = 0;
-    int64_t m_nMet = 0; // when another had the lock
+    int64_t m_nMet = 0; // when another program last had the lock
 };
 
 } // namespace gate

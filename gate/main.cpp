@@ -1,5 +1,5 @@
-// vemo-access-token-gate: grants tokens over HTTP to programs that are not root. This process, root's, holds
-// the token database; another, which it starts, reads HTTP and may do nothing else.
+// vemo-access-token-gate grants tokens over HTTP to programs that are not root. This process runs as root and
+// holds the token database. It starts another one, which reads HTTP and may do nothing else.
 
 #include <fcntl.h>
 #include <getopt.h>
@@ -25,7 +25,7 @@
 
 namespace {
 
-const char* const GROUP = "vemo-access-token"; // who may ask
+const char* const GROUP = "vemo-access-token"; // whose users may ask
 
 const char* const HELP = R"(usage: vemo-access-token-gate [--socket PATH] [--status-socket PATH]
                               [--user NAME] [--once-header NAME]
@@ -73,7 +73,7 @@ Options read(int nArguments, char** rgArguments)
         case USER: options.child.strUser = optarg; break;
         case ONCE_HEADER:
             options.child.strOnceHeader = optarg;
-            if (!isHeaderName(optarg)) { // no call would have it, and each repetition would spend a use
+            if (!isHeaderName(optarg)) { // no request could have it, so each repetition would spend a use
                 fprintf(stderr, "vemo-access-token-gate: \"%s\" is no name of a header\n", optarg);
                 exit(2);
             }
@@ -90,8 +90,8 @@ Options read(int nArguments, char** rgArguments)
     return options;
 }
 
-// A socket with the number of a closed standard stream would be taken for that stream. And a log that nobody
-// reads must not end the gate: the child inherits both.
+// Opens each closed standard stream, so that no socket gets its number. Ignores SIGPIPE, so that a log that
+// nobody reads does not end the gate. The child inherits both.
 void prepareStreams()
 {
     int nStream = 0;
@@ -125,7 +125,7 @@ gate::Sockets listenWhere(const Options& options)
     return sockets;
 }
 
-// SIGTERM and SIGINT as something to read.
+// Blocks SIGTERM and SIGINT, and returns a descriptor that reads them.
 int catchSignals()
 {
     sigset_t signals;
@@ -148,15 +148,15 @@ int serve(const Options& options)
     const gate::Sockets sockets = listenWhere(options);
     const int nSignals = catchSignals();
     auto pLink = std::make_unique<gate::Link>(gate::start(options.child, sockets));
-    // The library's lines would be written within transactions, and carry whole ids.
+    // The library's log lines are discarded: they hold whole ids, and would be written within transactions.
     if (!freopen("/dev/null", "w", stdout)) {
         throw std::system_error(errno, std::generic_category(), "/dev/null");
     }
     VEMO_ACCESS_TOKEN::logToStdout(true);
-    VEMO_ACCESS_TOKEN::tokenType(); // before there are threads
+    VEMO_ACCESS_TOKEN::tokenType(); // the first call must be made before there are threads
 
     const bool blAsked = (new gate::Service(*pLink, nSignals))->run();
-    pLink.reset(); // so that the other process ends
+    pLink.reset(); // then the other process ends
     int nStatus = 0;
     wait(&nStatus);
     if (blAsked && 0 == nStatus) {
@@ -175,7 +175,7 @@ int main(int nArguments, char** rgArguments)
 {
     prepareStreams();
     try {
-        // The threads of the service may stand still, and nothing waits for them.
+        // _exit(), because threads of the service may be stuck, and nothing may wait for them.
         _exit(serve(read(nArguments, rgArguments)));
     } catch (const std::exception& exception) {
         gate::log(LOG_ERR, std::string("vemo-access-token-gate: ") + exception.what());

@@ -15,8 +15,8 @@ int hexDigit(char c)
     return 'a' <= cLower && cLower <= 'f' ? cLower - 'a' + 10 : -1;
 }
 
-// The first part of a path, which is removed with the slash ahead of it. Returns false for one that has no
-// meaning here, or could have two.
+// Takes the first part of a path, and removes it with the slash before it. Returns false for a part that has
+// no meaning here, or could have two.
 bool takePart(std::string_view& strPath, std::string& strPart)
 {
     strPath.remove_prefix(1);
@@ -49,14 +49,14 @@ int readTarget(std::string_view strTarget, gate::Call& call)
     }
     std::string_view strPath = strTarget.substr(strGrant.size() - 1);
     strPath = strPath.substr(0, strPath.find('?'));
-    // A method that is empty is not none: the API alone would allow more than who left it empty may think.
+    // An empty method is refused: it must not mean the API alone, which would allow more than expected.
     if (!takePart(strPath, call.strApi) || (!strPath.empty() && !takePart(strPath, call.strMethod))) {
         return 400;
     }
     return call.strApi.size() > gate::API_MAX || call.strMethod.size() > gate::METHOD_MAX ? 414 : 0;
 }
 
-// The id of "Bearer ID"; empty where there is none.
+// The id in "Bearer ID"; empty if there is none.
 std::string_view bearer(std::string_view strCredential)
 {
     const std::string_view strScheme = "bearer ";
@@ -93,7 +93,7 @@ int readCall(const Head& head, const std::string& strOnceHeader, Call& call)
         return 401;
     }
     if (call.strTid.size() > TID_MAX || std::string::npos != call.strTid.find_first_of(" \t")) {
-        return 403; // nobody's id can come so
+        return 403; // no id can look like this
     }
     if (!strOnceHeader.empty()) {
         call.strOnce = head.value(strOnceHeader);

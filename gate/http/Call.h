@@ -1,4 +1,4 @@
-// What a request to the gate asks for: the target names API and method, a header carries the id.
+// A call, read from a request: the target names API and method, and a header carries the id.
 
 #ifndef GATE_HTTP_CALL_H
 #define GATE_HTTP_CALL_H
@@ -13,12 +13,11 @@ struct Call {
     std::string strTid;
     std::string strApi;
     std::string strMethod; // empty: the API alone
-    std::string strOnce;   // tells it from its repetition; empty: each is a call of its own
+    std::string strOnce;   // a repetition has the same; empty: each request is a new call
     bool blRecord = false;
 };
 
-// The status that answers a request which is no call, or 0 and the call. strOnceHeader is in lower case, or
-// empty.
+// Reads a call. Returns 0, or the status for a request that is not a call. strOnceHeader is in lower case.
 int readCall(const Head& head, const std::string& strOnceHeader, Call& call);
 
 } // namespace gate

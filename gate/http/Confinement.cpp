@@ -22,7 +22,7 @@
 
 namespace {
 
-// AddressSanitizer makes system calls of its own.
+// AddressSanitizer makes more system calls, so its builds have no filter.
 #if defined(__has_feature)
 #if __has_feature(address_sanitizer)
 #define VEMO_GATE_SANITIZED
@@ -41,7 +41,7 @@ void require(bool blDone, const char* szWhat)
     }
 }
 
-// A directory that is removed while it is the root of a process stays empty for ever.
+// Makes an empty directory the root. It is removed, so it stays empty for ever.
 void leaveFiles()
 {
     char szDirectory[] = "/tmp/vemo-access-token-gate-XXXXXX";
@@ -112,7 +112,7 @@ void filterSystemCalls()
         errno = -seccomp_rule_add(pFilter.get(), SCMP_ACT_ALLOW, nCall, 0);
         require(0 == errno, "seccomp_rule_add");
     }
-    // Memory, but none that could be executed.
+    // Memory is allowed, but not executable memory.
     const struct scmp_arg_cmp notExecutable = {2, SCMP_CMP_MASKED_EQ, PROT_EXEC, 0};
     errno = -seccomp_rule_add_array(pFilter.get(), SCMP_ACT_ALLOW, SCMP_SYS(mmap), 1, &notExecutable);
     require(0 == errno, "seccomp_rule_add");
@@ -132,7 +132,7 @@ void confine(const char* szUser)
     }
     require(0 == prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0), "PR_SET_NO_NEW_PRIVS");
     require(0 == prctl(PR_SET_DUMPABLE, 0, 0, 0, 0), "PR_SET_DUMPABLE");
-    require(0 == prctl(PR_SET_PDEATHSIG, SIGKILL, 0, 0, 0), "PR_SET_PDEATHSIG"); // a change of user undoes it
+    require(0 == prctl(PR_SET_PDEATHSIG, SIGKILL, 0, 0, 0), "PR_SET_PDEATHSIG"); // become() resets it
     if (getppid() != pidParent) {
         throw std::runtime_error("the parent has ended");
     }

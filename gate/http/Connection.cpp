@@ -73,7 +73,7 @@ void Connection::receive()
     if (0 >= cbBytes) {
         m_blEnded = true;
         event_del(m_readable.get());
-        // One who has only finished sending still wants the answer that is under way.
+        // A client that has only finished sending still wants the answer under way.
         m_blOver = m_blOver || 0 > cbBytes || State::Closing == state || hasGone() || isIdle();
         return;
     }
@@ -85,7 +85,7 @@ void Connection::receive()
     }
     strInput.append(rgBytes, static_cast<size_t>(cbBytes));
     if (!isReady() && strInput.size() > HEAD_MAX_BYTES) {
-        event_del(m_readable.get()); // until a response has gone
+        event_del(m_readable.get()); // until a response was sent
     }
 }
 
@@ -124,7 +124,8 @@ void Connection::flush()
     }
 }
 
-// Ends the connection without taking the response from a client who is still sending: closing at once would.
+// Ends the sending side, and lets the client finish. To close at once could destroy the response on its way
+// to a client that is still sending.
 void Connection::finish()
 {
     shutdown(m_nSocket, SHUT_WR);

@@ -1,4 +1,4 @@
-// One connection of a client, as bytes: what has come and what is to go. It never blocks.
+// One connection of a client: the bytes that have come and those that are to go. It never blocks.
 
 #ifndef GATE_HTTP_CONNECTION_H
 #define GATE_HTTP_CONNECTION_H
@@ -23,13 +23,13 @@ typedef std::unique_ptr<struct event, EventDeleter> Event;
 class Connection {
 public:
     enum class State {
-        Reading, // of the next head
+        Reading, // the next head
         Waiting, // for the answer to a call
-        Closing, // the last response has gone; what still comes is thrown away
+        Closing, // the last response was sent; what still comes is discarded
     };
 
-    // Takes over a socket. fChanged is called when something has come or gone that needs a decision: a head
-    // may be whole, or the connection is over.
+    // Takes over a socket. Calls fChanged() when bytes have come or gone, so that a head may be complete, or
+    // the connection may be over.
     Connection(struct event_base* pBase, int nSocket, bool blStatus,
                std::function<void(Connection&)> fChanged);
     ~Connection();
@@ -37,35 +37,35 @@ public:
     Connection& operator=(const Connection&) = delete;
 
     const bool blStatus; // for /health and /metrics, not for calls
-    uid_t uid = 0;       // of the client; that of nobody where the socket does not tell
+    uid_t uid = 0;       // of the client; -1 if the socket does not tell
     uint64_t nCall = 0;  // the number of the call it waits for
     Manner manner;       // for the next response
-    int64_t nSince;      // when the state began
+    int64_t nSince;      // when the state began, or the head that is being read
     State state = State::Reading;
 
-    // What has come and was not taken yet, and how much of it readHead has seen.
+    // The bytes that have come and were not taken yet, and how many of them readHead has scanned.
     std::string strInput;
     size_t cbSeen = 0;
 
-    // Removes the beginning of what has come.
+    // Removes bytes from the beginning of strInput.
     void take(size_t cbBytes);
 
-    // Sends a response, and goes on or closes as its manner says.
+    // Sends a response, and then goes on or closes, as its manner says.
     void send(const std::string& strResponse);
 
-    // Ends it at once.
+    // Makes isOver() true.
     void end() { m_blOver = true; }
 
-    // All is over: nothing comes, and nothing can go. The object is to be destroyed.
+    // The connection is over and must be destroyed: nothing more comes, and nothing can be sent.
     bool isOver() const { return m_blOver; }
 
-    // No byte of a next head has come, and no response is on its way.
+    // No byte of a next head has come, and no response is being sent.
     bool isIdle() const { return State::Reading == state && strInput.empty() && m_strOutput.empty(); }
 
     // Whether the next head can be read.
     bool isReady() const { return State::Reading == state && m_strOutput.empty() && !m_blOver; }
 
-    // The client sends nothing more.
+    // The client has finished sending.
     bool hasEnded() const { return m_blEnded; }
 
     // The client has closed its end for both directions.

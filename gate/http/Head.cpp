@@ -16,7 +16,7 @@ bool isToken(std::string_view strText)
     return !strText.empty() && std::all_of(strText.begin(), strText.end(), [](char c) { return isToken(c); });
 }
 
-// Whether a byte may stand in a value: no control character but the tab.
+// Whether a byte may be in a value: any but control characters, and the tab.
 bool isText(char c)
 {
     const unsigned char n = static_cast<unsigned char>(c);
@@ -41,7 +41,7 @@ std::string_view trimmed(std::string_view strText)
     return strText.substr(nBegin, strText.find_last_not_of(" \t") - nBegin + 1);
 }
 
-// What stands before a separator, which is removed from the text too; all of it where there is none.
+// Cuts off the text up to a separator, or all of it if there is none. Returns it without the separator.
 std::string_view cut(std::string_view& strText, std::string_view strSeparator)
 {
     const size_t nEnd = strText.find(strSeparator);
@@ -50,8 +50,8 @@ std::string_view cut(std::string_view& strText, std::string_view strSeparator)
     return strPart;
 }
 
-// The first bytes that no head can have, or that end one, from nBegin on: a control character, or a line that
-// does not end as lines do.
+// Looks, from nPlace on, for the end of the head, or for bytes that no head can have: a control character, or
+// a line that does not end in CR LF. Moves nPlace there.
 enum class Scan { Incomplete, End, Bad };
 Scan scan(std::string_view strBytes, size_t& nPlace)
 {
@@ -78,7 +78,7 @@ bool readLine(std::string_view strLine, gate::Head& head)
     head.strTarget = cut(strLine, " ");
     head.blOld = "HTTP/1.0" == strLine;
     const bool blPlain = std::all_of(head.strTarget.begin(), head.strTarget.end(), [](char c) {
-        return '\t' != c; // blanks are the separators
+        return '\t' != c; // a blank would have ended the target
     });
     return isToken(head.strMethod) && !head.strTarget.empty() && blPlain &&
            (head.blOld || "HTTP/1.1" == strLine);
@@ -88,13 +88,13 @@ bool readHeader(std::string_view strLine, gate::Head& head)
 {
     const size_t nColon = strLine.find(':');
     if (std::string_view::npos == nColon || !isToken(strLine.substr(0, nColon))) {
-        return false; // a continuation of the line before, too
+        return false; // also for a continuation of the line before
     }
     head.headers.push_back({lower(strLine.substr(0, nColon)), trimmed(strLine.substr(nColon + 1))});
     return true;
 }
 
-// Whether a body follows; nothing where that is not clear.
+// Whether a body follows; nothing if that is not clear.
 std::optional<bool> announcesBody(const gate::Head& head)
 {
     const size_t nCoded = head.count("transfer-encoding");
@@ -158,7 +158,7 @@ Reading readHead(std::string_view strBytes, size_t& cbSeen, Head& head, size_t& 
     }
     const Scan found = scan(strBytes, cbSeen);
     const size_t cbLine = strBytes.substr(0, cbSeen).find('\r');
-    // The limits first: what stands behind them may not have come yet.
+    // Limits come first, because the bytes after them may not have come yet.
     if (std::min(cbLine, cbSeen) > LINE_MAX_BYTES) {
         return Reading::TargetTooLong;
     }

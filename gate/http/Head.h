@@ -1,8 +1,8 @@
-// The head of an HTTP/1 request, read strictly: what two readers could read in two ways is refused. A proxy
-// sends the requests of many clients over one connection, and who makes it and the gate disagree about where
-// a request ends would get another client's answer.
+// The head of an HTTP/1 request, read strictly: what two readers could understand differently is refused. A
+// proxy sends the requests of many clients over one connection. If the proxy and the gate disagreed about
+// where a request ends, a client could get the answer to another client's request.
 //
-// Bodies are not read: a request that announces one is answered, and its connection ends.
+// Bodies are not read: a request with a body is answered, and its connection ends.
 
 #ifndef GATE_HTTP_HEAD_H
 #define GATE_HTTP_HEAD_H
@@ -15,22 +15,22 @@
 namespace gate {
 
 const size_t LINE_MAX_BYTES = 16384; // of the request line
-const size_t HEAD_MAX_BYTES = 65536; // of all, cookies included
+const size_t HEAD_MAX_BYTES = 65536; // of the whole head, cookies included
 const size_t HEADERS_MAX = 256;
 
 struct Head {
     std::string_view strMethod;
     std::string_view strTarget;
-    bool blOld = false;       // of HTTP/1.0
-    bool blKeepAlive = false; // the connection can take another request afterwards
+    bool blOld = false;       // the request is of HTTP/1.0
+    bool blKeepAlive = false; // another request may follow on the connection
     bool blBody = false;      // a body follows
 
-    // How many headers of a name there are (in lower case), and the value of the first.
+    // The number of headers with this name, which is in lower case; and the value of the first.
     size_t count(std::string_view strName) const;
     std::string_view value(std::string_view strName) const;
 
-    // Whether an element (in lower case) stands in the headers of a name that are lists. Parameters do not
-    // count.
+    // Whether a list in the headers of this name holds an element. Both are in lower case; parameters are
+    // ignored.
     bool lists(std::string_view strName, std::string_view strElement) const;
 
     struct Header {
@@ -48,9 +48,9 @@ enum class Reading {
     HeadTooLarge   // 431
 };
 
-// Reads the head that strBytes begins with. cbHead receives its size when it is whole; the head's views are
-// of strBytes. cbSeen, 0 at first, tells from call to call how much has been looked at, so that a slow head
-// costs no more than a quick one, and is read alike.
+// Reads the head at the beginning of strBytes. If it is complete, cbHead is set to its size; the views in
+// head are of strBytes. cbSeen is 0 at first and keeps, from call to call, how much was scanned. So a head
+// that comes in pieces costs no more, and is read in the same way.
 Reading readHead(std::string_view strBytes, size_t& cbSeen, Head& head, size_t& cbHead);
 
 } // namespace gate

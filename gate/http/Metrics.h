@@ -1,4 +1,4 @@
-// What the process that reads HTTP counts, and all that is counted as text for Prometheus.
+// The counts of the process that reads HTTP, and the text of all figures for Prometheus.
 
 #ifndef GATE_HTTP_METRICS_H
 #define GATE_HTTP_METRICS_H
@@ -14,16 +14,16 @@ namespace gate {
 
 class Metrics {
 public:
-    // A response that went out, and how long after the whole head had come, in ns.
+    // Counts a response, and its time since the complete head, in ns.
     void count(int nStatus, int64_t nTook);
     void countRepeated() { ++m_nRepeated; }
     void countTurnedAway() { ++m_nTurnedAway; }
 
-    // figures: those of the process that holds the tokens. nConnections: open now.
+    // figures are those of the process that holds the tokens. nConnections are open now.
     std::string text(const Figures& figures, size_t nConnections) const;
 
 private:
-    static constexpr size_t BUCKETS = 12; // from 0.125 ms on, each twice as long
+    static constexpr size_t BUCKETS = 12; // the first ends at 0.125 ms, each other at twice the time
 
     std::map<int, uint64_t> m_nResponses; // by status
     std::array<uint64_t, BUCKETS + 1> m_rgTook = {};

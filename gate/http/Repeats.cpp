@@ -5,7 +5,7 @@
 namespace {
 
 const int64_t REMEMBERED = 5 * gate::SECOND;
-const size_t HELD_MAX = 32 << 20; // bytes; the oldest are forgotten beyond
+const size_t HELD_MAX = 32 << 20; // bytes; beyond, the oldest are forgotten
 
 size_t sizeOf(const gate::Answer& answer)
 {

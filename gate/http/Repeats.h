@@ -1,4 +1,4 @@
-// Calls that come twice: proxies ask again for the same request of a client, and it is to spend one use.
+// Repeated calls: a proxy can ask several times for one request of a client, which must spend one use only.
 
 #ifndef GATE_HTTP_REPEATS_H
 #define GATE_HTTP_REPEATS_H
@@ -12,22 +12,20 @@
 
 namespace gate {
 
-// What is remembered for some seconds of each call that has a key. A key counts for one call only: the same
-// key with another id, API or method, or for an answer with the record, is another call.
+// Remembers each call that has a key, for some seconds. The key must differ if the id, the API, the method or
+// the wish for the record differs.
 class Repeats {
 public:
     struct Remembered {
-        uint64_t nCall = 0; // under which it was asked
+        uint64_t nCall = 0; // the number of the call
         bool blAnswered = false;
-        Answer answer; // once it is
+        Answer answer; // once blAnswered
     };
 
-    // What is remembered of a call with this key; if nothing is, a new entry for nCall is made, and null is
-    // returned.
+    // Returns what is remembered of the call with this key; null if nothing was, and remembers it as nCall.
     const Remembered* find(const std::string& strKey, uint64_t nCall, int64_t nNow);
 
-    // Remembers the answer of a call. An answer that spent nothing because something failed is forgotten: the
-    // next may have more luck.
+    // Remembers the answer of a call. If something failed, forgets the call: the next try is a new one.
     void answer(const std::string& strKey, const Answer& answer);
     void forget(const std::string& strKey, uint64_t nCall);
 
@@ -41,7 +39,7 @@ private:
 
     std::unordered_map<std::string, Remembered> m_entries;
     std::deque<Due> m_due; // in the order in which they become due
-    size_t m_cbHeld = 0;   // of memory, about
+    size_t m_cbHeld = 0;   // bytes of memory, roughly
 };
 
 } // namespace gate

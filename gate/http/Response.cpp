@@ -34,7 +34,7 @@ const Status& statusOf(int nStatus)
     return STATUSES[1];
 }
 
-// The time of a second, formatted once.
+// The header "Date", made once in each second.
 const std::string& date()
 {
     static time_t nLast = 0;

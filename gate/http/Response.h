@@ -10,25 +10,24 @@
 
 namespace gate {
 
-// How a response goes out, as its request and connection demand.
+// How a response must be sent: this depends on the request and the connection.
 struct Manner {
     bool blKeepAlive = false;
-    bool blHead = false; // without its body, as HEAD has it
-    bool blOld = false;  // for HTTP/1.0, which is told that the connection goes on
+    bool blHead = false; // the answer to HEAD has no body
+    bool blOld = false;  // for HTTP/1.0, which needs a header to keep the connection
 };
 
-// For a call that has been decided.
+// The response to a call that was granted.
 std::string grantedResponse(const Answer& answer, const Manner& manner);
 
-// With a body of one line that tells the status. All that a client can be told beside the status of a
-// refusal, or of a failure, is in the status.
+// A response whose body, a line, depends only on the status: a refusal tells a client nothing else.
 std::string plainResponse(int nStatus, const Manner& manner);
 
-// For people and their programs: 200 or 503.
+// A response for /health or /metrics: 200 or 503.
 std::string textResponse(int nStatus, std::string_view strType, std::string_view strBody,
                          const Manner& manner);
 
-// As a header can carry it: all but visible ASCII, and the percent sign, as "%XX".
+// A text as a header can carry it: the percent sign, and all but visible ASCII, become "%XX".
 std::string headerText(std::string_view strText);
 
 } // namespace gate

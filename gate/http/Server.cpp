@@ -11,7 +11,7 @@
 
 namespace {
 
-// The bounds of the manual page.
+// The bounds, which the manual page lists.
 const size_t CONNECTIONS_MAX = gate::DESCRIPTORS - 64;
 const size_t CONNECTIONS_OF_USER_MAX = 768;
 const int64_t HEAD_WAIT = 5 * gate::SECOND;
@@ -19,10 +19,10 @@ const int64_t IDLE_WAIT = 75 * gate::SECOND;
 const int64_t CLOSE_WAIT = gate::SECOND;
 const int64_t SEND_WAIT = 5 * gate::SECOND;
 const int64_t CALL_WAIT = gate::SECOND;
-const int64_t STOP_WAIT = gate::SECOND / 2; // for requests on connections that are open already
+const int64_t STOP_WAIT = gate::SECOND / 2; // for a request on an idle connection
 const size_t ACCEPTED_AT_ONCE = 64;
-const size_t SENT_AT_ONCE = 16; // calls go on while others are still read
-const size_t UNSENT_MAX = 2048; // messages; beyond, the other process stands still
+const size_t SENT_AT_ONCE = 16; // messages; so calls go on while others are still read
+const size_t UNSENT_MAX = 2048; // messages; with more, the other process does not read
 
 template <typename Pointer>
 Pointer required(Pointer p)
@@ -111,8 +111,8 @@ void Server::accept(int nSocket)
     }
 }
 
-// If there are too many connections now, closes one: of the same user, if that user has too many. Returns
-// false where there is none to close.
+// If there are too many connections now, closes one: one of the same user, if that user has too many. Returns
+// false if there is none to close.
 bool Server::makeRoomFor(const Connection& connection)
 {
     size_t nOfUser = 0;
@@ -123,7 +123,7 @@ bool Server::makeRoomFor(const Connection& connection)
     return (!blUser && m_connections.size() <= CONNECTIONS_MAX) || closeOldest(connection, blUser);
 }
 
-// Closes the connection that waits for its client longest. Returns false where all wait for the gate.
+// Closes the connection that has waited longest for its client. Returns false if all wait for the gate.
 bool Server::closeOldest(const Connection& newest, bool blOfUser)
 {
     const Connection* pOldest = nullptr;
@@ -148,12 +148,12 @@ void Server::changed(Connection& connection)
         readNext(connection);
     }
     if (connection.hasEnded() && connection.isIdle()) {
-        connection.end(); // all that was asked is answered
+        connection.end(); // all requests were answered
     }
     m_blOver = m_blOver || connection.isOver();
 }
 
-// Destroys what is over. Not in the middle of its own events.
+// Destroys the connections that are over. Must not be called from their events.
 void Server::sweep()
 {
     if (!m_blOver) {
@@ -168,7 +168,7 @@ void Server::sweep()
     });
 }
 
-// A connection that ends: its call is not made, if it is still to be.
+// Removes a connection that ends from those that wait for an answer. Cancels its call if none is left.
 void Server::forget(Connection& connection)
 {
     const auto it = m_asked.find(connection.nCall);
@@ -186,7 +186,7 @@ void Server::forget(Connection& connection)
     m_link.add(encode(cancel));
     if (it->second.strKey.empty()) {
         m_asked.erase(it);
-    } // else it may come again before it is known whether a use was spent
+    } // else it may be repeated before the answer says whether a use was spent
 }
 
 void Server::readNext(Connection& connection)
@@ -333,7 +333,7 @@ void Server::take(std::string_view strMessage)
     m_repeats.answer(asked.strKey, *answer);
     for (Connection* pConnection : asked.waiting) {
         if (Outcome::Cancelled == answer->outcome) {
-            askCall(*pConnection, asked.call); // it has come again since
+            askCall(*pConnection, asked.call); // the call was repeated after the cancellation
         } else if (asked.blHealth) {
             const int nStatus = answer->blHealthy ? 200 : 503;
             const char* szBody = answer->blHealthy ? "healthy\n" : "the token database cannot be read\n";
@@ -341,11 +341,11 @@ void Server::take(std::string_view strMessage)
         } else {
             respond(*pConnection, *answer);
         }
-        changed(*pConnection); // the next request may be there already
+        changed(*pConnection); // the next request may have come already
     }
 }
 
-// Ends what has taken too long, and asks for figures.
+// Ends connections that take too long, and asks for figures.
 void Server::tick()
 {
     const int64_t nNow = now();
@@ -354,7 +354,7 @@ void Server::tick()
         const bool blHurry = m_nStopping && nNow - m_nStopping > STOP_WAIT;
         int64_t nWait = HEAD_WAIT;
         switch (connection.state) {
-        case Connection::State::Waiting: // for a second at most, unless the other process stands still
+        case Connection::State::Waiting: // at most a second, unless the other process is stuck
             nWait = connection.hasGone() ? 0 : INT64_MAX;
             break;
         case Connection::State::Closing: nWait = CLOSE_WAIT; break;
@@ -377,11 +377,11 @@ void Server::tick()
     }
 }
 
-// Those who have connected already are served; others find the sockets with whoever listens next.
+// Stops: serves all who have connected. Others wait at the sockets for the next process that listens.
 void Server::stop()
 {
     m_nStopping = now();
-    for (size_t nAccepted = 0; nAccepted < CONNECTIONS_MAX; nAccepted += ACCEPTED_AT_ONCE) { // not for ever
+    for (size_t nAccepted = 0; nAccepted < CONNECTIONS_MAX; nAccepted += ACCEPTED_AT_ONCE) { // bounded
         accept(m_nCalls);
     }
     m_callsListening.reset();

@@ -1,4 +1,4 @@
-// The process that reads HTTP: its connections, and what it asks the other process.
+// The process that reads HTTP: its connections, and its questions to the other process.
 
 #ifndef GATE_HTTP_SERVER_H
 #define GATE_HTTP_SERVER_H
@@ -19,15 +19,15 @@
 
 namespace gate {
 
-// The descriptors that serving takes at most.
+// The most descriptors that serving needs.
 const size_t DESCRIPTORS = 1024 + 64;
 
 class Server {
 public:
-    // nCalls, nStatus: listening sockets; nStatus -1: none. All three are taken over.
+    // nCalls and nStatus are listening sockets; nStatus is -1 for none. Takes over all three descriptors.
     Server(int nLink, int nCalls, int nStatus, std::string strOnceHeader);
 
-    // Serves until the other process ends, or asks to stop and all calls are answered.
+    // Serves until the other process ends, or until it asks to stop and all calls are answered.
     void run();
 
 private:
@@ -35,11 +35,11 @@ private:
         void operator()(struct event_base* pBase) const { event_base_free(pBase); }
     };
     typedef std::list<Connection> Connections;
-    // A call that has been asked.
+    // A question to the other process that was not answered yet.
     struct Asked {
-        std::vector<Connection*> waiting; // for its answer; more than one where it has come again
-        Call call;                        // what it is, for Ask::Grant
-        std::string strKey;               // of Repeats; empty: none
+        std::vector<Connection*> waiting; // for the answer; several if the call was repeated
+        Call call;                        // for Ask::Grant
+        std::string strKey;               // for Repeats; empty: none
         bool blHealth = false;
     };
 
@@ -70,17 +70,17 @@ private:
     const int m_nCalls;
     const int m_nStatus;
     Connections m_connections;
-    bool m_blOver = false; // some of them are over, and go when all events of a round have been
-    std::unordered_map<uint64_t, Asked> m_asked; // by their numbers
-    uint64_t m_nNumber = 0;                      // the last that was used
+    bool m_blOver = false;                       // some are over; sweep() destroys them
+    std::unordered_map<uint64_t, Asked> m_asked; // by number
+    uint64_t m_nNumber = 0;                      // the last number that was used
     Repeats m_repeats;
     Metrics m_metrics;
     Figures m_figures = {};
-    uint64_t m_nFigures = 0; // the number of the request for them
+    uint64_t m_nFigures = 0; // the number of the last request for figures
     int64_t m_nTickAt = 0;
-    int64_t m_nStopping = 0; // since when; 0: not
+    int64_t m_nStopping = 0; // when it was asked to stop; 0: it was not
     bool m_blAlone = false;  // the other process has ended
-    // Last, so that no event outlives what it is about.
+    // The events are last, so that they are destroyed before what they refer to.
     Event m_linkReadable;
     Event m_linkWritable;
     Event m_tick;

@@ -1,5 +1,5 @@
-// The process that reads HTTP. vemo-access-token-gate starts it, with the user whom it is to become and the
-// header of --once-header as arguments, and its sockets under the numbers of ChildDescriptor.
+// The process that reads HTTP. vemo-access-token-gate starts it. Its arguments are the user that it becomes
+// and the header of --once-header; its sockets have the numbers of ChildDescriptor.
 
 #include <sys/socket.h>
 #include <syslog.h>
@@ -32,7 +32,7 @@ int main(int nArguments, char** rgArguments)
         }
         gate::Server server(gate::CHILD_LINK, gate::CHILD_CALLS, blStatus ? gate::CHILD_STATUS : -1,
                             strOnceHeader);
-        setenv("TZ", "UTC0", 1); // or the first date looks for a file of the time zone
+        setenv("TZ", "UTC0", 1); // else the first date would open a time zone file
         tzset();
         gate::confine(rgArguments[1]);
         server.run();
