@@ -1,6 +1,6 @@
 #!/usr/bin/env node
-// Asks the gate: grant.js API METHOD, with the token's id on standard input. Prints the token's user, and ends with 0;
-// with 1 when the call is refused, and with 2 when there is no answer.
+// Asks the gate: grant.js API METHOD, with the token's id on standard input. Prints the token's user and ends with 0.
+// Ends with 1 if the call is refused, and with 2 if there is no answer.
 const socketPath = process.env.GATE_SOCKET || '/run/vemo-access-token-gate/calls.sock';
 const id = require('fs').readFileSync(0, 'utf8').trim();
 const path = '/grant/' + process.argv.slice(2, 4).map(encodeURIComponent).join('/');

@@ -1,7 +1,7 @@
 #!/usr/bin/php
 <?php
-// Asks the gate: grant.php API METHOD, with the token's id on standard input. Prints the token's user, and ends with 0;
-// with 1 when the call is refused, and with 2 when there is no answer. Needs the extension curl.
+// Asks the gate: grant.php API METHOD, with the token's id on standard input. Prints the token's user and ends with 0.
+// Ends with 1 if the call is refused, and with 2 if there is no answer. Needs the extension curl.
 $user = '';
 $gate = curl_init('http://gate/grant/' . rawurlencode($argv[1]) . '/' . rawurlencode($argv[2]));
 curl_setopt_array($gate, [

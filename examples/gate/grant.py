@@ -1,7 +1,7 @@
 #!/usr/bin/python3
 """Asks the gate: grant.py API METHOD, with the token's id on standard input.
 
-Prints the token's user, and ends with 0; with 1 when the call is refused, and with 2 when there is no answer.
+Prints the token's user and ends with 0. Ends with 1 if the call is refused, and with 2 if there is no answer.
 """
 import http.client
 import os

@@ -1,6 +1,6 @@
 #!/bin/sh
 # Asks the gate: grant.sh API METHOD, with the token's id on standard input. Prints the token's user, as in the header,
-# and ends with 0; with 1 when the call is refused, and with 2 when there is no answer.
+# and ends with 0. Ends with 1 if the call is refused, and with 2 if there is no answer.
 # curl gets the id on standard input too, because everybody can read command lines.
 socket=${GATE_SOCKET:-/run/vemo-access-token-gate/calls.sock}
 read -r id
