@@ -1,9 +1,9 @@
 # shellcheck shell=bash
-# Sourced by the other scripts: installs what is missing of the Debian packages that they need. They say what they
-# need, and for what, with need.
+# Sourced by the other scripts: installs the Debian packages that they need and that are missing. A script says with
+# need() what it needs and for what.
 
 missing=()  # packages
-purposes=() # lines "PURPOSE: PACKAGE..." of those
+purposes=() # lines "PURPOSE: PACKAGE..." of the missing packages
 
 # need PURPOSE PACKAGE...
 need()
@@ -11,7 +11,7 @@ need()
     local purpose=$1 package new=()
     shift
     for package in "$@"; do
-        # A package can be installed for several architectures: one line for each.
+        # A package can be installed for several architectures; each has a line.
         if [[ " ${missing[*]} " != *" $package "* ]] &&
             ! dpkg-query -W -f '${db:Status-Status}\n' "$package" 2>/dev/null | grep -qx installed; then
             new+=("$package")
@@ -21,7 +21,7 @@ need()
     missing+=("${new[@]}")
 }
 
-# size_of PACKAGE...: what apt would fetch and write, with all that they depend on
+# size_of PACKAGE...: prints how much apt would fetch and write, with all dependencies
 size_of()
 {
     apt-get install --simulate --no-install-recommends "$@" | awk '/^Inst / { print $2 }' |
@@ -30,8 +30,8 @@ size_of()
             END { printf "%.1f MB to fetch, %.1f MB on the disk\n", bytes / 1e6, kilobytes / 1e3 }'
 }
 
-# install_needed TIME: says how long the script takes on two cores with all packages there, and what is missing, and
-# installs that. On a terminal it asks first.
+# install_needed TIME: says how long the script takes on two cores if all packages are there, and which are missing,
+# and installs those. On a terminal it asks first.
 install_needed()
 {
     echo "This takes $1."
@@ -45,7 +45,7 @@ install_needed()
         fi
         sudo=(sudo)
     fi
-    "${sudo[@]}" apt-get update -q=2 # or it knows of none
+    "${sudo[@]}" apt-get update -q=2 # or apt knows no packages
     echo "Packages are missing:"
     for purpose in "${purposes[@]}"; do
         # shellcheck disable=SC2086 # several packages
@@ -63,7 +63,7 @@ install_needed()
         apt-get install -q=2 --no-install-recommends -o Dpkg::Use-Pty=0 "${missing[@]}" >/dev/null
 }
 
-# shellcheck disable=SC2034 # for those who source this
+# shellcheck disable=SC2034 # for the scripts that source this
 {
     BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libbsd-dev
         libmd-dev libevent-dev libseccomp-dev)
