@@ -55,7 +55,7 @@ bool Link::receive(const std::function<void(std::string_view)>& take)
     }
     for (int i = 0; i < nReceived; ++i) {
         if (0 == rgMessage[i].msg_len) {
-            return false; // no message is empty
+            return false; // the end: no message is empty
         }
         take({&m_rgBuffer[static_cast<size_t>(i) * MESSAGE_MAX], rgMessage[i].msg_len});
     }

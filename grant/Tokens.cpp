@@ -14,7 +14,7 @@ namespace {
 #define WHERE_TID " WHERE tid = ?1"
 #define EXPIRED "deadline < strftime('%s', 'now')"
 
-// In the order of the field list.
+// The columns of find(), in the order of the field list.
 enum Column {
     TID,
     BIND_SID,

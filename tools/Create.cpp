@@ -26,7 +26,7 @@ struct Options {
     tool::Layout layout;
 };
 
-const int64_t TTL_DEFAULT = 86400; // the library's
+const int64_t TTL_DEFAULT = 86400; // seconds, as in the library
 
 std::string ownTid(const std::string& strArgument)
 {

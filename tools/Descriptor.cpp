@@ -35,7 +35,7 @@ Descriptor::~Descriptor()
 
 Descriptor& Descriptor::operator=(Descriptor&& other) noexcept
 {
-    std::swap(m_nFile, other.m_nFile); // the other one closes it
+    std::swap(m_nFile, other.m_nFile); // the destructor of other closes the old one
     return *this;
 }
 

@@ -18,7 +18,7 @@ using tool::Findings;
 using tool::Store;
 using tool::TokenNames;
 
-const int64_t BACKLOG_AGE_MAX = 3600; // seconds; every call purges
+const int64_t BACKLOG_AGE_MAX = 3600; // seconds; each call of a program purges, so none should be as old
 const uint64_t TOKENS_WITHOUT_INDEX = 10000;
 const int NESTING_MAX = 100; // levels that a stack of 64 KiB has room for
 

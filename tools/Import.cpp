@@ -98,7 +98,7 @@ std::string lineText(size_t nLine, const std::string& strText)
 
 Json::Value objectOf(const std::string& strText)
 {
-    return tool::parseObject(strText, tool::NESTED_MAX + 1); // objects in a record
+    return tool::parseObject(strText, tool::NESTED_MAX + 1); // a record adds a level
 }
 
 // Whether the last line, which has no line feed, is only the beginning of a record.

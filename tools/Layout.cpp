@@ -66,7 +66,7 @@ std::string noteOf(const Json::Value& jToken)
 
 // A column of the table of tokens.
 struct Column {
-    const char* szName; // for --columns
+    const char* szName; // in --columns
     tool::Table::Column title;
     std::string (*text)(const Json::Value& jToken, const Layout& layout, time_t nNow);
 };
@@ -109,7 +109,7 @@ const Column COLUMNS[] = {
      {"EXTRA", Kind::Long},
      [](const Json::Value& j, const Layout&, time_t) { return tool::compactJson(j["extra"]); }},
 };
-const size_t USUAL_COLUMNS = 8; // these come first
+const size_t USUAL_COLUMNS = 8; // the first ones of COLUMNS
 
 std::vector<size_t> parseColumns(const std::string& strText)
 {

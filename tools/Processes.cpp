@@ -99,7 +99,8 @@ std::string lockHolders(const std::string& strFile)
     for (std::string strLine; std::getline(locks, strLine);) {
         std::istringstream words(strLine);
         std::string strNumber, strKind, strStrength, strType, strPid, strName;
-        words >> strNumber >> strKind >> strStrength >> strType >> strPid >> strName; // who waits has "->"
+        // The line of a process that waits has "->" as one more word, so it does not match.
+        words >> strNumber >> strKind >> strStrength >> strType >> strPid >> strName;
         if (strName == strLock) {
             strPids.insert(strPid);
         }

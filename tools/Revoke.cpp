@@ -49,7 +49,7 @@ std::vector<std::string> readAll(const std::vector<std::string>& strArguments)
     return strTids;
 }
 
-// The ids of the tokens that names stand for, of which two can name the same; and how many name none.
+// The ids of the tokens that names stand for, and how many names stand for none. Two can name the same token.
 struct Named {
     std::set<std::string> strTids;
     uint64_t nUnknown = 0;

@@ -28,7 +28,7 @@ sqlite3* opened()
     const int nFlags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
     if (SQLITE_OK != sqlite3_open_v2(blFile ? "" : ":memory:", &pDb, nFlags, nullptr)) {
         sqlite3_close(pDb);
-        throw std::bad_alloc(); // no file is opened yet
+        throw std::bad_alloc(); // it opens no file yet, so only memory can be missing
     }
     return pDb;
 }

@@ -22,7 +22,7 @@ const int64_t MINUTE = 60;
 const int64_t HOUR = 60 * MINUTE;
 const int64_t DAY = 24 * HOUR;
 const int64_t WEEK = 7 * DAY;
-const size_t KNOWN_MAX = 10000;            // users
+const size_t KNOWN_MAX = 10000;            // users whose names are remembered
 const int64_t DURATION_MAX = 365250 * DAY; // a thousand years
 
 int64_t secondsOf(char cUnit)

@@ -1,5 +1,5 @@
-// Prints the completion of a shell: a template, with the commands and their options in the place of the line
-// "@COMMANDS@".
+// Prints the completion for a shell: reads a template, and puts the commands and their options in place of
+// the line "@COMMANDS@".
 //
 // usage: completions bash|zsh|fish <TEMPLATE
 
@@ -15,15 +15,15 @@ namespace {
 using tool::Command;
 typedef Command::Parameter Parameter;
 
-// How a shell completes the values of options. "@" stands for words.
+// How a shell completes the value of an option. "@" is replaced by words.
 struct Actions {
     std::string strUids;
     std::string strUsers;
-    std::string strData; // JSON, or "@" and a file
+    std::string strData; // JSON, or "@" and the name of a file
     std::string strWords;
-    std::string strList; // words with commas in between
+    std::string strList; // words, separated by commas
     std::string strNone;
-    std::string strColon; // within a word
+    std::string strColon; // how to write a colon within a word
 };
 
 const Actions BASH = {"_uids",
@@ -65,7 +65,7 @@ std::string joined(const std::vector<std::string>& strWords)
     return strText;
 }
 
-// The forms of output that a description names.
+// The forms of output that a description of --output names.
 std::string formsIn(const std::string& strDescription)
 {
     std::istringstream words(replaced(strDescription, ',', ""));
@@ -132,7 +132,7 @@ void printBash(const tool::Commands& commands)
               << values.str() << "        *) option= ;;\n    esac\n    [[ $option ]] && return\n";
 }
 
-// The names of the options that exclude one or that it excludes, and its own where it has two.
+// The names of the options that cannot be used with this one; also its own names, if it has two.
 std::string excludedBy(const Command& command, const Parameter& option)
 {
     const auto excludes = [](const Parameter& one, const Parameter& other) {
