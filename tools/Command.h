@@ -54,7 +54,7 @@ public:
     void repeatedOption(const std::string& strName, const std::string& strType, Take take,
                         const std::string& strDescription);
 
-    // Each call adds the next argument. The last one stands for all arguments that are left.
+    // Each adds the next argument; remainingArguments() adds one that takes all that are left.
     void argument(const std::string& strName, Take take, const std::string& strDescription);
     void optionalArgument(const std::string& strName, Take take, const std::string& strDescription);
     void remainingArguments(const std::string& strName, Take take, const std::string& strDescription);

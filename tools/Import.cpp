@@ -26,7 +26,7 @@
 
 namespace {
 
-// The most tokens of a transaction, so that it stops other programs for less than half a second.
+// The most tokens of a transaction: it stops other programs for about half a second at most.
 const size_t TOKENS_AT_ONCE = 10000;
 const size_t TOKENS_OF_A_STEP = 4000;
 
