@@ -12,8 +12,8 @@
 // Expiry: only cleanExpireToken looks at deadlines. Call it before the other operations, as the
 // exported functions do.
 //
-// A call that had to wait for a database locked by another process reports -1 although its change
-// was made. Look the token up (tokenGetByTid) to learn what happened.
+// An operation whose statement had to wait for a lock on the database reports -1 although the statement
+// took effect. Look the token up (tokenGetByTid) to learn what happened.
 //
 // Threads and processes: one thread at a time may use an object; several objects, in any threads and
 // processes, may use the database at once. The constructor, or the first operation after a failed
@@ -37,9 +37,9 @@ class AccessTokenDbApi;
 
 class VEMO_ATOKEN_EXPORT AccessTokenApi {
 public:
-    // Opens the database, and creates file and table if the file is missing. Reports no failure: after
-    // one, each operation tries to open again. Only when SQLite itself could not open the file do all
-    // operations fail until the object is destroyed.
+    // Opens the database, and creates file and table if the file is missing. A failure is only logged: after
+    // one, each operation tries to open again. But when SQLite itself could not open the file, or memory for
+    // the store was missing, all operations fail until the object is destroyed.
     AccessTokenApi();
 
     // Closes the database.
@@ -48,7 +48,7 @@ public:
     AccessTokenApi(const AccessTokenApi&) = delete;
     AccessTokenApi& operator=(const AccessTokenApi&) = delete;
 
-    // Creates a token with the id strTidIn, of at least VEMO_ATOKEN_LENGTH_MIN characters, for the
+    // Creates a token with the id strTidIn, of at least VEMO_ATOKEN_LENGTH_MIN bytes, for the
     // user uid (not UID_ERR) and the purpose strFunction (not empty).
     // jTokenOption is null or an object with any of these members; others are ignored:
     //   deadline      lifetime in seconds from now, 32 bits, default 86400. There is no value for
@@ -80,7 +80,7 @@ public:
     int VectorParamToJson(std::vector<std::string>& strVector, const char* szField, Json::Value& jParamOut);
 
     // Appends the token with the given id to jTokenArrayOut, which must be an array. An empty list is
-    // a failure; a list of more than one id finds nothing.
+    // a failure; a list of more than one id finds none of them.
     int tokenGetByTidArray(std::vector<std::string>& strTidVector, Json::Value& jTokenArrayOut);
 
     // Replaces those fields of a token that are members of the object jParam, each as a whole. Here
@@ -93,7 +93,7 @@ public:
     int tokenSaveByOverwrite(Json::Value& jToken);
 
     // Delete tokens by the value of a string field (szName is "tid", "bind_sid" or "function"), by id,
-    // by login session or by purpose. A list of more than one value matches nothing.
+    // by login session or by purpose. A list of more than one value matches none of them.
     // Return the number of tokens deleted, which may be 0, or -1, also for an empty argument.
     int tokenDeleteByArray(std::vector<std::string>& strVector, const char* szName);
     int tokenDeleteByName(std::string& strValue, const char* szName);

@@ -9,7 +9,7 @@
 // The one database file. Every process of the machine that uses tokens uses this file.
 #define VEMO_ATOKEN_DB_PATH "/usr/vemo/etc/private/session/vemo-access-token.db"
 
-// The least length, in characters, of a token id that a caller chooses. Generated ids are long
+// The least length, in bytes, of a token id that a caller chooses. Generated ids are long
 // enough: they have 127 to 255 characters.
 #define VEMO_ATOKEN_LENGTH_MIN 127
 

@@ -7,8 +7,8 @@
 // Results: 0 is success; -1 is a failure, which has written its log line. Functions with other results
 // or with exceptions other than std::bad_alloc say so.
 //
-// Threads: no function here takes a lock. All of them may run in several threads at once on
-// different records. Call tokenType() once before the threads start.
+// Threads: all functions may run in several threads at once, on different records. Call tokenType()
+// once before the threads start.
 
 #ifndef VEMO_ACCESS_TOKEN_UTIL_H
 #define VEMO_ACCESS_TOKEN_UTIL_H

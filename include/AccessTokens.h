@@ -18,8 +18,9 @@
 // Arguments are only read. Texts end at their first NUL.
 //
 // Errors: except for grant, an operation that did not do its work throws std::runtime_error. It is a
-// std::system_error when the lock was not available; otherwise the library's log lines say why. There are
-// also Json::LogicError, for a member of an argument that cannot be converted, and std::bad_alloc.
+// std::system_error when the lock was not available; otherwise the library's log lines say why, unless
+// create found no random number. There are also Json::LogicError, for a member of an argument that cannot be
+// converted, and std::bad_alloc.
 //
 // Time: an operation waits for the lock, at most as long as the constructor was told. Then each statement
 // waits up to 5 seconds for a database that a program without the lock keeps locked.

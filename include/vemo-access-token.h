@@ -1,12 +1,12 @@
 // The exported functions: one call for each thing that programs do with access tokens.
 //
-// Each call opens the token database, deletes expired tokens (except where a function says otherwise),
-// does its work and closes the database again; nothing is kept between calls. The process must be able
-// to set its effective uid to 0 and should have it (vemo-access-token(7) says why).
+// Each call but VemoAccessTokenGenerate opens the token database, deletes expired tokens (except where a
+// function says otherwise), does its work and closes the database again; nothing is kept between calls.
+// The process must be able to set its effective uid to 0 and should have it (vemo-access-token(7) says why).
 //
-// Results: 0 or more is success; -1 is a failure or a refusal. Failures have written their log lines
-// (see AccessTokenUtil.h). An unknown token and a method that is not listed are logged in debug mode
-// only, except that VemoAccessTokenGrant always logs that a grant was refused.
+// Results: 0 or more is success; -1 is a failure or a refusal. Failures of these calls have written their
+// log lines (see AccessTokenUtil.h). An unknown token and a method that is not listed are logged in debug
+// mode only, except that VemoAccessTokenGrant always logs that a grant was refused.
 // Arguments that are not described as results are only read. Strings and JSON values are C++ objects, so
 // the caller must be built with the same libstdc++ and jsoncpp.
 //
@@ -30,13 +30,13 @@ extern "C" {
 VEMO_ATOKEN_EXPORT int VemoAccessTokenCreate(unsigned int& uid, std::string& strFunction,
                                              Json::Value& jTokenOption, std::string& strTid);
 
-// Creates a token with an id that the caller chooses, of at least 127 characters. The arguments are
+// Creates a token with an id that the caller chooses, of at least 127 bytes. The arguments are
 // those of AccessTokenApi::tokenCreateByTid. Returns 0 or -1.
 VEMO_ATOKEN_EXPORT int VemoAccessTokenCreateByTid(unsigned int& uid, std::string& strFunction,
                                                   Json::Value& jTokenOption, std::string& strTid);
 
 // Makes a token id, of 127 to 255 digits and ASCII letters, without using the database.
-// Returns 0 or more; or a negative value, and leaves strTid unchanged.
+// Returns 0 or more; or a negative value, with strTid unchanged and no log line.
 VEMO_ATOKEN_EXPORT int VemoAccessTokenGenerate(std::string& strTid);
 
 // Decides whether the bearer of strTid may call szWebapiMethod of szWebapiName; a null or empty method

@@ -47,8 +47,8 @@ public:
     // Creates the table in a database that lacks it. Returns 0 or -1.
     int createTable();
 
-    // Runs a statement on the open connection. While others lock the database it tries again, 500
-    // times in all, 10 ms apart. callback is that of sqlite3_exec, called with arg for each row; it
+    // Runs a statement on the open connection. While others lock the database it tries again
+    // (vemo-access-token(7), LOCKS). callback is that of sqlite3_exec, called with arg for each row; it
     // must not throw.
     // Returns 0 with a callback, the number of changed rows without; or -1, with the reason in
     // m_strErr.
@@ -117,7 +117,7 @@ public:
 
     sqlite3* m_pDb;       // the connection; null when closed
     std::string m_strSql; // the statement that runSql runs, or ran last
-    std::string m_strErr; // why the last statement failed or had to wait; "" when neither
+    std::string m_strErr; // why a statement failed or had to wait; only runSql empties it, before its own
 };
 
 #endif
