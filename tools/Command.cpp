@@ -274,7 +274,11 @@ void Command::check() const
 void Command::takeWords() const
 {
     for (const Word& word : m_words) {
-        convertArgument(word.pParameter->strName, [&word] { word.pParameter->take(word.strText); });
+        try {
+            word.pParameter->take(word.strText);
+        } catch (const BadValue& bad) {
+            throw Failure(EXIT_STATUS_USAGE, word.pParameter->strName + ": " + bad.what());
+        }
     }
 }
 

@@ -45,7 +45,7 @@ std::string damageOfParts()
     std::string strErr;
     tool::Steps steps(Store::Access::Glance, "Reading");
     while (strErr.empty() && steps.next([&](Store& store, const std::string& strThose) {
-        strErr = store.queryAsFarAsItGoes(strRead + " FROM token WHERE " + strThose, rows);
+        strErr = store.queryPartially(strRead + " FROM token WHERE " + strThose, rows);
     })) {
     }
     // Now the other way: look up the id of each row in the index.
@@ -56,11 +56,11 @@ std::string damageOfParts()
             return;
         }
         rows.clear();
-        strErr = store.queryAsFarAsItGoes("SELECT count(*) FROM token NOT INDEXED WHERE " + strThose +
-                                              " AND NOT EXISTS (SELECT 1 FROM token AS other INDEXED BY " +
-                                              tool::sqlText("\"%w\"", strIndex.c_str()) +
-                                              " WHERE other.tid = token.tid AND other.rowid = token.rowid)",
-                                          rows);
+        strErr = store.queryPartially("SELECT count(*) FROM token NOT INDEXED WHERE " + strThose +
+                                          " AND NOT EXISTS (SELECT 1 FROM token AS other INDEXED BY " +
+                                          tool::sqlText("\"%w\"", strIndex.c_str()) +
+                                          " WHERE other.tid = token.tid AND other.rowid = token.rowid)",
+                                      rows);
         if (!rows.empty() && rows[0][0] != "0") {
             strErr = rows[0][0].value_or("") + " rows are missing in the index of the ids";
         }
@@ -78,7 +78,7 @@ std::string damage()
     {
         Store store(Store::Access::Read);
         const bool blOthersCommit = store.text("PRAGMA journal_mode") == "wal";
-        strErr = blOthersCommit ? store.queryAsFarAsItGoes("PRAGMA integrity_check", rows)
+        strErr = blOthersCommit ? store.queryPartially("PRAGMA integrity_check", rows)
                                 : store.queryWithin(CHECK_MAX, "PRAGMA integrity_check", rows);
     }
     if (!strErr) {

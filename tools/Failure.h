@@ -44,17 +44,6 @@ class BadValue : public std::runtime_error {
     using std::runtime_error::runtime_error;
 };
 
-// Returns what convert() returns. Turns a BadValue into a usage failure that begins with the argument's name.
-template <typename Convert>
-auto convertArgument(const std::string& strName, Convert convert)
-{
-    try {
-        return convert();
-    } catch (const BadValue& bad) {
-        throw Failure(EXIT_STATUS_USAGE, strName + ": " + bad.what());
-    }
-}
-
 } // namespace tool
 
 #endif

@@ -38,7 +38,7 @@ struct Options {
 };
 
 // A token of a file, and the number of its line.
-struct Line {
+struct NumberedToken {
     size_t nNumber;
     Json::Value jToken;
 };
@@ -49,7 +49,7 @@ struct Contents {
     std::string strFlaw = "the export has no end";
 };
 
-typedef std::function<void(Line line)> Take;
+typedef std::function<void(NumberedToken line)> Take;
 
 [[noreturn]] void failOnReading(const std::string& strFile)
 {
@@ -205,12 +205,12 @@ struct Imported {
 };
 
 // Creates tokens in one transaction. An existing token is skipped if blSkip, and a failure otherwise.
-void createTokens(const std::vector<Line>& lines, const std::string& strFile, bool blSkip,
+void createTokens(const std::vector<NumberedToken>& lines, const std::string& strFile, bool blSkip,
                   tool::Progress& progress, Imported& imported)
 {
     Imported now;
     tool::Store store(tool::Store::Access::Write, tool::Store::Missing::Make);
-    for (const Line& line : lines) {
+    for (const NumberedToken& line : lines) {
         if (!store.has(line.jToken["tid"].asString())) {
             store.create(line.jToken);
             ++now.nCreated;
@@ -231,9 +231,9 @@ void createTokens(const std::vector<Line>& lines, const std::string& strFile, bo
 
 Contents importAtOnce(const std::string& strFile, const Options& options, Imported& imported)
 {
-    std::vector<Line> lines;
+    std::vector<NumberedToken> lines;
     std::map<std::string, size_t> lineOf;
-    const Contents contents = readAhead(strFile, options, [&](Line line) {
+    const Contents contents = readAhead(strFile, options, [&](NumberedToken line) {
         const auto [pFirst, blNew] = lineOf.emplace(line.jToken["tid"].asString(), line.nNumber);
         if (!blNew) {
             throw tool::BadValue("has the id of line " + std::to_string(pFirst->second));
@@ -257,11 +257,11 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
 {
     uint64_t nTokens = 0;
     if (strFile != "-") {
-        nTokens = readAhead(strFile, options, [](const Line&) {}).nTokens;
+        nTokens = readAhead(strFile, options, [](const NumberedToken&) {}).nTokens;
     }
     tool::Progress progress(
         "Importing", [nTokens] { return nTokens; }, strFile != "-");
-    std::vector<Line> lines;
+    std::vector<NumberedToken> lines;
     const auto create = [&] {
         createTokens(lines, strFile, true, progress, imported);
         lines.clear();
@@ -273,7 +273,7 @@ Contents importInSteps(const std::string& strFile, const Options& options, Impor
                                  " imported before that; the command can be repeated without harm");
     };
     try {
-        const Contents contents = readFile(strFile, [&](Line line) {
+        const Contents contents = readFile(strFile, [&](NumberedToken line) {
             lines.push_back(std::move(line));
             if (lines.size() == TOKENS_OF_A_STEP) {
                 create();

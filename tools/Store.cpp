@@ -25,14 +25,6 @@ std::string sqlBehind(std::string strPrefix)
 
 namespace tool {
 
-Json::Value Store::tokens(const Json::Value& jFilter)
-{
-    Json::Value jFilterCopy = jFilter;
-    Json::Value jTokens(Json::arrayValue);
-    require(db().tokenGet(jFilterCopy, jTokens));
-    return jTokens;
-}
-
 void Store::eachToken(const std::string& strWhere, const std::string& strColumns, const TakeToken& take)
 {
     const std::vector<std::string> strNames = fieldNames();

@@ -21,9 +21,6 @@ class Store : public Transaction {
 public:
     using Transaction::Transaction;
 
-    // The tokens whose fields equal those of the filter.
-    Json::Value tokens(const Json::Value& jFilter);
-
     // Passes each token that a condition in SQL selects to take(), with the columns that strColumns adds to
     // the query (", COLUMN, ...").
     typedef std::function<void(Json::Value jToken, const Row& columns)> TakeToken;

@@ -293,7 +293,7 @@ void Transaction::eachRow(const std::string& strSql, const std::function<void(Ro
     }
 }
 
-std::string Transaction::queryAsFarAsItGoes(const std::string& strSql, Rows& rows)
+std::string Transaction::queryPartially(const std::string& strSql, Rows& rows)
 {
     return run(strSql, [&rows](Row row) { rows.push_back(std::move(row)); });
 }
@@ -313,7 +313,7 @@ std::optional<std::string> Transaction::queryWithin(std::chrono::milliseconds lo
             sqlite3_interrupt(m_db.m_pDb);
         }
     });
-    const std::string strErr = queryAsFarAsItGoes(strSql, rows);
+    const std::string strErr = queryPartially(strSql, rows);
     {
         const std::lock_guard<std::mutex> guard(mutex);
         blEnded = true;

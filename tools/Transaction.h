@@ -50,9 +50,9 @@ public:
     void eachRow(const std::string& strSql, const std::function<void(Row)>& take);
 
     // Runs a statement that may fail after some rows. Adds the rows; returns the error, or "".
-    std::string queryAsFarAsItGoes(const std::string& strSql, Rows& rows);
+    std::string queryPartially(const std::string& strSql, Rows& rows);
 
-    // Like queryAsFarAsItGoes(), but interrupts the statement after this time, and then returns nothing.
+    // Like queryPartially(), but interrupts the statement after this time, and then returns nothing.
     std::optional<std::string> queryWithin(std::chrono::milliseconds longest, const std::string& strSql,
                                            Rows& rows);
 
