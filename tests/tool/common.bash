@@ -122,17 +122,18 @@ on_terminal() {
     run --separate-stderr "$BATS_TEST_DIRNAME/terminal.py" --modes "$DIR/modes" "$@"
 }
 
-# in_namespace COMMANDS ARGUMENTS...: bash executes them as root of a namespace where file systems in memory lie over
-# /usr and /run; there the tool works on the real paths, and nothing is there yet
+# Commands of root in a namespace of its own: file systems in memory lie over /usr and /run, that over /usr in $0.
+OVERLAY='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
+    mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr && mount -t tmpfs tmpfs /run'
+
+# in_namespace COMMANDS ARGUMENTS...: bash executes them as root of such a namespace; there the tool works on the real
+# paths, and nothing is there yet
 in_namespace() {
-    local overlay='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
-        mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr &&
-        mount -t tmpfs tmpfs /run'
     [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
     mkdir "$DIR/layer"
-    unshare --user --map-root-user --mount bash -c "$overlay" "$DIR/layer" 2>/dev/null ||
+    unshare --user --map-root-user --mount bash -c "$OVERLAY" "$DIR/layer" 2>/dev/null ||
         skip "no namespace with an overlay here"
-    run --separate-stderr unshare --user --map-root-user --mount bash -c "unset VEMO_REDIRECT_DIR; $overlay; $1" \
+    run --separate-stderr unshare --user --map-root-user --mount bash -c "unset VEMO_REDIRECT_DIR; $OVERLAY; $1" \
         "$DIR/layer" "${@:2}"
 }
 

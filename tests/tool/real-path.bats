@@ -12,13 +12,16 @@ setup() {
     umask 022
     WAS_THERE=$([ ! -e /usr/vemo ] || stat -c '%i %y' /usr/vemo)
     # The namespace lives as long as this process, which ends with its standard input.
+    mkdir "$DIR/layer"
     mkfifo "$DIR/hold" "$DIR/ready"
-    "$BATS_TEST_DIRNAME/private-mount.sh" sh -c 'echo ready; exec cat' <"$DIR/hold" >"$DIR/ready" 2>"$DIR/reason" 3>&- &
+    unshare --mount --propagation private bash -c "$OVERLAY && mkdir -p /usr/vemo &&
+        mount -t tmpfs -o mode=0755 tmpfs /usr/vemo && echo ready && exec cat" "$DIR/layer" \
+        <"$DIR/hold" >"$DIR/ready" 2>"$DIR/reason" 3>&- &
     HOLDER=$!
     exec 7>"$DIR/hold"
     local ready=
     read -r -t 20 ready <"$DIR/ready" || true
-    [ "$ready" = ready ] || skip "$(cat "$DIR/reason")"
+    [ "$ready" = ready ] || skip "no namespace with an overlay here: $(head -n 1 "$DIR/reason")"
 }
 
 teardown() {
