@@ -11,7 +11,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pBytes, size_t cbBytes)
         FUZZ_REQUIRE(cbBytes <= gate::REQUEST_MAX && gate::encode(*request) == strBytes);
         FUZZ_REQUIRE((gate::Ask::Grant == request->ask) == !request->strTid.empty());
     }
-    if (const auto answer = gate::decodeAnswer(strBytes)) {
+    if (const auto answer = gate::decodeReply(strBytes)) {
         FUZZ_REQUIRE(cbBytes <= gate::ANSWER_MAX && gate::encode(*answer) == strBytes);
     }
     return 0;

@@ -30,16 +30,16 @@ std::optional<uid_t> userOf(int64_t nUid)
 
 namespace gate {
 
-Answer Batch::refused(const Request& request, Figure figure)
+Reply Batch::refused(const Request& request, Figure figure)
 {
     ++m_figures[figure];
-    Answer answer;
+    Reply answer;
     answer.nNumber = request.nNumber;
     answer.outcome = Outcome::Refused;
     return answer;
 }
 
-std::optional<Answer> Batch::call(const Request& request)
+std::optional<Reply> Batch::call(const Request& request)
 {
     const auto [it, blNew] = m_entries.try_emplace(request.strTid);
     Entry& entry = it->second;
@@ -57,7 +57,7 @@ std::optional<Answer> Batch::call(const Request& request)
     // An answer names the owner, so a token without an owner opens nothing here.
     const std::optional<uid_t> uid = userOf(token.nUid);
     const Owners::Owner owner = uid ? m_fOwner(*uid) : Owners::Owner{Owners::State::Nobody, ""};
-    Answer answer;
+    Reply answer;
     answer.nNumber = request.nNumber;
     switch (owner.state) {
     case Owners::State::Asked: return std::nullopt;

@@ -25,7 +25,7 @@ public:
     // Decides on a call, and notes the use that it spends. Returns nothing while the owner's name is not
     // known: the call stays open, and spends nothing. Later calls of a token see the uses that earlier ones
     // left.
-    std::optional<Answer> call(const Request& request);
+    std::optional<Reply> call(const Request& request);
 
     // Writes the uses that were spent, once for each token.
     void save();
@@ -40,7 +40,7 @@ private:
         bool blSpent = false; // its last use was spent
     };
 
-    Answer refused(const Request& request, Figure figure);
+    Reply refused(const Request& request, Figure figure);
 
     grant::Tokens& m_tokens;
     const std::function<Owners::Owner(uid_t)>& m_fOwner;

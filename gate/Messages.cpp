@@ -125,7 +125,7 @@ std::optional<Request> decodeRequest(std::string_view strMessage)
     return request;
 }
 
-std::string encode(const Answer& answer)
+std::string encode(const Reply& answer)
 {
     const bool blFigures = answer.figures != Figures();
     AnswerHead head = {};
@@ -145,11 +145,11 @@ std::string encode(const Answer& answer)
         .append(reinterpret_cast<const char*>(answer.figures.data()), head.cbFigures);
 }
 
-std::optional<Answer> decodeAnswer(std::string_view strMessage)
+std::optional<Reply> decodeReply(std::string_view strMessage)
 {
     Reader<AnswerHead> reader(strMessage);
     const AnswerHead& head = reader.head;
-    Answer answer;
+    Reply answer;
     answer.strUser = reader.takeText(head.cbUser, USER_MAX);
     answer.strFunction = reader.takeText(head.cbFunction, FUNCTION_MAX);
     answer.strRecord = reader.take(head.cbRecord, RECORD_MAX);

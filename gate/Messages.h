@@ -80,7 +80,7 @@ enum Figure : size_t {
 };
 typedef std::array<uint64_t, FIGURES> Figures;
 
-struct Answer {
+struct Reply {
     uint64_t nNumber = 0;
     Outcome outcome = Outcome::Failed;
     bool blHealthy = false; // for Ask::Health
@@ -97,11 +97,11 @@ const size_t ANSWER_MAX = 64 + USER_MAX + FUNCTION_MAX + RECORD_MAX;
 
 // The bytes of a message. Its texts must keep the limits above.
 std::string encode(const Request& request);
-std::string encode(const Answer& answer);
+std::string encode(const Reply& answer);
 
 // Returns nothing for a message with a wrong size or an impossible value. So each message has one form only.
 std::optional<Request> decodeRequest(std::string_view strMessage);
-std::optional<Answer> decodeAnswer(std::string_view strMessage);
+std::optional<Reply> decodeReply(std::string_view strMessage);
 
 } // namespace gate
 

@@ -78,7 +78,7 @@ bool Service::run()
             if (sizeof(signal) == read(m_nSignals, &signal, sizeof(signal)) && !m_blStopping) {
                 m_blStopping = true;
                 notify("STOPPING=1");
-                Answer stop;
+                Reply stop;
                 stop.outcome = Outcome::Stop;
                 m_link.add(encode(stop));
             }
@@ -137,7 +137,7 @@ void Service::take(std::string_view strMessage)
 void Service::tellFigures(uint64_t nNumber)
 {
     m_nHeard = now();
-    Answer told;
+    Reply told;
     told.nNumber = nNumber;
     told.outcome = Outcome::Told;
     told.figures = m_figures;
@@ -182,7 +182,7 @@ void Service::look()
         if (!blHealthy && !blFailed && nNow < request.nDue) {
             return false;
         }
-        Answer told;
+        Reply told;
         told.nNumber = request.nNumber;
         told.outcome = Outcome::Told;
         told.blHealthy = blHealthy;
@@ -194,7 +194,7 @@ void Service::look()
 
 void Service::answer(const Request& request, Outcome outcome)
 {
-    Answer answer;
+    Reply answer;
     answer.nNumber = request.nNumber;
     answer.outcome = outcome;
     m_link.add(encode(answer));
@@ -298,7 +298,7 @@ void Service::serveBatch()
     std::vector<std::string> strAnswers;
     std::vector<Request> parked;
     for (const Request& request : m_batch) {
-        if (const std::optional<Answer> answer = batch.call(request)) {
+        if (const std::optional<Reply> answer = batch.call(request)) {
             strAnswers.push_back(encode(*answer));
         } else {
             parked.push_back(request);

@@ -7,7 +7,7 @@ namespace {
 const int64_t REMEMBERED = 5 * gate::SECOND;
 const size_t HELD_MAX = 32 << 20; // bytes; beyond, the oldest are forgotten
 
-size_t sizeOf(const gate::Answer& answer)
+size_t sizeOf(const gate::Reply& answer)
 {
     return answer.strUser.size() + answer.strFunction.size() + answer.strRecord.size();
 }
@@ -39,7 +39,7 @@ const Repeats::Remembered* Repeats::find(const std::string& strKey, uint64_t nCa
     return nullptr;
 }
 
-void Repeats::answer(const std::string& strKey, const Answer& answer)
+void Repeats::answer(const std::string& strKey, const Reply& answer)
 {
     if (Outcome::Granted != answer.outcome && Outcome::Refused != answer.outcome) {
         return forget(strKey, answer.nNumber);

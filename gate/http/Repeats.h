@@ -19,14 +19,14 @@ public:
     struct Remembered {
         uint64_t nCall = 0; // the number of the call
         bool blAnswered = false;
-        Answer answer; // once blAnswered
+        Reply answer; // once blAnswered
     };
 
     // Returns what is remembered of the call with this key; null if nothing was, and remembers it as nCall.
     const Remembered* find(const std::string& strKey, uint64_t nCall, int64_t nNow);
 
     // Remembers the answer of a call. If something failed, forgets the call: the next try is a new one.
-    void answer(const std::string& strKey, const Answer& answer);
+    void answer(const std::string& strKey, const Reply& answer);
     void forget(const std::string& strKey, uint64_t nCall);
 
 private:

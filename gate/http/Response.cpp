@@ -91,7 +91,7 @@ std::string headerText(std::string_view strText)
     return strHeader;
 }
 
-std::string grantedResponse(const Answer& answer, const Manner& manner)
+std::string grantedResponse(const Reply& answer, const Manner& manner)
 {
     std::string strHeaders = "X-Token-User: " + headerText(answer.strUser);
     strHeaders.append("\r\nX-Token-Uid: ").append(std::to_string(answer.nUid));

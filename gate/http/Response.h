@@ -18,7 +18,7 @@ struct Manner {
 };
 
 // The response to a call that was granted.
-std::string grantedResponse(const Answer& answer, const Manner& manner);
+std::string grantedResponse(const Reply& answer, const Manner& manner);
 
 // A response whose body, a line, depends only on the status: a refusal tells a client nothing else.
 std::string plainResponse(int nStatus, const Manner& manner);

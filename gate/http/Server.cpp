@@ -301,7 +301,7 @@ void Server::respond(Connection& connection, int nStatus)
     respond(connection, nStatus, plainResponse(nStatus, connection.manner));
 }
 
-void Server::respond(Connection& connection, const Answer& answer)
+void Server::respond(Connection& connection, const Reply& answer)
 {
     switch (answer.outcome) {
     case Outcome::Granted: return respond(connection, 200, grantedResponse(answer, connection.manner));
@@ -312,7 +312,7 @@ void Server::respond(Connection& connection, const Answer& answer)
 
 void Server::take(std::string_view strMessage)
 {
-    const std::optional<Answer> answer = decodeAnswer(strMessage);
+    const std::optional<Reply> answer = decodeReply(strMessage);
     if (!answer) {
         m_blAlone = true;
         return;

@@ -57,7 +57,7 @@ private:
     void ask(Request request, Connection& connection, Asked asked);
     void respond(Connection& connection, int nStatus, const std::string& strResponse);
     void respond(Connection& connection, int nStatus);
-    void respond(Connection& connection, const Answer& answer);
+    void respond(Connection& connection, const Reply& answer);
     void forget(Connection& connection);
     void sweep();
     void take(std::string_view strMessage);

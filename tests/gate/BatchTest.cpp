@@ -4,9 +4,9 @@
 
 #include "TokenTable.h"
 
-using gate::Answer;
 using gate::Outcome;
 using gate::Owners;
+using gate::Reply;
 using gate::Request;
 
 namespace {
@@ -54,8 +54,8 @@ protected:
         return select.bind(1, strTid).step() ? select.text(0) : "gone";
     }
 
-    std::optional<Answer> call(const std::string& strTid, const std::string& strMethod = "get",
-                               const std::string& strApi = "Api", bool blRecord = false)
+    std::optional<Reply> call(const std::string& strTid, const std::string& strMethod = "get",
+                              const std::string& strApi = "Api", bool blRecord = false)
     {
         Request request;
         request.nNumber = ++m_nNumber;
@@ -63,7 +63,7 @@ protected:
         request.strApi = strApi;
         request.strMethod = strMethod;
         request.blRecord = blRecord;
-        std::optional<Answer> answer = m_batch->call(request);
+        std::optional<Reply> answer = m_batch->call(request);
         EXPECT_EQ(m_nNumber, answer ? answer->nNumber : m_nNumber);
         return answer;
     }
@@ -176,7 +176,7 @@ TEST_F(Batch, AnswersWithTheRecordAfterTheCallOrAtTheLastUse)
         R"(,"create_time":5,"deadline":9999999999,"extra":{},"function":"VPN","uid":1000,)"
         R"("webapi_allow":{"Api":{"method":["get"]}}})";
     for (const char* szCount : {"2", "1", "1"}) {
-        const Answer answer = call("three", "get", "Api", true).value();
+        const Reply answer = call("three", "get", "Api", true).value();
         EXPECT_EQ("user1000", answer.strUser);
         EXPECT_EQ(1000U, answer.nUid);
         EXPECT_EQ("VPN", answer.strFunction);

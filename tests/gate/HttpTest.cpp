@@ -6,15 +6,15 @@
 #include "gate/http/Repeats.h"
 #include "gate/http/Response.h"
 
-using gate::Answer;
 using gate::Outcome;
 using gate::Repeats;
+using gate::Reply;
 
 namespace {
 
-Answer answerOf(uint64_t nNumber, Outcome outcome, const std::string& strRecord = "")
+Reply answerOf(uint64_t nNumber, Outcome outcome, const std::string& strRecord = "")
 {
-    Answer answer;
+    Reply answer;
     answer.nNumber = nNumber;
     answer.outcome = outcome;
     answer.strRecord = strRecord;
@@ -25,7 +25,7 @@ Answer answerOf(uint64_t nNumber, Outcome outcome, const std::string& strRecord 
 
 TEST(Response, EscapesNamesThatNoHeaderCanCarry)
 {
-    Answer answer;
+    Reply answer;
     answer.nUid = 4294967294;
     answer.strUser = "a b%\r\n\x7f\xc3\xa4";
     answer.strFunction = "~!";

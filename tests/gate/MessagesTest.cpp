@@ -4,12 +4,12 @@
 
 #include <tuple>
 
-using gate::Answer;
 using gate::Ask;
-using gate::decodeAnswer;
+using gate::decodeReply;
 using gate::decodeRequest;
 using gate::encode;
 using gate::Outcome;
+using gate::Reply;
 using gate::Request;
 
 namespace {
@@ -24,7 +24,7 @@ auto fields(const Request& request)
                     request.strApi, request.strMethod);
 }
 
-auto fields(const Answer& answer)
+auto fields(const Reply& answer)
 {
     return std::tie(answer.nNumber, answer.outcome, answer.blHealthy, answer.nUid, answer.strUser,
                     answer.strFunction, answer.strRecord, answer.figures);
@@ -43,10 +43,10 @@ Request grantRequest(size_t cbTid = gate::TID_MAX, size_t cbApi = gate::API_MAX,
     return request;
 }
 
-Answer granted(size_t cbUser = gate::USER_MAX, size_t cbFunction = gate::FUNCTION_MAX,
-               size_t cbRecord = gate::RECORD_MAX)
+Reply granted(size_t cbUser = gate::USER_MAX, size_t cbFunction = gate::FUNCTION_MAX,
+              size_t cbRecord = gate::RECORD_MAX)
 {
-    Answer answer;
+    Reply answer;
     answer.nNumber = 0xfedcba9876543210;
     answer.outcome = Outcome::Granted;
     answer.nUid = 4294967294;
@@ -56,9 +56,9 @@ Answer granted(size_t cbUser = gate::USER_MAX, size_t cbFunction = gate::FUNCTIO
     return answer;
 }
 
-Answer told()
+Reply told()
 {
-    Answer answer;
+    Reply answer;
     answer.outcome = Outcome::Told;
     answer.blHealthy = true;
     for (size_t nFigure = 0; nFigure < gate::FIGURES; ++nFigure) {
@@ -118,31 +118,31 @@ TEST(Requests, ComeBackAsTheyWereIfTheyCanBe)
 
 TEST(Answers, ComeBackAsTheyWereIfTheyCanBe)
 {
-    for (const Answer& answer : {granted(), granted(0, 0, 0), told()}) {
-        expectWhole(answer, decodeAnswer, gate::ANSWER_MAX);
+    for (const Reply& answer : {granted(), granted(0, 0, 0), told()}) {
+        expectWhole(answer, decodeReply, gate::ANSWER_MAX);
     }
     const std::string strSmall = encode(granted(1, 1, 0));
     const std::string strTold = encode(told());
     for (char cOutcome = 1; cOutcome <= 6; ++cOutcome) {
-        Answer bare;
+        Reply bare;
         bare.outcome = static_cast<Outcome>(cOutcome);
-        expectWhole(bare, decodeAnswer, gate::ANSWER_MAX);
-        EXPECT_FALSE(decodeAnswer(changed(strSmall, OUTCOME, cOutcome))) << "a token of what is no grant";
-        EXPECT_EQ(5 == cOutcome, decodeAnswer(changed(strTold, OUTCOME, cOutcome)).has_value());
+        expectWhole(bare, decodeReply, gate::ANSWER_MAX);
+        EXPECT_FALSE(decodeReply(changed(strSmall, OUTCOME, cOutcome))) << "a token of what is no grant";
+        EXPECT_EQ(5 == cOutcome, decodeReply(changed(strTold, OUTCOME, cOutcome)).has_value());
     }
-    for (const Answer& answer : {granted(gate::USER_MAX + 1, 1, 0), granted(1, gate::FUNCTION_MAX + 1, 0),
-                                 granted(1, 1, gate::RECORD_MAX + 1)}) {
-        EXPECT_FALSE(decodeAnswer(encode(answer)));
+    for (const Reply& answer : {granted(gate::USER_MAX + 1, 1, 0), granted(1, gate::FUNCTION_MAX + 1, 0),
+                                granted(1, 1, gate::RECORD_MAX + 1)}) {
+        EXPECT_FALSE(decodeReply(encode(answer)));
     }
     const std::pair<size_t, char> IN_GRANT[] = {
         {OUTCOME, 7}, {HEALTHY, 1}, {UNUSED, 1}, {ANSWER_HEAD, '\0'}, {ANSWER_HEAD + 1, '\0'}};
     for (const auto& [nPlace, c] : IN_GRANT) {
-        EXPECT_FALSE(decodeAnswer(changed(strSmall, nPlace, c))) << nPlace;
+        EXPECT_FALSE(decodeReply(changed(strSmall, nPlace, c))) << nPlace;
     }
     const std::pair<size_t, char> IN_TOLD[] = {{HEALTHY, 2}, {ANSWER_UID, 1}, {FIGURES_SIZE, 0}};
     for (const auto& [nPlace, c] : IN_TOLD) {
-        EXPECT_FALSE(decodeAnswer(changed(strTold, nPlace, c))) << nPlace;
+        EXPECT_FALSE(decodeReply(changed(strTold, nPlace, c))) << nPlace;
     }
-    EXPECT_FALSE(decodeAnswer(strTold.substr(0, ANSWER_HEAD) + std::string(sizeof(gate::Figures), '\0')))
+    EXPECT_FALSE(decodeReply(strTold.substr(0, ANSWER_HEAD) + std::string(sizeof(gate::Figures), '\0')))
         << "figures of zeros are left out";
 }

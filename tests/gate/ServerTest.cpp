@@ -50,9 +50,9 @@ extern "C" int getsockopt(int nSocket, int nLevel, int nOption, void* pValue, so
 
 namespace {
 
-using gate::Answer;
 using gate::Ask;
 using gate::Outcome;
+using gate::Reply;
 using gate::Request;
 
 const std::string CALL = "GET /grant/Api/get HTTP/1.1\r\nHost: gate\r\nAuthorization: Bearer id\r\n\r\n";
@@ -178,7 +178,7 @@ protected:
             if (Ask::Figures != request->ask) {
                 return *request;
             }
-            Answer told;
+            Reply told;
             told.nNumber = request->nNumber;
             told.outcome = Outcome::Told;
             told.figures[gate::STORE_BYTES] = 4711;
@@ -188,7 +188,7 @@ protected:
 
     void answer(const Request& request, Outcome outcome)
     {
-        Answer answer;
+        Reply answer;
         answer.nNumber = request.nNumber;
         answer.outcome = outcome;
         answer.strUser = Outcome::Granted == outcome ? "anna" : "";

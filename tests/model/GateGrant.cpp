@@ -23,7 +23,7 @@ void moveToTheEnd(const std::string& strTid)
 }
 
 // The answer, and the gate's counters.
-std::pair<gate::Answer, gate::Figures> call(const gate::Request& request)
+std::pair<gate::Reply, gate::Figures> call(const gate::Request& request)
 {
     static gate::Store& store = *new gate::Store;
     static const std::function<gate::Owners::Owner(uid_t)> fOwner = anyOwner;
@@ -31,7 +31,7 @@ std::pair<gate::Answer, gate::Figures> call(const gate::Request& request)
         throw std::runtime_error("somebody holds the database");
     }
     gate::Batch batch(store.tokens(), fOwner);
-    const gate::Answer answer = batch.call(request).value();
+    const gate::Reply answer = batch.call(request).value();
     batch.save();
     if (!store.commit()) {
         throw std::runtime_error("somebody reads the database");
