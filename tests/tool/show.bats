@@ -58,44 +58,33 @@ create_time   $created" ]
 END
 }
 
-@test "-o json and jsonl give the record, the whole id too" {
-    row token--- "extra = '{\"n\":[1,0.5,null]}', bind_sid = 'session-1', count = -1"
-    record='{"bind_sid":"session-1","count":-1,"create_time":1000000000,"deadline":9999999999,"extra":{"n":[1,0.5,null]},"function":"VPN","tid":"token---'$ZEROS'","uid":0,"webapi_allow":{"Api":{"method":["get"]}}}'
-    gives "$record" show token--- -o jsonl
-    # Options for tables make no difference.
-    gives "$record" show token--- -o jsonl --no-header --utc
+@test "forms, columns and fields are those of a list that shows whole ids" {
+    row token--- "bind_sid = ' a,b', extra = '{\"n\":[1,0.5,null,\"ü\"]}', count = -1"
+    while read -r arguments; do
+        gives "$(tool list --show-ids $arguments)" show token--- $arguments
+    done <<'END'
+-o jsonl
+-o jsonl --no-header --utc
+-o csv
+-o csv --columns tid,session
+-o csv --columns uid --no-header
+--columns uid,session,note
+--field tid
+--field bind_sid
+--field uid
+--field deadline
+--field count
+--field create_time
+--field function --utc
+--field webapi_allow
+--field extra
+--field uid -o json
+END
+    # But the JSON is that of the token, and not a list.
     succeeds show token--- --output json
     [ "${#lines[@]}" -gt 10 ]
     printf %s "$output" >"$DIR/json"
-    [ "$(sqlite3 :memory: "SELECT json(CAST(readfile('$DIR/json') AS TEXT))")" = "$record" ]
-}
-
-@test "CSV and chosen columns are as in a list, with the whole id" {
-    row token--- "bind_sid = 'a,b'"
-    run_tool show token--- -o csv --columns tid,session
-    expect 0 "tid,session
-token---$ZEROS,\"a,b\""
-    gives 0 show token--- -o csv --columns uid --no-header
-    gives $'UID  SESSION\n  0  a,b' show token--- --columns uid,session
-}
-
-@test "--field gives one field as it is stored" {
-    row token--- "bind_sid = ' a', extra = '{\"a\":\"ü\"}', count = -1"
-    while IFS='|' read -r field value; do
-        gives "$value" show token--- --utc --field "$field"
-    done <<END
-tid|token---$ZEROS
-bind_sid| a
-uid|0
-deadline|9999999999
-count|-1
-create_time|1000000000
-function|VPN
-webapi_allow|{"Api":{"method":["get"]}}
-extra|{"a":"ü"}
-END
-    # It wins over a form.
-    gives 0 show token--- --field uid -o json
+    [ "$(sqlite3 :memory: "SELECT json(CAST(readfile('$DIR/json') AS TEXT))")" = "$(tool show token--- -o jsonl)" ]
 }
 
 @test "texts are stored as they are given, and come through exactly in JSON and harmless in tables" {
