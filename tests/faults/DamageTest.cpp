@@ -1,5 +1,5 @@
-// Each byte of a database is damaged, and the database is cut off after each byte. The calls must still
-// return.
+// Each byte of a database is damaged, and the database is cut off after each byte. The calls return all the
+// same.
 
 #include <gtest/gtest.h>
 #include <sqlite3.h>

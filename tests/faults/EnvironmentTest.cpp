@@ -167,8 +167,7 @@ std::string endOf(const TokenStore& store, const Operation& operation, int nResu
 // - "leaves no table: WHY": it failed and left a file without the table, so the next call fails too
 // - "fails late: WHY": it failed, but has changed the store
 // A first creation adds the mode of the file: "done, mode 0700". Waits for a lock are added for each
-// statement:
-// ", 500 waits". What the oracle finds wrong comes last: "; WRONG: ".
+// statement: ", 500 waits". What the oracle finds wrong comes last: "; WRONG: ".
 std::string outcomeOf(const TokenStore& store, const Operation& operation, const Environment& enter)
 {
     int nResult = -1;

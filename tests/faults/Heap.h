@@ -1,4 +1,5 @@
-// Replaces malloc and its kin in this process: counts allocations, and lets those fail that a test chooses.
+// Replaces malloc, calloc, realloc and free in this process: counts allocations, and lets those fail that a
+// test chooses.
 // Included in one file of a program.
 
 #ifndef TESTS_HEAP_H

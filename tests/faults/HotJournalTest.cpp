@@ -74,7 +74,7 @@ TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
     setRealEffectiveUid(0);
     const int nAtRoot = tokensWith99Uses(api);
 
-    EXPECT_LT(100, nHalfChange); // read from a change that never was
+    EXPECT_LT(100, nHalfChange); // read from a change that was never committed
     EXPECT_GT(TOKENS, static_cast<unsigned int>(nHalfChange));
     EXPECT_EQ(0, nAtRoot); // the journal has been played back
     figure("hot journal", std::to_string(nHalfChange) + " of " + std::to_string(TOKENS) +

@@ -168,7 +168,7 @@ void makeStores(Calls calls, int nProcesses)
     const StormCalls stormCalls(calls);
     const int64_t nStores = scaled(std::max(2, 64 / nProcesses));
     Tally tally;
-    int64_t nNoTable = 0; // failed for want of the table
+    int64_t nNoTable = 0; // failed because there was no table
     int64_t nBroken = 0;  // stores that stayed without one
     for (int64_t nStore = 0; nStore < nStores; ++nStore) {
         SharedArray<Told> rgTold(static_cast<size_t>(nProcesses));

@@ -271,7 +271,7 @@ class Source:
             if variable.type.get_canonical().kind == TypeKind.RECORD and self.is_guard(variable):
                 self.guard(variable)
             for child in variable.get_children():
-                if not self.text.startswith("]", child.extent.end.offset):  # the size of an array
+                if self.text[child.extent.end.offset] not in "]>":  # the size of an array, a template's argument
                     self.expression_of_statement(child, context=self.slice(cursor))
 
     def is_guard(self, variable):

@@ -33,13 +33,16 @@ TEST(DidYouMean, NamesTheNearestIfItIsNear)
         {"gran", "did you mean \"grant\"?"},
         {"gra", ""},
         {"lost", "did you mean \"list\"?"}, // as near to "last"
+        {"lxyt", ""},                       // half of it, too
+        {"--funct", "did you mean \"--function\"?"},
+        {"--func", ""},
         {"list of tokens", ""},
         {"", ""},
         {std::string(255, 'l'), ""},
     };
     for (const auto& [strWord, strQuestion] : CASES) {
         SCOPED_TRACE(strWord);
-        EXPECT_EQ(strQuestion, didYouMean(strWord, {"list", "last", "grant"}));
+        EXPECT_EQ(strQuestion, didYouMean(strWord, {"list", "last", "grant", "--function"}));
     }
     EXPECT_EQ("", didYouMean("list", {}));
 }

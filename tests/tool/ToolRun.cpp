@@ -265,7 +265,7 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
     int nCalls = -1;
     pid_t pid = -1;
     if (fault.isOfMemory()) {
-        getpwuid(0); // glibc does not bear a lack of memory when it does that first
+        getpwuid(0); // the first look-up of a process must not lack memory: glibc does not handle that
     }
     fflush(nullptr);
     // What the kernel does for a thread it does for what that forks, and not for this thread.
