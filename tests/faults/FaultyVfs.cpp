@@ -44,34 +44,23 @@ void hook(sqlite3_file* pFile, const char* szPath)
         g_files.erase(p);
         return nResult;
     };
-    methods.xRead = [](sqlite3_file* p, void* pData, int cb, sqlite3_int64 nOffset) {
-        return passFile<&Methods::xRead>({"xRead", "", 0, nullptr, cb, nOffset}, p, pData, cb, nOffset);
-    };
+    methods.xRead = [](auto... args) { return passFile<&Methods::xRead>({"xRead"}, args...); };
     methods.xWrite = [](sqlite3_file* p, const void* pData, int cb, sqlite3_int64 nOffset) {
         const auto write = [=](int cbPart) { return g_files.at(p).pReal->xWrite(p, pData, cbPart, nOffset); };
-        return passFile<&Methods::xWrite>({"xWrite", "", 0, pData, cb, nOffset, write}, p, pData, cb,
-                                          nOffset);
+        return passFile<&Methods::xWrite>({"xWrite", "", pData, cb, nOffset, write}, p, pData, cb, nOffset);
     };
     methods.xTruncate = [](sqlite3_file* p, sqlite3_int64 cb) {
-        return passFile<&Methods::xTruncate>({"xTruncate", "", cb}, p, cb);
+        return passFile<&Methods::xTruncate>({"xTruncate", "", nullptr, 0, cb}, p, cb);
     };
-    methods.xSync = [](sqlite3_file* p, int nFlags) {
-        return passFile<&Methods::xSync>({"xSync", "", nFlags}, p, nFlags);
+    methods.xSync = [](auto... args) { return passFile<&Methods::xSync>({"xSync"}, args...); };
+    methods.xFileSize = [](auto... args) { return passFile<&Methods::xFileSize>({"xFileSize"}, args...); };
+    methods.xLock = [](auto... args) { return passFile<&Methods::xLock>({"xLock"}, args...); };
+    methods.xUnlock = [](auto... args) { return passFile<&Methods::xUnlock>({"xUnlock"}, args...); };
+    methods.xCheckReservedLock = [](auto... args) {
+        return passFile<&Methods::xCheckReservedLock>({"xCheckReservedLock"}, args...);
     };
-    methods.xFileSize = [](sqlite3_file* p, sqlite3_int64* pcb) {
-        return passFile<&Methods::xFileSize>({"xFileSize"}, p, pcb);
-    };
-    methods.xLock = [](sqlite3_file* p, int nLock) {
-        return passFile<&Methods::xLock>({"xLock", "", nLock}, p, nLock);
-    };
-    methods.xUnlock = [](sqlite3_file* p, int nLock) {
-        return passFile<&Methods::xUnlock>({"xUnlock", "", nLock}, p, nLock);
-    };
-    methods.xCheckReservedLock = [](sqlite3_file* p, int* pnReserved) {
-        return passFile<&Methods::xCheckReservedLock>({"xCheckReservedLock"}, p, pnReserved);
-    };
-    methods.xFileControl = [](sqlite3_file* p, int nOperation, void* pArgument) {
-        return passFile<&Methods::xFileControl>({"xFileControl", "", nOperation}, p, nOperation, pArgument);
+    methods.xFileControl = [](auto... args) {
+        return passFile<&Methods::xFileControl>({"xFileControl"}, args...);
     };
 }
 
@@ -84,20 +73,20 @@ FaultyVfs::FaultyVfs(FileHook hooked) : m_vfs(*sqlite3_vfs_find("unix"))
     m_vfs.zName = "faulty";
     m_vfs.xOpen = [](sqlite3_vfs*, const char* szPath, sqlite3_file* pFile, int nFlags, int* pnFlags) {
         pFile->pMethods = nullptr;
-        const int nResult = pass<&sqlite3_vfs::xOpen>({"xOpen", "", nFlags}, szPath, pFile, nFlags, pnFlags);
+        const int nResult = pass<&sqlite3_vfs::xOpen>({"xOpen"}, szPath, pFile, nFlags, pnFlags);
         if (SQLITE_OK == nResult) {
             hook(pFile, szPath);
         }
         return nResult;
     };
-    m_vfs.xDelete = [](sqlite3_vfs*, const char* szPath, int nSync) {
-        return pass<&sqlite3_vfs::xDelete>({"xDelete", "", nSync}, szPath, nSync);
+    m_vfs.xDelete = [](sqlite3_vfs*, auto... args) {
+        return pass<&sqlite3_vfs::xDelete>({"xDelete"}, args...);
     };
-    m_vfs.xAccess = [](sqlite3_vfs*, const char* szPath, int nFlags, int* pnResult) {
-        return pass<&sqlite3_vfs::xAccess>({"xAccess", "", nFlags}, szPath, nFlags, pnResult);
+    m_vfs.xAccess = [](sqlite3_vfs*, auto... args) {
+        return pass<&sqlite3_vfs::xAccess>({"xAccess"}, args...);
     };
-    m_vfs.xFullPathname = [](sqlite3_vfs*, const char* szPath, int cbOut, char* szOut) {
-        return pass<&sqlite3_vfs::xFullPathname>({"xFullPathname"}, szPath, cbOut, szOut);
+    m_vfs.xFullPathname = [](sqlite3_vfs*, auto... args) {
+        return pass<&sqlite3_vfs::xFullPathname>({"xFullPathname"}, args...);
     };
     sqlite3_vfs_register(&m_vfs, 1);
 }

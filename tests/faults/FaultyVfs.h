@@ -12,11 +12,9 @@
 struct FileCall {
     const char* szName; // "xOpen", "xWrite", ...
     std::string strPath = "";
-    sqlite3_int64 nArgument =
-        0; // the flags, the lock, the operation, or the new size; of xDelete: whether to sync
     const void* pData = nullptr;                // of xWrite
-    int cb = 0;                                 // of xWrite and xRead
-    sqlite3_int64 nOffset = 0;                  // of xWrite and xRead
+    int cb = 0;                                 // of xWrite
+    sqlite3_int64 nOffset = 0;                  // of xWrite; of xTruncate the new size
     std::function<int(int cb)> write = nullptr; // of xWrite: writes only the first cb bytes
 };
 

@@ -74,7 +74,7 @@ int recordCall(std::set<std::string>& known, const FileCall& call, const std::fu
         g_calls.push_back({DiskCall::Kind::Write, strName, static_cast<size_t>(call.nOffset),
                            std::string(static_cast<const char*>(call.pData), static_cast<size_t>(call.cb))});
     } else if (0 == strcmp("xTruncate", call.szName)) {
-        g_calls.push_back({DiskCall::Kind::Truncate, strName, static_cast<size_t>(call.nArgument)});
+        g_calls.push_back({DiskCall::Kind::Truncate, strName, static_cast<size_t>(call.nOffset)});
     } else if (0 == strcmp("xDelete", call.szName)) {
         known.erase(strName);
         // Before the sync of the directory, if the call made one.
