@@ -6,10 +6,7 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <fstream>
-#include <functional>
 
-#include "FaultyVfs.h"
 #include "Figures.h"
 #include "ProcessState.h"
 #include "ShortWaits.h"
@@ -20,15 +17,6 @@ namespace {
 const unsigned int HANG_SEC = 60;
 const uid_t UID_CALLER = 1234;
 const char* const CALLS[] = {LISTING, GRANT, CREATION, DELETION};
-
-// Skips all syncs.
-int withoutSync(const FileCall& call, const std::function<int()>& real)
-{
-    const std::string strName = call.szName;
-    return "xSync" == strName     ? SQLITE_OK
-           : "xDelete" == strName ? (unlink(call.strPath.c_str()), SQLITE_OK)
-                                  : real();
-}
 
 class DamagedByte : public ::testing::Test {
 protected:
@@ -89,7 +77,6 @@ protected:
     const TokenStore m_store;
     const std::string m_strSound = makeSmallStore(m_store);
     const std::string m_strProcess = processState();
-    const FaultyVfs m_vfs{&withoutSync};
 
 private:
     std::vector<std::string> m_soundAnswers;
