@@ -11,7 +11,7 @@
 // the caller must be built with the same libstdc++ and jsoncpp.
 //
 // AccessTokenApi.h describes exceptions, -1 after waiting for a lock, threads and processes. Calls may
-// overlap in any threads and processes; two grants of one token that overlap can spend only one use.
+// overlap, but what overlaps is not exact: see vemo-access-token(7), THREADS AND PROCESSES.
 
 #ifndef VEMO_ACCESS_TOKEN_H
 #define VEMO_ACCESS_TOKEN_H

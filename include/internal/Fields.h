@@ -26,14 +26,14 @@ const Json::Value* fieldType(std::string_view strField);
 typedef std::array<const Json::Value*, FIELDS> FieldMembers;
 FieldMembers fieldMembers(const Json::Value& jObject);
 
-// What a column of a row is decoded with. Null: still to be found.
+// How a column of a row is decoded. A null pointer means that it is not known yet.
 struct Column {
     const Json::Value* pEntry; // in tokenType()
     Json::Value* pMember;      // of the record
 };
 
-// Adds all fields to an empty record, and finds the columns of a row, if these are the fields in their order.
-// That is faster than one by one. Otherwise returns nulls.
+// If the columns of a row are the fields in their order, adds all fields to the empty record and returns how
+// the columns are decoded. This is faster than one by one. Otherwise returns null pointers.
 typedef std::array<Column, FIELDS> Columns;
 Columns addFields(Json::Value& jRecord, int n_column, char** column_name);
 

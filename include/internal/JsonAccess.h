@@ -23,8 +23,8 @@ inline std::string_view nameOf(const Json::ValueIteratorBase& it)
     return {szBegin, static_cast<size_t>(szEnd - szBegin)};
 }
 
-// Finds a member from the iterator it on, and moves it past the member. Faster than findMember for one name
-// after the other, in the order of an object's members, which is that of their names.
+// Looks for a member at the iterator it or after it, and moves it past the member. This is faster than
+// findMember when names are looked up in the order of an object's members, which is that of their names.
 inline const Json::Value* findNext(Json::Value::const_iterator& it, const Json::Value::const_iterator& end,
                                    std::string_view strName)
 {
