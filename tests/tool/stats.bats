@@ -61,19 +61,9 @@ Web            1
 
 @test "stats --no-header leaves the titles out" {
     some_tokens
-    run_tool stats --no-header
-    expect 0 "tokens                        4
-expired                       2
-unlimited uses                2
-file size in bytes        16384
-free pages of 4096 bytes      0
-
-VPN   2
-Mail  1
-Web   1
-
-         0  root  3
-4000000000        1"
+    succeeds stats --no-header
+    [ "$(tr -s ' ' <<<"$output")" = "$(tool stats | sed '/NUMBER$/d; /TOKENS$/d' | tr -s ' ')" ]
+    [ "${lines[0]}" = "tokens                        4" ] # as narrow as can be
 }
 
 @test "stats -o json and jsonl tell the same" {

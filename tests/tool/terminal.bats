@@ -9,6 +9,12 @@ setup_file() {
     export LC_ALL=C.UTF-8
 }
 
+# shows STATUS OUTPUT [OPTIONS] -- ARGUMENTS...: on a terminal, the tool ends with that status and shows that
+shows() {
+    on_terminal "${@:3}"
+    expect "$1" "$2"
+}
+
 # below TITLE: all that stands below a title of the table in $output, joined, without blanks
 below() {
     awk -v title="$1" '
@@ -80,11 +86,9 @@ modes: as before" ]
 
 @test "the prompt does not get into the result, and ids from a pipe need none" {
     row token---
-    on_terminal --answer "Token id: " $'token---\r' --shell '"$0" check - Api >"$1"' -- "$DIR/result"
-    expect 0 "Token id: "
+    shows 0 "Token id: " --answer "Token id: " $'token---\r' --shell '"$0" check - Api >"$1"' -- "$DIR/result"
     [ "$(cat "$DIR/result")" = allowed ]
-    on_terminal --shell 'echo token--- | "$0" check - Api' --
-    expect 0 allowed
+    shows 0 allowed --shell 'echo token--- | "$0" check - Api' --
 }
 
 @test "many tokens are revoked when the answer is yes, and left alone at any other" {
@@ -114,8 +118,7 @@ yes|--user root
 y|--bind-sid s
 TABLE
     sql "DELETE FROM token WHERE tid LIKE 'first%'"
-    on_terminal --answer "[y/N] " $'y\r' --shell '"$0" revoke --all >"$1"' -- "$DIR/result"
-    expect 0 "Revoke 1 token? [y/N] y"
+    shows 0 "Revoke 1 token? [y/N] y" --answer "[y/N] " $'y\r' --shell '"$0" revoke --all >"$1"' -- "$DIR/result"
     [ "$(cat "$DIR/result")" = "1 token revoked" ]
 }
 
@@ -124,20 +127,14 @@ TABLE
 token---
 another-
 END
-    on_terminal -- revoke --all --dry-run
-    expect 0 "2 tokens would be revoked"
-    on_terminal -- revoke --function Other
-    expect 0 "0 tokens revoked"
-    on_terminal --shell '"$0" revoke --all </dev/null' --
-    expect 2 "vemo-access-token: repeat with --yes: there is nobody to ask"
-    on_terminal --shell '"$0" revoke --all 2>"$1"' -- "$DIR/stderr"
-    expect 2 ""
+    shows 0 "2 tokens would be revoked" -- revoke --all --dry-run
+    shows 0 "0 tokens revoked" -- revoke --function Other
+    shows 2 "vemo-access-token: repeat with --yes: there is nobody to ask" --shell '"$0" revoke --all </dev/null' --
+    shows 2 "" --shell '"$0" revoke --all 2>"$1"' -- "$DIR/stderr"
     [ "$(cat "$DIR/stderr")" = "vemo-access-token: repeat with --yes: there is nobody to ask" ]
     expect_left another- token---
-    on_terminal -- revoke token---
-    expect 0 "1 token revoked"
-    on_terminal -- revoke --all --yes
-    expect 0 "1 token revoked"
+    shows 0 "1 token revoked" -- revoke token---
+    shows 0 "1 token revoked" -- revoke --all --yes
 }
 
 @test "expired tokens are red" {
@@ -153,8 +150,7 @@ END
     [[ ${lines[1]} == "$id  root  VPN "* ]]
     [[ ${lines[1]} != *"$ESC"* ]]
     coloured=$output
-    on_terminal --columns 200 -- list --no-header --epoch --verbose
-    expect 0 "$coloured"
+    shows 0 "$coloured" --columns 200 -- list --no-header --epoch --verbose
     on_terminal --columns 400 -- show "$expired" --no-header
     [ "$(grep -c "$ESC" <<<"$output")" -eq 1 ]
     [[ $(grep "$ESC" <<<"$output") == "${ESC}[31mdeadline "* ]]
@@ -165,15 +161,12 @@ END
     on_terminal -- list -o json
     [ "$status" -eq 0 ]
     [[ $output != *"$ESC"* ]]
-    on_terminal --shell '"$0" list --no-header --epoch >"$1"' -- "$DIR/result"
-    expect 0 ""
-    on_terminal --shell '"$0" list --no-header --epoch --verbose >"$1"' -- "$DIR/result-verbose"
-    expect 0 ""
+    shows 0 "" --shell '"$0" list --no-header --epoch >"$1"' -- "$DIR/result"
+    shows 0 "" --shell '"$0" list --no-header --epoch --verbose >"$1"' -- "$DIR/result-verbose"
     cmp "$DIR/result" "$DIR/result-verbose"
     [ "$(cat "$DIR/result")" = "$(tool list --no-header --epoch)" ]
     [[ $(cat "$DIR/result") != *"$ESC"* ]]
-    NO_COLOR=1 on_terminal --columns 200 -- list --no-header --epoch
-    expect 0 "$(sed "s/$ESC\[[0-9]*m//g" <<<"$coloured")"
+    NO_COLOR=1 shows 0 "$(sed "s/$ESC\[[0-9]*m//g" <<<"$coloured")" --columns 200 -- list --no-header --epoch
     NO_COLOR= on_terminal --columns 200 -- list --no-header --epoch # as if it were not set
     expect 0 "$coloured"
 }
@@ -193,8 +186,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
     [ "$status" -eq 5 ]
     [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[32mrepaired${ESC}[0m: $REAL_DIRECTORY has mode 0755
 ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
-    on_terminal --shell '"$0" doctor >"$1"' -- "$DIR/result"
-    expect 5 ""
+    shows 5 "" --shell '"$0" doctor >"$1"' -- "$DIR/result"
     [[ $(cat "$DIR/result") == "warning: "* ]]
 }
 
@@ -214,8 +206,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
     # A terminal that does not know its width is taken for one of 80 columns.
     on_terminal --columns 80 -- list
     known=$output
-    on_terminal --columns 0 -- list
-    expect 0 "$known"
+    shows 0 "$known" --columns 0 -- list
     on_terminal --columns 60 -- show "$id"
     [ "$status" -eq 0 ]
     [ "$(awk 'length > 60' <<<"$output")" = "" ]
@@ -263,8 +254,7 @@ ${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
 70|TID       USER  FUNCTION  USES  DEADLINE             ALLOWS
 20|TID       USER  FUNCTION  USES  DEADLINE             ALLOWS
 TABLE
-    on_terminal --columns 20 -- list --columns session,expires
-    expect 0 $'SESSION    EXPIRES\nsession-1  in 1000 d'
+    shows 0 $'SESSION    EXPIRES\nsession-1  in 1000 d' --columns 20 -- list --columns session,expires
 }
 
 # Bytes that are no UTF-8, control characters, and characters that order the text anew or cannot be seen; of the
@@ -339,8 +329,7 @@ TABLE
         [ "$status" -eq 0 ]
         [[ $output == *"$name"* ]]
     done
-    on_terminal -- list --user "$name"
-    expect 2 "vemo-access-token: --user: there is no user \"$name\""
+    shows 2 "vemo-access-token: --user: there is no user \"$name\"" -- list --user "$name"
 }
 
 # bar TITLE: a full one ends on the first line of $output, and it grew from an empty one
@@ -391,15 +380,12 @@ vemo-access-token: $DIR/lines: line 2 has the id of a token that is there alread
 
 @test "there is no progress bar where standard error is no terminal, or the result goes to the same" {
     many_rows 2
-    on_terminal --shell '"$0" export "$1" 2>"$2"' -- "$DIR/lines" "$DIR/stderr"
-    expect 0 ""
+    shows 0 "" --shell '"$0" export "$1" 2>"$2"' -- "$DIR/lines" "$DIR/stderr"
     [ "$(cat "$DIR/stderr")" = "vemo-access-token: 2 tokens exported" ]
     sql "DELETE FROM token"
-    on_terminal --shell '"$0" import "$1" 2>"$2"' -- "$DIR/lines" "$DIR/stderr"
-    expect 0 "2 tokens imported"
+    shows 0 "2 tokens imported" --shell '"$0" import "$1" 2>"$2"' -- "$DIR/lines" "$DIR/stderr"
     [ ! -s "$DIR/stderr" ]
-    on_terminal --shell '"$0" tune 2>"$1" | tail -n 1 | cut -c1-20' -- "$DIR/stderr"
-    expect 0 "write a small change"
+    shows 0 "write a small change" --shell '"$0" tune 2>"$1" | tail -n 1 | cut -c1-20' -- "$DIR/stderr"
     [ ! -s "$DIR/stderr" ]
     on_terminal --columns 1000 -- export
     expect 0 "$(tool export 2>/dev/null)

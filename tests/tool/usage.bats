@@ -184,18 +184,6 @@ Examples:
     }
 }
 
-@test "names and ids in brackets are names and ids" {
-    one=$(a_token)
-    other=$(a_token)
-    says "0 tokens revoked" "1 id is unknown" revoke "[${one:0:8},${other:0:8},$ZEROS]"
-    [ "$(sql "SELECT count(*) FROM token")" -eq 2 ]
-    cd "$DIR"
-    tool export x
-    fails 2 "[x]: No such file or directory" import "[x]"
-    fails 2 "--a=: No such file or directory" import -- --a=
-    [ "$(sql "SELECT count(*) FROM token")" -eq 2 ]
-}
-
 @test "a user who is not root is told so, and nothing is tried" {
     uid=65534
     [ "$(id -u)" -eq 0 ] || uid=$(id -u)
