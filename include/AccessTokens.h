@@ -193,7 +193,9 @@ inline std::string AccessTokens::create(unsigned int uid, const std::string& str
                                         const Json::Value& jOption) const
 {
     std::string strTid;
-    require(0 <= VEMO_ACCESS_TOKEN::tokenGenerate(strTid), "there is no random number for an id");
+    if (0 > VEMO_ACCESS_TOKEN::tokenGenerate(strTid)) {
+        throw std::runtime_error("there is no random number for an id");
+    }
     std::string strFunctionCopy = strFunction;
     Json::Value jOptionCopy = jOption;
     run([&](AccessTokenApi& api) {
