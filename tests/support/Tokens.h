@@ -14,7 +14,6 @@ struct Field {
     const char* szName;
     int nLine; // in the field list
     const char* szType;
-    const char* szColumn;
     Json::Value jDefault; // at the time NOW
     const char* szOther;  // a value that is not the token's own, in JSON
     const char* szWrong;  // one of a wrong type
@@ -26,15 +25,15 @@ inline const std::vector<Field>& fields()
     static const Json::Value jNow = static_cast<Json::Int64>(NOW);
     static const Json::Value jEmpty(Json::objectValue);
     static const std::vector<Field> rgField = {
-        {"tid", 2, "string", "tid TEXT primary key NOT NULL", "INVALID_TOKEN_ID", R"("new")", "5"},
-        {"bind_sid", 4, "string", "bind_sid TEXT", "", R"("S'2")", "null"},
-        {"uid", 6, "long long", "uid INTEGER", 4294967295U, "0", R"("0")"},
-        {"deadline", 8, "long long", "deadline INTEGER default -1", -1, "3600", "1.5"},
-        {"count", 10, "long long", "count INTEGER default 1", 1, "-1", R"("5")"},
-        {"create_time", 14, "long long", "create_time INTEGER default CURRENT_TIMESTAMP", jNow, "-5", "[]"},
-        {"function", 16, "string", "function TEXT NOT NULL", "VEMO_ACCESS_TOKEN", R"("")", "{}"},
-        {"webapi_allow", 18, "Json::objectValue", "webapi_allow TEXT", jEmpty, R"({"B":{}})", "[]"},
-        {"extra", 22, "Json::objectValue", "extra TEXT", jEmpty, R"({"z":null})", R"("{}")"},
+        {"tid", 2, "string", "INVALID_TOKEN_ID", R"("new")", "5"},
+        {"bind_sid", 4, "string", "", R"("S'2")", "null"},
+        {"uid", 6, "long long", 4294967295U, "0", R"("0")"},
+        {"deadline", 8, "long long", -1, "3600", "1.5"},
+        {"count", 10, "long long", 1, "-1", R"("5")"},
+        {"create_time", 14, "long long", jNow, "-5", "[]"},
+        {"function", 16, "string", "VEMO_ACCESS_TOKEN", R"("")", "{}"},
+        {"webapi_allow", 18, "Json::objectValue", jEmpty, R"({"B":{}})", "[]"},
+        {"extra", 22, "Json::objectValue", jEmpty, R"({"z":null})", R"("{}")"},
     };
     return rgField;
 }

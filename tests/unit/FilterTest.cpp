@@ -1,6 +1,7 @@
 // Filters as SQL: conditions, order and paging.
 
-#include <limits>
+#include <algorithm>
+#include <cstdint>
 #include <regex>
 
 #include "AccessTokenUtil.h"
@@ -315,39 +316,36 @@ TEST_F(Filter, SortsByATextAndInOneOfTwoDirections)
 
 TEST_F(Filter, WritesTheTailOfTheKeywordThatTheNumberPointsTo)
 {
-    const Json::Int64 nMin = std::numeric_limits<Json::Int64>::min();
-    const Json::Int64 nMax = std::numeric_limits<Json::Int64>::max();
     const Json::Int64 n2To32 = Json::Int64(1) << 32;
-    // The numbers by the position that they point to, modulo 2^32. Other values are read as numbers, and a
-    // fraction is cut off.
-    const std::map<size_t, std::vector<Json::Value>> numbers = {
-        {0, {0, n2To32, -n2To32, nMin, Json::Value(), false, -0.9}},
-        {1, {1, true, 1.9}},
-        {2, {2}},
-        {3, {3U}},
-        {4, {4}},
-        {5, {5, nMin + 5}},
-        {6, {6, 6 - n2To32}},
-        {7, {7, n2To32 + 7}},
-        {8, {8}},
-        {9, {9, 16, 1000000, -1, -7, n2To32 / 2, n2To32 - 1, nMax, Json::UInt64(nMax)}}}; // or more
-    const auto tail = [](const std::string& strKeyword, size_t nFirst) {
-        return nFirst < strKeyword.size() ? strKeyword.substr(nFirst) : "";
+    const std::string strLimit = " LIMIT ", strOffset = " OFFSET ";
+    // The positions that numbers point to, modulo 2^32. Other values are read as numbers, and a fraction is
+    // cut off.
+    const auto points = [&](const Json::Value& jNumber, size_t nFirst) {
+        SCOPED_TRACE(jNumber.asString());
+        Json::Value jFilter;
+        jFilter["limit"] = jNumber;
+        m_strOut.clear();
+        EXPECT_EQ(0, condition(jFilter));
+        EXPECT_EQ(strLimit.substr(std::min(nFirst, strLimit.size())), m_strOut);
+        jFilter["limit"] = 8;
+        jFilter["offset"] = jNumber;
+        m_strOut.clear();
+        EXPECT_EQ(0, condition(jFilter));
+        EXPECT_EQ(strOffset.substr(std::min(nFirst, strOffset.size())), m_strOut);
     };
-    for (const auto& [nFirst, numbersOfFirst] : numbers) {
-        for (const Json::Value& jNumber : numbersOfFirst) {
-            SCOPED_TRACE(jNumber.asString());
-            Json::Value jFilter;
-            jFilter["limit"] = jNumber;
-            m_strOut.clear();
-            EXPECT_EQ(0, condition(jFilter));
-            EXPECT_EQ(tail(" LIMIT ", nFirst), m_strOut);
-            jFilter["limit"] = 8;
-            jFilter["offset"] = jNumber;
-            m_strOut.clear();
-            EXPECT_EQ(0, condition(jFilter));
-            EXPECT_EQ(tail(" OFFSET ", nFirst), m_strOut);
-        }
+    for (unsigned int nFirst = 0; nFirst < 10; ++nFirst) {
+        points(nFirst, nFirst);
+        points(n2To32 + nFirst, nFirst);
+        points(nFirst - n2To32, nFirst);
+    }
+    for (const Json::Value& jNumber :
+         {Json::Value(), Json::Value(false), Json::Value(-0.9), Json::Value(INT64_MIN)}) {
+        points(jNumber, 0);
+    }
+    points(true, 1);
+    points(1.9, 1);
+    for (const Json::Int64 nNumber : {Json::Int64(-1), n2To32 / 2, n2To32 - 1, Json::Int64(INT64_MAX)}) {
+        points(nNumber, 9); // or more
     }
 }
 

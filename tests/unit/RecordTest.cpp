@@ -1,8 +1,7 @@
 // The fields of records: their types, their defaults, and the check of their types.
 
-#include <algorithm>
 #include <climits>
-#include <limits>
+#include <set>
 
 #include "AccessTokenUtil.h"
 #include "StoreTest.h"
@@ -134,42 +133,24 @@ protected:
 // The table decides: a field that is added to it is checked like the others.
 TEST_F(TypeCheck, AcceptsTheValuesOfEachTypeOnly)
 {
-    const std::pair<std::string, Json::Value> values[] = {
-        {"null", Json::Value()},
-        {"bool", false},
-        {"int", 5},
-        {"negative", -5},
-        {"unsigned", 5U},
-        {"least", std::numeric_limits<Json::Int64>::min()},
-        {"greatest", std::numeric_limits<Json::UInt64>::max()},
-        {"real", 5.5},
-        {"text", "5"},
-        {"no text", ""},
-        {"array", json("[5]")},
-        {"object", json(R"({"a":5})")},
-        {"empty object", Json::Value(Json::objectValue)},
-    };
-    const Texts integral = {"int", "negative", "unsigned", "least", "greatest"};
-    const std::pair<const char*, Texts> types[] = {
+    const std::set<std::string> integral = {"5", "-5", "-9223372036854775808", "18446744073709551615"};
+    const std::set<std::string> others = {"null",  "false", "5.5",        R"("5")",
+                                          R"("")", "[5]",   R"({"a":5})", "{}"};
+    const std::pair<const char*, std::set<std::string>> types[] = {
         {"int", integral},
         {"long long", integral},
         {"uid_t", integral},
         {"time_t", integral},
-        {"bool", {"bool"}},
-        {"string", {"text", "no text"}},
-        {"Json::arrayValue", {"array"}},
-        {"Json::objectValue", {"object", "empty object"}},
-    };
+        {"bool", {"false"}},
+        {"string", {R"("5")", R"("")"}},
+        {"Json::arrayValue", {"[5]"}},
+        {"Json::objectValue", {R"({"a":5})", "{}"}}};
     for (const auto& [szType, accepted] : types) {
         tokenType()["added"][0] = szType;
-        for (const auto& [strKind, jValue] : values) {
-            SCOPED_TRACE(szType + (" " + strKind));
-            Json::Value jToken;
-            jToken["added"] = jValue;
-            if (accepted.end() != std::find(accepted.begin(), accepted.end(), strKind)) {
-                check(jToken, nullptr);
-            } else {
-                checkFails(jToken, "added");
+        for (const auto& values : {integral, others}) {
+            for (const std::string& strValue : values) {
+                const Json::Value jToken = json("{\"added\":" + strValue + "}");
+                accepted.count(strValue) ? check(jToken, nullptr) : checkFails(jToken, "added");
             }
         }
     }
