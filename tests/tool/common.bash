@@ -50,7 +50,7 @@ text_of() {
 # It does what "run --separate-stderr" does, in a third of the time. The arguments are shown when a test fails.
 run_tool() {
     local streams=$BATS_TEST_TMPDIR.streams
-    echo "vemo-access-token $*"
+    echo "vemo-access-token ${*@Q}"
     status=0
     "$TOOL" "$@" >"$streams" 2>"$streams.errors" || status=$?
     text_of output "$streams"

@@ -175,7 +175,7 @@ END
 @test "texts come through exactly" {
     row token---
     text=$'a\'b"c\\d\ne\tf\e[31mÄ漢\xff;--'
-    run_tool update token--- --bind-sid "$text" --add-allow "$text:$text" # which warns of the blanks
+    run_tool update token--- --bind-sid "$text" --add-allow "$text:$text" # which warns of the blank
     [ "$status $output" = "0 1 token updated" ]
     [ "$(sql "SELECT lower(hex(bind_sid)) FROM token")" = "$(printf %s "$text" | od -An -v -tx1 | tr -d ' \n')" ]
     json=$'a\'b\\"c\\\\d\\ne\\tf\\u001b[31mÄ漢\xff;--'
