@@ -59,7 +59,9 @@ bool fails(const std::string& strCall)
 
 void requireOwn(const char* szFile, int nFlags)
 {
-    if (!(nFlags & O_CLOEXEC) && 0 != strcmp(szFile, "/dev/tty")) { // which libbsd opens, and closes soon
+    // libbsd opens the first, and closes it soon; clang's counters stand in the others.
+    const bool blOthers = 0 == strcmp(szFile, "/dev/tty") || strstr(szFile, ".profraw");
+    if (!(nFlags & O_CLOEXEC) && !blOthers) {
         abort();
     }
 }
