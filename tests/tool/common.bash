@@ -147,6 +147,41 @@ options_of() {
     tool "$@" --help | sed -nE 's/^  (-[a-zA-Z],)?(--[a-z-]+).*/\2/p' | LC_ALL=C sort
 }
 
+# calls: each way to open the database, but for doctor. $ID is a token of it, and $DIR/other an export of another.
+calls() {
+    whole </dev/null >"$DIR/none"
+    cat <<TABLE
+list
+list --count
+list -o json
+show $ID
+show ${ID:0:8}
+check $ID Api get
+grant $ID Api get
+update $ID --uses 2
+rotate $ID
+revoke $ID
+revoke --dry-run $ID
+revoke --all --dry-run
+revoke --all --yes
+purge
+purge --dry-run
+stats
+stats -o json
+stats --prometheus
+export
+export $DIR/exported
+import $DIR/other
+import $DIR/none
+create --uid 0 --function TAG
+init
+tune
+tune --wal
+tune --undo
+tune --dry-run
+TABLE
+}
+
 # need_store: makes the store, if there is none
 need_store() {
     [ -e "$DB" ] || tool init >/dev/null
