@@ -191,6 +191,7 @@ Examples:
         plain $arguments </dev/null
         expect 4 "" "vemo-access-token: only root may do this: the token database belongs to root, and the effective uid is $uid"
     done < <(ID=- calls)
+    diff <(ID=- calls | cut -d ' ' -f 1 | sort -u) <(commands_of_tool | grep -vxE 'doctor|generate|help' | sort)
     plain doctor --repair
     expect 5 "error: not run as root: the effective uid is $uid
     meaning: the database belongs to root and cannot be looked at
