@@ -373,7 +373,9 @@ def main():
     runs = [results]
     for path in sys.argv[2:]:
         with open(path, encoding="utf-8") as file:
-            runs.append(json.load(file))
+            run = json.load(file)
+        if run not in runs:
+            runs.append(run)
     machines = dict.fromkeys("".join(f"- {line}\n" for line in run["machine"]) for run in runs)
     goals = ratios(runs, lambda what, goal: goal is not None or what.endswith(", 10 tokens"))
     sections = [
