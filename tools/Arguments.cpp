@@ -137,14 +137,14 @@ void addSelection(Command& command, Selection& selection)
     addParsed(command, "--created-before", "TIME", selection.nCreatedBefore, parseTime,
               "those made before a time, such as 2026-12-31 or \"2026-12-31 12:00\"");
     addParsed(command, "--created-after", "TIME", selection.nCreatedAfter, parseTime,
-              "those made then or later");
+              "those made at this time or later");
     addAllowances(command, "--opens", selection.opens, "those that open these methods, or the API alone");
     command.flag("--no-owner", selection.blNoOwner,
                  "those whose owner is not a user of this machine any more");
     command.flag("--unlimited", selection.blUnlimited, "those with any number of uses");
     command.flag("--expired", selection.blExpired, "those whose deadline has passed");
     addParsed(command, "--expiring", "DURATION", selection.nExpiring, parseDuration,
-              "those that expire within this time; with --expired, these and those");
+              "those that expire within this time; with --expired, both");
 }
 
 uint64_t countSelected(const Selection& selection)
@@ -184,13 +184,13 @@ void addTtl(Command& command, std::optional<int64_t>& nTtl)
 void addExtra(Command& command, std::optional<Json::Value>& jExtra)
 {
     addParsed(command, "--extra", "JSON|@FILE", jExtra, parseExtra,
-              "data of your own, a JSON object or a file of one");
+              "your data, a JSON object or a file that holds one");
 }
 
 void addNote(Command& command, std::optional<std::string>& strNote)
 {
     const auto keep = [](const std::string& strText) { return strText; };
-    addParsed(command, "--note", "TEXT", strNote, keep, "a note of yours, kept in the data; \"\" for none");
+    addParsed(command, "--note", "TEXT", strNote, keep, "your note, kept in the data; \"\" for none");
 }
 
 void setNote(Json::Value& jExtra, const std::string& strNote)

@@ -120,7 +120,7 @@ void addCreate(Commands& commands)
     addNote(command, pOptions->strNote);
     const auto keep = [](const std::string& strText) { return strText; };
     addParsed(command, "--tid", "TID", pOptions->strTid, keep,
-              "an id of your own; \"-\" reads it from standard input");
+              "your own id; \"-\" reads it from standard input");
     addForm(command, pOptions->layout);
     command.example("--user root --function backup --allow Backup:put >id");
     command.example("--uid 1000 --function login --ttl 8h --allow Login");

@@ -328,11 +328,11 @@ void addImport(Commands& commands)
         commands.add("import", "create the tokens of files that export wrote; all of a file or none",
                      [pOptions] { return importTokens(*pOptions); });
     command.flag("--partial", pOptions->blPartial,
-                 "import what is there of an export that is not whole or was changed");
+                 "import the whole lines of an export that is cut off or was changed");
     command.flag("--skip-existing", pOptions->blSkipExisting,
-                 "leave tokens as they are whose ids are there already");
+                 "keep the tokens whose ids exist already, and import the others");
     command.flag("--in-steps", pOptions->blInSteps,
-                 "let programs through in between; what is there already stays, so it can be repeated");
+                 "let programs through in between; keeps tokens that exist already, so it can be repeated");
     const auto add = [pOptions](const std::string& strFile) {
         if (strFile.empty()) {
             throw BadValue("must not be empty");

@@ -191,10 +191,11 @@ void addList(Commands& commands)
         commands.add("list", "list tokens; purges nothing", [pOptions] { return list(*pOptions); });
     addSelection(command, pOptions->selection);
     addParsed(command, "--sort", "FIELD[:desc]", pOptions->order, parseOrder,
-              "by this field, not by deadline");
+              "sort by this field instead of the deadline");
     const auto parseLimit = [](const std::string& strText) { return parseNumber(strText, 1, INT64_MAX); };
-    addParsed(command, "--limit", "N", pOptions->nLimit, parseLimit, "the first N; says how many there are");
-    command.flag("--count", pOptions->blCount, "how many there are, no more");
+    addParsed(command, "--limit", "N", pOptions->nLimit, parseLimit,
+              "only the first N; says how many there are");
+    command.flag("--count", pOptions->blCount, "print only how many there are");
     addTokenOptions(command, pOptions->layout);
     command.flag("--show-ids", pOptions->layout.blShowIds, "whole ids, not their first 8 characters");
     command.example("--user root --expiring 7d");

@@ -293,7 +293,7 @@ void addRevoke(Commands& commands)
     command.remainingArguments("TID", add, "ids; \"-\" reads them from standard input, one on each line");
     addSelection(command, pOptions->selection);
     command.flag("--all", pOptions->blAll, "every token there is");
-    command.flag("--dry-run", pOptions->blDryRun, "only tell how many");
+    command.flag("--dry-run", pOptions->blDryRun, "only say how many");
     command.flag("--yes", pOptions->blYes, "do not ask");
     command.example("- <id");
     command.example("--user root --function backup --yes");
@@ -304,7 +304,7 @@ void addPurge(Commands& commands)
     auto pOptions = std::make_shared<PurgeOptions>();
     Command& command =
         commands.add("purge", "delete the expired tokens", [pOptions] { return purge(*pOptions); });
-    command.flag("--dry-run", pOptions->blDryRun, "only tell how many");
+    command.flag("--dry-run", pOptions->blDryRun, "only say how many");
     command.example("");
     command.example("--dry-run");
 }

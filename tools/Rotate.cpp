@@ -104,7 +104,7 @@ void addRotate(Commands& commands)
                                     [pOptions] { return rotate(*pOptions); });
     addTid(command, pOptions->strTid);
     addParsed(command, "--grace", "DURATION", pOptions->nGrace, parseDuration,
-              "the old id stays good for so long, at most");
+              "how long the old id stays valid, at most");
     command.example("- <id >new-id");
     command.example("- --grace 1h <id >new-id");
 }

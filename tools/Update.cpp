@@ -242,7 +242,7 @@ void addUpdate(Commands& commands)
     command.exclude("--remove-allow", "--allow");
     const auto keep = [](const std::string& strText) { return strText; };
     addParsed(command, "--bind-sid", "SID", pOptions->strSid, keep,
-              "bind it to this login session; \"\" to none");
+              "bind it to this login session; \"\" unbinds it");
     addExtra(command, pOptions->jExtra);
     addNote(command, pOptions->strNote);
     command.example("- --ttl 30d --uses 5 <id");

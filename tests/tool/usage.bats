@@ -95,9 +95,9 @@ Options:
                               what it opens besides (repeatable)
   --remove-allow API[:METHOD,...]
                               what it no longer opens (repeatable)
-  --bind-sid SID              bind it to this login session; "" to none
-  --extra JSON|@FILE          data of your own, a JSON object or a file of one
-  --note TEXT                 a note of yours, kept in the data; "" for none
+  --bind-sid SID              bind it to this login session; "" unbinds it
+  --extra JSON|@FILE          your data, a JSON object or a file that holds one
+  --note TEXT                 your note, kept in the data; "" for none
 
 Examples:
   vemo-access-token update - --ttl 30d --uses 5 <id
