@@ -16,7 +16,7 @@ struct RequestHead {
 };
 static_assert(24 == sizeof(RequestHead) && std::has_unique_object_representations_v<RequestHead>);
 
-struct AnswerHead {
+struct ReplyHead {
     uint64_t nNumber;
     uint8_t nOutcome;
     uint8_t nHealthy;
@@ -27,11 +27,10 @@ struct AnswerHead {
     uint16_t nUnused;
     uint32_t nUid;
 };
-static_assert(24 == sizeof(AnswerHead) && std::has_unique_object_representations_v<AnswerHead>);
+static_assert(24 == sizeof(ReplyHead) && std::has_unique_object_representations_v<ReplyHead>);
 
 static_assert(sizeof(RequestHead) + gate::TID_MAX + gate::API_MAX + gate::METHOD_MAX <= gate::REQUEST_MAX);
-static_assert(sizeof(AnswerHead) + gate::USER_MAX + gate::FUNCTION_MAX + gate::RECORD_MAX <=
-              gate::ANSWER_MAX);
+static_assert(sizeof(ReplyHead) + gate::USER_MAX + gate::FUNCTION_MAX + gate::RECORD_MAX <= gate::ANSWER_MAX);
 static_assert(sizeof(gate::Figures) <= gate::RECORD_MAX);
 
 template <typename Head>
@@ -128,7 +127,7 @@ std::optional<Request> decodeRequest(std::string_view strMessage)
 std::string encode(const Reply& answer)
 {
     const bool blFigures = answer.figures != Figures();
-    AnswerHead head = {};
+    ReplyHead head = {};
     head.nNumber = answer.nNumber;
     head.nOutcome = static_cast<uint8_t>(answer.outcome);
     head.nHealthy = answer.blHealthy;
@@ -147,8 +146,8 @@ std::string encode(const Reply& answer)
 
 std::optional<Reply> decodeReply(std::string_view strMessage)
 {
-    Reader<AnswerHead> reader(strMessage);
-    const AnswerHead& head = reader.head;
+    Reader<ReplyHead> reader(strMessage);
+    const ReplyHead& head = reader.head;
     Reply answer;
     answer.strUser = reader.takeText(head.cbUser, USER_MAX);
     answer.strFunction = reader.takeText(head.cbFunction, FUNCTION_MAX);
