@@ -1,5 +1,6 @@
 #include "Operations.h"
 
+#include <cstring>
 #include <stdexcept>
 
 #include "AccessTokenApi.h"
@@ -112,14 +113,14 @@ const std::vector<Operation>& operations()
     return all;
 }
 
-const Operation& operationNamed(const std::string& strName)
+const Operation& operationNamed(const char* szName)
 {
     for (const Operation& operation : operations()) {
-        if (strName == operation.szName) {
+        if (0 == strcmp(szName, operation.szName)) {
             return operation;
         }
     }
-    throw std::logic_error("no operation " + strName);
+    throw std::logic_error(std::string("no operation ") + szName);
 }
 
 void prepareStore(const TokenStore& store, const Operation& operation)

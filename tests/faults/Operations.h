@@ -19,7 +19,7 @@ struct Operation {
 // Twelve: creating the store, and each way in which the library changes it or reads it.
 const std::vector<Operation>& operations();
 
-const Operation& operationNamed(const std::string& strName);
+const Operation& operationNamed(const char* szName);
 
 // Makes the store that the operation starts from.
 void prepareStore(const TokenStore& store, const Operation& operation);

@@ -30,11 +30,11 @@ const char* const DELETION = "deletion by id";
 
 // Runs an operation. Returns its result ("0"); after a failure also the start of its first log line
 // ("-1: LINE"); or the JSON library's exception ("throws: WHAT"). Other exceptions pass through.
-inline std::string call(const std::string& strOperation)
+inline std::string call(const char* szOperation)
 {
     Log::clear();
     try {
-        const int nResult = operationNamed(strOperation).run();
+        const int nResult = operationNamed(szOperation).run();
         const std::string strLine = Log::firstLine();
         const size_t nDetails = std::min(strLine.find(", err="), strLine.find(", jTokenParam="));
         return std::to_string(nResult) + (0 > nResult ? ": " + strLine.substr(0, nDetails) : "");
