@@ -1,5 +1,7 @@
 #include "Call.h"
 
+#include <algorithm>
+
 #include "gate/Messages.h"
 
 namespace {

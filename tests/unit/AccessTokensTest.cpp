@@ -2,6 +2,7 @@
 
 #include "AccessTokens.h"
 
+#include <algorithm>
 #include <filesystem>
 
 #include "Statements.h"
