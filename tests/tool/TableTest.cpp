@@ -50,6 +50,13 @@ TEST(Table, IsRedOnlyWhereItIsColoured)
               table.text(1, true));
 }
 
+TEST(Table, BreaksNoWordWhereverItStands)
+{
+    Table table({{"L", Kind::Long}}, true);
+    table.add({"a bcd"});
+    EXPECT_EQ("L\na\nbcd\n", table.text(1, false));
+}
+
 TEST(Table, GivesItsLongColumnsEqualSharesOfWhatIsLeft)
 {
     const struct {
