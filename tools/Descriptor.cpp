@@ -14,11 +14,10 @@ namespace {
 const int DIRECTORY_FLAGS = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 const mode_t OTHERS_WRITE_MODE = 0022;
 
-// Whether an open file has this name and no other. One call must tell both: those who gave it the name could
-// remove the name between two calls, and the link count would be 1 again.
-bool hasThisNameOnly(const tool::Descriptor& file, const tool::FilePlace& place)
+// Whether an open file has a name and no other. named is the status by that name. One call must tell both:
+// those who gave the file the name could remove it between two calls, and the link count would be 1 again.
+bool hasThisNameOnly(const tool::Descriptor& file, const struct stat& named)
 {
-    const struct stat named = tool::statusAt(place.directory, place.strName);
     return tool::isSame(named, tool::statusOf(file)) && 1 == named.st_nlink;
 }
 
@@ -137,9 +136,16 @@ Descriptor openToRead(const std::string& strPath)
     if (!file.isOpen()) {
         throw badPath(strPath, strPath);
     }
-    if (canOthersWrite(statusOf(place.directory)) && !hasThisNameOnly(file, place)) {
-        throw BadValue(shownPath(strPath) + " has other names besides, and others can change its directory; "
-                                            "copy it to a place of yours");
+    if (canOthersWrite(statusOf(place.directory))) {
+        const struct stat named = statusAt(place.directory, place.strName);
+        if (0 == named.st_mode && ENOENT != errno) { // a name that is gone is one that others gave
+            throw badPath(strPath, strPath);
+        }
+        if (!hasThisNameOnly(file, named)) {
+            throw BadValue(shownPath(strPath) +
+                           " has other names besides, and others can change its directory; "
+                           "copy it to a place of yours");
+        }
     }
     return file;
 }

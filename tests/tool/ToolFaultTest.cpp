@@ -243,6 +243,7 @@ private:
     {
         fs::remove_all(files());
         fs::create_directory(files());
+        fs::permissions(files(), fs::perms(0775)); // others could put names there
         std::ofstream(files() + "/IN") << m_strExport;
         std::ofstream(files() + "/OUT") << OLD_FILE;
         fs::create_directory(storeDirectory());
