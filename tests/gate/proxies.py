@@ -281,7 +281,8 @@ class ManyMachines(Scene):
     @classmethod
     def setUpClass(cls):
         super().setUpClass()
-        cls.openssl("req", "-x509", *KEY, "authority.key", "-out", "authority.pem", "-subj", "/CN=authority")
+        cls.openssl("req", "-x509", *KEY, "authority.key", "-out", "authority.pem", "-subj", "/CN=authority",
+                    "-addext", "keyUsage=critical,keyCertSign,cRLSign")
         for name in ("tokens.example", "front-end", "foreign"):
             signed = () if name == "foreign" else ("-CA", "authority.pem", "-CAkey", "authority.key")
             cls.openssl("req", "-x509", *KEY, name + ".key", "-out", name + ".pem", "-subj", "/CN=" + name, *signed,

@@ -80,6 +80,8 @@ fish_tab() {
         while read --line line
             set words (string split ' ' \$line)
             set offered (complete -C \$line | string replace -r '\t.*' '' | LC_ALL=C sort)
+            set begun (string match -- \$words[-1]\* \$offered)
+            test -z \"\$begun\"; or set offered \$begun # newer versions also offer what only resembles the word
             string match -qv -- \"\$offered[1]*\" \$offered; or test -z \"\$offered\"; or set words[-1] \$offered[1]
             string join -- '|' (string join -- ',' \$words) \$offered
         end
