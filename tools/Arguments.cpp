@@ -15,9 +15,8 @@ std::string ownersThatAreGone()
     std::set<Json::Int64> nUids;
     tool::Steps steps(tool::Store::Access::Glance);
     while (steps.next([&nUids](tool::Store& store, const std::string& strThose) {
-        store.eachRow(
-            "SELECT DISTINCT uid FROM token WHERE typeof(uid) = 'integer' AND " + strThose,
-            [&nUids](const tool::Row& row) { nUids.insert(strtoll(row[0]->c_str(), nullptr, 10)); });
+        store.select("DISTINCT uid", "typeof(uid) = 'integer' AND " + strThose,
+                     [&nUids](const tool::Row& row) { nUids.insert(strtoll(row[0]->c_str(), nullptr, 10)); });
     })) {
     }
     std::string strUids;

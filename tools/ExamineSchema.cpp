@@ -8,21 +8,15 @@
 #include "AccessTokenDefine.h"
 #include "Examination.h"
 #include "Masking.h"
+#include "Schema.h"
 #include "Steps.h"
 
 namespace {
 
 using tool::Finding;
 using tool::Findings;
+using tool::Schema;
 using tool::Store;
-
-const char* const TRIGGERS = "SELECT name FROM sqlite_schema WHERE type = 'trigger' "
-                             "AND tbl_name = 'token' COLLATE NOCASE ORDER BY 1";
-
-// Indexes that somebody made and that do more than list columns.
-const char* const ODD_INDEXES =
-    "SELECT name FROM pragma_index_list('token') AS list WHERE origin = 'c' AND (\"unique\" OR partial "
-    "OR EXISTS (SELECT 1 FROM pragma_index_info(list.name) WHERE cid < 0)) ORDER BY 1";
 
 std::string joined(const std::vector<std::string>& strParts)
 {
@@ -132,13 +126,12 @@ bool holdsComment(const std::string& strSql)
 }
 
 // Returns whether the table has exactly the columns that the library makes.
-bool examineColumns(Store& store, Findings& findings)
+bool examineColumns(Schema& schema, Findings& findings)
 {
     std::string strOwn;
     AccessTokenDbApi().SqlExpandCreateTable(strOwn);
     const auto strMade = definitions(strOwn);
-    const std::string strSql =
-        store.text("SELECT sql FROM sqlite_schema WHERE type = 'table' AND name = 'token' COLLATE NOCASE");
+    const std::string strSql = schema.tableStatement();
     const auto strFound = definitions(strSql);
     const std::string strMore = holdsComment(strSql) ? "a comment" : lacking(strFound, strMade);
     const std::string strLess = lacking(strMade, strFound);
@@ -155,14 +148,13 @@ bool examineColumns(Store& store, Findings& findings)
     return false;
 }
 
-// Reports the objects that a query names, with the statements that drop them.
-void examineObjects(Store& store, const std::string& strQuery, const std::string& strKind,
-                    const std::string& strWhat, const std::string& strMeaning, Findings& findings)
+// Reports objects of the schema, with the statements that drop them.
+void reportObjects(const std::vector<std::string>& strObjects, const std::string& strKind,
+                   const std::string& strWhat, const std::string& strMeaning, Findings& findings)
 {
     std::vector<std::string> strNames;
     std::string strDrops;
-    for (const auto& row : store.query(strQuery)) {
-        const std::string strName = row[0].value_or("");
+    for (const std::string& strName : strObjects) {
         strNames.push_back(tool::quoted(strName));
         strDrops += (strDrops.empty() ? "" : " ") +
                     tool::sqlText("DROP %s \"%w\";", strKind.c_str(), strName.c_str());
@@ -177,27 +169,27 @@ void examineObjects(Store& store, const std::string& strQuery, const std::string
     }
 }
 
-void examineTriggers(Store& store, Findings& findings)
+void examineTriggers(Schema& schema, Findings& findings)
 {
-    examineObjects(
-        store, TRIGGERS, "TRIGGER", "a trigger on the table of tokens",
+    reportObjects(
+        schema.triggers(), "TRIGGER", "a trigger on the table of tokens",
         "it runs in every change that it is for: calls can report what did not happen, change other "
         "tokens, fail, or never end",
         findings);
 }
 
-void examineOddIndexes(Store& store, Findings& findings)
+void examineOddIndexes(Schema& schema, Findings& findings)
 {
-    examineObjects(
-        store, ODD_INDEXES, "INDEX", "an index on the table of tokens that does not only find them",
+    reportObjects(
+        schema.oddIndexes(), "INDEX", "an index on the table of tokens that does not only find them",
         "changes can fail, and a grant can delete other tokens: those that a unique index takes for "
         "the same",
         findings);
 }
 
-void examineEncoding(Store& store, Findings& findings)
+void examineEncoding(Schema& schema, Findings& findings)
 {
-    const std::string strEncoding = store.text("PRAGMA encoding");
+    const std::string strEncoding = schema.encoding();
     if (strEncoding != "UTF-8") {
         findings.push_back({Finding::Severity::Error,
                             "the database is in " + strEncoding + ", and not in UTF-8",
@@ -208,9 +200,9 @@ void examineEncoding(Store& store, Findings& findings)
 }
 
 // Returns whether there is a table that can be read.
-bool examineKind(Store& store, Findings& findings)
+bool examineKind(Schema& schema, Findings& findings)
 {
-    const std::string strKind = store.tableKind();
+    const std::string strKind = schema.tableKind();
     if (strKind.empty()) {
         findings.push_back({Finding::Severity::Error, "the database has no table of tokens",
                             "every call fails: the table is made together with the file, and never later",
@@ -226,13 +218,11 @@ bool examineKind(Store& store, Findings& findings)
 }
 
 // Returns whether the fields can be read.
-bool examineMissing(Store& store, Findings& findings)
+bool examineMissing(Schema& schema, Findings& findings)
 {
     std::vector<std::string> strMissing;
     for (const std::string& strName : tool::fieldNames()) {
-        if (0 == store.number(tool::sqlText("SELECT count(*) FROM pragma_table_xinfo('token') "
-                                            "WHERE name = %Q COLLATE NOCASE",
-                                            strName.c_str()))) {
+        if (!schema.hasColumn(strName)) {
             strMissing.push_back(strName);
         }
     }
@@ -254,22 +244,22 @@ bool examineSchema(Findings& findings)
 {
     bool blOwn = false;
     {
-        Store store(Store::Access::Read);
-        if (!examineKind(store, findings)) {
+        Schema schema(Store::Access::Read);
+        if (!examineKind(schema, findings)) {
             return false;
         }
-        examineTriggers(store, findings);
-        examineOddIndexes(store, findings);
-        if (!examineMissing(store, findings)) {
+        examineTriggers(schema, findings);
+        examineOddIndexes(schema, findings);
+        if (!examineMissing(schema, findings)) {
             return false;
         }
-        blOwn = examineColumns(store, findings);
+        blOwn = examineColumns(schema, findings);
     }
     if (!blOwn) {
         examineDuplicates(findings);
     }
-    Store store(Store::Access::Read);
-    examineEncoding(store, findings);
+    Schema schema(Store::Access::Read);
+    examineEncoding(schema, findings);
     return true;
 }
 

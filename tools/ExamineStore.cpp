@@ -7,12 +7,14 @@
 #include "Console.h"
 #include "Examination.h"
 #include "Place.h"
+#include "Schema.h"
 #include "Steps.h"
 
 namespace {
 
 using tool::Finding;
 using tool::Findings;
+using tool::Schema;
 using tool::Store;
 
 const std::chrono::milliseconds CHECK_MAX(500);
@@ -31,67 +33,33 @@ bool isJournalOld()
     return status && time(nullptr) - status->st_mtime > JOURNAL_AGE_MAX;
 }
 
-// The index of the ids, which belongs to the primary key.
-const char* const INDEX_OF_IDS = "(SELECT name FROM pragma_index_list('token') WHERE origin = 'pk')";
-
-// Reads each token by its id, and checks that the id of each row leads back to it. Returns what is wrong.
+// Reads each token by its id, and then looks up the id of each row. Returns what is damaged, or "".
 std::string damageOfParts()
 {
-    std::string strRead = "SELECT 0";
-    for (const std::string& strName : tool::fieldNames()) {
-        strRead += " + total(length(" + strName + "))";
-    }
-    tool::Rows rows;
-    std::string strErr;
+    std::string strDamage;
     tool::Steps steps(Store::Access::Glance, "Reading");
-    while (strErr.empty() && steps.next([&](Store& store, const std::string& strThose) {
-        strErr = store.queryPartially(strRead + " FROM token WHERE " + strThose, rows);
+    while (strDamage.empty() && steps.next([&strDamage](Store& store, const std::string& strThose) {
+        strDamage = store.damageOfRows(strThose);
     })) {
     }
-    // Now the other way: look up the id of each row in the index.
     tool::Steps byRow(Store::Access::Glance, "Comparing", tool::Steps::Order::ByRow);
-    while (strErr.empty() && byRow.next([&](Store& store, const std::string& strThose) {
-        const std::string strIndex = store.text("SELECT " + std::string(INDEX_OF_IDS));
-        if (strIndex.empty()) {
-            return;
-        }
-        rows.clear();
-        strErr = store.queryPartially("SELECT count(*) FROM token NOT INDEXED WHERE " + strThose +
-                                          " AND NOT EXISTS (SELECT 1 FROM token AS other INDEXED BY " +
-                                          tool::sqlText("\"%w\"", strIndex.c_str()) +
-                                          " WHERE other.tid = token.tid AND other.rowid = token.rowid)",
-                                      rows);
-        if (!rows.empty() && rows[0][0] != "0") {
-            strErr = rows[0][0].value_or("") + " rows are missing in the index of the ids";
-        }
+    while (strDamage.empty() && byRow.next([&strDamage](Store& store, const std::string& strThose) {
+        strDamage = store.damageOfIndex(strThose);
     })) {
     }
-    return strErr;
+    return strDamage;
 }
 
-// Returns what is damaged, or "". A whole check takes some seconds for a million tokens. Without a
-// write-ahead journal, others cannot commit in that time, so a long check is done in parts.
+// Returns what is damaged, or "".
 std::string damage()
 {
-    tool::Rows rows;
-    std::optional<std::string> strErr;
-    {
-        Store store(Store::Access::Read);
-        const bool blOthersCommit = store.text("PRAGMA journal_mode") == "wal";
-        strErr = blOthersCommit ? store.queryPartially("PRAGMA integrity_check", rows)
-                                : store.queryWithin(CHECK_MAX, "PRAGMA integrity_check", rows);
-    }
-    if (!strErr) {
+    const auto strDamage = Schema(Store::Access::Read).damage(CHECK_MAX);
+    if (!strDamage) {
         tool::complain(
             "to hold no program up, the database is checked in parts, and pages that hold no token are "
             "not looked at; \"sqlite3 " VEMO_ATOKEN_DB_PATH " 'PRAGMA integrity_check'\" looks at all");
-        return damageOfParts();
     }
-    std::string strReport;
-    for (const auto& row : rows) {
-        strReport += (strReport.empty() ? "" : "\n") + row[0].value_or("");
-    }
-    return strReport == "ok" ? "" : strReport.empty() ? *strErr : strReport;
+    return strDamage ? *strDamage : damageOfParts();
 }
 
 bool examineIntegrity(Findings& findings)

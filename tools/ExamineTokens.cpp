@@ -9,18 +9,28 @@
 #include "Failure.h"
 #include "Json.h"
 #include "Memo.h"
+#include "Schema.h"
 #include "Steps.h"
 
 namespace {
 
 using tool::Finding;
 using tool::Findings;
+using tool::Schema;
 using tool::Store;
 using tool::TokenNames;
 
 const int64_t BACKLOG_AGE_MAX = 3600; // seconds; each call of a program purges, so none should be as old
 const uint64_t TOKENS_WITHOUT_INDEX = 10000;
 const int NESTING_MAX = 100; // levels that a stack of 64 KiB has room for
+
+// Repairs the tokens that a condition in SQL selects.
+typedef std::function<void(Store&, const std::string& strWhere)> Repair;
+
+void remove(Store& store, const std::string& strWhere)
+{
+    store.remove(strWhere);
+}
 
 // A finding about the tokens that fulfil a condition in SQL.
 struct Check {
@@ -29,7 +39,7 @@ struct Check {
     std::string strWhat; // the text before the tokens
     std::string strMeaning;
     std::string strRemedy;
-    std::string strRepair;        // the statement that repairs; empty if an administrator must decide
+    Repair repair;                // empty if an administrator must decide
     std::string strRepaired = {}; // the condition of the tokens to repair; empty: strWhere
 };
 
@@ -76,7 +86,7 @@ Check nulls()
             "a NULL in ",
             "such a token cannot be read or granted, and every listing that meets it fails",
             "delete them: vemo-access-token doctor --repair",
-            "DELETE FROM token"};
+            remove};
 }
 
 Check numbers()
@@ -86,7 +96,7 @@ Check numbers()
             "no whole number where there should be one in ",
             "it is read as another number, 0 for a word: deadline or uses are not what they seem",
             "revoke them, or update what is wrong",
-            ""};
+            {}};
 }
 
 Check texts()
@@ -103,7 +113,7 @@ Check texts()
             "bytes where there should be a text in ",
             "no look-up by that field finds such a token",
             "make texts of them: vemo-access-token doctor --repair",
-            "UPDATE token SET " + strTexts};
+            [strTexts](Store& store, const std::string& strWhich) { store.change(strTexts, strWhich); }};
 }
 
 Check users()
@@ -113,7 +123,7 @@ Check users()
             "a uid that is no user's in ",
             "programs take the lower 32 bits of it for the owner: 4294967296 is root's",
             "revoke them",
-            ""};
+            {}};
 }
 
 Check unnamed()
@@ -124,7 +134,7 @@ Check unnamed()
             "an id that is empty or holds a NUL byte in ",
             "no call can name such a token: it is listed, but cannot be granted or revoked",
             "sqlite3 " VEMO_ATOKEN_DB_PATH " \"DELETE FROM token WHERE " + strWhere + "\"",
-            ""};
+            {}};
 }
 
 Check shortened()
@@ -135,7 +145,7 @@ Check shortened()
             "an id of fewer than " + strLength + " bytes in ",
             "it was not made by the library, and may be guessed",
             "revoke them, and create others",
-            ""};
+            {}};
 }
 
 Check cutTexts()
@@ -146,7 +156,7 @@ Check cutTexts()
             "a NUL byte in a text of ",
             "programs see what stands before it, and no look-up by that field finds such a token",
             "revoke them",
-            ""};
+            {}};
 }
 
 Check purposes()
@@ -156,7 +166,7 @@ Check purposes()
             "an empty purpose in ",
             "no call deletes such a token by its purpose",
             "revoke them, and create others",
-            ""};
+            {}};
 }
 
 Check deadlines()
@@ -166,7 +176,7 @@ Check deadlines()
             "a deadline of 0 or less in ",
             "there is no value for \"never\": the next purge deletes them",
             "update --ttl gives them time",
-            ""};
+            {}};
 }
 
 Check backlog()
@@ -176,16 +186,15 @@ Check backlog()
             "expired for more than an hour: ",
             "no program has called since, or its purges fail",
             "vemo-access-token purge",
-            "DELETE FROM token",
+            remove,
             std::string("deadline > 0 AND ") + grant::SQL_EXPIRED};
 }
 
-void execute(const std::string& strStatement, const std::string& strWhere)
+void execute(const Repair& repair, const std::string& strWhere)
 {
     tool::Steps steps(Store::Access::Write);
-    while (steps.next([&](Store& store, const std::string& strThose) {
-        store.query(strStatement + " WHERE " + strThose + " AND " + strWhere);
-    })) {
+    while (steps.next(
+        [&](Store& store, const std::string& strThose) { repair(store, strThose + " AND " + strWhere); })) {
     }
 }
 
@@ -194,12 +203,12 @@ void execute(const std::string& strStatement, const std::string& strWhere)
 void report(const Check& check, const TokenNames& names, bool blTableSound, Findings& findings)
 {
     Finding finding = {check.severity, check.strWhat + names.text(), check.strMeaning, check.strRemedy, {}};
-    if (!check.strRepair.empty() && blTableSound) {
-        finding.repair = [strRepair = check.strRepair,
+    if (check.repair && blTableSound) {
+        finding.repair = [repair = check.repair,
                           strWhere = check.strRepaired.empty() ? check.strWhere : check.strRepaired] {
-            execute(strRepair, strWhere);
+            execute(repair, strWhere);
         };
-    } else if (!check.strRepair.empty()) {
+    } else if (check.repair) {
         finding.strRemedy = "when the table is mended: " + finding.strRemedy;
     }
     findings.push_back(finding);
@@ -210,14 +219,15 @@ void examineRows(bool blTableSound, Findings& findings)
 {
     const std::vector<Check> checks = {nulls(),     numbers(),  texts(),    users(),     unnamed(),
                                        shortened(), cutTexts(), purposes(), deadlines(), backlog()};
-    std::string strSql;
+    std::string strAny;
     for (const Check& check : checks) {
-        strSql += (strSql.empty() ? "SELECT max(" : ", max(") + check.strWhere + ")";
+        strAny += (strAny.empty() ? "max(" : ", max(") + check.strWhere + ")";
     }
     std::vector<TokenNames> names(checks.size());
     tool::Steps steps(Store::Access::Glance, "Examining", tool::Steps::Order::ByRow);
     while (steps.next([&](Store& store, const std::string& strThose) {
-        const tool::Row isThere = store.query(strSql + " FROM token WHERE " + strThose)[0];
+        tool::Row isThere;
+        store.select(strAny, strThose, [&isThere](tool::Row row) { isThere = std::move(row); });
         for (size_t i = 0; i < checks.size(); ++i) {
             if (isThere[i] == "1") {
                 store.eachTid(strThose + " AND " + checks[i].strWhere,
@@ -292,9 +302,8 @@ void examineObjects(Findings& findings)
         addIf(allow.blDeep || extra.blDeep, deep);
     };
     while (steps.next([&](Store& store, const std::string& strThose) {
-        store.eachRow("SELECT tid, webapi_allow, extra FROM token WHERE " + strThose +
-                          " AND (webapi_allow <> '{}' OR extra <> '{}') AND NOT " + anyNull(),
-                      examine);
+        store.select("tid, webapi_allow, extra",
+                     strThose + " AND (webapi_allow <> '{}' OR extra <> '{}') AND NOT " + anyNull(), examine);
     })) {
     }
     const auto add = [&](const TokenNames& names, Finding::Severity severity, const std::string& strWhat,
@@ -323,11 +332,7 @@ void examineObjects(Findings& findings)
 void examineSpeed(Findings& findings)
 {
     const uint64_t nTokens = tool::countSelected({});
-    Store store(Store::Access::Glance);
-    const std::string strIndexed =
-        "SELECT count(*) FROM pragma_index_list('token') AS list, "
-        "pragma_index_info(list.name) AS info WHERE info.seqno = 0 AND info.name = 'deadline'";
-    if (nTokens > TOKENS_WITHOUT_INDEX && 0 == store.number(strIndexed)) {
+    if (nTokens > TOKENS_WITHOUT_INDEX && !Schema(Store::Access::Glance).isIndexed("deadline")) {
         findings.push_back({Finding::Severity::Warning,
                             std::to_string(nTokens) + " tokens, and no index on their deadline",
                             "every call reads the whole table for expired tokens",

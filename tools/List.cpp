@@ -67,10 +67,11 @@ uint64_t sort(const ListOptions& options, tool::SortedIds& ids)
     for (tool::Steps steps(tool::Store::Access::Glance, "Sorting", tool::Steps::Order::ById, nMax);;) {
         tool::Rows rows;
         const auto read = [&](tool::Store& store, const std::string& strThose) {
-            const std::string strFrom = " FROM token WHERE " + strThose + " AND " + strSelected;
-            rows = store.query(std::string("SELECT ") + tool::SQL_QUOTED_TID + ", " + keyOf(options.order) +
-                               (store.hasRowIds() ? ", rowid" : ", 0") + strFrom + strOrder);
-            nTokens += options.nLimit ? store.number("SELECT count(*)" + strFrom) : rows.size();
+            const std::string strWhere = strThose + " AND " + strSelected;
+            store.select(std::string(tool::SQL_QUOTED_TID) + ", " + keyOf(options.order) +
+                             (store.hasRowIds() ? ", rowid" : ", 0"),
+                         strWhere + strOrder, [&rows](tool::Row row) { rows.push_back(std::move(row)); });
+            nTokens += options.nLimit ? store.count(strWhere) : rows.size();
         };
         if (!steps.next(read)) {
             return nTokens;

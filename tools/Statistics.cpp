@@ -8,6 +8,7 @@
 #include "Arguments.h"
 #include "Failure.h"
 #include "Place.h"
+#include "Schema.h"
 #include "Steps.h"
 #include "Values.h"
 
@@ -59,14 +60,13 @@ Statistics collectStatistics()
     Statistics statistics = {};
     std::map<std::string, uint64_t> functions;
     std::map<std::optional<Json::Int64>, uint64_t> users;
-    const std::string strSelect = std::string("SELECT function, CAST(uid AS INTEGER), count(*), "
-                                              "total(count < 0), total(") +
-                                  grant::SQL_EXPIRED + "), total(" + expiringWithin(DAY) + "), total(" +
-                                  expiringWithin(7 * DAY) + "), total(webapi_allow = '{}'), total(" +
-                                  oldAndUnlimited() + ") FROM token WHERE ";
+    const std::string strExpressions =
+        std::string("function, CAST(uid AS INTEGER), count(*), total(count < 0), total(") +
+        grant::SQL_EXPIRED + "), total(" + expiringWithin(DAY) + "), total(" + expiringWithin(7 * DAY) +
+        "), total(webapi_allow = '{}'), total(" + oldAndUnlimited() + ")";
     Steps steps(Store::Access::Glance, "Counting", Steps::Order::ByRow);
     while (steps.next([&](Store& store, const std::string& strThose) {
-        store.eachRow(strSelect + strThose + " GROUP BY 1, 2", [&](const Row& row) {
+        store.select(strExpressions, strThose + " GROUP BY 1, 2", [&](const Row& row) {
             const auto nTokens = static_cast<uint64_t>(numberOf(row[2]));
             statistics.nTokens += nTokens;
             statistics.nUnlimited += static_cast<uint64_t>(numberOf(row[3]));
@@ -78,10 +78,11 @@ Statistics collectStatistics()
             functions[row[0].value_or("")] += nTokens;
             users[row[1] ? std::optional(numberOf(row[1])) : std::nullopt] += nTokens;
         });
-        statistics.nFreePages = store.number("PRAGMA freelist_count");
-        statistics.nPageBytes = store.number("PRAGMA page_size");
     })) {
     }
+    const Schema::Pages pages = Schema(Store::Access::Glance).pages();
+    statistics.nFreePages = pages.nFree;
+    statistics.nPageBytes = pages.nBytes;
     statistics.functions = groupsOf<Group>(functions);
     statistics.users = groupsOf<UserGroup>(users);
     const auto status = statusOf(VEMO_ATOKEN_DB_PATH);

@@ -62,9 +62,10 @@ bool Steps::next(const Use& use)
         const bool blIds = Order::ById == m_order || !store.hasRowIds();
         const std::string strKey = blIds ? "tid" : "rowid";
         const std::string strBehind = strKey + (m_strLast.empty() ? " IS NOT NULL" : " > " + m_strLast);
-        const std::string strBound =
-            store.text("SELECT " + (blIds ? SQL_QUOTED_TID : strKey) + " FROM token WHERE " + strBehind +
-                       " ORDER BY " + strKey + " LIMIT 1 OFFSET " + std::to_string(m_nTokens - 1));
+        std::string strBound;
+        store.select(blIds ? SQL_QUOTED_TID : strKey,
+                     strBehind + " ORDER BY " + strKey + " LIMIT 1 OFFSET " + std::to_string(m_nTokens - 1),
+                     [&strBound](const Row& row) { strBound = row[0].value_or(""); });
         m_blEnd = strBound.empty();
         const std::string strUpTo = m_blEnd ? "true" : strKey + " <= " + strBound;
         // Tokens whose id is NULL have no place in the order; they come in the first step.

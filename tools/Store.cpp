@@ -25,6 +25,12 @@ std::string sqlBehind(std::string strPrefix)
 
 namespace tool {
 
+void Store::select(const std::string& strExpressions, const std::string& strWhere,
+                   const std::function<void(Row)>& take)
+{
+    eachRow("SELECT " + strExpressions + " FROM token WHERE " + strWhere, take);
+}
+
 void Store::eachToken(const std::string& strWhere, const std::string& strColumns, const TakeToken& take)
 {
     const std::vector<std::string> strNames = fieldNames();
@@ -39,7 +45,7 @@ void Store::eachToken(const std::string& strWhere, const std::string& strColumns
     });
     std::string strFields;
     db().SqlExpandMemberName(strFields);
-    eachRow("SELECT " + strFields + strColumns + " FROM token WHERE " + strWhere, [&](Row row) {
+    select(strFields + strColumns, strWhere, [&](Row row) {
         Json::Value jToken;
         for (size_t i = 0; i < strNames.size(); ++i) {
             if (!row[i]) {
@@ -65,7 +71,7 @@ uint64_t Store::count(const std::string& strWhere)
 void Store::eachTid(const std::string& strWhere,
                     const std::function<void(const std::optional<std::string>& strTid)>& take)
 {
-    eachRow("SELECT tid FROM token WHERE " + strWhere, [&take](const Row& row) { take(row[0]); });
+    select("tid", strWhere, [&take](const Row& row) { take(row[0]); });
 }
 
 bool Store::hasRowIds()
@@ -139,6 +145,12 @@ void Store::create(const Json::Value& jToken)
     audit::note("created", jToken["tid"].asString());
 }
 
+void Store::change(const std::string& strAssignments, const std::string& strWhere)
+{
+    query("UPDATE token SET " + strAssignments + " WHERE " + strWhere);
+    audit::note("updated", {}, number("SELECT changes()"));
+}
+
 void Store::update(const std::string& strTid, const Json::Value& jChange)
 {
     std::string strChanges;
@@ -196,6 +208,33 @@ uint64_t Store::removeTids(const std::vector<std::string>& strTids)
         nRemoved += removeTid(strTid);
     }
     return nRemoved;
+}
+
+std::string Store::damageOfRows(const std::string& strWhere)
+{
+    std::string strRead = "SELECT 0";
+    for (const std::string& strName : fieldNames()) {
+        strRead += " + total(length(" + strName + "))";
+    }
+    Rows rows;
+    return queryPartially(strRead + " FROM token WHERE " + strWhere, rows);
+}
+
+std::string Store::damageOfIndex(const std::string& strWhere)
+{
+    const std::string strIndex = text("SELECT name FROM pragma_index_list('token') WHERE origin = 'pk'");
+    if (strIndex.empty() || !hasRowIds()) { // without row numbers, the index is the table
+        return "";
+    }
+    Rows rows;
+    const std::string strErr =
+        queryPartially("SELECT count(*) FROM token NOT INDEXED WHERE " + strWhere +
+                           sqlText(" AND NOT EXISTS (SELECT 1 FROM token AS other INDEXED BY \"%w\" "
+                                   "WHERE other.tid = token.tid AND other.rowid = token.rowid)",
+                                   strIndex.c_str()),
+                       rows);
+    const std::string strMissing = rows.empty() ? "0" : rows[0][0].value_or("");
+    return strMissing == "0" ? strErr : "rows missing in the index of the ids: " + strMissing;
 }
 
 uint64_t Store::purge()

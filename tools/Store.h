@@ -21,6 +21,10 @@ class Store : public Transaction {
 public:
     using Transaction::Transaction;
 
+    // Passes the values that SQL expressions have for each token that a condition in SQL selects to take().
+    void select(const std::string& strExpressions, const std::string& strWhere,
+                const std::function<void(Row)>& take);
+
     // Passes each token that a condition in SQL selects to take(), with the columns that strColumns adds to
     // the query (", COLUMN, ...").
     typedef std::function<void(Json::Value jToken, const Row& columns)> TakeToken;
@@ -52,6 +56,9 @@ public:
     // Writes a new token.
     void create(const Json::Value& jToken);
 
+    // Writes expressions in SQL, "FIELD = EXPRESSION, ...", to the tokens that a condition in SQL selects.
+    void change(const std::string& strAssignments, const std::string& strWhere);
+
     // Writes the members of jChange to the fields of a token. All other fields stay as they are, even if they
     // cannot be read.
     void update(const std::string& strTid, const Json::Value& jChange);
@@ -64,6 +71,11 @@ public:
     uint64_t remove(const std::string& strWhere);
     uint64_t removeTid(const std::string& strTid);
     uint64_t removeTids(const std::vector<std::string>& strTids);
+
+    // These two return what is damaged among the tokens that a condition in SQL selects, or "": whether each
+    // can be read; and whether the index of the ids, which belongs to the primary key, leads to each.
+    std::string damageOfRows(const std::string& strWhere);
+    std::string damageOfIndex(const std::string& strWhere);
 
     // Deletes the expired tokens, as the library does. Returns how many were deleted.
     uint64_t purge();

@@ -185,9 +185,6 @@ void Transaction::lock()
 void Transaction::commit()
 {
     const uint64_t nChanges = number("SELECT total_changes()");
-    if (!audit::hasNotes()) {
-        audit::note("changed or deleted", {}, nChanges);
-    }
     m_blCommitting = 0 != nChanges;
     m_pause.emplace();
     query("COMMIT");

@@ -43,6 +43,16 @@ public:
     // the lock must wait until this object is destroyed.
     void commit();
 
+    // What has the name of the table of tokens: "table", "view" or "virtual table"; "" for nothing.
+    std::string tableKind();
+
+    // Whether there is a table of tokens. Fails if something else has its name.
+    bool hasTable();
+
+    // Makes the table if it is missing, and returns whether it was made. Call it outside a transaction.
+    bool makeTable();
+
+protected:
     // Runs any statement and returns its rows.
     Rows query(const std::string& strSql);
 
@@ -60,16 +70,6 @@ public:
     std::string text(const std::string& strSql);
     uint64_t number(const std::string& strSql);
 
-    // What has the name of the table of tokens: "table", "view" or "virtual table"; "" for nothing.
-    std::string tableKind();
-
-    // Whether there is a table of tokens. Fails if something else has its name.
-    bool hasTable();
-
-    // Makes the table if it is missing, and returns whether it was made. Call it outside a transaction.
-    bool makeTable();
-
-protected:
     // The library's store; and a check of the result of one of its operations, which fails if the result is
     // an error.
     AccessTokenDbApi& db() { return m_db; }

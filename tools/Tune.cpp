@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <functional>
 #include <memory>
 
 #include "Change.h"
@@ -10,11 +11,12 @@
 #include "Failure.h"
 #include "Layout.h"
 #include "Progress.h"
-#include "Store.h"
+#include "Schema.h"
 #include "Table.h"
 
 namespace {
 
+using tool::Schema;
 using tool::Store;
 typedef tool::Table::Kind Kind;
 
@@ -29,14 +31,14 @@ struct Options {
     bool blNoHeader = false;
 };
 
-// The milliseconds of a statement, as text: the shortest of several times, since others can only prolong it.
-std::string timeOf(Store& store, const std::string& strSql)
+// The milliseconds that work takes, as text: the shortest of several times, since others can only prolong it.
+std::string timeOf(const std::function<void()>& work)
 {
     typedef std::chrono::duration<double, std::milli> Milliseconds;
     Milliseconds shortest = Milliseconds::max();
     for (int i = 0; i < MEASUREMENTS; ++i) {
         const auto start = std::chrono::steady_clock::now();
-        store.query(strSql);
+        work();
         shortest = std::min(shortest, Milliseconds(std::chrono::steady_clock::now() - start));
     }
     char szText[32];
@@ -44,37 +46,36 @@ std::string timeOf(Store& store, const std::string& strSql)
     return szText;
 }
 
-bool hasIndex(Store& store, const std::string& strField)
+std::string nameOfIndex(const std::string& strField)
 {
-    return 0 != store.number("SELECT count(*) FROM sqlite_schema WHERE type = 'index' AND name = 'token_" +
-                             strField + "'");
+    return "token_" + strField;
 }
 
 typedef std::vector<std::pair<std::string, std::string>> Figures;
 
 // What the store has, and how fast it is, in the same words before and after.
-Figures measured(Store& store, bool blWrite)
+Figures measured(Schema& schema, bool blWrite)
 {
-    Figures lines = {
-        {"look for expired tokens, as every call does",
-         timeOf(store, std::string("SELECT tid FROM token WHERE ") + grant::SQL_EXPIRED)},
-        {"look for a session's tokens", timeOf(store, "SELECT tid FROM token WHERE bind_sid = '\x01'")},
-        {"look for a purpose's tokens", timeOf(store, "SELECT tid FROM token WHERE function = '\x01'")},
-        {"journal", store.text("PRAGMA journal_mode")}};
+    const auto timeOfSearch = [&schema](const char* szWhere) {
+        return timeOf([&] { schema.eachTid(szWhere, [](const auto&) {}); });
+    };
+    Figures lines = {{"look for expired tokens, as every call does", timeOfSearch(grant::SQL_EXPIRED)},
+                     {"look for a session's tokens", timeOfSearch("bind_sid = '\x01'")},
+                     {"look for a purpose's tokens", timeOfSearch("function = '\x01'")},
+                     {"journal", schema.journal()}};
     for (const std::string strField : INDEXED) {
-        lines.emplace_back("index token_" + strField, hasIndex(store, strField) ? "yes" : "no");
+        const std::string strName = nameOfIndex(strField);
+        lines.emplace_back("index " + strName, schema.hasIndex(strName) ? "yes" : "no");
     }
     if (blWrite) {
-        // This changes nothing, but costs as much as any small change.
-        const std::string strVersion = store.text("PRAGMA user_version");
-        lines.emplace_back("write a small change", timeOf(store, "PRAGMA user_version = " + strVersion));
+        lines.emplace_back("write a small change", timeOf([&schema] { schema.writeSame(); }));
     }
     return lines;
 }
 
 std::string indexStatement(const std::string& strField, const Options& options)
 {
-    const std::string strName = "token_" + strField;
+    const std::string strName = nameOfIndex(strField);
     const bool blWanted = !options.blUndo && (!options.blDeadlineOnly || strField == "deadline");
     return blWanted ? "CREATE INDEX IF NOT EXISTS " + strName + " ON token (" + strField + ")"
                     : "DROP INDEX IF EXISTS " + strName;
@@ -95,12 +96,12 @@ std::vector<std::string> statements(const Options& options)
     return strStatements;
 }
 
-void execute(Store& store, const Options& options, tool::Progress& progress)
+void execute(Schema& schema, const Options& options, tool::Progress& progress)
 {
     const std::string strJournal = options.blUndo ? "delete" : "wal";
     const std::vector<std::string> strStatements = statements(options);
     for (const std::string& strStatement : strStatements) {
-        const std::string strResult = store.text(strStatement);
+        const std::string strResult = schema.run(strStatement);
         // Only the statement for the journal returns a row. It can have no effect without reporting an error.
         if (!strResult.empty() && strResult != strJournal) {
             throw tool::Failure(tool::EXIT_STATUS_STORE,
@@ -115,8 +116,8 @@ void execute(Store& store, const Options& options, tool::Progress& progress)
 
 Figures look()
 {
-    Store store(Store::Access::Read);
-    return measured(store, false);
+    Schema schema(Store::Access::Read);
+    return measured(schema, false);
 }
 
 // Prints the state of the store, and the statements that would be run.
@@ -137,10 +138,10 @@ int tell(const Options& options)
 std::pair<Figures, Figures> change(const Options& options)
 {
     tool::Progress progress("Tuning", [&options] { return statements(options).size(); });
-    Store store(Store::Access::Locked);
-    const Figures before = measured(store, true);
-    execute(store, options, progress);
-    return {before, measured(store, true)};
+    Schema schema(Store::Access::Locked);
+    const Figures before = measured(schema, true);
+    execute(schema, options, progress);
+    return {before, measured(schema, true)};
 }
 
 int tune(const Options& options)

@@ -127,9 +127,12 @@ Json::Value changedAllow(const Json::Value& jToken, const Options& options)
 Json::Value changedExtra(tool::Store& store, const Json::Value& jToken, const Options& options)
 {
     Json::Value jExtra = options.jExtra.value_or(jToken["extra"]);
-    const std::string strWhere = tool::sqlText("tid = %Q", jToken["tid"].asCString());
-    const bool blWhole =
-        options.jExtra || tool::flawOfStored(store.text("SELECT extra FROM token WHERE " + strWhere)).empty();
+    bool blWhole = true;
+    if (!options.jExtra) {
+        store.select(
+            "extra", tool::sqlText("tid = %Q", jToken["tid"].asCString()),
+            [&blWhole](const tool::Row& row) { blWhole = tool::flawOfStored(row[0].value_or("")).empty(); });
+    }
     if (!blWhole || !jExtra.isObject()) {
         throw tool::Failure(
             tool::EXIT_STATUS_USAGE,

@@ -82,12 +82,14 @@ TABLE
     tool export "$DIR/lines"
     tool revoke --all --yes
     tool import "$DIR/lines"
+    sql "UPDATE token SET function = CAST(function AS BLOB)"
     tool doctor --repair
     tool import "$DIR/lines"
     tool purge
     [ "$(told)" = "revoke: 6 tokens deleted
 import: 6 tokens created
-doctor: 6 tokens changed or deleted
+doctor: 6 tokens updated
+doctor: 6 tokens deleted
 import: 6 tokens created
 purge: 6 tokens deleted" ]
 }

@@ -5,6 +5,8 @@ load common
 
 REPLACE='stop the programs, move the directory away, run "vemo-access-token init" and import a backup'
 SAVE_AND_REPLACE='stop the programs, save the tokens with "vemo-access-token export", move the directory away, run "vemo-access-token init" and import them'
+DAMAGED="error: the database is damaged"
+DAMAGE_HELP="tokens may be lost or wrong|$SAVE_AND_REPLACE; where export fails, import a backup or what sqlite3 can still read: see vemo-access-token(8)"
 NOT_PRIVATE="others than root can use it, and ids are credentials"
 NO_CHANGE="no token can be created, changed or granted"
 ELSEWHERE="the tokens stand elsewhere, or nowhere|find out who made it; move the database to a directory of that name"
@@ -420,7 +422,7 @@ TABLE
     sqlite3 -cmd '.dbconfig defensive off' "$DB" "
         CREATE INDEX i ON token (deadline); PRAGMA writable_schema = ON;
         UPDATE sqlite_schema SET sql = 'CREATE INDEX i ON token (uid)' WHERE name = 'i'" >"$DIR/defensive"
-    damage="error: the database is damaged: row 1 missing from index i; row 2 missing from index i|tokens may be lost or wrong|$SAVE_AND_REPLACE; where export fails, import a backup or what sqlite3 can still read: see vemo-access-token(8)"
+    damage="$DAMAGED: row 1 missing from index i; row 2 missing from index i|$DAMAGE_HELP"
     finds 5 "$damage"
     finds 5 "$damage" --repair
     tool export >"$DIR/exported"
@@ -429,6 +431,32 @@ TABLE
         PRAGMA writable_schema = ON;
         UPDATE sqlite_schema SET sql = 'CREATE INDEX i ON token (bind_sid COLLATE x)' WHERE name = 'i'" >"$DIR/defensive"
     expect_first "error: the database is damaged: no such collation sequence: x"
+}
+
+@test "a check of the database that takes long is done in parts" {
+    many_rows 300
+    # The check of each row of the table "slow" takes some milliseconds.
+    sql "CREATE TABLE slow (x CHECK (0 = instr(printf('%.*c', 60000, 'a'), printf('%.*c', 30000, 'a') || x)));
+         PRAGMA ignore_check_constraints = ON; INSERT INTO slow SELECT 'b' FROM token;
+         CREATE TABLE other (tid TEXT PRIMARY KEY); INSERT INTO other SELECT tid FROM token WHERE rowid <= 298"
+    SENTENCE="to hold no program up, the database is checked in parts, and pages that hold no token are not looked at; \"sqlite3 $REAL_DB 'PRAGMA integrity_check'\" looks at all"
+    finds 0 "$ALL_RIGHT"
+    cp "$DB" "$DIR/sound"
+    sqlite3 -cmd '.dbconfig defensive off' "$DB" "
+        PRAGMA writable_schema = ON;
+        UPDATE sqlite_schema SET rootpage = (SELECT rootpage FROM sqlite_schema WHERE tbl_name = 'other' AND type = 'index')
+            WHERE tbl_name = 'token' AND type = 'index'" >"$DIR/defensive"
+    finds 5 "$DAMAGED: rows missing in the index of the ids: 2|$DAMAGE_HELP"
+    cp "$DIR/sound" "$DB"
+    dd if=/dev/zero of="$DB" bs=4096 seek=$(($(sql "SELECT max(pageno) FROM dbstat WHERE name = 'token'") - 1)) \
+        count=1 conv=notrunc status=none
+    finds 5 "$DAMAGED: database disk image is malformed|$DAMAGE_HELP"
+    # Here the table is the index.
+    cp "$DIR/sound" "$DB"
+    sql "$(sql "SELECT replace(sql, 'TABLE token', 'TABLE new') || ' WITHOUT ROWID' FROM sqlite_schema
+                WHERE type = 'table' AND name = 'token'");
+         INSERT INTO new SELECT * FROM token; DROP TABLE token; ALTER TABLE new RENAME TO token"
+    finds 5 "error: the table of tokens is not the one that the library makes: it has \"WITHOUT ROWID\"|calls can fail, spend no use, report what did not happen, or take one token for another|$SAVE_AND_REPLACE"
 }
 
 @test "a page that is not one is damage, told on one line and without sending the reader in a circle" {
