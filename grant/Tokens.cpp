@@ -44,7 +44,7 @@ std::string findSql()
     return strSql + EXPIRED " FROM token" WHERE_TID;
 }
 
-// As the library's checkPermission(), and also -1 if the list of methods holds something that is not a text.
+// As the library's checkPermission(), and also -1 if it throws: the list of methods holds an array or object.
 int permission(Json::Value& jAllow, const std::string& strApi, const std::string& strMethod)
 {
     try {

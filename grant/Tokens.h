@@ -60,7 +60,7 @@ public:
     // A column of the row, as the library reads it; the first is 0. The text ends at its first NUL, and is
     // null for NULL. It is valid until the next step.
     const char* text(int nColumn) const;
-    int64_t number(int nColumn) const; // at the beginning of the text; 0 if there is none
+    int64_t number(int nColumn) const; // at the beginning of the text, not NULL; 0 if there is none
 
 private:
     [[noreturn]] void fail();

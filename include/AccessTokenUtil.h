@@ -53,7 +53,7 @@ VEMO_ATOKEN_EXPORT int getTimeAfterNow(int offsetSecond, long& now);
 
 // Sets strTime to the current time plus offsetSecond as text in UTC, such as
 // "Fri, 02 Jan 2026 13:00:00 GMT". The names of days and months follow the process's LC_TIME locale.
-// Returns 0, or -1 with strTime unchanged.
+// Always returns 0.
 VEMO_ATOKEN_EXPORT int getTimeAfterNow(int offsetSecond, std::string& strTime);
 
 // Decides whether the record's webapi_allow lists a web API and its method. Names are compared byte

@@ -22,8 +22,8 @@
 // create found no random number. There are also Json::LogicError, for a member of an argument that cannot be
 // converted, and std::bad_alloc.
 //
-// Time: an operation waits for the lock, at most as long as the constructor was told. Then each statement
-// waits up to 5 seconds for a database that a program without the lock keeps locked.
+// Time: an operation waits for the lock, at most as long as the constructor's argument says. Then each
+// statement waits up to 5 seconds for a database that a program without the lock keeps locked.
 //
 // Threads and processes: any number of threads may use an object at once, and take turns. The process needs
 // effective uid 0 during each operation. It calls VEMO_ACCESS_TOKEN::tokenType() once before it starts
@@ -57,7 +57,7 @@ public:
     enum class Answer {
         Granted, // the token allows the call, and one use of it is spent
         Refused, // the token does not allow it, has expired, or does not exist; nothing is spent
-        Failed,  // undecided, because the lock or the database failed; see grant
+        Failed,  // undecided: the lock or the database failed, or the token cannot be saved; see grant
     };
 
     // An operation waits for the lock as long as wait says, and then fails.
@@ -146,7 +146,7 @@ private:
     }
 
     // Whether a grant that the library reported as failed has spent a use after all. The count in the
-    // database tells, because nobody else has written since jToken was read. Lowers the count in jToken too.
+    // database shows it: nobody else has written since jToken was read. Lowers the count in jToken too.
     static bool isSpent(AccessTokenApi& api, std::string& strTid, Json::Value& jToken)
     {
         const Json::Int64 nBefore = jToken["count"].asInt64();

@@ -28,8 +28,8 @@ public:
     // takes it twice waits for ever. Throws std::system_error on failure; then the call must not be made.
     //
     // A missing file is created. Its directory must be one that only root may write. The file must not be
-    // the database, and must never be deleted. A file that the effective user does not own, or that anybody
-    // else may open, is refused with EPERM: others could hold the lock for ever.
+    // the database, and must not be deleted while a program may use it. A file that the effective user does
+    // not own, or that anybody else may open, is refused with EPERM: others could hold the lock for ever.
     explicit CallLock(const char* szFile = FILE_OF_ALL) : m_nFile(openFile(szFile))
     {
         while (0 != flock(m_nFile, LOCK_EX)) {

@@ -38,7 +38,7 @@ extern "C" void logSyslog(int nPriority, const char* szFormat, ...) __asm__("sys
 // the attribute, because ISO C++ has no "%m".)
 int checkFormat(const char* szFormat, ...) __attribute__((format(printf, 1, 2)));
 
-// The format of a line in the system log. When errno is set, it stands in front of the message.
+// The format of a line in the system log. When errno is set, it comes before the message.
 inline const char* syslogFormat(const char* szWithErrno, const char* szWithoutErrno)
 {
     return 0 != errno ? szWithErrno : szWithoutErrno;
@@ -58,7 +58,7 @@ inline const char* textOrNull(const char* szText)
 #define VEMO_ATOKEN_HERE __FILE_NAME__, __LINE__
 #define VEMO_ATOKEN_HERE_IN_LIST __FILE__, __LINE__
 
-// Standard output never shows errno in front of the message.
+// Standard output never shows errno before the message.
 #define VEMO_ATOKEN_WRITE_LINE(message, ...)                                                                 \
     do {                                                                                                     \
         const VEMO_ACCESS_TOKEN::ErrnoKeeper keeperOfLine;                                                   \
