@@ -16,7 +16,7 @@ namespace gate {
 
 class Batch {
 public:
-    // For use within a transaction. fOwner tells what is known of a user. Both must outlive the batch.
+    // For use within a transaction. fOwner returns what is known of a user. Both must outlive the batch.
     Batch(grant::Tokens& tokens, const std::function<Owners::Owner(uid_t)>& fOwner)
         : m_tokens(tokens), m_fOwner(fOwner)
     {

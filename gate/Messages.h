@@ -1,8 +1,8 @@
-// The messages between the two processes of the gate. One process reads HTTP and holds no secret. The other
+// The messages between the two processes of the gate. One reads HTTP and cannot read the database. The other
 // runs as root, holds the tokens, and reads nothing but these messages, of which it trusts no byte.
 //
 // Each message is one packet of a SOCK_SEQPACKET pair: a head of fixed size, and then, without gaps, the
-// texts whose sizes the head tells. Numbers have the byte order of this machine.
+// texts, whose sizes are in the head. Numbers have the byte order of this machine.
 
 #ifndef GATE_MESSAGES_H
 #define GATE_MESSAGES_H
@@ -43,7 +43,7 @@ struct Request {
 };
 
 enum class Outcome : uint8_t {
-    Granted,   // one use is spent; strUser, nUid and strFunction tell whose token it is
+    Granted,   // one use is spent; strUser and nUid are the token's owner, strFunction is its purpose
     Refused,   // nothing is spent
     Failed,    // the store, the lock or the user database failed; nothing is spent
     Late,      // it did not begin before nDue; nothing is spent

@@ -12,7 +12,7 @@
 namespace gate {
 
 // The connection is opened when it is needed, and again after a failure, or if another file has replaced the
-// database. All members but rollBack throw grant::Error.
+// database. begin, purge, commit and canRead throw grant::Error or std::bad_alloc.
 class Store {
 public:
     // Begins a transaction in which nobody else writes. Returns false if others hold the database now.

@@ -37,7 +37,7 @@ public:
     Connection& operator=(const Connection&) = delete;
 
     const bool blStatus; // for /health and /metrics, not for calls
-    uid_t uid = 0;       // of the client; -1 if the socket does not tell
+    uid_t uid = 0;       // of the client; -1 if the socket does not show it
     uint64_t nCall = 0;  // the number of the call it waits for
     Manner manner;       // for the next response
     int64_t nSince;      // when the state began, or the head that is being read

@@ -20,7 +20,7 @@ struct Manner {
 // The response to a call that was granted.
 std::string grantedResponse(const Reply& answer, const Manner& manner);
 
-// A response whose body, a line, depends only on the status: a refusal tells a client nothing else.
+// A response whose body is a line that depends only on the status: a refusal shows a client nothing else.
 std::string plainResponse(int nStatus, const Manner& manner);
 
 // A response for /health or /metrics: 200 or 503.
