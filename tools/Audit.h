@@ -33,7 +33,7 @@ bool hasNotes();
 enum class Certainty { Certain, Perhaps };
 void made(Certainty certainty = Certainty::Certain);
 
-// Writes the line of the change that was made, and forgets all notes. Call it without any lock or open
+// Writes the line about the change that was made, and forgets all notes. Call it without any lock or open
 // transaction: it waits until the system log takes the line.
 void tell();
 

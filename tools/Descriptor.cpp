@@ -14,7 +14,7 @@ namespace {
 const int DIRECTORY_FLAGS = O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 const mode_t OTHERS_WRITE_MODE = 0022;
 
-// Whether an open file has a name and no other. named is the status by that name. One call must tell both:
+// Whether an open file has a name and no other. named is the status by that name. One call must return both:
 // those who gave the file the name could remove it between two calls, and the link count would be 1 again.
 bool hasThisNameOnly(const tool::Descriptor& file, const struct stat& named)
 {

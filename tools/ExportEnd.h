@@ -1,4 +1,4 @@
-// The last line of an export. It tells an import that the export is complete:
+// The last line of an export. It shows an import that the export is complete:
 //   {"end":{"sha256":"...","tokens":3}}
 // It holds the SHA-256 of all bytes before it, and the number of tokens. No token looks like it.
 

@@ -19,7 +19,7 @@ enum ExitStatus {
 
 class Failure : public std::runtime_error {
 public:
-    // The hint tells the user what to do or what the failure means. It ends the sentence.
+    // The hint says what to do or what the failure means. It ends the sentence.
     Failure(ExitStatus status, const std::string& strFact, const std::string& strHint = "")
         : std::runtime_error(strFact + (strHint.empty() ? "" : "; " + strHint)),
           m_status(status),

@@ -145,7 +145,7 @@ void NewFile::requirePlace() const
     }
 }
 
-// Makes a file with the temporary name. Its lock tells other exports that it is being written. Just before it
+// Makes a file with the temporary name. Its lock shows other exports that it is being written. Just before it
 // is locked, another export can remove it as left behind; then this fails.
 Descriptor NewFile::makeNamed()
 {

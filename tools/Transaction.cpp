@@ -93,7 +93,7 @@ void opens(sqlite3_context* pContext, int, sqlite3_value** rgValue)
             VEMO_ACCESS_TOKEN::checkPermission(jToken, strTexts[1].c_str(), strTexts[2].c_str());
         sqlite3_result_int(pContext, 0 < nOpens);
     } catch (const Json::LogicError&) {
-        sqlite3_result_int(pContext, 0); // the list of methods holds something that is not a text
+        sqlite3_result_int(pContext, 0); // the list of methods holds an array or an object
     } catch (const std::bad_alloc&) {
         sqlite3_result_error_nomem(pContext);
     }

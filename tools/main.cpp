@@ -1,4 +1,4 @@
-// vemo-access-token: what the administrator of a machine does with its access tokens.
+// vemo-access-token, the tool by which an administrator manages the access tokens of a machine.
 
 #include <json/value.h>
 #include <unistd.h>
