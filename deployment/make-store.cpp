@@ -1,6 +1,5 @@
-// Makes the token database and its table if they are missing, as the first call of a program does. The
-// package of the library runs it before any program: if several programs made their first calls at once, some
-// could fail and be lost.
+// Makes the token database and its table if they are missing. The package of the library runs it before any
+// program makes its first call: if several made theirs at once, some could fail and be lost.
 
 #include <AccessTokenUtil.h>
 #include <internal/AccessTokenDbApi.h>

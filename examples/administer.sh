@@ -55,14 +55,14 @@ Who hands the id of a token to whom:
      create  --- the id --->        keeps it      --- the id ---->  grant
                                                    with each call
    The id is the secret of a token: whoever knows it is let in. So it is only sent where nobody else can
-   read it, and it is shown in full only once, when it is made.
+   read it, and lists show only its first characters.
 
 END
 
 step "The private directory, the file and the table are made before the first program needs them."
 call 0 init
 
-step "A token for root: two uses, for an hour, of two methods of one API. The id is printed once."
+step "A token for root: two uses, for an hour, of two methods of one API. Its id is printed."
 create share --user root --function demo-share --ttl 1h --uses 2 --allow Demo.File:get,list
 # shellcheck disable=SC2154 # create has set it
 echo "   (${share:0:8}..., ${#share} characters)"
