@@ -122,7 +122,7 @@ Contents readLines(std::istream& stream, const Take& take)
     for (size_t nLine = 1; std::getline(stream, strText); ++nLine) {
         try {
             if (blEnded) {
-                throw tool::BadValue("stands behind the end of the export");
+                throw tool::BadValue("comes after the end of the export");
             }
             if (strText.find('\0') != std::string::npos) {
                 throw tool::BadValue("holds a NUL byte");

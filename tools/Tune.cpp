@@ -166,16 +166,16 @@ namespace tool {
 void addTune(Commands& commands)
 {
     auto pOptions = std::make_shared<Options>();
-    Command& command = commands.add("tune", "add indexes for a large store; says before and after, measured",
+    Command& command = commands.add("tune", "add indexes for a large store, and print what that changes",
                                     [pOptions] { return tune(*pOptions); });
     command.flag("--deadline-only", pOptions->blDeadlineOnly,
-                 "no index but that on the deadline, for programs that never delete by session or purpose");
+                 "only the index on the deadline, for programs that never delete by session or purpose");
     command.flag("--wal", pOptions->blWal,
                  "the write-ahead journal too, for programs that hold their connection");
     command.flag("--undo", pOptions->blUndo, "remove the indexes and the write-ahead journal");
     command.exclude("--undo", "--wal");
     command.exclude("--undo", "--deadline-only");
-    command.flag("--dry-run", pOptions->blDryRun, "only measure, and tell what would be run");
+    command.flag("--dry-run", pOptions->blDryRun, "only measure, and print what would be run");
     command.flag("--no-header", pOptions->blNoHeader, "no line of titles above the table");
     command.example("--dry-run");
     command.example("--wal");

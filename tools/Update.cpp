@@ -238,8 +238,8 @@ void addUpdate(Commands& commands)
               "expiry: 2026-12-31, \"2026-12-31 23:59\", 2026-12-31T23:59:59Z or @SECONDS");
     addTtl(command, pOptions->nTtl);
     command.exclude("--ttl", "--deadline");
-    addAllowances(command, "--allow", pOptions->allow, "what it opens, instead of what it did");
-    addAllowances(command, "--add-allow", pOptions->addAllow, "what it opens besides");
+    addAllowances(command, "--allow", pOptions->allow, "all that it opens from now on");
+    addAllowances(command, "--add-allow", pOptions->addAllow, "what it opens in addition");
     addAllowances(command, "--remove-allow", pOptions->removeAllow, "what it no longer opens");
     command.exclude("--add-allow", "--allow");
     command.exclude("--remove-allow", "--allow");

@@ -422,7 +422,7 @@ TABLE
             done
         done
     done <<'TABLE'
-4 stands behind the end of the export~cat - <(echo)~cat - <(written C)~cat - <(printf '{')~cat - "$DIR/whole"~sed 3p
+4 comes after the end of the export~cat - <(echo)~cat - <(written C)~cat - <(printf '{')~cat - "$DIR/whole"~sed 3p
 3 has no "tid"~sed '3s/}}/,"x":1}}/'~sed '3s/}}/},"x":1}/'~sed '3s/2}/-2}/'~sed '3s/2}/2.5}/'~sed '3s/:"[^"]*"/:1/'
 3 has no "tid"~sed '3s/:.*/:[1,2]}/'
 2 has no "tid"~sed '2s/"tid":"[^"]*",//'

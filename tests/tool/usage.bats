@@ -90,9 +90,9 @@ Options:
                               2026-12-31T23:59:59Z or @SECONDS
   --ttl DURATION              lifetime from now: 45s, 90m, 8h, 2d12h, 1w, or
                               seconds
-  --allow API[:METHOD,...]    what it opens, instead of what it did (repeatable)
+  --allow API[:METHOD,...]    all that it opens from now on (repeatable)
   --add-allow API[:METHOD,...]
-                              what it opens besides (repeatable)
+                              what it opens in addition (repeatable)
   --remove-allow API[:METHOD,...]
                               what it no longer opens (repeatable)
   --bind-sid SID              bind it to this login session; "" unbinds it
