@@ -1,47 +1,25 @@
-// The library under the fuzzer, which may do nothing to the machine.
+// The library under the fuzzer. It works on a store of the tests (tests/faults/TokenStore.h) in their world
+// (tests/model/World.h).
 
 #ifndef FUZZ_LIBRARY_H
 #define FUZZ_LIBRARY_H
 
 #include <json/value.h>
+#include <sqlite3.h>
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <string_view>
 
 #include "AccessTokenDefine.h"
 #include "Require.h"
+#include "TokenStore.h"
 #include "internal/AccessTokenDbApi.h"
 #include "internal/JsonText.h"
 
 namespace fuzz {
-
-// While one lives, the process believes that it is root's and that the private directory exists; the database
-// is in memory. Two files can be read, EXTRA_FILE and TOKENS_FILE; new files vanish. The clock, the users and
-// the log are those of tests/model/World.h.
-class Confinement {
-public:
-    Confinement();
-    ~Confinement();
-    Confinement(const Confinement&) = delete;
-    Confinement& operator=(const Confinement&) = delete;
-};
-
-const char* const EXTRA_FILE = "extra.json";    // a JSON object
-const char* const TOKENS_FILE = "tokens.jsonl"; // a token as a line of JSON
-void setFileTexts(const std::string& strExtra, const std::string& strTokens);
-
-// Opens the database in memory that the code under test gets from sqlite3_open. It lasts as long as any
-// connection.
-sqlite3* openStore();
-
-// Gives this connection to the next caller of sqlite3_open instead.
-void offer(sqlite3* pDb);
-
-// What the tool has written to standard output and to standard error, while confined, since the last call.
-std::string takeResult();
-std::string takeComplaints();
 
 inline std::string_view viewOf(const uint8_t* pData, size_t cbData)
 {
@@ -70,15 +48,20 @@ inline std::string text(const Json::Value& jValue)
     return VEMO_ACCESS_TOKEN::toString(jValue);
 }
 
-// An id of 127 characters with this beginning.
-inline std::string tid(const std::string& strStart)
+typedef std::unique_ptr<sqlite3, decltype(&sqlite3_close)> Database;
+
+// The database of a store, with the limits that the library's own connections have.
+inline Database open(const TokenStore& store)
 {
-    return strStart + std::string(VEMO_ATOKEN_LENGTH_MIN - strStart.size(), 'f');
+    sqlite3* pDb = nullptr;
+    FUZZ_REQUIRE(SQLITE_OK == sqlite3_open(store.path().c_str(), &pDb));
+    return Database(pDb, sqlite3_close);
 }
 
-// All tokens of a store.
-inline Json::Value tokens(AccessTokenDbApi& db)
+// All tokens of the store.
+inline Json::Value tokens()
 {
+    AccessTokenDbApi db;
     Json::Value jAll(Json::objectValue);
     Json::Value jTokens(Json::arrayValue);
     FUZZ_REQUIRE(0 == db.tokenGet(jAll, jTokens));

@@ -126,13 +126,13 @@ std::optional<Reading> readPlainly(const tool::Command& command, const Texts& st
 }
 
 // The exit status.
-int run(const Texts& strArguments, const std::string& strInput)
+int run(fuzz::ToolStore& store, const Texts& strArguments, const std::string& strInput)
 {
     // Making all commands would take most of the time.
     const std::string strCommand = commandOf(strArguments);
     tool::Commands commands;
     entryOf(strCommand).add(commands);
-    const int nStatus = fuzz::runTool(commands, strArguments, strInput);
+    const int nStatus = store.run(commands, strArguments, strInput);
     if (!strCommand.empty()) { // each option and argument gets exactly its texts, or the command fails
         const auto reading = readPlainly(commands.all().front(), strArguments);
         FUZZ_REQUIRE(reading ? *reading == readingOf(commands.all().front())
@@ -141,19 +141,13 @@ int run(const Texts& strArguments, const std::string& strInput)
     return nStatus;
 }
 
-void prepare()
-{
-    tool::Commands commands;
-    for (const tool::CommandEntry& entry : tool::COMMANDS) {
-        entry.add(commands);
-        FUZZ_REQUIRE(commands.all().back().name() == entry.szName);
-    }
-    fuzz::setFileTexts(
-        R"({"a":[1]})",
-        R"({"tid":")" + fuzz::tid("FromAFile") +
-            R"(","bind_sid":"","uid":0,"deadline":4102444800,"count":1,"create_time":1,"function":"f",)"
-            R"("webapi_allow":{},"extra":{}})");
-}
+// The files that arguments can name.
+const Files FILES = {
+    {"extra.json", R"({"a":[1]})"},
+    {"tokens.jsonl",
+     R"({"tid":")" + fuzz::tid("FromAFile") +
+         R"(","bind_sid":"","uid":0,"deadline":4102444800,"count":1,"create_time":1,"function":"f",)"
+         R"("webapi_allow":{},"extra":{}})"}};
 
 bool has(const Texts& strArguments, const std::string& strArgument)
 {
@@ -221,18 +215,18 @@ void checkComplaint(const Texts& strArguments, int nStatus, const std::string& s
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
 {
-    const fuzz::Confinement confinement;
-    static fuzz::ToolStore store;
-    [[maybe_unused]] static const bool blPrepared = (prepare(), true);
+    static fuzz::ToolStore store(FILES);
     const std::string_view strInput = fuzz::viewOf(pData, cbData);
     const size_t cbLines = std::min(strInput.find('\0'), strInput.size());
-    const Texts strArguments = argumentsOf(strInput.substr(0, cbLines));
+    const std::string_view strLines = strInput.substr(0, cbLines);
+    if (std::string_view::npos != strLines.find('/')) { // no path may lead out of the directory
+        return -1;
+    }
+    const Texts strArguments = argumentsOf(strLines);
     const int nStatus =
-        run(strArguments, std::string(strInput.substr(std::min(cbLines + 1, strInput.size()))));
-    fuzz::takeResult();
-    const std::string strComplaints = fuzz::takeComplaints();
+        run(store, strArguments, std::string(strInput.substr(std::min(cbLines + 1, strInput.size()))));
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE <= nStatus && nStatus <= tool::EXIT_STATUS_FINDINGS);
-    checkComplaint(strArguments, nStatus, strComplaints);
+    checkComplaint(strArguments, nStatus, store.takeComplaints());
     if (store.isChanged()) {
         FUZZ_REQUIRE(mayChange(strArguments, nStatus));
         // Import accepts everything that the store can hold; the other commands make only what programs can.
@@ -240,7 +234,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
             FUZZ_REQUIRE(commandOf(strArguments) == "import" ||
                          0 == VEMO_ACCESS_TOKEN::checkJsonType(jToken));
         }
-        store.restore();
     }
+    store.restore();
     return 0;
 }

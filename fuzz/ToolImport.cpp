@@ -7,31 +7,35 @@
 
 namespace {
 
-int run(void (&addCommand)(tool::Commands&), const fuzz::Texts& strArguments,
-        const std::string& strInput = "")
+fuzz::ToolStore& store()
+{
+    static fuzz::ToolStore theStore({});
+    return theStore;
+}
+
+int run(void (&addCommand)(tool::Commands&), const fuzz::Texts& strArguments, std::string_view strInput = "")
 {
     tool::Commands commands;
     addCommand(commands);
-    const int nStatus = fuzz::runTool(commands, strArguments, strInput);
-    fuzz::takeComplaints();
+    const int nStatus = store().run(commands, strArguments, std::string(strInput));
+    store().takeComplaints();
     return nStatus;
 }
 
 int importText(std::string_view strText)
 {
-    return run(tool::addImport, {"vemo-access-token", "import", "-"}, std::string(strText));
+    return run(tool::addImport, {"vemo-access-token", "import", "-"}, strText);
 }
 
 int importPartially(std::string_view strText)
 {
-    return run(tool::addImport, {"vemo-access-token", "import", "--partial", "-"}, std::string(strText));
+    return run(tool::addImport, {"vemo-access-token", "import", "--partial", "-"}, strText);
 }
 
-std::string exportText()
+std::string exportText(const std::string& strFile)
 {
-    fuzz::takeResult();
-    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == run(tool::addExport, {"vemo-access-token", "export", "-"}));
-    return fuzz::takeResult();
+    FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == run(tool::addExport, {"vemo-access-token", "export", strFile}));
+    return store().files()[strFile];
 }
 
 bool isObject(const std::string& strLine)
@@ -63,37 +67,35 @@ Json::Value tokensOf(std::string_view strText)
     return jTokens;
 }
 
-void checkImported(fuzz::ToolStore& store, std::string_view strText)
+void checkImported(std::string_view strText)
 {
-    store.clear();
+    store().clear();
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == importPartially(strText));
-    const Json::Value jStored = store.tokens();
+    const Json::Value jStored = store().tokens();
     FUZZ_REQUIRE(fuzz::text(jStored) == fuzz::text(tokensOf(strText)));
-    const std::string strExported = exportText();
-    store.clear();
+    const std::string strExported = exportText("first");
+    store().clear();
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == importText(strExported));
-    FUZZ_REQUIRE(fuzz::text(store.tokens()) == fuzz::text(jStored));
-    FUZZ_REQUIRE(strExported == exportText());
-    store.clear();
+    FUZZ_REQUIRE(fuzz::text(store().tokens()) == fuzz::text(jStored));
+    FUZZ_REQUIRE(strExported == exportText("second"));
+    store().clear();
     const bool blWhole = tool::EXIT_STATUS_DONE == importText(strText);
-    FUZZ_REQUIRE(fuzz::text(store.tokens()) == (blWhole ? fuzz::text(jStored) : "[]"));
+    FUZZ_REQUIRE(fuzz::text(store().tokens()) == (blWhole ? fuzz::text(jStored) : "[]"));
 }
 
 } // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
 {
-    const fuzz::Confinement confinement;
-    static fuzz::ToolStore store;
     const std::string_view strText = fuzz::viewOf(pData, cbData);
     const int nStatus = importPartially(strText);
     FUZZ_REQUIRE(tool::EXIT_STATUS_DONE == nStatus || tool::EXIT_STATUS_USAGE == nStatus);
     if (tool::EXIT_STATUS_USAGE == nStatus) {
         FUZZ_REQUIRE(tool::EXIT_STATUS_USAGE == importText(strText));
-        FUZZ_REQUIRE(!store.isChanged());
+        FUZZ_REQUIRE(!store().isChanged());
         return 0;
     }
-    checkImported(store, strText);
-    store.restore();
+    checkImported(strText);
+    store().restore();
     return 0;
 }

@@ -1,10 +1,14 @@
-// The tool under the fuzzer, and the store that it uses, with the same tokens before each run.
+// The tool under the fuzzer, the store that it uses and the directory that it runs in. Each run finds them
+// the same.
 
 #ifndef FUZZ_TOOL_STORE_H
 #define FUZZ_TOOL_STORE_H
 
-#include <sqlite3.h>
+#include <dirent.h>
 
+#include <cstdio>
+#include <cstring>
+#include <filesystem>
 #include <iostream>
 #include <sstream>
 #include <string>
@@ -14,32 +18,12 @@
 #include "Commands.h"
 #include "Console.h"
 #include "Failure.h"
+#include "Interpose.h"
 #include "Library.h"
 
 namespace fuzz {
 
 typedef std::vector<std::string> Texts;
-
-// Runs the tool with these arguments; the first is the name of the program. Returns its exit status.
-// Exceptions other than tool::Failure pass through, and end the fuzzing.
-inline int runTool(tool::Commands& commands, Texts strArguments, const std::string& strInput)
-{
-    std::vector<char*> rgArguments;
-    for (std::string& strArgument : strArguments) {
-        rgArguments.push_back(strArgument.data());
-    }
-    std::stringbuf input(strInput);
-    std::streambuf* const pBefore = std::cin.rdbuf(&input);
-    int nStatus = tool::EXIT_STATUS_DONE;
-    try {
-        nStatus = commands.run(static_cast<int>(rgArguments.size()), rgArguments.data());
-    } catch (const tool::Failure& failure) {
-        tool::complain(failure.what());
-        nStatus = failure.status();
-    }
-    std::cin.rdbuf(pBefore);
-    return nStatus;
-}
 
 // The beginnings of ids, and fields that differ from their defaults.
 const char* const TOKENS[] = {
@@ -50,80 +34,103 @@ const char* const TOKENS[] = {
     R"("webapi_allow":{"A":{"method":[[]]},"B":[]}})",
     R"({"tid":"ExpiredIt","bind_sid":"sid","uid":77,"deadline":1,"count":0,"function":"old"})"};
 
-inline void copy(sqlite3* pFrom, sqlite3* pTo)
+// An id of 127 characters with this beginning.
+inline std::string tid(const std::string& strStart)
 {
-    sqlite3_backup* pBackup = sqlite3_backup_init(pTo, "main", pFrom, "main");
-    FUZZ_REQUIRE(pBackup && SQLITE_DONE == sqlite3_backup_step(pBackup, -1));
-    FUZZ_REQUIRE(SQLITE_OK == sqlite3_backup_finish(pBackup));
-}
-
-inline int isOk(void*, int, char** rgValue, char**)
-{
-    return 0 == std::string("ok").compare(rgValue[0]) ? 0 : 1;
+    return strStart + std::string(VEMO_ATOKEN_LENGTH_MIN - strStart.size(), 'f');
 }
 
 class ToolStore {
 public:
-    ToolStore()
+    // Of the files in the directory.
+    explicit ToolStore(const Files& inputs) : m_inputs(inputs)
     {
-        run("PRAGMA page_size = 1024");
-        FUZZ_REQUIRE(0 == m_db.createTable());
+        FUZZ_REQUIRE(freopen("/dev/null", "r", stdin) && freopen("/dev/null", "w", stdout));
+        stderr = m_pComplaints;
+        AccessTokenDbApi db;
         for (const char* szToken : TOKENS) {
             Json::Value jToken = json(szToken);
             jToken["tid"] = tid(jToken["tid"].asString());
             jToken["create_time"] = 1;
             VEMO_ACCESS_TOKEN::fillDefaultValue(jToken, false);
-            FUZZ_REQUIRE(0 == m_db.tokenCreate(jToken));
+            FUZZ_REQUIRE(0 == db.tokenCreate(jToken));
         }
-        FUZZ_REQUIRE(SQLITE_OK == sqlite3_open_v2(":memory:", &m_pFirst, SQLITE_OPEN_READWRITE, nullptr));
-        copy(m_pDb, m_pFirst);
-        m_strImage = image();
+        m_first = m_store.files();
+        restore();
     }
     ToolStore(const ToolStore&) = delete;
     ToolStore& operator=(const ToolStore&) = delete;
 
-    // Whether the database differs from its first state.
-    bool isChanged() const { return image() != m_strImage; }
-
-    // Its tokens. The database must be sound.
-    Json::Value tokens()
+    // Runs the tool with these arguments; the first is the name of the program. Returns its exit status.
+    // Exceptions other than tool::Failure pass through, and end the fuzzing.
+    int run(tool::Commands& commands, Texts strArguments, const std::string& strInput)
     {
-        FUZZ_REQUIRE(SQLITE_OK == sqlite3_exec(m_pDb, "PRAGMA integrity_check", isOk, nullptr, nullptr));
-        return fuzz::tokens(m_db);
+        std::vector<char*> rgArguments;
+        for (std::string& strArgument : strArguments) {
+            rgArguments.push_back(strArgument.data());
+        }
+        const std::filesystem::path before = std::filesystem::current_path();
+        std::filesystem::current_path(m_directory.directory());
+        std::stringbuf input(strInput);
+        std::streambuf* const pBefore = std::cin.rdbuf(&input);
+        int nStatus = tool::EXIT_STATUS_DONE;
+        try {
+            nStatus = commands.run(static_cast<int>(rgArguments.size()), rgArguments.data());
+        } catch (const tool::Failure& failure) {
+            tool::complain(failure.what());
+            nStatus = failure.status();
+        }
+        std::cin.rdbuf(pBefore);
+        std::filesystem::current_path(before);
+        return nStatus;
     }
 
-    // Restores its first state.
-    void restore()
+    // What the tool has written to standard error since the last call.
+    std::string takeComplaints()
     {
-        copy(m_pFirst, m_pDb);
-        m_strImage = image();
+        fflush(m_pComplaints);
+        const std::string strTaken(m_szComplaints, m_cbComplaints);
+        rewind(m_pComplaints);
+        return strTaken;
+    }
+
+    Files files() const { return m_directory.files(); }
+
+    // Whether the database differs from its first state.
+    bool isChanged() const { return m_store.files() != m_first; }
+
+    // Its tokens. The database must be sound.
+    Json::Value tokens() const
+    {
+        FUZZ_REQUIRE("ok\n" == m_store.rows("PRAGMA integrity_check"));
+        return fuzz::tokens();
     }
 
     // Deletes all tokens.
-    void clear() { run("DELETE FROM token"); }
+    void clear() const { m_store.run("DELETE FROM token"); }
+
+    void restore() const
+    {
+        m_store.setFiles(m_first);
+        m_directory.setFiles(m_inputs);
+    }
 
 private:
-    std::string image() const
-    {
-        sqlite3_int64 cbImage = 0;
-        unsigned char* pImage = sqlite3_serialize(m_pDb, "main", &cbImage, 0);
-        FUZZ_REQUIRE(pImage);
-        const std::string strImage(reinterpret_cast<const char*>(pImage), static_cast<size_t>(cbImage));
-        sqlite3_free(pImage);
-        return strImage;
-    }
-
-    void run(const char* szSql)
-    {
-        FUZZ_REQUIRE(SQLITE_OK == sqlite3_exec(m_pDb, szSql, nullptr, nullptr, nullptr));
-    }
-
-    sqlite3* const m_pDb = openStore(); // it keeps the database alive
-    sqlite3* m_pFirst = nullptr;        // a copy
-    std::string m_strImage;
-    AccessTokenDbApi m_db;
+    const TokenStore m_directory;
+    const TokenStore m_store; // which the tool uses, since it is the newer one
+    const Files m_inputs;
+    Files m_first;
+    char* m_szComplaints = nullptr;
+    size_t m_cbComplaints = 0;
+    FILE* m_pComplaints = open_memstream(&m_szComplaints, &m_cbComplaints);
 };
 
 } // namespace fuzz
+
+// To look at all processes of the machine takes long, and depends on what they do.
+extern "C" INTERPOSED DIR* opendir(const char* szPath)
+{
+    return 0 == strcmp(szPath, "/proc") || 0 == strcmp(szPath, "/proc/") ? nullptr : NEXT(opendir)(szPath);
+}
 
 #endif
