@@ -142,37 +142,28 @@ echo 'extern "C" void syslog(int, const char*, ...) {}' >log.cc
 
 # The headers that most programs begin with, parsed once.
 cp -r "$source/include" headers
-compile=("$compiler" -std=c++17 -Wall -Wextra -Werror -Iheaders -isystem "$json")
+echo "-std=c++17 -Wall -Wextra -Werror -Iheaders -isystem '$json'" >flags
+echo "-Wl,--no-as-needed '$build/examples/libredirect.so' '-Wl,-rpath,$build/examples'
+    '-L$build/src' '-Wl,-rpath,$build/src' -lvemoaccesstoken -ljsoncpp" >libraries
 for header in vemo-access-token.h AccessTokenUtil.h; do
-    "${compile[@]}" -x c++-header "headers/$header" -o "headers/$header.gch"
+    "$compiler" @flags -x c++-header "headers/$header" -o "headers/$header.gch"
 done
 
-# try PROGRAM.cpp: builds it, and runs it if the page says what it prints
+# shellcheck disable=SC2317 # xargs calls it
+# try PROGRAM: builds it, and runs it if the page says what it prints
 try()
 {
-    local program=${1%.cpp}
-    "${compile[@]}" "$1" log.o -o "$program" \
-        -Wl,--no-as-needed "$build/examples/libredirect.so" "-Wl,-rpath,$build/examples" \
-        "-L$build/src" "-Wl,-rpath,$build/src" -lvemoaccesstoken -ljsoncpp || return
-    [ -e "$program.out" ] || return 0
-    mkdir "$program.database"
-    VEMO_REDIRECT_DIR=$dir/$program.database "./$program" >"$program.printed" || return
-    diff "$program.out" "$program.printed"
+    "$compiler" @flags "$1.cpp" log.o -o "$1" @libraries || return
+    [ -e "$1.out" ] || return 0
+    mkdir "$1.database"
+    VEMO_REDIRECT_DIR=$PWD/$1.database "./$1" >"$1.printed" || return
+    diff "$1.out" "$1.printed"
 }
 
 echo "Examples that do not compile, or print something else (>) than the page says:"
-for program in "${programs[@]}"; do
-    while [ "$(jobs -r | wc -l)" -ge "$(nproc)" ]; do
-        wait -n
-    done
-    { try "$program" >"$program.log" 2>&1 || touch "$program.failed"; } &
-done
-wait
-for failed in *.failed; do
-    [ -e "$failed" ] || continue
-    echo "${failed%.failed}:"
-    cat "${failed%.failed}.log"
-    status=1
-done
+export -f try
+export compiler
+printf '%s\n' "${programs[@]%.cpp}" | xargs -P "$(nproc)" -I '{}' bash -c '
+    try "{}" >"{}.log" 2>&1 || { echo "{}:"; cat "{}.log"; exit 1; }' || status=1
 echo "${#programs[@]} programs, of which $(find . -name '*.printed' | wc -l) were run"
 exit $status
