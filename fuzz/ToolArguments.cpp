@@ -25,23 +25,14 @@ Texts argumentsOf(std::string_view strLines)
     return strArguments;
 }
 
-// Of a name there is a command of, or of "generate".
-const tool::CommandEntry& entryOf(const std::string& strName)
-{
-    const tool::CommandEntry* pFound = nullptr;
-    for (const tool::CommandEntry& entry : tool::COMMANDS) {
-        if (entry.szName == strName || (!pFound && entry.szName == std::string("generate"))) {
-            pFound = &entry;
-        }
-    }
-    return *pFound;
-}
-
 // The command, if the arguments begin with one; or else "".
 std::string commandOf(const Texts& strArguments)
 {
-    return strArguments.size() > 1 && entryOf(strArguments[1]).szName == strArguments[1] ? strArguments[1]
-                                                                                         : "";
+    const bool blCommand =
+        strArguments.size() > 1 &&
+        std::any_of(tool::COMMANDS.begin(), tool::COMMANDS.end(),
+                    [&](const tool::CommandEntry& entry) { return entry.szName == strArguments[1]; });
+    return blCommand ? strArguments[1] : "";
 }
 
 // The texts given to each option and argument, by its name; "" for a flag.
@@ -128,10 +119,14 @@ std::optional<Reading> readPlainly(const tool::Command& command, const Texts& st
 // The exit status.
 int run(fuzz::ToolStore& store, const Texts& strArguments, const std::string& strInput)
 {
-    // Making all commands would take most of the time.
+    // To make all commands would take long.
     const std::string strCommand = commandOf(strArguments);
     tool::Commands commands;
-    entryOf(strCommand).add(commands);
+    for (const tool::CommandEntry& entry : tool::COMMANDS) {
+        if (entry.szName == (strCommand.empty() ? "generate" : strCommand)) {
+            entry.add(commands);
+        }
+    }
     const int nStatus = store.run(commands, strArguments, strInput);
     if (!strCommand.empty()) { // each option and argument gets exactly its texts, or the command fails
         const auto reading = readPlainly(commands.all().front(), strArguments);
