@@ -89,27 +89,12 @@ def place(cursor):
     return (cursor.extent.start.offset, cursor.extent.end.offset)
 
 
-class Mutants:
-    """The names of all mutants."""
-
-    def __init__(self):
-        self.names = []
-        self.same = collections.Counter()
-
-    def add(self, name):
-        """Returns the number of the new mutant."""
-        self.same[name] += 1
-        same = self.same[name]
-        self.names.append(f"{name} | #{same}" if same > 1 else name)
-        return len(self.names) - 1
-
-
 class Source:
     def __init__(self, path, project, mutants):
         self.path = path
         self.name = str(path.relative_to(project))
         self.text = path.read_text(encoding="ascii")
-        self.mutants = mutants
+        self.mutants = mutants  # the names, of all sources; a mutant's number is its place there
         self.edits = []  # (start, end, text before, text after), outer ones first
         self.done = set()  # the conditions and the macros, by their place
         self.unused = None  # the place of the expression whose value is
@@ -156,9 +141,9 @@ class Source:
         text = one_line(self.slice(cursor))
         parts = [text] + [part for part in (self.context, self.branch) if part not in ("", text)]
         parts = [part if len(part) <= 80 else part[:77] + "..." for part in parts]
-        numbers = [self.mutants.add(f"{self.name} {self.where}: {change}: " + " | ".join(parts))
-                   for change in changes]
-        return numbers[0]
+        number = len(self.mutants)
+        self.mutants += [f"{self.name} {self.where}: {change}: " + " | ".join(parts) for change in changes]
+        return number
 
     def wrap(self, cursor, before, after):
         self.edits.append((*place(cursor), before, after))
@@ -425,14 +410,18 @@ def main():
     arguments = ["-xc++", "-std=c++17", f"-I{project}", f"-I{project}/include", f"-I{project}/platform",
                  '-DVEMO_ATOKEN_VERSION=""', *libraries.stdout.decode().split()]
     view = ["-include", f"{project}/tests/mutation/view.h"]
-    mutants = Mutants()
+    mutants = []
     for pattern in SOURCES:
         for path in sorted(project.glob(pattern)):
             source = Source(path, project, mutants)
             source.parse(arguments + (view if pattern.startswith("src") else []))
             source.write(output / source.name)
-    (output / "mutants.txt").write_text("\n".join(mutants.names) + "\n", encoding="ascii")
-    print(f"{len(mutants.names)} mutants")
+    same = collections.Counter()
+    with open(output / "mutants.txt", "w", encoding="ascii") as names:
+        for name in mutants:
+            same[name] += 1
+            names.write(f"{name} | #{same[name]}\n" if same[name] > 1 else f"{name}\n")
+    print(f"{len(mutants)} mutants")
 
 
 main()

@@ -15,16 +15,12 @@ namespace VEMO_ACCESS_TOKEN {
 const char* textOrNull(const char* szText);
 }
 
-template <typename... Arguments>
-void VEMO_ATOKEN_LOG(Arguments&&...);
-template <typename... Arguments>
-void VEMO_ATOKEN_DEBUG(Arguments&&...);
-template <typename... Arguments>
-void VEMO_ATOKEN_FAIL(Arguments&&...);
-template <typename... Arguments>
-void VEMO_ATOKEN_FAILED(Arguments&&...);
-template <typename... Arguments>
-void VEMO_ATOKEN_WRITE_LINE(Arguments&&...);
+struct Logging {
+    template <typename... Arguments>
+    void operator()(Arguments&&...) const;
+};
+extern const Logging VEMO_ATOKEN_LOG, VEMO_ATOKEN_DEBUG, VEMO_ATOKEN_FAIL, VEMO_ATOKEN_FAILED,
+    VEMO_ATOKEN_WRITE_LINE;
 void VEMO_ATOKEN_CHECK_RETURN(bool blCondition, int nResult);
 void VEMO_ATOKEN_CHECK_RETURN_AS(bool blCondition, const char* szCondition, int nResult);
 void VEMO_ATOKEN_CHECK_GOTO(bool blCondition, int nLabel);
