@@ -72,9 +72,9 @@ public:
         return ours.jCall;
     }
 
-    void requireSameTable() const { requireNone(Table(m_pDb.get()).differenceFrom(m_model.store.rows())); }
+    void requireSameTable() const { requireNone(Table(m_pDb.get()).differenceFrom(m_model.rows())); }
 
-    AccessTokenDbApi& store() { return m_library.store; }
+    AccessTokenDbApi& store() { return m_library; }
 
 private:
     const TokenStore& m_files = emptyStore();

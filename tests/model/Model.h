@@ -51,7 +51,8 @@ int removeIf(std::vector<Row>& rows, Predicate predicate)
     return nRemoved;
 }
 
-struct ModelRules {
+class Model {
+public:
     // Fields that are there are of their type.
     int checkJsonType(Json::Value& jToken)
     {
@@ -97,13 +98,10 @@ struct ModelRules {
         return std::any_of(jEntry["method"].begin(), jEntry["method"].end(),
                            [&](const Json::Value& jMethod) { return jMethod.asString() == szWebapiMethod; });
     }
-};
 
-class ModelStore {
-public:
     int tokenSave(Json::Value& jRecord, bool blCreate)
     {
-        if (0 > ModelRules().fillDefaultValue(jRecord, true)) {
+        if (0 > fillDefaultValue(jRecord, true)) {
             return -1;
         }
         const Row row = rowOf(jRecord);
@@ -175,14 +173,6 @@ public:
     // In the order of the table: sorted by when they were last written.
     const std::vector<Row>& rows() const { return m_rows; }
 
-private:
-    std::vector<Row> m_rows;
-};
-
-class ModelService {
-public:
-    explicit ModelService(ModelStore& store) : m_store(store) {}
-
     // Tells the model the id that the library has generated; it must look like one.
     void setGenerated(const std::string& strTid)
     {
@@ -215,8 +205,8 @@ public:
         } else {
             jToken["deadline"] = jToken["create_time"].asInt64() + DAY;
         }
-        ModelRules().fillDefaultValue(jToken, false);
-        return 0 == ModelRules().checkJsonType(jToken) ? m_store.tokenSave(jToken, true) : -1;
+        fillDefaultValue(jToken, false);
+        return 0 == checkJsonType(jToken) ? tokenSave(jToken, true) : -1;
     }
 
     int tokenCreate(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
@@ -237,12 +227,12 @@ public:
             return -1;
         }
         Json::Value jAll(Json::objectValue);
-        return m_store.tokenGet(jFilter.isNull() ? jAll : jFilter, jTokenArrayOut);
+        return tokenGet(jFilter.isNull() ? jAll : jFilter, jTokenArrayOut);
     }
 
     int tokenGetByTid(std::string& strTid, Json::Value& jTokenOut)
     {
-        return m_store.tokenGetOne("tid", strTid, jTokenOut);
+        return tokenGetOne("tid", strTid, jTokenOut);
     }
 
     int VectorParamToJson(std::vector<std::string>& strVector, const char* szField, Json::Value& jParamOut)
@@ -264,7 +254,7 @@ public:
             return -1;
         }
         VectorParamToJson(strTidVector, "tid", jFilter);
-        return m_store.tokenGet(jFilter, jTokenArrayOut);
+        return tokenGet(jFilter, jTokenArrayOut);
     }
 
     int tokenUpdateByTid(std::string& strTid, Json::Value& jParam)
@@ -287,9 +277,8 @@ public:
 
     int tokenSaveByOverwrite(Json::Value& jToken)
     {
-        const bool blSound =
-            0 == ModelRules().checkJsonType(jToken) && 0 == ModelRules().fillDefaultValue(jToken, true);
-        return blSound ? m_store.tokenSave(jToken, false) : -1;
+        const bool blSound = 0 == checkJsonType(jToken) && 0 == fillDefaultValue(jToken, true);
+        return blSound ? tokenSave(jToken, false) : -1;
     }
 
     int tokenDeleteByArray(std::vector<std::string>& strVector, const char* szName)
@@ -300,7 +289,7 @@ public:
         }
         Json::Value jFilter;
         VectorParamToJson(strVector, szName, jFilter);
-        return m_store.tokenDelete(jFilter, false);
+        return tokenDelete(jFilter, false);
     }
 
     int tokenDeleteByName(std::string& strValue, const char* szName)
@@ -319,17 +308,15 @@ public:
     int tokenDeleteAll()
     {
         Json::Value jAll(Json::objectValue);
-        return m_store.tokenDelete(jAll, true);
+        return tokenDelete(jAll, true);
     }
 
-    int cleanExpireToken(bool blLogErr) { return m_store.cleanExpireToken(blLogErr); }
     int tokenGrant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
                    Json::Value& jTokenOut)
     {
         Json::Value jToken;
         if (!isGiven(szWebapiName) || 1 != tokenGetByTid(strTid, jToken) ||
-            1 != ModelRules().checkPermission(jToken, szWebapiName, szWebapiMethod) ||
-            0 > tokenCountDegrade(jToken)) {
+            1 != checkPermission(jToken, szWebapiName, szWebapiMethod) || 0 > tokenCountDegrade(jToken)) {
             return -1;
         }
         jTokenOut = jToken;
@@ -356,36 +343,12 @@ public:
         return std::min(0, tokenDeleteByTid(strTid));
     }
 
-private:
-    ModelStore& m_store;
-    std::string m_strGenerated;
-};
-
-// The exported functions. All of them purge first, except the deletion by session.
-class ModelFunctions {
-public:
-    explicit ModelFunctions(ModelService& service) : m_service(service) {}
-
-    int create(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption, std::string& strTid)
-    {
-        return purged().tokenCreate(uid, strFunction, jTokenOption, strTid);
-    }
-    int createByTid(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
-                    std::string& strTid)
-    {
-        return purged().tokenCreateByTid(uid, strFunction, jTokenOption, strTid);
-    }
-    int generate(std::string& strTid) { return m_service.tokenGenerate(strTid); }
-    int grantEx(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
-                Json::Value& jToken)
-    {
-        return purged().tokenGrant(strTid, szWebapiName, szWebapiMethod, jToken);
-    }
+    // As tokenGrant(), and writes the name of the token's user.
     int grant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod, char* szUser,
               size_t cbUser)
     {
         Json::Value jToken;
-        if (0 > grantEx(strTid, szWebapiName, szWebapiMethod, jToken)) {
+        if (0 > tokenGrant(strTid, szWebapiName, szWebapiMethod, jToken)) {
             return -1;
         }
         if (!szUser || 0 == cbUser) {
@@ -401,29 +364,15 @@ public:
         return cchWritten < strlen(szName) ? -1 : 0;
     }
 
-    int deleteByTid(std::string& strTid) { return purged().tokenDeleteByTid(strTid); }
     int deleteByBindSid(const char* szSid)
     {
         std::string strSid = szSid ? szSid : "";
-        return m_service.tokenDeleteByBindSid(strSid);
+        return tokenDeleteByBindSid(strSid);
     }
-    int deleteByFunction(std::string& strFunction) { return purged().tokenDeleteByFunction(strFunction); }
 
 private:
-    ModelService& purged()
-    {
-        m_service.cleanExpireToken(false);
-        return m_service;
-    }
-
-    ModelService& m_service;
-};
-
-struct Model {
-    ModelRules rules;
-    ModelStore store;
-    ModelService service{store};
-    ModelFunctions functions{service};
+    std::vector<Row> m_rows;
+    std::string m_strGenerated;
 };
 
 #endif

@@ -46,75 +46,99 @@ private:
     unsigned int m_nNumber = 0;
 };
 
-template <typename Part, typename... Parameters>
-std::index_sequence_for<Parameters...> indexes(int (Part::*)(Parameters...));
-template <typename Part, typename... Parameters>
-std::index_sequence_for<Parameters...> indexes(int (*Part::*)(Parameters...));
-
-template <typename Part, typename Member, size_t... I>
-int invoke(Part& part, Member member, [[maybe_unused]] Json::Value& jCall, const Names& szArguments,
+template <typename Function, size_t... I>
+int invoke(const Function& function, [[maybe_unused]] Json::Value& jCall, const Names& szArguments,
            std::index_sequence<I...>)
 {
     if (sizeof...(I) != szArguments.size()) {
         throw std::logic_error("another number of arguments");
     }
-    return (part.*member)(Argument(jCall[szArguments[I]])...);
+    return function(Argument(jCall[szArguments[I]])...);
 }
 
-// A call of that member of that part of a Library or a Model.
-template <typename System, typename Part, typename Member>
-Call<System> on(Part System::*part, Member member)
+// A call of that function, or of that member of a Library or a Model.
+template <typename System, typename... Parameters>
+Call<System> on(int (*function)(Parameters...))
+{
+    return [=](System&, Json::Value& jCall, const Names& szArguments) {
+        return invoke(function, jCall, szArguments, std::index_sequence_for<Parameters...>());
+    };
+}
+template <typename System, typename Part, typename... Parameters>
+Call<System> on(int (Part::*member)(Parameters...))
 {
     return [=](System& system, Json::Value& jCall, const Names& szArguments) {
-        return invoke(system.*part, member, jCall, szArguments, decltype(indexes(member))());
+        const auto function = [&](Parameters... parameters) { return (system.*member)(parameters...); };
+        return invoke(function, jCall, szArguments, std::index_sequence_for<Parameters...>());
     };
 }
 
-#define BOTH(part, name)                                                                                     \
-    on(&Library::part, &decltype(Library::part)::name), on(&Model::part, &decltype(Model::part)::name)
+// The model's part of an exported function that purges first.
+template <typename Member>
+Call<Model> purged(Member member)
+{
+    return [=](Model& model, Json::Value& jCall, const Names& szArguments) {
+        model.cleanExpireToken(false);
+        return on<Model>(member)(model, jCall, szArguments);
+    };
+}
+
+// Rows of the table: those of an exported function; and what is called by the same name on both.
+#define EXPORTED(name, nWeight, model, ...)                                                                  \
+    {                                                                                                        \
+        "exported " #name, nWeight, {__VA_ARGS__}, on<Library>(&VemoAccessToken##name), model                \
+    }
+#define BOTH(Part, name) on<Library>(&Part::name), on<Model>(&Model::name)
 
 } // namespace
 
 const std::vector<Operation>& operations()
 {
     static const std::vector<Operation> all = {
-        {"exported Create", 6, {"uid", "function", "option", "made"}, BOTH(functions, create)},
-        {"exported CreateByTid", 6, {"uid", "function", "option", "fresh"}, BOTH(functions, createByTid)},
-        {"exported Generate", 1, {"made"}, BOTH(functions, generate)},
-        {"exported GrantEx", 10, {"granted", "webapi", "method", "answer"}, BOTH(functions, grantEx)},
-        {"exported Grant", 10, {"granted", "webapi", "method", "user", "size"}, BOTH(functions, grant)},
-        {"exported DeleteByTid", 3, {"tid"}, BOTH(functions, deleteByTid)},
-        {"exported DeleteByBindSid", 1, {"sid_or_null"}, BOTH(functions, deleteByBindSid)},
-        {"exported DeleteByFunction", 1, {"function"}, BOTH(functions, deleteByFunction)},
+        EXPORTED(Create, 6, purged(&Model::tokenCreate), "uid", "function", "option", "made"),
+        EXPORTED(CreateByTid, 6, purged(&Model::tokenCreateByTid), "uid", "function", "option", "fresh"),
+        EXPORTED(Generate, 1, on<Model>(&Model::tokenGenerate), "made"),
+        {"exported GrantEx",
+         10,
+         {"granted", "webapi", "method", "answer"},
+         on<Library>(&Library::grantEx),
+         purged(&Model::tokenGrant)},
+        EXPORTED(Grant, 10, purged(&Model::grant), "granted", "webapi", "method", "user", "size"),
+        EXPORTED(DeleteByTid, 3, purged(&Model::tokenDeleteByTid), "tid"),
+        EXPORTED(DeleteByBindSid, 1, on<Model>(&Model::deleteByBindSid), "sid_or_null"),
+        EXPORTED(DeleteByFunction, 1, purged(&Model::tokenDeleteByFunction), "function"),
 
-        {"checkJsonType", 5, {"record"}, BOTH(rules, checkJsonType)},
-        {"fillDefaultValue", 5, {"record", "flag"}, BOTH(rules, fillDefaultValue)},
-        {"checkPermission", 5, {"record", "webapi", "method"}, BOTH(rules, checkPermission)},
+        {"checkJsonType", 5, {"record"}, BOTH(VEMO_ACCESS_TOKEN, checkJsonType)},
+        {"fillDefaultValue", 5, {"record", "flag"}, BOTH(VEMO_ACCESS_TOKEN, fillDefaultValue)},
+        {"checkPermission", 5, {"record", "webapi", "method"}, BOTH(VEMO_ACCESS_TOKEN, checkPermission)},
 
-        {"tokenCreate", 30, {"uid", "function", "option", "made"}, BOTH(service, tokenCreate)},
-        {"tokenCreateByTid", 60, {"uid", "function", "option", "fresh"}, BOTH(service, tokenCreateByTid)},
-        {"tokenGrant", 50, {"granted", "webapi", "method", "answer"}, BOTH(service, tokenGrant)},
-        {"tokenCountDegrade", 10, {"record"}, BOTH(service, tokenCountDegrade)},
-        {"tokenUpdateByTid", 40, {"tid", "param"}, BOTH(service, tokenUpdateByTid)},
-        {"tokenSaveByOverwrite", 20, {"record"}, BOTH(service, tokenSaveByOverwrite)},
-        {"tokenDeleteByTid", 6, {"tid"}, BOTH(service, tokenDeleteByTid)},
-        {"tokenDeleteByBindSid", 2, {"sid"}, BOTH(service, tokenDeleteByBindSid)},
-        {"tokenDeleteByFunction", 1, {"function"}, BOTH(service, tokenDeleteByFunction)},
-        {"tokenDeleteByName", 4, {"text", "name"}, BOTH(service, tokenDeleteByName)},
-        {"tokenDeleteByArray", 4, {"texts", "name"}, BOTH(service, tokenDeleteByArray)},
-        {"tokenDeleteByTidArray", 6, {"texts"}, BOTH(service, tokenDeleteByTidArray)},
-        {"tokenDeleteAll", 1, {}, BOTH(service, tokenDeleteAll)},
-        {"cleanExpireToken", 4, {"flag"}, BOTH(service, cleanExpireToken)},
-        {"tokenList", 50, {"filter", "list"}, BOTH(service, tokenList)},
-        {"tokenGetByTid", 20, {"tid", "answer"}, BOTH(service, tokenGetByTid)},
-        {"tokenGetByTidArray", 15, {"texts", "list"}, BOTH(service, tokenGetByTidArray)},
-        {"VectorParamToJson", 3, {"texts", "name", "param"}, BOTH(service, VectorParamToJson)},
+        {"tokenCreate", 30, {"uid", "function", "option", "made"}, BOTH(AccessTokenApi, tokenCreate)},
+        {"tokenCreateByTid",
+         60,
+         {"uid", "function", "option", "fresh"},
+         BOTH(AccessTokenApi, tokenCreateByTid)},
+        {"tokenGrant", 50, {"granted", "webapi", "method", "answer"}, BOTH(AccessTokenApi, tokenGrant)},
+        {"tokenCountDegrade", 10, {"record"}, BOTH(AccessTokenApi, tokenCountDegrade)},
+        {"tokenUpdateByTid", 40, {"tid", "param"}, BOTH(AccessTokenApi, tokenUpdateByTid)},
+        {"tokenSaveByOverwrite", 20, {"record"}, BOTH(AccessTokenApi, tokenSaveByOverwrite)},
+        {"tokenDeleteByTid", 6, {"tid"}, BOTH(AccessTokenApi, tokenDeleteByTid)},
+        {"tokenDeleteByBindSid", 2, {"sid"}, BOTH(AccessTokenApi, tokenDeleteByBindSid)},
+        {"tokenDeleteByFunction", 1, {"function"}, BOTH(AccessTokenApi, tokenDeleteByFunction)},
+        {"tokenDeleteByName", 4, {"text", "name"}, BOTH(AccessTokenApi, tokenDeleteByName)},
+        {"tokenDeleteByArray", 4, {"texts", "name"}, BOTH(AccessTokenApi, tokenDeleteByArray)},
+        {"tokenDeleteByTidArray", 6, {"texts"}, BOTH(AccessTokenApi, tokenDeleteByTidArray)},
+        {"tokenDeleteAll", 1, {}, BOTH(AccessTokenApi, tokenDeleteAll)},
+        {"cleanExpireToken", 4, {"flag"}, BOTH(AccessTokenApi, cleanExpireToken)},
+        {"tokenList", 50, {"filter", "list"}, BOTH(AccessTokenApi, tokenList)},
+        {"tokenGetByTid", 20, {"tid", "answer"}, BOTH(AccessTokenApi, tokenGetByTid)},
+        {"tokenGetByTidArray", 15, {"texts", "list"}, BOTH(AccessTokenApi, tokenGetByTidArray)},
+        {"VectorParamToJson", 3, {"texts", "name", "param"}, BOTH(AccessTokenApi, VectorParamToJson)},
 
-        {"tokenGet of the store", 30, {"filter", "list"}, BOTH(store, tokenGet)},
-        {"tokenGetOne of the store", 15, {"name", "text", "answer"}, BOTH(store, tokenGetOne)},
-        {"tokenDelete of the store", 5, {"filter", "rare_flag"}, BOTH(store, tokenDelete)},
-        {"tokenSave of the store", 30, {"record", "flag"}, BOTH(store, tokenSave)},
-        {"cleanExpireToken of the store", 2, {"flag"}, BOTH(store, cleanExpireToken)},
+        {"tokenGet of the store", 30, {"filter", "list"}, BOTH(AccessTokenDbApi, tokenGet)},
+        {"tokenGetOne of the store", 15, {"name", "text", "answer"}, BOTH(AccessTokenDbApi, tokenGetOne)},
+        {"tokenDelete of the store", 5, {"filter", "rare_flag"}, BOTH(AccessTokenDbApi, tokenDelete)},
+        {"tokenSave of the store", 30, {"record", "flag"}, BOTH(AccessTokenDbApi, tokenSave)},
+        {"cleanExpireToken of the store", 2, {"flag"}, BOTH(AccessTokenDbApi, cleanExpireToken)},
     };
     return all;
 }

@@ -13,34 +13,19 @@
 #include "internal/AccessTokenDbApi.h"
 #include "vemo-access-token.h"
 
-// The functions under the names that the model has for them.
-struct LibraryRules {
-    decltype(&VEMO_ACCESS_TOKEN::checkJsonType) checkJsonType = &VEMO_ACCESS_TOKEN::checkJsonType;
-    decltype(&VEMO_ACCESS_TOKEN::fillDefaultValue) fillDefaultValue = &VEMO_ACCESS_TOKEN::fillDefaultValue;
-    decltype(&VEMO_ACCESS_TOKEN::checkPermission) checkPermission = &VEMO_ACCESS_TOKEN::checkPermission;
-};
-
-struct LibraryFunctions {
-    decltype(&VemoAccessTokenCreate) create = &VemoAccessTokenCreate;
-    decltype(&VemoAccessTokenCreateByTid) createByTid = &VemoAccessTokenCreateByTid;
-    decltype(&VemoAccessTokenGenerate) generate = &VemoAccessTokenGenerate;
-    decltype(&VemoAccessTokenGrantEx) grantEx = &VemoAccessTokenGrantEx;
-    decltype(&VemoAccessTokenGrant) grant = &VemoAccessTokenGrant;
-    decltype(&VemoAccessTokenDeleteByTid) deleteByTid = &VemoAccessTokenDeleteByTid;
-    decltype(&VemoAccessTokenDeleteByBindSid) deleteByBindSid = &VemoAccessTokenDeleteByBindSid;
-    decltype(&VemoAccessTokenDeleteByFunction) deleteByFunction = &VemoAccessTokenDeleteByFunction;
-};
-
 // What the gate does in the place of VemoAccessTokenGrantEx. Calls that it refuses on purpose go to the
 // library.
 int grantAtTheGate(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
                    Json::Value& jToken);
 
-struct Library {
-    LibraryRules rules;
-    AccessTokenDbApi store;
-    AccessTokenApi service;
-    LibraryFunctions functions;
+struct Library : AccessTokenDbApi, AccessTokenApi {
+    int (*pGrantEx)(std::string&, const char*, const char*, Json::Value&) = &VemoAccessTokenGrantEx;
+
+    int grantEx(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
+                Json::Value& jToken)
+    {
+        return pGrantEx(strTid, szWebapiName, szWebapiMethod, jToken);
+    }
 };
 
 // The outcome of an operation.
@@ -55,7 +40,7 @@ struct Outcome {
     }
 };
 
-// Calls a member of a Library or a Model. The arguments are the members of jCall with these names.
+// Calls a function of the library, or of a Model. The arguments are the members of jCall with these names.
 typedef std::vector<const char*> Names;
 template <typename System>
 using Call = std::function<int(System& system, Json::Value& jCall, const Names& szArguments)>;

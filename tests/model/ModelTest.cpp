@@ -89,11 +89,11 @@ protected:
             m_history.pop_front();
         }
         const Outcome library = operation.run(m_library, jCall);
-        m_model.service.setGenerated(library.jCall.get("made", "").asString());
+        m_model.setGenerated(library.jCall.get("made", "").asString());
         const Outcome model = operation.run(m_model, jCall);
         ASSERT_EQ(model, library) << "expected is the model's\n" << history();
-        ASSERT_EQ("", m_table.differenceFrom(m_model.store.rows())) << history();
-        m_nRows += static_cast<int64_t>(m_model.store.rows().size());
+        ASSERT_EQ("", m_table.differenceFrom(m_model.rows())) << history();
+        m_nRows += static_cast<int64_t>(m_model.rows().size());
         if (!library.strThrown.empty()) {
             ++m_nThrown;
         } else if (0 > library.nResult) {
@@ -119,7 +119,7 @@ protected:
                                                                    &sqlite3_close};
     const Table m_table{m_pDb.get()};
     Model m_model;
-    Draws m_draws{seed(), m_model.store.rows()};
+    Draws m_draws{seed(), m_model.rows()};
     std::deque<std::pair<std::string, Json::Value>> m_history;
     std::set<std::string> m_succeeded;
     int64_t m_nRefused = 0;
@@ -137,7 +137,7 @@ TEST_F(ModelCheck, LibraryDoesWhatTheModelDoes)
 #ifdef VEMO_TEST_GATE
 TEST_F(ModelCheck, GateGrantsWhatTheModelGrants)
 {
-    m_library.functions.grantEx = &grantAtTheGate;
+    m_library.pGrantEx = &grantAtTheGate;
     runAll("model check of the gate", scaled(std::min(VEMO_TEST_OPERATIONS, 10000)));
 }
 #endif
