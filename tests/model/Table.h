@@ -6,7 +6,6 @@
 #include <sqlite3.h>
 
 #include <stdexcept>
-#include <string_view>
 
 #include "ModelRow.h"
 
@@ -31,40 +30,31 @@ public:
     // How the table differs from these rows in this order, or "".
     std::string differenceFrom(const std::vector<Row>& rows) const
     {
-        std::string strDifference;
-        size_t nRow = 0;
-        int nStep = sqlite3_step(m_pSelect);
-        for (; SQLITE_ROW == nStep && nRow < rows.size() && strDifference.empty(); ++nRow) {
-            strDifference = columnDifference(rows[nRow]);
-            nStep = sqlite3_step(m_pSelect);
+        std::string strExpected;
+        for (const Row& row : rows) {
+            for (const std::string& strColumn : row.columns) {
+                strExpected.append(strColumn).append("\n");
+            }
         }
-        if (strDifference.empty() && (SQLITE_DONE != nStep || nRow != rows.size())) {
-            strDifference = SQLITE_ROW == nStep    ? "more rows than " + std::to_string(rows.size())
-                            : SQLITE_DONE == nStep ? "only " + std::to_string(nRow) + " rows"
-                                                   : sqlite3_errmsg(sqlite3_db_handle(m_pSelect));
+        std::string strFound;
+        while (SQLITE_ROW == sqlite3_step(m_pSelect)) {
+            for (size_t i = 0; i < FIELDS.size(); ++i) {
+                strFound.append(column(i)).append("\n");
+            }
         }
-        sqlite3_reset(m_pSelect);
-        return strDifference;
+        strFound += SQLITE_OK == sqlite3_reset(m_pSelect) ? "" : sqlite3_errmsg(sqlite3_db_handle(m_pSelect));
+        return strFound == strExpected ? "" : "the table holds:\n" + strFound + "instead of:\n" + strExpected;
     }
 
 private:
-    // How the current row differs from the expected one, or "".
-    std::string columnDifference(const Row& row) const
+    std::string column(size_t nField) const
     {
-        for (size_t i = 0; i < FIELDS.size(); ++i) {
-            const int nColumn = static_cast<int>(i);
-            const int nType = Kind::Number == FIELDS[i].kind ? SQLITE_INTEGER : SQLITE_TEXT;
-            const bool blType = nType == sqlite3_column_type(m_pSelect, nColumn);
-            const char* szText = reinterpret_cast<const char*>(sqlite3_column_text(m_pSelect, nColumn));
-            const std::string_view strText(szText ? szText : "",
-                                           static_cast<size_t>(sqlite3_column_bytes(m_pSelect, nColumn)));
-            if (!blType || strText != row.columns[i]) {
-                return row.columns[0] + ": " + FIELDS[i].szName + " is " +
-                       (blType ? "" : "of another type, ") + std::string(strText) + " instead of " +
-                       row.columns[i];
-            }
-        }
-        return "";
+        const int nColumn = static_cast<int>(nField);
+        const int nType = Kind::Number == FIELDS[nField].kind ? SQLITE_INTEGER : SQLITE_TEXT;
+        const bool blType = nType == sqlite3_column_type(m_pSelect, nColumn);
+        const auto* szText = reinterpret_cast<const char*>(sqlite3_column_text(m_pSelect, nColumn));
+        const auto cb = static_cast<size_t>(sqlite3_column_bytes(m_pSelect, nColumn));
+        return (blType ? "" : "(of another type) ") + std::string(szText ? szText : "", cb);
     }
 
     sqlite3_stmt* m_pSelect = nullptr;
