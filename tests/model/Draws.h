@@ -23,71 +23,52 @@ std::string withNul(const std::string& strHead, const std::string& strTail)
     return strHead + '\0' + strTail;
 }
 
+template <typename... Values>
+Json::Value list(const Values&... values)
+{
+    Json::Value jList(Json::arrayValue);
+    (jList.append(values), ...);
+    return jList;
+}
+
 // Ids that are long enough or not. Two are equal up to a NUL, and one is what two others become in a list.
-const std::string g_rgTid[] = {idOf("a"),
-                               idOf("b"),
-                               idOf("c"),
-                               idOf("d"),
-                               idOf("e"),
-                               idOf("it's"),
-                               idOf("\xff\xfe\xc3"),
-                               idOf("'; DROP TABLE token; --"),
-                               idOf("a") + "'" + idOf("b"),
-                               std::string(6000, 'l'),
-                               withNul(idOf("a"), "tail"),
-                               withNul("short", idOf("")),
-                               withNul("", idOf("")),
-                               "short",
-                               std::string(TID_MIN - 1, 'x'),
-                               ""};
+const Json::Value g_jTid =
+    list(idOf("a"), idOf("b"), idOf("c"), idOf("d"), idOf("e"), idOf("it's"), idOf("\xff\xfe\xc3"),
+         idOf("'; DROP TABLE token; --"), idOf("a") + "'" + idOf("b"), std::string(6000, 'l'),
+         withNul(idOf("a"), "tail"), withNul("short", idOf("")), withNul("", idOf("")), "short",
+         std::string(TID_MIN - 1, 'x'), "");
 
-const std::string g_rgSession[] = {
-    "", "s1", "s2", "s1's2", withNul("", "hidden"), withNul("s1", "tail"), "\xc3(", "' or '1'='1", "1"};
+const Json::Value g_jSession =
+    list("", "s1", "s2", "s1's2", withNul("", "hidden"), withNul("s1", "tail"), "\xc3(", "' or '1'='1", "1");
 
-const std::string g_rgPurpose[] = {
-    "VPN", "VPN", "Mail", "VPN'Mail", "it's", "\xf0\x9f\x94\x91", withNul("", "x"), ""};
+const Json::Value g_jPurpose =
+    list("VPN", "VPN", "Mail", "VPN'Mail", "it's", "\xf0\x9f\x94\x91", withNul("", "x"), "");
 
-const std::string g_rgWebapi[] = {"Example.Api",
-                                  "Example.Api",
-                                  "Example.Api",
-                                  "Example.Api",
-                                  "Example.Api",
-                                  "Example.File",
-                                  "a\"b\\c\n",
-                                  "\xff",
-                                  withNul("Example.Api", "x"),
-                                  ""};
+const Json::Value g_jWebapi = list("Example.Api", "Example.Api", "Example.Api", "Example.Api", "Example.Api",
+                                   "Example.File", "a\"b\\c\n", "\xff", withNul("Example.Api", "x"), "");
 
-const std::string g_rgMethod[] = {"get", "get", "get", "get", "get", "list", "Get", "5", "it's", ""};
+const Json::Value g_jMethod = list("get", "get", "get", "get", "get", "list", "Get", "5", "it's", "");
 
-const char* const g_rgExtra[] = {"{}", R"({"note":"it's"})", R"({"a":{"b":[1,-2,3.5,true,null,"x"]},"":0})",
-                                 R"({"n":18446744073709551615,"m":-9223372036854775808,"d":0.1})",
-                                 "{\"t\":\"\\u0000\\u0001\\n\\t\\\"\\\\/\xff\xc3\xa9\"}"};
+const Json::Value g_jExtra = list(jsonValue("{}"), jsonValue(R"({"note":"it's"})"),
+                                  jsonValue(R"({"a":{"b":[1,-2,3.5,true,null,"x"]},"":0})"),
+                                  jsonValue(R"({"n":18446744073709551615,"m":-9223372036854775808,"d":0.1})"),
+                                  jsonValue("{\"t\":\"\\u0000\\u0001\\n\\t\\\"\\\\/\xff\xc3\xa9\"}"));
 
 // Texts for number fields, which become part of a statement without quotes.
-const char* const g_rgNumberText[] = {"7",    "-1", "count", "uid",       TEXT_OR_TRUE,
-                                      "null", "'",  "",      "no_column", "1 1"};
+const Json::Value g_jNumberText =
+    list("7", "-1", "count", "uid", TEXT_OR_TRUE, "null", "'", "", "no_column", "1 1");
 
-const unsigned int g_rgUid[] = {UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77, 4294967294, 4294967295};
+const Json::Value g_jUid = list(UID_ROOT, UID_ANNA, UID_ANNA, UID_UNREADABLE, 77, 4294967294U, 4294967295U);
 
-const Json::UInt g_rgSize[] = {0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE};
+const Json::Value g_jSize = list(0, 1, 4, 5, USER_SIZE, USER_SIZE, USER_SIZE, USER_SIZE);
 
 // A clock that was never set or is years wrong; the end of 32 bits; the end of SQLite's dates.
-const time_t g_rgWrongTime[] = {-DAY - 1,
-                                -1,
-                                0,
-                                1700000000 - 1000 * DAY,
-                                1700000000 + 1000 * DAY,
-                                INT32_MAX,
-                                INT32_MAX + time_t(1),
-                                UINT32_MAX,
-                                UINT32_MAX + time_t(1),
-                                YEAR_10000 - DAY - 2,
-                                YEAR_10000 - 1,
-                                YEAR_10000};
+const Json::Value g_jWrongTime =
+    list(-DAY - 1, -1, 0, 1700000000 - 1000 * DAY, 1700000000 + 1000 * DAY, INT32_MAX, INT32_MAX + time_t(1),
+         UINT32_MAX, UINT32_MAX + time_t(1), YEAR_10000 - DAY - 2, YEAR_10000 - 1, YEAR_10000);
 
-const char* const g_rgName[] = {"tid",   "tid",   "bind_sid", "function", "function", "uid",
-                                "count", "extra", "limit",    "sort_by",  "no_field", ""};
+const Json::Value g_jName = list("tid", "tid", "bind_sid", "function", "function", "uid", "count", "extra",
+                                 "limit", "sort_by", "no_field", "");
 
 const Json::Value g_jAnything =
     jsonValue(R"([null, "5", "", true, 5, 5.0, 2.5, 18446744073709551615, [], {}, ["get"]])");
@@ -119,7 +100,7 @@ public:
     void moveClock()
     {
         if (oneIn(m_usualTime ? 10 : 1000)) {
-            const time_t wrong = oneOf(g_rgWrongTime);
+            const time_t wrong = oneOf(g_jWrongTime).asInt64();
             const time_t now = worldClock();
             worldClock() = m_usualTime.value_or(wrong);
             m_usualTime = m_usualTime ? std::nullopt : std::optional<time_t>(now);
@@ -145,21 +126,17 @@ public:
     Json::Value argument(const std::string& strName) const { return m_draws.at(strName)(); }
 
 private:
-    template <typename Values>
-    auto oneOf(const Values& values) -> std::decay_t<decltype(values[0])>
+    // One of the first values of a list.
+    Json::Value oneOf(const Json::Value& jValues, Json::ArrayIndex nValues)
     {
-        return values[below(std::size(values))];
+        return jValues[static_cast<Json::ArrayIndex>(below(nValues))];
     }
-    Json::Value oneOf(const Json::Value& jValues)
-    {
-        return jValues[static_cast<Json::ArrayIndex>(below(jValues.size()))];
-    }
+    Json::Value oneOf(const Json::Value& jValues) { return oneOf(jValues, jValues.size()); }
     const Row& row() { return m_rows[below(m_rows.size())]; }
 
     Json::Value anything() { return oneOf(g_jAnything); }
-    Json::Value extra() { return jsonValue(oneOf(g_rgExtra)); }
 
-    Json::Value tid() { return m_rows.empty() || oneIn(4) ? Json::Value(oneOf(g_rgTid)) : row().columns[0]; }
+    Json::Value tid() { return m_rows.empty() || oneIn(4) ? oneOf(g_jTid) : row().columns[0]; }
 
     Json::Value granted()
     {
@@ -175,23 +152,23 @@ private:
     // Mostly one that the token allows: others would rarely match.
     Json::Value webapi()
     {
-        return m_jAllow.isObject() && !m_jAllow.empty() ? oneOf(m_jAllow.getMemberNames())
+        return m_jAllow.isObject() && !m_jAllow.empty() ? m_jAllow.getMemberNames()[below(m_jAllow.size())]
                : oneIn(30)                              ? Json::Value()
-                                                        : Json::Value(oneOf(g_rgWebapi));
+                                                        : oneOf(g_jWebapi);
     }
 
     Json::Value allow()
     {
         Json::Value jAllow(Json::objectValue);
         for (size_t i = oneIn(8) ? 0 : 1 + below(3); 0 < i; --i) {
-            Json::Value& jEntry = jAllow[oneOf(g_rgWebapi)];
+            Json::Value& jEntry = jAllow[oneOf(g_jWebapi).asString()];
             if (oneIn(8)) {
                 jEntry = anything();
                 continue;
             }
             Json::Value jMethods(Json::arrayValue);
             for (size_t j = 1 + below(3); 0 < j; --j) {
-                jMethods.append(oneIn(8) ? anything() : Json::Value(oneOf(g_rgMethod)));
+                jMethods.append(oneIn(8) ? anything() : oneOf(g_jMethod));
             }
             jEntry = Json::Value(Json::objectValue);
             jEntry["method"] = jMethods;
@@ -202,10 +179,8 @@ private:
     Json::Value deadline()
     {
         const Json::Int64 nNow = worldClock();
-        const Json::Int64 rgDeadline[] = {
-            -1,          nNow - 1,       nNow,           nNow + 1,       nNow + 3,
-            nNow + 5000, nNow + 1000000, nNow + 1000000, nNow + 1000000, INT64_MAX};
-        return oneOf(rgDeadline);
+        return oneOf(list(-1, nNow - 1, nNow, nNow + 1, nNow + 3, nNow + 5000, nNow + 1000000, nNow + 1000000,
+                          nNow + 1000000, INT64_MAX));
     }
 
     Json::Value option()
@@ -236,15 +211,15 @@ private:
             return anything();
         }
         switch (fieldNumber(other.szName)) {
-        case 0: return oneOf(g_rgTid);
-        case 1: return oneOf(g_rgSession);
-        case 2: return oneIn(4) ? Json::Value(Json::Int64(1) << 32) : Json::Value(oneOf(g_rgUid));
+        case 0: return oneOf(g_jTid);
+        case 1: return oneOf(g_jSession);
+        case 2: return oneIn(4) ? Json::Value(Json::Int64(1) << 32) : oneOf(g_jUid);
         case 3: return deadline();
         case 4: return oneOf(g_jCount);
         case 5: return static_cast<Json::Int64>(worldClock());
-        case 6: return oneOf(g_rgPurpose);
+        case 6: return oneOf(g_jPurpose);
         case 7: return allow();
-        default: return extra();
+        default: return oneOf(g_jExtra);
         }
     }
 
@@ -290,7 +265,7 @@ private:
             jValue = row().jRecord[compared.szName];
         }
         if (Kind::Number == compared.kind && oneIn(8)) {
-            jValue = oneOf(g_rgNumberText);
+            jValue = oneOf(g_jNumberText);
         }
         return jValue;
     }
@@ -307,12 +282,12 @@ private:
             jList.append(scalar(compared));
             return jList;
         }
-        const char* const rgText[] = {"VPN", "Mail", "s1", "s2"};
+        const Json::Value jText = list("VPN", "Mail", "s1", "s2");
         for (size_t i = below(4); 0 < i; --i) {
             jList.append(Kind::Number == compared.kind       ? oneOf(g_jListed)
-                         : Kind::Json == compared.kind       ? extra()
-                         : 0 == fieldNumber(compared.szName) ? Json::Value(g_rgTid[below(3)])
-                                                             : Json::Value(oneOf(rgText)));
+                         : Kind::Json == compared.kind       ? oneOf(g_jExtra)
+                         : 0 == fieldNumber(compared.szName) ? oneOf(g_jTid, 3)
+                                                             : oneOf(jText));
         }
         return jList;
     }
@@ -328,8 +303,8 @@ private:
             jFilter[compared.szName] = condition(compared);
         }
         if (oneIn(6)) {
-            const std::string rgUnknown[] = {"no_field", "Tid", "", withNul("tid", "x")};
-            jFilter[oneOf(rgUnknown)] = anything();
+            const Json::Value jUnknown = list("no_field", "Tid", "", withNul("tid", "x"));
+            jFilter[oneOf(jUnknown).asString()] = anything();
         }
         if (oneIn(4)) {
             addPaging(jFilter);
@@ -340,11 +315,11 @@ private:
     void addPaging(Json::Value& jFilter)
     {
         if (oneIn(2)) {
-            jFilter["sort_by"] = oneIn(8) ? anything() : Json::Value(oneOf(g_rgName));
+            jFilter["sort_by"] = oneIn(8) ? anything() : oneOf(g_jName);
         }
         if (oneIn(2)) {
-            const char* const rgDirection[] = {"desc", "desc", "DESC", "asc", ""};
-            jFilter["sort_direction"] = oneIn(8) ? anything() : Json::Value(oneOf(rgDirection));
+            const Json::Value jDirection = list("desc", "desc", "DESC", "asc", "");
+            jFilter["sort_direction"] = oneIn(8) ? anything() : oneOf(jDirection);
         }
         if (oneIn(2)) {
             jFilter["limit"] = oneOf(g_jPosition);
@@ -358,9 +333,8 @@ private:
     {
         Json::Value jTexts(Json::arrayValue);
         for (size_t i = oneIn(3) ? below(4) : 1; 0 < i; --i) {
-            jTexts.append(oneIn(3)
-                              ? oneIn(2) ? Json::Value(oneOf(g_rgSession)) : Json::Value(oneOf(g_rgPurpose))
-                          : oneIn(2) ? Json::Value(g_rgTid[below(3)])
+            jTexts.append(oneIn(3)   ? oneIn(2) ? oneOf(g_jSession) : oneOf(g_jPurpose)
+                            : oneIn(2) ? oneOf(g_jTid, 3)
                                      : tid());
         }
         return jTexts;
@@ -369,15 +343,15 @@ private:
     // The draw of each argument.
     const std::map<std::string, std::function<Json::Value()>> m_draws = {
         {"tid", [this] { return tid(); }},
-        {"fresh", [this] { return oneOf(g_rgTid); }},
+        {"fresh", [this] { return oneOf(g_jTid); }},
         {"granted", [this] { return granted(); }},
         {"webapi", [this] { return webapi(); }},
-        {"method", [this] { return oneIn(10) ? Json::Value() : oneOf(g_rgMethod); }},
-        {"uid", [this] { return oneOf(g_rgUid); }},
-        {"function", [this] { return oneOf(g_rgPurpose); }},
-        {"sid", [this] { return oneOf(g_rgSession); }},
-        {"sid_or_null", [this] { return oneIn(20) ? Json::Value() : oneOf(g_rgSession); }},
-        {"name", [this] { return oneIn(20) ? Json::Value() : oneOf(g_rgName); }},
+        {"method", [this] { return oneIn(10) ? Json::Value() : oneOf(g_jMethod); }},
+        {"uid", [this] { return oneOf(g_jUid); }},
+        {"function", [this] { return oneOf(g_jPurpose); }},
+        {"sid", [this] { return oneOf(g_jSession); }},
+        {"sid_or_null", [this] { return oneIn(20) ? Json::Value() : oneOf(g_jSession); }},
+        {"name", [this] { return oneIn(20) ? Json::Value() : oneOf(g_jName); }},
         {"option", [this] { return option(); }},
         {"param", [this] { return param(); }},
         {"record", [this] { return record(); }},
@@ -386,7 +360,7 @@ private:
         {"texts", [this] { return texts(); }},
         {"list", [this] { return oneIn(12) ? anything() : Json::arrayValue; }},
         {"user", [this] { return oneIn(8) ? Json::Value() : std::string(USER_SIZE, '?'); }},
-        {"size", [this] { return oneOf(g_rgSize); }},
+        {"size", [this] { return oneOf(g_jSize); }},
         {"flag", [this] { return oneIn(2); }},
         {"rare_flag", [this] { return oneIn(8); }},
         {"made", [] { return "untouched"; }},
