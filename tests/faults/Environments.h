@@ -59,19 +59,10 @@ inline void setMode(const std::string& strPath, uid_t uid, mode_t mode)
             "give a file away");
 }
 
-// Something that stands in a wrong place. A link points to the real one.
-enum class Thing { Nothing, EmptyFile, Directory, Link, DanglingLink, Fifo };
-
-inline void make(Thing thing, const std::string& strPath, const std::string& strTarget)
+// Makes what stands in a wrong place: the command gets the path as its last argument.
+inline void make(const std::string& strCommand, const std::string& strPath)
 {
-    switch (thing) {
-    case Thing::Nothing: break;
-    case Thing::EmptyFile: std::ofstream{strPath}; break;
-    case Thing::Directory: fs::create_directory(strPath); break;
-    case Thing::Link: fs::create_symlink(strTarget, strPath); break;
-    case Thing::DanglingLink: fs::create_symlink("nowhere", strPath); break;
-    case Thing::Fifo: EXPECT_EQ(0, mkfifo(strPath.c_str(), 0600)); break;
-    }
+    EXPECT_EQ(0, system((strCommand + " '" + strPath + "'").c_str()));
 }
 
 // Sets a limit, and returns how to restore it.
@@ -94,18 +85,19 @@ inline Environment umaskOf(mode_t mode)
 }
 
 // Something else stands where the private directory should be.
-inline Environment directoryIs(Thing thing)
+inline Environment directoryIs(const char* szCommand)
 {
     return [=](const TokenStore& store) -> Leave {
         const std::string strPath = store.directory() + "/directory";
-        make(thing, strPath, ".");
+        make(szCommand, strPath);
         setenv("VEMO_REDIRECT_DIR", strPath.c_str(), 1);
         return [&store] { setenv("VEMO_REDIRECT_DIR", store.directory().c_str(), 1); };
     };
 }
 
-// Something else stands where the database should be, and must still stand there afterwards.
-inline Environment databaseIs(Thing thing)
+// Something else stands where the database should be, and must still stand there afterwards. The database, if
+// there was one, is "aside".
+inline Environment databaseIs(const char* szCommand)
 {
     return [=](const TokenStore& store) -> Leave {
         const std::string strPath = store.path();
@@ -114,7 +106,7 @@ inline Environment databaseIs(Thing thing)
         if (!blMissing) {
             fs::rename(strPath, strAside);
         }
-        make(thing, strPath, "aside");
+        make(szCommand, strPath);
         const fs::file_type type = fs::symlink_status(strPath).type();
         return [=] {
             EXPECT_EQ(type, fs::symlink_status(strPath).type());
