@@ -3,7 +3,6 @@
 #include <cstdio>
 
 #include "AccessTokenApi.h"
-#include "AccessTokenUtil.h"
 #include "Environments.h"
 #include "Figures.h"
 #include "Operations.h"
@@ -232,49 +231,6 @@ TEST_P(InEnvironment, HasItsOutcomeForEachOperation)
 INSTANTIATE_TEST_SUITE_P(In, InEnvironment, ::testing::ValuesIn(ROWS),
                          [](const auto& instance) { return instance.param.szName; });
 
-// The signal for the limit kills a process that does not ignore it. What it was writing is rolled back.
-TEST(FileSizeSignal, EndsTheProcessAndLeavesTheStoreAsItWas)
-{
-    const TokenStore store;
-    const Operation& operation = operationNamed("update");
-    for (const size_t cbMax : {0U, 8192U, 16384U}) {
-        SCOPED_TRACE(cbMax);
-        prepareStore(store, operation);
-        const std::string strBefore = store.state();
-        const int nStatus = statusOf(startProcess([&] {
-            const struct rlimit noCore = {};
-            setrlimit(RLIMIT_CORE, &noCore);
-            fileSizeLimit(cbMax, Signal::Kills)(store);
-            operation.run();
-        }));
-        EXPECT_TRUE(WIFSIGNALED(nStatus));
-        EXPECT_EQ(SIGXFSZ, WTERMSIG(nStatus));
-        EXPECT_EQ(strBefore, store.state());
-    }
-}
-
-// If the database were opened as standard output, log lines would be written into it.
-TEST(ClosedStandardStreams, KeepLogLinesOutOfTheDatabase)
-{
-    const TokenStore store;
-    const Operation& operation = operationNamed("creation under a given id");
-    EXPECT_TRUE(endsWell(startProcess([&] {
-        VEMO_ACCESS_TOKEN::logToStdout(true);
-        setvbuf(stdout, nullptr, _IONBF, 0);
-        const auto reopen = closedDescriptors({0, 1, 2})(store);
-        const AccessTokenApi api; // creates the store, and keeps it open
-        const int nFirst = operation.run();
-        const int nSecond = operation.run(); // fails, and logs why
-        reopen();
-        if (0 != nFirst || -1 != nSecond || ::testing::Test::HasFailure()) {
-            throw std::logic_error("not as with streams");
-        }
-    })));
-    EXPECT_EQ(1U, store.files().size());
-    EXPECT_EQ(std::string::npos, store.files().begin()->second.find("Failed ["));
-    EXPECT_EQ(0U, store.state().find("known-given|")) << store.state();
-}
-
 // Why a process must stay at effective uid 0 while it holds a connection: others cannot see the journal that
 // undoes the change of a writer that crashed half-way.
 TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
@@ -287,7 +243,7 @@ TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
     store.run("WITH RECURSIVE number(n) AS (SELECT 1 UNION ALL SELECT n + 1 FROM number WHERE n < 300) "
               "INSERT INTO token SELECT 'token-' || n, '', 0, 4102444800, 1, 1, 'VPN', '{}', "
               "json_object('filling', printf('%.1000c', 'f')) FROM number"); // three of them to a page
-    AccessTokenApi api; // its connection is open already
+    AccessTokenApi api;                                                      // its connection is open already
     const auto tokensWith99Uses = [&] {
         Json::Value jFilter(Json::objectValue);
         jFilter["count"] = 99;

@@ -188,13 +188,12 @@ inline Environment freeDescriptors(size_t nFree)
     };
 }
 
-// Files cannot grow beyond cbMax. The signal for that is ignored, or kills the process.
-enum class Signal { Ignored, Kills };
-inline Environment fileSizeLimit(size_t cbMax, Signal atLimit = Signal::Ignored)
+// Files cannot grow beyond cbMax, and the signal for that is ignored.
+inline Environment fileSizeLimit(size_t cbMax)
 {
     return [=](const TokenStore&) -> Leave {
         const Leave restoreLimit = limit(RLIMIT_FSIZE, cbMax);
-        signal(SIGXFSZ, Signal::Ignored == atLimit ? SIG_IGN : SIG_DFL);
+        signal(SIGXFSZ, SIG_IGN);
         return [=] {
             restoreLimit();
             signal(SIGXFSZ, SIG_DFL);
