@@ -1,6 +1,5 @@
 // The power fails at each moment of an operation, and the disk keeps any part of what was not synced.
 
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 #include <unistd.h>
@@ -210,18 +209,6 @@ protected:
         return recordOn(files, calls);
     }
 
-    // The call, followed by what its caller can do to make the change durable.
-    std::function<int()> thenSync(const Operation& operation)
-    {
-        return [this, &operation] {
-            const int nResult = operation.run();
-            const int nDirectory = open(m_store.directory().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-            fsync(nDirectory);
-            close(nDirectory);
-            return nResult;
-        };
-    }
-
     const std::string& stateOf(const Files& files)
     {
         std::string strAll;
@@ -284,7 +271,7 @@ protected:
         PowerDisk disk(recording.files, order);
         const auto cutPower = [&] {
             image(disk.files());
-            image(disk.afterPowerCut(&onlySynced));
+            image(disk.afterPowerCut(ONLY_SYNCED));
             for (int64_t nLeft = nDraws * static_cast<int64_t>(disk.pending()); 0 < nLeft; --nLeft) {
                 image(draw(disk));
             }
@@ -297,20 +284,24 @@ protected:
         }
     }
 
-    void judge(const Recording& recording, Order order, int64_t nDraws, PowerTally& tally)
+    PowerTally judge(const std::vector<Recording>& recordings, Order order, int64_t nDraws)
     {
-        Moment moment;
-        moment.strNow = stateOf(recording.files);
-        visit(
-            recording, order, nDraws,
-            [&](const DiskCall& call, const PowerDisk& disk) {
-                moment.pass(call, isStep(call) ? stateOf(disk.files()) : "");
-            },
-            [&](const Files& files) {
-                const bool blJournal = std::any_of(files.begin(), files.end(),
-                                                   [](const auto& file) { return isJournal(file.first); });
-                moment.judge(stateOf(files), blJournal, tally);
-            });
+        PowerTally tally;
+        for (const Recording& recording : recordings) {
+            Moment moment;
+            moment.strNow = stateOf(recording.files);
+            visit(
+                recording, order, nDraws,
+                [&](const DiskCall& call, const PowerDisk& disk) {
+                    moment.pass(call, isStep(call) ? stateOf(disk.files()) : "");
+                },
+                [&](const Files& files) {
+                    const bool blJournal = std::any_of(
+                        files.begin(), files.end(), [](const auto& file) { return isJournal(file.first); });
+                    moment.judge(stateOf(files), blJournal, tally);
+                });
+        }
+        return tally;
     }
 
     // Each image must hold everything that the returned calls have done, and all or nothing of the next call.
@@ -335,24 +326,20 @@ protected:
         return tally;
     }
 
-    PowerTally judgeAll(const std::vector<Recording>& recordings, Order order, int64_t nDraws)
+    // The same, in which nothing may be wrong; prints the figures.
+    PowerTally judgeSound(const std::string& strName, const std::vector<Recording>& recordings, Order order,
+                          int64_t nDraws)
     {
-        PowerTally sum;
-        for (const Recording& recording : recordings) {
-            judge(recording, order, nDraws, sum);
-        }
-        EXPECT_EQ(0, sum.nWrong) << sum.strFirstWrong;
-        return sum;
-    }
-
-    void report(const std::string& strName, const PowerTally& tally)
-    {
+        const PowerTally tally = judge(recordings, order, nDraws);
+        EXPECT_EQ(0, tally.nWrong) << tally.strFirstWrong;
+        EXPECT_TRUE(Order::Lost == order || 0 == tally.nDamaged) << tally.nDamaged;
         figure("power cut, " + strName,
                std::to_string(tally.nImages) + " images, " + std::to_string(m_stateOfImage.size()) +
                    " different; third states " + std::to_string(tally.nWrong) + ", damaged tokens " +
                    std::to_string(tally.nDamaged) + "; changes undone although acknowledged " +
                    std::to_string(tally.nUndone) + " of " + std::to_string(tally.nExposed) + " (" +
                    share(tally.nUndone, tally.nExposed) + ") before the directory is synced, 0 after");
+        return tally;
     }
 
     TokenStore m_store;
@@ -386,9 +373,7 @@ TEST_F(PowerCut, LeavesTheStateBeforeOrAfterACommit)
             EXPECT_TRUE(oracle.allows(strState)) << strState;
         }
     }
-    const PowerTally tally = judgeAll(recordings, Order::Kept, scaled(4));
-    EXPECT_EQ(0, tally.nDamaged);
-    report("one call", tally);
+    judgeSound("one call", recordings, Order::Kept, scaled(4));
 }
 
 TEST_F(PowerCut, UndoesNoAcknowledgedChangeButTheLast)
@@ -396,10 +381,7 @@ TEST_F(PowerCut, UndoesNoAcknowledgedChangeButTheLast)
     const std::vector<Recording> recordings = {
         recordOn({}, {FIRST_CREATION.run, CREATION.run, DELETION_OF_ALL.run}),
         recordOneAfterAnother(filesBefore(CREATION))};
-    const PowerTally tally = judgeAll(recordings, Order::Kept, scaled(4));
-    EXPECT_EQ(0, tally.nDamaged);
-    EXPECT_LT(0, tally.nUndone);
-    report("one call after another", tally);
+    EXPECT_LT(0, judgeSound("one call after another", recordings, Order::Kept, scaled(4)).nUndone);
 }
 
 // A first call that only reads makes the table; that is the last change then, and may be undone.
@@ -407,7 +389,7 @@ TEST_F(PowerCut, CanTakeBackTheTable)
 {
     const PowerDisk disk = diskAfter(recordOn({}, {LISTING.run}));
     EXPECT_EQ("", stateOf(disk.files()));
-    EXPECT_EQ(STATE_NO_TABLE, stateOf(disk.afterPowerCut(&onlySynced)));
+    EXPECT_EQ(STATE_NO_TABLE, stateOf(disk.afterPowerCut(ONLY_SYNCED)));
 }
 
 TEST_F(PowerCut, CanMeetTheRecoveryFromAnother)
@@ -421,20 +403,20 @@ TEST_F(PowerCut, CanMeetTheRecoveryFromAnother)
                                           }}));
         }
     }
-    const PowerTally tally = judgeAll(recordings, Order::Kept, scaled(2));
-    EXPECT_EQ(0, tally.nDamaged);
-    report("during the recovery", tally);
+    judgeSound("during the recovery", recordings, Order::Kept, scaled(2));
 }
 
 TEST_F(PowerCut, UndoesNothingOnceTheCallerHasSyncedTheDirectory)
 {
     std::vector<Recording> recordings;
     for (const Operation& operation : operations()) {
-        recordings.push_back(recordOn(filesBefore(operation), {thenSync(operation)}));
+        recordings.push_back(recordOn(filesBefore(operation), {[&] {
+                                          const int nResult = operation.run();
+                                          g_calls.push_back({DiskCall::Kind::SyncDirectory});
+                                          return nResult;
+                                      }}));
     }
-    const PowerTally tally = judgeAll(recordings, Order::Kept, scaled(1));
-    EXPECT_EQ(0, tally.nExposed);
-    report("directory synced after the call", tally);
+    EXPECT_EQ(0, judgeSound("directory synced after the call", recordings, Order::Kept, scaled(1)).nExposed);
 }
 
 #ifdef VEMO_TEST_GATE
@@ -489,18 +471,17 @@ TEST_F(PowerCut, UndoesNothingThatTheGateHasAnswered)
 // that part.
 TEST_F(PowerCut, DamagesATokenWhereTheDiskLosesTheOrder)
 {
-    const PowerTally tally = judgeAll({recordOneAfterAnother(filesBefore(CREATION))}, Order::Lost, scaled(1));
-    EXPECT_LT(0, tally.nDamaged);
-    report("order of unlink and truncation lost", tally);
+    const Recording recording = recordOneAfterAnother(filesBefore(CREATION));
+    EXPECT_LT(
+        0, judgeSound("order of unlink and truncation lost", {recording}, Order::Lost, scaled(1)).nDamaged);
 }
 
 TEST_F(PowerCut, DamagesNoTokenWhereTheDatabaseDoesNotShrink)
 {
     m_store.setFiles(filesBefore(CREATION));
     m_store.run("PRAGMA auto_vacuum = NONE; VACUUM;");
-    const PowerTally tally = judgeAll({recordOneAfterAnother(m_store.files())}, Order::Lost, scaled(1));
-    EXPECT_EQ(0, tally.nDamaged);
-    report("order lost, without auto_vacuum", tally);
+    const Recording recording = recordOneAfterAnother(m_store.files());
+    EXPECT_EQ(0, judgeSound("order lost, without auto_vacuum", {recording}, Order::Lost, scaled(1)).nDamaged);
 }
 
 // The judge must notice when a sync is missing.
@@ -512,8 +493,6 @@ TEST_F(PowerCut, WouldDamageAStoreThatIsNotSynced)
         calls.erase(std::remove_if(calls.begin(), calls.end(),
                                    [&](const DiskCall& call) { return call.kind == kind; }),
                     calls.end());
-        PowerTally tally;
-        judge(recording, Order::Kept, 1, tally);
-        EXPECT_LT(0, tally.nWrong);
+        EXPECT_LT(0, judge({recording}, Order::Kept, 1).nWrong);
     }
 }

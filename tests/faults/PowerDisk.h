@@ -32,16 +32,8 @@ enum class Order { Kept, Lost };
 // Picks one of n outcomes: from 0, the oldest, to n - 1, what was requested last.
 typedef std::function<size_t(size_t n)> Outcome;
 
-// Picks the oldest: everything that was not synced is lost.
-inline size_t onlySynced(size_t)
-{
-    return 0;
-}
-
-inline size_t asAskedFor(size_t n)
-{
-    return n - 1;
-}
+const Outcome ONLY_SYNCED = [](size_t) -> size_t { return 0; };
+const Outcome AS_ASKED_FOR = [](size_t n) { return n - 1; };
 
 class PowerDisk {
 public:
@@ -90,7 +82,7 @@ public:
     }
 
     // The files as programs see them.
-    Files files() const { return afterPowerCut(&asAskedFor); }
+    Files files() const { return afterPowerCut(AS_ASKED_FOR); }
 
 private:
     static constexpr size_t CB_SECTOR = 512;
@@ -129,7 +121,7 @@ private:
 
     void sync(Inode& inode)
     {
-        inode.strDurable = contentsAfter(inode, m_nNumber, &asAskedFor);
+        inode.strDurable = contentsAfter(inode, m_nNumber, AS_ASKED_FOR);
         for (const Change& change : inode.pending) {
             m_nDurable = std::max(m_nDurable, change.nNumber);
         }
