@@ -253,10 +253,8 @@ TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
     };
     // The writer's cache is so small that it has written most of the pages before it is killed.
     const int nStatus = statusOf(startProcess([&] {
-        sqlite3* pDb = nullptr;
-        sqlite3_open(store.path().c_str(), &pDb);
-        sqlite3_exec(pDb, "PRAGMA cache_size = 1; BEGIN; UPDATE token SET count = 99", nullptr, nullptr,
-                     nullptr);
+        const Database pDb = store.open();
+        run(pDb, "PRAGMA cache_size = 1; BEGIN; UPDATE token SET count = 99");
         raise(SIGKILL);
     }));
     EXPECT_TRUE(WIFSIGNALED(nStatus));

@@ -6,7 +6,6 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
-#include <sqlite3.h>
 #include <sys/mount.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
@@ -206,14 +205,10 @@ inline Environment stoppedHolder(const char* szSql)
 {
     return [=](const TokenStore& store) -> Leave {
         const pid_t pid = startProcess([&] {
-            sqlite3* pDb = nullptr;
-            const bool blHeld =
-                SQLITE_OK == sqlite3_open_v2(store.path().c_str(), &pDb, SQLITE_OPEN_READWRITE, "unix") &&
-                SQLITE_OK == sqlite3_exec(pDb, szSql, nullptr, nullptr, nullptr);
+            const Database pDb = store.open();
+            run(pDb, szSql);
             raise(SIGSTOP);
-            if (!blHeld || SQLITE_OK != sqlite3_exec(pDb, "COMMIT", nullptr, nullptr, nullptr)) {
-                throw std::runtime_error("the lock was not held");
-            }
+            run(pDb, "COMMIT");
         });
         int nStatus = 0;
         EXPECT_EQ(pid, waitpid(pid, &nStatus, WUNTRACED));

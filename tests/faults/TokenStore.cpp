@@ -1,12 +1,10 @@
 #include "TokenStore.h"
 
-#include <sqlite3.h>
 #include <unistd.h>
 
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <memory>
 #include <numeric>
 #include <set>
 #include <sstream>
@@ -15,22 +13,6 @@
 #include "AccessTokenDefine.h"
 
 namespace {
-
-struct Closer {
-    void operator()(sqlite3* pDb) const { sqlite3_close(pDb); }
-};
-typedef std::unique_ptr<sqlite3, Closer> Database;
-
-// Not with the default VFS, which may be the one with faults.
-Database openDatabase(const std::string& strPath)
-{
-    sqlite3* pDb = nullptr;
-    if (SQLITE_OK != sqlite3_open_v2(strPath.c_str(), &pDb, SQLITE_OPEN_READWRITE, "unix")) {
-        sqlite3_close(pDb);
-        throw std::runtime_error("cannot open " + strPath);
-    }
-    return Database(pDb);
-}
 
 int insertLine(void* pLines, int nColumns, char** szValues, char**)
 {
@@ -43,13 +25,11 @@ int insertLine(void* pLines, int nColumns, char** szValues, char**)
 }
 
 // The rows as sorted lines, or the error as "corrupt: ...".
-std::string rowsOf(sqlite3* pDb, const char* szSql)
+std::string rowsOf(const Database& pDb, const std::string& strSql)
 {
     std::multiset<std::string> lines;
-    char* szError = nullptr;
-    if (SQLITE_OK != sqlite3_exec(pDb, szSql, &insertLine, &lines, &szError)) {
-        lines = {std::string("corrupt: ") + (szError ? szError : sqlite3_errmsg(pDb))};
-        sqlite3_free(szError);
+    if (SQLITE_OK != sqlite3_exec(pDb.get(), strSql.c_str(), &insertLine, &lines, nullptr)) {
+        return std::string("corrupt: ") + sqlite3_errmsg(pDb.get());
     }
     return std::accumulate(lines.begin(), lines.end(), std::string());
 }
@@ -132,29 +112,41 @@ std::string TokenStore::state() const
     if (!std::filesystem::exists(path())) {
         return STATE_MISSING;
     }
-    const Database pDb = openDatabase(path());
-    const std::string strIntegrity = rowsOf(pDb.get(), "PRAGMA integrity_check");
+    const Database pDb = open();
+    const std::string strIntegrity = rowsOf(pDb, "PRAGMA integrity_check");
     if ("ok\n" != strIntegrity) {
         return 0 == strIntegrity.compare(0, 8, "corrupt:") ? strIntegrity : "corrupt: " + strIntegrity;
     }
-    if (rowsOf(pDb.get(), "SELECT name FROM sqlite_master WHERE type = 'table' AND name = 'token'").empty()) {
+    if (rowsOf(pDb, "SELECT name FROM sqlite_master WHERE type = 'table' AND name = 'token'").empty()) {
         return STATE_NO_TABLE;
     }
-    return rowsOf(pDb.get(), "SELECT CASE WHEN tid LIKE 'known-%' THEN rtrim(tid, 'x') ELSE 'new' END, "
-                             "bind_sid, uid, CASE WHEN deadline < strftime('%s', 'now') THEN 'past' "
-                             "WHEN deadline > 4000000000 THEN 'far' ELSE 'new' END, count, "
-                             "CASE WHEN create_time > 1000000000 THEN 'new' ELSE 'past' END, "
-                             "function, webapi_allow, extra FROM token");
+    return rowsOf(pDb, "SELECT CASE WHEN tid LIKE 'known-%' THEN rtrim(tid, 'x') ELSE 'new' END, "
+                       "bind_sid, uid, CASE WHEN deadline < strftime('%s', 'now') THEN 'past' "
+                       "WHEN deadline > 4000000000 THEN 'far' ELSE 'new' END, count, "
+                       "CASE WHEN create_time > 1000000000 THEN 'new' ELSE 'past' END, "
+                       "function, webapi_allow, extra FROM token");
 }
 
 std::string TokenStore::rows(const std::string& strSelect) const
 {
-    return rowsOf(openDatabase(path()).get(), strSelect.c_str());
+    return rowsOf(open(), strSelect);
 }
 
 void TokenStore::run(const std::string& strSql) const
 {
-    const Database pDb = openDatabase(path());
+    ::run(open(), strSql);
+}
+
+Database TokenStore::open() const
+{
+    sqlite3* pDb = nullptr;
+    const int nResult = sqlite3_open_v2(path().c_str(), &pDb, SQLITE_OPEN_READWRITE, "unix");
+    Database database(pDb, &sqlite3_close);
+    return SQLITE_OK == nResult ? std::move(database) : throw std::runtime_error("cannot open " + path());
+}
+
+void run(const Database& pDb, const std::string& strSql)
+{
     if (SQLITE_OK != sqlite3_exec(pDb.get(), strSql.c_str(), nullptr, nullptr, nullptr)) {
         throw std::runtime_error(sqlite3_errmsg(pDb.get()));
     }

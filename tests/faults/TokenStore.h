@@ -3,7 +3,10 @@
 #ifndef TESTS_TOKEN_STORE_H
 #define TESTS_TOKEN_STORE_H
 
+#include <sqlite3.h>
+
 #include <map>
+#include <memory>
 #include <string>
 
 // The contents of the files by name: of the database and, if there is one, of its journal.
@@ -13,6 +16,10 @@ const std::string DATABASE = "vemo-access-token.db";
 
 // The id of the token with this name, padded to the length of an id. TokenStore::state() shows the name.
 std::string idOf(const std::string& strName);
+
+typedef std::unique_ptr<sqlite3, decltype(&sqlite3_close)> Database;
+
+void run(const Database& pDb, const std::string& strSql);
 
 class TokenStore {
 public:
@@ -35,6 +42,9 @@ public:
     // Run SQL without the library. The rows come as sorted lines.
     std::string rows(const std::string& strSelect) const;
     void run(const std::string& strSql) const;
+
+    // A connection without the library. It does not use the default VFS, which may be the one with faults.
+    Database open() const;
 
 private:
     std::string m_strDirectory;

@@ -19,18 +19,11 @@ namespace {
 const size_t REPORTED = 12;    // operations that a failure shows
 const size_t TEXT_SHOWN = 500; // of each
 
-// Short, and with bytes that cannot be printed in hexadecimal.
 std::string shown(const Json::Value& jCall)
 {
     const std::string strText = jsonText(jCall);
-    std::string strShown;
-    for (const char c : strText.substr(0, TEXT_SHOWN)) {
-        char szByte[8];
-        snprintf(szByte, sizeof(szByte), isprint(static_cast<unsigned char>(c)) ? "%c" : "\\x%02x",
-                 static_cast<unsigned char>(c));
-        strShown += szByte;
-    }
-    return strShown + (TEXT_SHOWN < strText.size() ? "..." : "");
+    return ::testing::PrintToString(strText.substr(0, TEXT_SHOWN)) +
+           (TEXT_SHOWN < strText.size() ? "..." : "");
 }
 
 } // namespace
@@ -43,14 +36,6 @@ static std::ostream& operator<<(std::ostream& stream, const Outcome& outcome)
 }
 
 namespace {
-
-// Another connection than the library's.
-sqlite3* openDatabase(const std::string& strPath)
-{
-    sqlite3* pDb = nullptr;
-    EXPECT_EQ(SQLITE_OK, sqlite3_open_v2(strPath.c_str(), &pDb, SQLITE_OPEN_READONLY, nullptr));
-    return pDb;
-}
 
 class ModelCheck : public ::testing::Test {
 protected:
@@ -115,8 +100,7 @@ protected:
 
     const TokenStore m_files;
     Library m_library;
-    const std::unique_ptr<sqlite3, decltype(&sqlite3_close)> m_pDb{openDatabase(m_files.path()),
-                                                                   &sqlite3_close};
+    const Database m_pDb = m_files.open();
     const Table m_table{m_pDb.get()};
     Model m_model;
     Draws m_draws{seed(), m_model.rows()};
