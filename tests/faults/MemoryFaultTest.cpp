@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 #include <pwd.h>
-#include <sqlite3.h>
 
 #include <algorithm>
 #include <functional>
@@ -10,14 +9,11 @@
 
 #include "Figures.h"
 #include "Heap.h"
-#include "Interpose.h"
 #include "Oracle.h"
 
 namespace {
 
 const uid_t NOBODY_KNOWN = 3999999999;
-
-bool g_blCrossedSqlite = false;
 
 class MemoryFault : public ::testing::TestWithParam<size_t> {};
 
@@ -33,7 +29,6 @@ void failEachAllocation(const Operation& operation, bool blOwnThread = false)
         } else {
             judge();
         }
-        EXPECT_FALSE(g_blCrossedSqlite);
         const int64_t cbLive = g_cbLive;
         cbHeld = INT64_MAX == cbHeld ? cbLive : cbHeld;
         EXPECT_GE(cbHeld, cbLive); // less, when something that was kept has been given up
@@ -47,18 +42,6 @@ void failEachAllocation(const Operation& operation, bool blOwnThread = false)
 }
 
 } // namespace
-
-// Notices an exception that passes through SQLite, which is written in C and would not clean up.
-extern "C" int sqlite3_exec(sqlite3* pDb, const char* szSql, int (*callback)(void*, int, char**, char**),
-                            void* pArgument, char** pszError)
-{
-    try {
-        return NEXT(sqlite3_exec)(pDb, szSql, callback, pArgument, pszError);
-    } catch (...) {
-        g_blCrossedSqlite = true;
-        throw;
-    }
-}
 
 TEST_P(MemoryFault, LeavesNothingBehind)
 {
