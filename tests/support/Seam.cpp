@@ -96,16 +96,6 @@ struct Receiver {
     }
 };
 
-template <typename Allocation>
-void* withoutThrowing(Allocation allocation)
-{
-    try {
-        return allocation();
-    } catch (const std::bad_alloc&) {
-        return nullptr;
-    }
-}
-
 } // namespace
 
 // Whether the library calls the function that this stands in.
@@ -354,10 +344,14 @@ void* operator new(std::size_t cbSize, const std::nothrow_t&) noexcept
     if (CALLED_BY_LIBRARY && fails("operator new")) {
         return nullptr;
     }
-    return withoutThrowing([cbSize] { return ::operator new(cbSize); });
+    try {
+        return ::operator new(cbSize);
+    } catch (const std::bad_alloc&) {
+        return nullptr;
+    }
 }
 
 void* operator new[](std::size_t cbSize, const std::nothrow_t&) noexcept
 {
-    return fails("operator new[]") ? nullptr : withoutThrowing([cbSize] { return ::operator new[](cbSize); });
+    return fails("operator new[]") ? nullptr : ::operator new(cbSize, std::nothrow);
 }
