@@ -1,5 +1,6 @@
-// Each system call that is needed to open the store fails, the library's own and SQLite's: that call alone,
-// or that call and all later ones. (ShortWaits.h lets waits for a lock fail.)
+// Each call of an operation fails: that call alone, or that call and all later ones. First the system calls
+// that are needed to open the store, the library's own and SQLite's; then those that SQLite makes on the
+// store's files. (ShortWaits.h lets waits for a lock fail.)
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -9,7 +10,9 @@
 #include <cerrno>
 #include <cstdarg>
 #include <cstring>
+#include <map>
 
+#include "FaultyVfs.h"
 #include "Interpose.h"
 #include "Oracle.h"
 
@@ -29,6 +32,22 @@ bool fails(const char* szName)
 }
 
 class SystemCallFault : public ::testing::TestWithParam<const char*> {};
+
+// What SQLite's calls on files answer when they fail, by the name of the call. When others cannot fail in
+// that way, nOthers is SQLITE_OK.
+struct FileFault {
+    std::map<std::string, int> answers;
+    int nOthers;
+};
+
+const std::map<std::string, FileFault> FILE_FAULTS = {
+    {"Error", {{{"xOpen", SQLITE_CANTOPEN}, {"xWrite", SQLITE_IOERR_WRITE}}, SQLITE_IOERR}},
+    {"FullDisk", {{{"xWrite", SQLITE_FULL}}, SQLITE_OK}},
+    {"TornWrite", {{{"xWrite", SQLITE_IOERR_WRITE}}, SQLITE_OK}},
+    {"Locked", {{{"xLock", SQLITE_BUSY}}, SQLITE_OK}},
+};
+
+class IoFault : public ::testing::TestWithParam<const char*> {};
 
 } // namespace
 
@@ -83,4 +102,29 @@ TEST_P(SystemCallFault, LeavesAStateThatTheCallerKnows)
 
 INSTANTIATE_TEST_SUITE_P(Each, SystemCallFault,
                          ::testing::Values("geteuid", "seteuid", "access", "chmod", "open"),
+                         [](const auto& instance) { return instance.param; });
+
+TEST_P(IoFault, LeavesAStateThatTheCallerKnows)
+{
+    const std::string strFault = GetParam();
+    const FileFault& fault = FILE_FAULTS.at(strFault);
+    Injection injection;
+    const FaultyVfs vfs([&](const FileCall& call, const std::function<int()>& real) {
+        const auto pAnswer = fault.answers.find(call.szName);
+        const int nAnswer = fault.answers.end() == pAnswer ? fault.nOthers : pAnswer->second;
+        if (SQLITE_OK == nAnswer || !injection.fails()) {
+            return real();
+        }
+        if ("TornWrite" == strFault) {
+            call.write(call.cb / 2);
+        }
+        if (0 == strcmp("xClose", call.szName)) {
+            real(); // whatever close answers, the descriptor is gone
+        }
+        return nAnswer;
+    });
+    failEachOfAll("I/O faults", strFault, injection);
+}
+
+INSTANTIATE_TEST_SUITE_P(Each, IoFault, ::testing::Values("Error", "FullDisk", "TornWrite", "Locked"),
                          [](const auto& instance) { return instance.param; });
