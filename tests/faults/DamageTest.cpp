@@ -28,8 +28,6 @@ protected:
         }
     }
 
-    ~DamagedByte() override { alarm(0); }
-
     // Runs the first nFirst calls on a database. They may fail, or succeed with what they can still read.
     void use(const std::string& strContents, size_t nFirst = std::size(CALLS))
     {

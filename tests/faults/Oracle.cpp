@@ -21,17 +21,16 @@ namespace {
 std::string withExpired(const std::string& strState, const std::string& strOther)
 {
     std::multiset<std::string> lines;
-    std::string strLine;
-    std::istringstream state(strState);
-    while (std::getline(state, strLine)) {
-        lines.insert(strLine + "\n");
-    }
-    std::istringstream other(strOther);
-    while (std::getline(other, strLine)) {
-        if (std::string::npos != strLine.find("|past|5|")) {
-            lines.insert(strLine + "\n");
+    const auto take = [&](const std::string& strText, const char* szPart) {
+        std::istringstream text(strText);
+        for (std::string strLine; std::getline(text, strLine);) {
+            if (std::string::npos != strLine.find(szPart)) {
+                lines.insert(strLine + "\n");
+            }
         }
-    }
+    };
+    take(strState, "");
+    take(strOther, "|past|5|");
     return std::accumulate(lines.begin(), lines.end(), std::string());
 }
 

@@ -49,17 +49,18 @@ int grantAtTheGate(std::string& strTid, const char* szWebapiName, const char* sz
     request.strApi = szWebapiName ? szWebapiName : "";
     request.strMethod = szWebapiMethod ? szWebapiMethod : "";
     request.blRecord = true;
+    const auto askLibrary = [&] {
+        return VemoAccessTokenGrantEx(strTid, szWebapiName, szWebapiMethod, jToken);
+    };
     if (request.strTid.empty() || request.strApi.empty()) {
-        return VemoAccessTokenGrantEx(strTid, szWebapiName, szWebapiMethod,
-                                      jToken); // no such message can come
+        return askLibrary(); // no such message can come
     }
     const auto [answer, figures] = call(request);
     if (figures[gate::REFUSED_OWNER] || figures[gate::REFUSED_LARGE]) {
-        return VemoAccessTokenGrantEx(strTid, szWebapiName, szWebapiMethod, jToken);
+        return askLibrary();
     }
     if (figures[gate::REFUSED_MALFORMED]) {
-        // The library refuses it too, perhaps by an exception.
-        const int nResult = VemoAccessTokenGrantEx(strTid, szWebapiName, szWebapiMethod, jToken);
+        const int nResult = askLibrary(); // it refuses it too, perhaps by an exception
         return 0 > nResult ? nResult : throw std::runtime_error("the gate alone finds it malformed");
     }
     // The gate purges now and then, the library with each call.

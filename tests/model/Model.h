@@ -24,11 +24,6 @@ inline bool isGiven(const char* szText)
     return szText && szText[0];
 }
 
-inline bool isAlphanumeric(char c)
-{
-    return ('0' <= c && c <= '9') || ('a' <= c && c <= 'z') || ('A' <= c && c <= 'Z');
-}
-
 inline bool isObjectOrNull(const Json::Value& jValue)
 {
     return jValue.isObject() || jValue.isNull();
@@ -176,8 +171,9 @@ public:
     // Tells the model the id that the library has generated; it must look like one.
     void setGenerated(const std::string& strTid)
     {
-        const bool blId = TID_MIN <= strTid.size() && strTid.size() <= TID_MAX &&
-                          std::all_of(strTid.begin(), strTid.end(), &isAlphanumeric);
+        const bool blId =
+            TID_MIN <= strTid.size() && strTid.size() <= TID_MAX &&
+            std::all_of(strTid.begin(), strTid.end(), [](unsigned char c) { return isalnum(c); });
         m_strGenerated = blId ? strTid : std::string(TID_MIN, '?');
     }
 
