@@ -43,23 +43,22 @@ Oracle::Oracle(const TokenStore& store, const Operation& operation) : m_store(st
     AccessTokenApi().cleanExpireToken(true);
     m_strPurged = store.state();
     prepareStore(store, operation);
-    const Ending ending = run();
-    m_nResult = ending.nResult;
+    m_nResult = run().value_or(-1);
     m_strAfter = store.state();
     m_strAfterWithoutPurge = operation.blPurges ? withExpired(m_strAfter, m_strBefore) : m_strAfter;
-    if (ending.blNoMemory || 0 > m_nResult) {
+    if (0 > m_nResult) {
         throw std::logic_error(std::string("fails undisturbed: ") + operation.szName);
     }
 }
 
-Oracle::Ending Oracle::run() const
+std::optional<int> Oracle::run() const
 {
     try {
-        return {m_operation.run(), false};
+        return m_operation.run();
     } catch (const std::bad_alloc&) {
-        return {-1, true};
+        return std::nullopt;
     } catch (const Json::RuntimeError&) { // how jsoncpp tells that it got no memory
-        return {-1, true};
+        return std::nullopt;
     }
 }
 
@@ -83,15 +82,16 @@ std::string Oracle::judge(const std::function<void()>& arm, const std::function<
     const std::string strProcess = processState();
 
     arm();
-    const Ending ending = run();
+    const std::optional<int> result = run();
     disarm();
+    const bool blDone = result && 0 <= *result;
 
     std::string strWrong;
-    if (0 > ending.nResult && !ending.blNoMemory && !Log::text()[0]) {
+    if (result && !blDone && !Log::text()[0]) {
         strWrong += "a failure without a log line; ";
     }
-    if (0 <= ending.nResult && ending.nResult != m_nResult) {
-        strWrong += "another result: " + std::to_string(ending.nResult) + "; ";
+    if (blDone && *result != m_nResult) {
+        strWrong += "another result: " + std::to_string(*result) + "; ";
     }
     if (geteuid() != (strstr(Log::text(), "open sqlite failed") ? 0 : uidAfter())) {
         strWrong += "another effective uid; ";
@@ -106,7 +106,7 @@ std::string Oracle::judge(const std::function<void()>& arm, const std::function<
     const std::string strState = m_store.state();
     if (!allows(strState)) {
         strWrong += "a third state: " + strState.substr(0, 200) + "; ";
-    } else if (0 <= ending.nResult && !isDone(strState)) {
+    } else if (blDone && !isDone(strState)) {
         strWrong += "reported success, yet the store is: " + strState.substr(0, 200) + "; ";
     }
     return strWrong.empty() ? "" : strWrong + "log: " + std::string(Log::text()).substr(0, 2000);

@@ -7,6 +7,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 
 #include "Operations.h"
@@ -35,11 +36,7 @@ public:
     bool allows(const std::string& strState) const;
 
 private:
-    struct Ending {
-        int nResult;
-        bool blNoMemory;
-    };
-    Ending run() const;
+    std::optional<int> run() const; // nothing if there was no memory
     bool isDone(const std::string& strState) const;
 
     const TokenStore& m_store;

@@ -112,17 +112,7 @@ public:
                                      : 0;
     }
 
-    // The argument of that name:
-    //   tid, fresh     an id that a row has, mostly; an id that no row has, mostly
-    //   granted, webapi, method
-    //                  mostly what a row allows; the last two are null now and then
-    //   option, param  of a creation; of an update
-    //   name           mostly that of a field
-    //   text, texts    values of text fields, mostly ids
-    //   list           what a caller passes for a list
-    //   user, size     a buffer for the user's name
-    //   made, answer   a value that the operation must not read
-    //   uid, function, sid, sid_or_null, record, filter, flag, rare_flag
+    // The argument of that name, of those in m_draws.
     Json::Value argument(const std::string& strName) const { return m_draws.at(strName)(); }
 
 private:
@@ -136,8 +126,10 @@ private:
 
     Json::Value anything() { return oneOf(g_jAnything); }
 
+    // An id that a row has, mostly.
     Json::Value tid() { return m_rows.empty() || oneIn(4) ? oneOf(g_jTid) : row().columns[0]; }
 
+    // The same; webapi() then draws what that row allows, mostly.
     Json::Value granted()
     {
         m_jAllow = Json::Value();
@@ -149,7 +141,7 @@ private:
         return granted.columns[0];
     }
 
-    // Mostly one that the token allows: others would rarely match.
+    // Others than those that the token allows would rarely match.
     Json::Value webapi()
     {
         return m_jAllow.isObject() && !m_jAllow.empty() ? m_jAllow.getMemberNames()[below(m_jAllow.size())]
@@ -329,6 +321,7 @@ private:
         }
     }
 
+    // Values of text fields, mostly ids.
     Json::Value texts()
     {
         Json::Value jTexts(Json::arrayValue);
@@ -340,7 +333,7 @@ private:
         return jTexts;
     }
 
-    // The draw of each argument.
+    // The draw of each argument. Those that an operation must not read are "untouched".
     const std::map<std::string, std::function<Json::Value()>> m_draws = {
         {"tid", [this] { return tid(); }},
         {"fresh", [this] { return oneOf(g_jTid); }},

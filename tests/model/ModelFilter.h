@@ -81,9 +81,10 @@ inline bool isName(const std::string& strText)
            std::all_of(strText.begin(), strText.end(), isPart);
 }
 
+// Of a text, SQL gets what stands ahead of its first NUL.
 inline std::string textOf(Kind kind, const Json::Value& jValue)
 {
-    return Kind::Json == kind ? jsonText(jValue) : untilNul(jValue.asString());
+    return Kind::Json == kind ? jsonText(jValue) : jValue.asString().c_str();
 }
 
 // The library puts no separator between the elements of a list. Texts are quoted, so two quotes meet and

@@ -45,12 +45,6 @@ struct Row {
     Json::Value jRecord;              // as the library returns it
 };
 
-// A text up to its first NUL, which is what SQL gets.
-inline std::string untilNul(const std::string& strText)
-{
-    return strText.c_str();
-}
-
 // The JSON text that the table holds, and that filters compare: compact, strings byte for byte; and its
 // value.
 inline std::string jsonText(const Json::Value& jValue)

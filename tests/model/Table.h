@@ -13,13 +13,8 @@ class Table {
 public:
     explicit Table(sqlite3* pDb)
     {
-        std::string strSelect = "SELECT ";
-        for (const Field& field : FIELDS) {
-            strSelect.append(field.szName).append(",");
-        }
-        strSelect.back() = ' ';
-        strSelect += "FROM token ORDER BY rowid";
-        if (SQLITE_OK != sqlite3_prepare_v2(pDb, strSelect.c_str(), -1, &m_pSelect, nullptr)) {
+        const char* const szSelect = "SELECT * FROM token ORDER BY rowid";
+        if (SQLITE_OK != sqlite3_prepare_v2(pDb, szSelect, -1, &m_pSelect, nullptr)) {
             throw std::runtime_error(sqlite3_errmsg(pDb));
         }
     }
