@@ -8,23 +8,23 @@
 #include <algorithm>
 
 #include "Figures.h"
+#include "Operations.h"
 #include "ProcessState.h"
 #include "ShortWaits.h"
-#include "SmallStore.h"
 
 namespace {
 
 const unsigned int HANG_SEC = 60;
 const uid_t UID_CALLER = 1234;
-const char* const CALLS[] = {LISTING, GRANT, CREATION, DELETION};
+const Operation* const CALLS[] = {&LISTING, &GRANT, &GIVEN_CREATION, &DELETION};
 
 class DamagedByte : public ::testing::Test {
 protected:
     DamagedByte()
     {
         static_cast<void>(seteuid(UID_CALLER));
-        for (const char* szCall : CALLS) {
-            m_soundAnswers.push_back(call(szCall));
+        for (const Operation* pCall : CALLS) {
+            m_soundAnswers.push_back(answerOf(*pCall));
         }
     }
 
@@ -34,23 +34,23 @@ protected:
         alarm(HANG_SEC); // ends a test that hangs
         m_store.setFiles({{DATABASE, strContents}});
         for (size_t i = 0; i < nFirst; ++i) {
-            judge(CALLS[i], call(CALLS[i]), m_soundAnswers[i]);
+            judge(*CALLS[i], answerOf(*CALLS[i]), m_soundAnswers[i]);
         }
         EXPECT_EQ(0, sqlite3_memory_used());
         ++m_nDatabases;
     }
 
-    void judge(const std::string& strCall, const std::string& strAnswer, const std::string& strSound)
+    void judge(const Operation& operation, const std::string& strAnswer, const std::string& strSound)
     {
         const bool blThrown = 0 == strAnswer.find("throws: ");
         const int nResult = blThrown ? -1 : std::stoi(strAnswer);
-        EXPECT_LE(-1, nResult) << strCall;
-        if (GRANT == strCall || CREATION == strCall) {
-            EXPECT_GE(0, nResult) << strCall;
+        EXPECT_LE(-1, nResult) << operation.szName;
+        if (&GRANT == &operation || &GIVEN_CREATION == &operation) {
+            EXPECT_GE(0, nResult) << operation.szName;
         }
-        if (GRANT != strCall) { // which does not tell why it refuses
-            EXPECT_NE("-1: ", strAnswer) << strCall;
-            EXPECT_FALSE(blThrown) << strCall << strAnswer;
+        if (&GRANT != &operation) { // which does not tell why it refuses
+            EXPECT_NE("-1: ", strAnswer) << operation.szName;
+            EXPECT_FALSE(blThrown) << operation.szName << strAnswer;
         }
         ++m_nCalls;
         m_nThrown += blThrown;

@@ -119,9 +119,7 @@ const std::vector<Row> ROWS = {
 
 const std::string& expectedOf(const Row& row, const Operation& operation)
 {
-    return operation.blCreatesStore                   ? row.strFirst
-           : 0 == strcmp("listing", operation.szName) ? row.strListing
-                                                      : row.strChange;
+    return operation.blCreatesStore ? row.strFirst : &LISTING == &operation ? row.strListing : row.strChange;
 }
 
 std::string modeOf(const std::string& strPath)

@@ -3,7 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "FaultyVfs.h"
-#include "SmallStore.h"
+#include "Operations.h"
 
 namespace {
 
@@ -140,16 +140,16 @@ TEST(HostileDatabase, GetsItsAnswerFromEachCall)
     const TokenStore store;
     for (const Case& theCase : CASES) {
         SCOPED_TRACE(theCase.szName);
-        const std::pair<const char*, std::string> expected[] = {{LISTING, theCase.strListing},
-                                                                {GRANT, theCase.strGrant},
-                                                                {CREATION, theCase.strCreation},
-                                                                {DELETION, theCase.strDeletion}};
-        for (const auto& [szCall, strAnswer] : expected) {
+        const std::pair<const Operation*, std::string> expected[] = {{&LISTING, theCase.strListing},
+                                                                     {&GRANT, theCase.strGrant},
+                                                                     {&GIVEN_CREATION, theCase.strCreation},
+                                                                     {&DELETION, theCase.strDeletion}};
+        for (const auto& [pOperation, strAnswer] : expected) {
             makeSmallStore(store, theCase.strSettings);
             store.run(theCase.strSql);
             putFiles(store, theCase.files);
-            EXPECT_EQ(strAnswer, call(szCall)) << szCall;
-            EXPECT_EQ(1U, store.files().size()) << szCall;
+            EXPECT_EQ(strAnswer, answerOf(*pOperation)) << pOperation->szName;
+            EXPECT_EQ(1U, store.files().size()) << pOperation->szName;
         }
     }
 }
@@ -161,8 +161,8 @@ TEST(HostileValue, GetsItsAnswerFromAGrant)
         SCOPED_TRACE(value.szAssignment);
         makeSmallStore(store);
         store.run(setThree(value.szAssignment));
-        EXPECT_EQ("3", call(LISTING));
-        EXPECT_EQ(value.strAnswer, call(GRANT));
+        EXPECT_EQ("3", answerOf(LISTING));
+        EXPECT_EQ(value.strAnswer, answerOf(GRANT));
         EXPECT_EQ(value.strAfter, valueOfThree(store, "count || ' ' || deadline || ' ' || uid"));
     }
 }
@@ -182,12 +182,12 @@ TEST(HostileJournal, OfAnotherDatabaseIsRolledBackIntoThisOne)
             }
             return real();
         });
-        call(GRANT);
+        answerOf(GRANT);
     }
     makeSmallStore(store);
     EXPECT_EQ("3", valueOfThree(store, "count"));
     putFiles(store, {{JOURNAL, strForeign}});
-    EXPECT_EQ("3", call(LISTING));
+    EXPECT_EQ("3", answerOf(LISTING));
     EXPECT_EQ("9", valueOfThree(store, "count"));
     EXPECT_EQ(1U, store.files().size());
 }

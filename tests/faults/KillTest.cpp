@@ -20,8 +20,6 @@
 
 namespace {
 
-const Operation& CREATION = operations()[1];
-
 // Dies before the call of SQLite on its files that has that number, after it, or half-way if it is a write.
 // Returns the number of calls.
 int64_t runUntil(const Operation& operation, int64_t nFatal, uint64_t nWhere)

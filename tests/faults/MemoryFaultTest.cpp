@@ -50,7 +50,7 @@ TEST_P(MemoryFault, LeavesNothingBehind)
 
 TEST(MemoryFaultInAFreshThread, LeavesNothingBehind)
 {
-    failEachAllocation(operations()[3], true); // which reads and writes JSON
+    failEachAllocation(GRANT, true); // which reads and writes JSON
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, MemoryFault, ::testing::Range<size_t>(0, operations().size()),

@@ -1,9 +1,9 @@
 #include "Operations.h"
 
-#include <cstring>
-#include <stdexcept>
+#include <algorithm>
 
 #include "AccessTokenApi.h"
+#include "ProcessState.h"
 #include "internal/AccessTokenDbApi.h"
 #include "vemo-access-token.h"
 
@@ -113,18 +113,30 @@ const std::vector<Operation>& operations()
     return all;
 }
 
-const Operation& operationNamed(const char* szName)
-{
-    for (const Operation& operation : operations()) {
-        if (0 == strcmp(szName, operation.szName)) {
-            return operation;
-        }
-    }
-    throw std::logic_error(std::string("no operation ") + szName);
-}
-
 void prepareStore(const TokenStore& store, const Operation& operation)
 {
     static const Files files = makeStore(store);
     store.setFiles(operation.blCreatesStore ? Files() : files);
+}
+
+std::string makeSmallStore(const TokenStore& store, const std::string& strSettings)
+{
+    makeTable(store, "PRAGMA page_size = 512;" + strSettings);
+    insertToken(store, "one", "'',0,4102444800,1,1,'VPN'");
+    insertToken(store, "three", "'session',0,4102444800,3,1,'VPN'");
+    insertToken(store, "expired", "'" + std::string(300, 'e') + "',0,1,5,1,'VPN'"); // over two pages
+    return store.files().at(DATABASE);
+}
+
+std::string answerOf(const Operation& operation)
+{
+    Log::clear();
+    try {
+        const int nResult = operation.run();
+        const std::string strLine = Log::firstLine();
+        const size_t nDetails = std::min(strLine.find(", err="), strLine.find(", jTokenParam="));
+        return std::to_string(nResult) + (0 > nResult ? ": " + strLine.substr(0, nDetails) : "");
+    } catch (const Json::Exception& exception) {
+        return std::string("throws: ") + exception.what();
+    }
 }

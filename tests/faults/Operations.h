@@ -19,7 +19,14 @@ struct Operation {
 // Twelve: creating the store, and each way in which the library changes it or reads it.
 const std::vector<Operation>& operations();
 
-const Operation& operationNamed(const char* szName);
+// Some of them.
+inline const Operation& FIRST_CREATION = operations()[0];
+inline const Operation& CREATION = operations()[1];
+inline const Operation& GIVEN_CREATION = operations()[2];
+inline const Operation& GRANT = operations()[3];
+inline const Operation& DELETION = operations()[5];
+inline const Operation& LISTING = operations()[9];
+inline const Operation& DELETION_OF_ALL = operations()[11];
 
 // Makes the store that the operation starts from.
 void prepareStore(const TokenStore& store, const Operation& operation);
@@ -29,5 +36,14 @@ void prepareStore(const TokenStore& store, const Operation& operation);
 // "get" of Example.Api.
 void makeTable(const TokenStore& store, const std::string& strSettings = "");
 void insertToken(const TokenStore& store, const std::string& strName, const std::string& strColumns);
+
+// Makes a store of three tokens on pages of 512 bytes, so small that each byte can be damaged in turn. The
+// listing shows all three; GIVEN_CREATION, GRANT and DELETION use "known-given", "known-three" and
+// "known-one". Returns the bytes of its database.
+std::string makeSmallStore(const TokenStore& store, const std::string& strSettings = "");
+
+// Runs an operation on a damaged store. Returns its result ("0"); after a failure also the start of its first
+// log line ("-1: LINE"); or the JSON library's exception ("throws: WHAT"). Other exceptions pass through.
+std::string answerOf(const Operation& operation);
 
 #endif

@@ -26,11 +26,6 @@ namespace {
 
 typedef std::vector<std::function<int()>> Calls;
 
-const Operation& FIRST_CREATION = operations()[0];
-const Operation& CREATION = operations()[1];
-const Operation& LISTING = operations()[9];
-const Operation& DELETION_OF_ALL = operations()[11];
-
 // What calls of the library request of the disk.
 struct Recording {
     Files files; // found by the first call
