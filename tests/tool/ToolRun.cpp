@@ -18,11 +18,9 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cstdarg>
 #include <cstddef>
 #include <cstdlib>
 #include <cstring>
-#include <filesystem>
 #include <thread>
 
 #include "Heap.h"
@@ -87,17 +85,6 @@ int handOverCalls()
         syscall(__NR_seccomp, SECCOMP_SET_MODE_FILTER, SECCOMP_FILTER_FLAG_NEW_LISTENER, &filter));
 }
 
-bool g_blTool = false;             // whether this process is the tool
-const Fault* g_pWaiting = nullptr; // for the command to begin
-
-void failMemory(const Fault& fault)
-{
-    g_pWaiting = nullptr;
-    g_allocations.nFirst = fault.nFirst;
-    g_allocations.nLast = fault.nLast;
-    g_allocations.blRunning = true;
-}
-
 // The child: it is the tool from here on.
 [[noreturn]] void beTool(std::vector<std::string> strArguments, const Fault& fault, int64_t& nAllocations)
 {
@@ -110,12 +97,11 @@ void failMemory(const Fault& fault)
     if (0 != fault.nSignal) {
         signal(fault.nSignal, SIG_DFL); // which jobs in the background inherit as ignored
     }
-    g_blTool = true;
     sqlite3_shutdown(); // for it to begin from nothing
-    if (Fault::Kind::Parsing == fault.kind) {
-        failMemory(fault);
-    } else if (Fault::Kind::Memory == fault.kind) {
-        g_pWaiting = &fault;
+    if (Fault::Kind::Memory == fault.kind) {
+        g_allocations.nFirst = fault.nFirst;
+        g_allocations.nLast = fault.nLast;
+        g_allocations.blRunning = true;
     }
     const int nStatus = toolMain(static_cast<int>(rgArguments.size() - 1), rgArguments.data());
     nAllocations = g_allocations.nCalls;
@@ -137,9 +123,6 @@ public:
                 continue; // it was killed meanwhile
             }
             const bool blSync = __NR_fsync == call.data.nr || __NR_fdatasync == call.data.nr;
-            if (blSync) {
-                m_strSynced.push_back(fileOf(call));
-            }
             struct seccomp_notif_resp response = {};
             response.id = call.id;
             response.error = -errorOf(call);
@@ -150,12 +133,15 @@ public:
     }
 
     int64_t count() const { return m_nCalls; }
-    const std::vector<std::string>& synced() const { return m_strSynced; }
 
 private:
     // The errno with which a call fails, or 0.
     int errorOf(const struct seccomp_notif& call)
     {
+        if (__NR_openat == call.data.nr && O_TMPFILE == (call.data.args[2] & O_TMPFILE) &&
+            getenv("VEMO_TEST_NO_TMPFILE")) {
+            return EOPNOTSUPP;
+        }
         if (!isMet(call.data) || ++m_nCalls < m_fault.nFirst || m_fault.nLast < m_nCalls) {
             return 0;
         }
@@ -172,20 +158,13 @@ private:
     {
         const bool blSentence =
             (__NR_write == call.nr || __NR_writev == call.nr) && STDERR_FILENO == call.args[0];
-        return !m_fault.isOfMemory() && !blSentence &&
+        return Fault::Kind::Memory != m_fault.kind && !blSentence &&
                (Fault::Kind::Signal != m_fault.kind || __NR_getrandom != call.nr) &&
                (Fault::Kind::FullDisk != m_fault.kind || takesRoom(call));
     }
 
-    static std::string fileOf(const struct seccomp_notif& call)
-    {
-        return std::filesystem::read_symlink("/proc/" + std::to_string(call.pid) + "/fd/" +
-                                             std::to_string(call.data.args[0]));
-    }
-
     const Fault m_fault;
     int64_t m_nCalls = 0;
-    std::vector<std::string> m_strSynced;
 };
 
 // Closes a file without a name, and returns what was written to it.
@@ -198,56 +177,27 @@ std::string textOf(int nFile)
     return strText;
 }
 
-int syncIfTool(long nCall, int nFile)
-{
-    return g_blTool ? static_cast<int>(syscall(nCall, nFile)) : 0;
-}
-
 } // namespace
 
-// The test waits for no disk, but the syncs of the tool must come to be answered.
+// Where syncs do nothing for the tests, the tool's must come to be answered.
 extern "C" int fsync(int nFile)
 {
-    return syncIfTool(__NR_fsync, nFile);
+    return static_cast<int>(syscall(__NR_fsync, nFile));
 }
 
 extern "C" int fdatasync(int nFile)
 {
-    return syncIfTool(__NR_fdatasync, nFile);
-}
-
-// As on a file system that has no files without a name, with VEMO_TEST_NO_TMPFILE.
-extern "C" int openat(int nDirectory, const char* szPath, int nFlags, ...)
-{
-    if (g_blTool && O_TMPFILE == (nFlags & O_TMPFILE) && getenv("VEMO_TEST_NO_TMPFILE")) {
-        errno = EOPNOTSUPP;
-        return -1;
-    }
-    va_list arguments;
-    va_start(arguments, nFlags);
-    const mode_t nMode = va_arg(arguments, mode_t);
-    va_end(arguments);
-    return NEXT(openat)(nDirectory, szPath, nFlags, nMode);
+    return static_cast<int>(syscall(__NR_fdatasync, nFile));
 }
 
 // The processes of the machine are others in each run.
 extern "C" DIR* opendir(const char* szPath)
 {
-    if (g_blTool && 0 == strcmp(szPath, "/proc/")) {
+    if (0 == strcmp(szPath, "/proc/")) {
         errno = ENOENT;
         return nullptr;
     }
     return NEXT(opendir)(szPath);
-}
-
-// Each command begins by asking who runs it. Stands in front of the redirection's.
-extern "C" uid_t geteuid() noexcept
-{
-    const uid_t uid = NEXT(geteuid)();
-    if (g_pWaiting) {
-        failMemory(*g_pWaiting);
-    }
-    return uid;
 }
 
 bool canRunTool()
@@ -265,7 +215,7 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
     const int nError = memfd_create("error", MFD_CLOEXEC);
     int nCalls = -1;
     pid_t pid = -1;
-    if (fault.isOfMemory()) {
+    if (Fault::Kind::Memory == fault.kind) {
         getpwuid(0); // the first look-up of a process must not lack memory: glibc does not handle that
     }
     fflush(nullptr);
@@ -291,7 +241,6 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
     ending.nStatus = WIFEXITED(nStatus) ? WEXITSTATUS(nStatus) : 0;
     ending.strOutput = textOf(nOutput);
     ending.strError = textOf(nError);
-    ending.strSynced = calls.synced();
-    ending.nCalls = fault.isOfMemory() ? rgAllocations[0] : calls.count();
+    ending.nCalls = Fault::Kind::Memory == fault.kind ? rgAllocations[0] : calls.count();
     return ending;
 }

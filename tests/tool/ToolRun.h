@@ -13,15 +13,12 @@ struct Fault {
         Error,    // a system call on a file fails
         FullDisk, // a system call that takes room on the disk fails
         Signal,   // the process gets a signal in front of a system call on a file
-        Memory,   // an allocation of the command fails
-        Parsing,  // an allocation fails, before the command begins too
+        Memory,   // an allocation fails
     };
     Kind kind = Kind::Error;
     int64_t nFirst = 0;
     int64_t nLast = -1;
     int nSignal = 0;
-
-    bool isOfMemory() const { return Kind::Memory == kind || Kind::Parsing == kind; }
 };
 
 struct Ending {
@@ -29,14 +26,13 @@ struct Ending {
     int nStatus = 0;
     std::string strOutput;
     std::string strError;
-    int64_t nCalls = 0;                 // that the fault could happen to
-    std::vector<std::string> strSynced; // one after the other
+    int64_t nCalls = 0; // that the fault could happen to
 };
 
 // Whether the kernel lets one process answer the system calls of another. Otherwise the tool cannot be run.
 bool canRunTool();
 
-// Nothing waits for the disk.
+// Nothing waits for the disk. With VEMO_TEST_NO_TMPFILE, the file system has no files without a name.
 Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault = {});
 
 #endif
