@@ -58,7 +58,18 @@ def head_of(size):
     return empty.replace("X: ", "X: " + "x" * (size - len(empty)))
 
 
+def headers(text):
+    """A call with these headers besides, and what would be another call if they were taken for the end of a body."""
+    return call(text + "\r\n") + "0\r\n\r\n" + GOOD
+
+
+def rows(name, send, expected, *texts):
+    """Rows of texts that are sent in the same form and get the same."""
+    return [(f"{name} {text!r}", send(text), expected) for text in texts]
+
+
 GOOD = call()
+OLD = "GET /grant/Api/get HTTP/1.0\r\n"
 
 # What a client sends, and all that comes back, response by response. The client then sends nothing more and reads on
 # until the gate ends the connection. CLOSE: the response says that it does.
@@ -69,113 +80,76 @@ ROWS = [
     ("a refusal between calls", GOOD + target("/grant/Other") + GOOD, [GRANTED, REFUSED, GRANTED]),
     ("a call without an id between calls", GOOD + call(auth="") + GOOD, [GRANTED, UNAUTHORIZED, GRANTED]),
     ("a call behind a malformed target", target("/other") + GOOD, [MALFORMED, GRANTED]),
-    ("a call behind a malformed head", call(" folded\r\n") + GOOD, [MALFORMED + CLOSE]),
     ("a call behind a body", call("Content-Length: 4\r\n") + "body" + GOOD, [GRANTED + CLOSE]),
     ("a call as a body", call("Content-Length: 999\r\n") + GOOD, [GRANTED + CLOSE]),
-    ("a call behind chunks", call("Transfer-Encoding: chunked\r\n") + "0\r\n\r\n" + GOOD, [GRANTED + CLOSE]),
     ("a call as a chunk", call("Transfer-Encoding: chunked\r\n") + "ff\r\n" + GOOD, [GRANTED + CLOSE]),
-    *(("a call behind one of Connection: " + options, call("Connection: " + options + "\r\n") + GOOD, [GRANTED + CLOSE])
-      for options in ("close", "x,\tCLOSE ,y", "keep-alive\r\nConnection: close")),
-    ("a call behind one that nearly closes", call("Connection: closed, x-close\r\n") + GOOD, [GRANTED, GRANTED]),
     ("nothing", "", []),
     ("half a call", GOOD[:-1], [MALFORMED + CLOSE]),
     ("a call and a half", GOOD + GOOD[:20], [GRANTED, MALFORMED + CLOSE]),
     ("a call and a NUL", GOOD + "\0", [GRANTED, MALFORMED + CLOSE]),
-    ("an empty line first", "\r\n" + GOOD, [MALFORMED + CLOSE]),
     # methods
-    *((method, by(method), [GRANTED]) for method in
-      ("POST", "PUT", "DELETE", "PATCH", "OPTIONS", "PROPFIND", "get", "M-SEARCH", "X" * 1000)),
-    ("HEAD", by("HEAD"), [GRANTED]),
+    *rows("the method", by, [GRANTED], "POST", "PUT", "DELETE", "PATCH", "OPTIONS", "PROPFIND", "get", "M-SEARCH",
+          "X" * 1000, "HEAD"),
     ("HEAD that wants a record", call("Accept: application/json\r\n", line=LINE.replace("GET", "HEAD")), [RECORD]),
     ("CONNECT", by("CONNECT") + GOOD, [NOT_ALLOWED, GRANTED]),
     ("CONNECT to a host", call(line="CONNECT example.org:443 HTTP/1.1\r\n"), [NOT_ALLOWED]),
     ("TRACE", by("TRACE"), [NOT_ALLOWED]),
-    ("a method that is no token", by("GE(T"), [MALFORMED + CLOSE]),
-    ("a method alone", call(line="GET\r\n"), [MALFORMED + CLOSE]),
-    ("no method", call(line=" /grant/Api/get HTTP/1.1\r\n"), [MALFORMED + CLOSE]),
     # other protocols and versions
-    ("TLS 1.3", "\x16\x03\x01\x02\x00\x01\x00\x01\udcfc\x03\x03" + "".join(map(chr, range(128))), [MALFORMED + CLOSE]),
-    ("SSL 2", "\udc80\x2e\x01\x00\x02" + "\0" * 44, [MALFORMED + CLOSE]),
-    ("HTTP/2 preface", "PRI * HTTP/2.0\r\n\r\nSM\r\n\r\n", [MALFORMED + CLOSE]),
-    ("HTTP/0.9", "GET /grant/Api/get\r\n", [MALFORMED + CLOSE]),
-    ("HTTP/0.9 with headers", call(line="GET /grant/Api/get\r\n"), [MALFORMED + CLOSE]),
-    ("a newer version", call(line="GET /grant/Api/get HTTP/1.2\r\n"), [MALFORMED + CLOSE]),
-    ("a version and a blank", call(line="GET /grant/Api/get HTTP/1.1 \r\n"), [MALFORMED + CLOSE]),
-    ("a version in small letters", call(line="GET /grant/Api/get http/1.1\r\n"), [MALFORMED + CLOSE]),
-    ("a version of another size", call(line="GET /grant/Api/get HTTP/1.10\r\n"), [MALFORMED + CLOSE]),
+    *rows("what begins with", lambda text: text + "\r\n" + GOOD, [MALFORMED + CLOSE],
+          # an empty line, TLS 1.3, SSL 2, a proxy, HTTP/2, HTTP/0.9
+          "", "\x16\x03\x01\x02\x00\x01\x00\x01\udcfc\x03\x03", "\udc80\x2e\x01\x00\x02\0\0", "PROXY UNIX",
+          "PRI * HTTP/2.0\r\n\r\nSM\r\n", "GET /grant/Api/get"),
+    *rows("the first line", lambda text: call(line=text + "\r\n"), [MALFORMED + CLOSE],
+          "GET /grant/Api/get", "GET /grant/Api/get HTTP/1.2", "GET /grant/Api/get HTTP/1.1 ",
+          "GET /grant/Api/get http/1.1", "GET /grant/Api/get HTTP/1.10", "GET", " /grant/Api/get HTTP/1.1",
+          "GE(T /grant/Api/get HTTP/1.1"),
     ("an offered upgrade", call("Connection: Upgrade, HTTP2-Settings\r\nUpgrade: h2c\r\n"), [GRANTED]),
-    ("HTTP/1.0", call(line="GET /grant/Api/get HTTP/1.0\r\n") + GOOD, [GRANTED + CLOSE]),
-    ("HTTP/1.0 without Host", call(line="GET /grant/Api/get HTTP/1.0\r\n", host=""), [GRANTED + CLOSE]),
-    ("HTTP/1.0 that goes on", call("Connection: Keep-Alive\r\n", line="GET /grant/Api/get HTTP/1.0\r\n") + GOOD,
-     [GRANTED + " keep-alive", GRANTED]),
-    ("HTTP/1.0 in chunks", call("Transfer-Encoding: chunked\r\n", line="GET /grant/Api/get HTTP/1.0\r\n"),
-     [MALFORMED + CLOSE]),
-    ("a proxy's preface", "PROXY UNIX\r\n" + GOOD, [MALFORMED + CLOSE]),
-    # bodies
-    *(("a length of " + length, call("Content-Length: " + length + "\r\n") + GOOD, [GRANTED, GRANTED]) for length in
-      ("0", "000")),
-    *(("a body of " + length + " that does not come", call("Content-Length: " + length + "\r\n"), [GRANTED + CLOSE])
-      for length in ("10", "9" * 18)),
-    ("a body to be asked for", call("Content-Length: 5\r\nExpect: 100-continue\r\n"), [GRANTED + CLOSE]),
-    ("no body to be asked for", call("Expect: 100-continue\r\n"), [GRANTED]),
-    ("two lengths", call("Content-Length: 4\r\nContent-Length: 5\r\n") + "body", [MALFORMED + CLOSE]),
-    ("two equal lengths", call("Content-Length: 4\r\nContent-Length: 4\r\n") + "body", [MALFORMED + CLOSE]),
-    ("a list of lengths", call("Content-Length: 4, 4\r\n") + "body", [MALFORMED + CLOSE]),
-    ("length and chunks", call("Content-Length: 4\r\nTransfer-Encoding: chunked\r\n") + "0\r\n\r\n",
-     [MALFORMED + CLOSE]),
-    ("chunks and length", call("Transfer-Encoding: chunked\r\nContent-Length: 4\r\n") + "0\r\n\r\n",
-     [MALFORMED + CLOSE]),
-    *(("a length of " + repr(length), call("Content-Length: " + length + "\r\n"), [MALFORMED + CLOSE]) for length in
-      ("", "-1", "+1", "1.0", "0x10", "1e1", "1 1", "1000000000000000000", "18446744073709551616", "\u0661")),
-    *(("coded as " + repr(coding), call("Transfer-Encoding:" + coding + "\r\n") + "0\r\n\r\n" + GOOD,
-       [MALFORMED + CLOSE]) for coding in
-      ("", " identity", " gzip", " chunked, gzip", " gzip, chunked", " chunked, identity", " chunked;q=1",
-       " chunked, chunked", " xchunked", " \"chunked\"", " chunked\r\nTransfer-Encoding: chunked",
-       " chunked\r\nTransfer-Encoding: identity", "\x0bchunked")),
-    *(("coded as " + repr(coding), call("Transfer-Encoding:" + coding + "\r\n"), [GRANTED + CLOSE]) for coding in
-      ("chunked", " CHUNKED", "\t chunked \t")),
-    ("a coding whose name is not one", call("Transfer-Encoding : chunked\r\n"), [MALFORMED + CLOSE]),
-    ("a coding by another name", call("Transfer_Encoding: chunked\r\n") + GOOD, [GRANTED, GRANTED]),
+    ("HTTP/1.0", call(line=OLD) + GOOD, [GRANTED + CLOSE]),
+    ("HTTP/1.0 without Host", call(line=OLD, host=""), [GRANTED + CLOSE]),
+    ("HTTP/1.0 that goes on", call("Connection: Keep-Alive\r\n", line=OLD) + GOOD, [GRANTED + " keep-alive", GRANTED]),
+    ("HTTP/1.0 in chunks", call("Transfer-Encoding: chunked\r\n", line=OLD), [MALFORMED + CLOSE]),
+    # bodies, and what else ends a connection
+    *rows("behind", headers, [GRANTED + CLOSE], "Content-Length: 10", "Content-Length: " + "9" * 18,
+          "Content-Length: 5\r\nExpect: 100-continue", "Transfer-Encoding:chunked", "Transfer-Encoding: CHUNKED",
+          "Transfer-Encoding:\t chunked \t", "Connection: close", "Connection: x,\tCLOSE ,y",
+          "Connection: keep-alive\r\nConnection: close"),
+    *rows("a call behind", lambda text: call(text + "\r\n") + GOOD, [GRANTED, GRANTED], "Content-Length: 0",
+          "Content-Length: 000", "Expect: 100-continue", "Transfer_Encoding: chunked", "Connection: closed, x-close",
+          "X: close, application/json", "X: \u00e4\udcff", "X: a\tb"),
+    *rows("a length of", lambda text: headers("Content-Length: " + text), [MALFORMED + CLOSE], "", "-1", "+1", "1.0",
+          "0x10", "1e1", "1 1", "4, 4", "1000000000000000000", "18446744073709551616", "\u0661",
+          "4\r\nContent-Length: 5", "4\r\nContent-Length: 4", "4\r\nTransfer-Encoding: chunked"),
+    *rows("coded as", lambda text: headers("Transfer-Encoding:" + text), [MALFORMED + CLOSE], "", " identity", " gzip",
+          " chunked, gzip", " gzip, chunked", " chunked, identity", " chunked;q=1", " chunked, chunked", " xchunked",
+          " \"chunked\"", " chunked\r\nTransfer-Encoding: chunked", " chunked\r\nTransfer-Encoding: identity",
+          " chunked\r\nContent-Length: 4", "\x0bchunked"),
     # lines
+    *rows("the header", headers, [MALFORMED + CLOSE], "Transfer-Encoding : chunked", "X: a\r\n b", " X: a", "X", ": x",
+          "X : a", "X: a\rb", "X: a\0b", "X\0: a", "X: \x07", "X: \x7f", "X\u00e4: 1", "X: a\nX: b", "X: a\r",
+          "Host: gate"),
     ("bare LF everywhere", GOOD.replace("\r\n", "\n"), [MALFORMED + CLOSE]),
     ("bare LF behind the first line", GOOD.replace("\r\n", "\n", 1), [MALFORMED + CLOSE]),
-    ("bare LF behind a header", GOOD.replace(HOST, "Host: gate\n"), [MALFORMED + CLOSE]),
     ("bare LF at the end", GOOD[:-2] + "\n", [MALFORMED + CLOSE]),
-    ("bare CR in a value", call("X: a\rb\r\n"), [MALFORMED + CLOSE]),
     ("bare CR for a line", GOOD.replace("\r\n", "\r"), [MALFORMED + CLOSE]),
-    ("CR CR LF", GOOD[:-2] + "\r\r\n", [MALFORMED + CLOSE]),
-    ("a folded header", call("X: a\r\n b\r\n"), [MALFORMED + CLOSE]),
     ("a folded id", call(auth="Authorization: Bearer\r\n {id}\r\n"), [MALFORMED + CLOSE]),
-    ("a header that begins with a blank", call(" X: a\r\n"), [MALFORMED + CLOSE]),
-    ("a header without a colon", call("X\r\n"), [MALFORMED + CLOSE]),
-    ("a header without a name", call(": x\r\n"), [MALFORMED + CLOSE]),
-    ("a blank ahead of the colon", call("X : a\r\n"), [MALFORMED + CLOSE]),
-    ("a NUL in a value", call("X: a\0b\r\n"), [MALFORMED + CLOSE]),
-    ("a NUL in a name", call("X\0: a\r\n"), [MALFORMED + CLOSE]),
     ("a NUL behind the id", bearer("Bearer {id}\0"), [MALFORMED + CLOSE]),
-    ("a bell in a value", call("X: \x07\r\n"), [MALFORMED + CLOSE]),
-    ("a DEL in a value", call("X: \x7f\r\n"), [MALFORMED + CLOSE]),
-    ("a name beyond ASCII", call("X\u00e4: 1\r\n"), [MALFORMED + CLOSE]),
-    ("a value beyond ASCII", call("X: \u00e4\udcff\r\n"), [GRANTED]),
-    ("a tab in a value", call("X: a\tb\r\n"), [GRANTED]),
     ("no Host", call(host=""), [MALFORMED + CLOSE]),
-    ("two Hosts", call(HOST), [MALFORMED + CLOSE]),
     ("an empty Host", call(host="Host:\r\n"), [GRANTED]),
     # targets
-    *((text, target(text), [GRANTED]) for text in
-      ("/grant/Api", "/grant/Api?/put", "/grant/Api/get/", "/grant/Api/get/x/../../%00//?y=/z", "/grant/%41pi/ge%74",
-       "/grant/Example.Page/\u00e4++", "/grant/Example.Page/%c3%A4%2b+?x=%zz")),
-    *((repr(text), target(text), [REFUSED]) for text in
-      ("/grant/Api/get%2500", "/grant/%252F/%25", "/grant/.../..%20", "/grant/" + "a" * 512 + "/" + "a" * 512)),
-    *((text, target(text), [MALFORMED]) for text in
-      ("/grant", "/grant/", "/grant/?x", "/grant//Api/get", "//grant/Api/get", "/grants/Api", "/Grant/Api", "/health",
-       "/grant/Api/", "/grant/Api//get", "/grant/Api/?get",  # the API alone would allow more than a method
-       "/grant/Api%2Fget", "/grant/Api/%2f", "/grant/Api%00", "/grant/Api/get%00", "/grant/Api/get%7", "/grant/Api%",
-       "/grant/Api%4/1", "/grant/Api%4g", "/grant/Api/%xx", "/grant/Api%-1", "/grant/Api#/get", "/grant/Api/get?x#y",
-       "/grant/./Api/get", "/grant/Other/../Api/get", "/grant/Other/%2e./Api", "/grant/Api/%2e%2E/x", "/grant/Api/..",
-       "/grant/Api/.", "http://gate/grant/Api/get", "*", "\\grant\\Api\\get")),
-    *((repr(text), target(text), [MALFORMED + CLOSE]) for text in
-      ("/grant/Api/get\0", "/grant/Api/get x", "/grant/Api/get\tx", " /grant/Api/get")),
+    *rows("the target", target, [GRANTED],
+          "/grant/Api", "/grant/Api?/put", "/grant/Api/get/", "/grant/Api/get/x/../../%00//?y=/z", "/grant/%41pi/ge%74",
+          "/grant/Example.Page/\u00e4++", "/grant/Example.Page/%c3%A4%2b+?x=%zz"),
+    *rows("the target", target, [REFUSED],
+          "/grant/Api/get%2500", "/grant/%252F/%25", "/grant/.../..%20", "/grant/" + "a" * 512 + "/" + "a" * 512),
+    *rows("the target", target, [MALFORMED],
+          "/grant", "/grant/", "/grant/?x", "/grant//Api/get", "//grant/Api/get", "/grants/Api", "/Grant/Api",
+          "/grant/Api/", "/grant/Api//get", "/grant/Api/?get",  # the API alone would allow more than a method
+          "/grant/Api%2Fget", "/grant/Api/%2f", "/grant/Api%00", "/grant/Api/get%00", "/grant/Api/get%7", "/grant/Api%",
+          "/grant/Api%4/1", "/grant/Api%4g", "/grant/Api/%xx", "/grant/Api%-1", "/grant/Api#/get", "/grant/Api/get?x#y",
+          "/grant/./Api/get", "/grant/Other/../Api/get", "/grant/Other/%2e./Api", "/grant/Api/%2e%2E/x", "/health",
+          "/grant/Api/..", "/grant/Api/.", "http://gate/grant/Api/get", "*", "\\grant\\Api\\get"),
+    *rows("the target", target, [MALFORMED + CLOSE],
+          "/grant/Api/get\0", "/grant/Api/get x", "/grant/Api/get\tx", " /grant/Api/get"),
     ("too long an API", target("/grant/" + "a" * 513), [TOO_LONG]),
     ("too long a method", target("/grant/Api/" + "a" * 513), [TOO_LONG]),
     ("the longest line", target("/grant/Api/get/" + "a" * (16384 - 28)), [GRANTED]),
@@ -191,29 +165,21 @@ ROWS = [
     ("too large a head", head_of(65537), [TOO_LARGE + CLOSE]),
     ("a header without an end", LINE + "X: " + "x" * 200000, [TOO_LARGE + CLOSE]),
     # ids
-    *(("an unknown id of %d bytes" % size, bearer("Bearer " + "x" * size), [REFUSED]) for size in
-      (1, 126, 127, 128, 255, 256, 1023, 1025, 8000)),
+    *rows("an unknown id of this size:", lambda size: bearer("Bearer " + "x" * size), [REFUSED],
+          1, 126, 127, 128, 255, 256, 1023, 1025, 8000),
+    *rows("the credential", lambda text: bearer("Bearer " + text), [REFUSED], "{id:.126}", "{id}x", BLANK_ID, "{id} x",
+          "{id}, Bearer {id}", '"{id}"', "%", "';DROP/**/TABLE/**/token;--"),
     ("the longest id", bearer("Bearer " + LONGEST_ID), [GRANTED]),
-    ("the beginning of an id", bearer("Bearer {id:.126}"), [REFUSED]),
-    ("an id and a letter", bearer("Bearer {id}x"), [REFUSED]),
-    ("an id with blanks in it", bearer("Bearer " + BLANK_ID), [REFUSED]),
-    ("an id and a word", bearer("Bearer {id} x"), [REFUSED]),
-    ("two ids in one header", bearer("Bearer {id}, Bearer {id}"), [REFUSED]),
-    ("a quoted id", bearer('Bearer "{id}"'), [REFUSED]),
-    ("a pattern for ids", bearer("Bearer %"), [REFUSED]),
-    ("an id that ends a statement", bearer("Bearer ';DROP/**/TABLE/**/token;--"), [REFUSED]),
     ("an id with blanks around it", call(auth="AUTHORIZATION: \tBEARER   {id}\t \r\n"), [GRANTED]),
     ("no header for an id", call(auth=""), [UNAUTHORIZED]),
-    *(("a credential of " + repr(text), bearer(text), [UNAUTHORIZED]) for text in
-      ("", "Bearer", "Bearer ", "Bearer\t{id}", "Bearer:{id}", "{id}", "Basic {id}", "Token {id}", "bearer{id}")),
+    *rows("the credential", bearer, [UNAUTHORIZED],
+          "", "Bearer", "Bearer ", "Bearer\t{id}", "Bearer:{id}", "{id}", "Basic {id}", "Token {id}", "bearer{id}"),
     ("two headers for an id", call(AUTH), [MALFORMED]),
     ("a second, empty header", call("authorization:\r\n"), [MALFORMED]),
     ("a header for proxies", call(auth="Proxy-" + AUTH), [UNAUTHORIZED]),
     # records
-    ("a record", call("Accept: application/json\r\n"), [RECORD]),
-    ("a record among others", call("Accept: text/html, Application/JSON;q=0.1\r\n"), [RECORD]),
-    ("a record in the second of two headers", call("Accept: text/*\r\nACCEPT:application/json\r\n"), [RECORD]),
-    ("another header", call("X: close, application/json\r\n") + GOOD, [GRANTED, GRANTED]),
+    *rows("a record by", lambda text: call(text + "\r\n"), [RECORD], "Accept: application/json",
+          "Accept: text/html, Application/JSON;q=0.1", "Accept: text/*\r\nACCEPT:application/json"),
     ("what looks like a record", call("Accept: application/json-seq, */*\r\n"), [GRANTED]),
     # keys of repetitions
     ("a key", call(once("1")) * 3, [GRANTED] + [AGAIN] * 2),
@@ -290,7 +256,6 @@ class Requests(scene.Scene):
         return responses(received, sent)
 
     def test_each_is_answered_exactly(self):
-        self.assertGreaterEqual(len(ROWS), 100)
         self.assertEqual(len({row[0] for row in ROWS}), len(ROWS))
         before, told = self.told(), collections.Counter(["200"])  # that answer
         idle = [self.connect() for _ in range(100)]  # more than the descriptors that it was started with
