@@ -80,6 +80,8 @@ class Exactness(scene.Scene):
         with self.clients():
             for number in range(30):
                 by_tool[self.grant_by_tool(self.ids[number % 3]), number % 3 == 2] += 1
+                for path in ("/health", "/metrics"):
+                    self.assertEqual(self.answer("status", path=path)[0], 200, "nothing is in the way of a look")
             self.assertTrue(scene.is_within(10, lambda: self.answers[403]), "the third token has few uses")
         self.assertEqual(before - self.left(), self.answers[200] + by_tool[200, False] + by_tool[200, True])
         self.assertEqual(by_tool[200, False], 20, "nothing is in the way of the tool")

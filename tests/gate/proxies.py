@@ -1,5 +1,5 @@
 #!/usr/bin/python3 -B
-"""The examples of examples/gate/ in front of the gate: nginx, Caddy, both at once, clients in four languages, and a
+"""The examples of examples/gate/ in front of the gate: nginx, Caddy, clients in four languages, and a
 front end on another machine. Of the examples, only paths and addresses are replaced. scene.py tells the usage.
 """
 import http.server
@@ -227,51 +227,6 @@ class Caddy(Proxy, Scene):
     def setUpClass(cls):
         super().setUpClass()
         cls.start_caddy()
-
-
-class Both(Scene):
-    """The two proxies, a client of the gate's and the tool spend the uses of one token, while its status is asked."""
-    PROGRAMS = ("nginx", "caddy")
-
-    @classmethod
-    def setUpClass(cls):
-        super().setUpClass()
-        cls.start_web_server()
-        cls.start_caddy()
-
-    def test_grant_as_often_as_the_token_has_uses(self):
-        uses = 200
-        id = self.token(uses)
-        ends = {"nginx": lambda: self.answer("nginx", path="/files/a", id=id)[0],
-                "caddy": lambda: self.answer("caddy", path="/files/a", id=id)[0],
-                "calls": lambda: self.answer("calls", path="/grant/Example.Page/get", id=id)[0],
-                "tool": lambda: self.grant_by_tool(id, "Example.File")}
-        told = {name: [] for name in (*ends, "/health", "/metrics")}
-        is_over = threading.Event()
-
-        def spend(name):
-            while 403 not in told[name]:
-                told[name].append(ends[name]())
-
-        def look(name):
-            while not is_over.is_set():
-                told[name].append(self.answer("status", path=name)[0])
-
-        spenders = [threading.Thread(target=spend, args=(name,)) for name in list(ends) * 2]
-        lookers = [threading.Thread(target=look, args=(name,)) for name in ("/health", "/metrics")]
-        for thread in spenders + lookers:
-            thread.start()
-        for thread in spenders:
-            thread.join()
-        is_over.set()
-        for thread in lookers:
-            thread.join()
-
-        granted = {name: told[name].count(200) for name in ends}
-        self.assertEqual({name: set(told[name]) for name in ends}, {name: {200, 403} for name in ends})
-        self.assertEqual(sum(granted.values()), uses)
-        self.assertEqual(set(told["/health"] + told["/metrics"]), {200})
-        self.assertTrue(self.is_soon('vemo_gate_calls_total{outcome="granted"}', uses - granted["tool"]))
 
 
 class ManyMachines(Scene):
