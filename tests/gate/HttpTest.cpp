@@ -35,40 +35,6 @@ TEST(Response, EscapesNamesThatNoHeaderCanCarry)
                                "X-Token-Uid: 4294967294\r\nX-Token-Function: ~!\r\nCache"));
 }
 
-TEST(Repeats, HaveTheAnswerOfTheFirstForFiveSeconds)
-{
-    for (const Outcome outcome : {Outcome::Granted, Outcome::Refused}) {
-        Repeats repeats;
-        EXPECT_FALSE(repeats.find("key", 1, 0));
-        ASSERT_TRUE(repeats.find("key", 2, 1));
-        EXPECT_EQ(1U, repeats.find("key", 2, 1)->nCall);
-        EXPECT_FALSE(repeats.find("key", 2, 1)->blAnswered);
-        EXPECT_FALSE(repeats.find("other", 2, 1));
-        repeats.answer("key", answerOf(1, outcome, "{}"));
-        const Repeats::Remembered* pRemembered = repeats.find("key", 3, 5 * gate::SECOND - 1);
-        ASSERT_TRUE(pRemembered);
-        EXPECT_TRUE(pRemembered->blAnswered);
-        EXPECT_EQ(outcome, pRemembered->answer.outcome);
-        EXPECT_EQ("{}", pRemembered->answer.strRecord);
-        EXPECT_FALSE(repeats.find("key", 3, 5 * gate::SECOND));
-    }
-}
-
-TEST(Repeats, AreAskedAnewAfterAnAnswerThatSpentNothing)
-{
-    for (const Outcome outcome : {Outcome::Failed, Outcome::Late, Outcome::Cancelled}) {
-        Repeats repeats;
-        repeats.find("key", 1, 0);
-        repeats.answer("key", answerOf(1, outcome));
-        EXPECT_FALSE(repeats.find("key", 2, 0));
-    }
-    Repeats repeats;
-    repeats.find("key", 1, 0);
-    repeats.forget("key", 1);
-    EXPECT_FALSE(repeats.find("key", 2, 0));
-    EXPECT_TRUE(repeats.find("key", 3, 5 * gate::SECOND - 1)) << "the time of the first is over, not its own";
-}
-
 TEST(Repeats, TakeNothingFromACallThatCameLaterWithTheSameKey)
 {
     Repeats repeats;

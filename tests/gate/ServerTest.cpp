@@ -325,58 +325,54 @@ TEST_F(Server, ClosesTheOldestIdleConnectionToMakeRoom)
         std::all_of(idle.begin() + 768, idle.end(), [](const Socket& each) { return each.isOpen(); }));
 }
 
-TEST_F(Server, AsksOnceForCallsWithTheSameKey)
+TEST_F(Server, AsksOnceForCallsWithTheSameKeyWithinFiveSeconds)
 {
-    const Socket first = client(KEYED);
-    const Request request = asked();
-    const Socket second = client(KEYED);
-    settle();
-    answer(request, Outcome::Granted);
-    EXPECT_EQ("200", first.status());
-    EXPECT_EQ("200", second.status());
-    EXPECT_EQ("200", client(KEYED).status());
-    EXPECT_EQ("2", metric("vemo_gate_repeated_total"));
-
-    pass(6 * gate::SECOND);
-    const Socket later = client(KEYED);
-    answer(asked(), Outcome::Late);
-    EXPECT_EQ("503", later.status());
-    later.send(KEYED);
-    answer(asked(), Outcome::Granted);
-    EXPECT_EQ("200", later.status());
+    for (const auto& [outcome, szStatus] : {std::pair(Outcome::Granted, "200"), {Outcome::Refused, "403"}}) {
+        const Socket first = client(KEYED);
+        const Request request = asked();
+        const Socket second = client(KEYED);
+        settle();
+        answer(request, outcome);
+        EXPECT_EQ(szStatus, first.status());
+        EXPECT_EQ(szStatus, second.status());
+        pass(3 * gate::SECOND);
+        EXPECT_EQ(szStatus, client(KEYED).status());
+        pass(2 * gate::SECOND);
+    }
+    EXPECT_EQ("4", metric("vemo_gate_repeated_total"));
+    const Socket later = client();
+    for (const Outcome outcome : {Outcome::Failed, Outcome::Late}) { // nothing was spent
+        later.send(KEYED);
+        answer(asked(), outcome);
+        EXPECT_EQ("503", later.status());
+    }
 }
 
-TEST_F(Server, KeepsTheAnswerForAKeyWhoseClientHasGone)
+TEST_F(Server, KeepsTheKeyOfAClientThatHasGoneUntilItsCallIsDecided)
 {
-    Socket gone = client(KEYED);
-    const Request request = asked();
-    gone.close();
-    EXPECT_EQ(Ask::Cancel, asked().ask);
-    const Socket again = client(KEYED);
-    settle();
-    answer(request, Outcome::Granted); // it was decided when it was cancelled
-    EXPECT_EQ("200", again.status());
-    EXPECT_EQ("200", client(KEYED).status());
-}
-
-TEST_F(Server, AsksAgainForAKeyThatReturnsWhileItsCallIsCancelled)
-{
-    Socket gone = client(KEYED);
-    const Request request = asked();
-    gone.close();
-    const Request cancel = asked();
-    EXPECT_EQ(Ask::Cancel, cancel.ask);
-    EXPECT_EQ(request.nNumber, cancel.nNumber);
-    const Socket again = client(KEYED);
-    const Socket andAgain = client(KEYED);
-    settle();
-    answer(request, Outcome::Cancelled);
-    const Request second = asked();
-    EXPECT_EQ(Ask::Grant, second.ask);
-    EXPECT_LT(request.nNumber, second.nNumber);
-    answer(second, Outcome::Granted);
-    EXPECT_EQ("200", again.status());
-    EXPECT_EQ("200", andAgain.status());
+    for (const bool blCancelled : {true, false}) {
+        Socket gone = client(KEYED);
+        const Request request = asked();
+        gone.close();
+        const Request cancel = asked();
+        EXPECT_EQ(Ask::Cancel, cancel.ask);
+        EXPECT_EQ(request.nNumber, cancel.nNumber);
+        const Socket again = client(KEYED);
+        const Socket andAgain = client(KEYED);
+        settle();
+        Request decided = request;
+        if (blCancelled) {
+            answer(request, Outcome::Cancelled);
+            decided = asked();
+            EXPECT_EQ(Ask::Grant, decided.ask);
+            EXPECT_LT(request.nNumber, decided.nNumber);
+        }
+        answer(decided, Outcome::Granted);
+        EXPECT_EQ("200", again.status());
+        EXPECT_EQ("200", andAgain.status());
+        EXPECT_EQ("200", client(KEYED).status());
+        pass(6 * gate::SECOND);
+    }
 }
 
 TEST_F(Server, ReportsTheFiguresItWasToldAndNoOthers)
