@@ -1,7 +1,6 @@
 // What the system does to the tool in a test. These variables make it fail:
 //   VEMO_TEST_SYNC    "file", "directory" or a path: none of these can be synced
 //   VEMO_TEST_LOOKUP  an errno: each look-up of a user ends with it; ERANGE for buffers below 4 KiB only
-//   VEMO_TEST_PROC    an errno: /proc cannot be listed
 //   VEMO_TEST_VFS     the name of SQLite's way to work on files
 //   VEMO_TEST_ROOM    free blocks of a file system, their size, its files, and how many of these are free
 //   VEMO_TEST_CALLS   lines "CALL|ERRNO": all these calls fail; or "CALL|COMMAND": ahead of the first, the
@@ -254,12 +253,7 @@ extern "C" INTERPOSED FILE* fdopen(int nFile, const char* szMode)
 
 extern "C" INTERPOSED DIR* opendir(const char* szPath)
 {
-    const char* szError = getenv("VEMO_TEST_PROC");
-    if (szError && 0 == strcmp(szPath, "/proc/")) {
-        errno = atoi(szError);
-        return nullptr;
-    }
-    return NEXT(opendir)(szPath);
+    return fails("opendir " + std::string(szPath)) ? nullptr : NEXT(opendir)(szPath);
 }
 
 extern "C" INTERPOSED int getpwnam_r(const char* szName, struct passwd* pEntry, char* szBuffer,

@@ -439,7 +439,7 @@ print(written)' "$DB"
     id=$(a_token)
     while IFS='|' read -r error reason; do
         uses=$((uses + 1))
-        VEMO_TEST_PROC=$error run_tool update "$id" --uses $uses
+        VEMO_TEST_CALLS="opendir /proc/|$error" run_tool update "$id" --uses $uses
         expect 4 "" "vemo-access-token: /proc/: $reason; the change was made, but calls that were under way can have undone it"
         [ "$(sql "SELECT count FROM token")" -eq $uses ]
     done <<'TABLE'
@@ -448,7 +448,7 @@ print(written)' "$DB"
 24|Too many open files
 TABLE
     # What it is not allowed to see is no reason to fail.
-    VEMO_TEST_PROC=13 gives "1 token revoked" revoke "$id"
+    VEMO_TEST_CALLS="opendir /proc/|13" gives "1 token revoked" revoke "$id"
 }
 
 @test "the tool waits for a program that has read a token, and does not name it when it ends without writing" {
