@@ -9,7 +9,6 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
-#include <optional>
 #include <sstream>
 
 #include "Figures.h"
@@ -139,11 +138,18 @@ std::vector<std::string> sentences(const std::string& strError, const std::strin
 }
 
 // What a command finds and what it leaves: the store, and files beside it.
-class Scene {
-public:
+class ToolFault : public ::testing::TestWithParam<Command> {
+protected:
     // Runs the command once undisturbed, to know what it gives.
-    explicit Scene(const Command& command) : m_command(command), m_strArguments(command.strArguments)
+    void SetUp() override
     {
+        if (!GetParam().blNoName) {
+            setenv("VEMO_TEST_NO_TMPFILE", "", 1);
+        }
+        if (!canRunTool()) {
+            GTEST_SKIP() << "the kernel does not let one process answer the system calls of another";
+        }
+        m_strArguments = GetParam().strArguments;
         for (std::string& strArgument : m_strArguments) {
             strArgument =
                 strArgument == "IN" || strArgument == "OUT" ? files() + "/" + strArgument : strArgument;
@@ -162,17 +168,29 @@ public:
         m_strAfter = m_store.state();
         m_strNewFile = contentsOf(files() + "/OUT");
     }
-    ~Scene()
+
+    void TearDown() override
     {
         std::error_code ignored;
         fs::remove_all(files(), ignored);
     }
-    Scene(const Scene&) = delete;
-    Scene& operator=(const Scene&) = delete;
 
-    const std::string& storeDirectory() const { return m_store.directory(); }
     std::string files() const { return m_store.directory() + ".files"; }
     bool isChanged() const { return m_strBefore != m_strAfter || OLD_FILE != m_strNewFile; }
+
+    void prepare() const
+    {
+        fs::remove_all(files());
+        fs::create_directory(files());
+        fs::permissions(files(), fs::perms(0775)); // others could put names there
+        std::ofstream(files() + "/IN") << m_strExport;
+        std::ofstream(files() + "/OUT") << OLD_FILE;
+        fs::create_directory(m_store.directory());
+        prepareStore(m_store, GetParam().blStore ? operations().back() : operations().front());
+        if (!GetParam().blStore) {
+            fs::remove(m_store.directory());
+        }
+    }
 
     // How many calls a fault of this kind can happen to.
     int64_t calls(Fault::Kind kind) const
@@ -181,156 +199,91 @@ public:
         return runTool(m_strArguments, {kind}).nCalls;
     }
 
-    // Runs the command and returns what is wrong with how it ended, "" when nothing is:
+    int64_t strideOf(int64_t nStride) const
+    {
+        return std::max<int64_t>(1, nStride * GetParam().nStride / scaled(1));
+    }
+
+    // Runs the command and judges how it ended:
     // - the store is sound and as before the command, after its purge or after all of it; the file OUT is the
     //   old one or the whole new one, and there is no other
     // - it succeeds, and all is done and said as undisturbed; or it fails with one sentence, which names the
     //   cause, and says so when the change was made all the same
     // - it ends by itself, unless the fault is a signal
-    std::string judge(const Fault& fault) const
+    void judge(const Fault& fault)
     {
+        ++m_nRuns;
         prepare();
         const Ending ending = runTool(m_strArguments, fault);
-        std::string strWrong = leftFiles(fault);
-        const std::string strState = fs::exists(storeDirectory()) ? m_store.state() : STATE_MISSING;
-        const bool blHalfMade = !m_command.blStore && (strState == STATE_NO_TABLE || strState.empty());
-        if (strState != m_strBefore && strState != m_strPurged && strState != m_strAfter && !blHalfMade) {
-            strWrong += "a third state: " + strState.substr(0, 200) + "; ";
-        }
+        SCOPED_TRACE("call " + std::to_string(fault.nFirst) + " to " + std::to_string(fault.nLast) +
+                     "; said: " + ending.strError + "; printed: " + ending.strOutput.substr(0, 500));
+        const std::string strState = fs::exists(m_store.directory()) ? m_store.state() : STATE_MISSING;
+        const bool blHalfMade = !GetParam().blStore && (strState == STATE_NO_TABLE || strState.empty());
+        EXPECT_TRUE(strState == m_strBefore || strState == m_strPurged || strState == m_strAfter ||
+                    blHalfMade)
+            << "a third state: " << strState.substr(0, 200);
+        judgeFiles(fault);
+        ASSERT_EQ(fault.nSignal, ending.nSignal);
         const bool blTellsId = m_strArguments[0] == "create" || m_strArguments[0] == "rotate";
-        if (blTellsId && SIGKILL != fault.nSignal && strState == m_strAfter && ending.strOutput.empty() &&
-            !contains(ending.strError, "cannot be taken back")) {
-            strWrong += "a token whose id nobody knows; ";
+        EXPECT_FALSE(blTellsId && SIGKILL != fault.nSignal && strState == m_strAfter &&
+                     ending.strOutput.empty() && !contains(ending.strError, "cannot be taken back"))
+            << "a token whose id nobody knows";
+        if (0 != ending.nSignal) {
+            return;
         }
-        if (ending.nSignal != fault.nSignal) {
-            strWrong += "ended by signal " + std::to_string(ending.nSignal) + "; ";
-        } else if (0 == ending.nSignal && !isUndisturbed(ending)) {
-            strWrong += wrongWithFailure(ending, fault, strState);
-        } else if (0 == ending.nSignal &&
-                   (strState != m_strAfter || contentsOf(files() + "/OUT") != m_strNewFile)) {
-            strWrong += "reported success, yet it is not done; ";
-        }
-        return strWrong.empty()
-                   ? ""
-                   : strWrong + "said: " + ending.strError + "; printed: " + ending.strOutput.substr(0, 500);
-    }
-
-private:
-    void prepare() const
-    {
-        fs::remove_all(files());
-        fs::create_directory(files());
-        fs::permissions(files(), fs::perms(0775)); // others could put names there
-        std::ofstream(files() + "/IN") << m_strExport;
-        std::ofstream(files() + "/OUT") << OLD_FILE;
-        fs::create_directory(storeDirectory());
-        prepareStore(m_store, m_command.blStore ? operations().back() : operations().front());
-        if (!m_command.blStore) {
-            fs::remove(storeDirectory());
+        if (ending.nStatus == m_undisturbed.nStatus && ending.strError == m_undisturbed.strError &&
+            withoutChance(ending.strOutput) == withoutChance(m_undisturbed.strOutput)) {
+            EXPECT_TRUE(strState == m_strAfter && contentsOf(files() + "/OUT") == m_strNewFile)
+                << "reported success, yet it is not done";
+        } else if (m_strArguments[0] ==
+                   "doctor") { // what it cannot look at is a finding, if it can print that
+            const bool blMute =
+                Fault::Kind::Memory == fault.kind || contains(ending.strError, "cannot write the result");
+            EXPECT_TRUE(5 == ending.nStatus || (0 == ending.nStatus && strState == m_strAfter) ||
+                        (4 == ending.nStatus && blMute))
+                << ending.nStatus;
+        } else {
+            judgeFailure(ending, fault, strState);
         }
     }
 
-    bool isUndisturbed(const Ending& ending) const
-    {
-        return ending.nStatus == m_undisturbed.nStatus &&
-               withoutChance(ending.strOutput) == withoutChance(m_undisturbed.strOutput) &&
-               ending.strError == m_undisturbed.strError;
-    }
-
-    // What is wrong with the files beside the store.
-    std::string leftFiles(const Fault& fault) const
+    void judgeFiles(const Fault& fault) const
     {
         const std::string strFile = contentsOf(files() + "/OUT");
-        std::string strWrong = strFile == OLD_FILE || strFile == m_strNewFile ? "" : "half a file; ";
+        EXPECT_TRUE(strFile == OLD_FILE || strFile == m_strNewFile) << "half a file";
         for (const auto& entry : fs::directory_iterator(files())) {
             const std::string strName = entry.path().filename();
             // It is there to stay when the process cannot remove it.
             const bool blExcused = (SIGKILL == fault.nSignal || Fault::Kind::Error == fault.kind) &&
                                    0 == strName.compare(0, 4, "OUT.") &&
                                    (entry.status().permissions() & fs::perms::all) == fs::perms(0600);
-            if (strName != "IN" && strName != "OUT" && !blExcused) {
-                strWrong += "left " + strName + "; ";
-            }
+            EXPECT_TRUE(strName == "IN" || strName == "OUT" || blExcused) << "left " << strName;
         }
-        return strWrong;
     }
 
-    std::string wrongWithFailure(const Ending& ending, const Fault& fault, const std::string& strState) const
+    void judgeFailure(const Ending& ending, const Fault& fault, const std::string& strState) const
     {
-        if (m_strArguments[0] == "doctor") { // what it cannot look at is a finding, if it can print that
-            const bool blMute =
-                Fault::Kind::Memory == fault.kind || contains(ending.strError, "cannot write the result");
-            return 5 == ending.nStatus || (0 == ending.nStatus && strState == m_strAfter) ||
-                           (4 == ending.nStatus && blMute)
-                       ? ""
-                       : "status " + std::to_string(ending.nStatus) + "; ";
-        }
-        std::string strWrong;
         const std::vector<std::string> strSentences = sentences(ending.strError, m_undisturbed.strError);
-        if (1 != strSentences.size() || 0 != strSentences[0].find("vemo-access-token: ")) {
-            strWrong += "not one sentence; ";
-        }
-        if (ending.nStatus != (contains(ending.strError, files() + "/IN: ") ? 2 : 4)) {
-            strWrong += "status " + std::to_string(ending.nStatus) + "; ";
-        }
+        ASSERT_EQ(1U, strSentences.size());
+        EXPECT_EQ(0U, strSentences[0].find("vemo-access-token: "));
+        EXPECT_EQ(contains(ending.strError, files() + "/IN: ") ? 2 : 4, ending.nStatus);
         const std::vector<std::string> strCauses = causes(fault.kind);
-        if (std::none_of(strCauses.begin(), strCauses.end(),
-                         [&](const std::string& strCause) { return contains(ending.strError, strCause); })) {
-            strWrong += "no cause is named; ";
+        EXPECT_TRUE(std::any_of(strCauses.begin(), strCauses.end(), [&](const std::string& strCause) {
+            return contains(ending.strError, strCause);
+        })) << "no cause is named";
+        if (GetParam().blStore) { // else what it has made stays, and is seen by calling it again
+            const bool blSaysChange = contains(ending.strError, "the change was made");
+            const bool blSaysPerhaps = contains(ending.strError, "the change may have been made");
+            const bool blMade = strState == m_strAfter && strState != m_strBefore;
+            EXPECT_TRUE(!blMade || blSaysChange || blSaysPerhaps) << "the change was made, unsaid";
+            EXPECT_TRUE(strState == m_strAfter || !blSaysChange) << "the change was not made, but it says so";
         }
-        const bool blSaysChange = contains(ending.strError, "the change was made");
-        const bool blSaysPerhaps = contains(ending.strError, "the change may have been made");
-        if (!m_command.blStore) {
-            return strWrong; // what it has made stays, and is seen by calling it again
-        }
-        if (strState != m_strBefore && strState == m_strAfter && !blSaysChange && !blSaysPerhaps) {
-            strWrong += "the change was made, which it does not say; ";
-        }
-        if (strState != m_strAfter && blSaysChange) {
-            strWrong += "the change was not made, but it says so; ";
-        }
-        return strWrong;
-    }
-
-    TokenStore m_store;
-    const Command& m_command;
-    std::vector<std::string> m_strArguments;
-    std::string m_strExport;
-    std::string m_strBefore;
-    std::string m_strPurged;
-    std::string m_strAfter;
-    std::string m_strNewFile;
-    Ending m_undisturbed;
-};
-
-class ToolFault : public ::testing::TestWithParam<Command> {
-protected:
-    void SetUp() override
-    {
-        if (!GetParam().blNoName) {
-            setenv("VEMO_TEST_NO_TMPFILE", "", 1);
-        }
-        if (!canRunTool()) {
-            GTEST_SKIP() << "the kernel does not let one process answer the system calls of another";
-        }
-        m_scene.emplace(GetParam());
-    }
-
-    int64_t strideOf(int64_t nStride) const
-    {
-        return std::max<int64_t>(1, nStride * GetParam().nStride / scaled(1));
-    }
-
-    void judge(const Fault& fault)
-    {
-        ++m_nRuns;
-        EXPECT_EQ("", m_scene->judge(fault)) << "call " << fault.nFirst << " to " << fault.nLast;
     }
 
     // Each call fails, or each of a stride and each of the last: once, and from then on.
     void judgeEach(Fault::Kind kind, int64_t nStride)
     {
-        const int64_t nCalls = m_scene->calls(kind);
+        const int64_t nCalls = calls(kind);
         const int64_t nStart = 1 + static_cast<int64_t>(seed() % static_cast<uint64_t>(nStride));
         const int64_t nLast = std::max(nStart, nCalls - LAST_CALLS + 1);
         for (int64_t nCall = nStart; nCall <= nCalls && !HasFailure();) {
@@ -347,7 +300,14 @@ protected:
                                        " calls, " + std::to_string(m_nRuns) + " runs");
     }
 
-    std::optional<Scene> m_scene;
+    TokenStore m_store;
+    std::vector<std::string> m_strArguments;
+    std::string m_strExport;
+    std::string m_strBefore;
+    std::string m_strPurged;
+    std::string m_strAfter;
+    std::string m_strNewFile;
+    Ending m_undisturbed;
     int64_t m_nCalls = 0;
     int64_t m_nRuns = 0;
 };
@@ -374,7 +334,7 @@ TEST_P(ToolFault, IsAllOrNothingAfterASignal)
     const auto signals = strCommand == "export" || strCommand == "create" || strCommand == "rotate"
                              ? std::vector<int>{SIGKILL, SIGINT, SIGTERM}
                              : std::vector<int>{SIGKILL};
-    m_nCalls = m_scene->isChanged() ? m_scene->calls(Fault::Kind::Signal) : 0;
+    m_nCalls = isChanged() ? calls(Fault::Kind::Signal) : 0;
     for (int64_t nCall = 1; nCall <= m_nCalls; nCall += strideOf(1)) {
         for (const int nSignal : signals) {
             judge({Fault::Kind::Signal, nCall, nCall, nSignal});
