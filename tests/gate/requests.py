@@ -5,6 +5,7 @@ scene.py tells the usage.
 """
 import collections
 import contextlib
+import json
 import re
 import resource
 import socket
@@ -214,7 +215,7 @@ def responses(received, sent):
         size = int(size) if not sent.startswith("HEAD") else 0
         body, received = received[:size].decode(), received[size:]
         text = [status, *special.split("\r\n")[:-1]]
-        if kind == "application/json" and (size == 0 or '"function":"' + scene.FUNCTION in body):
+        if kind == "application/json" and (size == 0 or json.loads(body)["function"] == scene.FUNCTION):
             text.append("a record")
         elif body:
             text.append(body)

@@ -21,7 +21,7 @@ import unittest
 SOURCE, GATE, TOOL = map(os.path.abspath, sys.argv[1:4])
 PATH = "/usr/sbin:/usr/bin:/sbin:/bin"
 OWNER = pwd.getpwuid(0).pw_name  # of all tokens
-FUNCTION, FUNCTION_IN_HEADERS = "50 % \u00e4", "50%20%25%20%C3%A4"
+FUNCTION, FUNCTION_IN_HEADERS = "50 % \u00e4\r\n\x7f~!", "50%20%25%20%C3%A4%0D%0A%7F~!"
 
 
 class UnixConnection(http.client.HTTPConnection):
