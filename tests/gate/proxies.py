@@ -89,21 +89,6 @@ class Scene(scene.Scene):
                                         f"events {{}}\nhttp {{ access_log off; {temporary} include {site}; }}\n")
         cls.start(name, "nginx", "-p", cls.directory, "-e", "stderr", "-c", main)
 
-    @classmethod
-    def start_web_server(cls):
-        cls.file("www/pages/inner/index.html", "a page\n")
-        site = cls.example("nginx.conf", (GATE_SOCKET, cls.at("calls")), (APPLICATION, cls.at("application")),
-                           ("/srv/www", cls.at("www")), ("listen 80;", f"listen unix:{cls.at('nginx')};"))
-        cls.start_nginx("nginx", site)
-
-    @classmethod
-    def start_caddy(cls):
-        cls.environment.update(XDG_CONFIG_HOME=cls.at("config"), XDG_DATA_HOME=cls.at("data"))
-        site = cls.example("Caddyfile", (GATE_SOCKET, cls.at("calls")), (APPLICATION, cls.at("application")),
-                           ("example.org {", f"http://example.org {{\n\tbind unix/{cls.at('caddy')}"))
-        cls.start("caddy", "caddy", "run", "--adapter", "caddyfile", "--config",
-                  cls.file("main", "{\n\tadmin off\n}\nimport " + site + "\n"))
-
 
 class Clients(Scene):
     def test_tell_the_user_or_why_not(self):
@@ -209,7 +194,10 @@ class Nginx(Proxy, Scene):
     @classmethod
     def setUpClass(cls):
         super().setUpClass()
-        cls.start_web_server()
+        cls.file("www/pages/inner/index.html", "a page\n")
+        site = cls.example("nginx.conf", (GATE_SOCKET, cls.at("calls")), (APPLICATION, cls.at("application")),
+                           ("/srv/www", cls.at("www")), ("listen 80;", f"listen unix:{cls.at('nginx')};"))
+        cls.start_nginx("nginx", site)
 
     def test_spends_one_use_where_nginx_asks_twice(self):
         self.assertEqual(self.request(path="/pages/inner/", id=self.id)[0], 200)
@@ -226,7 +214,11 @@ class Caddy(Proxy, Scene):
     @classmethod
     def setUpClass(cls):
         super().setUpClass()
-        cls.start_caddy()
+        cls.environment.update(XDG_CONFIG_HOME=cls.at("config"), XDG_DATA_HOME=cls.at("data"))
+        site = cls.example("Caddyfile", (GATE_SOCKET, cls.at("calls")), (APPLICATION, cls.at("application")),
+                           ("example.org {", f"http://example.org {{\n\tbind unix/{cls.at('caddy')}"))
+        cls.start("caddy", "caddy", "run", "--adapter", "caddyfile", "--config",
+                  cls.file("main", "{\n\tadmin off\n}\nimport " + site + "\n"))
 
 
 class ManyMachines(Scene):
