@@ -35,10 +35,7 @@ const std::string LONG(100, 'x');
 
 TEST(Json, TellsHowDeepATextIsNested)
 {
-    const struct {
-        const char* szText;
-        int nLevels;
-    } CASES[] = {
+    const std::pair<const char*, int> CASES[] = {
         {"", 0},
         {"1", 0},
         {"{}", 1},
@@ -56,8 +53,8 @@ TEST(Json, TellsHowDeepATextIsNested)
         {"]]]]", 0},
         {"}[[", 1},
     };
-    for (const auto& each : CASES) {
-        EXPECT_EQ(each.nLevels, nestingOf(each.szText)) << each.szText;
+    for (const auto& [szText, nLevels] : CASES) {
+        EXPECT_EQ(nLevels, nestingOf(szText)) << szText;
     }
 }
 

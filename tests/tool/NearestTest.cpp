@@ -2,24 +2,22 @@
 
 #include <gtest/gtest.h>
 
+#include <tuple>
+
 using tool::didYouMean;
 using tool::distance;
 
 TEST(Distance, CountsWhatMustChange)
 {
-    const struct {
-        std::string strOne;
-        std::string strOther;
-        size_t nDistance;
-    } CASES[] = {
+    const std::tuple<std::string, std::string, size_t> CASES[] = {
         {"", "", 0},          {"", "abc", 3},          {"list", "list", 0},          {"lst", "list", 1},
         {"llist", "list", 1}, {"lint", "list", 1},     {"lsit", "list", 1},          {"abcd", "badc", 2},
         {"ca", "abc", 3},     {"craete", "create", 1}, {"--funct", "--function", 3}, {"ab", "ba", 1},
     };
-    for (const auto& each : CASES) {
-        SCOPED_TRACE(each.strOne + " " + each.strOther);
-        EXPECT_EQ(each.nDistance, distance(each.strOne, each.strOther));
-        EXPECT_EQ(each.nDistance, distance(each.strOther, each.strOne));
+    for (const auto& [strOne, strOther, nDistance] : CASES) {
+        SCOPED_TRACE(strOne + " " + strOther);
+        EXPECT_EQ(nDistance, distance(strOne, strOther));
+        EXPECT_EQ(nDistance, distance(strOther, strOne));
     }
 }
 

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <clocale>
+#include <tuple>
 
 using tool::Table;
 typedef Table::Kind Kind;
@@ -59,12 +60,7 @@ TEST(Table, BreaksNoWordWhereverItStands)
 
 TEST(Table, GivesItsLongColumnsEqualSharesOfWhatIsLeft)
 {
-    const struct {
-        const char* szFirst;
-        const char* szLast;
-        size_t nTerminal;
-        const char* szText;
-    } CASES[] = {
+    const std::tuple<const char*, const char*, size_t, const char*> CASES[] = {
         {"0123 56789", "01 34567", 24,
          "FIRST        N  LAST\n"
          "0123 56789  12  01 34567\n"},
@@ -108,19 +104,16 @@ TEST(Table, GivesItsLongColumnsEqualSharesOfWhatIsLeft)
          "\\x1b   12  \\xff\n"},
     };
     ASSERT_NE(nullptr, setlocale(LC_CTYPE, "C.UTF-8"));
-    for (const auto& each : CASES) {
+    for (const auto& [szFirst, szLast, nTerminal, szText] : CASES) {
         Table table({{"FIRST", Kind::Long}, {"N", Kind::Right}, {"LAST", Kind::Long}}, true);
-        table.add({each.szFirst, "12", each.szLast});
-        EXPECT_EQ(each.szText, table.text(each.nTerminal, false));
+        table.add({szFirst, "12", szLast});
+        EXPECT_EQ(szText, table.text(nTerminal, false));
     }
 }
 
 TEST(Table, LeavesSpareColumnsOutWhereALineDoesNotFitTheLastFirst)
 {
-    const struct {
-        size_t nTerminal;
-        const char* szText;
-    } CASES[] = {
+    const std::pair<size_t, const char*> CASES[] = {
         {20, "A   SPARE  MORE  Z\n"
              "aa  bb     cc    zz\n"},
         {19, "A   SPARE  MORE  Z\n"
@@ -134,12 +127,12 @@ TEST(Table, LeavesSpareColumnsOutWhereALineDoesNotFitTheLastFirst)
         {0, "A   Z\n"
             "aa  zz\n"},
     };
-    for (const auto& each : CASES) {
-        Table table(
-            {{"A", Kind::Short}, {"SPARE", Kind::Short, true}, {"MORE", Kind::Long, true}, {"Z", Kind::Long}},
-            true);
-        table.add({"aa", "bb", "cc", "zz"});
-        EXPECT_EQ(each.szText, table.text(each.nTerminal, false)) << each.nTerminal;
+    Table table(
+        {{"A", Kind::Short}, {"SPARE", Kind::Short, true}, {"MORE", Kind::Long, true}, {"Z", Kind::Long}},
+        true);
+    table.add({"aa", "bb", "cc", "zz"});
+    for (const auto& [nTerminal, szText] : CASES) {
+        EXPECT_EQ(szText, table.text(nTerminal, false)) << nTerminal;
     }
     // The last column can be one of them; what is measured line by line is laid out in the same way.
     Table last({{"A", Kind::Short}, {"LAST", Kind::Short, true}}, true);

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <sstream>
+#include <tuple>
 
 #include "Seam.h"
 #include "tools/Failure.h"
@@ -74,10 +75,7 @@ TEST(Users, HaveNumbersButForTheLast)
 
 TEST(Durations, AreANumberOfSecondsOrNumbersWithUnits)
 {
-    const struct {
-        const char* szText;
-        int64_t nSeconds;
-    } CASES[] = {
+    const std::pair<const char*, int64_t> CASES[] = {
         {"1", 1},
         {"45s", 45},
         {"90m", 90 * MINUTE},
@@ -92,8 +90,8 @@ TEST(Durations, AreANumberOfSecondsOrNumbersWithUnits)
         {"365249d24h", 365250 * DAY},
         {"31557600000", 365250 * DAY},
     };
-    for (const auto& each : CASES) {
-        EXPECT_EQ(each.nSeconds, parseDuration(each.szText)) << each.szText;
+    for (const auto& [szText, nSeconds] : CASES) {
+        EXPECT_EQ(nSeconds, parseDuration(szText)) << szText;
     }
 }
 
@@ -110,11 +108,7 @@ TEST(Durations, AreFromASecondToAThousandYears)
 
 TEST(Times, AreLocalOrUtcOrSeconds)
 {
-    const struct {
-        const char* szZone;
-        const char* szText;
-        int64_t nTime;
-    } CASES[] = {
+    const std::tuple<const char*, const char*, int64_t> CASES[] = {
         {"Europe/Berlin", "2060-02-29", 2845234800},
         {"Europe/Berlin", "2060-02-29Z", 2845238400},
         {"Europe/Berlin", "2060-06-30 12:34", 2855817240},
@@ -140,9 +134,9 @@ TEST(Times, AreLocalOrUtcOrSeconds)
         {"Europe/Berlin", "2060-10-31 03:00", 2866413600},
         {"Africa/Cairo", "2060-04-30", 2850501600}, // a day that begins at 1 o'clock
     };
-    for (const auto& each : CASES) {
-        setZone(each.szZone);
-        EXPECT_EQ(each.nTime, parseTime(each.szText)) << each.szText;
+    for (const auto& [szZone, szText, nTime] : CASES) {
+        setZone(szZone);
+        EXPECT_EQ(nTime, parseTime(szText)) << szText;
     }
     setZone("Europe/Berlin");
     const int64_t nTwice = parseTime("2060-10-31 02:30");
@@ -176,10 +170,7 @@ TEST(Times, ThatDoNotExistAreRefused)
 
 TEST(RelativeText, HasOneUnit)
 {
-    const struct {
-        int64_t nLeft;
-        const char* szText;
-    } CASES[] = {
+    const std::pair<int64_t, const char*> CASES[] = {
         {0, "in 0 s"},
         {1, "in 1 s"},
         {MINUTE - 1, "in 59 s"},
@@ -196,8 +187,8 @@ TEST(RelativeText, HasOneUnit)
         {-2 * DAY, "expired 2 d ago"},
     };
     const int64_t nNow = 1767225600;
-    for (const auto& each : CASES) {
-        EXPECT_EQ(each.szText, relativeText(nNow + each.nLeft, nNow)) << each.nLeft;
+    for (const auto& [nLeft, szText] : CASES) {
+        EXPECT_EQ(szText, relativeText(nNow + nLeft, nNow)) << nLeft;
     }
     // What is too far away to be counted, and what is just not.
     EXPECT_EQ("far off", relativeText(INT64_MAX, -1));
