@@ -16,12 +16,16 @@
 #include <algorithm>
 #include <atomic>
 #include <cstring>
+#include <tuple>
 
 #include "gate/Clock.h"
 
 namespace {
 
-std::atomic<int64_t>* g_pLater = nullptr; // how far the clock is ahead, in ns; shared with the child
+// How far the clock is ahead, in ns; shared with the child.
+std::atomic<int64_t>* const g_pLater =
+    new (mmap(nullptr, sizeof(*g_pLater), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0))
+        std::atomic<int64_t>(0);
 
 } // namespace
 
@@ -103,10 +107,6 @@ class Server : public testing::Test {
 protected:
     void SetUp() override
     {
-        void* pShared =
-            mmap(nullptr, sizeof(*g_pLater), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
-        ASSERT_NE(MAP_FAILED, pShared);
-        g_pLater = new (pShared) std::atomic<int64_t>(0);
         struct rlimit files = {};
         getrlimit(RLIMIT_NOFILE, &files);
         files.rlim_cur = files.rlim_max;
@@ -131,9 +131,7 @@ protected:
         m_link.close();
         int nStatus = -1;
         waitpid(m_pid, &nStatus, 0);
-        EXPECT_TRUE(WIFEXITED(nStatus) && 0 == WEXITSTATUS(nStatus)) << nStatus;
-        munmap(static_cast<void*>(g_pLater), sizeof(*g_pLater));
-        g_pLater = nullptr;
+        EXPECT_EQ(0, nStatus);
     }
 
     Socket listening(const std::string& strWhat) const
@@ -150,7 +148,7 @@ protected:
     {
         struct sockaddr_un address = {};
         address.sun_family = AF_UNIX;
-        const std::string strName = "vemo-gate-test " + std::to_string(m_pidTest) + strWhat;
+        const std::string strName = "vemo-gate-test " + std::to_string(getpid()) + strWhat;
         memcpy(&address.sun_path[1], strName.data(), strName.size());
         EXPECT_EQ(0, function(socket.number(), reinterpret_cast<const struct sockaddr*>(&address),
                               sizeof(address)));
@@ -235,7 +233,6 @@ protected:
     pid_t m_pid = -1;
 
 private:
-    const pid_t m_pidTest = getpid();
     int m_nClients = 0;
 };
 
@@ -243,25 +240,21 @@ private:
 
 TEST_F(Server, ClosesConnectionsThatAreTooSlow)
 {
-    const struct {
-        std::string strSent;
-        std::string strReceived;
-        int64_t nSeconds;
-    } CLIENTS[] = {
+    const std::tuple<std::string, std::string, int64_t> CLIENTS[] = {
         {"", "", 75},
         {"G", "", 5},
         {CALL.substr(0, CALL.size() - 1), "", 5},
         {NO_CALL, "401", 75},
         {NO_CALL + "G", "401", 5},
     };
-    for (const auto& row : CLIENTS) {
-        const Socket slow = client(row.strSent);
-        EXPECT_EQ(row.strReceived, row.strReceived.empty() ? "" : slow.status());
+    for (const auto& [strSent, strReceived, nSeconds] : CLIENTS) {
+        const Socket slow = client(strSent);
+        EXPECT_EQ(strReceived, strReceived.empty() ? "" : slow.status());
         settle();
-        pass(row.nSeconds * gate::SECOND - gate::SECOND / 2);
-        EXPECT_TRUE(slow.isOpen()) << row.strSent;
+        pass(nSeconds * gate::SECOND - gate::SECOND / 2);
+        EXPECT_TRUE(slow.isOpen()) << strSent;
         pass(gate::SECOND);
-        EXPECT_EQ("end", slow.receive()) << row.strSent;
+        EXPECT_EQ("end", slow.receive()) << strSent;
     }
 }
 
