@@ -53,11 +53,6 @@ const std::vector<int> CALLS_THAT_TAKE_ROOM = {
     __NR_write,     __NR_writev,  __NR_pwrite64, __NR_ftruncate, __NR_fsync,
     __NR_fdatasync, __NR_mkdirat, __NR_linkat,   __NR_renameat,  __NR_renameat2};
 
-bool isOneOf(const std::vector<int>& nCalls, int nCall)
-{
-    return std::find(nCalls.begin(), nCalls.end(), nCall) != nCalls.end();
-}
-
 bool takesRoom(const struct seccomp_data& call)
 {
 #ifdef __NR_open
@@ -65,7 +60,9 @@ bool takesRoom(const struct seccomp_data& call)
         return 0 != (call.args[1] & O_CREAT);
     }
 #endif
-    return __NR_openat == call.nr ? 0 != (call.args[2] & O_CREAT) : isOneOf(CALLS_THAT_TAKE_ROOM, call.nr);
+    return __NR_openat == call.nr
+               ? 0 != (call.args[2] & O_CREAT)
+               : std::count(CALLS_THAT_TAKE_ROOM.begin(), CALLS_THAT_TAKE_ROOM.end(), call.nr);
 }
 
 // From now on, the calls on files of this thread, and of what it forks, wait to be answered. Returns the
@@ -108,64 +105,55 @@ int handOverCalls()
     exit(nStatus);
 }
 
-// What becomes of the calls, and how many there have been.
-class SystemCalls {
-public:
-    explicit SystemCalls(const Fault& fault) : m_fault(fault) {}
+// Whether the fault can happen to a call. Sentences must come through. Random numbers are drawn until they
+// suit, so that a run can have fewer calls than the one that was counted; a signal in front of the last one
+// must come all the same.
+bool isMet(const struct seccomp_data& call, const Fault& fault)
+{
+    const bool blSentence =
+        (__NR_write == call.nr || __NR_writev == call.nr) && STDERR_FILENO == call.args[0];
+    return Fault::Kind::Memory != fault.kind && !blSentence &&
+           (Fault::Kind::Signal != fault.kind || __NR_getrandom != call.nr) &&
+           (Fault::Kind::FullDisk != fault.kind || takesRoom(call));
+}
 
-    // Answers until nobody calls any more.
-    void answerAll(int nCalls)
-    {
-        struct pollfd calls = {nCalls, POLLIN, 0};
-        while (0 <= poll(&calls, 1, -1) && !(calls.revents & POLLHUP)) {
-            struct seccomp_notif call = {};
-            if (0 != ioctl(nCalls, SECCOMP_IOCTL_NOTIF_RECV, &call)) {
-                continue; // it was killed meanwhile
-            }
-            const bool blSync = __NR_fsync == call.data.nr || __NR_fdatasync == call.data.nr;
-            struct seccomp_notif_resp response = {};
-            response.id = call.id;
-            response.error = -errorOf(call);
-            // A sync succeeds without waiting for the disk.
-            response.flags = blSync || response.error ? 0 : SECCOMP_USER_NOTIF_FLAG_CONTINUE;
-            ioctl(nCalls, SECCOMP_IOCTL_NOTIF_SEND, &response);
-        }
+// The errno with which a call fails, or 0. Counts the calls that the fault can happen to.
+int errorOf(const struct seccomp_notif& call, const Fault& fault, int64_t& nMet)
+{
+    if (__NR_openat == call.data.nr && O_TMPFILE == (call.data.args[2] & O_TMPFILE) &&
+        getenv("VEMO_TEST_NO_TMPFILE")) {
+        return EOPNOTSUPP;
     }
-
-    int64_t count() const { return m_nCalls; }
-
-private:
-    // The errno with which a call fails, or 0.
-    int errorOf(const struct seccomp_notif& call)
-    {
-        if (__NR_openat == call.data.nr && O_TMPFILE == (call.data.args[2] & O_TMPFILE) &&
-            getenv("VEMO_TEST_NO_TMPFILE")) {
-            return EOPNOTSUPP;
-        }
-        if (!isMet(call.data) || ++m_nCalls < m_fault.nFirst || m_fault.nLast < m_nCalls) {
-            return 0;
-        }
-        if (Fault::Kind::Signal == m_fault.kind) {
-            kill(static_cast<pid_t>(call.pid), m_fault.nSignal);
-            return 0;
-        }
-        return Fault::Kind::Error == m_fault.kind ? EIO : ENOSPC;
+    if (!isMet(call.data, fault) || ++nMet < fault.nFirst || fault.nLast < nMet) {
+        return 0;
     }
-
-    // Sentences must come through. Random numbers are drawn until they suit, so that a run can have fewer
-    // calls than the one that was counted; a signal in front of the last one must come all the same.
-    bool isMet(const struct seccomp_data& call) const
-    {
-        const bool blSentence =
-            (__NR_write == call.nr || __NR_writev == call.nr) && STDERR_FILENO == call.args[0];
-        return Fault::Kind::Memory != m_fault.kind && !blSentence &&
-               (Fault::Kind::Signal != m_fault.kind || __NR_getrandom != call.nr) &&
-               (Fault::Kind::FullDisk != m_fault.kind || takesRoom(call));
+    if (Fault::Kind::Signal == fault.kind) {
+        kill(static_cast<pid_t>(call.pid), fault.nSignal);
+        return 0;
     }
+    return Fault::Kind::Error == fault.kind ? EIO : ENOSPC;
+}
 
-    const Fault m_fault;
-    int64_t m_nCalls = 0;
-};
+// Answers until nobody calls any more. Returns how many calls the fault could happen to.
+int64_t answerCalls(int nCalls, const Fault& fault)
+{
+    int64_t nMet = 0;
+    struct pollfd calls = {nCalls, POLLIN, 0};
+    while (0 <= poll(&calls, 1, -1) && !(calls.revents & POLLHUP)) {
+        struct seccomp_notif call = {};
+        if (0 != ioctl(nCalls, SECCOMP_IOCTL_NOTIF_RECV, &call)) {
+            continue; // it was killed meanwhile
+        }
+        const bool blSync = __NR_fsync == call.data.nr || __NR_fdatasync == call.data.nr;
+        struct seccomp_notif_resp response = {};
+        response.id = call.id;
+        response.error = -errorOf(call, fault, nMet);
+        // A sync succeeds without waiting for the disk.
+        response.flags = blSync || response.error ? 0 : SECCOMP_USER_NOTIF_FLAG_CONTINUE;
+        ioctl(nCalls, SECCOMP_IOCTL_NOTIF_SEND, &response);
+    }
+    return nMet;
+}
 
 // Closes a file without a name, and returns what was written to it.
 std::string textOf(int nFile)
@@ -232,8 +220,7 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
         }
     }).join();
     close(nInput);
-    SystemCalls calls(fault);
-    calls.answerAll(nCalls);
+    const int64_t nMet = answerCalls(nCalls, fault);
     close(nCalls);
     const int nStatus = statusOf(pid);
     Ending ending;
@@ -241,6 +228,6 @@ Ending runTool(const std::vector<std::string>& strArguments, const Fault& fault)
     ending.nStatus = WIFEXITED(nStatus) ? WEXITSTATUS(nStatus) : 0;
     ending.strOutput = textOf(nOutput);
     ending.strError = textOf(nError);
-    ending.nCalls = Fault::Kind::Memory == fault.kind ? rgAllocations[0] : calls.count();
+    ending.nCalls = Fault::Kind::Memory == fault.kind ? rgAllocations[0] : nMet;
     return ending;
 }
