@@ -4,6 +4,7 @@
 VEMO_TEST_FACTOR, a whole number, makes so many times as many kills; VEMO_TEST_SEED chooses other moments for them.
 """
 import collections
+import concurrent.futures
 import contextlib
 import fcntl
 import os
@@ -49,15 +50,13 @@ class Exactness(scene.Scene):
             if client:
                 client.close()
 
-        threads = [threading.Thread(target=spend, args=(number,)) for number in range(8)]
-        for thread in threads:
-            thread.start()
-        try:
-            yield
-        finally:
-            is_over.set()
-            for thread in threads:
-                thread.join()
+        with concurrent.futures.ThreadPoolExecutor(8) as pool:
+            spenders = pool.map(spend, range(8))
+            try:
+                yield
+            finally:
+                is_over.set()
+            list(spenders)  # raises what one of them raised
 
     @staticmethod
     def call(client, id):

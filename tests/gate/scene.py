@@ -129,9 +129,9 @@ class Scene(unittest.TestCase):
                         "--allow", "Example.File:get,put", "--allow", "Example.Page:get,\u00e4++")
 
     @classmethod
-    def grant_by_tool(cls, id, api="Api"):
+    def grant_by_tool(cls, id):
         """As the gate would answer."""
-        status = subprocess.run([TOOL, "grant", "-", api, "get"], env=cls.environment, input=id.encode(),
+        status = subprocess.run([TOOL, "grant", "-", "Api", "get"], env=cls.environment, input=id.encode(),
                                 stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL).returncode
         return {0: 200, 1: 403}.get(status, status)
 
