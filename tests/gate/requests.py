@@ -308,6 +308,16 @@ class Requests(scene.Scene):
         self.assertEqual(self.left(), left - 1)
         self.assertTrue(self.is_soon('vemo_gate_calls_total{outcome="cancelled"}', 3))
 
+    def test_a_look_at_its_health_waits_for_another_program_but_not_for_long(self):
+        with self.database() as holder:
+            holder.execute("BEGIN EXCLUSIVE")
+            self.assertEqual(self.answer("status", path="/health")[::2], (503, "the token database cannot be read\n"))
+            look = scene.connected(self.at("status"))
+            look.sendall(b"GET /health HTTP/1.1\r\nHost: gate\r\n\r\n")
+            time.sleep(0.1)
+            holder.execute("COMMIT")
+        self.assertEqual(self.received(look, ""), ["200 OK; healthy\n"])
+
 
 if __name__ == "__main__":
     scene.main()
