@@ -9,6 +9,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <map>
 #include <sstream>
 
 #include "Figures.h"
@@ -70,24 +71,16 @@ const Command COMMANDS[] = {
 
 // The sentences that name the cause. SQLite does not tell of a journal that it cannot make why, works on
 // where it may only read, and takes an error of reading for damage.
-std::vector<std::string> causes(Fault::Kind kind)
-{
-    switch (kind) {
-    case Fault::Kind::Error:
-        return {"Input/output error",
-                "disk I/O error",
-                "unable to open database file",
-                "attempt to write a readonly database",
-                "database disk image is malformed",
-                "the kernel gives no random numbers"};
-    case Fault::Kind::FullDisk:
-        return {"No space left on device", "database or disk is full", "disk I/O error",
-                "unable to open database file", "attempt to write a readonly database"};
-    case Fault::Kind::Memory: return {"out of memory", "Cannot allocate memory"};
-    case Fault::Kind::Signal: break;
-    }
-    return {};
-}
+const std::map<Fault::Kind, std::vector<std::string>> CAUSES = {
+    {Fault::Kind::Error,
+     {"Input/output error", "disk I/O error", "unable to open database file",
+      "attempt to write a readonly database", "database disk image is malformed",
+      "the kernel gives no random numbers"}},
+    {Fault::Kind::FullDisk,
+     {"No space left on device", "database or disk is full", "disk I/O error", "unable to open database file",
+      "attempt to write a readonly database"}},
+    {Fault::Kind::Memory, {"out of memory", "Cannot allocate memory"}},
+};
 
 bool contains(const std::string& strText, const std::string& strPart)
 {
@@ -267,7 +260,7 @@ protected:
         ASSERT_EQ(1U, strSentences.size());
         EXPECT_EQ(0U, strSentences[0].find("vemo-access-token: "));
         EXPECT_EQ(contains(ending.strError, files() + "/IN: ") ? 2 : 4, ending.nStatus);
-        const std::vector<std::string> strCauses = causes(fault.kind);
+        const std::vector<std::string>& strCauses = CAUSES.at(fault.kind);
         EXPECT_TRUE(std::any_of(strCauses.begin(), strCauses.end(), [&](const std::string& strCause) {
             return contains(ending.strError, strCause);
         })) << "no cause is named";
