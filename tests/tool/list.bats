@@ -40,12 +40,11 @@ at() {
     row expired- "deadline = $((now - 9000)), count = 0, function = 'File share',
         webapi_allow = '{\"A\":{\"method\":[]},\"B\":{\"method\":[\"m\",\"n\"]}}'"
     row soon---- "deadline = $((now + 9000)), count = 12345, uid = 65534"
-    run_tool list
-    expect 0 "\
+    gives "\
 TID       USER        FUNCTION         USES  DEADLINE             EXPIRES          SESSION    ALLOWS
 expired-  root        File share          0  $(at $((now - 9000)))  expired 2 h ago             A B:m,n
 soon----  nobody      VPN             12345  $(at $((now + 9000)))  in 2 h                      Api:get
-later---  4294967294  VPN         unlimited  $(at $((now + 200000)))  in 2 d           session-1  Api:get"
+later---  4294967294  VPN         unlimited  $(at $((now + 200000)))  in 2 d           session-1  Api:get" list
     run_tool list --no-header
     [ "$output" = "$(tool list | tail -n +2)" ]
 }
@@ -100,13 +99,11 @@ latest--  root  VPN  1  @9223372036854775807   in 1067519911NNNNN d    Api:get"
     row second-- "deadline = 9000000002, webapi_allow = '{}', uid = 4294967294"
     first='{"bind_sid":"session-1","count":-1,"create_time":1000000000,"deadline":9000000001,"extra":{"n":[1,0.5,null]},"function":"VPN","tid":"first---","uid":0,"webapi_allow":{"Api":{"method":["get"]}}}'
     second='{"bind_sid":"","count":1,"create_time":1000000000,"deadline":9000000002,"extra":{},"function":"VPN","tid":"second--","uid":4294967294,"webapi_allow":{}}'
-    run_tool list -o jsonl
-    expect 0 "$first
-$second"
+    gives "$first
+$second" list -o jsonl
     # Options for tables make no difference.
-    run_tool list --output=jsonl --no-header --utc
-    expect 0 "$first
-$second"
+    gives "$first
+$second" list --output=jsonl --no-header --utc
     succeeds list -o json
     [ "${#lines[@]}" -gt 10 ]
     printf %s "$output" >"$DIR/json"
@@ -117,9 +114,8 @@ $second"
     row first--- "deadline = 9000000001, bind_sid = 'a b'"
     row second-- "deadline = 9000000002, count = -1, extra = '{\"a\":\"ü\"}'"
     while IFS='|' read -r field first second; do
-        run_tool list --utc --field "$field"
-        expect 0 "$first
-$second"
+        gives "$first
+$second" list --utc --field "$field"
     done <<'END'
 tid|first---|second--
 uid|0|0
@@ -133,9 +129,8 @@ END
     run --keep-empty-lines --separate-stderr tool list --field bind_sid
     [ "$output" = $'a b\n\n' ]
     # It wins over a form.
-    run_tool list --field count -o json
-    expect 0 "1
--1"
+    gives "1
+-1" list --field count -o json
 }
 
 @test "--show-ids shows whole ids, in every form" {
@@ -294,11 +289,10 @@ b-------,4294967294,VPN,unlimited,2099-01-25 09:00:02Z,"",""'
 @test "--columns chooses those of a table" {
     row a------- "extra = '{\"note\":7}'"
     row b------- "extra = '[]', deadline = 99999999999"
-    run_tool list --columns uses,note,tid
-    expect 0 "\
+    gives "\
 USES  NOTE  TID
    1  7     a-------
-   1        b-------"
+   1        b-------" list --columns uses,note,tid
     gives $'0  0\n0  0' list --columns uid,uid --no-header
 }
 

@@ -541,10 +541,9 @@ TABLE
     chmod 0601 "$VEMO_REDIRECT_DIR.lock"
     run_tool purge
     expect 4 "" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
-    run_tool doctor
-    expect 5 "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0601
+    ends 5 "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0601
     meaning: others can hold the lock for ever; programs that take it refuse this file
-    remedy: remove it while no program that uses tokens runs"
+    remedy: remove it while no program that uses tokens runs" doctor
     if [ "$(id -u)" -eq 0 ]; then
         chmod 0600 "$VEMO_REDIRECT_DIR.lock"
         chown 1 "$VEMO_REDIRECT_DIR.lock"

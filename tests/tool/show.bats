@@ -12,8 +12,7 @@ shows_at() {
     now=$(date +%s)
     row token--- "bind_sid = 'session-1', deadline = $((now + 9000)), count = 12, extra = '{\"a\": [ 1 ]}'"
     deadline=$(date -d "@$((now + 9000))" '+%Y-%m-%d %H:%M:%S')
-    run_tool show "token---$ZEROS"
-    expect 0 "\
+    gives "\
 FIELD         VALUE
 tid           token---$ZEROS
 bind_sid      session-1
@@ -23,7 +22,7 @@ count         12
 create_time   2001-09-09 03:46:40
 function      VPN
 webapi_allow  {\"Api\":{\"method\":[\"get\"]}}
-extra         {\"a\":[1]}"
+extra         {\"a\":[1]}" show "token---$ZEROS"
     run_tool show --no-header "token---$ZEROS"
     [ "$output" = "$(tool show "token---$ZEROS" | tail -n +2)" ]
 }
