@@ -127,14 +127,14 @@ OVERLAY='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
     mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr && mount -t tmpfs tmpfs /run'
 
 # in_namespace COMMANDS ARGUMENTS...: bash executes them as root of such a namespace; there the tool works on the real
-# paths, and nothing is there yet
+# paths, and nothing is there yet. What is not root maps itself alone to root.
 in_namespace() {
+    local namespace=(unshare --mount --propagation private)
+    [ "$(id -u)" -eq 0 ] || namespace=(unshare --mount --user --map-root-user)
     [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
-    mkdir "$DIR/layer"
-    unshare --user --map-root-user --mount bash -c "$OVERLAY" "$DIR/layer" 2>/dev/null ||
-        skip "no namespace with an overlay here"
-    run --separate-stderr unshare --user --map-root-user --mount bash -c "unset VEMO_REDIRECT_DIR; $OVERLAY; $1" \
-        "$DIR/layer" "${@:2}"
+    mkdir -p "$DIR/layer"
+    "${namespace[@]}" bash -c "$OVERLAY" "$DIR/layer" 2>/dev/null || skip "no namespace with an overlay here"
+    run --separate-stderr "${namespace[@]}" bash -c "unset VEMO_REDIRECT_DIR; $OVERLAY; $1" "$DIR/layer" "${@:2}"
 }
 
 # commands_of_tool: the commands that help lists

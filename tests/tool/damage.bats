@@ -161,6 +161,15 @@ TABLE
     all_fail "$REAL_DB: Permission denied" '^[^i]|^import'
 }
 
+@test "reading needs no room on the disk" {
+    a_store
+    for arguments in "show $ID --field count" "check $ID Api get" "list --count"; do
+        # shellcheck disable=SC2016 # for the shell inside
+        run bash -c 'trap "" XFSZ; ulimit -f 0; exec "$@"' - "$TOOL" $arguments
+        [ "$status $output" = "0 $(tool $arguments)" ]
+    done
+}
+
 @test "a NULL in a token" {
     a_store
     sql "UPDATE token SET extra = NULL WHERE tid = '$ID'"
