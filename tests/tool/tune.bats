@@ -28,19 +28,12 @@ without_times() {
     sed -E 's/[0-9]+\.[0-9][0-9] ms/T/g; s/  +/|/g; s/\|$//' <<<"$output"
 }
 
-# expect_change INDEX INDEX JOURNAL JOURNAL [OTHERS [OTHERS]]: the last run told whether there was an index on the
-# deadline (and OTHERS, if they differ) and what the journal was, before and after
-expect_change() {
-    [ "$status$stderr" = 0 ]
-    [ "$(without_times)" = "WHAT|BEFORE|AFTER
-look for expired tokens, as every call does|T|T
-look for a session's tokens|T|T
-look for a purpose's tokens|T|T
-journal|$3|$4
-index token_deadline|$1|$2
-index token_bind_sid|${5-$1}|${6-$2}
-index token_function|${5-$1}|${6-$2}
-write a small change|T|T" ]
+# figures TIMES JOURNAL DEADLINE OTHERS: the lines that tell the journal, whether there is an index on the deadline and
+# whether on the other two, behind those that look; each with its columns
+figures() {
+    printf '%s\n' "look for expired tokens, as every call does|$1" "look for a session's tokens|$1" \
+        "look for a purpose's tokens|$1" "journal|$2" "index token_deadline|$3" "index token_bind_sid|$4" \
+        "index token_function|$4"
 }
 
 # The tokens are as they were.
@@ -49,50 +42,36 @@ expect_tokens() {
 ok" ]
 }
 
-@test "tune makes three indexes, and measures before and after" {
+@test "tune makes the indexes and the journal that it is asked for, and measures before and after" {
     a_store
-    run_tool tune
-    expect_change no yes delete delete
-    [ "$(indexes | xargs)" = "token_bind_sid:bind_sid token_deadline:deadline token_function:function" ]
-    expect_tokens
+    sql "PRAGMA user_version = 7; CREATE INDEX own ON token (uid)"
+    cp "$DB" "$DIR/store"
+    all=token_bind_sid:bind_sid,token_deadline:deadline,token_function:function
+    while IFS=/ read -r prepare arguments journal deadline others indexes_then; do
+        echo "$prepare, tune $arguments"
+        cp "$DIR/store" "$DB"
+        eval "$prepare" >"$DIR/prepared"
+        succeeds tune $arguments
+        [ "$(without_times)" = "WHAT|BEFORE|AFTER
+$(figures "T|T" "$journal" "$deadline" "$others")
+write a small change|T|T" ]
+        [ "$(indexes | paste -sd ,)" = "own:uid${indexes_then:+,$indexes_then}" ]
+        [ "$(sql "PRAGMA journal_mode; PRAGMA user_version" | xargs) $(stat -c %a "$DB")" = "${journal#*|} 7 700" ]
+        [ "$(ls -A "$VEMO_REDIRECT_DIR")" = vemo-access-token.db ]
+        expect_tokens
+    done <<TABLE
+//delete|delete/no|yes/no|yes/$all
+tool tune/--wal/delete|wal/yes|yes/yes|yes/$all
+tool tune --wal//wal|wal/yes|yes/yes|yes/$all
+tool tune --wal/--wal/wal|wal/yes|yes/yes|yes/$all
+tool tune --wal/--undo/wal|delete/yes|no/yes|no/
+/--undo/delete|delete/no|no/no|no/
+/--deadline-only/delete|delete/no|yes/no|no/token_deadline:deadline
+tool tune/--deadline-only/delete|delete/yes|yes/yes|no/token_deadline:deadline
+sql "CREATE INDEX token_deadline ON token (deadline)"//delete|delete/yes|yes/no|yes/$all
+TABLE
     run_tool doctor
     [[ $output != *index* ]]
-}
-
-@test "tune can be run twice" {
-    a_store
-    sql "PRAGMA user_version = 7" # the file's own
-    tool tune --wal
-    run_tool tune
-    expect_change yes yes wal wal
-    run_tool tune --wal
-    expect_change yes yes wal wal
-    tool tune --undo
-    run_tool tune --undo
-    expect_change no no delete delete
-    expect_tokens
-    [ "$(sql "PRAGMA user_version")" -eq 7 ]
-}
-
-@test "tune --deadline-only makes the index that grants need, and drops the others" {
-    a_store
-    for before in no yes; do
-        run_tool tune --deadline-only
-        expect_change $before yes delete delete $before no
-        [ "$(indexes)" = token_deadline:deadline ]
-        tool tune
-    done
-    expect_tokens
-}
-
-@test "tune --wal sets the write-ahead journal, too" {
-    a_store
-    run_tool tune --wal
-    expect_change no yes delete wal
-    [ "$(sql "PRAGMA journal_mode")" = wal ]
-    [ "$(stat -c %a "$DB")" = 700 ]
-    expect_tokens
-    gives "1 token revoked" revoke aaaaaaaa
 }
 
 @test "where there can be no write-ahead journal, tune says so and makes no indexes" {
@@ -120,26 +99,6 @@ TABLE
     [ "$(indexes)" = "" ]
 }
 
-@test "tune --undo takes back what tune did, and nothing else" {
-    a_store
-    sql "CREATE INDEX own ON token (uid)"
-    tool tune --wal
-    run_tool tune --undo
-    expect_change yes no wal delete
-    [ "$(indexes)" = own:uid ]
-    [ "$(sql "PRAGMA journal_mode")" = delete ]
-    [ "$(ls -A "$VEMO_REDIRECT_DIR")" = vemo-access-token.db ]
-    expect_tokens
-}
-
-@test "tune keeps an index that is there already" {
-    a_store
-    sql "CREATE INDEX token_deadline ON token (deadline)"
-    run_tool tune
-    expect_change yes yes delete delete no
-    expect_tokens
-}
-
 @test "tune --no-header leaves the titles out" {
     a_store
     succeeds tune --no-header
@@ -158,13 +117,7 @@ TABLE
         while IFS='|' read -r arguments statements; do
             succeeds tune --dry-run $arguments
             [ "$(without_times)" = "WHAT|NOW
-look for expired tokens, as every call does|T
-look for a session's tokens|T
-look for a purpose's tokens|T
-journal|$mode
-index token_deadline|no
-index token_bind_sid|no
-index token_function|no
+$(figures T $mode no no)
 $(echo -e "$statements")" ]
             cmp "$DB" "$DIR/before"
             [ "$(stat -c %y "$DB")" = "$changed" ]
