@@ -44,27 +44,6 @@ END
     [ "$(uses)" = "another-|5 endless-|-1 lowest--|-9223372036854775808 most----|9223372036854775807 token---|1" ]
 }
 
-@test "a refused grant says why, as check does, and spends nothing" {
-    rows <<'END'
-token---
-last----|count = 1
-END
-    all_tokens >"$DIR/before"
-    while IFS='|' read -r arguments reason; do
-        ends 1 "refused: $reason" check $arguments
-        fails 1 "refused: $reason" grant $arguments
-        fails 1 "refused: $reason" grant --print-user $arguments
-    done <<END
-token---$ZEROS Api put|method not listed
-token---$ZEROS Bare get|method not listed
-token---$ZEROS Other get|API not listed
-token---$ZEROS Other|API not listed
-last----$ZEROS api get|API not listed
-unknown-$ZEROS Api get|unknown token
-END
-    all_tokens | diff "$DIR/before" -
-}
-
 @test "a grant needs the whole id, which may come from standard input" {
     row token---
     while IFS='|' read -r tid hint; do

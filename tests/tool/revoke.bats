@@ -28,20 +28,15 @@ END
     gives "0 tokens revoked" revoke --function VPN --yes
 }
 
-@test "revoke takes prefixes of 8 characters or more, and whole ids whatever their length" {
+@test "revoke takes ids as show does, also twice" {
     tool init
-    for tid in Abcdefgh1 Abcdefgh2 abcdefgh1 Xbcdefgh Xbcdefghi short -begins-with-a-dash; do
+    for tid in Abcdefgh1 Abcdefgh2 Xbcdefgh Xbcdefghi -begins-with-a-dash; do
         row "$tid" "tid = '$tid'"
     done
-    gives "1 token revoked" revoke abcdefgh
     gives "1 token revoked" revoke Abcdefgh2 Abcdefgh2
     gives "1 token revoked" revoke Xbcdefgh # which is an id as well as a prefix
-    gives "1 token revoked" revoke short
     gives "1 token revoked" revoke -- -begins-
-    # A prefix matches as it is written.
-    for tid in Abcdefg% Abcdefg_ "Abcdefg'" 'Abcdefg*' ABCDEFGH bcdefgh1 Abcdefgh11; do
-        says "0 tokens revoked" "1 id is unknown" revoke "$tid"
-    done
+    says "0 tokens revoked" "1 id is unknown" revoke Abcdefgh11
     expect_left Abcdefgh1 Xbcdefghi
 }
 
@@ -57,16 +52,18 @@ END
     # Somebody has the database open, but of nothing that was revoked nothing can come back.
     says "0 tokens revoked" "1 id is unknown" revoke unknown1 8<"$DB"
     gives "0 tokens revoked" revoke --function none --yes 8<"$DB"
-    fails 2 "TID: an id on standard input holds a NUL byte" revoke - < <(printf 'eeeeeeee\0x\n')
     expect_left eeeeeeee
 }
 
-@test "selectors choose the tokens, and those that fit all of several" {
+@test "selectors choose the tokens, and those that fit all of several; --dry-run tells how many, and changes nothing" {
     six_tokens
     cp "$DB" "$DIR/six"
     while IFS='|' read -r selectors revoked; do
         cp "$DIR/six" "$DB"
-        eval "gives '${#revoked} token$([ ${#revoked} = 1 ] || echo s) revoked' revoke --yes $selectors"
+        number="${#revoked} token$([ ${#revoked} = 1 ] || echo s)"
+        eval "gives '$number would be revoked' revoke --dry-run $selectors"
+        cmp "$DB" "$DIR/six"
+        eval "gives '$number revoked' revoke --yes $selectors"
         left=abcdef
         left=${left//["$revoked "]/}
         expect_left ${left//?/&&&&&&&& }
@@ -74,35 +71,11 @@ END
 --uid 0|ab
 --function "it's"|f
 --function vpn|
---bind-sid s1|ace
 --uid 65534 --function Mail --bind-sid s1|e
 --user root --created-before @1 --opens Other|
 --all|abcdef
 TABLE
-}
-
-@test "--dry-run tells how many, asks nothing and changes nothing" {
-    six_tokens
-    sql "UPDATE token SET uid = 4294967294 WHERE tid LIKE 'a%'; UPDATE token SET count = -1 WHERE tid LIKE 'b%';
-         UPDATE token SET deadline = 5 WHERE tid LIKE 'c%';
-         UPDATE token SET deadline = strftime('%s', 'now') + 1000 WHERE tid LIKE 'd%'"
-    cp "$DB" "$DIR/six"
-    while IFS='|' read -r arguments number; do
-        run_tool revoke --dry-run $arguments
-        expect 0 "$number would be revoked" "$([[ $arguments != *unknown* ]] || echo "vemo-access-token: 1 id is unknown")"
-    done <<'TABLE'
-aaaaaaaa|1 token
-aaaaaaaa bbbbbbbb unknown-|2 tokens
-unknown-|0 tokens
---no-owner|1 token
---opens Other|0 tokens
---expired|1 token
---created-after @1|0 tokens
---unlimited|1 token
---expiring 1h|1 token
---created-before @1|6 tokens
---all|6 tokens
---yes --all|6 tokens
-TABLE
-    cmp "$DB" "$DIR/six"
+    cp "$DIR/six" "$DB"
+    says "0 tokens would be revoked" "1 id is unknown" revoke --dry-run unknown-
+    says "2 tokens would be revoked" "1 id is unknown" revoke --dry-run eeeeeeee ffffffff unknown-
 }
