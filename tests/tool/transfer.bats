@@ -32,12 +32,10 @@ all_rows() {
          FROM token ORDER BY tid"
 }
 
-# odd_tokens NUMBER: so many tokens of odd texts, numbers and data, and one without an id
+# odd_tokens: tokens of odd texts, numbers and data, and one without an id
 odd_tokens() {
-    local seed=${VEMO_TEST_SEED-1}
-    echo "seed $seed"
     row without-id "tid = '', deadline = 1"
-    /usr/bin/python3 "$BATS_TEST_DIRNAME/odd_rows.py" "$DB" "$seed" "$1"
+    /usr/bin/python3 "$BATS_TEST_DIRNAME/odd_rows.py" "$DB"
 }
 
 # --- export
@@ -291,19 +289,13 @@ vemo-access-token: nothing exported; without 1 token, the file would not be whol
         cp "$DIR/sound" "$DB"
     done <<TABLE
 uid = 'root'~"uid" is not a whole number
-deadline = 9999999999.5~"deadline" is not a whole number
 count = 'two'~"count" is not a whole number
-create_time = CURRENT_TIMESTAMP~"create_time" is not a whole number
 tid = CAST(tid AS BLOB)~"tid" is not a text
-bind_sid = x''~"bind_sid" is not a text
 function = CAST('VPN' AS BLOB)~"function" is not a text
 function = 'V' || char(0)~"function" holds a NUL character
-tid = tid || char(0, 65)~"tid" holds a NUL character
 extra = '{}' || char(0)~"extra" holds a NUL character
-webapi_allow = x'7b7d00'~"webapi_allow" holds a NUL character
 webapi_allow = '{"Api":'~"webapi_allow" is not JSON
 extra = ''~"extra" is not JSON
-extra = '{"a":"\ud800"}'~"extra" is not JSON
 extra = '$(printf '{"a":%.0s' {1..1000})1$(printf '}%.0s' {1..1000})'~"extra" is nested too deeply
 TABLE
 }
@@ -346,10 +338,9 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
 # --- import
 
 @test "tokens come back from an export as they were, whatever they hold" {
-    count=$((500 * ${VEMO_TEST_FACTOR-1}))
-    odd_tokens $count
+    odd_tokens
     all_rows >"$DIR/rows"
-    [ "$(wc -l <"$DIR/rows")" -eq $((1 + count)) ]
+    [ "$(wc -l <"$DIR/rows")" -gt 250 ]
     tool export "$DIR/file"
     sql "DELETE FROM token"
     tool import "$DIR/file"
@@ -359,13 +350,12 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
 }
 
 @test "tokens move through a pipe to a machine that has no database yet" {
-    odd_tokens 10
-    there=$(all_rows)
+    row A
     mkdir -m 0700 "$DIR/other"
     run --separate-stderr bash -c '"$0" export 2>/dev/null | VEMO_REDIRECT_DIR=$1 "$0" import -' "$TOOL" "$DIR/other"
-    [ "$status $output" = "0 11 tokens imported" ]
+    [ "$status $output" = "0 1 token imported" ]
     DB=$DIR/other/vemo-access-token.db
-    [ "$(all_rows)" = "$there" ]
+    expect_left A
     [ "$(stat -c %a "$DB")" = 700 ]
 }
 
@@ -426,30 +416,19 @@ TABLE
 3 has no "tid"~sed '3s/}}/,"x":1}}/'~sed '3s/}}/},"x":1}/'~sed '3s/2}/-2}/'~sed '3s/2}/2.5}/'~sed '3s/:"[^"]*"/:1/'
 3 has no "tid"~sed '3s/:.*/:[1,2]}/'
 2 has no "tid"~sed '2s/"tid":"[^"]*",//'
-2 has no "bind_sid"~sed '2s/"bind_sid":"",//'
 2 has no "uid"~sed '2s/"uid":0,//'
-2 has no "deadline"~sed '2s/"deadline":9999999999,//'
-2 has no "count"~sed '2s/"count":1,//'
-2 has no "create_time"~sed '2s/"create_time":0,//'
-2 has no "function"~sed '2s/"function":"VPN",//'
-2 has no "webapi_allow"~sed '2s/,"webapi_allow":{}//'
 2 has no "extra"~sed '2s/"extra":{},//'
 2 "tid" is not a string~sed '2s/"tid":"[^"]*"/"tid":1/'
-2 "bind_sid" is not a string~sed '2s/"bind_sid":""/"bind_sid":null/'
 2 "function" is not a string~sed '2s/"VPN"/["VPN"]/'
 2 "uid" is not a whole number~sed '2s/"uid":0/"uid":"0"/'~sed '2s/"uid":0/"uid":9223372036854775808/'
 2 "deadline" is not a whole number~sed '2s/9999999999/null/'~sed '2s/9999999999/9223372036854775808/'
 2 "count" is not a whole number~sed '2s/"count":1/"count":1.5/'~sed '2s/"count":1/"count":true/'
 2 "count" is not a whole number~sed '2s/"count":1/"count":Infinity/'~sed '2s/"count":1/"count":-9223372036854775809/'
-2 "create_time" is not a whole number~sed '2s/"create_time":0/"create_time":{}/'
 2 "other" is not a field of a token~sed '2s/"extra":{}/&,"other":1/'
 2 "function" holds a NUL character~sed '2s/VPN/V\\u0000N/'
-2 "bind_sid" holds a NUL character~sed '2s/"bind_sid":"/&\\u0000/'
-2 "tid" holds a NUL character~sed '2s/"tid":"B/&\\u0000/'
 2 is not a JSON object~sed '2s/.*/[]/'~sed '2s/.*/[&]/'
-2 is not JSON: *~sed '2s/.*/x/'~sed '2s/.*/1/'~sed '2s/.*/"a"/'~sed '2s/.*/null/'~sed '2s/.*/{/'~sed '2s/$/,/'
-2 is not JSON: *~sed '2s/.*/&&/'~sed '2s/$/ x/'~sed "2s/.*/'&'/"~sed '2s,^,//,'~sed '2s/1//'~sed '2s/VPN/\\ud800/'
-2 is not JSON: *~sed '2s/VPN/\\x/'~sed '2s/"count":1/&,"count":2/'~sed '2s/://'~head -n 1 | cat - <(printf x)
+2 is not JSON: *~sed '2s/.*/x/'~sed '2s/.*/1/'~sed '2s/.*/{/'~sed '2s/$/ x/'~sed '2s/"count":1/&,"count":2/'
+2 is not JSON: *~sed "2s/.*/'&'/"~sed '2s,^,//,'~sed '2s/VPN/\\ud800/'~head -n 1 | cat - <(printf x)
 1 is not JSON: *~sed '1s/}$//'
 2 holds a NUL byte~head -n 1 | cat - <(printf '{\0')
 1 holds a NUL byte~sed '1s/$/\x00/'~sed '1s/$/\x00{broken/'~sed '1s/^/\x00/'
