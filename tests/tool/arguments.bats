@@ -29,89 +29,59 @@ help list show|unexpected argument "show"
 -x|unknown option "-x"
 --|unknown option "--"
 --hlep|unknown option "--hlep"; did you mean "--help"?
-list --count=5|--count: takes no value
-list --expired=false|--expired: takes no value
-list --verbose=1|--verbose: takes no value
 list --help=1|--help: takes no value
-list --bogus|unknown option "--bogus"
-list --bogus=x|unknown option "--bogus"
 list --funct TAG|unknown option "--funct"; did you mean "--function"?
-list --verb|unknown option "--verb"; did you mean "--verbose"?
-list --fucntion=TAG|unknown option "--fucntion"; did you mean "--function"?
 list --limit x --uid y --bogus|--limit: "x" is not a number from 1 to 9223372036854775807
-list --uid y --limit x|--uid: "y" is not a number from 0 to 4294967294
-list --uid y --limit|--uid: "y" is not a number from 0 to 4294967294
 list --help --bogus|unknown option "--bogus"
-list --limit|--limit: needs a value
-list --output|--output: needs a value
-list --sort tid --sort uid|--sort: can be given once only
 list list|unexpected argument "list"
 list --uid 0 --user root|--uid excludes --user
 list --utc --epoch|--utc excludes --epoch
 list --columns uid -o json|--columns is for tables and CSV
-list --columns uid --field function|--columns is for tables and CSV
 list -o xml|--output: "xml" is not a form: table, json, jsonl or csv
 list -o JSON|--output: "JSON" is not a form: table, json, jsonl or csv
 list --sort \$'a\e[31m\nb\x7f'|--sort: "a\x1b[31m\x0ab\x7f" is not a field of a token
 list --sort \$'Ä\xc2\x9b31m'|--sort: "Ä\xc2\x9b31m" is not a field of a token
 purge -x|unknown option "-x"
-purge -vx|unknown option "-x"
-purge --yes|unknown option "--yes"
-purge --all|unknown option "--all"
 purge 12345678|unexpected argument "12345678"
 init now|unexpected argument "now"
 generate more|unexpected argument "more"
-generate -- more|unexpected argument "more"
-generate -|unexpected argument "-"
 create|--function is required
 create --function VPN|--uid or --user is required
 create --uid 0|--function is required
 create --function= --uid 0|--function: must not be empty
-create --function TAG --function TAG|--function: can be given once only
-create --uid 0 --function|--function: needs a value
 create --uid 0 --user root --function VPN|--uid excludes --user
 create --uid 0 --function VPN --uses 2 --unlimited|--uses excludes --unlimited
 create --uid 0 --function VPN -o csv|--output: "csv" is not a form: table, json or jsonl
-create --uid 0 --function VPN more|unexpected argument "more"
 create --uid 0 --function VPN --tid token--|--tid: an id needs 127 characters at least, this one has 7
 create --uid 0 --function VPN --tid "${ZEROS%0}12345678"|--tid: an id needs 127 characters at least, this one has 126
 create --uid 0 --function VPN --tid "token---$ZEROS"|--tid: there is a token with this id already
 create --uid 0 --function VPN --tid=|--tid: the id is empty
 show|TID is required
-show -o|--output: needs a value
 show -o xml --utc|TID is required
 show token---0 token---1|unexpected argument "token---1"
-show token---0 --show-ids|unknown option "--show-ids"
 show token---0 -o yaml|--output: "yaml" is not a form: table, json, jsonl or csv
 show token---0 --epoch --utc|--epoch excludes --utc
 show token--- --columns uid -o json|--columns is for tables and CSV
 check|TID is required
 check token---|API is required
 check token--- ''|API: must not be empty
-check token--- '' get|API: must not be empty
 check token--- Api get put|unexpected argument "put"
 check token--- Api -o xml|--output: "xml" is not a form: table, json or jsonl
 grant|TID is required
 grant token---$ZEROS|API is required
 grant token---$ZEROS ''|API: must not be empty
-grant token---$ZEROS Api get put|unexpected argument "put"
 grant token---$ZEROS Api -o csv|--output: "csv" is not a form: table, json or jsonl
 update --uses 2|TID is required
 update token---|say what to change; "update --help" lists the fields
-update token--- second-1 --uses 2|unexpected argument "second-1"
 update token--- --uses 2 --unlimited|--uses excludes --unlimited
 update token--- --ttl 1h --deadline 2060-01-01|--ttl excludes --deadline
 update token--- --allow A --add-allow B|--allow excludes --add-allow
 update token--- --allow A --remove-allow B|--allow excludes --remove-allow
 rotate expired-|$expired
-rotate token--- second-1|unexpected argument "second-1"
 revoke --all|$alone
 revoke --uid 0|$alone
-revoke --user root|$alone
-revoke --function VPN|$alone
 revoke --bind-sid s1|$alone
 revoke|$which
-revoke --yes|$which
 revoke --dry-run|$which
 revoke token--- --all|$which
 revoke token--- --uid 0|$which
@@ -119,21 +89,17 @@ revoke --all --function VPN --yes|$which
 revoke --yes --bind-sid ""|--bind-sid: must not be empty
 revoke --yes --user root --uid 0|--user excludes --uid
 revoke token--- second-1|TID: several tokens begin with "second-1"; give more of the id
-revoke --dry-run token--- second-1|TID: several tokens begin with "second-1"; give more of the id
 revoke token--- second-|TID: "second-" is too short: give the id or its first 8 characters, or more
 revoke token--- ""|TID: the id is empty
 doctor -o xml|--output: "xml" is not a form: table, json or jsonl
-doctor --fix|unknown option "--fix"
 doctor token---|unexpected argument "token---"
 stats -o xml|--output: "xml" is not a form: table, json, jsonl or metrics
 stats --prometheus -o json|--prometheus excludes --output
 stats --prometheus -o metrics|--prometheus excludes --output
 stats VPN|unexpected argument "VPN"
 tune --wal --undo|--wal excludes --undo
-tune --undo --wal --dry-run|--undo excludes --wal
 tune --undo --deadline-only|--undo excludes --deadline-only
 tune deadline|unexpected argument "deadline"
-tune -o|unknown option "-o"
 TABLE
     LC_ALL=C fails 2 'unknown command "café"' café # only of a terminal anything is known
 }
@@ -144,13 +110,11 @@ TABLE
     a_time='"VALUE" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599'
     columns="tid, user, function, uses, deadline, expires, session, allows, uid, created, note, extra"
     syntax="is not JSON: Column 1 Syntax error: value, object or array expected."
-    deep=$(printf '{"a":%.0s' {1..1000})'{}'$(printf '}%.0s' {1..1000})
     tool init
     before=$(state)
     cd "$DIR"
     printf '[1]' >array
     printf '{"a":' >broken
-    printf '{\n"a":\n}' >lines
     printf '{"a":"b\0c"}' >nul
     printf '{}\0' >nul-behind
     : >empty
@@ -181,16 +145,9 @@ TABLE
 --columns|tid,|"" is not a column: $columns
 --extra|'[]' '[{"a":1}]' @array|is not a JSON object
 --extra|'' @empty|$syntax
---extra|1 null|is not JSON: Column 1 A valid JSON document must be either an array or an object value.
---extra|'{' '{a:1}'|is not JSON: Column 2 Missing '}' or object member name
---extra|'{"a":1,}'|is not JSON: Column 8 Missing '}' or object member name
---extra|'{"a" 1}'|is not JSON: Column 6 Missing ':' after object member name
 --extra|'{"a":1} x'|is not JSON: Column 9 Extra non-whitespace after JSON value.
---extra|'{} //'|is not JSON: Column 4 Extra non-whitespace after JSON value.
 --extra|'{"a":1,"a":2}'|is not JSON: Column 8 Duplicate key: 'a'
 --extra|@broken|is not JSON: Column 6 Syntax error: value, object or array expected.
---extra|@lines|is not JSON: Line 3, Column 1 Syntax error: value, object or array expected.
---extra|'$deep'|is nested too deeply for JSON
 --extra|@|"@" names no file
 --extra|@missing|missing: No such file or directory
 --extra|@$DIR|$DIR: Is a directory
