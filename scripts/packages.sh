@@ -68,8 +68,8 @@ install_needed()
     BUILD_PACKAGES=(g++ cmake ninja-build pkg-config libjsoncpp-dev libsqlite3-dev libbsd-dev
         libmd-dev libevent-dev libseccomp-dev)
     UNIT_TEST_PACKAGES=(libgtest-dev)
-    TEST_PACKAGES=(valgrind bats sqlite3 tzdata python3 mandoc bash-completion zsh fish curl nginx-light caddy
-        openssl)
+    TEST_PACKAGES=(valgrind bats sqlite3 tzdata python3 python3-pexpect mandoc bash-completion zsh fish curl
+        nginx-light caddy openssl)
     CLANG_PACKAGES=(clang libclang-rt-dev lld)
     BENCH_PACKAGES=(libbenchmark-dev)
     PEER_PACKAGES=(libhiredis-dev libpq-dev) # to build what measures Redis and PostgreSQL

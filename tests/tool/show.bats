@@ -43,7 +43,7 @@ extra         null" ]
 }
 
 @test "forms, columns and fields are those of a list that shows whole ids" {
-    row token--- "bind_sid = ' a,b', extra = '{\"n\":[1,0.5,null,\"ü\"]}', count = -1"
+    row token--- "bind_sid = ' a,b, and more', extra = '{\"n\":[1,0.5,null,\"ü\"]}', count = -1"
     while read -r arguments; do
         gives "$(tool list --show-ids $arguments)" show token--- $arguments
     done <<'END'

@@ -1,4 +1,4 @@
-#!/usr/bin/python3 -IS
+#!/usr/bin/python3 -I
 """Runs the tool on a terminal of its own and prints what the terminal shows.
 
 terminal.py [--columns N] [--modes FILE] [--answer TEXT REPLY]... [--shell SCRIPT] -- ARGUMENTS...
@@ -10,63 +10,17 @@ showed then what was typed, and one at the end, whether its modes are those of t
 The exit status is the program's, as a shell tells it; 99 when a TEXT or the program's end did not come.
 """
 
-import fcntl
+import argparse
 import os
 import pty
-import select
 import signal
-import struct
 import sys
 import termios
 import time
 
+import pexpect
+
 TIMEOUT = 20  # seconds
-FLAGS = 3  # where termios.tcgetattr() has the local ones
-
-
-def command_line():
-    """Returns the options by their names, the answers as pairs, and what to run."""
-    options = {"--columns": "80", "--modes": os.devnull, "--shell": ""}
-    answers = []
-    rest = iter(os.fsencode(argument) for argument in sys.argv[1:])
-    for option in rest:
-        if option == b"--":
-            break
-        if option == b"--answer":
-            answers.append((next(rest), next(rest)))
-        else:
-            options[option.decode()] = next(rest)
-    script = options["--shell"]
-    return options, answers, [*(["sh", "-c", script] if script else []), os.environ["VEMO_TEST_TOOL"], *rest]
-
-
-def start(command, columns):
-    """Returns the process that runs the command, and the terminal that all its streams are on."""
-    pid, terminal = pty.fork()
-    if pid == 0:
-        fcntl.ioctl(0, termios.TIOCSWINSZ, struct.pack("4H", 24, columns, 0, 0))
-        signal.signal(signal.SIGINT, signal.SIG_DFL)  # what runs in the background of a script ignores it
-        os.execvp(command[0], command)
-    return pid, terminal
-
-
-def initial_modes():
-    """Returns the modes of a terminal that no program has touched."""
-    own, other = pty.openpty()
-    modes = termios.tcgetattr(other)
-    os.close(own)
-    os.close(other)
-    return modes
-
-
-def read_on(terminal):
-    """Returns what the terminal shows next, and nothing when all programs have closed it."""
-    if not select.select([terminal], [], [], TIMEOUT)[0]:
-        raise TimeoutError
-    try:
-        return os.read(terminal, 1 << 16)
-    except OSError:
-        return b""
 
 
 def wait_until_it_sleeps(pid):
@@ -79,41 +33,45 @@ def wait_until_it_sleeps(pid):
         time.sleep(0.001)
 
 
-def talk(pid, terminal, answers, modes):
+def talk(child, answers, modes):
     """Types the answers, and returns all that is shown until the end."""
     shown = b""
-    answered = 0  # bytes of it
     for text, reply in answers:
-        while text not in shown[answered:]:
-            more = read_on(terminal)
-            if not more:
-                raise EOFError
-            shown += more
-        answered = shown.index(text, answered) + len(text)
-        hidden = not termios.tcgetattr(terminal)[FLAGS] & termios.ECHO
-        modes.write("typed: " + ("hidden" if hidden else "shown") + "\n")
-        wait_until_it_sleeps(pid)
-        os.write(terminal, reply)
-    while more := read_on(terminal):
-        shown += more
-    return shown
+        child.expect_exact(os.fsencode(text))
+        shown += child.before + child.after
+        modes.write("typed: " + ("shown" if child.getecho() else "hidden") + "\n")
+        wait_until_it_sleeps(child.pid)
+        child.send(os.fsencode(reply))
+    child.expect_exact(pexpect.EOF)
+    return shown + child.before
 
 
 def main():
-    options, answers, command = command_line()
-    pid, terminal = start(command, int(options["--columns"]))
-    with open(options["--modes"], "w", encoding="ascii") as modes:
+    end = sys.argv.index("--")
+    parser = argparse.ArgumentParser()
+    parser.add_argument("--columns", type=int, default=80)
+    parser.add_argument("--modes", default=os.devnull)
+    parser.add_argument("--answer", nargs=2, action="append", default=[])
+    parser.add_argument("--shell")
+    options = parser.parse_args(sys.argv[1:end])
+    command = [*(["sh", "-c", options.shell] if options.shell else []), os.environ["VEMO_TEST_TOOL"], *sys.argv[end + 1:]]
+    # What runs in the background of a script ignores the signal.
+    child = pexpect.spawn(command[0], command[1:], timeout=TIMEOUT, dimensions=(24, options.columns),
+                          preexec_fn=lambda: signal.signal(signal.SIGINT, signal.SIG_DFL))
+    child.delaybeforesend = None
+    with open(options.modes, "w", encoding="ascii") as modes:
         try:
-            shown = talk(pid, terminal, answers, modes)
-        except (EOFError, TimeoutError) as failure:
-            print("the terminal does not show what is expected:", repr(failure), file=sys.stderr)
-            os.kill(pid, signal.SIGKILL)
+            shown = talk(child, options.answer, modes)
+        except pexpect.ExceptionPexpect as failure:
+            print("the terminal does not show what is expected:", failure, file=sys.stderr)
+            child.kill(signal.SIGKILL)
             return 99
-        same = termios.tcgetattr(terminal) == initial_modes()
+        untouched = termios.tcgetattr(pty.openpty()[1])
+        same = termios.tcgetattr(child.child_fd) == untouched
         modes.write("modes: " + ("as before" if same else "changed") + "\n")
     sys.stdout.buffer.write(shown.replace(b"\r\n", b"\n"))
-    status = os.waitstatus_to_exitcode(os.waitpid(pid, 0)[1])
-    return status if status >= 0 else 128 - status
+    child.wait()
+    return child.exitstatus if child.signalstatus is None else 128 + child.signalstatus
 
 
 sys.exit(main())
