@@ -67,19 +67,11 @@ END
         [ "$(column webapi_allow "$tid")" = "$stored" ]
     done <<'END'
 --allow A|{"A":{"method":[]}}
---allow A:m|{"A":{"method":["m"]}}
---allow=A:m,n|{"A":{"method":["m","n"]}}
 --allow A:n,m,n|{"A":{"method":["n","m"]}}
 --allow A:m --allow B --allow A:n,m|{"A":{"method":["m","n"]},"B":{"method":[]}}
---allow A --allow A:m|{"A":{"method":["m"]}}
---allow A:m --allow A|{"A":{"method":["m"]}}
+--allow A --allow A:m --allow A|{"A":{"method":["m"]}}
 --allow A:m:n|{"A":{"method":["m:n"]}}
---allow 'A b:m n'|{"A b":{"method":["m n"]}}
 --allow '"\'|{"\"\\":{"method":[]}}
---allow '[A,B]'|{"[A,B]":{"method":[]}}
---allow '{}'|{"{}":{"method":[]}}
---allow %%|{"%%":{"method":[]}}
---allow -A|{"-A":{"method":[]}}
 --allow Äpi:ü|{"Äpi":{"method":["ü"]}}
 END
 }
@@ -108,50 +100,34 @@ vemo-access-token: --allow: "c d" holds a blank, which is part of the name' ]
     expect 2 "" "vemo-access-token: --tid: there is a token with this id already"
 }
 
-# nested LEVELS: an object in an object in an object...
-nested() {
-    printf '{"a":%.0s' $(seq 2 "$1")
-    printf '{}'
-    printf '}%.0s' $(seq 2 "$1")
-}
-
 @test "--extra takes a JSON object, on the command line or in a file" {
     tool init
-    while IFS='|' read -r extra stored; do
-        echo "$extra"
-        tid=$(tool create --uid 0 --function VPN --extra "$extra")
-        [ "$(column extra "$tid")" = "$stored" ]
-    done <<'END'
-{}|{}
- { "b" : [ ] , "a" : { "c" : null } } |{"a":{"c":null},"b":[]}
-{"n":[0,-1,9223372036854775807,18446744073709551615,0.5,2e3]}|{"n":[0,-1,9223372036854775807,18446744073709551615,0.5,2000.0]}
-{"t":[true,false,""]}|{"t":[true,false,""]}
-{"ü":"\u00fc\n\"\\\u0000\u001b'"}|{"ü":"ü\n\"\\\u0000\u001b'"}
-{"@":"@"}|{"@":"@"}
-END
+    # As many levels as the library reads back.
+    nested=$(printf '{"a":%.0s' {2..1000}){}$(printf '}%.0s' {2..1000})
     # Line breaks, and one at the end, as in files that people write.
     printf '{\n  "file": [1,\n2]\n}\n' >"$DIR/extra file"
-    tid=$(tool create --uid 0 --function VPN --extra "@$DIR/extra file")
-    [ "$(column extra "$tid")" = '{"file":[1,2]}' ]
-    # As many levels as the library reads back.
-    tid=$(tool create --uid 0 --function VPN --extra "$(nested 1000)")
-    [ "$(column extra "$tid")" = "$(nested 1000)" ]
-    [ "$(tool show "$tid" --field extra)" = "$(nested 1000)" ]
+    while IFS='|' read -r extra stored; do
+        echo "$extra"
+        gives "$stored" show "$(a_token --extra "$extra")" --field extra
+    done <<END
+ { "b" : [ ] , "a" : { "c" : null } } |{"a":{"c":null},"b":[]}
+{"n":[0,-1,9223372036854775807,18446744073709551615,0.5,2e3]}|{"n":[0,-1,9223372036854775807,18446744073709551615,0.5,2000.0]}
+{"ü":"\u00fc\n\"\\\u0000\u001b'"}|{"ü":"ü\n\"\\\u0000\u001b'"}
+@$DIR/extra file|{"file":[1,2]}
+$nested|$nested
+END
 }
 
 @test "create takes an id of the caller's own" {
     tool init
     gives "$OWN" create --uid 0 --function VPN --allow Api --tid "$OWN"
     gives "${OWN/own/two}" create --uid 0 --function VPN --allow Api --tid - <<<"${OWN/own/two}"
-    # Empty lines do not matter, nor does a missing line break.
-    gives "${OWN/own/tre}" create --uid 0 --function VPN --allow Api --tid - < <(printf '\n\n%s' "${OWN/own/tre}")
     # It may hold anything, and be as long as the caller likes.
     odd="' \"Ä\\$(printf '%010000d' 0)"
     gives "$odd" create --uid 0 --function VPN --allow Api --tid - <<<"$odd"
     tool generate | tool create --uid 0 --function VPN --tid - >"$DIR/tid"
     [ "$(sql "SELECT tid FROM token ORDER BY rowid")" = "$OWN
 ${OWN/own/two}
-${OWN/own/tre}
 $odd
 $(cat "$DIR/tid")" ]
 }
@@ -185,10 +161,6 @@ $OWN|1" ]
     [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
     [ "$output" != "$(tool generate)" ]
     [ ! -e "$VEMO_REDIRECT_DIR" ]
-    # Any user may.
-    user=()
-    [ "$(id -u)" -ne 0 ] || user=(setpriv --reuid=65534 --regid=65534 --clear-groups)
-    ! "${user[@]}" test -x "$TOOL" || "${user[@]}" env -u VEMO_REDIRECT_DIR "$TOOL" generate
 }
 
 @test "create says what became of a token that was to be taken back" {

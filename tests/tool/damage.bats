@@ -212,16 +212,6 @@ TABLE
     gives granted grant "token---$ZEROS" Api get
 }
 
-@test "a number that is no user's" {
-    row token---
-    for uid in 4294967296 -4294967296 -1 9223372036854775807; do # the first two are 0 in 32 bits
-        sql "UPDATE token SET uid = $uid, count = -1"
-        run_tool list --no-header --epoch
-        [[ $output == "token---  $uid "* ]]
-        fails 4 "granted, but there is no user of the number $uid" grant "token---$ZEROS" Api get --print-user
-    done
-}
-
 @test "garbage in the journals hides no tokens" {
     a_store
     for journal in journal wal; do
