@@ -64,14 +64,14 @@ leaf() {
         all_fail "$sentence" "${!which}"
         run_tool doctor
         [ "$status$stderr" = "$([[ $finding == note* ]] && echo 0 || echo 5)" ]
-        [[ ${lines[0]} == $finding ]]
-        [[ $output != *"says how badly"* ]] # that would be itself
+        [[ ${lines[0]} == $finding && ${lines[0]} != *'\x0a'* ]] # what SQLite says in several lines is on one
+        [[ $output != *"vemo-access-token doctor"* ]] # that would be itself
     done <<TABLE
 echo "These are the notes of somebody else." >"\$DB"|all|$NO_DATABASE|error: $NO_DATABASE
 head -c 100 /dev/urandom >"\$DB"|some|$NO_DATABASE|error: $NO_DATABASE
 spoil 1 /dev/zero|some|$NO_DATABASE|error: $NO_DATABASE
 truncate -s 8192 "\$DB"|all|$MALFORMED|error: *malformed*
-spoil "\$(root)" /dev/zero|uncounted|$MALFORMED|error: the database is damaged: *
+spoil "\$(root)" /dev/zero|uncounted|$MALFORMED|error: the database is damaged: *age 3: btreeInitPage() returns error code 11*
 spoil "\$(root)"|uncounted|$MALFORMED|error: the database is damaged: *
 : >"\$DB"|unmade|$NO_TABLE|error: the database has no table of tokens
 rm "\$DB"|unmade|$NO_FILE|note: there is no database $REAL_DB
