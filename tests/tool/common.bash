@@ -2,7 +2,7 @@
 # database in it.
 #
 # It calls the tool by one of these; each is explained below:
-#   tool, run_tool and expect, succeeds, gives, fails, refuses, on_terminal, in_namespace
+#   tool, run_tool and expect, succeeds, gives, says, ends, fails, refuses, expect_first, on_terminal, in_namespace
 # makes what there is to work on with these:
 #   a_token, row, rows, many_rows, whole
 # and looks at the result with these:
@@ -102,6 +102,12 @@ ends() {
 fails() {
     run_tool "${@:3}"
     expect "$1" "" "vemo-access-token: $2"
+}
+
+# expect_first FINDING: doctor has findings, and tells this one first
+expect_first() {
+    run_tool doctor
+    [ "$status $stderr${lines[0]}" = "5 $1" ]
 }
 
 # refuses [ARGUMENTS...]: each line "ARGUMENTS|SENTENCE" of standard input, behind those, is a call that fails

@@ -31,12 +31,6 @@ expect_sound() {
     gives "$ALL_RIGHT" doctor
 }
 
-# expect_first FINDING: doctor's first line
-expect_first() {
-    run_tool doctor
-    [ "$status $stderr${lines[0]}" = "5 $1" ]
-}
-
 # fresh: a store of two tokens and a backup of them, and nothing else in $DIR
 fresh() {
     cd "$DIR"

@@ -535,13 +535,11 @@ TABLE
     if [ "$(id -u)" -eq 0 ]; then
         chmod 0600 "$VEMO_REDIRECT_DIR.lock"
         chown 1 "$VEMO_REDIRECT_DIR.lock"
-        run_tool doctor
-        [ "${lines[0]}" = "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 1 and has mode 0600" ]
+        expect_first "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 1 and has mode 0600"
     fi
     rm "$VEMO_REDIRECT_DIR.lock"
     mkdir -m 0700 "$VEMO_REDIRECT_DIR.lock"
-    run_tool doctor
-    [ "${lines[0]}" = "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0700" ]
+    expect_first "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0700"
     rmdir "$VEMO_REDIRECT_DIR.lock"
     gives "0 tokens purged" purge
 }

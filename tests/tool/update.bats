@@ -51,15 +51,9 @@ END
 
 @test "--ttl counts from now" {
     row token---
-    while read -r ttl seconds; do
-        before=$(date +%s)
-        gives "1 token updated" update token--- --ttl $ttl
-        [ "$(sql "SELECT deadline - $seconds BETWEEN $before AND $(date +%s) FROM token")" = 1 ]
-    done <<'END'
-1w2d 777600
-90 90
-365250d 31557600000
-END
+    before=$(date +%s)
+    gives "1 token updated" update token--- --ttl 1w2d
+    [ "$(sql "SELECT deadline - 777600 BETWEEN $before AND $(date +%s) FROM token")" = 1 ]
 }
 
 @test "what a token opens can be replaced, extended and reduced" {
@@ -104,13 +98,9 @@ END
 {"A":1,"B":{"method":["m"]}}|--remove-allow B:m|{"A":1,"B":{"method":[]}}
 {"A":1,"B":{"method":["m"]}}|--remove-allow A|{"B":{"method":["m"]}}
 {"A":1}|--add-allow A:m|
-{"A":1}|--add-allow A|
 {"A":1}|--remove-allow A:m|
-{"A":{}}|--add-allow A:m|
 {"A":{"method":"m"}}|--add-allow A:n|
-{"A":{"method":"m"}}|--remove-allow A:m|
 ["A"]|--add-allow B|
-["A"]|--remove-allow A|
 no JSON|--add-allow A|
 ["A"]|--allow A:m|{"A":{"method":["m"]}}
 no JSON|--allow A|{"A":{"method":[]}}
@@ -126,8 +116,6 @@ END
         sql "UPDATE token SET count = 1, bind_sid = '', $column = '{}'"
     done <<'END'
 extra|no JSON
-extra|{"a":1,"b":
-webapi_allow|no JSON
 webapi_allow|{"Api":{"method":["get"
 END
 }
@@ -146,9 +134,7 @@ END
     row token---
     refuses update token--- <<'END'
 --remove-allow Other|--remove-allow: the token does not list "Other"
---remove-allow api|--remove-allow: the token does not list "api"
 --remove-allow Other:get|--remove-allow: the token does not list "Other"
---remove-allow Api:put|--remove-allow: the token does not list "Api:put"
 --remove-allow Api:get,put|--remove-allow: the token does not list "Api:put"
 --remove-allow Api --remove-allow Api|--remove-allow: the token does not list "Api"
 --uses 9 --add-allow More --remove-allow Other|--remove-allow: the token does not list "Other"
