@@ -69,17 +69,6 @@ paths() {
     [ -s "$DIR/compiled" ]
 }
 
-# As the drop-in has it for services, on the real path.
-@test "without a capability, root takes a token through its life" {
-    in_namespace 'tool=(setpriv --bounding-set=-all --inh-caps=-all --ambient-caps=-all "$1")
-        "${tool[@]}" init && id=$("${tool[@]}" create --uid 0 --function VPN --allow Api) &&
-            "${tool[@]}" grant "$id" Api && "${tool[@]}" doctor' "$TOOL"
-    echo "$output" "${stderr-}"
-    [ "$status" -eq 0 ]
-    [ "${lines[-2]}" = granted ]
-    [ "${lines[-1]}" = "no findings" ]
-}
-
 @test "metrics appear at once, readable for the collector" {
     a_token >/dev/null
     mkdir "$DIR/collected"
