@@ -134,55 +134,40 @@ END
     shows 0 "1 token revoked" -- revoke --all --yes
 }
 
-@test "expired tokens are red" {
-    id=$(a_token --ttl 90m | cut -c1-8)
-    expired=$(a_token | cut -c1-8)
-    # Both times show the same for half an hour.
-    sql "UPDATE token SET deadline = strftime('%s', 'now') - 5400 WHERE tid LIKE '$expired%'"
-
-    on_terminal --columns 200 -- list --no-header --epoch
-    [ "$status" -eq 0 ]
-    [ "${#lines[@]}" -eq 2 ]
-    [[ ${lines[0]} == "${ESC}[31m$expired  root  VPN "*"${ESC}[0m" ]]
-    [[ ${lines[1]} == "$id  root  VPN "* ]]
-    [[ ${lines[1]} != *"$ESC"* ]]
-    coloured=$output
-    shows 0 "$coloured" --columns 200 -- list --no-header --epoch --verbose
-    on_terminal --columns 400 -- show "$expired" --no-header
-    [ "$(grep -c "$ESC" <<<"$output")" -eq 1 ]
-    [[ $(grep "$ESC" <<<"$output") == "${ESC}[31mdeadline "* ]]
-
-    # In all other cases there are no colours.
-    on_terminal --columns 400 -- show "$id"
-    [[ $output != *"$ESC"* ]]
-    on_terminal -- list -o json
-    [ "$status" -eq 0 ]
-    [[ $output != *"$ESC"* ]]
-    shows 0 "" --shell '"$0" list --no-header --epoch >"$1"' -- "$DIR/result"
-    shows 0 "" --shell '"$0" list --no-header --epoch --verbose >"$1"' -- "$DIR/result-verbose"
-    cmp "$DIR/result" "$DIR/result-verbose"
-    [ "$(cat "$DIR/result")" = "$(tool list --no-header --epoch)" ]
-    [[ $(cat "$DIR/result") != *"$ESC"* ]]
-    NO_COLOR=1 shows 0 "$(sed "s/$ESC\[[0-9]*m//g" <<<"$coloured")" --columns 200 -- list --no-header --epoch
-    NO_COLOR= on_terminal --columns 200 -- list --no-header --epoch # as if it were not set
-    expect 0 "$coloured"
+@test "expired tokens are red, but not without a terminal or with NO_COLOR" {
+    row expired- "deadline = 5"
+    row lasting-
+    plain=$'expired-  5\nlasting-  9999999999'
+    coloured=$ESC[31m${plain/$'\n'/$ESC[0m$'\n'}
+    table=(list --no-header --epoch --columns tid,deadline)
+    shows 0 "$coloured" -- "${table[@]}"
+    NO_COLOR= shows 0 "$coloured" -- "${table[@]}" --verbose # as if it were not set
+    NO_COLOR=1 shows 0 "$plain" -- "${table[@]}"
+    for option in "" --verbose; do
+        shows 0 "" --shell "\"\$0\" ${table[*]} $option >\"\$1\"" -- "$DIR/result"
+        [ "$(cat "$DIR/result")" = "$plain" ]
+    done
+    on_terminal -- show expired- --no-header --epoch
+    [[ $(grep "$ESC" <<<"$output") == "${ESC}[31mdeadline  "*" ago)${ESC}[0m" ]]
+    for arguments in "show lasting-" "list -o json"; do
+        on_terminal -- $arguments
+        [[ $status$output == 0* && $output != *"$ESC"* ]]
+    done
 }
 
 @test "doctor's marks are coloured" {
     row token--- "deadline = 0"
     chmod 0755 "$VEMO_REDIRECT_DIR"
-    NO_COLOR=1 on_terminal -- doctor
-    [ "$status" -eq 5 ]
-    [ "$(grep -v '^ ' <<<"$output")" = "error: $REAL_DIRECTORY has mode 0755
-warning: a deadline of 0 or less in 1 token (token---)" ]
-    NO_COLOR= on_terminal -- doctor
-    [ "$status" -eq 5 ]
-    [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[31merror${ESC}[0m: $REAL_DIRECTORY has mode 0755
-${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
-    on_terminal -- doctor --repair
-    [ "$status" -eq 5 ]
-    [ "$(grep -v '^ ' <<<"$output")" = "${ESC}[32mrepaired${ESC}[0m: $REAL_DIRECTORY has mode 0755
-${ESC}[33mwarning${ESC}[0m: a deadline of 0 or less in 1 token (token---)" ]
+    while IFS='|' read -r no_color option mode deadline; do
+        NO_COLOR=$no_color on_terminal -- doctor $option
+        [ "$status" -eq 5 ]
+        [ "$(grep -v '^ ' <<<"$output")" = "$mode: $REAL_DIRECTORY has mode 0755
+$deadline: a deadline of 0 or less in 1 token (token---)" ]
+    done <<TABLE
+1||error|warning
+||$ESC[31merror$ESC[0m|$ESC[33mwarning$ESC[0m
+|--repair|$ESC[32mrepaired$ESC[0m|$ESC[33mwarning$ESC[0m
+TABLE
     shows 5 "" --shell '"$0" doctor >"$1"' -- "$DIR/result"
     [[ $(cat "$DIR/result") == "warning: "* ]]
 }
