@@ -294,11 +294,14 @@ TABLE
     gives "$EVIL" show "$ID" --field function
 }
 
-# bar TITLE: a full one ends on the first line of $output, and it grew from an empty one
-bar() {
+# shows_bar TITLE REST [OPTIONS] -- ARGUMENTS...: the tool shows a bar that grows from an empty one to a full one, and
+# then the rest
+shows_bar() {
     local first="$1 [                                        ]   0 %"
     local last="$1 [########################################] 100 %"
-    [[ ${lines[0]} == $'\r'"$first"$'\r'* ]] && [[ ${lines[0]} == *$'\r'"$last" ]] || {
+    on_terminal "${@:3}"
+    expect 0 "${lines[0]}${2:+$'\n'$2}"
+    [[ ${lines[0]} == $'\r'"$first"$'\r'* && ${lines[0]} == *$'\r'"$last" ]] || {
         echo "no bar: $(cat -v <<<"${lines[0]}")"
         return 1
     }
@@ -306,18 +309,10 @@ bar() {
 
 @test "export, import and tune show a progress bar on a terminal, which is not part of the result" {
     many_rows 2
-    on_terminal -- export "$DIR/lines"
-    bar Exporting
-    expect 0 "${lines[0]}
-vemo-access-token: 2 tokens exported"
-    on_terminal --shell '"$0" export >"$1"' -- "$DIR/result"
-    bar Exporting
-    expect 0 "${lines[0]}
-vemo-access-token: 2 tokens exported"
+    shows_bar Exporting "vemo-access-token: 2 tokens exported" -- export "$DIR/lines"
+    shows_bar Exporting "vemo-access-token: 2 tokens exported" --shell '"$0" export >"$1"' -- "$DIR/result"
     cmp "$DIR/result" "$DIR/lines"
-    on_terminal --shell '"$0" tune >"$1"' -- "$DIR/result"
-    bar Tuning
-    expect 0 "${lines[0]}"
+    shows_bar Tuning "" --shell '"$0" tune >"$1"' -- "$DIR/result"
     [[ $(head -n 1 "$DIR/result") =~ ^WHAT\ +BEFORE\ +AFTER$ ]]
 
     # A bar that does not get full is ended before the reason is told.
@@ -327,10 +322,7 @@ vemo-access-token: 2 tokens exported"
     expect 2 "${lines[0]}
 vemo-access-token: $DIR/lines: line 2 has the id of a token that is there already; nothing of this file was imported"
     sql "DELETE FROM token"
-    on_terminal -- import "$DIR/lines"
-    bar Importing
-    expect 0 "${lines[0]}
-2 tokens imported"
+    shows_bar Importing "2 tokens imported" -- import "$DIR/lines"
 
     # The bar stays on its line. A table that is wider than the terminal keeps its words.
     on_terminal --columns 10 -- tune --undo
