@@ -124,13 +124,11 @@ completes() {
 CASES='li                            => list
 list --user roo                      => list,--user,root
 create --user=roo                    => create,--user=root
-list --output ta                     => list,--output,table
 check -o ta                          => check,-o,table
 show -o c                            => show,-o,csv
 list --columns exp                   => list,--columns,expires
 list --columns tid,no                => list,--columns,tid,note
 show --field=bin                     => show,--field=bind_sid
-list --sort dea                      => list,--sort,deadline
 list --sort count:                   => list,--sort,count:desc
 list --sort=uid:d                    => list,--sort=uid:desc
 list --limit 3 --sho                 => list,--limit,3,--show-ids
@@ -139,13 +137,10 @@ update x --extra=@backups/           => update,x,--extra=@backups/tokens
 import d                             => import,data file.json
 export --verbose backups/to          => export,--verbose,backups/tokens
 create --function li --b             => create,--function,li,--bind-sid
-create --function list --tt          => create,--function,list,--ttl
 create --function d                  => create,--function,d
-create --allow d                     => create,--allow,d
 create --tid d                       => create,--tid,d
 show d                               => show,d
 grant --user roo                     => grant,--user,roo
-revoke d                             => revoke,d
 doctor d                             => doctor,d
 help doc                             => help,doctor
 nothing --d                          => nothing,--d'

@@ -129,6 +129,21 @@ END
     [[ "$(tool list --show-ids -o json)" == *"\"tid\" : \"token---$ZEROS\""* ]]
 }
 
+@test "every character is shown or escaped as Unicode has it, and none is lost" {
+    export LC_ALL=C.UTF-8
+    visible=$BATS_TEST_DIRNAME/visible.py
+    "$visible" all >"$DIR/all"
+    row token---
+    sql "UPDATE token SET function = CAST(readfile('$DIR/all') AS TEXT)"
+    for arguments in "list --no-header" "list -o jsonl"; do
+        tool $arguments 2>"$DIR/errors" | "$visible" compare
+    done
+    # What goes to programs keeps a byte that is no UTF-8.
+    sql "UPDATE token SET function = function || CAST(x'9b' AS TEXT)"
+    printf '\x9b\n' >>"$DIR/all"
+    tool list --field function | cmp - "$DIR/all"
+}
+
 @test "list selects by owner, purpose and session, alone and together, and by text that is no SQL" {
     rows <<'END'
 a-------

@@ -25,19 +25,6 @@ long_options() {
     grep -oE 'Fl -[a-z][a-z-]*' | sed 's/^Fl /-/' | LC_ALL=C sort -u
 }
 
-@test "mandoc has nothing to say against the page" {
-    command -v mandoc >/dev/null || skip "mandoc is not installed"
-    run mandoc -T lint -W warning "$PAGE"
-    [ "$status" -eq 0 ]
-    [ "$output" = "" ]
-}
-
-@test "the page fits a terminal of 80 columns" {
-    command -v mandoc >/dev/null || skip "mandoc is not installed"
-    run bash -c "mandoc -T ascii -O width=80 '$PAGE' | sed 's/.\x08//g' | grep -E '.{81}'"
-    [ "$status" -eq 1 ]
-}
-
 @test "the page describes the commands that there are" {
     diff <(described | LC_ALL=C sort) <(commands_of_tool | LC_ALL=C sort)
 }

@@ -49,19 +49,13 @@ extra         null" ]
     done <<'END'
 -o jsonl
 -o jsonl --no-header --utc
--o csv
 -o csv --columns tid,session
 -o csv --columns uid --no-header
 --columns uid,session,note
 --field tid
---field bind_sid
 --field uid
---field deadline
---field count
---field create_time
 --field function --utc
 --field webapi_allow
---field extra
 --field uid -o json
 END
     # But the JSON is that of the token, and not a list.
