@@ -3,32 +3,29 @@
 
 load common
 
+# purges NUMBER: so many tokens; ahead of that, --dry-run tells how many, and changes nothing
+purges() {
+    cp "$DB" "$DIR/before"
+    gives "$1 would be purged" purge --dry-run
+    cmp "$DB" "$DIR/before"
+    gives "$1 purged" purge
+}
+
 @test "purge deletes the tokens whose deadline has passed, whatever uses they have left, and says how many" {
     rows <<'END'
 kept
 kept-for-a-minute|deadline = strftime('%s', 'now') + 60
 END
-    gives "0 tokens purged" purge
+    purges "0 tokens"
     row minus-one "deadline = -1"
-    gives "1 token purged" purge
+    purges "1 token"
     rows <<'END'
 zero|deadline = 0
 least|deadline = -9223372036854775808, count = 5
 just-passed|deadline = strftime('%s', 'now') - 1, count = -1
 END
-    gives "3 tokens purged" purge
+    purges "3 tokens"
     expect_left kept kept-for-a-minute
-}
-
-@test "purge --dry-run tells how many and changes nothing" {
-    row kept
-    gives "0 tokens would be purged" purge --dry-run
-    row first "deadline = 1"
-    gives "1 token would be purged" purge --dry-run
-    row second "deadline = -1"
-    cp "$DB" "$DIR/before"
-    gives "2 tokens would be purged" purge --dry-run
-    cmp "$DB" "$DIR/before"
 }
 
 # What a command tells of the store must be on the disk. Where it is not known to be, the command fails.
