@@ -114,6 +114,9 @@ purge: 6 tokens deleted" ]
     [ "$status" -eq 4 ]
     [ "$(told)" = "update: 1 token updated (token---...)" ]
 
+    VEMO_TEST_SYNC=file fails 4 "$REAL_DB failed: disk I/O error; the change may have been made" revoke token---
+    [ "$(told | grep -v '^a line of its own: 3 ')" = "revoke: perhaps 1 token deleted (token---...)" ]
+
     run bash -c '"$@" >/dev/full' - "$TOOL" create --uid 0 --function VPN --tid "created-$ZEROS"
     [ "$status" -eq 4 ]
     [ "$(told)" = "create: 1 token created (created-...)

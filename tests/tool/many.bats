@@ -67,7 +67,7 @@ END
     [ "$(cat "$DIR/output")" = "9999 tokens revoked" ]
     [ "$(sql "SELECT count(*) FROM token WHERE create_time < 1000010000")" = 0 ]
     sql "SELECT tid FROM token WHERE function LIKE 'purpose %' LIMIT 5000" >"$DIR/ids"
-    beside revoke - < <(cat "$DIR/ids" && echo none-such && head -n 1 "$DIR/ids" | cut -c 1-20)
+    beside revoke - < <(cat "$DIR/ids" && echo 0none-such && head -n 1 "$DIR/ids" | cut -c 1-20)
     [ "$(cat "$DIR/output" "$DIR/stderr")" = "5000 tokens revoked
 vemo-access-token: 1 id is unknown" ]
     fails 2 "TID: there are more than 100000 ids; revoke them some at a time, or by what they have in \

@@ -138,8 +138,8 @@ END
     row expired- "deadline = 5"
     row lasting-
     plain=$'expired-  5\nlasting-  9999999999'
-    coloured=$ESC[31m${plain/$'\n'/$ESC[0m$'\n'}
-    table=(list --no-header --epoch --columns tid,deadline)
+    coloured=${ESC}[31m${plain/$'\n'/${ESC}[0m$'\n'}
+    table=(list --no-header --epoch --columns "tid,deadline")
     shows 0 "$coloured" -- "${table[@]}"
     NO_COLOR= shows 0 "$coloured" -- "${table[@]}" --verbose # as if it were not set
     NO_COLOR=1 shows 0 "$plain" -- "${table[@]}"
@@ -165,8 +165,8 @@ END
 $deadline: a deadline of 0 or less in 1 token (token---)" ]
     done <<TABLE
 1||error|warning
-||$ESC[31merror$ESC[0m|$ESC[33mwarning$ESC[0m
-|--repair|$ESC[32mrepaired$ESC[0m|$ESC[33mwarning$ESC[0m
+||${ESC}[31merror${ESC}[0m|${ESC}[33mwarning${ESC}[0m
+|--repair|${ESC}[32mrepaired${ESC}[0m|${ESC}[33mwarning${ESC}[0m
 TABLE
     shows 5 "" --shell '"$0" doctor >"$1"' -- "$DIR/result"
     [[ $(cat "$DIR/result") == "warning: "* ]]
