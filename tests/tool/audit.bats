@@ -48,7 +48,6 @@ setup_log() {
     done <<TABLE
 init|init: the store was changed
 list|
-list --count|
 check token---$ZEROS Api get|
 grant token---$ZEROS Api put|grant: 1 token purged
 grant token---$ZEROS Api put|
@@ -66,8 +65,6 @@ import $DIR/lines|import: 1 token created (token---...)
 import $DIR/lines|
 create --uid 0 --function VPN --tid created-$ZEROS|create: 1 token created (created-...)
 create --uid 0 --function VPN --tid created-$ZEROS|
-generate|
-init --verbose|
 purge|
 tune --dry-run|
 tune|tune: the store was changed

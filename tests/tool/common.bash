@@ -37,6 +37,13 @@ tool() {
     "$TOOL" "$@"
 }
 
+# tool_on_path: from now on, the tool is called by its name, too
+tool_on_path() {
+    mkdir -p "$DIR/bin"
+    ln -sf "$TOOL" "$DIR/bin/vemo-access-token"
+    PATH=$DIR/bin:$PATH
+}
+
 # text_of VARIABLE FILE: sets it to what $(<FILE) is, without a process for that
 text_of() {
     local -n text=$1

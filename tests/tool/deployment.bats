@@ -10,16 +10,10 @@ CONFIGURED=$(dirname "$TOOL")/../../tools
 SESSION=/usr/vemo/etc/private/session
 LOCK=/run/vemo-access-token.lock
 
-# bin: a directory with the tool that is tested
-bin() {
-    mkdir -p "$DIR/bin"
-    ln -sf "$TOOL" "$DIR/bin/vemo-access-token"
-    echo "$DIR/bin"
-}
-
 # task NAME ARGUMENTS...: runs one, as run_tool does the tool
 task() {
-    PATH=$(bin):$PATH run --separate-stderr "$DEPLOYMENT/libexec/$1" "${@:2}"
+    tool_on_path
+    run --separate-stderr "$DEPLOYMENT/libexec/$1" "${@:2}"
 }
 
 # paths FILE [BEGINNING]: what stands behind that on lines of the file, sorted
@@ -128,8 +122,8 @@ paths() {
 
 # logout [NAME=VALUE...]: runs the hook as pam_exec does; $told is what it logs
 logout() {
-    local hook=$DIR/revoke-session bin
-    bin=$(bin)
+    local hook=$DIR/revoke-session bin=$DIR/bin
+    tool_on_path
     printf '#!/bin/sh\necho "$@" >>"%s/told"\n' "$DIR" >"$bin/logger"
     chmod +x "$bin/logger"
     sed "s,^export PATH=.*,export PATH=$bin:/usr/bin:/bin,; s,^database=.*,database=$DB," "$CONFIGURED/revoke-session" \

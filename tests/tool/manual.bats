@@ -105,11 +105,6 @@ TABLE
     section DIAGNOSTICS | sed -n 's/^\.It "\(.*\)"$/\1/p' | sed 's/\.\.\., /...\n/; s/, \.\.\. /\n... /' | diff "$DIR/sentences" -
 }
 
-# What there is on this machine.
-all() {
-    sql "SELECT * FROM token ORDER BY tid"
-}
-
 # Prints each literal block of the examples as a file of its own, in order.
 example_blocks() {
     section EXAMPLES | sed 's/\\-/-/g; s/\\e/\\/g' |
@@ -148,16 +143,10 @@ run_block() {
     [ -z "$command" ] || run_example "$command" "$shown"
 }
 
-# tool_on_path: the tool, by its name, on this machine and on that of "ssh root@new"
-tool_on_path() {
-    mkdir "$DIR/bin"
-    ln -s "$TOOL" "$DIR/bin/vemo-access-token"
-    PATH=$DIR/bin:$PATH
-    ssh()
-    {
-        [ "$1" = root@new ]
-        VEMO_REDIRECT_DIR=$DIR/new "${@:2}"
-    }
+# ssh COMMAND...: on the other machine, which is called root@new
+ssh() {
+    [ "$1" = root@new ]
+    VEMO_REDIRECT_DIR=$DIR/new "${@:2}"
 }
 
 @test "the examples of the page do what it says, one after the other" {
@@ -199,7 +188,7 @@ tool_on_path() {
     [ "$(wc -l <"$DIR/move")" -eq 1 ]
     sed -n 's/^# //p; s/^    //p' "$(cat "$DIR/move")" >"$DIR/commands"
     [ "$(tail -n 1 "$DIR/commands" | grep -c 'revoke --all --yes')" -eq 1 ]
-    before=$(all)
+    before=$(state)
 
     # What the new machine is asked, and what becomes of it.
     while read -r fault; do
@@ -208,7 +197,7 @@ tool_on_path() {
         bash -c "
             ssh() ( VEMO_REDIRECT_DIR=$DIR/new; shift; $fault; \"\$@\" )
             . $DIR/commands" || true
-        [ "$(all)" = "$before" ]
+        [ "$(state)" = "$before" ]
     done <<'TABLE'
 [ $2 != init ] || return 255
 [ $2 != import ] || return 255

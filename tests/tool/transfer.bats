@@ -121,8 +121,6 @@ out|out $irregular
 fifo|fifo $irregular
 link|link $irregular
 /dev/null|/dev/null $irregular
-a b|unexpected argument "b"
--o json|unknown option "-o"
 ""|FILE: must not be empty
 TABLE
     fails 4 "here is a symbolic link; name the place that it leads to" export here/file
@@ -497,7 +495,6 @@ TABLE
     chmod 0 forbidden
     refuses import <<TABLE
 nowhere|nowhere: No such file or directory
-nowhere/file|nowhere/file: No such file or directory
 directory|directory: Is a directory
 - <directory|standard input: Is a directory
 fifo|fifo is not a regular file
@@ -506,7 +503,6 @@ link/file|link is a symbolic link; name the place that it leads to
 /proc/$$/mem|/proc/$$/mem: Input/output error
 |FILE is required
 ""|FILE: must not be empty
---force directory|unknown option "--force"
 TABLE
     [ "$(id -u)" -eq 0 ] || refuses import <<<"forbidden|forbidden: Permission denied"
     # No database is made for a bad file.

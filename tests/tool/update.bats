@@ -19,13 +19,11 @@ unchanged"
                   UNION ALL SELECT count(*) FROM (SELECT $columns FROM token WHERE substr(tid, 1, 1) IN ('a', 'u')
                   GROUP BY $columns)" | xargs)" = "1 1" ]
     done <<'END'
---uses 1|count = 1
 --uses 9223372036854775807|count = 9223372036854775807
 --unlimited|count = -1
 --deadline @9000000000|deadline = 9000000000
 --bind-sid session-2|bind_sid = 'session-2'
 --bind-sid ''|bind_sid = ''
---bind-sid=|bind_sid = ''
 --allow Other:put|webapi_allow = '{"Other":{"method":["put"]}}'
 --add-allow Api:put|webapi_allow = '{"Api":{"method":["get","put"]}}'
 --remove-allow Api|webapi_allow = '{}'

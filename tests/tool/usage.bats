@@ -114,9 +114,7 @@ Examples:
 }
 
 @test "the two examples of each command's help do what they should" {
-    mkdir "$DIR/bin"
-    ln -s "$TOOL" "$DIR/bin/vemo-access-token"
-    PATH=$DIR/bin:$PATH
+    tool_on_path
     cd "$DIR"
     tool init
     for command in $(commands_of_tool); do
