@@ -102,9 +102,17 @@ TABLE
 @test "tokens can be listed as long as they can be read" {
     a_store
     cp "$DB" "$DIR/sound"
-    spoil "$(leaf)" /dev/zero
+    leaf=$(leaf)
+    spoil "$leaf" /dev/zero
     all_fail "$MALFORMED" '^(list$|export|purge$|stats$|create)'
     gives 10 list --count # by the index of their ids
+    # Doctor names the page: a leaf, or the one where the index of the ids begins.
+    for page in "$leaf" 4; do
+        cp "$DIR/sound" "$DB"
+        spoil "$page" /dev/zero
+        run_tool doctor
+        [[ ${lines[0]} == "error: the database is damaged: "*"age $page: btreeInitPage() returns error code 11"* ]]
+    done
     cp "$DIR/sound" "$DB"
     spoil 2 /dev/zero
     cp "$DB" "$DIR/before"
