@@ -32,38 +32,31 @@ below() {
 @test "an id is asked for, and not shown" {
     id=$(a_token --allow Api --unlimited)
     while IFS='|' read -r arguments shown; do
-        VEMO_TEST_WIPED=$DIR/wiped on_terminal --answer "Token id: " "$id"$'\r' -- $arguments
-        expect 0 "Token id: 
-$shown"
+        VEMO_TEST_WIPED=$DIR/wiped shows 0 "Token id: 
+$shown" --answer "Token id: " "$id"$'\r' -- $arguments
         [ "$(cat "$DIR/wiped")" = "4096 $id" ] # the whole buffer that it was read into
         rm "$DIR/wiped"
         [ "$(cat "$DIR/modes")" = "typed: hidden
 modes: as before" ]
-    done <<'TABLE'
+    done <<TABLE
 show - --field function|VPN
-check - Api|allowed
 grant - Api|granted
-update - --bind-sid s|1 token updated
 revoke -|1 token revoked
+create --uid 0 --function TAG --allow Api --tid -|$id
 TABLE
-    on_terminal --answer "Token id: " "$id"$'\r' -- create --uid 0 --function TAG --allow Api --tid -
-    expect 0 "Token id: 
-$id" # the result
     [ "$(sql "SELECT tid, function FROM token")" = "$id|TAG" ]
 }
 
 @test "a prompt can be answered with nothing" {
     row token---
     for reply in $'\r' $'\x04'; do
-        on_terminal --answer "Token id: " "$reply" -- show -
-        expect 2 "Token id: 
-vemo-access-token: TID: there is no id on standard input"
+        shows 2 "Token id: 
+vemo-access-token: TID: there is no id on standard input" --answer "Token id: " "$reply" -- show -
         [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
     done
-    on_terminal --answer "Token id: " $'\r' -- revoke -
-    expect 0 "Token id: 
+    shows 0 "Token id: 
 0 tokens revoked
-vemo-access-token: no token matches"
+vemo-access-token: no token matches" --answer "Token id: " $'\r' -- revoke -
 }
 
 @test "Ctrl-C at a prompt or a question leaves the terminal and the tokens as they were" {
