@@ -54,7 +54,8 @@ def main():
     parser.add_argument("--answer", nargs=2, action="append", default=[])
     parser.add_argument("--shell")
     options = parser.parse_args(sys.argv[1:end])
-    command = [*(["sh", "-c", options.shell] if options.shell else []), os.environ["VEMO_TEST_TOOL"], *sys.argv[end + 1:]]
+    shell = ["sh", "-c", options.shell] if options.shell else []
+    command = [*shell, os.environ["VEMO_TEST_TOOL"], *sys.argv[end + 1:]]
     # What runs in the background of a script ignores the signal.
     child = pexpect.spawn(command[0], command[1:], timeout=TIMEOUT, dimensions=(24, options.columns),
                           preexec_fn=lambda: signal.signal(signal.SIGINT, signal.SIG_DFL))

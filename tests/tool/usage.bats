@@ -327,7 +327,8 @@ TABLE
     fails 4 "$DIR/${id:0:8}.../x: Not a directory" export "$DIR/$id/x"
     fails 4 "$DIR/x/${id:0:8}...: No such file or directory" export "$DIR/x/$id"
     mkdir -p "$DIR/x/$id"
-    fails 2 "$DIR/x/${id:0:8}... is not a regular file; to write to a pipe, write to standard output" export "$DIR/x/$id"
+    fails 2 "$DIR/x/${id:0:8}... is not a regular file; to write to a pipe, write to standard output" \
+        export "$DIR/x/$id"
 }
 
 @test "no id appears on standard error when SQLite's reason holds it" {
