@@ -243,14 +243,8 @@ vemo-access-token: $REAL_DB stayed locked by another process for 5 seconds"
 
 # at_once NUMBER ARGUMENTS...: prints what so many runs at the same time print, and their statuses, sorted
 at_once() {
-    local i pids=() directory
-    directory=$(mktemp -d "$DIR/XXXXXX")
-    for ((i = 0; i < $1; ++i)); do
-        { "$TOOL" "${@:2}" >"$directory/$i" 2>&1 || echo "status $?" >>"$directory/$i"; } 3>&- &
-        pids+=($!)
-    done
-    wait "${pids[@]}"
-    LC_ALL=C sort "$directory"/*
+    # shellcheck disable=SC2016 # for the shell inside
+    seq "$1" | xargs -P "$1" -I{} sh -c '"$0" "$@" 2>&1 || echo "status $?"' "$TOOL" "${@:2}" | LC_ALL=C sort
 }
 
 @test "several creations at once, where there is no database yet, all succeed" {
