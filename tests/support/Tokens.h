@@ -52,7 +52,17 @@ inline Json::Value token(const std::string& strChanges = "{}")
     return jToken;
 }
 
-// The same with another count.
+// The record that a creation for the user 1000 and the purpose VPN makes without options.
+inline Json::Value created(const std::string& strTid)
+{
+    Json::Value jToken =
+        json(R"({"bind_sid":"","uid":1000,"deadline":1700086400,"count":1,"create_time":1700000000,
+                 "function":"VPN","webapi_allow":{},"extra":{}})");
+    jToken["tid"] = strTid;
+    return jToken;
+}
+
+// token() with another count.
 inline Json::Value counted(Json::Int64 nCount)
 {
     return token("{\"count\":" + std::to_string(nCount) + "}");
