@@ -180,9 +180,6 @@ int usleep(useconds_t nMicroseconds)
         return NEXT(usleep)(nMicroseconds);
     }
     record("usleep", std::to_string(nMicroseconds));
-    if (seam().sleep) {
-        seam().sleep();
-    }
     errno = EINTR; // the library ignores the result and the errno of its sleep
     return -1;
 }

@@ -25,6 +25,7 @@ struct Seam {
     // The calls in order: "geteuid", "seteuid 0", "access PATH", "open PATH", "chmod PATH 0700",
     // "sqlite3_open PATH", "sqlite3_exec SQL", "sqlite3_changes", "sqlite3_close", "usleep 10000",
     // "time", "sqlite3_mprintf FORMAT", "getrandom", "getpwuid_r UID", "operator new", "operator new[]".
+    // usleep never really sleeps.
     std::vector<std::string> calls;
 
     // The calls whose first word is one of the names, and the SQL that was run.
@@ -52,7 +53,6 @@ struct Seam {
     std::function<int(const char*, sqlite3**)> sqliteOpen;
     std::function<int(sqlite3*, const char*, SqlCallback, void*, char**)> sqliteExec;
     std::function<int(sqlite3*)> sqliteClose;
-    std::function<void()> sleep; // called for usleep, which never really sleeps
     std::function<int(uid_t, struct passwd*, char*, size_t, struct passwd**)> getUser;
     std::function<ssize_t(void*, size_t, unsigned int)> random; // getrandom
 

@@ -1,7 +1,5 @@
 // Running statements, waiting for locks, and the purge of expired tokens.
 
-#include <unistd.h>
-
 #include "AccessTokenUtil.h"
 #include "Statements.h"
 #include "StoreTest.h"
@@ -12,17 +10,10 @@ namespace {
 
 const std::string UPDATE = "UPDATE token SET extra = '%n%s';"; // of as many rows as there are
 const std::string UNKNOWN = "Unknow Error!!";
-const std::string RUN_LINE = ordinary(STORE, "run sql=" + UPDATE);
 
-int countRow(void* pnRows, int, char**, char**)
+int passOver(void*, int, char**, char**)
 {
-    ++*static_cast<int*>(pnRows);
     return 0;
-}
-
-int stop(void*, int, char**, char**)
-{
-    return 1;
 }
 
 // The line of a try that failed.
@@ -44,11 +35,11 @@ protected:
         reset();
     }
 
-    int run(const std::string& strSql, SqlCallback pCallback = nullptr, void* pArgument = nullptr)
+    int run(const std::string& strSql, SqlCallback pCallback = nullptr)
     {
         m_db.m_strSql = strSql;
         m_db.m_strErr = "stale";
-        const int nResult = m_db.runSql(pCallback, pArgument);
+        const int nResult = m_db.runSql(pCallback, nullptr);
         EXPECT_EQ(strSql, m_db.m_strSql);
         return nResult;
     }
@@ -73,43 +64,13 @@ TEST_F(RunSql, RefusesAnEmptyStatement)
     db.m_strErr = "stale";
     errno = EINTR;
     EXPECT_EQ(-1, db.runSql());
-    EXPECT_EQ(-1, db.runSql(countRow, nullptr));
+    EXPECT_EQ(-1, db.runSql(passOver, nullptr));
     EXPECT_EQ("stale", db.m_strErr);
     EXPECT_EQ(-1, db.runSqlEx("", nullptr, nullptr));
     EXPECT_EQ(UNKNOWN, db.m_strErr);
     const std::string strLine = fail(STORE, "no correct sql", EINTR);
     EXPECT_LINES(strLine, strLine, failed(STORE, "0 >= strSql.length()", EINTR));
     EXPECT_EQ(Texts{}, seam().calls);
-}
-
-TEST_F(RunSql, PassesConnectionStatementCallbackAndArgument)
-{
-    int nRows = 0;
-    EXPECT_EQ(0, run("SELECT tid FROM token", countRow, &nRows));
-    EXPECT_EQ(2, nRows);
-    EXPECT_EQ(0, m_db.runSqlEx("SELECT 1", countRow, &nRows));
-    EXPECT_EQ(3, nRows);
-    EXPECT_EQ("SELECT tid FROM token", m_db.m_strSql);
-    EXPECT_EQ(Texts{}, seam().callsOf({"sqlite3_changes"}));
-
-    seam().sqliteExec = [&](sqlite3* pDb, const char* szSql, SqlCallback pCallback, void* pArgument,
-                            char** pszError) {
-        EXPECT_EQ(m_db.m_pDb, pDb);
-        EXPECT_STREQ("SELECT 2", szSql);
-        EXPECT_EQ(&countRow, pCallback);
-        EXPECT_EQ(&nRows, pArgument);
-        EXPECT_EQ(nullptr, *pszError);
-        return SQLITE_OK;
-    };
-    EXPECT_EQ(0, m_db.runSqlEx("SELECT 2", countRow, &nRows));
-}
-
-TEST_F(RunSql, FailsWhenTheCallbackStopsIt)
-{
-    EXPECT_EQ(-1, run("SELECT tid FROM token", stop));
-    EXPECT_EQ("query aborted", m_db.m_strErr);
-    EXPECT_EQ((Texts{"SELECT tid FROM token"}), seam().statements());
-    EXPECT_LINES(failureOf(m_db.m_strSql, "query aborted"));
 }
 
 // The number is SQLite's own, which statements that change no row leave as it is.
@@ -128,7 +89,6 @@ TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
     returns("DELETE FROM token WHERE tid = 'c'", 0);
     returns("DELETE FROM token; INSERT INTO token (tid, function) VALUES ('c', '')", 1);
     returns(" ", 1);
-    returns("-- nothing", 1);
 }
 
 // The text of the error decides whether a statement is tried again, not the code.
@@ -142,7 +102,7 @@ TEST_F(RunSql, TriesAgainOnlyAfterLocks)
             const int nWaits = static_cast<int>(answers.size()) - 1;
             reset();
             answerStatements(UPDATE, answers);
-            EXPECT_EQ(szError ? -1 : blCallback ? 0 : 2, run(UPDATE, blCallback ? countRow : nullptr));
+            EXPECT_EQ(szError ? -1 : blCallback ? 0 : 2, run(UPDATE, blCallback ? passOver : nullptr));
             EXPECT_EQ(szErrAfter, m_db.m_strErr);
             Texts calls = {"sqlite3_exec " + UPDATE};
             for (int i = 0; i < nWaits; ++i) {
@@ -154,7 +114,6 @@ TEST_F(RunSql, TriesAgainOnlyAfterLocks)
                         : Texts{});
         }
     };
-    runs("success", {RUN}, "", nullptr);
     runs("success with a text", {{SQLITE_OK, "no matter"}}, "", nullptr);
     runs("lock", {LOCKED, {SQLITE_BUSY, "(2) database is locked"}, RUN}, "(2) database is locked", nullptr);
     runs("lock of another code", {{SQLITE_ERROR, "cannot: database is locked!"}, RUN},
@@ -170,35 +129,6 @@ TEST_F(RunSql, TriesAgainOnlyAfterLocks)
     runs("directives", {{SQLITE_ERROR, "near \"%n%s\""}}, "near \"%n%s\"", "near \"%n%s\"");
 }
 
-TEST_F(RunSql, WaitsForAnotherConnection)
-{
-    sqlite3* pOther = nullptr;
-    ASSERT_EQ(SQLITE_OK, sqlite3_open(path().c_str(), &pOther));
-    const auto elsewhere = [&](const char* szSql) {
-        EXPECT_EQ(SQLITE_OK, sqlite3_exec(pOther, szSql, nullptr, nullptr, nullptr));
-    };
-    elsewhere("BEGIN EXCLUSIVE; DELETE FROM token WHERE tid = 'a'");
-    seam().sleep = [&, nWaits = 3]() mutable { 0 == --nWaits ? elsewhere("COMMIT") : void(); };
-    EXPECT_EQ(1, run(UPDATE));
-    EXPECT_EQ("database is locked", m_db.m_strErr);
-    EXPECT_EQ(Texts(3, "usleep 10000"), seam().callsOf({"usleep"}));
-    EXPECT_EQ((Texts{"b|%n%s"}), query("SELECT tid, extra FROM token"));
-    sqlite3_close(pOther);
-}
-
-TEST_F(RunSql, TellsEachTryAndTheChangesInDebugMode)
-{
-    const Texts tries = {RUN_LINE, tryLine(0, "database is locked"), RUN_LINE,
-                         tryLine(1, "database is locked"), RUN_LINE};
-    debugInfo(true);
-    failStatements(UPDATE, LOCKED, 2);
-    EXPECT_EQ(2, m_db.runSqlEx(UPDATE, nullptr, nullptr));
-    EXPECT_LINES(tries + Texts{ordinary(STORE, "change rv=2, run sql=" + UPDATE)});
-    failStatements(UPDATE, LOCKED, 2);
-    EXPECT_EQ(0, m_db.runSqlEx(UPDATE, countRow, nullptr));
-    EXPECT_LINES(tries);
-}
-
 TEST_F(RunSql, GivesUpAfter500Tries)
 {
     for (const bool blDebug : {false, true}) {
@@ -208,7 +138,7 @@ TEST_F(RunSql, GivesUpAfter500Tries)
         for (int i = 0; i < 500; ++i) {
             calls.insert(calls.end(), {"sqlite3_exec " + UPDATE, "usleep 10000"});
             errors.push_back("database is locked (" + std::to_string(i) + ")");
-            lines.insert(lines.end(), {RUN_LINE, tryLine(i, errors.back())});
+            lines.insert(lines.end(), {ordinary(STORE, "run sql=" + UPDATE), tryLine(i, errors.back())});
         }
         for (const std::string& strError : errors) {
             answers.push_back({SQLITE_BUSY, strError.c_str()});
@@ -248,14 +178,9 @@ TEST_F(RunSql, PurgeTakesDeadlinesBeforeNow)
         EXPECT_EQ("", m_db.m_strErr);
         EXPECT_EQ(PURGE, m_db.m_strSql);
         EXPECT_EQ(kept, query("SELECT quote(deadline) FROM token ORDER BY rowid"));
-        EXPECT_EQ(0, m_db.cleanExpireToken(false)); // with none to delete
-        for (const bool blLog : {false, true}) {
-            insert(R"({"tid":"old","deadline":-1})");
-            seam().calls.clear();
-            EXPECT_EQ(0, api().cleanExpireToken(blLog));
-            EXPECT_EQ((Texts{PURGE}), seam().statements());
-            EXPECT_EQ("", countOf("old"));
-        }
+        seam().calls.clear();
+        EXPECT_EQ(0, api().cleanExpireToken(true));
+        EXPECT_EQ((Texts{PURGE}), seam().statements());
     }
 }
 
@@ -297,24 +222,13 @@ TEST_F(RunSql, PurgeFailsWithTheLinesThatWereAskedFor)
                 fail_([&] { return m_db.cleanExpireToken(blLog); });
                 EXPECT_LINES(lines);
                 fail_([&] { return api().cleanExpireToken(blLog); });
-                Texts service;
-                if (blLog) {
-                    service = {failed(SERVICE, "0 > m_pDb->cleanExpireToken(blLogErr)", EIO)};
-                } else if (blDebug) {
-                    service = {fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)", EIO)};
-                }
-                EXPECT_LINES(lines + service);
+                const std::string strCondition = "0 > m_pDb->cleanExpireToken(blLogErr)";
+                EXPECT_LINES(lines + (blLog     ? Texts{failed(SERVICE, strCondition, EIO)}
+                                      : blDebug ? Texts{fail(SERVICE, "run fail " + strCondition, EIO)}
+                                                : Texts{}));
             }
         }
     }
-}
-
-TEST_F(RunSql, PurgeFailsWhereTheDatabaseCannotBeOpened)
-{
-    AccessTokenDbApi db;
-    seam().fail("seteuid", EPERM, 1, 2);
-    EXPECT_FAILURE(db.cleanExpireToken(true), NOT_OPENED + Texts{fail(STORE, "run sql failed", EPERM)});
-    EXPECT_EQ("a b", tids());
 }
 
 } // namespace
