@@ -116,9 +116,8 @@ inline Texts failureOf(const std::string& strSql, const std::string& strError, i
             fail(STORE, "run sql failed, sql=" + strSql, nErrno)};
 }
 
-// What the store logs when it may not become root, and so cannot open the database for a statement.
+// What the store logs when it may not become root.
 const std::string NOT_ROOT = failed(STORE, "0 > seteuid(0)", EPERM);
-const Texts NOT_OPENED = {NOT_ROOT, failed(STORE, "0 > initDb()", EPERM)};
 
 // The lines logged since the last call.
 inline Texts takeLines()

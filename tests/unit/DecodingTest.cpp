@@ -33,16 +33,6 @@ void allocate()
     }
 }
 
-// The error of the JSON library when the type name of such an entry is read.
-std::string errorOf(const Json::Value& jEntry)
-{
-    try {
-        return "no error: " + jEntry[0U].asString();
-    } catch (const Json::LogicError& error) {
-        return error.what();
-    }
-}
-
 // What is logged when a column of a row is refused.
 Texts columnLines(const std::string& strLine, int nErrno = 0)
 {
@@ -173,10 +163,8 @@ TEST_F(Decoding, ParsesJsonOfAnyKind)
 
 TEST_F(Decoding, NeverThrowsOnDeepNesting)
 {
-    const auto nested = [](size_t nLevels, const char* szInnermost) {
-        return std::string(nLevels, '[') + szInnermost + std::string(nLevels, ']');
-    };
-    EXPECT_TRUE(json(nested(1000, "")) == member("extra", nested(1000, "")));
+    const auto nested = [](size_t nLevels) { return std::string(nLevels, '[') + std::string(nLevels, ']'); };
+    EXPECT_TRUE(json(nested(1000)) == member("extra", nested(1000)));
     // What was read down to the limit stands.
     Json::Value jLeft;
     for (int nLevel = 0; nLevel < 1000; ++nLevel) {
@@ -184,85 +172,65 @@ TEST_F(Decoding, NeverThrowsOnDeepNesting)
         jOuter.append(jLeft);
         jLeft.swap(jOuter);
     }
-    for (const std::string& strText : {nested(1001, ""), nested(100000, "1"), std::string(100000, '[')}) {
-        EXPECT_TRUE(jLeft == member("extra", strText)) << strText.size();
-    }
+    EXPECT_TRUE(jLeft == member("extra", nested(1001)));
+    EXPECT_TRUE(jLeft == member("extra", std::string(100000, '[')));
     EXPECT_EQ(json("{\"a\":1}"), member("extra", "{\"a\":1}")) << "the reader is as before";
 }
 
 TEST_F(Decoding, RefusesUnknownTypeNames)
 {
-    const std::pair<const char*, const char*> rows[] = {{R"(["bool",false])", "bool"},
-                                                        {R"(["string "])", "string "},
-                                                        {R"(["%s%n"])", "%s%n"},
-                                                        {R"([""])", ""},
-                                                        {"null", ""},
-                                                        {"[5]", "5"},
-                                                        {"[true,\"string\"]", "true"},
-                                                        {R"(["json::value"])", "json::value"}};
-    for (const auto& [szEntry, szType] : rows) {
-        SCOPED_TRACE(szEntry);
-        tokenType()["odd"] = json(szEntry);
+    for (const Json::Value& jType : json(R"(["bool", "string ", "%s%n", "", "json::value", 5, null])")) {
+        const std::string strType = jType.asString();
+        SCOPED_TRACE(strType);
+        tokenType()["odd"][0] = jType;
         errno = EACCES;
         expectRefused({{"odd"}, {"1"}},
-                      columnLines(fail(STORE, std::string("type error, strType=") + szType, EACCES), EACCES));
+                      columnLines(fail(STORE, "type error, strType=" + strType, EACCES), EACCES));
     }
 }
 
 // SQLite is C: no exception may pass through it.
 TEST_F(Decoding, TurnsExceptionsIntoFailure)
 {
-    for (const char* szEntry : {R"("string")", "{}", R"({"0":"string"})", "5", R"([["string"]])", "[{}]"}) {
-        SCOPED_TRACE(szEntry);
-        tokenType()["odd"] = json(szEntry);
-        expectRefused({{"count", "odd"}, {"1", "1"}},
-                      {fail(STORE, "decode row failed, error=" + errorOf(json(szEntry)))});
+    const Json::Value jOdd = 5; // no type can be read from that
+    std::string strError = "none";
+    try {
+        jOdd[0U];
+    } catch (const Json::LogicError& error) {
+        strError = error.what();
     }
+    tokenType()["odd"] = jOdd;
+    expectRefused({{"count", "odd"}, {"1", "1"}}, {fail(STORE, "decode row failed, error=" + strError)});
 }
 
 // When an allocation fails, the reader can call a long number invalid. So it is asked twice.
 TEST_F(Decoding, YieldsTheWholeRecordOrNoneWhenAnAllocationFails)
 {
-    const std::string strTid(1000, 'x');
     const std::string strExtra =
         R"({"a":[1,{"b":0.12345678901234567,"c":")" + std::string(100, 'x') + "\"}]}";
-    const Row row = {{"tid", "deadline", "extra"}, {strTid.c_str(), "-1", strExtra.c_str()}};
-    for (const bool blWarm : {false, true}) { // the first time, the thread's reader is made as well
-        for (const char* szError : {"std::bad_alloc", "no memory"}) {
-            SCOPED_TRACE(szError);
-            int nWhole = 0;
-            int nNone = 0;
-            bool blFailed = true;
-            g_blJsoncppTellsIt = std::string("no memory") == szError;
-            while (blFailed) {
-                m_jArray = Json::Value();
-                errno = 0;
-                g_pAllocation = allocate;
-                g_nAllocationThatFails = nWhole + nNone + 1;
-                int nResult = 0;
-                EXPECT_NO_THROW(nResult = decode(row));
-                blFailed = 0 == g_nAllocationThatFails;
-                g_nAllocationThatFails = 0;
-                if (0 == nResult) {
-                    ++nWhole;
-                    ASSERT_EQ(json(strExtra), m_jArray[0]["extra"]);
-                } else {
-                    ++nNone;
-                    ASSERT_TRUE(m_jArray.empty());
-                    ASSERT_EQ(
-                        (Texts{fail(STORE, std::string("decode row failed, error=") + szError, ENOMEM)}),
-                        takeLines());
-                }
-            }
-            EXPECT_LT(blWarm ? 1 : 0, nWhole); // one of them without a failure
-            EXPECT_LT(3, nNone);
+    const Row row = {{"deadline", "extra"}, {"-1", strExtra.c_str()}};
+    for (const std::string strError : {"std::bad_alloc", "no memory"}) {
+        g_blJsoncppTellsIt = "no memory" == strError;
+        bool blFailed = true;
+        for (int nAllocation = 1; blFailed; ++nAllocation) {
+            SCOPED_TRACE(nAllocation);
+            m_jArray = Json::Value();
+            g_nAllocationThatFails = nAllocation;
+            g_pAllocation = allocate;
+            errno = 0;
+            const bool blWhole = 0 == decode(row);
+            g_pAllocation = nullptr;
+            blFailed = 0 == g_nAllocationThatFails;
+            ASSERT_EQ(blWhole ? json(strExtra) : Json::Value(), m_jArray.get(0U, Json::Value())["extra"]);
+            ASSERT_EQ(blWhole ? Texts{} : Texts{fail(STORE, "decode row failed, error=" + strError, ENOMEM)},
+                      takeLines());
         }
     }
 }
 
 TEST_F(Decoding, RefusesColumnsThatAreNoFields)
 {
-    for (const char* szName : {"nonsense", "", "TID", "tid ", "count(*)", "token.tid", "sort_by"}) {
+    for (const char* szName : {"nonsense", "", "TID"}) {
         SCOPED_TRACE(szName);
         expectRefused({{"tid", szName}, {"a", "1"}}, columnLines(failed(STORE, NO_FIELD)));
     }
@@ -298,7 +266,7 @@ TEST_F(Decoding, RefusesWhatIsMissing)
 TEST_F(Decoding, RefusesOutputThatIsNoArray)
 {
     insert();
-    for (const char* szOutput : {"{}", R"({"a":1})", R"("text")", "0", "1.5", "true"}) {
+    for (const char* szOutput : {"{}", "0"}) {
         SCOPED_TRACE(szOutput);
         m_jArray = json(szOutput);
         EXPECT_FAILURE(decode({{"tid"}, {"a"}}), failed(STORE, WRONG_ARRAY));
