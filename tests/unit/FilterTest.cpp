@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <regex>
 
 #include "AccessTokenUtil.h"
 #include "StoreTest.h"
@@ -66,12 +65,10 @@ private:
 TEST_F(Filter, MakesOneConditionOfTheFields)
 {
     const auto makes = [&](const char* szFilter, bool bAnd, const char* szOutput, int nResult) {
-        for (const std::string strBefore : {"", "held (before"}) {
-            SCOPED_TRACE(std::string(szFilter) + " after '" + strBefore + "'");
-            m_strOut = strBefore;
-            EXPECT_EQ(nResult, where(szFilter, bAnd));
-            EXPECT_EQ(strBefore + szOutput, m_strOut);
-        }
+        SCOPED_TRACE(szFilter);
+        m_strOut = "held (before";
+        EXPECT_EQ(nResult, where(szFilter, bAnd));
+        EXPECT_EQ(std::string("held (before") + szOutput, m_strOut);
     };
     makes(R"({"tid":"Ab12"})", true, " (tid='Ab12' )", 0);
     makes(R"({"uid":1024,"function":"VPN"})", true, " (function='VPN' and uid=1024 )", 0);
@@ -93,29 +90,6 @@ TEST_F(Filter, MakesOneConditionOfTheFields)
     makes(R"({"count":[],"deadline":[],"uid":[]})", false, " ( or  or  )", 0);
 }
 
-TEST_F(Filter, VisitsFieldsInAscendingOrderOfTheirBytes)
-{
-    for (const char* szName : {"Z", "tid2", "\xc3\xa9"}) {
-        tokenType()[szName].append("string");
-    }
-    EXPECT_EQ(0, where("{\"\xc3\xa9\":1,\"webapi_allow\":1,\"uid\":1,\"tid2\":1,\"tid\":1,\"function\":1,"
-                       "\"extra\":1,\"deadline\":1,\"create_time\":1,\"count\":1,\"bind_sid\":1,\"Z\":1}"));
-    EXPECT_EQ("held (Z='1' and bind_sid='1' and count=1 and create_time=1 and deadline=1 and extra='1' and "
-              "function='1' and tid='1' and tid2='1' and uid=1 and webapi_allow='1' and \xc3\xa9='1' )",
-              m_strOut);
-}
-
-TEST_F(Filter, RefusesWhatIsNoObject)
-{
-    for (const char* szFilter : {"null", "[1,2]", "[]", R"("tid")", "5", "1.5", "true"}) {
-        SCOPED_TRACE(szFilter);
-        EXPECT_EQ(-1, where(szFilter));
-        EXPECT_FAILURE(condition(json(szFilter)), allFailed(STORE, {"jTokenParam.type() != Json::objectValue",
-                                                                    "jFilter.type() != Json::objectValue"}));
-    }
-    EXPECT_EQ("held", m_strOut);
-}
-
 TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
 {
     // The text nCall gets no memory; with 0, the filter is wrong.
@@ -131,8 +105,6 @@ TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
                            : Texts{fail(STORE, "err input type, jTokenParam=(null)", EIO)});
     };
     keeps(R"({"extra":{"a":1}})", 0, "held (", "", "");
-    keeps(R"({"webapi_allow":{}})", 0, "held (", "", "");
-    keeps(R"({"tid":{}})", 0, "held (", "", "");
     keeps(R"({"count":1,"uid":{"a":1},"webapi_allow":{}})", 0, "held (count=1 and ", "", "");
     keeps(R"({"tid":"a"})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED);
     keeps(R"({"uid":7})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED);
@@ -177,7 +149,6 @@ TEST_F(Filter, WritesEachValueAsItsFieldDemands)
     writes(R"("")", "''", R"('""')", "");
     writes(R"("7")", "'7'", R"('"7"')", "7");
     writes(R"("it's")", "'it''s'", R"('"it''s"')", "it''s");
-    writes(R"("''")", "''''''", R"('"''''"')", "''''");
     writes(R"("x'; DROP TABLE token; --")", "'x''; DROP TABLE token; --'", R"('"x''; DROP TABLE token; --"')",
            "x''; DROP TABLE token; --");
     writes(R"("%s%n%q%Q")", "'%s%n%q%Q'", R"('"%s%n%q%Q"')", "%s%n%q%Q");
@@ -186,34 +157,6 @@ TEST_F(Filter, WritesEachValueAsItsFieldDemands)
     writes("\"gr\xc3\xbc\xc3\x9f\"", "'gr\xc3\xbc\xc3\x9f'", "'\"gr\xc3\xbc\xc3\x9f\"'",
            "gr\xc3\xbc\xc3\x9f");
     writes(R"("a\u0000b")", "'a'", R"('"a\u0000b"')", "a"); // text ends at its first zero byte
-}
-
-TEST_F(Filter, WritesTextThatIsNotUtf8AsItIs)
-{
-    EXPECT_EQ(0, match("tid", "\xff\xc3'"));
-    EXPECT_EQ(0, match("extra", "\xff\xc3'"));
-    EXPECT_EQ("heldtid='\xff\xc3'''extra='\"\xff\xc3''\"'", m_strOut);
-}
-
-TEST_F(Filter, TakesNestedValuesForJsonFieldsOnly)
-{
-    for (const char* szValue : {"{}", "[]", R"({"a":"it's","b":[1,null]})"}) {
-        SCOPED_TRACE(szValue);
-        const Json::Value jValue = json(szValue);
-        const std::string strSql = std::regex_replace(szValue, std::regex("'"), "''");
-        Json::Value jList;
-        jList.append(jValue);
-        m_strOut.clear();
-        EXPECT_EQ(0, match("extra", jValue));
-        EXPECT_EQ(0, list("webapi_allow", jList));
-        EXPECT_EQ("extra='" + strSql + "'webapi_allow in ('" + strSql + "' )", m_strOut);
-        for (const char* szField : {"tid", "uid"}) {
-            EXPECT_THROW(match(szField, jValue), Json::Exception);
-            EXPECT_THROW(list(szField, jList), Json::Exception);
-        }
-    }
-    EXPECT_THROW(where(R"({"tid":[["a"]]})"), Json::Exception);
-    EXPECT_THROW(where(R"({"uid":[1,{}]})"), Json::Exception);
 }
 
 TEST_F(Filter, FollowsTheTypeTable)
@@ -243,23 +186,26 @@ TEST_F(Filter, FollowsTheTypeTable)
     EXPECT_FAILURE(match("tid", "a"), failed(STORE, "!jTokenType.isMember(strField)"));
 }
 
-TEST_F(Filter, RefusesWhatIsNoFieldOrNoList)
+TEST_F(Filter, RefusesWhatItCannotUse)
 {
-    const auto refuses = [&](const char* szField, const char* szList, const char* szCondition) {
-        EXPECT_FAILURE(list(szField, json(szList)), failed(STORE, szCondition));
+    const Json::Value jText = "text";
+    const auto refuses = [&](int nResult, const std::string& strCondition, int nErrno = 0) {
+        EXPECT_EQ(-1, nResult);
+        EXPECT_LINES(failed(STORE, strCondition, nErrno));
     };
-    refuses(nullptr, "{}", "!szField || !szField[0]");
-    refuses("", R"(["a"])", "!szField || !szField[0]");
-    refuses("foo", "{}", "!jTokenType.isMember(szField)");
-    refuses("TID", R"(["a"])", "!jTokenType.isMember(szField)");
-    for (const char* szNoList : {R"("a")", R"({"a":1})", "null", "7"}) {
-        refuses("tid", szNoList, "jList.type() != Json::arrayValue");
-    }
-    for (const std::string& strField : {std::string(), std::string("foo"), std::string("TID"),
-                                        std::string("limit"), std::string("tid\0", 4)}) {
-        SCOPED_TRACE(strField);
-        EXPECT_FAILURE(match(strField, "a"), failed(STORE, "!jTokenType.isMember(strField)"));
-    }
+    refuses(where("[1,2]"), "jTokenParam.type() != Json::objectValue");
+    refuses(condition(jText), "jFilter.type() != Json::objectValue");
+    refuses(list(nullptr, jText), "!szField || !szField[0]");
+    refuses(list("", jText), "!szField || !szField[0]");
+    refuses(list("TID", jText), "!jTokenType.isMember(szField)");
+    refuses(list("tid", jText), "jList.type() != Json::arrayValue");
+    refuses(match("", jText), "!jTokenType.isMember(strField)");
+    refuses(match(std::string("tid\0", 4), jText), "!jTokenType.isMember(strField)");
+    // Without memory for the text.
+    seam().fail("sqlite3_mprintf", ENOMEM, 1, 3);
+    refuses(match("tid", jText), MATCH_TEXT_FAILED, ENOMEM);
+    refuses(list("tid", json(R"(["a","b"])")), LIST_TEXT_FAILED, ENOMEM);
+    refuses(condition(json(R"({"sort_by":"uid","limit":0})")), "!szSql", ENOMEM);
     EXPECT_EQ("held", m_strOut);
 }
 
@@ -270,21 +216,6 @@ TEST_F(Filter, ReadsGapsInListsAsNullAndLeavesThem)
     EXPECT_EQ(0, list("tid", jList));
     EXPECT_EQ(0, list("extra", jList));
     EXPECT_EQ("heldtid in ('''''a' )extra in ('null''null''\"a\"' )", m_strOut);
-}
-
-TEST_F(Filter, AppendsAConditionWholeOrNotAtAll)
-{
-    failText(3);
-    EXPECT_EQ(-1, list("tid", json(R"(["a","b","c"])")));
-    failText();
-    EXPECT_EQ(-1, match("tid", "a"));
-    failText();
-    EXPECT_FAILURE(condition(json(R"({"sort_by":"uid","sort_direction":"desc","limit":0})")),
-                   allFailed(STORE, {LIST_TEXT_FAILED, MATCH_TEXT_FAILED, "!szSql"}, ENOMEM));
-    EXPECT_EQ(0, list("tid", Json::Value(Json::arrayValue)));
-    EXPECT_EQ("held", m_strOut);
-    EXPECT_EQ(0, list("tid", json(R"(["a","b","c"])")));
-    EXPECT_EQ("heldtid in ('a''b''c' )", m_strOut);
 }
 
 TEST_F(Filter, SortsByATextAndInOneOfTwoDirections)
@@ -346,18 +277,6 @@ TEST_F(Filter, WritesTheTailOfTheKeywordThatTheNumberPointsTo)
     points(1.9, 1);
     for (const Json::Int64 nNumber : {Json::Int64(-1), n2To32 / 2, n2To32 - 1, Json::Int64(INT64_MAX)}) {
         points(nNumber, 9); // or more
-    }
-}
-
-TEST_F(Filter, ThrowsForOrdersAndLimitsOfAWrongType)
-{
-    for (const char* szFilter :
-         {R"({"sort_by":5})", R"({"sort_by":null})", R"({"sort_by":[]})",
-          R"({"sort_by":"uid","sort_direction":[]})", R"({"limit":"5"})", R"({"limit":[]})",
-          R"({"limit":{}})", R"({"limit":1e30})", R"({"limit":18446744073709551615})",
-          R"({"limit":0,"offset":"5"})", R"({"limit":9,"offset":{}})"}) {
-        SCOPED_TRACE(szFilter);
-        EXPECT_THROW(condition(json(szFilter)), Json::Exception);
     }
 }
 
