@@ -105,10 +105,4 @@ TEST_F(Permission, IsDecidedAndExplainedInDebugMode)
     }
 }
 
-TEST_F(Permission, ThrowsAtAMethodThatIsNoText)
-{
-    Json::Value jToken = token();
-    EXPECT_THROW(checkPermission(jToken, "Odd", "get"), Json::LogicError);
-}
-
 } // namespace

@@ -1,6 +1,5 @@
 // The fields of records: their types, their defaults, and the check of their types.
 
-#include <climits>
 #include <set>
 
 #include "AccessTokenUtil.h"
@@ -11,15 +10,6 @@ using VEMO_ACCESS_TOKEN::fillDefaultValue;
 using VEMO_ACCESS_TOKEN::tokenType;
 
 namespace {
-
-Json::Value defaults()
-{
-    Json::Value jToken;
-    for (const Field& field : fields()) {
-        jToken[field.szName] = field.jDefault;
-    }
-    return jToken;
-}
 
 // Two values are equal only if their JSON types are, signed and unsigned told apart.
 class TypeTable : public SeamTest {};
@@ -46,67 +36,28 @@ TEST_F(TypeTable, IsBuiltOnceAndItsTimeDoesNotReachRecords)
     EXPECT_EQ(Json::Value(Json::Int64(NOW + 5)), jToken["create_time"]);
 }
 
+// The model shows what becomes of records that have some members.
 class Defaults : public SeamTest {};
 
 TEST_F(Defaults, CompleteARecord)
 {
-    for (const Json::ValueType type : {Json::objectValue, Json::nullValue}) {
-        Json::Value jToken(type);
-        EXPECT_EQ(0, fillDefaultValue(jToken, false));
-        EXPECT_EQ(defaults(), jToken);
-    }
+    Json::Value jToken;
+    EXPECT_EQ(0, fillDefaultValue(jToken, false));
     for (const Field& field : fields()) {
-        SCOPED_TRACE(field.szName);
-        Json::Value jToken = without(field.szName);
-        Json::Value jExpected = token();
-        jExpected[field.szName] = field.jDefault;
-        EXPECT_EQ(0, fillDefaultValue(jToken, false));
-        EXPECT_EQ(jExpected, jToken);
+        EXPECT_EQ(field.jDefault, jToken[field.szName]);
     }
-}
-
-TEST_F(Defaults, LeaveMembersAsTheyAre)
-{
-    const Json::Value jGiven = json(
-        R"({"count":"5","tid":null,"uid":-1,"extra":[1],"create_time":{},"function":false,"note":7,"":{}})");
-    Json::Value jToken = jGiven;
-    Json::Value jExpected = defaults();
-    for (const std::string& strName : jGiven.getMemberNames()) {
-        jExpected[strName] = jGiven[strName];
-    }
-    for (const bool blCheck : {false, true}) {
-        EXPECT_EQ(0, fillDefaultValue(jToken, blCheck));
-        EXPECT_EQ(jExpected, jToken);
-    }
-    EXPECT_EQ(Texts{}, seam().calls);
+    EXPECT_EQ(fields().size(), jToken.size());
 }
 
 TEST_F(Defaults, CheckTellsTheFirstMissingFieldAndAddsNothing)
 {
-    Json::Value jRest = token();
+    Json::Value jToken = token();
     for (auto field = fields().rbegin(); fields().rend() != field; ++field) {
-        jRest.removeMember(field->szName); // and all that follow are gone already
-        for (const Json::Value& jBefore : {without(field->szName), jRest}) {
-            SCOPED_TRACE(text(jBefore));
-            Json::Value jToken = jBefore;
-            EXPECT_EQ(-1, fillDefaultValue(jToken, true));
-            EXPECT_EQ(jBefore, jToken);
-            EXPECT_LINES(ordinary(fieldList(field->nLine), std::string("lost data member=") + field->szName));
-        }
-    }
-    Json::Value jNull;
-    EXPECT_FAILURE(fillDefaultValue(jNull, true), ordinary(fieldList(2), "lost data member=tid"));
-    EXPECT_TRUE(jNull.isNull());
-}
-
-TEST_F(Defaults, ThrowForWhatIsNoRecord)
-{
-    for (const char* szRecord : {"[]", "5", R"("")"}) {
-        SCOPED_TRACE(szRecord);
-        Json::Value jToken = json(szRecord);
-        EXPECT_THROW(fillDefaultValue(jToken, false), Json::LogicError);
-        EXPECT_THROW(fillDefaultValue(jToken, true), Json::LogicError);
-        EXPECT_EQ(json(szRecord), jToken);
+        jToken.removeMember(field->szName); // and all that follow are gone already
+        const Json::Value jBefore = jToken;
+        EXPECT_FAILURE(fillDefaultValue(jToken, true),
+                       ordinary(fieldList(field->nLine), std::string("lost data member=") + field->szName));
+        EXPECT_EQ(jBefore, jToken);
     }
 }
 
@@ -162,35 +113,21 @@ TEST_F(TypeCheck, StopsAtTheFirstMemberOfAWrongType)
         Json::Value jToken = token();
         jToken[field.szName] = json(field.szOther);
         check(jToken, nullptr);
-        checkFails(withWrong(field), field.szName, EACCES);
+        jToken[field.szName] = json(field.szWrong);
+        checkFails(jToken, field.szName, EACCES);
     }
-    checkFails(json(R"({"uid":"0","tid":1,"count":1,"bind_sid":""})"), "tid"); // in the order of the names
-    checkFails(json(R"({"count":"%s%n%m%%"})"), "count");
+    // In the order of the names, whatever else there is.
+    checkFails(json(R"({"uid":"0","tid":1,"count":"%s%n%m%%","bind_sid":"","a":1,"z":1,"Count":[]})"),
+               "count");
     Json::Value jLong = json(R"({"count":"5"})");
     jLong["tid"] = std::string(200000, 'x');
     checkFails(jLong, "count");
 }
 
-TEST_F(TypeCheck, LooksAtNeitherValuesNorOtherNames)
+TEST_F(TypeCheck, RefusesWhatIsNoObjectAndUnknownTypeNames)
 {
-    for (const char* szRecord :
-         {"{}", R"({"tid":"too short","webapi_allow":{"Api":5}})",
-          R"({"Count":"5","tid ":1,"":[],"limit":"x","sort_by":{},"count\u0000":"5"})"}) {
-        check(json(szRecord), nullptr);
-    }
-    checkFails(json(R"({"a":1,"count":"5","z":1})"), "count");
-}
-
-TEST_F(TypeCheck, RefusesWhatIsNoObject)
-{
-    for (const char* szRecord : {"null", "[]", "\"count\"", "5", "true", "1.5"}) {
-        check(json(szRecord), "Failed [!jTokenParam.isObject()], err=Permission denied", EACCES);
-    }
-}
-
-// Names that the check does not know, though the row decoder may.
-TEST_F(TypeCheck, RefusesUnknownTypeNames)
-{
+    check(Json::Value(), "Failed [!jTokenParam.isObject()], err=Permission denied", EACCES);
+    // The row decoder knows the first of these names, and the check does not.
     for (const char* szType : {"Json::Value", "double", "String", "int ", ""}) {
         SCOPED_TRACE(szType);
         tokenType()["count"][0] = szType;
