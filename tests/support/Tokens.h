@@ -68,20 +68,6 @@ inline Json::Value counted(Json::Int64 nCount)
     return token("{\"count\":" + std::to_string(nCount) + "}");
 }
 
-// A record without one member; with a value of a wrong type for a field.
-inline Json::Value without(const char* szMember, Json::Value jToken = token())
-{
-    jToken.removeMember(szMember);
-    return jToken;
-}
-
-inline Json::Value withWrong(const Field& field)
-{
-    Json::Value jToken = token();
-    jToken[field.szName] = json(field.szWrong);
-    return jToken;
-}
-
 // The values of a record's fields as texts, with szQuote around those that SQL quotes, and quotes doubled.
 inline Texts values(const Json::Value& jToken, const std::string& strQuote)
 {

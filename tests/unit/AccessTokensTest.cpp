@@ -48,18 +48,24 @@ protected:
     const Json::Value m_jCountOf7 = json(R"({"count":7})");
 };
 
+// Each of its changes waits for a lock once, and does what it says.
 TEST_F(TokensTest, GoThroughTheirLife)
 {
+    answerStatements("INSERT", {LOCKED});
     const std::string strTid =
         m_tokens.create(1000, "VPN", json(R"({"count":2,"webapi_allow":{"Api":{"method":["get"]}}})"));
-    EXPECT_EQ("2", countOf(strTid));
     EXPECT_EQ(2, m_tokens.lookup(strTid)->get("count", 0).asInt());
+    answerStatements(REPLACE, {LOCKED});
     EXPECT_TRUE(m_tokens.update(strTid, m_jCountOf7));
+    EXPECT_THROW(m_tokens.update(strTid, json(R"({"tid":"u"})")), std::invalid_argument);
     Json::Value jToken;
     EXPECT_EQ(GRANTED, m_tokens.grant(strTid, "Api", "get", &jToken));
     EXPECT_EQ(6, jToken["count"].asInt());
     EXPECT_EQ(1000, jToken["uid"].asInt());
     EXPECT_EQ(GRANTED, m_tokens.grant(strTid, "Api"));
+    EXPECT_EQ(strTid, tids());
+    EXPECT_EQ("5", countOf(strTid));
+    answerStatements("DELETE FROM token WHERE tid", {LOCKED});
     EXPECT_TRUE(m_tokens.revoke(strTid));
     EXPECT_EQ("", tids());
     EXPECT_FALSE(m_tokens.revoke(strTid));
@@ -80,13 +86,6 @@ TEST_F(TokensTest, AreRevokedBySessionAndByPurpose)
     // The library would read it as "no session", and delete the tokens that are bound to none.
     EXPECT_THROW(m_tokens.revokeSession(std::string("\0S2", 3)), std::runtime_error);
     EXPECT_EQ("c d", tids());
-}
-
-TEST_F(TokensTest, KeepTheirId)
-{
-    insert();
-    EXPECT_THROW(m_tokens.update("t", json(R"({"tid":"u"})")), std::invalid_argument);
-    EXPECT_EQ("t", tids());
 }
 
 TEST_F(TokensTest, SayWhatHappenedToAGrant)
@@ -141,19 +140,6 @@ TEST_F(TokensTest, TreatExpiredTokensAsGoneWhenThePurgeFails)
     EXPECT_EQ(std::nullopt, m_tokens.lookup("t"));
     EXPECT_FALSE(m_tokens.update("t", m_jCountOf7));
     EXPECT_EQ("3", countOf());
-}
-
-TEST_F(TokensTest, WaitAndDoWhatTheySay)
-{
-    answerStatements("INSERT", {LOCKED});
-    const std::string strTid = m_tokens.create(0, "VPN");
-    EXPECT_EQ("1", countOf(strTid));
-    answerStatements(REPLACE, {LOCKED});
-    EXPECT_TRUE(m_tokens.update(strTid, m_jCountOf7));
-    EXPECT_EQ("7", countOf(strTid));
-    answerStatements("DELETE FROM token WHERE tid", {LOCKED});
-    EXPECT_TRUE(m_tokens.revoke(strTid));
-    EXPECT_EQ("", tids());
 }
 
 TEST_F(TokensTest, ThrowWhatTheyCannotDo)

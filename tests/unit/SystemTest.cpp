@@ -89,15 +89,6 @@ TEST_F(System, OpensAsRootButCannotWriteAtAnotherEffectiveUid)
     expectPrivateFileOfRoot();
 }
 
-TEST_F(System, FailedOpeningLeavesTheEffectiveUidAtRoot)
-{
-    ASSERT_EQ(0, mkdir(VEMO_ATOKEN_DB_PATH, 0700));
-    ASSERT_EQ(0, seteuid(UID_NOBODY));
-    EXPECT_EQ(-1, AccessTokenDbApi().initDb());
-    EXPECT_EQ(0u, geteuid());
-    EXPECT_EQ(1u, takeLines().size());
-}
-
 TEST_F(System, NeedsTheRightToBecomeRoot)
 {
     EXPECT_TRUE(endsWell(startProcess([] {
