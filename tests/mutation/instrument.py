@@ -148,6 +148,10 @@ class Source:
     def wrap(self, cursor, before, after):
         self.edits.append((*place(cursor), before, after))
 
+    def change(self, cursor, function, *changes):
+        """Passes an expression through that function of mutants.h."""
+        self.wrap(cursor, f"{function}({self.add(cursor, *changes)}, ", ")")
+
     # Statements
 
     def statements(self, block, last):
@@ -299,8 +303,7 @@ class Source:
             if operator == "|" and CONSTANT.fullmatch(self.slice(child)):
                 if self.slice(child) == "O_RDONLY":
                     continue  # no flag at all
-                number = self.add(child, "flag removed")
-                self.wrap(child, f"mutant_flag({number}, ", ")")
+                self.change(child, "mutant_flag", "flag removed")
                 continue
             if operator in ("&&", "||"):
                 self.operand(child, operator, i == 0, place(cursor) == self.unused)
@@ -352,18 +355,14 @@ class Source:
     def constant(self, cursor):
         kind = cursor.kind
         if kind == Kind.CXX_BOOL_LITERAL_EXPR:
-            number = self.add(cursor, "constant flipped")
-            self.wrap(cursor, f"mutant_bool({number}, ", ")")
+            self.change(cursor, "mutant_bool", "constant flipped")
         elif self.is_enumerator(cursor):
-            number = self.add(cursor, "constant changed")
-            self.wrap(cursor, f"mutant_enumerator({number}, ", ")")
+            self.change(cursor, "mutant_enumerator", "constant changed")
         elif kind == Kind.INTEGER_LITERAL and self.is_number(cursor) or self.is_named_constant(cursor):
             if self.text[cursor.extent.start.offset - 1] == "[" and self.slice(cursor) in ("0", "0U"):
-                number = self.add(cursor, "constant +1")
-                self.wrap(cursor, f"mutant_up({number}, ", ")")
+                self.change(cursor, "mutant_up", "constant +1")
             else:
-                number = self.add(cursor, "constant +1", "constant -1")
-                self.wrap(cursor, f"mutant_constant({number}, ", ")")
+                self.change(cursor, "mutant_constant", "constant +1", "constant -1")
 
     def is_number(self, cursor):
         """Or a macro that stands for one, however many make it up."""
