@@ -96,6 +96,16 @@ struct Receiver {
     }
 };
 
+template <typename Allocation>
+void* withoutThrowing(Allocation allocation)
+{
+    try {
+        return allocation();
+    } catch (const std::bad_alloc&) {
+        return nullptr;
+    }
+}
+
 } // namespace
 
 // Whether the library calls the function that this stands in.
@@ -341,14 +351,10 @@ void* operator new(std::size_t cbSize, const std::nothrow_t&) noexcept
     if (CALLED_BY_LIBRARY && fails("operator new")) {
         return nullptr;
     }
-    try {
-        return ::operator new(cbSize);
-    } catch (const std::bad_alloc&) {
-        return nullptr;
-    }
+    return withoutThrowing([cbSize] { return ::operator new(cbSize); });
 }
 
 void* operator new[](std::size_t cbSize, const std::nothrow_t&) noexcept
 {
-    return fails("operator new[]") ? nullptr : ::operator new(cbSize, std::nothrow);
+    return fails("operator new[]") ? nullptr : withoutThrowing([cbSize] { return ::operator new[](cbSize); });
 }
