@@ -154,6 +154,32 @@ Examples:
     [ "$(tool list --field bind_sid)" = "" ]
 }
 
+# At each limit the program ends in the loader (1, 127), for lack of memory (4), or as usual (2). The loader itself crashes
+# where it has no memory for a table of its own, and does so when it only lists the libraries.
+@test "a lack of memory from the start is told, and causes no crash" {
+    ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
+    [[ $(ldd "$TOOL" 2>&1) != *"not a dynamic executable"* ]] || skip "valgrind takes more memory"
+    [ -z "${LLVM_PROFILE_FILE-}" ] || skip "clang's counters take memory of their own"
+    as_usual=0
+    for ((limit = 5000; limit < 12000 && as_usual < 20; limit += 16)); do
+        status=0
+        stderr=$( (ulimit -v "$limit" && exec "$TOOL" generate more) 2>&1) || status=$?
+        case $status in
+            1 | 127) ;;
+            2) as_usual=$((as_usual + 1)) ;;
+            4) [ "$stderr" = "vemo-access-token: out of memory" ] ;;
+            139)
+                run bash -c "ulimit -v $limit && LD_TRACE_LOADED_OBJECTS=1 exec '$TOOL' >/dev/null 2>&1"
+                [ "$status" -eq 139 ]
+                ;;
+            *) false ;;
+        esac
+        [ "$status" -eq 2 ] || as_usual=0
+    done
+    [ "$as_usual" -eq 20 ]
+    [ "$stderr" = 'vemo-access-token: unexpected argument "more"' ]
+}
+
 @test "a user who is not root is told so, and nothing is tried" {
     uid=65534
     [ "$(id -u)" -eq 0 ] || uid=$(id -u)
