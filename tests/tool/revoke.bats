@@ -57,6 +57,9 @@ END
 
 @test "selectors choose the tokens, and those that fit all of several; --dry-run tells how many, and changes nothing" {
     six_tokens
+    sql "UPDATE token SET uid = 4294967294 WHERE tid LIKE 'a%'; UPDATE token SET count = -1 WHERE tid LIKE 'b%';
+         UPDATE token SET deadline = 5 WHERE tid LIKE 'c%';
+         UPDATE token SET deadline = strftime('%s', 'now') + 1000 WHERE tid LIKE 'd%'"
     cp "$DB" "$DIR/six"
     while IFS='|' read -r selectors revoked; do
         cp "$DIR/six" "$DB"
@@ -68,9 +71,17 @@ END
         left=${left//["$revoked "]/}
         expect_left ${left//?/&&&&&&&& }
     done <<'TABLE'
---uid 0|ab
+--uid 0|b
 --function "it's"|f
 --function vpn|
+--bind-sid s2|bd
+--opens Api|abcdef
+--no-owner|a
+--unlimited|b
+--expired|c
+--expiring 1h|d
+--created-before @1|abcdef
+--created-after @1|
 --uid 65534 --function Mail --bind-sid s1|e
 --user root --created-before @1 --opens Other|
 --all|abcdef
