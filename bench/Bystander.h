@@ -4,17 +4,46 @@
 #ifndef VEMO_ACCESS_TOKEN_BENCH_BYSTANDER_H
 #define VEMO_ACCESS_TOKEN_BENCH_BYSTANDER_H
 
-#include <sys/types.h>
+#include <signal.h>
+#include <unistd.h>
+
+#include <stdexcept>
+
+#include "AccessTokenApi.h"
+#include "Processes.h"
 
 class Bystander {
 public:
-    Bystander();
-    ~Bystander();
+    Bystander()
+    {
+        int rgnEnd[2];
+        char cByte = 0;
+        if (0 != pipe(rgnEnd)) {
+            throw std::runtime_error("no pipe");
+        }
+        m_pid = startProcess([&] {
+            AccessTokenApi api;
+            // SQLite opens the journal with the first statement only.
+            if (0 == api.cleanExpireToken(false) && 1 == write(rgnEnd[1], &cByte, 1)) {
+                pause();
+            }
+        });
+        close(rgnEnd[1]);
+        const bool blConnected = 1 == read(rgnEnd[0], &cByte, 1);
+        close(rgnEnd[0]);
+        if (!blConnected) {
+            throw std::runtime_error("the other process has no connection");
+        }
+    }
+    ~Bystander()
+    {
+        kill(m_pid, SIGKILL);
+        statusOf(m_pid);
+    }
     Bystander(const Bystander&) = delete;
     Bystander& operator=(const Bystander&) = delete;
 
 private:
-    int m_rgnEnd[2];
     pid_t m_pid;
 };
 

@@ -1,11 +1,23 @@
 #include "Run.h"
 
-#include <benchmark/benchmark.h>
 #include <json/version.h>
 #include <sqlite3.h>
 
 #include <cstdio>
-#include <exception>
+#include <fstream>
+#include <stdexcept>
+
+double procValue(const std::string& strFile, const std::string& strName)
+{
+    std::ifstream file("/proc/" + strFile);
+    std::string strLine;
+    while (std::getline(file, strLine)) {
+        if (0 == strLine.compare(0, strName.size(), strName)) {
+            return std::stod(strLine.substr(strName.size()));
+        }
+    }
+    throw std::runtime_error(strFile + " has no " + strName);
+}
 
 int main(int argc, char** argv)
 {

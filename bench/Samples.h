@@ -12,17 +12,15 @@ class Samples {
 public:
     void add(double dSample) { m_rgdSample.push_back(dSample); }
 
-    // Adds the seconds that the call takes, and returns its result.
+    // Adds the microseconds that the call takes, and returns them.
     template <typename Call>
-    auto time(Call call)
+    double time(Call call)
     {
         const auto start = std::chrono::steady_clock::now();
-        auto result = call();
-        add(std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count());
-        return result;
+        call();
+        add(std::chrono::duration<double, std::micro>(std::chrono::steady_clock::now() - start).count());
+        return m_rgdSample.back();
     }
-
-    double last() const { return m_rgdSample.back(); }
 
     // The value that nPercent of the samples do not exceed. There must be samples.
     double percentile(int nPercent)
@@ -33,6 +31,8 @@ public:
         std::nth_element(m_rgdSample.begin(), it, m_rgdSample.end());
         return *it;
     }
+
+    double median() { return percentile(50); }
 
 private:
     std::vector<double> m_rgdSample;

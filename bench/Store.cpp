@@ -52,6 +52,7 @@ Store::Store(Place place) : m_nTokens(0)
 Store::~Store()
 {
     std::filesystem::remove_all(m_strDirectory);
+    std::filesystem::remove(m_strDirectory + ".lock"); // of the redirected lock of all programs
 }
 
 void Store::use() const
@@ -104,6 +105,19 @@ BareToken tokenOf(int nNumber)
     token.strWebapiAllow = R"({"Example.File":{"method":["get","list"]}})";
     token.strExtra = "{}";
     return token;
+}
+
+std::map<std::string, std::string> fieldsOf(const BareToken& token)
+{
+    return {{"tid", token.strTid},
+            {"bind_sid", token.strBindSid},
+            {"uid", std::to_string(token.nUid)},
+            {"deadline", std::to_string(token.nDeadline)},
+            {"count", std::to_string(token.nCount)},
+            {"create_time", std::to_string(token.nCreateTime)},
+            {"function", token.strFunction},
+            {"webapi_allow", token.strWebapiAllow},
+            {"extra", token.strExtra}};
 }
 
 const char* webapi()

@@ -6,6 +6,7 @@
 #ifndef VEMO_ACCESS_TOKEN_BENCH_STORE_H
 #define VEMO_ACCESS_TOKEN_BENCH_STORE_H
 
+#include <map>
 #include <string>
 
 #include "BareEngine.h"
@@ -46,6 +47,9 @@ private:
 // n - 1. Each has many uses left and allows two methods of one API. Tokens expire from a day on, ten a
 // second.
 BareToken tokenOf(int nNumber);
+
+// Its fields as texts, by their names.
+std::map<std::string, std::string> fieldsOf(const BareToken& token);
 
 const int FRESH = 100000000; // the number of a token that no store holds by itself
 

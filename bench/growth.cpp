@@ -8,10 +8,7 @@
 //   median_us, few_us   of the library's grants in the two stores
 //   ratio, bare_ratio   of the two medians: the library's, and the bare engine's
 
-#include <benchmark/benchmark.h>
-
 #include <algorithm>
-#include <fstream>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -30,7 +27,9 @@ void grant(int nToken, Samples& samples)
 {
     std::string strTid = tokenOf(nToken).strTid;
     Json::Value jToken;
-    if (0 != samples.time([&] { return VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken); })) {
+    int nResult = -1;
+    samples.time([&] { nResult = VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken); });
+    if (0 != nResult) {
         throw std::runtime_error("the grant failed");
     }
 }
@@ -42,7 +41,6 @@ void grantBare(int nToken, Samples& samples)
         BareEngine engine;
         engine.purge();
         engine.grant(strTid);
-        return 0;
     });
 }
 
@@ -86,23 +84,11 @@ void growth(benchmark::State& state, Place place, bool blIndexes, int nTokens)
         grantByBoth(*pMany, nTokens, nTurn, many, bareMany);
         grantByBoth(*pFew, FEW, nTurn, few, bareFew);
         ++nTurn;
-        state.SetIterationTime(many.last());
     }
-    state.counters["median_us"] = many.percentile(50) * 1e6;
-    state.counters["few_us"] = few.percentile(50) * 1e6;
-    state.counters["ratio"] = many.percentile(50) / few.percentile(50);
-    state.counters["bare_ratio"] = bareMany.percentile(50) / bareFew.percentile(50);
-}
-
-// The bytes that this process has written, as the kernel counts them.
-double bytesWritten()
-{
-    std::ifstream file("/proc/self/io");
-    std::string strName;
-    double dBytes = 0;
-    while (file >> strName >> dBytes && strName != "wchar:") {
-    }
-    return dBytes;
+    state.counters["median_us"] = many.median();
+    state.counters["few_us"] = few.median();
+    state.counters["ratio"] = many.median() / few.median();
+    state.counters["bare_ratio"] = bareMany.median() / bareFew.median();
 }
 
 // Grants and deletions with the index on the deadline alone beside those with all three.
@@ -123,18 +109,17 @@ void indexes(benchmark::State& state, Place place, int nTokens)
             deletions[blThree].time(
                 [] { return VemoAccessTokenDeleteByBindSid("a session without tokens"); });
             grant(nCall * 7919 % nTokens, firsts);
-            const double dBefore = bytesWritten();
+            const double dBefore = procValue("self/io", "wchar:");
             grant((nCall + 1) * 7919 % nTokens, grants[blThree]);
-            written[blThree].add(bytesWritten() - dBefore);
+            written[blThree].add(procValue("self/io", "wchar:") - dBefore);
         }
         nCall += 2;
-        state.SetIterationTime(grants[true].last());
     }
     for (const bool blThree : {false, true}) {
         const std::string strPrefix = blThree ? "three_" : "one_";
-        state.counters[strPrefix + "us"] = grants[blThree].percentile(50) * 1e6;
-        state.counters[strPrefix + "kB"] = written[blThree].percentile(50) / 1e3;
-        state.counters[strPrefix + "delete_us"] = deletions[blThree].percentile(50) * 1e6;
+        state.counters[strPrefix + "us"] = grants[blThree].median();
+        state.counters[strPrefix + "kB"] = written[blThree].median() / 1e3;
+        state.counters[strPrefix + "delete_us"] = deletions[blThree].median();
     }
 }
 
@@ -143,21 +128,15 @@ void indexes(benchmark::State& state, Place place, int nTokens)
 void registerBenchmarks()
 {
     for (const Place place : {Place::Memory, Place::Disk}) {
+        const std::string strName = std::string("Growth/") + nameOf(place);
         for (const int nTokens : {1000, 10000, 100000}) {
-            const std::string strName =
-                std::string("Growth/") + nameOf(place) + "/indexes/" + std::to_string(nTokens);
-            benchmark::RegisterBenchmark(strName.c_str(), indexes, place, nTokens)
-                ->UseManualTime()
-                ->Iterations(300);
+            add(strName + "/indexes/" + std::to_string(nTokens), 300, indexes, place, nTokens);
         }
         for (const bool blIndexes : {false, true}) {
             for (const int nTokens : {10, 100, 1000, 10000, 100000, 1000000}) {
-                const std::string strName = std::string("Growth/") + nameOf(place) +
-                                            (blIndexes ? "/indexed/" : "/plain/") + std::to_string(nTokens);
                 const int nCalls = blIndexes || nTokens <= 10000 ? 300 : 3000000 / nTokens;
-                benchmark::RegisterBenchmark(strName.c_str(), growth, place, blIndexes, nTokens)
-                    ->UseManualTime()
-                    ->Iterations(std::max(nCalls, 15));
+                add(strName + (blIndexes ? "/indexed/" : "/plain/") + std::to_string(nTokens),
+                    std::max(nCalls, 15), growth, place, blIndexes, nTokens);
             }
         }
     }

@@ -7,11 +7,10 @@
 //
 // Control compares the bare engine with itself: how far its ratio is from 1 shows the error of the others.
 
-#include <benchmark/benchmark.h>
-
-#include <memory>
+#include <map>
 #include <stdexcept>
 #include <string>
+#include <utility>
 
 #include "MeasuredCalls.h"
 #include "Run.h"
@@ -23,38 +22,29 @@ namespace {
 const int FEW = 10;      // tokens
 const int MANY = 100000; // with which a call takes so long that fewer calls must do
 
-// Keeps the store for the next benchmark with the same place and size.
+// Keeps the store for the other benchmarks of the same place and size.
 void useStore(Place place, int nTokens)
 {
-    static std::unique_ptr<Store> pStore;
-    static Place placeOfStore;
-    static int nTokensOfStore;
-    if (!pStore || place != placeOfStore || nTokens != nTokensOfStore) {
-        pStore = std::make_unique<Store>(place);
-        pStore->grow(nTokens);
-        placeOfStore = place;
-        nTokensOfStore = nTokens;
-    }
+    static std::map<std::pair<Place, int>, Store> stores;
+    const auto it = stores.try_emplace({place, nTokens}, place).first;
+    it->second.grow(nTokens);
 }
 
-// Both return the seconds of the call.
 double runOurs(const Operation& operation, Call& call, Samples& samples)
 {
     operation.prepare(call);
-    if (operation.nExpected != samples.time([&] { return operation.run(call); })) {
+    int nResult = 0;
+    const double dTime = samples.time([&] { nResult = operation.run(call); });
+    if (operation.nExpected != nResult) {
         throw std::runtime_error("the library failed");
     }
-    return samples.last();
+    return dTime;
 }
 
 double runBare(const Operation& operation, Call& call, Samples& samples)
 {
     operation.prepare(call);
-    samples.time([&] {
-        operation.runBare(call);
-        return 0;
-    });
-    return samples.last();
+    return samples.time([&] { operation.runBare(call); });
 }
 
 void overhead(benchmark::State& state, const Operation& operation, Place place, int nTokens)
@@ -70,12 +60,11 @@ void overhead(benchmark::State& state, const Operation& operation, Place place, 
         const double dOurs = runOurs(operation, call, ours) + runOurs(operation, call, ours);
         const double dBare = dBareFirst + runBare(operation, call, bare);
         ratios.add(dOurs / dBare);
-        state.SetIterationTime(dOurs);
     }
     removeFreshTokens();
-    state.counters["ours_us"] = ours.percentile(50) * 1e6;
-    state.counters["bare_us"] = bare.percentile(50) * 1e6;
-    state.counters["ratio"] = ratios.percentile(50);
+    state.counters["ours_us"] = ours.median();
+    state.counters["bare_us"] = bare.median();
+    state.counters["ratio"] = ratios.median();
 }
 
 // More turns where the library's share of the time is larger.
@@ -87,32 +76,21 @@ int turnsOf(Place place, int nTokens)
     return Place::Memory == place ? 1500 : FEW == nTokens ? 750 : 150;
 }
 
-void registerBenchmark(const Operation& operation, Place place, int nTokens)
-{
-    const std::string strName =
-        std::string("Overhead/") + operation.szName + "/" + nameOf(place) + "/" + std::to_string(nTokens);
-    benchmark::RegisterBenchmark(strName.c_str(), overhead, operation, place, nTokens)
-        ->UseManualTime()
-        ->Iterations(turnsOf(place, nTokens));
-}
-
-void registerOperations(Place place, int nTokens)
-{
-    for (const Operation& operation : operations()) {
-        if (operation.runBare) {
-            registerBenchmark(operation, place, nTokens);
-        }
-    }
-    registerBenchmark(control(), place, nTokens);
-}
-
 } // namespace
 
 void registerBenchmarks()
 {
+    std::vector<Operation> rgOperation = operations();
+    rgOperation.push_back(control());
     for (const Place place : {Place::Memory, Place::Disk}) {
         for (const int nTokens : {FEW, 1000, MANY}) {
-            registerOperations(place, nTokens);
+            for (const Operation& operation : rgOperation) {
+                if (operation.runBare) {
+                    add(std::string("Overhead/") + operation.szName + "/" + nameOf(place) + "/" +
+                            std::to_string(nTokens),
+                        turnsOf(place, nTokens), overhead, operation, place, nTokens);
+                }
+            }
         }
     }
 }

@@ -7,11 +7,8 @@
 
 #include <cerrno>
 #include <chrono>
-#include <cstdlib>
 #include <cstring>
 #include <stdexcept>
-
-#include "Samples.h"
 
 namespace {
 
@@ -24,56 +21,10 @@ struct Client {
     Clock::time_point sent;
 };
 
-[[noreturn]] void fail(const char* szWhat)
+[[noreturn]] void fail(const std::string& strWhat)
 {
-    throw std::runtime_error(std::string(szWhat) + ": " + strerror(errno));
+    throw std::runtime_error(strWhat + ": " + strerror(errno));
 }
-
-void sendNext(Client& client, const Load& load)
-{
-    const std::string& strRequest = load.strRequests[client.nNext];
-    client.nNext = (client.nNext + load.nClients) % load.strRequests.size();
-    client.sent = Clock::now();
-    if (static_cast<ssize_t>(strRequest.size()) !=
-        send(client.nSocket, strRequest.data(), strRequest.size(), MSG_NOSIGNAL)) {
-        fail("send");
-    }
-}
-
-std::vector<Client> connectAll(const Load& load, int nEpoll)
-{
-    std::vector<Client> clients(load.nClients);
-    for (size_t i = 0; i < clients.size(); ++i) {
-        clients[i].nSocket = connectTo(load.strPath);
-        clients[i].nNext = i % load.strRequests.size();
-        struct epoll_event event = {};
-        event.events = EPOLLIN;
-        event.data.ptr = &clients[i];
-        epoll_ctl(nEpoll, EPOLL_CTL_ADD, clients[i].nSocket, &event);
-    }
-    return clients;
-}
-
-// Receives bytes. Returns the reply once it is complete.
-Reply takeReply(Client& client, const Load& load)
-{
-    char rgBytes[16384];
-    const ssize_t cbBytes = recv(client.nSocket, rgBytes, sizeof(rgBytes), 0);
-    if (0 >= cbBytes) {
-        fail("recv");
-    }
-    client.strReply.append(rgBytes, static_cast<size_t>(cbBytes));
-    const Reply reply = load.readReply(client.strReply);
-    client.strReply.erase(0, reply.cbReply);
-    return reply;
-}
-
-double seconds(Clock::duration duration)
-{
-    return std::chrono::duration<double>(duration).count();
-}
-
-} // namespace
 
 int connectTo(const std::string& strPath)
 {
@@ -81,89 +32,87 @@ int connectTo(const std::string& strPath)
     address.sun_family = AF_UNIX;
     strncpy(address.sun_path, strPath.c_str(), sizeof(address.sun_path) - 1);
     const int nSocket = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    if (0 != connect(nSocket, reinterpret_cast<struct sockaddr*>(&address), sizeof(address))) {
-        close(nSocket);
-        fail(strPath.c_str());
+    for (int i = 0; i < 500; ++i, usleep(10000)) {
+        if (0 == connect(nSocket, reinterpret_cast<struct sockaddr*>(&address), sizeof(address))) {
+            return nSocket;
+        }
     }
-    return nSocket;
+    fail(strPath);
 }
 
-Reply readHttpReply(std::string_view strBytes)
+void sendNext(Client& client, const Load& load, size_t nClients)
 {
-    const size_t nEnd = strBytes.find("\r\n\r\n");
-    if (std::string_view::npos == nEnd) {
-        return {};
+    const std::string& strRequest = load.strRequests[client.nNext];
+    client.nNext = (client.nNext + nClients) % load.strRequests.size();
+    client.strReply.clear();
+    client.sent = Clock::now();
+    if (static_cast<ssize_t>(strRequest.size()) !=
+        send(client.nSocket, strRequest.data(), strRequest.size(), MSG_NOSIGNAL)) {
+        fail("send");
     }
-    const size_t nLength = strBytes.substr(0, nEnd).find("Content-Length: ");
-    const size_t cbBody =
-        std::string_view::npos == nLength ? 0 : strtoul(&strBytes[nLength + 16], nullptr, 10);
-    if (strBytes.size() < nEnd + 4 + cbBody) {
-        return {};
-    }
-    return {nEnd + 4 + cbBody, strBytes.substr(9, 3) == "200"};
 }
 
-Reply readRedisReply(std::string_view strBytes)
+// Receives bytes. Returns whether the reply is complete.
+bool receive(Client& client, const Load& load)
 {
-    size_t nPlace = 0;
-    bool blArray = false;
-    for (long nLeft = 1; nLeft > 0; --nLeft) {
-        const size_t nEnd = strBytes.find("\r\n", nPlace);
-        if (std::string_view::npos == nEnd) {
-            return {};
-        }
-        const char cKind = strBytes[nPlace];
-        const long nSize = strtol(&strBytes[nPlace + 1], nullptr, 10);
-        nPlace = nEnd + 2;
-        if ('-' == cKind) {
-            throw std::runtime_error(std::string(strBytes));
-        }
-        if ('*' == cKind && nSize >= 0) {
-            blArray = true;
-            nLeft += nSize;
-        } else if ('$' == cKind && nSize >= 0) {
-            nPlace += static_cast<size_t>(nSize) + 2;
-        }
+    char rgBytes[16384];
+    const ssize_t cbBytes = recv(client.nSocket, rgBytes, sizeof(rgBytes), 0);
+    if (0 >= cbBytes) {
+        fail("recv");
     }
-    return nPlace > strBytes.size() ? Reply{} : Reply{nPlace, blArray};
+    std::string& strReply = client.strReply.append(rgBytes, static_cast<size_t>(cbBytes));
+    if (0 != strReply.compare(0, load.strBegin.size(), load.strBegin)) {
+        throw std::runtime_error("not granted: " + strReply);
+    }
+    const size_t cbEnd = load.strEnd.size();
+    return strReply.size() >= cbEnd && 0 == strReply.compare(strReply.size() - cbEnd, cbEnd, load.strEnd);
 }
 
-Loaded run(const Load& load)
+double secondsSince(Clock::time_point start)
+{
+    return std::chrono::duration<double>(Clock::now() - start).count();
+}
+
+} // namespace
+
+Loaded run(const Load& load, size_t nClients, double dSeconds)
 {
     const int nEpoll = epoll_create1(EPOLL_CLOEXEC);
-    std::vector<Client> clients = connectAll(load, nEpoll);
+    std::vector<Client> clients(nClients);
+    for (size_t i = 0; i < nClients; ++i) {
+        clients[i].nSocket = connectTo(load.strPath);
+        clients[i].nNext = i % load.strRequests.size();
+        struct epoll_event event = {};
+        event.events = EPOLLIN;
+        event.data.ptr = &clients[i];
+        epoll_ctl(nEpoll, EPOLL_CTL_ADD, clients[i].nSocket, &event);
+    }
     Loaded loaded;
-    Samples took;
     const Clock::time_point start = Clock::now();
     for (Client& client : clients) {
-        sendNext(client, load);
+        sendNext(client, load, nClients);
     }
-    for (size_t nWaiting = clients.size(); nWaiting;) {
+    for (size_t nWaiting = nClients; nWaiting;) {
         struct epoll_event rgEvent[64];
         const int nEvents = epoll_wait(nEpoll, rgEvent, 64, -1);
         for (int i = 0; i < nEvents; ++i) {
             Client& client = *static_cast<Client*>(rgEvent[i].data.ptr);
-            const Reply reply = takeReply(client, load);
-            if (!reply.cbReply) {
+            if (!receive(client, load)) {
                 continue;
             }
-            const Clock::time_point now = Clock::now();
-            took.add(seconds(now - client.sent));
+            loaded.took.add(secondsSince(client.sent) * 1e6);
             ++loaded.nReplies;
-            loaded.nGranted += reply.blGranted;
-            if (seconds(now - start) < load.dSeconds) {
-                sendNext(client, load);
+            if (secondsSince(start) < dSeconds) {
+                sendNext(client, load, nClients);
             } else {
                 --nWaiting;
             }
         }
     }
-    loaded.dSeconds = seconds(Clock::now() - start);
+    loaded.dSeconds = secondsSince(start);
     for (const Client& client : clients) {
         close(client.nSocket);
     }
     close(nEpoll);
-    loaded.dMedian = took.percentile(50);
-    loaded.d99th = took.percentile(99);
     return loaded;
 }

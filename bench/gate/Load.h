@@ -5,44 +5,25 @@
 #define VEMO_ACCESS_TOKEN_BENCH_LOAD_H
 
 #include <cstddef>
-#include <cstdint>
-#include <functional>
 #include <string>
-#include <string_view>
 #include <vector>
 
-// Connects to a Unix socket. Throws std::runtime_error when that fails.
-int connectTo(const std::string& strPath);
-
-// What the client has of a reply so far.
-struct Reply {
-    size_t cbReply = 0; // the size of the whole reply; 0: more must come
-    bool blGranted = false;
-};
-
-// Reads the reply at the beginning of the received bytes.
-typedef std::function<Reply(std::string_view)> ReplyReader;
-
-Reply readHttpReply(std::string_view strBytes);
-Reply readRedisReply(std::string_view strBytes); // an array: granted; nil: refused
+#include "Samples.h"
 
 struct Load {
-    std::string strPath; // of a Unix socket
+    std::string strPath;          // of a Unix socket
+    std::string strBegin, strEnd; // of the replies, all of which grant
     std::vector<std::string> strRequests;
-    ReplyReader readReply;
-    size_t nClients = 1;
-    double dSeconds = 1;
 };
 
 struct Loaded {
-    uint64_t nReplies = 0;
-    uint64_t nGranted = 0;
+    long long nReplies = 0;
     double dSeconds = 0;
-    double dMedian = 0; // s
-    double d99th = 0;
+    Samples took; // µs
 };
 
-// Runs the load, and waits for the last replies. Throws std::runtime_error when a connection fails.
-Loaded run(const Load& load);
+// Runs the clients, and waits for the last replies. The server may need some seconds before it listens.
+// Throws std::runtime_error when a connection fails, or where a reply is not as expected.
+Loaded run(const Load& load, size_t nClients, double dSeconds);
 
 #endif

@@ -4,17 +4,20 @@
 // All data is on the disk. Unless stated otherwise there are 1000 tokens with many uses. Clients run in a
 // closed loop. The program fails unless the gate has spent exactly one use for each reply.
 
-#include <benchmark/benchmark.h>
+#include <signal.h>
+#include <unistd.h>
 
 #include <cstdlib>
+#include <fstream>
 #include <memory>
+#include <optional>
 #include <stdexcept>
-#include <utility>
 
+#include "../peers/Redis.h"
 #include "Callers.h"
 #include "Load.h"
+#include "Processes.h"
 #include "Run.h"
-#include "Servers.h"
 #include "Store.h"
 
 namespace {
@@ -24,82 +27,115 @@ const int MANY_TOKENS = 100000;
 const size_t CLIENTS = 64;
 const double SECONDS = 2;
 
-std::vector<std::string> httpRequests(int nTokens, const std::string& strTarget)
-{
-    std::vector<std::string> strRequests;
-    for (int i = 0; i < nTokens; ++i) {
-        strRequests.push_back("GET " + strTarget + " HTTP/1.1\r\nHost: bench\r\nAuthorization: Bearer " +
-                              tokenOf(i).strTid + "\r\n\r\n");
-    }
-    return strRequests;
-}
-
-std::string word(const std::string& strText)
-{
-    return "$" + std::to_string(strText.size()) + "\r\n" + strText + "\r\n";
-}
-
-std::vector<std::string> redisRequests(int nTokens, const std::string& strScript)
-{
-    std::vector<std::string> strRequests;
-    for (int i = 0; i < nTokens; ++i) {
-        strRequests.push_back("*6\r\n" + word("EVALSHA") + word(strScript) + word("1") +
-                              word(tokenOf(i).strTid) + word(webapi()) + word(method()));
-    }
-    return strRequests;
-}
-
-long long usesLeft(int nTokens)
-{
-    BareEngine engine;
-    long long nLeft = 0;
-    for (int i = 0; i < nTokens; ++i) {
-        nLeft += engine.read(tokenOf(i).strTid).nCount;
-    }
-    return nLeft;
-}
-
-void report(benchmark::State& state, const Loaded& loaded)
-{
-    if (loaded.nReplies != loaded.nGranted) {
-        throw std::runtime_error("a call was not granted");
-    }
-    state.SetIterationTime(loaded.dSeconds);
-    state.counters["per_second"] = static_cast<double>(loaded.nReplies) / loaded.dSeconds;
-    state.counters["median_us"] = loaded.dMedian * 1e6;
-    state.counters["p99_us"] = loaded.d99th * 1e6;
-}
-
-// Returns the number of replies.
-long long ask(benchmark::State& state, const std::string& strPath, std::vector<std::string> strRequests,
-              ReplyReader read, size_t nClients)
-{
-    Load load;
-    load.strPath = strPath;
-    load.strRequests = std::move(strRequests);
-    load.readReply = std::move(read);
-    load.nClients = nClients;
-    load.dSeconds = SECONDS;
-    long long nReplies = 0;
-    for (auto _ : state) {
-        const Loaded loaded = run(load);
-        report(state, loaded);
-        nReplies += static_cast<long long>(loaded.nReplies);
-    }
-    return nReplies;
-}
+const char* const g_szRedis = getenv("VEMO_BENCH_REDIS_ALWAYS");
 
 enum class Journal { Rollback, WriteAhead };
 
-std::unique_ptr<Store> makeStore(Journal journal, int nTokens)
-{
-    auto pStore = std::make_unique<Store>(Place::Disk);
-    pStore->grow(nTokens);
-    BareEngine().run("UPDATE token SET uid = 0"); // an owner whom each machine knows
-    if (Journal::WriteAhead == journal) {
-        pStore->useWriteAheadLog();
+class DiskStore : public Store {
+public:
+    DiskStore(Journal journal, int nTokens) : Store(Place::Disk)
+    {
+        grow(nTokens);
+        BareEngine().run("UPDATE token SET uid = 0"); // an owner whom each machine knows
+        if (Journal::WriteAhead == journal) {
+            useWriteAheadLog();
+        }
     }
-    return pStore;
+};
+
+// Requests with the tokens 0 to nTokens - 1.
+Load httpLoad(const std::string& strSocket, int nTokens, const std::string& strTarget, const char* szReplyEnd)
+{
+    Load load = {strSocket, "HTTP/1.1 200 ", szReplyEnd, {}};
+    for (int i = 0; i < nTokens; ++i) {
+        load.strRequests.push_back("GET " + strTarget + " HTTP/1.1\r\nHost: bench\r\nAuthorization: Bearer " +
+                                   tokenOf(i).strTid + "\r\n\r\n");
+    }
+    return load;
+}
+
+// A program that runs in the directory of a store, as long as the object.
+class Program {
+public:
+    Program(const Store& store, std::vector<const char*> rgszWord)
+        : m_pid(startProcess([&] {
+              rgszWord.push_back(nullptr);
+              if (0 == chdir(store.directory().c_str())) {
+                  execvp(rgszWord[0], const_cast<char* const*>(rgszWord.data()));
+              }
+          }))
+    {
+    }
+    ~Program()
+    {
+        kill(m_pid, SIGTERM);
+        endsWell(m_pid);
+    }
+    Program(const Program&) = delete;
+    Program& operator=(const Program&) = delete;
+
+    pid_t pid() const { return m_pid; }
+
+private:
+    const pid_t m_pid;
+};
+
+// A gate that has opened its store.
+class Gate {
+public:
+    explicit Gate(const Store& store)
+        : m_strSocket(store.directory() + "/calls"),
+          m_program(store, {VEMO_BENCH_GATE, "--socket", m_strSocket.c_str(), "--user", "nobody"})
+    {
+        run(load(1), 1, 0);
+    }
+
+    // Clients that use the first nTokens tokens.
+    Load load(int nTokens) const
+    {
+        return httpLoad(m_strSocket, nTokens, std::string("/grant/") + webapi() + "/" + method(), "\r\n\r\n");
+    }
+
+    // The memory of its two processes, in MB.
+    double memory() const
+    {
+        const std::string strPid = std::to_string(m_program.pid());
+        std::string strChild;
+        std::ifstream("/proc/" + strPid + "/task/" + strPid + "/children") >> strChild;
+        return 1.024e-3 *
+               (procValue(strPid + "/status", "VmRSS:") + procValue(strChild + "/status", "VmRSS:"));
+    }
+
+private:
+    const std::string m_strSocket;
+    const Program m_program;
+};
+
+// Lets the clients ask, and returns the number of replies. Each grants a use.
+long long ask(benchmark::State& state, const Load& load, size_t nClients)
+{
+    Loaded loaded;
+    for (auto _ : state) {
+        loaded = run(load, nClients, SECONDS);
+    }
+    state.counters["per_second"] = static_cast<double>(loaded.nReplies) / loaded.dSeconds;
+    state.counters["median_us"] = loaded.took.median();
+    state.counters["p99_us"] = loaded.took.percentile(99);
+    return loaded.nReplies;
+}
+
+// Of all tokens.
+long long usesLeft()
+{
+    long long nLeft = 0;
+    BareEngine().run(
+        "SELECT sum(count) FROM token",
+        [](void* pLeft, int, char** rgszValue, char**) {
+            *static_cast<long long*>(pLeft) = atoll(rgszValue[0]);
+            return 0;
+        },
+        &nLeft);
+    return nLeft;
 }
 
 void requireSpent(long long nReplies, long long nSpent)
@@ -110,84 +146,78 @@ void requireSpent(long long nReplies, long long nSpent)
     }
 }
 
-// nUsed: how many of the tokens the clients use.
 void gate(benchmark::State& state, Journal journal, int nTokens, int nUsed, size_t nClients)
 {
-    const std::unique_ptr<Store> pStore = makeStore(journal, nTokens);
-    const long long nBefore = usesLeft(nUsed);
-    const Gate server(*pStore);
-    const std::string strTarget = std::string("/grant/") + webapi() + "/" + method();
-    const long long nReplies =
-        ask(state, server.path(), httpRequests(nUsed, strTarget), readHttpReply, nClients);
-    state.counters["memory_MB"] = server.memory() / 1e6;
-    requireSpent(nReplies, nBefore - usesLeft(nUsed));
+    const DiskStore store(journal, nTokens);
+    const Gate gate(store);
+    const long long nBefore = usesLeft();
+    const long long nReplies = ask(state, gate.load(nUsed), nClients);
+    state.counters["memory_MB"] = gate.memory();
+    requireSpent(nReplies, nBefore - usesLeft());
 }
 
 void behindNginx(benchmark::State& state, bool blGate)
 {
-    const std::unique_ptr<Store> pStore = makeStore(Journal::WriteAhead, TOKENS);
-    const Gate server(*pStore);
-    const Nginx nginx(*pStore, blGate ? server.path() : "");
-    const long long nBefore = usesLeft(TOKENS);
-    const long long nReplies =
-        ask(state, nginx.path(), httpRequests(TOKENS, "/page"), readHttpReply, CLIENTS);
-    requireSpent(blGate ? nReplies : 0, nBefore - usesLeft(TOKENS));
+    const DiskStore store(Journal::WriteAhead, TOKENS);
+    const Gate gate(store);
+    std::ofstream(store.directory() + "/page") << "a page\n";
+    const Program nginx(store, {"nginx", "-p", ".", "-c", VEMO_BENCH_NGINX});
+    const long long nBefore = usesLeft();
+    const std::string strSocket = store.directory() + (blGate ? "/behind-gate" : "/behind-at-once");
+    const long long nReplies = ask(state, httpLoad(strSocket, TOKENS, "/page", "a page\n"), CLIENTS);
+    requireSpent(blGate ? nReplies : 0, nBefore - usesLeft());
 }
 
 void redis(benchmark::State& state, int nUsed, size_t nClients)
 {
-    const std::string strPath = getenv("VEMO_BENCH_REDIS_ALWAYS");
-    ask(state, strPath, redisRequests(nUsed, fillRedis(strPath, TOKENS)), readRedisReply, nClients);
+    // It reads and returns no more than the gate's answer needs.
+    const Redis server(g_szRedis, TOKENS, {"count", "webapi_allow", "uid", "function"}, 3);
+    Load load = {g_szRedis, "*2\r\n", "\r\n", {}};
+    for (int i = 0; i < nUsed; ++i) {
+        const std::string strTid = tokenOf(i).strTid;
+        Redis::Words rgszWord = server.grant(strTid, webapi(), method());
+        char* szRequest = nullptr;
+        const auto nWords = static_cast<int>(rgszWord.size());
+        const auto cbRequest = redisFormatCommandArgv(&szRequest, nWords, rgszWord.data(), nullptr);
+        load.strRequests.emplace_back(szRequest, static_cast<size_t>(cbRequest));
+        redisFreeCommand(szRequest);
+    }
+    ask(state, load, nClients);
 }
 
 // Programs that call the library; with blGate, while a gate holds the store open.
 void callers(benchmark::State& state, Journal journal, int nProcesses, Calls calls, bool blGate)
 {
-    const std::unique_ptr<Store> pStore = makeStore(journal, TOKENS);
-    const std::unique_ptr<Gate> pGate = blGate ? std::make_unique<Gate>(*pStore) : nullptr;
-    if (blGate) { // it opens the store with the first call
-        Load load;
-        load.strPath = pGate->path();
-        load.strRequests = httpRequests(1, std::string("/grant/") + webapi());
-        load.readReply = readHttpReply;
-        load.dSeconds = 0;
-        run(load);
+    const DiskStore store(journal, TOKENS);
+    std::optional<Gate> gate;
+    if (blGate) {
+        gate.emplace(store);
     }
     for (auto _ : state) {
         state.counters["per_second"] = grantsPerSecond(grantAtOnce(nProcesses, TOKENS, SECONDS, calls));
-        state.SetIterationTime(SECONDS);
     }
-}
-
-template <typename... Arguments>
-void add(const std::string& strName, Arguments... arguments)
-{
-    benchmark::RegisterBenchmark(("Gate/" + strName).c_str(), arguments...)
-        ->UseManualTime()
-        ->Unit(benchmark::kSecond)
-        ->Iterations(1);
 }
 
 } // namespace
 
 void registerBenchmarks()
 {
-    if (!getenv("VEMO_BENCH_REDIS_ALWAYS")) {
+    if (!g_szRedis) {
         throw std::runtime_error("to be run through with-peers, which starts Redis");
     }
     for (const size_t nClients : {1, 8, 64, 256}) {
         const std::string strClients = "/" + std::to_string(nClients);
-        add("write-ahead" + strClients, gate, Journal::WriteAhead, TOKENS, TOKENS, nClients);
-        add("rollback" + strClients, gate, Journal::Rollback, TOKENS, TOKENS, nClients);
-        add("redis" + strClients, redis, TOKENS, nClients);
+        add("Gate/write-ahead" + strClients, 1, gate, Journal::WriteAhead, TOKENS, TOKENS, nClients);
+        add("Gate/rollback" + strClients, 1, gate, Journal::Rollback, TOKENS, TOKENS, nClients);
+        add("Gate/redis" + strClients, 1, redis, TOKENS, nClients);
     }
-    add("one-token/64", gate, Journal::WriteAhead, TOKENS, 1, CLIENTS);
-    add("redis-one-token/64", redis, 1, CLIENTS);
-    add("many-tokens/64", gate, Journal::WriteAhead, MANY_TOKENS, TOKENS, CLIENTS);
-    add("nginx-at-once/64", behindNginx, false);
-    add("nginx/64", behindNginx, true);
-    add("calls/64", callers, Journal::Rollback, 64, Calls::Plain, false);
-    add("calls-locked/64", callers, Journal::Rollback, 64, Calls::Serialised, false);
-    add("call/1", callers, Journal::WriteAhead, 1, Calls::Plain, false);
-    add("call-beside/1", callers, Journal::WriteAhead, 1, Calls::Plain, true);
+    add("Gate/one-token/64", 1, gate, Journal::WriteAhead, TOKENS, 1, CLIENTS);
+    add("Gate/redis-one-token/64", 1, redis, 1, CLIENTS);
+    add("Gate/many-tokens/64", 1, gate, Journal::WriteAhead, MANY_TOKENS, TOKENS, CLIENTS);
+    add("Gate/nginx-at-once/64", 1, behindNginx, false);
+    add("Gate/nginx/64", 1, behindNginx, true);
+    add("Gate/calls/64", 1, callers, Journal::Rollback, 64, Calls::Plain, false);
+    add("Gate/calls-locked/64", 1, callers, Journal::Rollback, 64, Calls::Serialised, false);
+    add("Gate/call/1", 1, callers, Journal::WriteAhead, 1, Calls::Plain, false);
+    add("Gate/call-beside/1", 1, callers, Journal::WriteAhead, 1, Calls::Plain, true);
 }

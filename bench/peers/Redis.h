@@ -1,4 +1,4 @@
-// Calls of a Redis server. They throw std::runtime_error when they fail.
+// A Redis server that grants tokens. What fails throws std::runtime_error.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_REDIS_H
 #define VEMO_ACCESS_TOKEN_BENCH_REDIS_H
@@ -6,39 +6,39 @@
 #include <hiredis/hiredis.h>
 
 #include <memory>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
-namespace redis {
+#include "BareEngine.h"
 
-struct Deleter {
-    void operator()(redisContext* pContext) const { redisFree(pContext); }
-    void operator()(redisReply* pReply) const { freeReplyObject(pReply); }
+class Redis {
+public:
+    struct Deleter {
+        void operator()(redisContext* pContext) const { redisFree(pContext); }
+        void operator()(redisReply* pReply) const { freeReplyObject(pReply); }
+    };
+    typedef std::unique_ptr<redisContext, Deleter> Session;
+    typedef std::unique_ptr<redisReply, Deleter> Reply;
+    typedef std::vector<const char*> Words;
+
+    // Replaces all that the server has by the tokens 0 to nTokens - 1. It keeps these fields of each, of
+    // which "count" and "webapi_allow" are the first two; a grant answers with those from number nFirst on.
+    Redis(const char* szSocket, int nTokens, const Words& rgszField, int nFirst);
+
+    void create(const BareToken& token) const;
+
+    // The command that grants a use. The answer to a refusal is nil.
+    Words grant(const std::string& strTid, const char* szWebapi, const char* szMethod) const;
+
+    Session connect() const;
+    static Reply run(const Session& pSession, Words rgszWord);
+    Reply run(Words rgszWord) const { return run(m_pHeld, std::move(rgszWord)); }
+
+private:
+    const char* const m_szSocket;
+    const Words m_rgszField;
+    const Session m_pHeld;
+    std::string m_strGrant; // the digest of the script
 };
-
-typedef std::unique_ptr<redisContext, Deleter> Context;
-typedef std::unique_ptr<redisReply, Deleter> Reply;
-
-inline Context connect(const std::string& strSocket)
-{
-    Context pContext(redisConnectUnix(strSocket.c_str()));
-    if (!pContext || pContext->err) {
-        throw std::runtime_error("no connection to Redis at " + strSocket);
-    }
-    return pContext;
-}
-
-inline Reply run(redisContext& context, std::vector<const char*> rgszWord)
-{
-    const int nWords = static_cast<int>(rgszWord.size());
-    Reply pReply(static_cast<redisReply*>(redisCommandArgv(&context, nWords, rgszWord.data(), nullptr)));
-    if (!pReply || REDIS_REPLY_ERROR == pReply->type) {
-        throw std::runtime_error(std::string("Redis: ") + (pReply ? pReply->str : context.errstr));
-    }
-    return pReply;
-}
-
-} // namespace redis
 
 #endif
