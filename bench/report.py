@@ -64,6 +64,12 @@ GATE_GOALS = (  # what, beside what, the least ratio
 )
 
 
+SYSTEM_CALLS = {  # of the kinds that are shown
+    "openat": "opens", "close": "closes", "read": "reads", "pread64": "reads", "write": "writes", "pwrite64": "writes",
+    "fsync": "syncs", "fdatasync": "syncs", "fcntl": "locks", "unlink": "unlinks", "newfstatat": "stats",
+    "access": "stats",
+}
+KINDS_OF_CALLS = tuple(dict.fromkeys(SYSTEM_CALLS.values())) + ("others",)
 NOT_COUNTERS = ("family_index", "per_family_instance_index", "repetitions", "repetition_index", "threads", "iterations",
                 "real_time", "cpu_time")
 
@@ -81,6 +87,16 @@ def figures(content):
     return cells
 
 
+def system_calls(path, grants):
+    """Of one grant: those that strace has counted in a whole run, divided by its grants."""
+    numbers = dict.fromkeys(KINDS_OF_CALLS, 0)
+    with open(path, encoding="utf-8") as file:
+        for number, name in re.findall(r"^ *(\d+) (\w+)$", file.read(), re.MULTILINE):
+            if name not in ("total", "getuid"):  # the redirection of the database asks for the uid
+                numbers[SYSTEM_CALLS.get(name, "others")] += int(number)
+    return {kind: round(number / grants) for kind, number in numbers.items()}
+
+
 def measured(directory):
     """What a run measured, as results.json keeps it."""
     results = {}
@@ -91,6 +107,10 @@ def measured(directory):
             with open(path, encoding="utf-8") as file:
                 content = json.load(file)
             results[program] = figures(content)
+            if program == "breakdown":
+                for benchmark, cell in zip(content["benchmarks"], results[program].values()):
+                    calls = os.path.join(directory, benchmark["run_name"].replace("/", "-") + ".calls")
+                    cell.update(system_calls(calls, benchmark["iterations"]))
             context = context or content["context"]
     return {"machine": machine(context, "peers" in results), **results}
 
@@ -398,8 +418,7 @@ def main():
         ("Where the time of a grant goes",
          breakdown_table(results, "Grant (µs)", ("open", "purge", "select", "save", "close", "library", "total"), "_us")
          + "\n"
-         + breakdown_table(results, "System calls", ("opens", "closes", "reads", "writes", "syncs", "locks", "unlinks",
-                                                    "stats", "others"))),
+         + breakdown_table(results, "System calls", KINDS_OF_CALLS)),
         ("Growth", growth_table(results)),
         ("Indexes", indexes_table(results)),
         ("Contention", contention_table(results)),
