@@ -78,8 +78,6 @@ def figures(content):
     """The counters of each benchmark, by its name without the program's."""
     cells = {}
     for benchmark in content["benchmarks"]:
-        if benchmark.get("error_occurred"):
-            sys.exit(f"{benchmark['name']}: {benchmark['error_message']}")
         if benchmark.get("aggregate_name", "median") == "median":
             name = benchmark["run_name"].split("/iterations:")[0].partition("/")[2]
             cells[name] = {counter: float(f"{value:.5g}") for counter, value in benchmark.items()
@@ -160,35 +158,25 @@ def verdict(met):
     return f"met in {sum(met)} of {len(met)} runs" if any(met) else "missed"
 
 
-def output_of(command):
-    try:
-        return subprocess.run(command, capture_output=True, text=True, check=False).stdout.strip()
-    except FileNotFoundError:
-        return ""
-
-
 def machine(context, peers):
+    """What was measured, and on what."""
+    def told(command):
+        return subprocess.run(command, shell=True, capture_output=True, text=True, check=True).stdout.strip()
+
     with open("/proc/cpuinfo", encoding="utf-8") as file:
         processor = dict(re.findall(r"^(model name|cpu family|model)\s*: (.*)$", file.read(), re.MULTILINE))
-    name = f"{processor['model name']} (family {processor['cpu family']}, model {processor['model']})" \
-        if "model name" in processor else platform.machine()
+    name = "{model name} (family {cpu family}, model {model})".format_map(processor) if "model name" in processor else \
+        platform.machine()
     lines = [
         f"{name}, {context['num_cpus']} processors, Linux {platform.release().split('-')[0]}",
-        ", ".join(
-            f"{name}: {output_of(['df', '--output=fstype', os.environ.get(variable, default)]).split()[-1]}"
-            for name, variable, default in (
-                ("memory", "VEMO_BENCH_MEMORY", "/dev/shm"),
-                ("disk", "VEMO_BENCH_DISK", "/var/tmp"),
-            )
-        ),
+        f"memory: {told('df --output=fstype ${VEMO_BENCH_MEMORY:-/dev/shm} | tail -1')}, "
+        f"disk: {told('df --output=fstype ${VEMO_BENCH_DISK:-/var/tmp} | tail -1')}",
         f"libvemoaccesstoken {context['library']}, {context['compiler']}, SQLite {context['sqlite']}, "
         f"jsoncpp {context['jsoncpp']}",
     ]
     if peers:
-        redis = re.search(r"v=(\S+)", output_of(["redis-server", "--version"]))
-        directory = output_of(["pg_config", "--bindir"]).strip()
-        postgresql = re.search(r"[\d.]+", output_of([f"{directory}/postgres", "--version"]))
-        lines.append(f"Redis {redis.group(1)}, PostgreSQL {postgresql.group()}")
+        versions = told("redis-server --version; $(pg_config --bindir)/postgres --version")
+        lines.append("Redis {}, PostgreSQL {}".format(*re.search(r"v=(\S+).*\) (\S+)", versions, re.DOTALL).groups()))
     return lines
 
 
@@ -294,103 +282,64 @@ def breakdown_table(results, title, names, suffix=""):
                                    for key, cell in cells_of(results, "breakdown").items()])
 
 
-def save(figure, directory, name):
-    figure.tight_layout()
-    figure.savefig(os.path.join(directory, name), dpi=100)
-    pyplot.close(figure)
-
-
 def plot_lines(axes, cells, series, counter, factor=1, **options):
     """The counter of a series (the first parts of the benchmarks' names) over the number that comes last."""
     points = sorted((int(key[-1]), cell[counter] * factor) for key, cell in cells.items() if key[:-1] == series)
     return axes.plot(*zip(*points), **options)[0]
 
 
-def finish_panels(panels, titles, xlabel, base=None):
-    for axes, title in zip(panels, titles):
+def finish(figure, path, titles, xlabel, base):
+    for axes, title in zip(figure.axes, titles):
         axes.set_title(title)
         axes.grid(True, alpha=0.3)
         axes.set_xlabel(xlabel)
-        if base:
-            axes.set_xscale("log", base=base)
-            axes.xaxis.set_major_formatter("{x:.0f}")
+        axes.set_xscale("log", base=base)
+        axes.xaxis.set_major_formatter("{x:.0f}")
+    figure.tight_layout()
+    figure.savefig(path, dpi=100)
+    pyplot.close(figure)
 
 
-def plot_overhead(results, directory):
-    cells = cells_of(results, "overhead")
-    names = [operation for operation, place, tokens in cells if (place, tokens) == ("memory", "10")]
-    figure, axes = pyplot.subplots(figsize=(9, 4.5))
-    for offset, place in ((-0.2, "memory"), (0.2, "disk")):
-        values = [cells[(name, place, "10")]["ratio"] for name in names]
-        axes.bar([i + offset for i in range(len(names))], values, 0.38, label=place)
-        axes.axhline(GOAL_OVERHEAD[place], linestyle=":", color="C0" if place == "memory" else "C1")
-    axes.set_xticks(range(len(names)), names, rotation=30, ha="right")
-    axes.set_ylim(0.95, None)
-    axes.set_ylabel("time / time of the bare engine")
-    axes.set_title("The library beside the bare engine, 10 tokens (dotted: the goals)")
-    axes.legend()
-    save(figure, directory, "overhead.png")
-
-
-def plot_growth(results, directory):
+def plot_growth(results, path):
     figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5), sharey=True)
     for axes, place in zip(panels, ("memory", "disk")):
         for kind in ("plain", "indexed"):
             plot_lines(axes, cells_of(results, "growth"), (place, kind), "median_us", 1e-3, marker="o", label=kind)
         axes.set_yscale("log")
         axes.legend()
-    finish_panels(panels, ("A grant in memory", "A grant on disk"), "tokens", base=10)
     panels[0].set_ylabel("ms (median)")
-    save(figure, directory, "growth.png")
+    finish(figure, path, ("A grant in memory", "A grant on disk"), "tokens", base=10)
 
 
-def plot_contention(results, directory):
+def plot_contention(results, path):
     cells = cells_of(results, "contention")
     figure, panels = pyplot.subplots(2, 2, figsize=(9, 7))
-    panels = panels.flatten()
     for axes, counter, factor in zip(
-        panels, ("grants_per_second", "p99_us", "false_failures", "beyond_count"), (1, 1e-3, 100, 100)
+        panels.flatten(), ("grants_per_second", "p99_us", "false_failures", "beyond_count"), (1, 1e-3, 100, 100)
     ):
         for series in dict.fromkeys(key[:2] for key in cells):
             line = plot_lines(axes, cells, series, counter, factor, marker="o", label=", ".join(series))
             if counter == "p99_us":
                 plot_lines(axes, cells, series, "median_us", factor, linestyle=":", color=line.get_color())
-    panels[1].set_yscale("log")
-    panels[2].legend()
-    finish_panels(panels, ("grants a second", "a call: 99th percentile, dotted: median (ms)",
-                           "false failures (% of calls)", "uses beyond count (% of grants)"),
-                  "processes on one token", base=2)
-    save(figure, directory, "contention.png")
+                axes.set_yscale("log")
+    panels[1][0].legend()
+    finish(figure, path, ("grants a second", "a call: 99th percentile, dotted: median (ms)",
+                          "false failures (% of calls)", "uses beyond count (% of grants)"),
+           "processes on one token", base=2)
 
 
-def plot_gate(results, directory):
+def plot_gate(results, path):
     cells = cells_of(results, "gate")
     figure, panels = pyplot.subplots(1, 2, figsize=(9, 4.5))
     for series in ("write-ahead", "rollback", "redis"):
         label = "Redis, appendfsync always" if series == "redis" else f"gate, {series} journal"
         plot_lines(panels[0], cells, (series,), "per_second", marker="o", label=label)
-        line = plot_lines(panels[1], cells, (series,), "p99_us", 1e-3, marker="o", label=label)
+        line = plot_lines(panels[1], cells, (series,), "p99_us", 1e-3, marker="o")
         plot_lines(panels[1], cells, (series,), "median_us", 1e-3, linestyle=":", color=line.get_color())
     for axes in panels:
         axes.set_yscale("log")
     panels[0].legend()
-    finish_panels(panels, ("grants a second", "a grant: 99th percentile, dotted: median (ms)"), "clients", base=2)
-    save(figure, directory, "gate.png")
-
-
-def plot_peers(results, directory):
-    cells = cells_of(results, "peers")
-    names = [slug for slug in PEERS if (slug,) in cells][::-1]
-    figure, axes = pyplot.subplots(figsize=(9, 5))
-    medians = [cells[(name,)]["median_us"] for name in names]
-    highs = [cells[(name,)]["p99_us"] for name in names]
-    axes.barh(range(len(names)), medians, color=["C0" if name.startswith("ours") else "C7" for name in names])
-    axes.plot(highs, range(len(names)), "k|", markersize=12, label="99th percentile")
-    axes.set_yticks(range(len(names)), names)
-    axes.set_xscale("log")
-    axes.set_xlabel("µs of a grant (bar: median)")
-    axes.legend()
-    save(figure, directory, "peers.png")
+    finish(figure, path, ("grants a second", "a grant: 99th percentile, dotted: median (ms)"), "clients", base=2)
 
 
 def main():
@@ -423,15 +372,13 @@ def main():
         ("Indexes", indexes_table(results)),
         ("Contention", contention_table(results)),
     ]
-    plot_overhead(results, directory)
-    plot_growth(results, directory)
-    plot_contention(results, directory)
     if "peers" in results:
         sections.append(("Peers", peers_table(results)))
-        plot_peers(results, directory)
     if "gate" in results:
         sections.append(("The gate", gate_table(results)))
-        plot_gate(results, directory)
+    for name, plot in (("growth", plot_growth), ("contention", plot_contention), ("gate", plot_gate)):
+        if name in results:
+            plot(results, os.path.join(directory, name + ".png"))
     with open(os.path.join(directory, "report.md"), "w", encoding="utf-8") as file:
         file.write("\n".join(f"## {title}\n\n{text}" for title, text in sections))
     print(goals)
