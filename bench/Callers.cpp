@@ -40,7 +40,7 @@ GrantCall timedGrant(int nToken, Calls calls)
         if (Calls::Serialised == calls) {
             lock.emplace();
         }
-        call.blGranted = 0 == VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken);
+        call.blGranted = 0 == VemoAccessTokenGrantEx(strTid, WEBAPI, METHOD, jToken);
     }
     call.dEnd = now();
     call.blSpent = nWritten != g_nWritten;

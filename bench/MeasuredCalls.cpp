@@ -27,10 +27,10 @@ void useFreshToken(Call& call)
 {
     removeFreshTokens();
     call.token = freshToken(1000);
-    Json::Value& jMethods = call.jArgument["webapi_allow"][webapi()]["method"];
+    Json::Value& jMethods = call.jArgument["webapi_allow"][WEBAPI]["method"];
     jMethods.clear();
     jMethods.append("get");
-    jMethods.append(method());
+    jMethods.append(METHOD);
     call.jArgument["bind_sid"] = call.token.strBindSid;
     call.jArgument["deadline"] = 86400;
     call.jArgument["count"] = static_cast<Json::Int64>(call.token.nCount);
@@ -66,7 +66,7 @@ void holdConnectionToUpdate(Call& call)
 
 int grantEx(Call& call)
 {
-    return VemoAccessTokenGrantEx(call.token.strTid, webapi(), method(), call.jResult);
+    return VemoAccessTokenGrantEx(call.token.strTid, WEBAPI, METHOD, call.jResult);
 }
 
 // A bare engine that has purged, as all exported functions do except the deletion by session.
@@ -110,14 +110,11 @@ const std::vector<Operation>& operations()
         {"GrantEx.deleted", storeFreshToken<1>, grantEx, 0, bareGrant},
         {"GrantEx.unlimited", storeFreshToken<-1>, grantEx, 0, bareGrant},
         {"GrantEx.refused", useStoredToken,
-         [](Call& call) {
-             return VemoAccessTokenGrantEx(call.token.strTid, webapi(), "delete", call.jResult);
-         },
+         [](Call& call) { return VemoAccessTokenGrantEx(call.token.strTid, WEBAPI, "delete", call.jResult); },
          -1, [](Call& call) { purged(BareEngine()).read(call.token.strTid); }},
         {"Grant.saved", storeFreshToken<1000>,
          [](Call& call) {
-             return VemoAccessTokenGrant(call.token.strTid, webapi(), method(), call.szUser,
-                                         sizeof(call.szUser));
+             return VemoAccessTokenGrant(call.token.strTid, WEBAPI, METHOD, call.szUser, sizeof(call.szUser));
          },
          0, bareGrant},
         {"DeleteByTid", storeFreshToken<1>,
@@ -135,10 +132,8 @@ const std::vector<Operation>& operations()
          [](Call& call) { return call.pApi->tokenUpdateByTid(call.token.strTid, call.jArgument); }, 0,
          nullptr},
         {"tokenGrant.saved", holdConnection,
-         [](Call& call) {
-             return call.pApi->tokenGrant(call.token.strTid, webapi(), method(), call.jResult);
-         },
-         0, nullptr},
+         [](Call& call) { return call.pApi->tokenGrant(call.token.strTid, WEBAPI, METHOD, call.jResult); }, 0,
+         nullptr},
     };
     return rgOperation;
 }

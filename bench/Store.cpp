@@ -119,13 +119,3 @@ std::map<std::string, std::string> fieldsOf(const BareToken& token)
             {"webapi_allow", token.strWebapiAllow},
             {"extra", token.strExtra}};
 }
-
-const char* webapi()
-{
-    return "Example.File";
-}
-
-const char* method()
-{
-    return "list";
-}

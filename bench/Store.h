@@ -54,7 +54,7 @@ std::map<std::string, std::string> fieldsOf(const BareToken& token);
 const int FRESH = 100000000; // the number of a token that no store holds by itself
 
 // An API and a method that the tokens allow.
-const char* webapi();
-const char* method();
+const char* const WEBAPI = "Example.File";
+const char* const METHOD = "list";
 
 #endif

@@ -17,13 +17,14 @@
 
 #include <array>
 #include <chrono>
+#include <memory>
 #include <numeric>
 #include <optional>
 #include <stdexcept>
 #include <string>
 
 #include "AccessTokenApi.h"
-#include "Bystander.h"
+#include "Process.h"
 #include "Run.h"
 #include "Samples.h"
 #include "Store.h"
@@ -75,19 +76,19 @@ bool grant(AccessTokenApi* pHeld, std::string& strTid)
     Json::Value jToken;
     if (pHeld) {
         pHeld->cleanExpireToken(false);
-        return 0 == pHeld->tokenGrant(strTid, webapi(), method(), jToken);
+        return 0 == pHeld->tokenGrant(strTid, WEBAPI, METHOD, jToken);
     }
-    return 0 == VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken);
+    return 0 == VemoAccessTokenGrantEx(strTid, WEBAPI, METHOD, jToken);
 }
 
 void breakdown(benchmark::State& state, bool blHeld, Place place, bool blWriteAheadLog)
 {
     Store store(place);
     store.grow(TOKENS);
-    std::optional<Bystander> bystander;
+    std::unique_ptr<Process> pBystander;
     if (blWriteAheadLog) {
         store.useWriteAheadLog();
-        bystander.emplace();
+        pBystander = startBystander();
     }
     std::optional<AccessTokenApi> held;
     if (blHeld) {

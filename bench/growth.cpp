@@ -28,7 +28,7 @@ void grant(int nToken, Samples& samples)
     std::string strTid = tokenOf(nToken).strTid;
     Json::Value jToken;
     int nResult = -1;
-    samples.time([&] { nResult = VemoAccessTokenGrantEx(strTid, webapi(), method(), jToken); });
+    samples.time([&] { nResult = VemoAccessTokenGrantEx(strTid, WEBAPI, METHOD, jToken); });
     if (0 != nResult) {
         throw std::runtime_error("the grant failed");
     }

@@ -4,7 +4,6 @@
 // All data is on the disk. Unless stated otherwise there are 1000 tokens with many uses. Clients run in a
 // closed loop. The program fails unless the gate has spent exactly one use for each reply.
 
-#include <signal.h>
 #include <unistd.h>
 
 #include <cstdlib>
@@ -16,7 +15,7 @@
 #include "../peers/Redis.h"
 #include "Callers.h"
 #include "Load.h"
-#include "Processes.h"
+#include "Process.h"
 #include "Run.h"
 #include "Store.h"
 
@@ -54,38 +53,14 @@ Load httpLoad(const std::string& strSocket, int nTokens, const std::string& strT
     return load;
 }
 
-// A program that runs in the directory of a store, as long as the object.
-class Program {
-public:
-    Program(const Store& store, std::vector<const char*> rgszWord)
-        : m_pid(startProcess([&] {
-              rgszWord.push_back(nullptr);
-              if (0 == chdir(store.directory().c_str())) {
-                  execvp(rgszWord[0], const_cast<char* const*>(rgszWord.data()));
-              }
-          }))
-    {
-    }
-    ~Program()
-    {
-        kill(m_pid, SIGTERM);
-        endsWell(m_pid);
-    }
-    Program(const Program&) = delete;
-    Program& operator=(const Program&) = delete;
-
-    pid_t pid() const { return m_pid; }
-
-private:
-    const pid_t m_pid;
-};
-
 // A gate that has opened its store.
 class Gate {
 public:
     explicit Gate(const Store& store)
-        : m_strSocket(store.directory() + "/calls"),
-          m_program(store, {VEMO_BENCH_GATE, "--socket", m_strSocket.c_str(), "--user", "nobody"})
+        : m_strSocket(store.directory() + "/calls"), m_process([this] {
+              execl(VEMO_BENCH_GATE, VEMO_BENCH_GATE, "--socket", m_strSocket.c_str(), "--user", "nobody",
+                    nullptr);
+          })
     {
         run(load(1), 1, 0);
     }
@@ -93,13 +68,13 @@ public:
     // Clients that use the first nTokens tokens.
     Load load(int nTokens) const
     {
-        return httpLoad(m_strSocket, nTokens, std::string("/grant/") + webapi() + "/" + method(), "\r\n\r\n");
+        return httpLoad(m_strSocket, nTokens, std::string("/grant/") + WEBAPI + "/" + METHOD, "\r\n\r\n");
     }
 
     // The memory of its two processes, in MB.
     double memory() const
     {
-        const std::string strPid = std::to_string(m_program.pid());
+        const std::string strPid = std::to_string(m_process.pid());
         std::string strChild;
         std::ifstream("/proc/" + strPid + "/task/" + strPid + "/children") >> strChild;
         return 1.024e-3 *
@@ -108,7 +83,7 @@ public:
 
 private:
     const std::string m_strSocket;
-    const Program m_program;
+    const Process m_process;
 };
 
 // Lets the clients ask, and returns the number of replies. Each grants a use.
@@ -161,7 +136,11 @@ void behindNginx(benchmark::State& state, bool blGate)
     const DiskStore store(Journal::WriteAhead, TOKENS);
     const Gate gate(store);
     std::ofstream(store.directory() + "/page") << "a page\n";
-    const Program nginx(store, {"nginx", "-p", ".", "-c", VEMO_BENCH_NGINX});
+    const Process nginx([&] {
+        if (0 == chdir(store.directory().c_str())) {
+            execlp("nginx", "nginx", "-p", ".", "-c", VEMO_BENCH_NGINX, nullptr);
+        }
+    });
     const long long nBefore = usesLeft();
     const std::string strSocket = store.directory() + (blGate ? "/behind-gate" : "/behind-at-once");
     const long long nReplies = ask(state, httpLoad(strSocket, TOKENS, "/page", "a page\n"), CLIENTS);
@@ -175,7 +154,7 @@ void redis(benchmark::State& state, int nUsed, size_t nClients)
     Load load = {g_szRedis, "*2\r\n", "\r\n", {}};
     for (int i = 0; i < nUsed; ++i) {
         const std::string strTid = tokenOf(i).strTid;
-        Redis::Words rgszWord = server.grant(strTid, webapi(), method());
+        Redis::Words rgszWord = server.grant(strTid, WEBAPI, METHOD);
         char* szRequest = nullptr;
         const auto nWords = static_cast<int>(rgszWord.size());
         const auto cbRequest = redisFormatCommandArgv(&szRequest, nWords, rgszWord.data(), nullptr);

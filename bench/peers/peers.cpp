@@ -13,8 +13,8 @@
 #include <stdexcept>
 
 #include "AccessTokenApi.h"
-#include "Bystander.h"
 #include "Contender.h"
+#include "Process.h"
 #include "Redis.h"
 #include "Run.h"
 #include "Samples.h"
@@ -35,7 +35,7 @@ enum class Tuning { Plain, Tuned };
 
 struct Ours {
     Store store{Place::Disk};
-    std::optional<Bystander> bystander;
+    std::unique_ptr<Process> pBystander;
     std::optional<AccessTokenApi> held;
 
     long long grant(std::string& strTid, const char* szWebapi, const char* szMethod)
@@ -59,7 +59,7 @@ Contender makeOurs(Tuning tuning, Connection connection)
         pOurs->store.useWriteAheadLog();
     }
     if (Connection::PerCallBesideAnother == connection) {
-        pOurs->bystander.emplace();
+        pOurs->pBystander = startBystander();
     } else if (Connection::Held == connection) {
         pOurs->held.emplace();
     }
@@ -67,7 +67,7 @@ Contender makeOurs(Tuning tuning, Connection connection)
     // phase is measured.
     std::string strTid = tokenOf(0).strTid;
     for (int i = 0; i < 400; ++i) {
-        pOurs->grant(strTid, webapi(), method());
+        pOurs->grant(strTid, WEBAPI, METHOD);
     }
     return {[](const BareToken& token) { BareEngine().create(token); },
             [pOurs](std::string& strToken, const char* szWebapi, const char* szMethod) {
@@ -127,16 +127,16 @@ void verify(const Entry& entry)
     };
     token.nCount = USES;
     contender.create(token);
-    require(REFUSED == grant("Example.Other", method()), entry, "refuse a wrong API");
-    require(REFUSED == grant(webapi(), "delete"), entry, "refuse a wrong method");
+    require(REFUSED == grant("Example.Other", METHOD), entry, "refuse a wrong API");
+    require(REFUSED == grant(WEBAPI, "delete"), entry, "refuse a wrong method");
     for (long long nLeft = USES - 1; 0 <= nLeft; --nLeft) {
-        require(std::max(1LL, nLeft) == grant(webapi(), method()), entry, "count each use");
+        require(std::max(1LL, nLeft) == grant(WEBAPI, METHOD), entry, "count each use");
     }
-    require(REFUSED == grant(webapi(), method()), entry, "delete the token with its last use");
+    require(REFUSED == grant(WEBAPI, METHOD), entry, "delete the token with its last use");
 
     token.nDeadline = time(nullptr) - 1;
     contender.create(token);
-    require(REFUSED == grant(webapi(), method()), entry, "refuse an expired token");
+    require(REFUSED == grant(WEBAPI, METHOD), entry, "refuse an expired token");
 }
 
 void measure(benchmark::State& state, const Entry& entry)
@@ -151,7 +151,7 @@ void measure(benchmark::State& state, const Entry& entry)
             contender.create(token);
         }
         long long nCount = REFUSED;
-        samples.time([&] { nCount = contender.grant(token.strTid, webapi(), method()); });
+        samples.time([&] { nCount = contender.grant(token.strTid, WEBAPI, METHOD); });
         require(REFUSED != nCount, entry, "grant");
     }
     state.counters["median_us"] = samples.median();
