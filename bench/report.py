@@ -113,17 +113,6 @@ def measured(directory):
     return {"machine": machine(context, "peers" in results), **results}
 
 
-def compact(results):
-    """The same as JSON, a line for each benchmark."""
-    programs = []
-    for name, cells in results.items():
-        lines = [json.dumps(cell) for cell in cells] if name == "machine" else \
-            [f"{json.dumps(key)}: {json.dumps(cell)}" for key, cell in cells.items()]
-        opening, closing = "[]" if name == "machine" else "{}"
-        programs.append(f"{json.dumps(name)}: {opening}\n" + ",\n".join(lines) + "\n" + closing)
-    return "{" + ",\n".join(programs) + "}\n"
-
-
 def cells_of(results, program):
     """The same by the parts of the names."""
     return {tuple(name.split("/")): cell for name, cell in results.get(program, {}).items()}
@@ -348,7 +337,7 @@ def main():
     directory = sys.argv[1]
     results = measured(directory)
     with open(os.path.join(directory, "results.json"), "w", encoding="utf-8") as file:
-        file.write(compact(results))
+        file.write(json.dumps(results).replace("}, ", "},\n") + "\n")  # a line for each benchmark
     runs = [results]
     for path in sys.argv[2:]:
         with open(path, encoding="utf-8") as file:
