@@ -52,11 +52,9 @@ void record(const std::string& strName, const std::string& strArguments = "")
 std::string withoutLineNumbers(std::string strText)
 {
     const std::string strSuffix = ".cpp:";
-    size_t nAt = strText.find(strSuffix);
-    while (std::string::npos != nAt) {
+    for (size_t nAt = 0; std::string::npos != (nAt = strText.find(strSuffix, nAt));) {
         nAt += strSuffix.size();
         strText.replace(nAt, strText.find_first_not_of("0123456789", nAt) - nAt, "#");
-        nAt = strText.find(strSuffix, nAt);
     }
     return strText;
 }
