@@ -57,12 +57,7 @@ namespace {
 
 class SerialisingLock : public ::testing::Test {
 protected:
-    // Takes the lock and releases it. Returns 0, or the errno why it could not be taken.
-    template <typename... Wait>
-    int lockOnce(Wait... wait) const
-    {
-        return lockOnce(m_strFile, wait...);
-    }
+    // Takes the lock of a file and releases it. Returns 0, or the errno why it could not be taken.
     template <typename... Wait>
     static int lockOnce(const std::string& strFile, Wait... wait)
     {
@@ -74,7 +69,7 @@ protected:
         }
     }
 
-    bool isHeld() const { return ETIMEDOUT == lockOnce(std::chrono::milliseconds(0)); }
+    bool isHeld() const { return ETIMEDOUT == lockOnce(m_strFile, std::chrono::milliseconds(0)); }
 
     const StormCalls m_calls{Calls::Serialised};
     const std::string m_strFile = m_calls.lockFile();
@@ -168,9 +163,9 @@ TEST_F(SerialisingLock, TellsWhyItCannotBeHadAndLeavesNothingOpen)
     const std::string strBefore = processState();
     for (const auto& row : rows) {
         g_rgErrors = row.rgErrors;
-        EXPECT_EQ(row.nExpected, lockOnce());
+        EXPECT_EQ(row.nExpected, lockOnce(m_strFile));
         g_rgErrors = row.rgErrors;
-        EXPECT_EQ(row.nExpected, lockOnce(std::chrono::milliseconds(0)));
+        EXPECT_EQ(row.nExpected, lockOnce(m_strFile, std::chrono::milliseconds(0)));
     }
     EXPECT_EQ(strBefore, processState());
 }
@@ -191,19 +186,19 @@ TEST_F(SerialisingLock, MayHaveTheFirstDescriptor)
 // Others could hold a lock forever on a file that they can open.
 TEST_F(SerialisingLock, RefusesAFileThatIsNotItsOwnersAlone)
 {
-    EXPECT_EQ(0, lockOnce());
+    EXPECT_EQ(0, lockOnce(m_strFile));
     for (const mode_t mode : {0644, 0620, 0604, 0601}) {
         ASSERT_EQ(0, chmod(m_strFile.c_str(), mode));
-        EXPECT_EQ(EPERM, lockOnce());
+        EXPECT_EQ(EPERM, lockOnce(m_strFile));
     }
     ASSERT_EQ(0, chmod(m_strFile.c_str(), 0700));
-    EXPECT_EQ(0, lockOnce());
+    EXPECT_EQ(0, lockOnce(m_strFile));
     if (0 == getuid() && 0 == chown(m_strFile.c_str(), 1, 1)) {
-        EXPECT_EQ(EPERM, lockOnce());
+        EXPECT_EQ(EPERM, lockOnce(m_strFile));
     }
     ASSERT_EQ(0, unlink(m_strFile.c_str()));
     ASSERT_EQ(0, mkfifo(m_strFile.c_str(), 0600));
-    EXPECT_EQ(EPERM, lockOnce());
+    EXPECT_EQ(EPERM, lockOnce(m_strFile));
 }
 
 TEST_F(SerialisingLock, WaitsNoLongerThanIsAsked)
@@ -214,10 +209,10 @@ TEST_F(SerialisingLock, WaitsNoLongerThanIsAsked)
         const std::chrono::milliseconds wait(nWait);
         const auto start = Clock::now();
         g_nLocks = 0;
-        EXPECT_EQ(ETIMEDOUT, lockOnce(wait));
+        EXPECT_EQ(ETIMEDOUT, lockOnce(m_strFile, wait));
         EXPECT_LE(wait, Clock::now() - start);
         EXPECT_EQ(nTries, g_nLocks);
     }
     lock.reset();
-    EXPECT_EQ(0, lockOnce(std::chrono::milliseconds(0)));
+    EXPECT_EQ(0, lockOnce(m_strFile, std::chrono::milliseconds(0)));
 }
