@@ -109,13 +109,17 @@ TEST(LogLines, AreEscapedForATerminalAlone)
     EXPECT_EQ("\\xc3\\xa4\\x1b", tool::errorLine("\u00e4\x1b"));
 }
 
-// As if another command ran in the same process.
+// To another stdout than the program began with, too.
 TEST(LogLines, GiveStdoutBack)
 {
     FILE* const pBefore = stdout;
+    FILE* const pOther = tmpfile();
+    stdout = pOther;
     {
         const tool::LogLines logLines(false);
-        EXPECT_NE(pBefore, stdout);
+        EXPECT_NE(pOther, stdout);
     }
-    EXPECT_EQ(pBefore, stdout);
+    FILE* const pAfter = stdout;
+    stdout = pBefore;
+    EXPECT_EQ(pOther, pAfter);
 }
