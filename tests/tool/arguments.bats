@@ -13,7 +13,7 @@ expired-|deadline = 1
 END
 }
 
-@test "the first mistake is told, and nothing is done" {
+@test "the first mistake is reported, and nothing is done" {
     three_tokens
     which="say which tokens: by TID, by options that select, or --all"
     alone="repeat with --yes: there is nobody to ask"

@@ -72,7 +72,7 @@ doctor|
 TABLE
 }
 
-@test "of many tokens, the number is told" {
+@test "for many tokens, a line says only how many" {
     setup_log
     many_rows 6 "deadline = 5"
     told >/dev/null
@@ -91,7 +91,7 @@ import: 6 tokens created
 purge: 6 tokens deleted" ]
 }
 
-@test "who has become root by sudo is named" {
+@test "a line names the user who became root by sudo" {
     setup_log
     tool init
     told >/dev/null
@@ -103,7 +103,7 @@ purge: 6 tokens deleted" ]
     done
 }
 
-@test "a change is told even if the command fails or is ended then" {
+@test "a change has its line even if the command then fails or is ended" {
     setup_log
     row token---
     told >/dev/null

@@ -19,7 +19,7 @@ checks() {
     [ "$(state)" = "$before" ]
 }
 
-@test "check tells whether a call would be granted, and why not; it spends and purges nothing" {
+@test "check says whether a call would be granted, and why not; it spends and purges nothing" {
     rows <<'END'
 token---|webapi_allow = '{"Äpi":{"method":["list","-x","a b","\u001b\n"]},"Bare":{"method":[]},"create":{"method":[]}}'
 expired-|deadline = strftime('%s') - 5
@@ -54,7 +54,7 @@ endless- Api get|allowed
 END
 }
 
-@test "a refused grant says why, as check does, and spends nothing; a malformed token is told where the call touches that" {
+@test "a refused grant says why, as check does, and spends nothing; malformed data are reported where the call reads them" {
     tool init
     while IFS='~' read -r columns arguments result; do
         sql "DELETE FROM token"

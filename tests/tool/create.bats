@@ -11,7 +11,7 @@ column() {
 # An id of the caller's own: as short as may be.
 OWN=own-$(printf '%0123d' 0)
 
-@test "create prints the id alone, and the library's defaults hold" {
+@test "create prints the id alone, and uses the library's defaults" {
     tool init
     succeeds create --uid 1000 --function VPN --allow Api
     [[ $output =~ ^[0-9A-Za-z]{127,255}$ ]]
@@ -64,7 +64,7 @@ TABLE
     [ "$output" = "$(sql "SELECT tid FROM token")" ]
 }
 
-@test "what is seldom meant is told, and done" {
+@test "create warns of what is seldom meant, and does it" {
     tool init
     while IFS='|' read -r arguments doubt; do
         eval "run_tool create --uid 0 --function VPN $arguments"
@@ -88,7 +88,7 @@ vemo-access-token: --allow: "c d" holds a blank, which is part of the name' ]
     expect 2 "" "vemo-access-token: --tid: there is a token with this id already"
 }
 
-@test "create takes an id of the caller's own" {
+@test "create takes an id that the caller chooses" {
     tool init
     gives "$OWN" create --uid 0 --function VPN --allow Api --tid "$OWN"
     gives "${OWN/own/two}" create --uid 0 --function VPN --allow Api --tid - <<<"${OWN/own/two}"
@@ -102,7 +102,7 @@ $odd
 $(cat "$DIR/tid")" ]
 }
 
-@test "create purges expired tokens, and may use the id of one again" {
+@test "create purges expired tokens, and can use the id of one again" {
     a_token --tid "$OWN" --uses 5
     expired=$(a_token)
     lasting=$(a_token)

@@ -32,7 +32,7 @@ paths() {
         "$REAL_DB-journal rw" "$REAL_DB-shm rwk" "$REAL_DB-wal rw")" ]
 }
 
-@test "systemd has nothing to say against the units, and leaves the tasks little of root's power" {
+@test "systemd finds nothing wrong with the units, and leaves the tasks little of root's power" {
     command -v systemd-analyze >/dev/null || skip "systemd-analyze is not installed"
     mkdir "$DIR/units" "$DIR/units/service.service.d"
     cp "$DEPLOYMENT/systemd/uses-access-tokens.conf" "$DIR/units/service.service.d"
@@ -52,7 +52,7 @@ paths() {
     [[ $output == *"Overall exposure level"* ]]
 }
 
-@test "AppArmor takes the abstraction" {
+@test "AppArmor accepts the abstraction" {
     command -v apparmor_parser >/dev/null || skip "apparmor_parser is not installed"
     cp -r /etc/apparmor.d "$DIR/profiles"
     cp "$DEPLOYMENT/apparmor/vemo-access-token" "$DIR/profiles/abstractions"
@@ -63,7 +63,7 @@ paths() {
     [ -s "$DIR/compiled" ]
 }
 
-@test "metrics appear at once, readable for the collector" {
+@test "metrics appear in one step, and the collector can read them" {
     a_token >/dev/null
     mkdir "$DIR/collected"
     echo old >"$DIR/elsewhere"
@@ -83,7 +83,7 @@ paths() {
     cmp "$DIR/collected/vemo-access-token.prom" "$DIR/before"
 }
 
-@test "a notice tells of the tokens that expire soon" {
+@test "a notice says which tokens expire soon" {
     a_token --ttl 30d >/dev/null
     task expiry-notice
     [ "$status-$output$stderr" = 0- ]
@@ -162,7 +162,7 @@ TABLE
     [ "$(tool list --field tid --show-ids | sort)" = "$(sort <<<"$others")" ]
 }
 
-@test "the end of a session tells of tokens that it could not revoke, and does not wait for them" {
+@test "the end of a session reports tokens that it could not revoke, and does not wait for them" {
     boot=$(</proc/sys/kernel/random/boot_id)
     a_token --bind-sid "$boot-42" >/dev/null
     start=$SECONDS

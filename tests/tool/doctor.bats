@@ -120,7 +120,7 @@ END
     cmp "$DB" "$DIR/before"
 }
 
-@test "what is worth knowing of a sound store is told in numbers, and is no finding" {
+@test "notes about a sound store are numbers, and no findings" {
     now="strftime('%s', 'now')"
     rows <<END
 plain
@@ -153,7 +153,7 @@ no findings'
 
 # The place.
 
-@test "what is missing of the store is made" {
+@test "parts of the store that are missing are made" {
     no_store="there is no directory $REAL_DIRECTORY|there is no store yet: no token can be created, and every call fails"
     no_file="there is no database $REAL_DB|$NO_TOKENS"
     no_table="the database has no table of tokens|every call fails: the table is made together with the file, and never later"
@@ -207,7 +207,7 @@ TABLE
     [ "$(stat -c '%u %g' session)" = "0 1" ]
 }
 
-@test "what stands in the place of the directory, the file or a journal is left to the administrator, and not opened" {
+@test "anything else in place of the directory, the file or a journal is left to the administrator, and not opened" {
     file="programs work on another file than this one, or on none|find out who made it; move the database to this name"
     hide='sql "UPDATE token SET deadline = 0"' # which would be a finding
     remove="find out who made it; remove it while no program runs"
@@ -271,7 +271,7 @@ error: $REAL_DB is immutable|$NO_CHANGE|chattr -i $REAL_DB" --repair || wrong=1
     expect_sound
 }
 
-@test "a file or a directory that cannot be written to is left to the administrator, and a repair that fails is told" {
+@test "a place that cannot be written to is left to the administrator, and a repair that fails is reported" {
     in_namespace '"$1" init >/dev/null && chmod 0755 "$3" && chmod 0750 "$2" && mount --bind "$2" "$2" &&
         mount -o remount,bind,ro "$2" && "$1" doctor --repair' "$TOOL" "$REAL_DB" "$REAL_DIRECTORY"
     found 5 "repaired: $REAL_DIRECTORY has mode 0755|$NOT_PRIVATE
@@ -297,7 +297,7 @@ error: /usr/vemo is a symbolic link|the tokens stand elsewhere, or nowhere\
 |find out who made it; move the directory to a directory of that name"
 }
 
-@test "a repair that does not help is told, and not called one" {
+@test "a repair that does not help is reported, and not called one" {
     echo '#include <errno.h>
         int chmod() { return 0; } int fchmod() { return 0; } int fchmodat() { return 0; }
         int unlinkat() { errno = EPERM; return -1; }' |
@@ -321,7 +321,7 @@ error: there is no database $REAL_DB|$NO_TOKENS|vemo-access-token init" --repair
     [ "$status $stderr" = "5 vemo-access-token: cannot repair: backup.part: Operation not permitted" ]
 }
 
-@test "what others change in the middle of a repair is not followed" {
+@test "a repair does not follow what others change in the middle of it" {
     while IFS='|' read -r between reason; do
         fresh
         chmod 0640 "$DB"
@@ -348,7 +348,7 @@ rm|
 TABLE
 }
 
-@test "who can change a directory above in the middle of a repair gets nothing from root" {
+@test "a user who can change a directory above gets nothing from root in the middle of a repair" {
     in_namespace '"$1" init >/dev/null && chmod 0640 "$2" && install -m 0640 /dev/null "$2-journal" &&
         VEMO_TEST_CALLS="fchmod|chmod 0777 /usr/vemo/etc" "$1" doctor --repair || stat -c %a "$2"' "$TOOL" "$REAL_DB"
     [ "${lines[-1]}" = 640 ]
@@ -372,7 +372,7 @@ TABLE
 error: $REAL_DIRECTORY: Too many levels of symbolic links|$cause"
 }
 
-@test "what an export into the private directory left behind is removed, but not while it is written" {
+@test "a file that an export left in the private directory is removed, but not while it is written" {
     part=$VEMO_REDIRECT_DIR/backup.part
     mends <<<"install -m 0600 /dev/null $part; touch session/x|warning: $REAL_DIRECTORY/backup.part was left behind|an export was cut off; the file can hold whole ids|remove it"
     [ ! -e "$part" ]
@@ -390,7 +390,7 @@ $undone" ]
     [ "${#lines[@]}" -eq 120 ]
 }
 
-@test "what is left of a file system is enough for a change and for another file, or is not" {
+@test "the room that a file system has left is enough for a change and for another file, or is a finding" {
     leaves <<TABLE
 export VEMO_TEST_ROOM="65535 1 2 1"|error: the file system of $REAL_DIRECTORY has no room for a change|$NO_CHANGE|remove what is not needed there: "df $REAL_DIRECTORY" tells how full it is
 export VEMO_TEST_ROOM="16 4096 1 0"|error: the file system of $REAL_DIRECTORY has no room for another file|$NO_CHANGE|remove what is not needed there: "df -i $REAL_DIRECTORY" tells how full it is
@@ -474,7 +474,7 @@ TABLE
     leaves <"$DIR.table"
 }
 
-@test "the library's table in other words is none of another kind, and what only looks like it is" {
+@test "the library's table in other words is no other table, but one that only looks like it is" {
     row aaaaaaaa
     made=$(sql "SELECT sql FROM sqlite_schema WHERE name = 'token'")
     for comment in '/*(*/' $'--(\n'; do
@@ -580,7 +580,7 @@ expect_undone() {
     [ "$(sql "SELECT function, count(*) FROM token GROUP BY 1; PRAGMA integrity_check" | xargs)" = "VPN|40 ok" ]
 }
 
-@test "a journal that was left behind is a finding, and undone by looking" {
+@test "a journal that was left behind is a finding, and reading the database undoes the half change" {
     journal="$REAL_DB-journal was left behind|a program or the machine stopped in the middle of a change"
     half_change
     finds 5 "warning: $journal|none needed: reading the database has just undone the half change"
@@ -596,7 +596,7 @@ expect_undone() {
     expect_undone
 }
 
-@test "an old journal that is empty, or that its program has ended, holds no half change" {
+@test "an old journal that is empty, or whose change has ended, holds no half change" {
     row aaaaaaaa
     install -m 0700 /dev/null "$DB-journal"
     touch -d "1 hour ago" "$DB-journal"
@@ -732,7 +732,7 @@ END
     expect_left aaaaaaaa bbbbbbbb
 }
 
-@test "texts are made of bytes in place of a text, which no look-up finds" {
+@test "bytes in place of a text, which no look-up finds, are made a text" {
     bytes="bytes where there should be a text in 3 tokens (bytes-1x, bytes-2x, bytes-3x)|no look-up by that field finds such a token"
     rows <<'END'
 sound
@@ -757,7 +757,7 @@ END
     sql ".dump" | diff "$DIR/before" -
 }
 
-@test "a backlog of expired tokens is purged, but not what was meant to last for ever" {
+@test "a backlog of expired tokens is purged, but not tokens that were meant to last for ever" {
     backlog="expired for more than an hour: 6 tokens (expired1, expired2, expired3, expired4, expired5, ...)|no program has called since, or its purges fail"
     never='warning: a deadline of 0 or less in 1 token (meant-to)|there is no value for "never": the next purge deletes them|update --ttl gives them time'
     rows <<'END'

@@ -61,7 +61,7 @@ END
     fails 1 "refused: unknown token" grant - Api get < <(printf '%0100000d' 0)
 }
 
-@test "a grant purges expired tokens, also when it refuses, and says of them that they have expired" {
+@test "a grant purges expired tokens, also when it refuses, and says when the token has expired" {
     rows <<'END'
 token---
 past----|deadline = strftime('%s') - 5, count = -1

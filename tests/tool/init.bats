@@ -97,7 +97,7 @@ TABLE
     expect_complete
 }
 
-@test "init says what has the name of the table, and makes none beside it" {
+@test "init says what has the name of the table, and makes no table" {
     while IFS='|' read -r statement sentence; do
         rm -rf "$VEMO_REDIRECT_DIR"
         tool init
@@ -112,7 +112,7 @@ CREATE TABLE other (tid); CREATE INDEX token ON other (tid)|failed: there is alr
 TABLE
 }
 
-@test "init tells what it made although the rest fails" {
+@test "init says what it made although the rest fails" {
     install -m 0644 /dev/null "$VEMO_REDIRECT_DIR.lock"
     run_tool init
     expect 4 "made the directory $REAL_DIRECTORY" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
@@ -124,7 +124,7 @@ TABLE
     [[ $stderr == *" stayed locked by flock (process "*") for 5 seconds" ]] # and not that nothing was changed
 }
 
-@test "init makes no table before the file is on the disk, and tells what a power cut can undo" {
+@test "init makes no table before the file is on the disk, and says what a power cut can undo" {
     sentence="$REAL_DIRECTORY: Input/output error; the change was made, but a power cut can undo it"
     mkdir -m 0700 "$VEMO_REDIRECT_DIR"
     VEMO_TEST_SYNC=directory fails 4 "$sentence" init

@@ -129,7 +129,7 @@ END
     [[ "$(tool list --show-ids -o json)" == *"\"tid\" : \"token---$ZEROS\""* ]]
 }
 
-@test "every character is shown or escaped as Unicode has it, and none is lost" {
+@test "every character is shown or escaped as Unicode classifies it, and none is lost" {
     export LC_ALL=C.UTF-8
     visible=$BATS_TEST_DIRNAME/visible.py
     "$visible" all >"$DIR/all"
@@ -249,7 +249,7 @@ END
     [ "$allowed" = " at000006 at000007 at000008 at000009 at000010" ]
 }
 
-@test "no owner is taken for gone when users cannot be looked up" {
+@test "no owner counts as gone when users cannot be looked up" {
     row token---
     VEMO_TEST_LOOKUP=5 fails 4 "the user of the number 0 could not be looked up: Input/output error" list --no-owner
 }

@@ -74,7 +74,7 @@ stored() {
     sql "SELECT group_concat(count || '/' || bind_sid, ' ') FROM (SELECT * FROM token ORDER BY deadline, tid)"
 }
 
-@test "reading waits for a lock, and then tells what there is" {
+@test "reading waits for a lock, and then shows what there is" {
     a_store
     while read -r arguments; do
         expected=$(tool $arguments 2>/dev/null)
@@ -170,7 +170,7 @@ TABLE
     [ "$(stored)" = "5/old 5/" ]
 }
 
-@test "reading does not wait for a change that is being prepared" {
+@test "reading does not wait for a change that is not being committed yet" {
     a_store
     lock "$WRITING"
     VEMO_TEST_WAITS=$DIR/none gives 2 list --count
@@ -222,7 +222,7 @@ warning: expired for more than an hour: 1 token (old${ID:0:5})
     done
 }
 
-@test "after a first change, a lock that stays is not said to have changed nothing" {
+@test "after a first change, the failure of a lock does not say that nothing was changed" {
     a_store
     sql "DELETE FROM token"
     mkfifo "$DIR/lines"
@@ -294,7 +294,7 @@ beside_call() {
     text_of stderr "$DIR/err"
 }
 
-@test "what a call writes back is revoked again, and no token that is new" {
+@test "a token that a call writes back is revoked again, but no new token" {
     id=$(a_token)
     while IFS='|' read -r arguments tokens times; do
         [[ $arguments != *--uid* ]] || sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 8)
@@ -312,7 +312,7 @@ revoke --uid 0 --yes|9 tokens|9 times
 TABLE
 }
 
-@test "what a call writes back is updated again, and what it spends is told" {
+@test "a token that a call writes back is updated again, and the uses that it spent are reported" {
     again="the token was written back as it had been 1 time, by calls that do not take the lock, and was updated again"
     left="left: calls have spent some meanwhile, or written back an old number"
     gone="the token is gone: a call has spent its last use meanwhile, or deleted it"
@@ -335,7 +335,7 @@ TABLE
 TABLE
 }
 
-@test "the old token of a rotation ends as it should when a call has written it back" {
+@test "the old token of a rotation ends as intended when a call has written it back" {
     while IFS=';' read -r arguments then sentence again; do
         old=$(a_token --uses 9 --ttl 2h)
         beside_call 1 "SELECT count(*) FROM token WHERE tid <> '$old'" \
@@ -408,7 +408,7 @@ TABLE
     VEMO_TEST_CALLS="opendir /proc/|13" gives "1 token revoked" revoke "$id"
 }
 
-@test "the tool waits for a program that has read a token, and does not name it when it ends without writing" {
+@test "the tool waits for a program that has read a token, and does not name the program when it ends without writing" {
     id=$(a_token)
     calling
     mkfifo "$DIR/waits"
@@ -428,7 +428,7 @@ TABLE
     diff "$DIR/out" - <<< "1 token revoked"
 }
 
-@test "a change says so where /proc does not tell who may still write back" {
+@test "a change says so where /proc does not show who may still write back" {
     namespace=(unshare --user --map-root-user --mount)
     "${namespace[@]}" mount -t tmpfs none /proc 2>/dev/null || skip "no namespace with another /proc here"
     id=$(a_token)
@@ -466,7 +466,7 @@ $open" ]
     [ "$(sql "SELECT tid || count FROM token")" = "${second}3" ]
 }
 
-@test "who holds the lock is named" {
+@test "the program that holds the lock is named" {
     row token---
     tool export "$DIR/other" 2>/dev/null
     flock "$VEMO_REDIRECT_DIR.lock" sh -c 'echo >"$0"; exec sleep 60' "$DIR/locked" 3>&- &

@@ -62,7 +62,7 @@ locked() {
     sqlite3 "$DB" "BEGIN EXCLUSIVE;" ".shell VEMO_TEST_HASTE=1 '$TOOL' $*"
 }
 
-@test "what the page explains under diagnostics is what the tool says" {
+@test "the tool prints the messages that the page explains under diagnostics" {
     ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
     [[ $(ldd "$TOOL" 2>&1) != *"not a dynamic executable"* ]] || skip "valgrind takes more memory"
     not_root=(env -u VEMO_REDIRECT_DIR)

@@ -29,7 +29,7 @@ END
 }
 
 # What a command tells of the store must be on the disk. Where it is not known to be, the command fails.
-@test "what is told outlasts a power cut, that others changed it too" {
+@test "what a command shows outlasts a power cut, also when others changed it" {
     row token---
     while read -r arguments; do
         VEMO_TEST_SYNC=directory fails 4 \
@@ -50,7 +50,7 @@ tune --dry-run
 TABLE
 }
 
-@test "purge gives the space of what it deletes back" {
+@test "purge gives back the space of the tokens that it deletes" {
     tool init
     size=$(stat -c %s "$DB")
     many_rows 100 "deadline = 1, extra = hex(zeroblob(1000))"

@@ -55,7 +55,7 @@ END
     expect_left eeeeeeee
 }
 
-@test "selectors choose the tokens, and those that fit all of several; --dry-run tells how many, and changes nothing" {
+@test "options select the tokens that fit all of them; --dry-run says how many, and changes nothing" {
     six_tokens
     sql "UPDATE token SET uid = 4294967294 WHERE tid LIKE 'a%'; UPDATE token SET count = -1 WHERE tid LIKE 'b%';
          UPDATE token SET deadline = 5 WHERE tid LIKE 'c%';

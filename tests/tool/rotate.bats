@@ -11,7 +11,7 @@ kept() {
          ORDER BY tid" | sed "${1-}"
 }
 
-@test "rotate moves a token to a fresh id, to the byte, and prints that" {
+@test "rotate gives a token a fresh id, changes nothing else of it, and prints the id" {
     row token---
     row another-
     before=$(kept "s/^'token---$ZEROS'/'fresh'/")
@@ -28,7 +28,7 @@ kept() {
     [ "$(sql "SELECT group_concat(tid, ' ') FROM (SELECT tid FROM token ORDER BY rowid)")" = "another-$ZEROS $output" ]
 }
 
-@test "--grace leaves the old token for a time, and never gives it more" {
+@test "--grace leaves the old token for a time, and never prolongs it" {
     while IFS='|' read -r grace left; do
         rm -rf "$VEMO_REDIRECT_DIR"
         row token--- "deadline = strftime('%s', 'now') + 7200"

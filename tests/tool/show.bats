@@ -3,7 +3,7 @@
 
 load common
 
-@test "show tells all fields, the whole id too; times are in local time, in UTC or in seconds" {
+@test "show prints all fields, the whole id too; times are in local time, in UTC or in seconds" {
     in_2_h=$(($(date +%s) + 9000))
     row token--- "bind_sid = 'session-1', deadline = $in_2_h, count = 12, extra = '{\"a\": [ 1 ]}'"
     while IFS='|' read -r option created deadline; do
@@ -26,7 +26,7 @@ END
     gives "$(tool show token--- | tail -n +2)" show --no-header token---
 }
 
-@test "show tells expired and unlimited tokens, and owners that have no name" {
+@test "show marks expired and unlimited tokens, and owners that have no name" {
     row token--- "uid = 4294967294, deadline = strftime('%s') - 9000, count = -3, webapi_allow = '[1', extra = 'x'"
     deadline=$(date -d "@$(sql "SELECT deadline FROM token")" '+%Y-%m-%d %H:%M:%S')
     # The empty session leaves its column's width behind.

@@ -44,7 +44,7 @@ Web            1
     [ "${lines[0]}" = "tokens                        4" ] # as narrow as can be
 }
 
-@test "stats -o json and jsonl tell the same" {
+@test "stats -o json and jsonl give the same" {
     some_tokens
     run_tool stats -o jsonl
     expect 0 '{"expired":2,"file_bytes":16384,"free_pages":0,"functions":[{"function":"VPN","tokens":2},{"function":"Mail","tokens":1},{"function":"Web","tokens":1}],"page_bytes":4096,"tokens":4,"unlimited":2,"users":[{"tokens":3,"uid":0,"user":"root"},{"tokens":1,"uid":4000000000,"user":""}]}'
@@ -127,7 +127,7 @@ vemo_access_token_old_unlimited_tokens 0' ]
     [[ $output == *'"users":[{"tokens":3,"uid":-1,"user":""},{"tokens":1,"uid":4294967296,"user":""}]}' ]]
 }
 
-@test "stats tells of free pages and of the size that the file has" {
+@test "stats counts free pages and the bytes of the file" {
     some_tokens
     sql "PRAGMA auto_vacuum = NONE; VACUUM; UPDATE token SET extra = hex(zeroblob(20000));
          UPDATE token SET extra = '{}'"

@@ -77,7 +77,7 @@ modes: as before" ]
     exec 9>&-
 }
 
-@test "the prompt does not get into the result, and ids from a pipe need none" {
+@test "the prompt is not part of the result, and ids from a pipe need none" {
     row token---
     shows 0 "Token id: " --answer "Token id: " $'token---\r' --shell '"$0" check - Api >"$1"' -- "$DIR/result"
     [ "$(cat "$DIR/result")" = allowed ]

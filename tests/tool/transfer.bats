@@ -182,7 +182,7 @@ TABLE
     gives "1 token imported" import "$theirs"
 }
 
-@test "an export leaves a file of another alone, and removes what an export has left behind" {
+@test "an export leaves the files of others alone, and removes what another export has left behind" {
     row A
     touch "$DIR/file"
     in_the_way="$DIR/file.part is in the way: another export is writing it, or it is none's"
@@ -289,7 +289,7 @@ TABLE
 }
 
 # Some versions of jsoncpp read such a number as an infinite one, which is then what programs get of the token.
-@test "a number that is too large comes back as the library reads it, or is told" {
+@test "a number that is too large comes back as the library reads it, or is reported" {
     row A0000000 "extra = '{\"a\":1e400,\"b\":[-1e400]}'"
     run_tool show A0000000 --field extra
     read=$output
@@ -471,7 +471,7 @@ TABLE
     [ "$(sql "SELECT uid, deadline, count, function FROM token")" = "4294967294|9999999999|2|VPN" ]
 }
 
-@test "import tells of expired tokens, and keeps them" {
+@test "import reports expired tokens, and keeps them" {
     tool init
     written A B C | sed '1s/9999999999/1/; 2s/9999999999/-1/' | whole >"$DIR/file"
     says "3 tokens imported" "2 of them expired: the next call of a program purges those" import "$DIR/file"

@@ -83,7 +83,7 @@ TABLE
     expect_tokens
 }
 
-@test "what tune has changed when it fails is told" {
+@test "tune says what it has changed when it fails" {
     while IFS='|' read -r arguments journal made; do
         a_store
         VEMO_TEST_SYNC=directory run_tool tune $arguments
@@ -108,7 +108,7 @@ TABLE
     [ "$(without_times | head -n 1)" = "look for expired tokens, as every call does|T" ]
 }
 
-@test "tune --dry-run tells what it would do, and changes nothing at all" {
+@test "tune --dry-run prints what it would do, and changes nothing at all" {
     a_store
     for mode in delete wal; do
         sql "PRAGMA journal_mode = $mode" >/dev/null
@@ -131,7 +131,7 @@ TABLE
     done
 }
 
-@test "what every call looks for is found by an index" {
+@test "the search that every call makes uses an index" {
     a_store
     tool tune
     [[ $(sql "EXPLAIN QUERY PLAN DELETE FROM token where deadline < strftime('%s', 'now');") == *"USING "*"INDEX token_deadline (deadline<?)"* ]]

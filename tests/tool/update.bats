@@ -133,7 +133,7 @@ END
     done
 }
 
-@test "update purges nothing, and tells that the token has expired unless it is given time" {
+@test "update purges nothing, and says that the token has expired unless it is given time" {
     row expired- "deadline = 5"
     row another- "deadline = -1"
     says "1 token updated" "the token has expired; the next call of a program purges it,\

@@ -48,7 +48,7 @@ other_lines() {
     grep -cvE '^[A-Za-z]+\.cpp:[0-9]+ ' <<<"$stderr" || true
 }
 
-@test "--help tells what there is and the exit statuses, and --version is the same everywhere" {
+@test "--help lists commands, options and exit statuses, and --version is the same everywhere" {
     succeeds --help
     help=$output
     [[ $help == "Usage: vemo-access-token [OPTIONS] COMMAND"* ]]
@@ -72,7 +72,7 @@ other_lines() {
     [ "$(grep -E '.{81}' <<<"$help")" = "" ]
 }
 
-@test "--help of a command tells how each argument and option is given" {
+@test "--help of a command says how each argument and option is given" {
     run_tool update --help
     expect 0 'Usage: vemo-access-token update [OPTIONS] TID
 change fields of a token
@@ -132,7 +132,7 @@ Examples:
     done
 }
 
-@test "arguments may stand before, between and behind options, also with POSIXLY_CORRECT" {
+@test "arguments may come before, between and after options, also with POSIXLY_CORRECT" {
     id=$(a_token --allow Api:get)
     for arguments in "$id Api get -o json" "-o json $id Api get" "$id -ojson Api get" "$id Api --output=json get" \
         "-vo json -- $id Api get"; do
@@ -156,7 +156,7 @@ Examples:
 
 # At each limit the program ends in the loader (1, 127), for lack of memory (4), or as usual (2). The loader itself crashes
 # where it has no memory for a table of its own, and does so when it only lists the libraries.
-@test "a lack of memory from the start is told, and causes no crash" {
+@test "a lack of memory from the start is reported, and causes no crash" {
     ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
     [[ $(ldd "$TOOL" 2>&1) != *"not a dynamic executable"* ]] || skip "valgrind takes more memory"
     [ -z "${LLVM_PROFILE_FILE-}" ] || skip "clang's counters take memory of their own"
@@ -180,7 +180,7 @@ Examples:
     [ "$stderr" = 'vemo-access-token: unexpected argument "more"' ]
 }
 
-@test "a user who is not root is told so, and nothing is tried" {
+@test "a user who is not root gets a sentence, and nothing is tried" {
     uid=65534
     [ "$(id -u)" -eq 0 ] || uid=$(id -u)
     while read -r arguments; do
@@ -334,7 +334,7 @@ TABLE
 
 # Superfluous arguments are named, but this one may be an id that got there by mistake. One of somebody's own can
 # hold slashes, as Base64 does.
-@test "no id appears on standard error when it stands in a wrong place" {
+@test "no id appears on standard error when it was given in a wrong place" {
     row token---
     for id in "$(printf 'Own+id-%08d/' {1..8})==" "$(a_token)"; do
         mkdir -p "$(dirname "$DIR/$id")"

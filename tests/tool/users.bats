@@ -3,7 +3,7 @@
 
 load common
 
-@test "a user database that fails is told from one without the user" {
+@test "a user database that fails is not the same as one without the user" {
     row token---
     before=$(state)
     while IFS='|' read -r errno status sentence; do
@@ -20,7 +20,7 @@ END
     [ "$(state)" = "$before" ]
 }
 
-@test "grant spends the use, and tells a user database that fails from an owner without a name" {
+@test "grant spends the use, and says whether the user database failed or the owner has no name" {
     for errno in 0 2 3; do
         row "none---$errno" "count = 2"
         VEMO_TEST_LOOKUP=$errno fails 4 "granted, but there is no user of the number 0" \
