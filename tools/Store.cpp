@@ -233,8 +233,12 @@ std::string Store::damageOfIndex(const std::string& strWhere)
                                    "WHERE other.tid = token.tid AND other.rowid = token.rowid)",
                                    strIndex.c_str()),
                        rows);
-    const std::string strMissing = rows.empty() ? "0" : rows[0][0].value_or("");
-    return strMissing == "0" ? strErr : "rows missing in the index of the ids: " + strMissing;
+    for (const Row& row : rows) {
+        if (row[0] != "0") {
+            return "rows missing in the index of the ids: " + row[0].value_or("");
+        }
+    }
+    return strErr;
 }
 
 uint64_t Store::purge()

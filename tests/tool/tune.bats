@@ -72,6 +72,10 @@ sql "CREATE INDEX token_deadline ON token (deadline)"//delete|delete/yes|yes/no|
 TABLE
     run_tool doctor
     [[ $output != *index* ]]
+    # Five small changes are measured before, and five after. SQLite counts changes.
+    count=$(od -An -j27 -N1 -tu1 "$DB")
+    succeeds tune
+    [ $((($(od -An -j27 -N1 -tu1 "$DB") - count + 256) % 256)) -eq 10 ]
 }
 
 @test "where there can be no write-ahead journal, tune says so and makes no indexes" {
