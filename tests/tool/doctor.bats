@@ -421,6 +421,7 @@ TABLE
 
 @test "a check of the database that takes long is done in parts" {
     many_rows 300
+    sql "UPDATE token SET extra = json_object('long', hex(zeroblob(5000))) WHERE rowid = 150"
     # The check of each row of the table "slow" takes some milliseconds.
     sql "CREATE TABLE slow (x CHECK (0 = instr(printf('%.*c', 60000, 'a'), printf('%.*c', 30000, 'a') || x)));
          PRAGMA ignore_check_constraints = ON; INSERT INTO slow SELECT 'b' FROM token;
@@ -434,8 +435,8 @@ TABLE
             WHERE tbl_name = 'token' AND type = 'index'" >"$DIR/defensive"
     finds 5 "$DAMAGED: rows missing in the index of the ids: 2|$DAMAGE_HELP"
     cp "$DIR/sound" "$DB"
-    dd if=/dev/zero of="$DB" bs=4096 seek=$(($(sql "SELECT max(pageno) FROM dbstat WHERE name = 'token'") - 1)) \
-        count=1 conv=notrunc status=none
+    page=$(sql "SELECT pageno FROM dbstat WHERE name = 'token' AND pagetype = 'overflow' ORDER BY path LIMIT 1")
+    dd if=/dev/zero of="$DB" bs=4096 seek=$((page - 1)) count=1 conv=notrunc status=none
     finds 5 "$DAMAGED: database disk image is malformed|$DAMAGE_HELP"
     # Tables without an index of the ids. In the second, the table is the index.
     while IFS='|' read -r old new; do
