@@ -600,6 +600,8 @@ expect_undone() {
     half_change
     finds 0 "repaired: $journal"$'\n'"$ALL_RIGHT" --repair
     expect_undone
+    half_change
+    VEMO_TEST_SYNC=file finds 5 "error: $REAL_DB failed: disk I/O error|programs fail in the same way|mend the cause; or $REPLACE"
     # A journal of just now can belong to a program that is running.
     half_change "1 hour"
     expect_sound
