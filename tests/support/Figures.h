@@ -13,10 +13,10 @@ int64_t scaled(int64_t nEveryday);
 
 uint64_t seed();
 
-// Prints the line "figure: NAME: TEXT", which scripts/test and scripts/stress gather.
+// Prints the line "figure: NAME: TEXT", which scripts/test and scripts/stress collect.
 void figure(const std::string& strName, const std::string& strText);
 
-// "12.3 %", or "none" when there is nothing to take a share of.
+// "12.3 %", or "none" when the whole is 0.
 std::string share(int64_t nPart, int64_t nWhole);
 
 #endif

@@ -23,7 +23,7 @@ pid_t startProcess(const std::function<void()>& body)
     }
     prctl(PR_SET_PDEATHSIG, SIGKILL);
     int nStatus = getppid() == pidParent ? 0 : 1;
-    try { // neither a return nor an exception may take a child to its parent's business
+    try { // the child must not go on with its parent's code, by a return or an exception
         if (0 == nStatus) {
             body();
         }
@@ -46,7 +46,7 @@ bool endsWell(pid_t pid)
 
 int runProcesses(int nProcesses, const std::function<void(int)>& body)
 {
-    // Its end of file comes when the parent and every process have closed the writing end.
+    // It is at its end of file when the parent and every process have closed the writing end.
     int rgnGate[2];
     if (0 != pipe(rgnGate)) {
         throw std::system_error(errno, std::generic_category(), "pipe");

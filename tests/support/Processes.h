@@ -44,7 +44,7 @@ int statusOf(pid_t pid);
 bool endsWell(pid_t pid);
 
 // Runs body(0), body(1) and so on, each in a process of its own. All begin when the last process has started.
-// Returns how many did not end well.
+// Returns how many of them failed.
 int runProcesses(int nProcesses, const std::function<void(int)>& body);
 
 #endif

@@ -30,7 +30,7 @@ bool isIn(const char* szLibrary, void* pCode)
     return 0 == _dl_find_object(pCode, &object) && strstr(object.dlfo_link_map->l_name, szLibrary);
 }
 
-// Records a call. Returns true, with errno set, when this one is to fail; otherwise errno stays.
+// Records a call. Returns true and sets errno if this call must fail; otherwise leaves errno unchanged.
 bool fails(const std::string& strName, const std::string& strArguments = "")
 {
     const int nErrno = errno;
@@ -59,8 +59,8 @@ std::string withoutLineNumbers(std::string strText)
     return strText;
 }
 
-// Writes a line down. szFormat may contain "%m". A line in the system log must have its priority and, behind
-// its place, errno unless that is 0. These are left out then, so that it reads as on standard output.
+// Records a log line. szFormat may contain "%m". A line in the system log must have its priority and, after
+// its place, errno unless that is 0. These are left out, so that the line reads as on standard output.
 void logged(const int* pnPriority, const char* szFormat, va_list args)
 {
     const int nErrno = errno;
@@ -80,7 +80,7 @@ void logged(const int* pnPriority, const char* szFormat, va_list args)
     errno = nErrno;
 }
 
-// A callback of the library, which is to find errno as the library left it.
+// A callback of the library. It must see errno as the library left it.
 struct Receiver {
     SqlCallback callback;
     void* pArgument;
@@ -106,7 +106,7 @@ void* withoutThrowing(Allocation allocation)
 
 } // namespace
 
-// Whether the library calls the function that this stands in.
+// Whether the library calls the function that this is called from.
 #define CALLED_BY_LIBRARY isIn("libvemoaccesstoken.so", __builtin_return_address(0))
 
 Seam& seam()

@@ -1,10 +1,10 @@
 // The seam between the library and the system. The test programs define the C functions that the library
-// calls (Seam.cpp), so the shared object that ships calls these. They record each call, write the log lines
-// down, fail where a test wants that, and otherwise call the real function.
+// calls (Seam.cpp), so the shared object that ships calls these. They record each call and each log line,
+// fail where a test demands it, and otherwise call the real function.
 //
 // Calls by SQLite and by the test itself go straight to the real function. The clock is shared with SQLite.
-// getrandom, getpwuid_r and the allocation of arrays are the seam's whoever calls, for tests that have the
-// callers linked in.
+// getrandom, getpwuid_r and the allocation of arrays go to the seam whoever calls them, for tests into which
+// the callers are linked.
 
 #ifndef TESTS_SEAM_H
 #define TESTS_SEAM_H
@@ -28,17 +28,17 @@ struct Seam {
     // usleep never really sleeps.
     std::vector<std::string> calls;
 
-    // The calls whose first word is one of the names, and the SQL that was run.
+    // The calls whose first word is one of the names; and the SQL that was run.
     std::vector<std::string> callsOf(const std::vector<std::string>& names) const;
     std::vector<std::string> statements() const;
 
     // What the library logged, with the line numbers of source files as '#', since they may change:
-    // "util.cpp:# ...". Those in the system log read as they would on standard output, if they are as they
-    // must be there; and whether the last one went there.
+    // "util.cpp:# ...". Lines in the system log read as they would on standard output, if their form is
+    // right; and whether the last line went to the system log.
     std::vector<std::string> lines;
     bool blInSystemLog = false;
 
-    // Functions that fail: the numbers (from 1) of the calls that do, and the errno they leave. They are
+    // Functions that fail: the numbers (from 1) of the calls that fail, and the errno they set. They are
     // geteuid (answers (uid_t)-1), seteuid, access, open, chmod, sqlite3_mprintf (no memory), getrandom,
     // getpwuid_r (returns the errno), "operator new" and "operator new[]" (the non-throwing ones).
     struct Failure {
@@ -68,7 +68,7 @@ struct Seam {
 
 Seam& seam();
 
-// When set, called ahead of each allocation by operator new. It may throw, and may change errno.
+// When set, called before each allocation by operator new. It may throw, and may change errno.
 extern void (*g_pAllocation)();
 
 #endif

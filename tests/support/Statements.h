@@ -9,7 +9,7 @@
 
 #include "Seam.h"
 
-// What one try of a statement gets for an answer; it is not run. SQLITE_OK runs it.
+// The answer to one try of a statement, which is then not run. SQLITE_OK runs it.
 struct SqlAnswer {
     int nResult;
     const char* szError; // null: no text
@@ -20,8 +20,8 @@ const SqlAnswer RUN = {SQLITE_OK, nullptr};
 const SqlAnswer DISK_ERROR = {SQLITE_IOERR, "disk I/O error"};
 const SqlAnswer LOCKED = {SQLITE_BUSY, "database is locked"};
 
-// Answers, in turn, the tries of the library's statements that start with strStart. Other statements are run,
-// and these too when no answer is left.
+// Answers, one after the other, the tries of the library's statements that start with strStart. Other
+// statements are run, and these too when no answer is left.
 inline void answerStatements(const std::string& strStart, const std::vector<SqlAnswer>& answers)
 {
     seam().sqliteExec = [strStart, answers, nTry = size_t(0)](sqlite3* pDb, const char* szSql,
@@ -42,13 +42,13 @@ inline void answerStatements(const std::string& strStart, const std::vector<SqlA
     };
 }
 
-// Answers nTimes of them with a failure.
+// Answers nTimes of these tries with a failure.
 inline void failStatements(const std::string& strStart, const SqlAnswer& failure, int nTimes = 1)
 {
     answerStatements(strStart, std::vector<SqlAnswer>(static_cast<size_t>(nTimes), failure));
 }
 
-// Calls something ahead of each of the library's statements, which is then run.
+// Calls a function before each of the library's statements, which is then run.
 inline void beforeStatements(const std::function<void(const std::string& strSql)>& call)
 {
     seam().sqliteExec = [call](sqlite3* pDb, const char* szSql, SqlCallback callback, void* pArgument,

@@ -61,7 +61,7 @@ void SeamTest::SetUp()
 
 void SeamTest::TearDown()
 {
-    EXPECT_EQ(Texts{}, takeLines()) << "the test expects no such lines";
+    EXPECT_EQ(Texts{}, takeLines()) << "the test does not expect these lines";
 }
 
 void SeamTest::reset()

@@ -11,7 +11,7 @@
 #include "Tokens.h"
 #include "internal/AccessTokenDbApi.h"
 
-// The calls around the opening of the database, whose order is fixed. The caller's uid is 1000.
+// The calls that open the database; their order is fixed. The caller's uid is 1000.
 const uid_t UID_CALLER = 1000;
 const char* const UID = "geteuid";
 const char* const RAISE = "seteuid 0";
@@ -26,7 +26,7 @@ const char* const CLOSE = "sqlite3_close";
 const Texts OPENING_CALLS = {"geteuid",      "seteuid",      "access",          "open",         "chmod",
                              "sqlite3_open", "sqlite3_exec", "sqlite3_changes", "sqlite3_close"};
 
-// Tests that need no database. A line of the log that a test does not expect is an error.
+// Tests that need no database. A log line that a test does not expect is an error.
 class SeamTest : public ::testing::Test {
 protected:
     void SetUp() override;
@@ -47,12 +47,12 @@ protected:
     const std::string& directory() const { return m_strDirectory; }
     std::string path() const { return m_strDirectory + "/vemo-access-token.db"; }
 
-    // Runs SQL over a connection of the test's own and returns the rows, their columns joined by
+    // Runs SQL on the test's own connection and returns the rows, their columns joined by
     // '|'; NULL reads "NULL".
     Texts query(const std::string& strSql) const;
 
-    // The rows of the table, in the order of their ids; these ids, with blanks between; and the count of a
-    // token, "" when it is not there.
+    // The rows of the table, in the order of their ids; these ids, separated by blanks; and the count of a
+    // token, "" if there is no such token.
     Texts rows() const { return query("SELECT * FROM token ORDER BY tid"); }
     std::string tids() const { return joined(query("SELECT tid FROM token ORDER BY tid"), " "); }
     std::string countOf(const std::string& strTid = "t") const
@@ -60,7 +60,7 @@ protected:
         return joined(query("SELECT count FROM token WHERE tid = '" + strTid + "'"), " ");
     }
 
-    // Makes the database with its table, as the library would have; and a token in it, with the members of
+    // Makes the database with its table, as the library does; and a token in it, with the members of
     // token(strChanges).
     void makeTable() const { query(SCHEMA); }
     void insert(const std::string& strChanges = "{}") const { query(saveSql("INSERT", token(strChanges))); }

@@ -23,7 +23,7 @@ inline Texts operator+(Texts left, const Texts& right)
     return left;
 }
 
-// The texts with a separator between.
+// The texts, joined by a separator.
 inline std::string joined(const Texts& texts, const char* szSeparator)
 {
     std::string strJoined;
@@ -33,7 +33,7 @@ inline std::string joined(const Texts& texts, const char* szSeparator)
     return strJoined;
 }
 
-// JSON text as a value (the text is well-formed), and a value as compact text.
+// JSON text as a value (the text must be well-formed), and a value as compact text.
 inline Json::Value json(const std::string& strText)
 {
     const std::unique_ptr<Json::CharReader> pReader(Json::CharReaderBuilder().newCharReader());
@@ -51,7 +51,7 @@ inline std::string text(const Json::Value& jValue)
     return Json::writeString(builder, jValue);
 }
 
-// The files that log lines come from; the field list comes with a line.
+// The files that log lines come from; the field list has a line number.
 const char* const UTIL = "util.cpp:#";
 const char* const STORE = "AccessTokenSqlite.cpp:#";
 const char* const SERVICE = "AccessTokenApi.cpp:#";
@@ -62,7 +62,7 @@ inline std::string fieldList(int nLine)
     return "include/internal/vemo-access-token-data-member:" + std::to_string(nLine);
 }
 
-// Statements. Values stand in them as they are quoted.
+// Statements. Values in them are quoted.
 inline const std::string PURGE = "DELETE FROM token where deadline < strftime('%s', 'now');";
 inline const std::string SCHEMA =
     "PRAGMA auto_vacuum = FULL; CREATE TABLE if not exists token (tid TEXT primary key NOT NULL,"
@@ -87,7 +87,7 @@ inline std::string ordinary(const std::string& strFile, const std::string& strMe
     return strFile + " " + strMessage + "\n";
 }
 
-// a failure line with a message of its own, written while errno is nErrno;
+// a failure line with its own message, written while errno is nErrno;
 inline std::string fail(const std::string& strFile, const std::string& strMessage, int nErrno = 0)
 {
     return ordinary(strFile, "(" + strFile + ")(" + strerror(nErrno) + ")" + strMessage + "\n");
@@ -99,7 +99,7 @@ inline std::string failed(const std::string& strFile, const std::string& strCond
     return fail(strFile, "Failed [" + strCondition + "], err=" + strerror(nErrno), nErrno);
 }
 
-// those of several conditions, which report one failure on its way up;
+// those of several conditions, which pass one failure on to their callers;
 inline Texts allFailed(const std::string& strFile, const Texts& conditions, int nErrno = 0)
 {
     Texts lines;
@@ -109,14 +109,14 @@ inline Texts allFailed(const std::string& strFile, const Texts& conditions, int 
     return lines;
 }
 
-// and what the store logs of a statement that fails at its first try.
+// and what the store logs when a statement fails at its first try.
 inline Texts failureOf(const std::string& strSql, const std::string& strError, int nErrno = 0)
 {
     return {ordinary(STORE, "i=0,run sql failed, error=" + strError + ", sql=" + strSql),
             fail(STORE, "run sql failed, sql=" + strSql, nErrno)};
 }
 
-// What the store logs when it may not become root.
+// What the store logs when it cannot become root.
 const std::string NOT_ROOT = failed(STORE, "0 > seteuid(0)", EPERM);
 
 // The lines logged since the last call.
@@ -125,7 +125,7 @@ inline Texts takeLines()
     return std::exchange(seam().lines, {});
 }
 
-// Expects these lines, texts or one list of them; and that a call returns -1 and logs them.
+// Expects these lines, given as texts or as one list; and that a call returns -1 and logs them.
 #define EXPECT_LINES(...) EXPECT_EQ((Texts{__VA_ARGS__}), takeLines())
 #define EXPECT_FAILURE(call, ...)                                                                            \
     do {                                                                                                     \

@@ -1,4 +1,4 @@
-// The token of most tests, and the fields that it has.
+// The token of most tests, and its fields.
 
 #ifndef TESTS_TOKENS_H
 #define TESTS_TOKENS_H
@@ -9,14 +9,14 @@
 
 const time_t NOW = 1700000000; // what the library's clock shows
 
-// A field, and values for tests of it.
+// A field, and values to test it with.
 struct Field {
     const char* szName;
     int nLine; // in the field list
     const char* szType;
     Json::Value jDefault; // at the time NOW
-    const char* szOther;  // a value that is not the token's own, in JSON
-    const char* szWrong;  // one of a wrong type
+    const char* szOther;  // another value than the token's, in JSON
+    const char* szWrong;  // a value of a wrong type
 };
 
 // In the field list's order.
@@ -68,7 +68,7 @@ inline Json::Value counted(Json::Int64 nCount)
     return token("{\"count\":" + std::to_string(nCount) + "}");
 }
 
-// The values of a record's fields as texts, with szQuote around those that SQL quotes, and quotes doubled.
+// The values of a record's fields as texts. Where SQL quotes, szQuote is around them, and quotes are doubled.
 inline Texts values(const Json::Value& jToken, const std::string& strQuote)
 {
     Texts texts;
@@ -99,7 +99,7 @@ inline std::string saveSql(const std::string& strVerb, const Json::Value& jToken
            joined(values(jToken, "'"), ",") + ")";
 }
 
-// A token id of 127 characters, the fewest that a caller may choose, which starts with strStart.
+// A token id that starts with strStart and has 127 characters, the fewest that a caller may choose.
 inline std::string tid(const std::string& strStart = "")
 {
     return strStart + std::string(127 - strStart.size(), 'x');

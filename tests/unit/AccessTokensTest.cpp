@@ -1,4 +1,4 @@
-// The operations of AccessTokens: what each does and says, also where the store makes it wait or fails.
+// The operations of AccessTokens: their effects and results, also when the store is locked or fails.
 
 #include "AccessTokens.h"
 
@@ -16,7 +16,7 @@ const AccessTokens::Answer GRANTED = AccessTokens::Answer::Granted;
 const AccessTokens::Answer REFUSED = AccessTokens::Answer::Refused;
 const AccessTokens::Answer FAILED = AccessTokens::Answer::Failed;
 
-// The lines that the library logs are other tests' subject, and are dropped.
+// Other tests check the lines that the library logs; they are dropped here.
 class TokensTest : public TableTest {
 protected:
     void SetUp() override
@@ -48,8 +48,8 @@ protected:
     const Json::Value m_jCountOf7 = json(R"({"count":7})");
 };
 
-// Each of its changes waits for a lock once, and does what it says.
-TEST_F(TokensTest, GoThroughTheirLife)
+// Each change of the token waits for a lock once, and takes effect.
+TEST_F(TokensTest, LiveFromCreationToRevocation)
 {
     answerStatements("INSERT", {LOCKED});
     const std::string strTid =
@@ -83,14 +83,14 @@ TEST_F(TokensTest, AreRevokedBySessionAndByPurpose)
     EXPECT_EQ("b c d", tids());
     m_tokens.revokeFunction("VPN");
     EXPECT_EQ("c d", tids());
-    // The library would read it as "no session", and delete the tokens that are bound to none.
+    // The library would read this as "no session", and delete the tokens that are bound to none.
     EXPECT_THROW(m_tokens.revokeSession(std::string("\0S2", 3)), std::runtime_error);
     EXPECT_EQ("c d", tids());
 }
 
-TEST_F(TokensTest, SayWhatHappenedToAGrant)
+TEST_F(TokensTest, ReportTheOutcomeOfAGrant)
 {
-    // The first tries of the statement get the answers. The count is szStored then.
+    // The first tries of the statement get the answers. Afterwards the count is szStored.
     const auto says = [&](const char* szCount, const std::string& strStatement,
                           const std::vector<SqlAnswer>& answers, AccessTokens::Answer answer,
                           const char* szStored) {
@@ -119,7 +119,7 @@ TEST_F(TokensTest, SayWhatHappenedToAGrant)
     says("-1", SELECT, {RUN, LOCKED}, GRANTED, "-1"); // an unlimited token needs no change
 }
 
-TEST_F(TokensTest, RefuseWhatATokenDoesNotOpen)
+TEST_F(TokensTest, RefuseWhatATokenDoesNotAllow)
 {
     insert();
     EXPECT_EQ(REFUSED, m_tokens.grant("u", "Api", "get"));
@@ -142,7 +142,7 @@ TEST_F(TokensTest, TreatExpiredTokensAsGoneWhenThePurgeFails)
     EXPECT_EQ("3", countOf());
 }
 
-TEST_F(TokensTest, ThrowWhatTheyCannotDo)
+TEST_F(TokensTest, ThrowWhenTheStoreFails)
 {
     insert();
     const auto failsTo = [](const std::string& strStatement, const char* szDone, const auto& call) {
@@ -160,7 +160,7 @@ TEST_F(TokensTest, ThrowWhatTheyCannotDo)
     EXPECT_EQ("3", countOf());
 }
 
-TEST_F(TokensTest, SayWhyTheyCannotHaveTheLock)
+TEST_F(TokensTest, ReportWhyTheyCannotTakeTheLock)
 {
     insert();
     VEMO_ACCESS_TOKEN::logToStdout(true);

@@ -25,7 +25,7 @@ namespace {
 const std::string UPDATE = "UPDATE token SET uid = 1";
 const std::string OPEN_FAILED = "open sqlite failed, path=" VEMO_ATOKEN_DB_PATH ", errno=";
 
-// What an opening leaves.
+// The state after an opening.
 struct Outcome {
     int nResult;
     bool blHandle;
@@ -50,7 +50,7 @@ protected:
         return status.st_mode & 07777;
     }
 
-    // SQLite refuses a directory, and leaves a handle that can only be closed.
+    // SQLite refuses to open a directory, and returns a handle that can only be closed.
     static void refuseOpening()
     {
         seam().sqliteOpen = [](const char*, sqlite3** ppDb) {
@@ -66,7 +66,7 @@ protected:
     }
 };
 
-TEST_F(Connection, OpensInAFixedOrderOfCallsAndPutsTheUidBack)
+TEST_F(Connection, OpensInAFixedOrderOfCallsAndRestoresTheUid)
 {
     const Texts touched = {UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN};
     const Texts created = touched + Texts{CREATE, CHANGES};
@@ -89,7 +89,7 @@ TEST_F(Connection, OpensInAFixedOrderOfCallsAndPutsTheUidBack)
     };
     opens([] {}, OPENED, created + back, {});
     opens([&] { std::ofstream{path()}; }, OPENED, {UID, RAISE, ACCESS, OPEN, BACK}, {});
-    // A file that cannot be looked at is treated as missing, which does it no harm.
+    // A file that cannot be examined is treated as missing, which does not harm it.
     opens([&] { std::ofstream{path()}, seam().fail("access", EACCES); }, OPENED, created + back, {});
     opens([] { seam().fail("seteuid", EPERM); }, REFUSED, {UID, RAISE, BACK}, {NOT_ROOT});
     opens([] { seam().fail("open", EROFS); }, REFUSED, {UID, RAISE, ACCESS, TOUCH, BACK},
@@ -108,7 +108,7 @@ TEST_F(Connection, OpensInAFixedOrderOfCallsAndPutsTheUidBack)
     opens([] { failStatements(SCHEMA, DISK_ERROR); }, OPENED, touched + Texts{CREATE} + back,
           {ordinary(STORE, "i=0,run sql failed, error=disk I/O error, sql=" + SCHEMA),
            fail(STORE, "create table failed, sql=" + SCHEMA, EIO)});
-    // Without the uid of before, none is put back.
+    // If the earlier uid is unknown, none is restored.
     opens([] { seam().fail("geteuid", EPERM); }, {0, true, 0}, created, {});
     opens([] { seam().fail("geteuid", 0), seam().fail("seteuid", EPERM); }, REFUSED, {UID, RAISE},
           {NOT_ROOT});
@@ -130,7 +130,7 @@ TEST_F(Connection, CreatesAPrivateFileWithTheTableWhateverTheUmask)
               query("SELECT sql || ';' FROM sqlite_schema WHERE sql <> ''"));
 }
 
-TEST_F(Connection, OpensOnceAndNotUnasked)
+TEST_F(Connection, OpensOnceAndNotBeforeItMust)
 {
     {
         AccessTokenDbApi db;
@@ -153,7 +153,7 @@ TEST_F(Connection, OpensOnceAndNotUnasked)
 }
 
 // The table is created only with the file.
-TEST_F(Connection, LeavesFilesThatExistAlone)
+TEST_F(Connection, LeavesExistingFilesUnchanged)
 {
     const std::string strForeign(4096, 'x');
     for (const auto& [strContent, strError] :
@@ -174,7 +174,7 @@ TEST_F(Connection, LeavesFilesThatExistAlone)
     EXPECT_EQ((Texts{UPDATE, UPDATE}), seam().statements());
 }
 
-TEST_F(Connection, PutsTheUidBackWhenAnExceptionPasses)
+TEST_F(Connection, RestoresTheUidWhenAnExceptionPasses)
 {
     seam().sqliteExec = [](sqlite3*, const char*, SqlCallback, void*, char**) -> int {
         throw std::bad_alloc();
@@ -186,7 +186,7 @@ TEST_F(Connection, PutsTheUidBackWhenAnExceptionPasses)
     EXPECT_NE(nullptr, db.m_pDb);
 }
 
-TEST_F(Connection, KeepsTheUselessHandleOfARefusedOpening)
+TEST_F(Connection, KeepsTheHandleOfARefusedOpening)
 {
     refuseOpening();
     AccessTokenDbApi db;
@@ -204,12 +204,12 @@ TEST_F(Connection, KeepsTheUselessHandleOfARefusedOpening)
 
     EXPECT_EQ(0, db.freeDb());
     reset();
-    EXPECT_EQ(-1, db.runSql()); // the empty file that the first try made is there by now
+    EXPECT_EQ(-1, db.runSql()); // the first try has made an empty file
     EXPECT_LINES(failureOf(UPDATE, "no such table: token"));
 }
 
-// A failure to put the uid back does not hide why the opening failed.
-TEST_F(Connection, TellsErrnoOfTheFailedCallUpToTheStatement)
+// A failure to restore the uid does not hide why the opening failed.
+TEST_F(Connection, KeepsErrnoOfTheFailedCallInEachLine)
 {
     seam().fail("open", EROFS);
     seam().fail("seteuid", EAGAIN, 2, 2);

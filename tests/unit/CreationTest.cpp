@@ -1,5 +1,5 @@
-// Creating tokens, with ids that the caller chooses and with generated ones: what is refused, and what is
-// logged. The model shows what is created.
+// Creating tokens, with ids that the caller chooses and with generated ids: what is refused and logged. The
+// test of the model shows what is created.
 
 #include <type_traits>
 
@@ -19,7 +19,7 @@ std::string summary(const std::string& strTid, const std::string& strUid = "1000
                                  ", strFunction=" + strFunction + ", jTokenOption=" + strOption);
 }
 
-// What is logged when there is a token with that id.
+// What is logged when a token with that id exists.
 Texts duplicateLines(const std::string& strTid)
 {
     return failureOf(saveSql("INSERT", created(strTid)), "UNIQUE constraint failed: token.tid") +
@@ -72,7 +72,7 @@ TEST_F(Creation, RefusesMembersOfAWrongType)
     EXPECT_EQ(Texts{}, seam().statements());
 }
 
-TEST_F(Creation, RefusesAnIdThatExistsWithItsStepsInDebugMode)
+TEST_F(Creation, RefusesAnExistingIdAndLogsTheStepsInDebugMode)
 {
     const std::string strInsert = saveSql("INSERT", created(m_strTid));
     const Texts begin = {ordinary(SERVICE, "create token ok, token=" + text(created(m_strTid))),
@@ -82,7 +82,7 @@ TEST_F(Creation, RefusesAnIdThatExistsWithItsStepsInDebugMode)
     EXPECT_EQ(0, createByTid());
     EXPECT_FAILURE(createByTid(), duplicateLines(m_strTid));
     EXPECT_EQ((Texts{row(created(m_strTid))}), rows());
-    // The debug line comes before the store is asked, so also when it refuses.
+    // The debug line is written before the call of the store, so a refusal has it too.
     VEMO_ACCESS_TOKEN::debugInfo(true);
     EXPECT_FAILURE(createByTid(), begin + duplicateLines(m_strTid));
     query("DELETE FROM token");

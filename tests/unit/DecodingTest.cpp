@@ -19,14 +19,14 @@ const std::string NO_FIELD = "!jTokenType.isMember(strName)";
 const std::string WRONG_ARRAY = "pjTokenArray->type() != Json::arrayValue && "
                                 "pjTokenArray->type() != Json::nullValue";
 
-int g_nAllocationThatFails = 0;  // 1 is the next one; 0: none
-bool g_blJsoncppTellsIt = false; // jsoncpp reports it by an exception of its own, as where it calls malloc
+int g_nAllocationThatFails = 0; // 1 is the next one; 0: none
+bool g_blJsoncppThrows = false; // jsoncpp throws its own exception, as it does where it calls malloc
 
 void allocate()
 {
     if (0 < g_nAllocationThatFails && 0 == --g_nAllocationThatFails) {
         errno = ENOMEM;
-        if (g_blJsoncppTellsIt) {
+        if (g_blJsoncppThrows) {
             throw Json::RuntimeError("no memory");
         }
         throw std::bad_alloc();
@@ -45,7 +45,7 @@ struct Row {
     std::vector<const char*> values;
 };
 
-// The decoder, as the library hands it to SQLite. A row that is refused leaves the array as it was.
+// The decoder that the library passes to SQLite. A row that is refused leaves the array unchanged.
 class Decoding : public TableTest {
 protected:
     void SetUp() override
@@ -66,7 +66,7 @@ protected:
                           const_cast<char**>(row.values.data()), const_cast<char**>(row.names.data()));
     }
 
-    // The member that one column becomes.
+    // The member that is made from one column.
     Json::Value member(const char* szName, const std::string& strValue)
     {
         m_jArray = Json::Value();
@@ -84,14 +84,14 @@ protected:
         EXPECT_TRUE(m_jArray.isNull());
     }
 
-    // Decodes what a query yields.
+    // Decodes the rows of a query.
     int run(const std::string& strSql)
     {
         m_db.m_strSql = strSql;
         return m_db.runSql(m_pDecoder, &m_jArray);
     }
 
-    // The lines of a query that ends at a refused row.
+    // The log lines of a query that ends at a refused row.
     Texts queryLines(const Texts& linesOfRow) const
     {
         return linesOfRow + failureOf(m_db.m_strSql, "query aborted");
@@ -131,7 +131,7 @@ TEST_F(Decoding, ReadsNumbersLeniently)
     EXPECT_EQ(Json::Value("-1"), member("deadline", "-1"));
 }
 
-// The text decides what the member becomes, not the type name. Of bad JSON, what was read stays.
+// The text decides the type of the member, not the type name. Of bad JSON, the part before the error is kept.
 TEST_F(Decoding, ParsesJsonOfAnyKind)
 {
     tokenType()["any"] = json(R"(["Json::Value",0])");
@@ -165,7 +165,7 @@ TEST_F(Decoding, NeverThrowsOnDeepNesting)
 {
     const auto nested = [](size_t nLevels) { return std::string(nLevels, '[') + std::string(nLevels, ']'); };
     EXPECT_TRUE(json(nested(1000)) == member("extra", nested(1000)));
-    // What was read down to the limit stands.
+    // What was read down to the limit is kept.
     Json::Value jLeft;
     for (int nLevel = 0; nLevel < 1000; ++nLevel) {
         Json::Value jOuter;
@@ -174,7 +174,7 @@ TEST_F(Decoding, NeverThrowsOnDeepNesting)
     }
     EXPECT_TRUE(jLeft == member("extra", nested(1001)));
     EXPECT_TRUE(jLeft == member("extra", std::string(100000, '[')));
-    EXPECT_EQ(json("{\"a\":1}"), member("extra", "{\"a\":1}")) << "the reader is as before";
+    EXPECT_EQ(json("{\"a\":1}"), member("extra", "{\"a\":1}")) << "the reader works as before";
 }
 
 TEST_F(Decoding, RefusesUnknownTypeNames)
@@ -189,10 +189,10 @@ TEST_F(Decoding, RefusesUnknownTypeNames)
     }
 }
 
-// SQLite is C: no exception may pass through it.
+// SQLite is written in C: no exception may pass through it.
 TEST_F(Decoding, TurnsExceptionsIntoFailure)
 {
-    const Json::Value jOdd = 5; // no type can be read from that
+    const Json::Value jOdd = 5; // not a type
     std::string strError = "none";
     try {
         jOdd[0U];
@@ -203,14 +203,14 @@ TEST_F(Decoding, TurnsExceptionsIntoFailure)
     expectRefused({{"count", "odd"}, {"1", "1"}}, {fail(STORE, "decode row failed, error=" + strError)});
 }
 
-// When an allocation fails, the reader can call a long number invalid. So it is asked twice.
+// When an allocation fails, the reader may call a long number invalid. So the library reads it twice.
 TEST_F(Decoding, YieldsTheWholeRecordOrNoneWhenAnAllocationFails)
 {
     const std::string strExtra =
         R"({"a":[1,{"b":0.12345678901234567,"c":")" + std::string(100, 'x') + "\"}]}";
     const Row row = {{"deadline", "extra"}, {"-1", strExtra.c_str()}};
     for (const std::string strError : {"std::bad_alloc", "no memory"}) {
-        g_blJsoncppTellsIt = "no memory" == strError;
+        g_blJsoncppThrows = "no memory" == strError;
         bool blFailed = true;
         for (int nAllocation = 1; blFailed; ++nAllocation) {
             SCOPED_TRACE(nAllocation);
@@ -228,7 +228,7 @@ TEST_F(Decoding, YieldsTheWholeRecordOrNoneWhenAnAllocationFails)
     }
 }
 
-TEST_F(Decoding, RefusesColumnsThatAreNoFields)
+TEST_F(Decoding, RefusesColumnsThatAreNotFields)
 {
     for (const char* szName : {"nonsense", "", "TID"}) {
         SCOPED_TRACE(szName);
@@ -240,7 +240,7 @@ TEST_F(Decoding, RefusesColumnsThatAreNoFields)
     EXPECT_EQ(json(R"([{"tid":"t","uid":1001,"count":0}])"), m_jArray);
 }
 
-TEST_F(Decoding, RefusesWhatIsMissing)
+TEST_F(Decoding, RefusesNullPointers)
 {
     char* pointers[] = {nullptr};
     for (const int nColumns : {1, 0, -1}) {
@@ -263,14 +263,14 @@ TEST_F(Decoding, RefusesWhatIsMissing)
                   columnLines(failed(STORE, NO_FIELD, EACCES), EACCES));
 }
 
-TEST_F(Decoding, RefusesOutputThatIsNoArray)
+TEST_F(Decoding, RefusesOutputThatIsNotAnArray)
 {
     insert();
     for (const char* szOutput : {"{}", "0"}) {
         SCOPED_TRACE(szOutput);
         m_jArray = json(szOutput);
         EXPECT_FAILURE(decode({{"tid"}, {"a"}}), failed(STORE, WRONG_ARRAY));
-        EXPECT_EQ(0, run("SELECT * FROM token WHERE tid = 'u'")) << "nobody looks before the first row";
+        EXPECT_EQ(0, run("SELECT * FROM token WHERE tid = 'u'")) << "no check before the first row";
         EXPECT_FAILURE(run("SELECT * FROM token"), queryLines({failed(STORE, WRONG_ARRAY)}));
         EXPECT_EQ(json(szOutput), m_jArray);
     }
@@ -295,8 +295,8 @@ TEST_F(Decoding, AppendsEachRowAsAFreshRecord)
         m_jArray);
 }
 
-// The library decodes a row of all fields in a faster way, of which nothing may show.
-TEST_F(Decoding, TakesARowOfAllFieldsAsAnyOther)
+// The library decodes a row of all fields in a faster way. The result must be the same.
+TEST_F(Decoding, TreatsARowOfAllFieldsLikeAnyOther)
 {
     Row row;
     for (const Field& field : fields()) {

@@ -1,4 +1,4 @@
-// What deletions by value refuse. QueryTest and the model show what is deleted.
+// What deletions by value refuse. QueryTest and the test of the model show what is deleted.
 
 #include "AccessTokenUtil.h"
 #include "StoreTest.h"
@@ -47,7 +47,7 @@ TEST_F(Deletion, RefusesListsValuesAndNames)
     EXPECT_FAILURE(byName("1000", "uid"), failed(SERVICE, NO_STRING, EACCES), arraySummary("uid", "1000"),
                    failed(SERVICE, ARRAY_FAILED, EACCES), nameSummary("uid", "1000"));
     EXPECT_EQ(Texts{}, seam().statements());
-    // The table of types decides, as it is now.
+    // The present table of types decides.
     VEMO_ACCESS_TOKEN::tokenType()["uid"][0] = "string";
     EXPECT_EQ(0, byName("1000", "uid"));
 }

@@ -1,4 +1,4 @@
-// The eight exported functions: what each runs and returns, until the end of a thread and of the process.
+// The eight exported functions: what each runs and returns, also at the end of a thread and of the process.
 
 #include <malloc.h>
 #include <pthread.h>
@@ -54,7 +54,7 @@ protected:
         insert(R"({"tid":"old","deadline":1699999999})");
     }
 
-    // The functions, which take references, for values.
+    // The functions take references; these take values.
     static int create(unsigned int uid, const char* szOption, std::string strTid = "")
     {
         Json::Value jOption = json(szOption);
@@ -75,7 +75,7 @@ protected:
     static int deleteByFunction(std::string strTag) { return VemoAccessTokenDeleteByFunction(strTag); }
 };
 
-TEST_F(Exported, PurgeThenOperateAndDoSoAfterAFailedPurge)
+TEST_F(Exported, PurgeFirstAndGoOnAfterAFailedPurge)
 {
     const auto emptyValue = [](const std::string& strField) {
         return Texts{failed(SERVICE, "strValue.empty()"),
@@ -86,7 +86,7 @@ TEST_F(Exported, PurgeThenOperateAndDoSoAfterAFailedPurge)
     const Texts shortTid = {
         failed(SERVICE, "strTidIn.length() < VEMO_ATOKEN_LENGTH_MIN"),
         ordinary(SERVICE, "tokenCreate failed, tid=short, uid=1000, strFunction=VPN, jTokenOption=null")};
-    // The statements follow that of the purge.
+    // These statements follow the purge.
     const auto purges = [&](int (*pCall)(), int nResult, const Texts& statements, const Texts& lines) {
         for (const bool blPurged : {true, false}) {
             SCOPED_TRACE(joined(statements + lines, ""));
@@ -158,7 +158,7 @@ TEST_F(Exported, GenerateNeverTouchesTheDatabase)
     }
 }
 
-TEST_F(Exported, LetExceptionsPassOnceTheDatabaseIsClosed)
+TEST_F(Exported, CloseTheDatabaseBeforeAnExceptionPasses)
 {
     const auto throws = [](int (*pCall)(), const Texts& statements) {
         seam().calls.clear();
@@ -172,7 +172,7 @@ TEST_F(Exported, LetExceptionsPassOnceTheDatabaseIsClosed)
     EXPECT_EQ("2", countOf());
 }
 
-// The grant that tells the name of the token's user
+// The grant that returns the name of the token's user
 
 class GrantWithName : public Exported {
 protected:
@@ -220,7 +220,7 @@ TEST_F(GrantWithName, LooksTheUserUpByTheNarrowedUid)
     EXPECT_STREQ("root", m_szUser);
 }
 
-TEST_F(GrantWithName, WritesWhatFits)
+TEST_F(GrantWithName, WritesAsMuchOfTheNameAsFits)
 {
     const size_t cbHuge = static_cast<size_t>(UINT_MAX) + 1;
     query("UPDATE token SET count = -1");
@@ -248,12 +248,12 @@ TEST_F(GrantWithName, WritesWhatFits)
 }
 
 // (A sanitizer has its own allocator, and reports leaks at exit.)
-TEST_F(GrantWithName, LeaksNoUser)
+TEST_F(GrantWithName, FreesTheUser)
 {
     size_t cbBefore = 0;
     setUser(std::string(1000, 'x'));
     query("UPDATE token SET count = -1");
-    for (int i = 0; i < 2; ++i) { // what the first round makes may stay
+    for (int i = 0; i < 2; ++i) { // what the first round allocates may stay
         cbBefore = mallinfo2().uordblks;
         for (int nGrant = 0; nGrant < 10; ++nGrant) {
             EXPECT_EQ(-1, grant());
@@ -264,10 +264,10 @@ TEST_F(GrantWithName, LeaksNoUser)
     EXPECT_GT(cbBefore + 5000, mallinfo2().uordblks);
 }
 
-TEST_F(GrantWithName, SpendsTheUseThoughTheUserCannotBeFound)
+TEST_F(GrantWithName, SpendsTheUseEvenIfTheUserIsNotFound)
 {
     seam().fail("getpwuid_r", EIO);
-    EXPECT_EQ(0, grant(0)); // nobody is looked up where no name is wanted
+    EXPECT_EQ(0, grant(0)); // no user is looked up if no name is asked for
     EXPECT_EQ("1", countOf());
     EXPECT_FAILURE(grant(), failed(WRAPPER, "0 > VEMOUserGetByUID(jToken[\"uid\"].asInt64(), &pUser)", EIO));
     EXPECT_EQ(std::string(16, '#'), m_szUser);
@@ -288,7 +288,7 @@ TEST_F(Exported, GrantInHandlersAtTheEndOfTheProcess)
 {
     const auto grantAtExit = [] { atexit([] { _exit(isGranted() ? 0 : 1); }); };
     query("UPDATE token SET count = -1");
-    // The library keeps something from the first grant on, also for a handler that was there before it.
+    // The library keeps an object from the first grant on. A handler that was registered earlier runs later.
     for (const bool blBefore : {false, true}) {
         EXPECT_EXIT(
             {
@@ -312,7 +312,7 @@ TEST_F(Exported, GrantAtTheEndOfAThread)
 {
     bool blGranted = false;
     std::thread([&] {
-        // Made ahead of what the library keeps for the thread, so destroyed after it.
+        // Made before the library's own object of the thread, so it is destroyed after that.
         static thread_local LastGrant lastGrant;
         lastGrant.pGranted = &blGranted;
         isGranted();
@@ -320,8 +320,8 @@ TEST_F(Exported, GrantAtTheEndOfAThread)
     EXPECT_TRUE(blGranted);
 }
 
-// The library keeps an object for each thread under a key. A process has only so many keys.
-TEST_F(Exported, GrantThoughTheProcessHasNoKeyLeft)
+// The library keeps an object for each thread under a key. The keys of a process are limited.
+TEST_F(Exported, GrantEvenIfTheProcessHasNoKeyLeft)
 {
     pthread_key_t key;
     while (0 == pthread_key_create(&key, nullptr)) {

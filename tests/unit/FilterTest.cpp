@@ -17,7 +17,7 @@ const std::string LIST_JSON_FAILED = "NULL == (szSql = sqlite3_mprintf(\"%q\", j
 const std::string MATCH_FAILED = "0 > SqlMakeByMatchField(jmFieldName[i], jTmp, strSqlWhereOut)";
 const std::string LIST_FAILED = "0 > SqlMakeByListField(jmFieldName[i].c_str(), jTmp, strSqlWhereOut)";
 
-// The builders append their text to m_strOut, and change nothing else.
+// The builders append their text to m_strOut and change nothing else.
 class Filter : public SeamTest {
 protected:
     int where(const std::string& strFilter, bool bAnd = true)
@@ -38,7 +38,7 @@ protected:
         return builds(jFilter, [&](Json::Value& j) { return m_db.SqlFilterConditionFromJson(j, m_strOut); });
     }
 
-    // Lets the nCall-th text for SQL, from now on, fail.
+    // Makes the nCall-th text for SQL fail, counted from now on.
     static void failText(int nCall = 1)
     {
         seam().counts.clear();
@@ -79,12 +79,12 @@ TEST_F(Filter, MakesOneConditionOfTheFields)
     makes(R"({"extra":[{"a":1}],"webapi_allow":"x"})", true,
           R"( (extra in ('{"a":1}' ) and webapi_allow='"x"' ))", 0);
     makes(R"({"uid":"7 or 1=1"})", true, " (uid=7 or 1=1 )", 0);
-    // Names that are no fields are passed over, whatever their values are.
+    // Names that are not fields are ignored, whatever their values are.
     makes("{}", true, "", 1);
     makes(R"({"sort_by":"uid","sort_direction":"desc","limit":1,"offset":2})", true, "", 1);
     makes(R"({"foo":{"a":1},"":[1],"Tid":"x","tid ":"x","tid\u0000":"x","TID":null})", true, "", 1);
     makes(R"({"foo":{},"uid":1,"limit":{},"zzz":[[]]})", true, " (uid=1 )", 0);
-    // An empty list leaves the joining words.
+    // An empty list leaves the words between conditions.
     makes(R"({"count":1,"uid":[]})", true, " (count=1 and  )", 0);
     makes(R"({"count":[],"uid":1})", true, " ( and uid=1 )", 0);
     makes(R"({"count":[],"deadline":[],"uid":[]})", false, " ( or  or  )", 0);
@@ -92,7 +92,7 @@ TEST_F(Filter, MakesOneConditionOfTheFields)
 
 TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
 {
-    // The text nCall gets no memory; with 0, the filter is wrong.
+    // There is no memory for the text nCall; with 0, the filter is wrong.
     const auto keeps = [&](const char* szFilter, int nCall, const char* szKept, const std::string& strInner,
                            const std::string& strOuter) {
         SCOPED_TRACE(szFilter);
@@ -117,9 +117,9 @@ TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
     keeps(R"({"count":[1],"uid":[1,2,3]})", 4, "held (count in (1 ) and ", LIST_TEXT_FAILED, LIST_FAILED);
 }
 
-TEST_F(Filter, WritesEachValueAsItsFieldDemands)
+TEST_F(Filter, WritesEachValueByTheTypeOfItsField)
 {
-    // In a condition of its own and as an element of a list, for a field of text, of JSON and of a number.
+    // As a single value and as an element of a list, for a field of text, of JSON and of a number.
     const auto writes = [&](const std::string& strValue, const std::string& strText,
                             const std::string& strJson, const std::string& strNumber) {
         for (const Field& field : fields()) {
@@ -135,7 +135,7 @@ TEST_F(Filter, WritesEachValueAsItsFieldDemands)
             m_strOut = "held ";
             EXPECT_EQ(0, list(field.szName, json("[" + strValue + "]")));
             EXPECT_EQ("held " + strName + " in (" + strSql + " )", m_strOut);
-            // Nothing separates elements.
+            // There is no separator between elements.
             m_strOut.clear();
             EXPECT_EQ(0, list(field.szName, json("[" + strValue + "," + strValue + "," + strValue + "]")));
             EXPECT_EQ(strName + " in (" + strSql + strSql + strSql + " )", m_strOut);
@@ -177,7 +177,7 @@ TEST_F(Filter, FollowsTheTypeTable)
             EXPECT_EQ(" (colour=" + strSql + " ) (colour in (" + strSql + " ) )", m_strOut);
         }
     }
-    // The library's own fields are no exception.
+    // This is true of the library's own fields too.
     tokenType()["uid"][0] = "string";
     tokenType().removeMember("tid");
     m_strOut.clear();
@@ -186,7 +186,7 @@ TEST_F(Filter, FollowsTheTypeTable)
     EXPECT_FAILURE(match("tid", "a"), failed(STORE, "!jTokenType.isMember(strField)"));
 }
 
-TEST_F(Filter, RefusesWhatItCannotUse)
+TEST_F(Filter, RefusesUnusableValues)
 {
     const Json::Value jText = "text";
     const auto refuses = [&](int nResult, const std::string& strCondition, int nErrno = 0) {
@@ -209,7 +209,7 @@ TEST_F(Filter, RefusesWhatItCannotUse)
     EXPECT_EQ("held", m_strOut);
 }
 
-TEST_F(Filter, ReadsGapsInListsAsNullAndLeavesThem)
+TEST_F(Filter, ReadsGapsInListsAsNullAndDoesNotFillThem)
 {
     Json::Value jList;
     jList[2] = "a";
@@ -242,15 +242,14 @@ TEST_F(Filter, SortsByATextAndInOneOfTwoDirections)
     appends(R"({"limit":0,"offset":0})", " LIMIT  OFFSET ");
     appends(R"({"offset":3})", "");
     appends(R"({"tid":"a","foo":1})", "");
-    appends(R"({"sort_direction":{},"offset":"x"})", ""); // what is not read does not matter
+    appends(R"({"sort_direction":{},"offset":"x"})", ""); // values that are not read do not matter
 }
 
 TEST_F(Filter, WritesTheTailOfTheKeywordThatTheNumberPointsTo)
 {
     const Json::Int64 n2To32 = Json::Int64(1) << 32;
     const std::string strLimit = " LIMIT ", strOffset = " OFFSET ";
-    // The positions that numbers point to, modulo 2^32. Other values are read as numbers, and a fraction is
-    // cut off.
+    // Numbers are positions, modulo 2^32. Other values are read as numbers, and a fraction is cut off.
     const auto points = [&](const Json::Value& jNumber, size_t nFirst) {
         SCOPED_TRACE(jNumber.asString());
         Json::Value jFilter;

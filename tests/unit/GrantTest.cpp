@@ -1,5 +1,5 @@
-// Granting tokens: what is run, refused and logged. The model shows who is granted what, and how many uses
-// are left.
+// Granting tokens: what is run, refused and logged. The test of the model shows which calls are granted, and
+// how many uses are left.
 
 #include <functional>
 
@@ -36,7 +36,7 @@ protected:
     Json::Value m_jToken;
 };
 
-TEST_F(Grant, SpendsOneUseWithItsStepsInDebugMode)
+TEST_F(Grant, SpendsOneUseAndLogsTheStepsInDebugMode)
 {
     const std::string strReplace = saveSql("REPLACE", counted(1));
     const std::string strSuccess = ordinary(SERVICE, "token grant success!!");
@@ -62,7 +62,7 @@ TEST_F(Grant, SpendsOneUseWithItsStepsInDebugMode)
     spends(-1, "-1", -1, {});
 }
 
-TEST_F(Grant, RefusesAndSpendsNothing)
+TEST_F(Grant, SpendsNothingWhenItRefuses)
 {
     const std::string strNoTid = failed(SERVICE, "strTid.empty()");
     const std::string strNoApi = failed(SERVICE, "!szWebapiName || !szWebapiName[0]");
@@ -91,7 +91,7 @@ TEST_F(Grant, RefusesAndSpendsNothing)
     EXPECT_EQ((Texts{row(token())}), rows());
 }
 
-// A table that another program made may lack columns.
+// A table that another program has made may lack columns.
 TEST_F(Grant, RefusesRecordsThatLackMembers)
 {
     const std::string strDegrade = failed(SERVICE, "0 > tokenCountDegrade(jToken)");
@@ -114,8 +114,8 @@ TEST_F(Grant, RefusesRecordsThatLackMembers)
     }
 }
 
-// Nothing is locked between the lookup and the change: another process may come in between.
-TEST_F(Grant, OverlapsWithOthersAndLosesWhatTheyDid)
+// Nothing is locked between the lookup and the change: another process can make a change in between.
+TEST_F(Grant, OverwritesOverlappingChanges)
 {
     const auto grantElsewhere = [] {
         std::string strTid = "t";
@@ -141,9 +141,9 @@ TEST_F(Grant, OverlapsWithOthersAndLosesWhatTheyDid)
         3, [&] { query("DELETE FROM token"); }, "2", 2);
 }
 
-// Counting by itself, also of records that come from no table. With a use left, a save needs all fields, and
-// the count stays lowered when it is refused.
-TEST_F(Grant, CountNeedsNothingButTidAndCountAtTheLastUse)
+// The counting alone, also for records that are not from a table. With a use left, a save needs all fields;
+// if the save is refused, the count in the record stays lowered.
+TEST_F(Grant, CountNeedsOnlyTidAndCountAtTheLastUse)
 {
     const struct {
         const char *szRecord, *szAfter;

@@ -1,5 +1,5 @@
-// Exported functions that a program replaces by its own: the library calls these, from within as well, and
-// passes their failures on. Nothing else causes such failures.
+// Exported functions that a program replaces by its own: the library calls these too, and passes their
+// failures on. Nothing else can cause such failures.
 
 #include <dlfcn.h>
 #include <unistd.h>
@@ -107,7 +107,7 @@ TEST_F(Interposed, FailuresArePassedOn)
     EXPECT_FAILURE(
         api().tokenUpdateByTid(strTid, jToken),
         allFailed(SERVICE, {strGetOne, strGetOne, "0 > (nCount = tokenGetByTid(strTid, jToken))"}));
-    // Whatever goes wrong with the filter, a deletion by value never empties the table.
+    // Even if the filter is wrong, a deletion by value never empties the table.
     g_nList = -1;
     EXPECT_FAILURE(api().tokenGetByTidArray(values, jArray),
                    failed(SERVICE, "0 > VectorParamToJson(strTidVector, \"tid\", jParam)"));
@@ -116,7 +116,7 @@ TEST_F(Interposed, FailuresArePassedOn)
     g_nList = 0;
     EXPECT_FAILURE(api().tokenDeleteByArray(values, "tid"), failed(STORE, "strSql.empty()"),
                    failed(SERVICE, "0 > (err = m_pDb->tokenDelete(jParam))"), strSummary);
-    // A grant that hands back a record without a uid.
+    // A grant that returns a record without a uid.
     EXPECT_FAILURE(VemoAccessTokenGrant(strTid, "Api", "get", szUser, sizeof(szUser)),
                    failed(WRAPPER, "!jToken.isMember(\"uid\")"));
     EXPECT_STREQ("before", szUser);
@@ -134,7 +134,7 @@ TEST_F(Interposed, OpeningSucceedsWithoutATable)
     EXPECT_EQ((Texts{UID, RAISE, ACCESS, TOUCH, CHMOD, OPEN, RAISE}), seam().callsOf(OPENING_CALLS));
 }
 
-// A fresh record is always an object, so only a wrong answer reaches the check, which asks up to twice.
+// A new record is always an object, so only a wrong answer fails the check, which asks once or twice.
 TEST_F(Interposed, RowsBecomeRecordsThatAreObjectsOrNull)
 {
     Json::Value jAll(Json::objectValue);

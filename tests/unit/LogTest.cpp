@@ -1,5 +1,5 @@
-// The two switches of the log, its two destinations, and the forms of its lines. All tests of the unit run
-// with both destinations.
+// The two switches of the log, its two destinations, and the forms of its lines. All unit tests run with both
+// destinations.
 
 #include "AccessTokenUtil.h"
 #include "StoreTest.h"
@@ -13,7 +13,7 @@ using VEMO_ACCESS_TOKEN::logToStdout;
 using VEMO_ACCESS_TOKEN::logToStdoutGet;
 using VEMO_ACCESS_TOKEN::tokenType;
 
-// The process decides the identity of its lines in the system log, not the library.
+// The process chooses the name under which its lines are in the system log, not the library.
 extern "C" void openlog(const char*, int, int)
 {
     ADD_FAILURE() << "the library calls openlog";
@@ -39,7 +39,7 @@ void checkACountOfText()
     EXPECT_EQ(-1, checkJsonType(jToken));
 }
 
-// The library logs as it does before any switch is set.
+// Tests of the log before any switch is set.
 class Log : public SeamTest {
 protected:
     Log() { m_blStdout = false; }
@@ -52,12 +52,12 @@ protected:
     }
 };
 
-TEST_F(Log, ToStdoutNeverGoesOff)
+TEST_F(Log, ToStdoutStaysOn)
 {
     expectLatch(logToStdout, logToStdoutGet, debugInfoGet);
 }
 
-TEST_F(Log, OfDebugLinesNeverGoesOff)
+TEST_F(Log, OfDebugLinesStaysOn)
 {
     expectLatch(debugInfo, debugInfoGet, logToStdoutGet);
 }
@@ -116,9 +116,9 @@ TEST_F(LogLine, HasOneOfFiveFormsAndLeavesErrno)
     }
 }
 
-TEST_F(LogLine, TellsErrnoAlthoughItsArgumentsChangeIt)
+TEST_F(LogLine, ShowsErrnoEvenIfItsArgumentsChangeIt)
 {
-    tokenType(); // made now, so that the line's arguments are the only allocations
+    tokenType(); // made now, so that only the line's arguments allocate
     Json::Value jToken = json(R"({"count":"5"})");
     g_pAllocation = [] { errno = EAGAIN; }; // the allocation succeeds
     errno = EACCES;

@@ -33,7 +33,7 @@ TEST_F(Permission, IsDecidedAndExplainedInDebugMode)
     for (const bool blDebug : {false, true}) {
         debugInfo(blDebug);
         const int nErrno = blDebug ? EACCES : 0;
-        // szCondition is that of the failure line, when there is one.
+        // szCondition is the condition in the failure line, if there is one.
         const auto decides = [&](const std::string& strRecord, const char* szApi, const char* szMethod,
                                  int nResult, const char* szCondition = nullptr) {
             SCOPED_TRACE(::testing::Message() << strRecord << " " << (szApi ? szApi : "(null)") << " "
@@ -65,7 +65,7 @@ TEST_F(Permission, IsDecidedAndExplainedInDebugMode)
         // Elements are read as text, up to the one that matches.
         decides(entry(R"({"method":[5,"get",{}]})"), "A", "5", 1);
         decides(entry(R"({"method":[5,"get",{}]})"), "A", "get", 1);
-        // Nothing but webapi_allow is looked at.
+        // Only webapi_allow is read.
         decides(R"({"count":0,"deadline":-1,"tid":5,"webapi_allow":{"A":{"method":["get"]}}})", "A", "get",
                 1);
 

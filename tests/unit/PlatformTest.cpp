@@ -71,7 +71,7 @@ TEST_F(Touch, ClosesItsDescriptorWhichNoChildInherits)
     close(nInput);
 }
 
-TEST_F(Touch, LeavesAFileAlone)
+TEST_F(Touch, LeavesAnExistingFileUnchanged)
 {
     const std::string strPath = file("old");
     std::ofstream(strPath) << "content";
@@ -91,7 +91,7 @@ TEST_F(Touch, LeavesAFileAlone)
     EXPECT_EQ("content", strContent);
 }
 
-TEST_F(Touch, FailsWhereNoFileCanBe)
+TEST_F(Touch, FailsWhereNoFileCanBeMade)
 {
     std::ofstream{file("plain")};
     ASSERT_EQ(0, symlink("loop", file("loop").c_str()));
@@ -108,7 +108,7 @@ TEST_F(Touch, FailsWhereNoFileCanBe)
     }
     EXPECT_FALSE(std::filesystem::exists(file("missing")) || std::filesystem::exists(file("target")));
 
-    // Without a descriptor it fails though the file is there.
+    // Without a free descriptor it fails although the file exists.
     struct rlimit before = {};
     ASSERT_EQ(0, getrlimit(RLIMIT_NOFILE, &before));
     const struct rlimit none = {0, before.rlim_max};
@@ -148,7 +148,7 @@ private:
 
 TEST(RandomNumber, HasBothBoundsAndNoBias)
 {
-    // 129 numbers fit so many times into 64 bits; greater draws would favour some and are drawn again.
+    // This many times, 129 numbers fit into 64 bits. Greater draws would favour some, and are drawn again.
     const uint64_t nLimit = UINT64_MAX / 129 * 129;
     const auto gives = [&](int nMin, int nMax, const std::vector<uint64_t>& draws, int nExpected) {
         SCOPED_TRACE(draws.front());
@@ -169,7 +169,7 @@ TEST(RandomNumber, HasBothBoundsAndNoBias)
     gives(0, INT_MAX, {0x80000000}, 0);
 }
 
-TEST(RandomNumber, FailsForWrongBoundsAndWithItsSource)
+TEST(RandomNumber, FailsForWrongBoundsAndWhenItsSourceFails)
 {
     for (const auto& [nMin, nMax] :
          {std::pair<int, int>{-1, 5}, {6, 5}, {-2, -1}, {INT_MIN, INT_MAX}, {INT_MAX, 0}}) {
@@ -229,7 +229,7 @@ TEST(RandomString, MayBeOfAnyLength)
     }
 }
 
-TEST(RandomString, FailsForWrongAlphabetsAndWithItsSource)
+TEST(RandomString, FailsForWrongAlphabetsAndWhenItsSourceFails)
 {
     const struct {
         size_t nChoices, cbServed;
@@ -265,7 +265,7 @@ TEST_F(KernelRandom, JoinsShortReadsAndStopsAtAFailure)
         SCOPED_TRACE(::testing::PrintToString(row.reads));
         seam().random = [&, nCall = size_t(0), nByte = 0](void* pBuffer, size_t cbBuffer,
                                                           unsigned int nFlags) mutable {
-            const int nRead = row.reads.at(nCall++); // never one call too many
+            const int nRead = row.reads.at(nCall++); // throws at one call too many
             EXPECT_EQ(0u, nFlags);
             EXPECT_LE(nRead, static_cast<int>(cbBuffer));
             for (int i = 0; i < nRead; ++i) {
@@ -283,7 +283,7 @@ TEST_F(KernelRandom, JoinsShortReadsAndStopsAtAFailure)
 
 // The user database
 
-// A name at the end of a page, after which nothing can be read.
+// A name at the end of a page; the memory after it cannot be read.
 char* nameAtTheEndOfMemory()
 {
     const size_t cbPage = static_cast<size_t>(sysconf(_SC_PAGESIZE));
@@ -301,7 +301,7 @@ protected:
     VEMOUser* m_pUser = nullptr;
 };
 
-TEST_F(User, IsFoundWithANameOfItsOwn)
+TEST_F(User, IsFoundWithACopyOfTheName)
 {
     char* const szName = nameAtTheEndOfMemory();
     seam().getUser = [=](uid_t, struct passwd* pEntry, char*, size_t, struct passwd** ppEntry) {
@@ -310,7 +310,7 @@ TEST_F(User, IsFoundWithANameOfItsOwn)
         return 0;
     };
     seam().fail("operator new[]", 0, 2, 2);
-    EXPECT_EQ(-1, VEMOUserGetByUID(1026, &m_pUser)); // without memory for it
+    EXPECT_EQ(-1, VEMOUserGetByUID(1026, &m_pUser)); // there is no memory for the copy
     EXPECT_EQ(ENOMEM, errno);
     EXPECT_EQ(nullptr, m_pUser);
     seam().calls.clear();

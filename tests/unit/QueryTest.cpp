@@ -1,5 +1,5 @@
 // Reading and deleting the tokens of the store that a filter selects: the statements, and what is refused.
-// The model shows what is found and deleted.
+// The test of the model shows what is found and deleted.
 
 #include "AccessTokenUtil.h"
 #include "Statements.h"
@@ -27,7 +27,7 @@ protected:
         insert(R"({"tid":"Ef56","uid":7,"create_time":200,"function":"FTP"})");
     }
 
-    // The operations, given their filter as text.
+    // The operations, with the filter as text.
     int get(const std::string& strFilter, const char* szOut = "null")
     {
         Json::Value jFilter = json(strFilter);
@@ -45,7 +45,7 @@ protected:
         return m_db.tokenGetOne(szName, strValue, m_jOut);
     }
 
-    // The ids in m_jOut, with blanks between.
+    // The ids in m_jOut, separated by blanks.
     std::string found() const
     {
         Texts ids;
@@ -78,7 +78,7 @@ TEST_F(Query, RunsTheStatementThatTheFilterMakes)
     finds(R"({"tid":["Ab12","Cd34"]})", " WHERE  (tid in ('Ab12''Cd34' ) )", ""); // one value
 }
 
-TEST_F(Query, FailsWhereSqliteRefusesTheStatement)
+TEST_F(Query, FailsWhenSqliteRefusesTheStatement)
 {
     const auto fails = [&](const char* szFilter, const std::string& strCondition,
                            const std::string& strError) {
@@ -96,7 +96,7 @@ TEST_F(Query, FailsWhereSqliteRefusesTheStatement)
     fails(R"({"uid":[]})", " ( )", "near \")\": syntax error");
 }
 
-TEST_F(Query, RefusesWhatItCannotUseAndRunsNothing)
+TEST_F(Query, RefusesUnusableArgumentsAndRunsNothing)
 {
     const std::string strNoFilter = failed(STORE, "jTokenParam.type() != Json::objectValue");
     const std::string strNoName = failed(STORE, "!szName || !szName[0]");
@@ -113,7 +113,7 @@ TEST_F(Query, RefusesWhatItCannotUseAndRunsNothing)
     EXPECT_EQ(json(R"({"old":1})"), m_jOut);
     EXPECT_FAILURE(get(R"({"tid":{"a":1}})"), nested);
     EXPECT_FAILURE(remove(R"({"tid":{"a":1}})", true), nested);
-    // The text of the field is the first, that of the order the second.
+    // The first text is the field's, the second the order's.
     seam().fail("sqlite3_mprintf", ENOMEM, 2, 2);
     EXPECT_FAILURE(
         get(R"({"uid":7,"sort_by":"uid"})"),
@@ -123,7 +123,7 @@ TEST_F(Query, RefusesWhatItCannotUseAndRunsNothing)
 }
 
 // The statement has taken effect. FailedStore in ServiceTest shows how the service reports it.
-TEST_F(Query, ReportsFailureAfterALockThatItWaitedOut)
+TEST_F(Query, ReportsFailureAfterWaitingForALock)
 {
     Json::Value jToken = token();
     const std::string strDelete = "DELETE FROM token WHERE  (uid=7 );";
@@ -162,7 +162,7 @@ TEST_F(Query, GetsTheFirstRowWhoseFieldMatches)
     };
     getsOne("tid", "Ab12", " WHERE  (tid='Ab12' )");
     getsOne("uid", "1024", " WHERE  (uid=1024 )");
-    getsOne("foo", "x", ""); // what is no field selects the whole table
+    getsOne("foo", "x", ""); // an unknown field selects the whole table
 }
 
 TEST_F(Query, DeletesWhatTheFilterSelects)
@@ -181,7 +181,7 @@ TEST_F(Query, DeletesWhatTheFilterSelects)
             "DELETE FROM token WHERE  (bind_sid='S1' and function='VPN' );", 1, "Cd34 Ef56");
     deletes("{}", true, "DELETE FROM token;", 3, "");
     deletes("{}", false, "earlier", -1, ALL);
-    // A condition counts whatever bAll says; order and paging do not.
+    // A condition has effect whatever bAll is; order and paging have none.
     deletes(R"({"uid":7,"sort_by":5})", true, "DELETE FROM token WHERE  (uid=7 );", 1, "Ab12 Cd34");
     deletes(R"({"limit":3})", true, "DELETE FROM token;", 3, "");
 }

@@ -11,7 +11,7 @@ using VEMO_ACCESS_TOKEN::tokenType;
 
 namespace {
 
-// Two values are equal only if their JSON types are, signed and unsigned told apart.
+// Two values are equal only if their JSON types are equal; signed and unsigned are different types.
 class TypeTable : public SeamTest {};
 
 TEST_F(TypeTable, HoldsTypeNameAndDefaultOfEachField)
@@ -36,7 +36,7 @@ TEST_F(TypeTable, IsBuiltOnceAndItsTimeDoesNotReachRecords)
     EXPECT_EQ(Json::Value(Json::Int64(NOW + 5)), jToken["create_time"]);
 }
 
-// The model shows what becomes of records that have some members.
+// The test of the model covers records that have some of the members.
 class Defaults : public SeamTest {};
 
 TEST_F(Defaults, CompleteARecord)
@@ -49,11 +49,11 @@ TEST_F(Defaults, CompleteARecord)
     EXPECT_EQ(fields().size(), jToken.size());
 }
 
-TEST_F(Defaults, CheckTellsTheFirstMissingFieldAndAddsNothing)
+TEST_F(Defaults, CheckLogsTheFirstMissingFieldAndAddsNothing)
 {
     Json::Value jToken = token();
     for (auto field = fields().rbegin(); fields().rend() != field; ++field) {
-        jToken.removeMember(field->szName); // and all that follow are gone already
+        jToken.removeMember(field->szName); // the fields after it are removed already
         const Json::Value jBefore = jToken;
         EXPECT_FAILURE(fillDefaultValue(jToken, true),
                        ordinary(fieldList(field->nLine), std::string("lost data member=") + field->szName));
@@ -63,7 +63,7 @@ TEST_F(Defaults, CheckTellsTheFirstMissingFieldAndAddsNothing)
 
 class TypeCheck : public SeamTest {
 protected:
-    // Checks a record: szMessage is that of the failure line, null when the record passes.
+    // Checks a record. szMessage is the message of the failure line, or null if the record passes.
     static void check(const Json::Value& jRecord, const char* szMessage, int nErrno = 0)
     {
         SCOPED_TRACE(text(jRecord).substr(0, 200));
@@ -82,7 +82,7 @@ protected:
 };
 
 // The table decides: a field that is added to it is checked like the others.
-TEST_F(TypeCheck, AcceptsTheValuesOfEachTypeOnly)
+TEST_F(TypeCheck, AcceptsOnlyValuesOfTheFieldsType)
 {
     const std::set<std::string> integral = {"5", "-5", "-9223372036854775808", "18446744073709551615"};
     const std::set<std::string> others = {"null",  "false", "5.5",        R"("5")",
@@ -116,7 +116,7 @@ TEST_F(TypeCheck, StopsAtTheFirstMemberOfAWrongType)
         jToken[field.szName] = json(field.szWrong);
         checkFails(jToken, field.szName, EACCES);
     }
-    // In the order of the names, whatever else there is.
+    // In the order of the names, whatever the other members are.
     checkFails(json(R"({"uid":"0","tid":1,"count":"%s%n%m%%","bind_sid":"","a":1,"z":1,"Count":[]})"),
                "count");
     Json::Value jLong = json(R"({"count":"5"})");
@@ -124,10 +124,10 @@ TEST_F(TypeCheck, StopsAtTheFirstMemberOfAWrongType)
     checkFails(jLong, "count");
 }
 
-TEST_F(TypeCheck, RefusesWhatIsNoObjectAndUnknownTypeNames)
+TEST_F(TypeCheck, RefusesOtherValuesThanObjectsAndUnknownTypeNames)
 {
     check(Json::Value(), "Failed [!jTokenParam.isObject()], err=Permission denied", EACCES);
-    // The row decoder knows the first of these names, and the check does not.
+    // The row decoder knows the first of these names, but the check does not.
     for (const char* szType : {"Json::Value", "double", "String", "int ", ""}) {
         SCOPED_TRACE(szType);
         tokenType()["count"][0] = szType;

@@ -8,7 +8,7 @@ using VEMO_ACCESS_TOKEN::debugInfo;
 
 namespace {
 
-const std::string UPDATE = "UPDATE token SET extra = '%n%s';"; // of as many rows as there are
+const std::string UPDATE = "UPDATE token SET extra = '%n%s';"; // of all rows
 const std::string UNKNOWN = "Unknow Error!!";
 
 int passOver(void*, int, char**, char**)
@@ -16,14 +16,14 @@ int passOver(void*, int, char**, char**)
     return 0;
 }
 
-// The line of a try that failed.
+// The log line of a failed try.
 std::string tryLine(int nTry, const std::string& strError, const std::string& strSql = UPDATE)
 {
     return ordinary(STORE,
                     "i=" + std::to_string(nTry) + ",run sql failed, error=" + strError + ", sql=" + strSql);
 }
 
-// A store that is open on a table of two tokens.
+// An open store with a table of two tokens.
 class RunSql : public TableTest {
 protected:
     void SetUp() override
@@ -45,7 +45,7 @@ protected:
     }
 };
 
-TEST_F(RunSql, OpensTheDatabaseWhichRunSqlExDoesNot)
+TEST_F(RunSql, OpensTheDatabaseButRunSqlExDoesNot)
 {
     AccessTokenDbApi db;
     EXPECT_EQ(-1, db.runSqlEx(UPDATE, nullptr, nullptr));
@@ -73,7 +73,7 @@ TEST_F(RunSql, RefusesAnEmptyStatement)
     EXPECT_EQ(Texts{}, seam().calls);
 }
 
-// The number is SQLite's own, which statements that change no row leave as it is.
+// The number is SQLite's; statements other than changes do not reset it.
 TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
 {
     const auto returns = [&](const char* szSql, int nChanges) {
@@ -94,7 +94,7 @@ TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
 // The text of the error decides whether a statement is tried again, not the code.
 TEST_F(RunSql, TriesAgainOnlyAfterLocks)
 {
-    // One answer for each try. szError is that of the failure line, null when the statement succeeds.
+    // One answer for each try. szError is the error in the failure line, or null if the statement succeeds.
     const auto runs = [&](const char* szName, const std::vector<SqlAnswer>& answers, const char* szErrAfter,
                           const char* szError) {
         for (const bool blCallback : {false, true}) {
@@ -155,14 +155,14 @@ TEST_F(RunSql, GivesUpAfter500Tries)
 
 // The purge
 
-TEST_F(RunSql, PurgeTakesDeadlinesBeforeNow)
+TEST_F(RunSql, PurgeDeletesTokensWithDeadlinesBeforeNow)
 {
     for (const time_t now : {time_t(0), NOW, time_t(4102444800)}) {
         SCOPED_TRACE(now);
         const std::string strNow = std::to_string(now);
         const std::string strBefore = std::to_string(now - 1);
         const std::string strAfter = std::to_string(now + 1);
-        // Nothing protects -1. A text that is no number comes after all numbers.
+        // -1 is no exception. A text that is not a number is greater than all numbers.
         const Texts kept = {"NULL", strNow, strNow, strAfter, "9223372036854775807", "'never'"};
         query("DELETE FROM token");
         int nTid = 0;
@@ -174,7 +174,7 @@ TEST_F(RunSql, PurgeTakesDeadlinesBeforeNow)
         }
         seam().clock = now;
         m_db.m_strErr = "stale";
-        EXPECT_EQ(0, m_db.cleanExpireToken(true)); // no number
+        EXPECT_EQ(0, m_db.cleanExpireToken(true)); // not a number
         EXPECT_EQ("", m_db.m_strErr);
         EXPECT_EQ(PURGE, m_db.m_strSql);
         EXPECT_EQ(kept, query("SELECT quote(deadline) FROM token ORDER BY rowid"));
@@ -184,9 +184,9 @@ TEST_F(RunSql, PurgeTakesDeadlinesBeforeNow)
     }
 }
 
-// The purge's own lines can be switched off, those that the store writes for any statement cannot. A purge
-// that had to wait for a lock has taken effect, and yet reports failure.
-TEST_F(RunSql, PurgeFailsWithTheLinesThatWereAskedFor)
+// The purge's own lines can be switched off; those that the store writes for any statement cannot. A purge
+// that had to wait for a lock has taken effect, but reports failure.
+TEST_F(RunSql, FailedPurgeLogsItsOwnLinesOnlyOnDemand)
 {
     const std::string strRun = ordinary(STORE, "run sql=" + PURGE);
     const std::string strLocked = tryLine(0, "database is locked", PURGE);

@@ -1,4 +1,4 @@
-// Saving records: the statements, what is refused, and that what was saved comes back as it was.
+// Saving records: the statements, what is refused, and that a saved record is read back equal.
 
 #include <cmath>
 #include <cstdlib>
@@ -28,7 +28,7 @@ protected:
 
     int save(Json::Value jToken, bool blCreate = false) { return m_db.tokenSave(jToken, blCreate); }
 
-    // The record of a token, as it comes back.
+    // The record of a token, as it is read back.
     Json::Value stored(std::string strTid = "t")
     {
         Json::Value jToken;
@@ -36,7 +36,7 @@ protected:
         return jToken;
     }
 
-    // What is saved comes back equal, and once more when that is saved again.
+    // A saved record is read back equal; and again when the result is saved.
     void expectSame(const Json::Value& jJson, const std::string& strText = "t")
     {
         Json::Value jToken = token();
@@ -81,7 +81,7 @@ TEST_F(Save, RunsOneStatement)
 }
 
 // The caller is responsible for types: a value is written as the JSON library converts it.
-TEST_F(Save, WritesEachFieldAsItsTypeDemands)
+TEST_F(Save, WritesEachFieldByItsType)
 {
     const auto writes = [&](const std::string& strField, const char* szValue, const char* szSql) {
         SCOPED_TRACE(strField + " " + szValue);
@@ -102,12 +102,12 @@ TEST_F(Save, WritesEachFieldAsItsTypeDemands)
     writes("extra", R"("\u0000\u001f\n\u007fü")", "'\"\\u0000\\u001f\\n\x7fü\"'");
 }
 
-TEST_F(Save, RefusesARecordThatLacksAFieldAndTellsTheFirst)
+TEST_F(Save, RefusesARecordThatLacksAFieldAndLogsTheFirst)
 {
     m_db.m_strSql = "before";
     Json::Value jRest = token();
     for (auto field = fields().rbegin(); fields().rend() != field; ++field) {
-        jRest.removeMember(field->szName); // and all that follow are gone already
+        jRest.removeMember(field->szName); // the fields after it are removed already
         const std::string strCondition = std::string("!jParam.isMember(\"") + field->szName + "\")";
         errno = EACCES;
         EXPECT_FAILURE(save(jRest), failed(fieldList(field->nLine), strCondition, EACCES));
@@ -124,19 +124,19 @@ TEST_F(Save, FailsWithoutMemoryForTheStatement)
     EXPECT_EQ(Texts{}, seam().statements());
 }
 
-TEST_F(Save, SucceedsWhereNoRowChanges)
+TEST_F(Save, SucceedsWhenNoRowChanges)
 {
     query("CREATE TRIGGER ignore BEFORE INSERT ON token BEGIN SELECT RAISE(IGNORE); END");
     EXPECT_EQ(0, save(token()));
     EXPECT_EQ("", tids());
 }
 
-// What was saved comes back
+// What was saved is read back
 
 TEST_F(Save, KeepsJsonOfAnySizeAndDepth)
 {
     Json::Value jDeep(Json::objectValue);
-    for (int nLevel = 1; nLevel < 1000; ++nLevel) { // as deep as the reader goes
+    for (int nLevel = 1; nLevel < 1000; ++nLevel) { // as deep as the reader reads
         Json::Value jOuter;
         jOuter["a"].swap(jDeep);
         jDeep.swap(jOuter);
@@ -150,7 +150,7 @@ TEST_F(Save, KeepsJsonOfAnySizeAndDepth)
                         "n":[-9223372036854775808,-2147483649,2147483648,4294967295,18446744073709551615]})"));
 }
 
-// Byte for byte, as text and as name: valid UTF-8 or not, and control characters. JSON keeps NUL too.
+// Each byte is kept, in texts and in names: valid UTF-8 or not, and control characters. JSON keeps NUL too.
 TEST_F(Save, KeepsBytes)
 {
     Json::Value jValue;
@@ -186,7 +186,7 @@ TEST_F(Save, KeepsDoublesToTheBit)
 }
 
 // Conditions compare texts, so a value must always become the same text.
-TEST_F(Save, DropsCommentsOtherMembersAndWhatFollowsANul)
+TEST_F(Save, DropsCommentsOtherMembersAndTextAfterANul)
 {
     Json::Value jToken = token(R"({"extra":[1],"more":"text","TID":1,"sort_by":"tid"})");
     jToken["tid"] = std::string("t\0b", 3);

@@ -6,7 +6,7 @@
 #include "Statements.h"
 #include "StoreTest.h"
 
-// Compiled callers hold the object in the space of a pointer.
+// Compiled callers expect the object to have the size of a pointer.
 static_assert(sizeof(AccessTokenApi) == sizeof(void*));
 static_assert(!std::is_polymorphic_v<AccessTokenApi>);
 static_assert(!std::is_copy_constructible_v<AccessTokenApi> && !std::is_copy_assignable_v<AccessTokenApi>);
@@ -18,7 +18,7 @@ const Json::Value UNTOUCHED = "what the caller had";
 
 class ServiceObject : public StoreTest {};
 
-TEST_F(ServiceObject, OpensTheDatabaseOfItsOwnAndClosesItAtItsEnd)
+TEST_F(ServiceObject, OpensItsOwnDatabaseAndClosesItAtItsEnd)
 {
     for (const bool blNew : {true, false}) {
         seam().calls.clear();
@@ -41,7 +41,7 @@ TEST_F(ServiceObject, OpensAgainAfterAFailedOpening)
 {
     Json::Value jFilter;
     Json::Value jTokens(Json::arrayValue);
-    seam().fail("seteuid", EPERM, 1, 4); // each opening raises and puts back
+    seam().fail("seteuid", EPERM, 1, 4); // each opening raises the uid and restores it
     AccessTokenApi api;
     EXPECT_LINES(NOT_ROOT);
     EXPECT_FAILURE(api.tokenList(jFilter, jTokens),
@@ -52,7 +52,7 @@ TEST_F(ServiceObject, OpensAgainAfterAFailedOpening)
     EXPECT_EQ((Texts{OPEN}), seam().callsOf({"sqlite3_open"}));
 }
 
-// A caller may have a failure of its last operation still to report.
+// A caller may still have to report the failure of its last operation.
 TEST_F(ServiceObject, KeepsErrnoAtItsEndAndTriesTwiceToClose)
 {
     seam().sqliteClose = [](sqlite3* pDb) {
@@ -69,8 +69,8 @@ TEST_F(ServiceObject, KeepsErrnoAtItsEndAndTriesTwiceToClose)
     EXPECT_LINES(failed(STORE, "SQLITE_OK != sqlite3_close(m_pDb)", EIO));
 }
 
-// Below the service there is no store, SQLite refuses a statement, or a statement had to wait for a lock and
-// has taken effect. Each step tells of it, up to the operation.
+// The service has no store, SQLite refuses a statement, or a statement had to wait for a lock and has taken
+// effect. Each level logs a line, up to the operation.
 class FailedStore : public TableTest {
 protected:
     // Conditions of the service, and its operations' own lines, which say "failed".
@@ -100,7 +100,7 @@ TEST_F(FailedStore, FailsEachOperation)
     const std::string strInsert = saveSql("INSERT", created(strNew));
     const std::string strReplace = saveSql("REPLACE", jSaved);
 
-    // The conditions above a statement: in the store, and the last at the service's call of the store.
+    // The conditions that fail after a statement: in the store, and the last in the service.
     const Texts toCreate = {"0 > runSql()", "0 > m_pDb->tokenCreate(jParam)"};
     const Texts toUpdate = {"0 > runSql()", "0 > m_pDb->tokenUpdate(jToken)"};
     const Texts toDelete = {"0 > (err = runSql())", "0 > (err = m_pDb->tokenDelete(jParam))"};
@@ -108,7 +108,7 @@ TEST_F(FailedStore, FailsEachOperation)
     const Texts toGetAll = {RUN_FAILED, "0 > m_pDb->tokenGet(jParam, jTokenArrayOut)"};
     const Texts toGet = {RUN_FAILED, "0 > tokenGet(jParam, jTokenArray)",
                          "0 > (rv = m_pDb->tokenGetOne(\"tid\", strTid, jTokenOut))"};
-    // What the service logs above that.
+    // What the service logs after them.
     const Texts notCreated = {"tokenCreate failed, tid=" + strNew +
                               ", uid=1000, strFunction=VPN, jTokenOption=null"};
     const Texts saved = {"tokenSaveByOverwrite failed, jToken=" + text(jSaved)};
@@ -148,7 +148,7 @@ TEST_F(FailedStore, FailsEachOperation)
                                            inService);
         EXPECT_EQ(0 == strSql.find("SELECT"), before == rows());
         EXPECT_EQ(UNTOUCHED, jOut);
-        if (strSql == seam().statements().front()) { // without a store, nothing comes before
+        if (strSql == seam().statements().front()) { // only the first statement can fail for lack of a store
             reset();
             EXPECT_FAILURE(operate(apiWithoutStore), lines(Texts{"!m_pDb"} + above, 0));
             EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
@@ -186,19 +186,19 @@ TEST_F(FailedStore, FailsEachOperation)
     errno = 0;
     EXPECT_FAILURE(apiWithoutStore.tokenDeleteAll(), failed(SERVICE, "!m_pDb"));
     EXPECT_EQ(-1, apiWithoutStore.tokenCreate(uid, strFunction, jNull, strTid));
-    EXPECT_EQ(3u, takeLines().size()); // they hold a random id
+    EXPECT_EQ(3u, takeLines().size()); // they contain a random id
     EXPECT_EQ("t", strTid);
     EXPECT_FAILURE(apiWithoutStore.cleanExpireToken(true), failed(SERVICE, "!m_pDb"));
     EXPECT_EQ(-1, apiWithoutStore.cleanExpireToken(false));
     VEMO_ACCESS_TOKEN::debugInfo(true);
     EXPECT_FAILURE(apiWithoutStore.cleanExpireToken(false),
                    fail(SERVICE, "run fail 0 > m_pDb->cleanExpireToken(blLogErr)"));
-    // These need none.
+    // These need no store.
     EXPECT_EQ(0, apiWithoutStore.VectorParamToJson(tids, "tid", jAll));
     EXPECT_EQ(0, apiWithoutStore.tokenCountDegrade(jToken = counted(-1)));
 }
 
-// QueryTest and the model show what else is found.
+// QueryTest and the test of the model show the rest.
 class Lookup : public TableTest {};
 
 TEST_F(Lookup, TakesAListOfIdsForOneTextWithoutSeparators)

@@ -72,7 +72,7 @@ TEST_F(System, KeepsTokensInAPrivateFileOfRoot)
     expectPrivateFileOfRoot();
 }
 
-// Why a process should stay at effective uid 0: SQLite opens the journal for each change anew.
+// This is why a process should stay at effective uid 0: SQLite opens the journal anew for each change.
 TEST_F(System, OpensAsRootButCannotWriteAtAnotherEffectiveUid)
 {
     Json::Value jTokens;

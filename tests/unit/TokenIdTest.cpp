@@ -13,7 +13,7 @@ namespace {
 class TokenId : public SeamTest {};
 
 // Eight bytes, the least significant first, choose the length; then each byte chooses one of 62 characters.
-// The 8 greatest bytes would favour the first characters and are skipped.
+// The 8 greatest values of a byte would favour the first characters; they are skipped.
 TEST_F(TokenId, TakesCharactersInTheOrderOfTheAlphabet)
 {
     const std::string strAlphabet = "0987654321abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ";

@@ -1,4 +1,4 @@
-// Changing tokens, field by field and as a whole. The model shows more of what is changed.
+// Changing tokens, field by field and as a whole. The test of the model covers more changes.
 
 #include "AccessTokenUtil.h"
 #include "Statements.h"
@@ -6,7 +6,7 @@
 
 namespace {
 
-// The lines of a save by overwriting that the service refuses.
+// What is logged when the service refuses a save by overwriting.
 Texts refusedLines(const std::string& strCondition, const Json::Value& jToken)
 {
     return {failed(SERVICE, strCondition),
@@ -28,7 +28,7 @@ protected:
     }
 };
 
-TEST_F(Update, ReplacesTheFieldsThatAreGivenInTheListsOrder)
+TEST_F(Update, ReplacesTheGivenFieldsInTheOrderOfTheList)
 {
     const Texts lookedUp = {ordinary(STORE, "run sql=" + selectSql("t"))};
     VEMO_ACCESS_TOKEN::debugInfo(true);
@@ -55,7 +55,7 @@ TEST_F(Update, ReplacesTheFieldsThatAreGivenInTheListsOrder)
         EXPECT_EQ((jChange.isMember("tid") ? Texts{row(jExpected), row(token())} : Texts{row(jExpected)}),
                   rows());
     };
-    Json::Value jAll = json(R"({"colour":"red"})"); // what is no field is passed over
+    Json::Value jAll = json(R"({"colour":"red"})"); // other members than fields are ignored
     replaces(jAll);
     for (const Field& field : fields()) {
         Json::Value jOne;
@@ -64,7 +64,7 @@ TEST_F(Update, ReplacesTheFieldsThatAreGivenInTheListsOrder)
     }
     replaces(jAll);
     EXPECT_EQ(0, update(jAll, "unknown"));
-    EXPECT_LINES(ordinary(STORE, "run sql=" + selectSql("unknown"))); // none for a missing token
+    EXPECT_LINES(ordinary(STORE, "run sql=" + selectSql("unknown"))); // no REPLACE for a missing token
 }
 
 TEST_F(Update, RefusesBadArguments)
@@ -83,8 +83,8 @@ TEST_F(Update, RefusesBadArguments)
     EXPECT_EQ((Texts{row(token())}), rows());
 }
 
-// No transaction holds reading and writing together.
-TEST_F(Update, WinsOverWhatOthersDidSinceItsRead)
+// Reading and writing are not one transaction.
+TEST_F(Update, OverwritesChangesMadeSinceItsRead)
 {
     for (const char* szOthers : {"UPDATE token SET uid = 7, count = 8", "DELETE FROM token"}) {
         SCOPED_TRACE(szOthers);
