@@ -25,7 +25,7 @@
 
 namespace {
 
-// The errno with which the next calls of flock() and fstat() fail; 0 stands for a real call. When the list is
+// The errno with which the next calls of flock() and fstat() fail; 0 makes the real call. When the list is
 // empty, all calls are real.
 std::deque<int> g_rgErrors;
 std::atomic<int> g_nLocks(0); // calls of flock()
@@ -57,7 +57,7 @@ namespace {
 
 class SerialisingLock : public ::testing::Test {
 protected:
-    // Takes the lock of a file and releases it. Returns 0, or the errno why it could not be taken.
+    // Takes the lock of a file and releases it. Returns 0, or the errno of the failure.
     template <typename... Wait>
     static int lockOnce(const std::string& strFile, Wait... wait)
     {
@@ -82,7 +82,7 @@ TEST_F(SerialisingLock, GrantsToThreadsExactly)
     const int nUses = static_cast<int>(scaled(50));
     const unsigned int nThreads = 4;
     m_calls.prepare({{"shared", nUses}});
-    VEMO_ACCESS_TOKEN::tokenType(); // filled without a lock, so ahead of the threads
+    VEMO_ACCESS_TOKEN::tokenType(); // filled without a lock, so before the threads start
 
     std::atomic<int> nGranted(0);
     std::vector<std::thread> threads;
@@ -100,8 +100,8 @@ TEST_F(SerialisingLock, GrantsToThreadsExactly)
     EXPECT_EQ(Tokens(), m_calls.tokens());
 }
 
-// Whatever a killed process was doing, the others' calls succeed: the kernel frees its lock, and the next
-// call undoes what it left half done.
+// Wherever a process is killed, the others' calls succeed: the kernel releases its lock, and the next call
+// undoes the change that it has not finished.
 TEST_F(SerialisingLock, GoesOnWhenAHolderIsKilled)
 {
     const int nKills = static_cast<int>(scaled(50));
@@ -125,7 +125,7 @@ TEST_F(SerialisingLock, GoesOnWhenAHolderIsKilled)
 }
 
 // A child that is forked meanwhile has the descriptor too. It neither releases nor keeps the lock.
-TEST_F(SerialisingLock, IsItsMakersAlone)
+TEST_F(SerialisingLock, BelongsToItsMakerAlone)
 {
     std::optional<CallLock> lock(std::in_place, m_strFile.c_str());
     EXPECT_TRUE(endsWell(startProcess([] {})));
@@ -154,7 +154,7 @@ TEST_F(SerialisingLock, MakesAPrivateFileAndFollowsNoLink)
     EXPECT_EQ(ENOENT, lockOnce(m_strFile + ".missing/lock"));
 }
 
-TEST_F(SerialisingLock, TellsWhyItCannotBeHadAndLeavesNothingOpen)
+TEST_F(SerialisingLock, ReportsWhyItCannotBeTakenAndLeavesNothingOpen)
 {
     const struct {
         std::deque<int> rgErrors; // of fstat(), and then of flock()
@@ -183,7 +183,7 @@ TEST_F(SerialisingLock, MayHaveTheFirstDescriptor)
     EXPECT_EQ(STDIN_FILENO, open("/dev/null", O_RDONLY));
 }
 
-// Others could hold a lock forever on a file that they can open.
+// Other users could hold a lock forever on a file that they can open.
 TEST_F(SerialisingLock, RefusesAFileThatIsNotItsOwnersAlone)
 {
     EXPECT_EQ(0, lockOnce(m_strFile));
@@ -201,7 +201,7 @@ TEST_F(SerialisingLock, RefusesAFileThatIsNotItsOwnersAlone)
     EXPECT_EQ(EPERM, lockOnce(m_strFile));
 }
 
-TEST_F(SerialisingLock, WaitsNoLongerThanIsAsked)
+TEST_F(SerialisingLock, WaitsNoLongerThanItIsAskedTo)
 {
     typedef std::chrono::steady_clock Clock;
     std::optional<CallLock> lock(std::in_place, m_strFile.c_str());

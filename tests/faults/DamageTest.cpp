@@ -1,5 +1,5 @@
-// Each byte of a database is damaged, and the database is cut off after each byte. The calls return all the
-// same.
+// Each byte of a database is damaged, and the database is cut off after each byte. The calls must still
+// return.
 
 #include <gtest/gtest.h>
 #include <sqlite3.h>
@@ -48,7 +48,7 @@ protected:
         if (&GRANT == &operation || &GIVEN_CREATION == &operation) {
             EXPECT_GE(0, nResult) << operation.szName;
         }
-        if (&GRANT != &operation) { // which does not tell why it refuses
+        if (&GRANT != &operation) { // which does not log why it refuses
             EXPECT_NE("-1: ", strAnswer) << operation.szName;
             EXPECT_FALSE(blThrown) << operation.szName << strAnswer;
         }
@@ -98,8 +98,8 @@ TEST_F(DamagedByte, InvertedHarmsNobody)
     print("each byte inverted");
 }
 
-// Only decoding rows is the library's own work. A usual run flips the bit that turns a zero into NULL; longer
-// runs flip the other bits too.
+// SQLite reads the file; the library only decodes the rows. A usual run flips the bit that turns a zero into
+// NULL; longer runs flip the other bits too.
 TEST_F(DamagedByte, WithOneBitFlippedIsReadWithoutHarm)
 {
     for (int64_t nBit = 3; nBit < 3 + std::min<int64_t>(8, scaled(1)); ++nBit) {
@@ -113,9 +113,9 @@ TEST_F(DamagedByte, WithOneBitFlippedIsReadWithoutHarm)
     print("a bit of each byte flipped");
 }
 
-TEST_F(DamagedByte, MissingWithAllBehindItHarmsNobody)
+TEST_F(DamagedByte, MissingWithAllAfterItHarmsNobody)
 {
-    const size_t nStride = scaled(1) > 1 ? 1 : 4; // longer runs look at each
+    const size_t nStride = scaled(1) > 1 ? 1 : 4; // longer runs try each byte
     for (size_t cb = seed() % nStride; cb < m_strSound.size(); cb += nStride) {
         SCOPED_TRACE(cb);
         use(m_strSound.substr(0, cb));

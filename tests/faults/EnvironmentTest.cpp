@@ -15,7 +15,7 @@ namespace {
 enum class Needs { Nothing, Root, FileSystem };
 
 // The expected outcomes of a first creation, of the operations that change the store, and of a listing, in
-// the words of outcomeOf(). An empty outcome: the environment cannot occur at a first creation.
+// the words of outcomeOf(). An empty outcome means that the environment cannot occur at a first creation.
 struct Row {
     const char* szName;
     Environment enter;
@@ -77,14 +77,14 @@ const std::vector<Row> ROWS = {
     everywhere("DanglingLinkAsDirectory", directoryIs("ln -s nowhere"), noTouch("No such file or directory")),
     {"LinkAsDirectory", directoryIs("ln -s ."), DONE_FIRST, DONE, DONE},
 
-    // The library makes no table in a file that exists. After a failed opening the effective uid stays 0.
+    // The library makes no table in an existing file. After a failed opening the effective uid stays 0.
     everywhere("EmptyDatabase", databaseIs("touch"), refused(NO_TABLE)),
     everywhere("DirectoryAsDatabase", databaseIs("mkdir"), noOpen("14")),
     everywhere("FifoAsDatabase", databaseIs("mkfifo -m 0600"), noOpen("10")),
     everywhere("DanglingLinkAsDatabase", databaseIs("ln -s nowhere"), noTouch("No such file or directory")),
     {"LinkAsDatabase", databaseIs("ln -s aside"), "", DONE, DONE},
 
-    // Modes restrict everybody but root.
+    // Modes restrict all users except root.
     {"OrdinaryUser", modes(User::Other, 0700, 0600), DONE_FIRST, DONE, DONE},
     {"ReadOnlyDirectory", modes(User::Other, 0500, 0600), noTouch("Permission denied"), refused(READ_ONLY),
      DONE},
@@ -133,7 +133,7 @@ std::string modeOf(const std::string& strPath)
     return szMode;
 }
 
-// How the operation ended, judged by the store and by the next call, outside of the environment.
+// How the operation ended, judged by the store and by the next call after leaving the environment.
 std::string endOf(const TokenStore& store, const Operation& operation, int nResult)
 {
     if (0 <= nResult) {
@@ -202,7 +202,7 @@ TEST_P(InEnvironment, HasItsOutcomeForEachOperation)
 {
     const Row& row = ROWS[GetParam()];
     if (Needs::Root == row.needs && 0 != getuid()) {
-        GTEST_SKIP() << "needs root, whom modes do not bind";
+        GTEST_SKIP() << "needs root, whom modes do not restrict";
     }
     try {
         const TokenStore store;
@@ -223,8 +223,8 @@ TEST_P(InEnvironment, HasItsOutcomeForEachOperation)
 INSTANTIATE_TEST_SUITE_P(In, InEnvironment, ::testing::Range<size_t>(0, ROWS.size()),
                          [](const auto& instance) { return ROWS[instance.param].szName; });
 
-// Why a process must stay at effective uid 0 while it holds a connection: others cannot see the journal that
-// undoes the change of a writer that crashed half-way.
+// This is why a process must stay at effective uid 0 while it holds a connection: at another uid it cannot
+// see the journal that undoes the half change of a crashed writer.
 TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
 {
     if (0 != getuid()) {
@@ -234,7 +234,7 @@ TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
     makeTable(store);
     store.run("WITH RECURSIVE number(n) AS (SELECT 1 UNION ALL SELECT n + 1 FROM number WHERE n < 300) "
               "INSERT INTO token SELECT 'token-' || n, '', 0, 4102444800, 1, 1, 'VPN', '{}', "
-              "json_object('filling', printf('%.1000c', 'f')) FROM number"); // three of them to a page
+              "json_object('filling', printf('%.1000c', 'f')) FROM number"); // three rows on a page
     AccessTokenApi api;                                                      // its connection is open already
     const auto tokensWith99Uses = [&] {
         Json::Value jFilter(Json::objectValue);
@@ -255,6 +255,6 @@ TEST(HotJournal, IsNotSeenByAReaderAtAnotherEffectiveUid)
     becomeReally(0);
     EXPECT_LT(100U, nHalfChange); // read from a change that was never committed
     EXPECT_GT(300U, nHalfChange);
-    EXPECT_EQ(0U, tokensWith99Uses()); // the journal has been played back
+    EXPECT_EQ(0U, tokensWith99Uses()); // the journal was rolled back
     figure("hot journal", std::to_string(nHalfChange) + " of 300 tokens read from a change that never was");
 }

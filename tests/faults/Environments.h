@@ -58,7 +58,7 @@ inline void setMode(const std::string& strPath, uid_t uid, mode_t mode)
             "give a file away");
 }
 
-// Makes what stands in a wrong place: the command gets the path as its last argument.
+// Makes something in a wrong place: the command gets the path as its last argument.
 inline void make(const std::string& strCommand, const std::string& strPath)
 {
     EXPECT_EQ(0, system((strCommand + " '" + strPath + "'").c_str()));
@@ -83,7 +83,7 @@ inline Environment umaskOf(mode_t mode)
     };
 }
 
-// Something else stands where the private directory should be.
+// Something else is in the place of the private directory.
 inline Environment directoryIs(const char* szCommand)
 {
     return [=](const TokenStore& store) -> Leave {
@@ -94,8 +94,8 @@ inline Environment directoryIs(const char* szCommand)
     };
 }
 
-// Something else stands where the database should be, and must still stand there afterwards. The database, if
-// there was one, is "aside".
+// Something else is in the place of the database, and must still be there afterwards. The database, if there
+// was one, is renamed to "aside".
 inline Environment databaseIs(const char* szCommand)
 {
     return [=](const TokenStore& store) -> Leave {
@@ -117,8 +117,8 @@ inline Environment databaseIs(const char* szCommand)
     };
 }
 
-// The modes of the directory and the database. Both belong to the process's user, which stays the same or
-// becomes another than root.
+// The modes of the directory and the database. Both belong to the process's user, which is the present one or
+// a user other than root.
 enum class User { Same, Other };
 inline Environment modes(User user, mode_t modeDirectory, mode_t modeFile)
 {
@@ -138,7 +138,7 @@ inline Environment modes(User user, mode_t modeDirectory, mode_t modeFile)
             becomeReally(uidBefore);
             setMode(store.directory(), uidBefore, 0700);
             if (fs::exists(store.path())) {
-                setMode(store.path(), uidBefore, 0600); // can be read again, by others than root too
+                setMode(store.path(), uidBefore, 0600); // can be read again, also by other users than root
             }
         };
     };
@@ -200,7 +200,7 @@ inline Environment fileSizeLimit(size_t cbMax)
     };
 }
 
-// Another process holds a lock on the database and is stopped (SIGSTOP). It ends well once it is continued.
+// Another process holds a lock on the database and is stopped (SIGSTOP). Once continued, it succeeds.
 inline Environment stoppedHolder(const char* szSql)
 {
     return [=](const TokenStore& store) -> Leave {

@@ -1,6 +1,6 @@
 // Each call of an operation fails: that call alone, or that call and all later ones. First the system calls
-// that are needed to open the store, the library's own and SQLite's; then those that SQLite makes on the
-// store's files. (ShortWaits.h lets waits for a lock fail.)
+// that open the store, the library's own and SQLite's; then the calls that SQLite makes on the store's files.
+// (In ShortWaits.h, waits for a lock fail.)
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -20,7 +20,7 @@ namespace {
 
 Injection g_injection;
 const char* g_szFunction = "";
-bool g_blUidUnknown = false; // at the last time of asking
+bool g_blUidUnknown = false; // at the last question
 bool g_blUidRaised = false;  // to 0
 bool g_blUidLost = false;    // raised while unknown, or the last try to put it back failed
 
@@ -33,8 +33,8 @@ bool fails(const char* szName)
 
 class SystemCallFault : public ::testing::TestWithParam<const char*> {};
 
-// What SQLite's calls on files answer when they fail, by the name of the call. When others cannot fail in
-// that way, nOthers is SQLITE_OK.
+// The errors of SQLite's calls on files, by the name of the call. If the other calls cannot fail in that way,
+// nOthers is SQLITE_OK.
 struct FileFault {
     std::map<std::string, int> answers;
     int nOthers;
@@ -119,7 +119,7 @@ TEST_P(IoFault, LeavesAStateThatTheCallerKnows)
             call.write(call.cb / 2);
         }
         if (0 == strcmp("xClose", call.szName)) {
-            real(); // whatever close answers, the descriptor is gone
+            real(); // whatever close returns, the descriptor is closed
         }
         return nAnswer;
     });

@@ -6,7 +6,7 @@ namespace {
 
 typedef sqlite3_io_methods Methods;
 
-// An open file is SQLite's own, but some of its methods are replaced by ones that ask the hook.
+// An open file is SQLite's own; some of its methods are replaced by others, which ask the hook.
 struct File {
     std::string strPath;
     const Methods* pReal;
@@ -38,7 +38,7 @@ void hook(sqlite3_file* pFile, const char* szPath)
     file = {szPath ? szPath : "", pFile->pMethods, *pFile->pMethods};
     pFile->pMethods = &file.hooked;
     Methods& methods = file.hooked;
-    methods.iVersion = 2; // no mapping of the database
+    methods.iVersion = 2; // without mapping of the database
     methods.xClose = [](sqlite3_file* p) {
         const int nResult = passFile<&Methods::xClose>({"xClose"}, p);
         g_files.erase(p);

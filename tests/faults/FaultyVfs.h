@@ -1,5 +1,5 @@
-// SQLite's own VFS, but a hook is asked about each call on a file. It is the default VFS, so the library uses
-// it.
+// SQLite's own VFS with a hook, which decides the result of each call on a file. It is the default VFS, so
+// the library uses it.
 
 #ifndef TESTS_FAULTY_VFS_H
 #define TESTS_FAULTY_VFS_H

@@ -1,4 +1,4 @@
-// Replaces malloc, calloc, realloc and free in this process: counts allocations, and lets those fail that a
+// Replaces malloc, calloc, realloc and free in this process: counts allocations, and makes those fail that a
 // test chooses.
 // Included in one file of a program.
 

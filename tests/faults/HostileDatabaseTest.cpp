@@ -1,4 +1,4 @@
-// Databases that somebody has tampered with, or other files in their place: what each call does.
+// What each call does on a manipulated database, or on another file in its place.
 
 #include <gtest/gtest.h>
 
@@ -7,7 +7,7 @@
 
 namespace {
 
-// What is done to a sound store, and what each call then answers. Each call gets a fresh store.
+// A change of a sound store, and the answer of each call after it. Each call gets a fresh store.
 struct Case {
     const char* szName;
     std::string strSql;
@@ -16,13 +16,13 @@ struct Case {
     std::string strCreation;
     std::string strDeletion;
     std::string strSettings = ""; // of the store
-    Files files = {};             // that are put there
+    Files files = {};             // that are written into it
 };
 
 const std::string JOURNAL = DATABASE + "-journal";
 const Files ZEROS = {{DATABASE, std::string(4096, '\0')}};
 
-// Beside those that are there, or in their place.
+// Adds these files to the store, or replaces them.
 void putFiles(const TokenStore& store, Files files)
 {
     files.merge(store.files());
@@ -73,7 +73,7 @@ const std::vector<Case> CASES = {
      failed("table token has no column named extra"), "1"},
     {"NoDeadline", "ALTER TABLE token DROP COLUMN deadline", NO_DEADLINE, NO_DEADLINE, NO_DEADLINE, "1"},
 
-    // The purge leaves the first. A token without an id is not found; that is no failure and is not logged.
+    // The purge leaves the first. A token without an id is not found; this is neither a failure nor logged.
     {"NullDeadline", setThree("deadline = NULL"), NULL_VALUE, NULL_VALUE, "0", "1"},
     {"NullPurpose", LAX + setThree("function = NULL"), NULL_VALUE, NULL_VALUE, "0", "1"},
     {"NullId", LAX + setThree("tid = NULL"), NULL_VALUE, "-1: ", "0", "1"},
@@ -81,13 +81,13 @@ const std::vector<Case> CASES = {
     {"View", "ALTER TABLE token RENAME TO real; CREATE VIEW token AS SELECT * FROM real", "3", IS_VIEW,
      IS_VIEW, IS_VIEW},
     {"RefusedInsertion", trigger("INSERT", "ABORT, 'no'"), "3", failed("no"), failed("no"), "1"},
-    // The calls report success although the trigger prevented the change: nothing is created, no use is
-    // spent.
+    // The calls report success although the trigger has prevented the change: no token is created, and no
+    // use is spent.
     {"IgnoredInsertion", trigger("INSERT", "IGNORE"), "3", "0", "0", "1"},
     {"IgnoredDeletion", trigger("DELETE", "IGNORE"), "3", "0", "0", "0"},
-    // The text of an error decides whether the library takes it for a lock.
+    // The library takes an error for a lock by its text.
     {"FeignedLock", trigger("INSERT", "ABORT, 'database is locked'"), "3", LOCKED, LOCKED, "1"},
-    // The index of the ids points to another table: no token is found by its id, and the purge notices.
+    // The index of the ids points to another table: no token is found by its id, and the purge fails.
     {"LyingIndex",
      "CREATE TABLE other (t TEXT PRIMARY KEY); PRAGMA writable_schema = ON;"
      "CREATE TEMP TABLE page AS SELECT * FROM sqlite_schema WHERE name LIKE 'sqlite_autoindex%';"
@@ -96,8 +96,8 @@ const std::vector<Case> CASES = {
      "3", failed("database disk image is malformed"), "0", "0"},
 };
 
-// A field of an SQLite type that the library never writes: what a grant answers, and the token's count,
-// deadline and uid afterwards, or "gone".
+// A field of an SQLite type that the library never writes: the answer of a grant, and afterwards the token's
+// count, deadline and uid, or "gone".
 struct Value {
     const char* szAssignment;
     std::string strAnswer;
@@ -108,7 +108,7 @@ const std::string UNTOUCHED = "3 4102444800 0";
 const std::string WRONG_EXTRA = "-1: type failed, jmList[i]=extra";
 
 const std::vector<Value> VALUES = {
-    // A number is read as far as SQLite's text of it has digits, and written back like that.
+    // The library reads a number up to the first other character of its text, and writes that back.
     {"count = ''", "0", "gone"},
     {"count = '7up'", "0", "6 4102444800 0"},
     {"count = X'39'", "0", "8 4102444800 0"},
@@ -116,7 +116,7 @@ const std::vector<Value> VALUES = {
     {"count = 99999999999999999999", "0", "gone"},
     {"uid = 'nobody'", "0", "2 4102444800 0"},
     {"uid = 1e300", "0", "2 4102444800 1"},
-    // SQLite sorts texts after all numbers, so this deadline has not passed. The grant writes a number back.
+    // In SQLite, texts are greater than numbers, so this deadline has not passed. The grant writes a number.
     {"deadline = 'never'", "0", "2 0 0"},
     {"deadline = X'39'", "0", "2 9 0"},
     {"deadline = 1e300", "0", "2 1 0"},
@@ -124,7 +124,7 @@ const std::vector<Value> VALUES = {
     {"webapi_allow = 7", R"(-1: Failed [jToken["webapi_allow"].type() != Json::objectValue])", UNTOUCHED},
     {R"(webapi_allow = '{"Example.Api":{"method":[{}]}}')", "throws: Type is not convertible to string",
      UNTOUCHED},
-    // What was read before the damage counts.
+    // The text before the damage is used.
     {R"(webapi_allow = '{"Example.Api":7,"Example.Api":{"method":[7,null,"get"]')", "0", "2 4102444800 0"},
 
     // The type of this field is checked only when the token is written back.

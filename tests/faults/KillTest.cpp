@@ -1,4 +1,4 @@
-// Processes are killed in the middle of an operation, and leave the store as a crash does.
+// Processes are killed in the middle of an operation, and leave the store as after a crash.
 
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -20,8 +20,8 @@
 
 namespace {
 
-// Dies before the call of SQLite on its files that has that number, after it, or half-way if it is a write.
-// Returns the number of calls.
+// Kills the process before or after SQLite's call on files of that number, or in the middle of it if it is a
+// write. Returns the number of calls.
 int64_t runUntil(const Operation& operation, int64_t nFatal, uint64_t nWhere)
 {
     int64_t nCalls = 0;
@@ -58,11 +58,11 @@ void runFor(const Operation& operation, int64_t nNanoseconds)
 
 class Kill : public ::testing::Test {
 protected:
-    // Runs it in another process. Returns whether that was killed before it ended.
+    // Runs it in another process. Returns whether that process was killed before its end.
     static bool isKilledIn(const std::function<void()>& run)
     {
         const int nStatus = statusOf(startProcess([&] {
-            alarm(60); // nobody waits for a call that hangs
+            alarm(60); // ends a call that hangs
             run();
         }));
         const bool blKilled = WIFSIGNALED(nStatus) && SIGKILL == WTERMSIG(nStatus);
@@ -70,7 +70,7 @@ protected:
         return blKilled;
     }
 
-    // What was left must be a state that the caller knows, for a reader and for the library's next call.
+    // The store must be in a state that the caller knows, for a reader and for the library's next call.
     void judge(const Operation& operation, const Oracle& oracle)
     {
         const Files files = m_store.files();
@@ -89,7 +89,7 @@ protected:
         }
     }
 
-    // Kills each operation equally often: with a number that is drawn from 1 to that of the operation's life.
+    // Kills each operation equally often, each time at a number drawn from 1 to lifeOf(operation).
     void killAll(const std::string& strName, const std::function<int64_t(const Operation&)>& lifeOf,
                  const std::function<std::function<void()>(const Operation&, int64_t nFatal)>& fatal)
     {
@@ -121,7 +121,7 @@ protected:
     }
 
     const TokenStore m_store;
-    std::map<std::string, int64_t> m_leftovers; // by a first creation
+    std::map<std::string, int64_t> m_leftovers; // of a first creation
     std::mt19937_64 m_random{seed()};
 };
 

@@ -1,4 +1,4 @@
-// Each allocation of each operation fails, also those of SQLite and jsoncpp: alone, or with all later ones.
+// Each allocation of each operation fails, also in SQLite and jsoncpp: alone, or with all later ones.
 
 #include <gtest/gtest.h>
 #include <pwd.h>
@@ -17,7 +17,7 @@ const uid_t NOBODY_KNOWN = 3999999999;
 
 class MemoryFault : public ::testing::TestWithParam<size_t> {};
 
-// With blOwnThread, each run has a new thread, for which the library has kept nothing yet.
+// With blOwnThread, each run has a new thread, for which the library holds no object yet.
 void failEachAllocation(const Operation& operation, bool blOwnThread = false)
 {
     const TokenStore store;
@@ -31,7 +31,7 @@ void failEachAllocation(const Operation& operation, bool blOwnThread = false)
         }
         const int64_t cbLive = g_cbLive;
         cbHeld = INT64_MAX == cbHeld ? cbLive : cbHeld;
-        EXPECT_GE(cbHeld, cbLive); // less, when something that was kept has been given up
+        EXPECT_GE(cbHeld, cbLive); // less if the library has released something that it held
         if (0 == g_allocations.nFirst) {
             EXPECT_EQ(cbHeld, cbLive);
         }

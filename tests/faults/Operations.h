@@ -19,7 +19,7 @@ struct Operation {
 // Twelve: creating the store, and each way in which the library changes it or reads it.
 const std::vector<Operation>& operations();
 
-// Some of them.
+// Some of these.
 inline const Operation& FIRST_CREATION = operations()[0];
 inline const Operation& CREATION = operations()[1];
 inline const Operation& GIVEN_CREATION = operations()[2];
@@ -31,9 +31,9 @@ inline const Operation& DELETION_OF_ALL = operations()[11];
 // Makes the store that the operation starts from.
 void prepareStore(const TokenStore& store, const Operation& operation);
 
-// For stores of other tokens. makeTable() makes a store with an empty table, after running strSettings.
-// insertToken() adds a token with these values in the columns from bind_sid to function; it allows the method
-// "get" of Example.Api.
+// For stores of other tokens. makeTable() runs strSettings and makes an empty table. insertToken() adds a
+// token with these values in the columns from bind_sid to function; it allows the method "get" of
+// Example.Api.
 void makeTable(const TokenStore& store, const std::string& strSettings = "");
 void insertToken(const TokenStore& store, const std::string& strName, const std::string& strColumns);
 

@@ -57,7 +57,7 @@ std::optional<int> Oracle::run() const
         return m_operation.run();
     } catch (const std::bad_alloc&) {
         return std::nullopt;
-    } catch (const Json::RuntimeError&) { // how jsoncpp tells that it got no memory
+    } catch (const Json::RuntimeError&) { // jsoncpp's report that it got no memory
         return std::nullopt;
     }
 }

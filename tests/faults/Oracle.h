@@ -25,7 +25,7 @@ public:
     // - The store is sound, and is as before the operation, after its purge, or after all of it. After a
     //   success it is as after all of it. (The purge alone may be missing: an operation goes on without it.)
     // - Effective uid, umask, working directory, signal mask, descriptors and SQLite's memory are unchanged.
-    //   Only when SQLite refuses to open the database, the effective uid stays 0.
+    //   The exception: if SQLite refuses to open the database, the effective uid stays 0.
     // - A failure is logged, or is the exception of an allocation that failed.
     // uidAfter() gives the effective uid to expect, for tests that make setting it fail.
     std::string judge(

@@ -26,7 +26,7 @@ namespace {
 
 typedef std::vector<std::function<int()>> Calls;
 
-// What calls of the library request of the disk.
+// What calls of the library request from the disk.
 struct Recording {
     Files files; // found by the first call
     std::vector<DiskCall> calls;
@@ -51,7 +51,7 @@ int recordSync(int nFile)
 }
 
 // The library creates the database file before SQLite's first call; SQLite creates its journal in xOpen.
-// known: the names of files that are there.
+// known: the names of the files that exist.
 int recordCall(std::set<std::string>& known, const FileCall& call, const std::function<int()>& real)
 {
     const auto nBefore = static_cast<std::ptrdiff_t>(g_calls.size());
@@ -192,7 +192,7 @@ protected:
         return recordOn(filesBefore(operation), {operation.run});
     }
 
-    // All operations that start from a store, one after another.
+    // All operations that start from an existing store, one after another.
     Recording recordOneAfterAnother(const Files& files)
     {
         Calls calls;
@@ -227,8 +227,8 @@ protected:
         });
     }
 
-    // Disks after a power cut between the writing of a change and its sync: they have a journal to recover
-    // from.
+    // Disks after a power cut between the writing of a change and its sync: their journal must be rolled
+    // back.
     std::vector<Files> drawInterrupted(const Recording& recording)
     {
         std::vector<Files> interrupted;
@@ -256,8 +256,8 @@ protected:
         return states;
     }
 
-    // Cuts the power at the start and after each call. Each moment has the images of the two extremes,
-    // everything kept and only what was synced kept, and nDraws random images for each change that is not
+    // Cuts the power at the start and after each call. Each moment has two extreme images, one that keeps
+    // everything and one that keeps only synced data, and nDraws random images for each change that is not
     // synced. Calls passed() after each call, and image() for each image.
     void visit(const Recording& recording, Order order, int64_t nDraws,
                const std::function<void(const DiskCall&, const PowerDisk&)>& passed,
@@ -321,7 +321,7 @@ protected:
         return tally;
     }
 
-    // The same, in which nothing may be wrong; prints the figures.
+    // The same, but fails if anything is wrong; prints the figures.
     PowerTally judgeSound(const std::string& strName, const std::vector<Recording>& recordings, Order order,
                           int64_t nDraws)
     {
@@ -393,7 +393,7 @@ TEST_F(PowerCut, CanMeetTheRecoveryFromAnother)
     for (const Operation& operation : operations()) {
         for (const Files& files : drawInterrupted(recordOperation(operation))) {
             recordings.push_back(recordOn(files, {[] {
-                                              CREATION.run(); // there may be no table yet
+                                              CREATION.run(); // there may not be a table yet
                                               return 0;
                                           }}));
         }
@@ -451,7 +451,7 @@ TEST_F(PowerCut, UndoesNothingThatTheGateHasAnswered)
                                                                [&] {
                                                                    return batch({"one", "large", "three"});
                                                                },
-                                                               checkpoint, // the log begins anew then
+                                                               checkpoint, // the journal begins anew then
                                                                [&] { return batch({"large"}); }, close});
         const PowerTally tally = judgeReturned(recording, scaled(4));
         EXPECT_EQ(0, tally.nWrong) << szMode << ": " << tally.strFirstWrong;
@@ -479,7 +479,7 @@ TEST_F(PowerCut, DamagesNoTokenWhereTheDatabaseDoesNotShrink)
     EXPECT_EQ(0, judgeSound("order lost, without auto_vacuum", {recording}, Order::Lost, scaled(1)).nDamaged);
 }
 
-// The judge must notice when a sync is missing.
+// The oracle must notice when a sync is missing.
 TEST_F(PowerCut, WouldDamageAStoreThatIsNotSynced)
 {
     for (const DiskCall::Kind kind : {DiskCall::Kind::Sync, DiskCall::Kind::SyncDirectory}) {

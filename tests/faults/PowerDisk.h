@@ -21,7 +21,7 @@
 
 struct DiskCall {
     enum class Kind { Create, Write, Truncate, Unlink, Sync, SyncDirectory, Return };
-    Kind kind; // Return: the library returned to its caller; the disk hears nothing of that
+    Kind kind; // Return: the library returned to its caller, which the disk does not see
     std::string strName = "";
     size_t nOffset = 0; // of Write; of Truncate the new size
     std::string strData = "";
@@ -207,7 +207,7 @@ private:
     std::vector<Inode> m_inodes;
     std::map<std::string, std::vector<Entry>> m_directory; // by name, since the last sync of the directory
     size_t m_nNumber = 0;
-    size_t m_nDurable = 0; // where the order is kept, that and all before cannot be lost
+    size_t m_nDurable = 0; // if the order is kept, this one and all before it cannot be lost
 };
 
 #endif

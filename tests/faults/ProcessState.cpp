@@ -20,7 +20,7 @@ std::string processState()
 {
     std::set<std::string> parts = {std::filesystem::current_path()};
     for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
-        std::error_code ignored; // that of the iteration itself is gone already
+        std::error_code ignored; // the iteration's own descriptor is closed already
         const std::string strTarget = std::filesystem::read_symlink(entry.path(), ignored);
         if (0 != strTarget.compare(0, 6, "/proc/")) {
             parts.insert(entry.path().filename().string() + "=" + strTarget);

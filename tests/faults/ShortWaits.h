@@ -1,4 +1,4 @@
-// Replaces usleep(): nobody waits for a lock here. Waits are counted, and end as if a signal came.
+// Replaces usleep(): a wait for a lock takes no time. Waits are counted, and end as if by a signal.
 // Included in one file of a program.
 
 #ifndef TESTS_SHORT_WAITS_H

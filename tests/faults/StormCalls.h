@@ -81,7 +81,7 @@ public:
 
     const TokenStore& store() const { return m_store; }
 
-    // The lock file of serialised calls, beside the database.
+    // The lock file of serialised calls, next to the database.
     std::string lockFile() const { return m_store.directory() + "/calls.lock"; }
 
 private:

@@ -1,5 +1,5 @@
-// 1 to 64 processes use one file at once, through the exported functions: without a lock, and serialised by
-// CallLock. VEMO_TEST_PROCESSES adds a storm of that many processes.
+// 1 to 64 processes use one file at the same time through the exported functions: without a lock, and
+// serialised by CallLock. VEMO_TEST_PROCESSES adds a storm of that many processes.
 
 #include <gtest/gtest.h>
 
@@ -16,7 +16,7 @@
 
 namespace {
 
-// What became of calls whose effect no other call can have.
+// The results of calls whose effect no other call can have.
 struct Tally {
     int64_t nCalls = 0;
     int64_t nFailed = 0;  // reported failure, had no effect
@@ -43,7 +43,7 @@ bool has(const Tokens& tokens, const std::string& strName)
     return 0 != tokens.count(strName);
 }
 
-// Whether each call must have the whole effect that its caller is told.
+// Whether each call must have exactly the effect that it reports.
 bool isExact(Calls calls, int nProcesses)
 {
     return Calls::Serialised == calls || 1 == nProcesses;
@@ -90,13 +90,13 @@ public:
         }
     }
 
-    // Compares what the processes were told with what the store holds.
+    // Compares the results that the processes got with what the store holds.
     void judge(Calls calls)
     {
         Tally tally;
         int64_t nGranted = 0; // of the token that all share
         int64_t nDeleted = 0;
-        int64_t nUndone = 0; // told that it was deleted, and the token is there none the less
+        int64_t nUndone = 0; // reported as deleted, but the token is there
         const Tokens found = m_calls.tokens();
         for (int nProcess = 0; nProcess < m_nProcesses; ++nProcess) {
             const int64_t nSpent = m_nRounds + 1 - found.at(nameOf("own", nProcess));
@@ -130,7 +130,7 @@ public:
     }
 
 private:
-    // What one process was told in one round.
+    // The results that one process got in one round.
     struct Round {
         int nCreated;
         int nGrantedOwn;
@@ -144,7 +144,7 @@ private:
 
     const int m_nProcesses;
     const int m_nRounds = static_cast<int>(scaled(std::max(4, 64 / m_nProcesses)));
-    // Uses: half of the attempts, so that all are spent where each is counted.
+    // Half as many uses as attempts, so that all are spent if each is counted.
     const int64_t m_nShared = m_nProcesses * m_nRounds / 2;
     const StormCalls m_calls;
     SharedArray<Round> m_rounds{static_cast<size_t>(m_nProcesses * m_nRounds)};
@@ -157,7 +157,7 @@ void raise(Calls calls, int nProcesses)
     storm.judge(calls);
 }
 
-// All processes start without a file. The file exists before its table does: calls in between fail.
+// All processes start without a file. The file exists before its table: calls in between fail.
 void makeStores(Calls calls, int nProcesses)
 {
     struct Told {

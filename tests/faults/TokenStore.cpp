@@ -43,8 +43,8 @@ std::string contentsOf(const std::filesystem::path& path)
 
 } // namespace
 
-// Nothing has to survive a crash of the machine, so nothing is synced. Weak, because PowerCutTest defines
-// its own.
+// No test needs files to survive a crash of the machine, so nothing is synced. Weak, because PowerCutTest
+// defines its own.
 extern "C" __attribute__((weak)) int fsync(int)
 {
     return 0;
@@ -78,7 +78,7 @@ TokenStore::~TokenStore()
 {
     std::error_code ignored;
     std::filesystem::remove_all(m_strDirectory, ignored);
-    std::filesystem::remove(m_strDirectory + ".lock", ignored); // where the redirection puts it
+    std::filesystem::remove(m_strDirectory + ".lock", ignored); // the redirection makes it there
 }
 
 std::string TokenStore::path() const
@@ -90,7 +90,7 @@ Files TokenStore::files() const
 {
     Files files;
     for (const auto& entry : std::filesystem::directory_iterator(m_strDirectory)) {
-        if (entry.path().extension() != ".db-shm") { // memory: who opens the database first makes it anew
+        if (entry.path().extension() != ".db-shm") { // memory: made anew when the database is opened
             files[entry.path().filename()] = contentsOf(entry.path());
         }
     }

@@ -34,9 +34,9 @@ public:
     Files files() const;
     void setFiles(const Files& files) const;
 
-    // What the next user of the database would find, who rolls back what a crash left: STATE_MISSING,
-    // STATE_NO_TABLE, or a sorted line for each token. Ids that the library made up read "new"; times read
-    // "past", "new" or "far". A damaged database reads "corrupt: " and why.
+    // What the next program finds, which rolls back a half change: STATE_MISSING, STATE_NO_TABLE, or a sorted
+    // line for each token. Ids that the library generated read "new"; times read "past", "new" or "far". A
+    // damaged database reads "corrupt: " and why.
     std::string state() const;
 
     // Run SQL without the library. The rows come as sorted lines.

@@ -1,4 +1,5 @@
-// Draws the arguments of operations at random: from a few values, so that calls meet, and from strange ones.
+// Draws the arguments of operations at random: from a few values, so that calls share them, and from odd
+// ones.
 
 #ifndef TESTS_DRAWS_H
 #define TESTS_DRAWS_H
@@ -31,7 +32,7 @@ Json::Value list(const Values&... values)
     return jList;
 }
 
-// Ids that are long enough or not. Two are equal up to a NUL, and one is what two others become in a list.
+// Ids, long enough or not. Two are equal up to a NUL, and one is what two others become in a list.
 const Json::Value g_jTid =
     list(idOf("a"), idOf("b"), idOf("c"), idOf("d"), idOf("e"), idOf("it's"), idOf("\xff\xfe\xc3"),
          idOf("'; DROP TABLE token; --"), idOf("a") + "'" + idOf("b"), std::string(6000, 'l'),
@@ -96,7 +97,7 @@ public:
     size_t below(size_t nLimit) { return static_cast<size_t>(m_source() % nLimit); }
     bool oneIn(size_t nTimes) { return 0 == below(nTimes); }
 
-    // Moves it on a little now and then; rarely sets it to a wrong time for about ten operations.
+    // Sometimes moves the clock on a little; rarely sets it to a wrong time for about ten operations.
     void moveClock()
     {
         if (oneIn(m_usualTime ? 10 : 1000)) {
@@ -112,7 +113,7 @@ public:
                                      : 0;
     }
 
-    // The argument of that name, of those in m_draws.
+    // The argument of that name, one of those in m_draws.
     Json::Value argument(const std::string& strName) const { return m_draws.at(strName)(); }
 
 private:
@@ -126,10 +127,10 @@ private:
 
     Json::Value anything() { return oneOf(g_jAnything); }
 
-    // An id that a row has, mostly.
+    // Mostly the id of a row.
     Json::Value tid() { return m_rows.empty() || oneIn(4) ? oneOf(g_jTid) : row().columns[0]; }
 
-    // The same; webapi() then draws what that row allows, mostly.
+    // The same; webapi() then mostly draws what that row allows.
     Json::Value granted()
     {
         m_jAllow = Json::Value();
@@ -141,7 +142,7 @@ private:
         return granted.columns[0];
     }
 
-    // Others than those that the token allows would rarely match.
+    // Random ones would rarely be among those that the token allows.
     Json::Value webapi()
     {
         return m_jAllow.isObject() && !m_jAllow.empty() ? m_jAllow.getMemberNames()[below(m_jAllow.size())]
@@ -363,7 +364,7 @@ private:
     std::mt19937_64 m_source;
     const std::vector<Row>& m_rows;
     std::optional<time_t> m_usualTime; // while the clock is wrong
-    Json::Value m_jAllow;              // of the id that was drawn last for a grant
+    Json::Value m_jAllow;              // of the row whose id was drawn last for a grant
 };
 
 #endif

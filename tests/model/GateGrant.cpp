@@ -53,17 +53,17 @@ int grantAtTheGate(std::string& strTid, const char* szWebapiName, const char* sz
         return VemoAccessTokenGrantEx(strTid, szWebapiName, szWebapiMethod, jToken);
     };
     if (request.strTid.empty() || request.strApi.empty()) {
-        return askLibrary(); // no such message can come
+        return askLibrary(); // a message cannot hold such a call
     }
     const auto [answer, figures] = call(request);
     if (figures[gate::REFUSED_OWNER] || figures[gate::REFUSED_LARGE]) {
         return askLibrary();
     }
     if (figures[gate::REFUSED_MALFORMED]) {
-        const int nResult = askLibrary(); // it refuses it too, perhaps by an exception
+        const int nResult = askLibrary(); // the library refuses the call too, perhaps by an exception
         return 0 > nResult ? nResult : throw std::runtime_error("the gate alone finds it malformed");
     }
-    // The gate purges now and then, the library with each call.
+    // The gate purges from time to time, the library at each call.
     AccessTokenDbApi().cleanExpireToken(false);
     if (gate::Outcome::Granted != answer.outcome) {
         return -1;

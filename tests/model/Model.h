@@ -1,5 +1,5 @@
-// A model of the library: a table in memory, and operations with the names and arguments of the library's.
-// Nothing of the library is used here, and no SQL.
+// A model of the library: a table in memory, and operations with the same names and arguments. It uses
+// neither the library nor SQL.
 //
 // Operations do not change arguments that they only read. They throw Json::LogicError where the library does:
 // when a value cannot be converted.
@@ -36,7 +36,7 @@ inline bool isOfKind(Kind kind, const Json::Value& jValue)
                                 : jValue.isIntegral();
 }
 
-// Removes rows and tells how many.
+// Removes rows and returns how many.
 template <typename Predicate>
 int removeIf(std::vector<Row>& rows, Predicate predicate)
 {
@@ -48,7 +48,7 @@ int removeIf(std::vector<Row>& rows, Predicate predicate)
 
 class Model {
 public:
-    // Fields that are there are of their type.
+    // Returns 0 if the record's fields have their types.
     int checkJsonType(Json::Value& jToken)
     {
         const bool blSound =
@@ -159,7 +159,7 @@ public:
 
     int cleanExpireToken(bool)
     {
-        if (worldClock() < YEAR_10000) { // then there is no date to compare with
+        if (worldClock() < YEAR_10000) { // later there is no date to compare with
             removeIf(m_rows, [](const Row& row) { return row.jRecord["deadline"].asInt64() < worldClock(); });
         }
         return 0;
@@ -168,7 +168,7 @@ public:
     // In the order of the table: sorted by when they were last written.
     const std::vector<Row>& rows() const { return m_rows; }
 
-    // Tells the model the id that the library has generated; it must look like one.
+    // Gives the model the id that the library has generated; its form must be right.
     void setGenerated(const std::string& strTid)
     {
         const bool blId =

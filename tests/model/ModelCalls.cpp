@@ -4,7 +4,7 @@
 
 namespace {
 
-// A member of jCall as an argument of a parameter of any of these types. A text is written back behind the
+// A member of jCall as an argument of a parameter of any of these types. A text is written back after the
 // call.
 class Argument {
 public:

@@ -13,7 +13,7 @@
 #include "internal/AccessTokenDbApi.h"
 #include "vemo-access-token.h"
 
-// What the gate does in the place of VemoAccessTokenGrantEx. Calls that it refuses on purpose go to the
+// What the gate does instead of VemoAccessTokenGrantEx. Calls that the gate refuses on purpose go to the
 // library.
 int grantAtTheGate(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
                    Json::Value& jToken);
@@ -64,7 +64,7 @@ private:
         try {
             outcome.nResult = call(system, outcome.jCall, szArguments);
         } catch (const Json::LogicError&) {
-            outcome.strThrown = "Json::LogicError"; // its text is no part of the interface
+            outcome.strThrown = "Json::LogicError"; // its text is not part of the interface
         } catch (const std::exception& exception) {
             outcome.strThrown = exception.what();
         }

@@ -38,7 +38,7 @@ inline Condition numberIs(size_t nField, long double number64)
     return [=](const Row& row) { return static_cast<long double>(number(row, nField)) == number64; };
 }
 
-// Takes "12", "2.5" or "true" off the beginning of a text.
+// Removes "12", "2.5" or "true" from the beginning of a text.
 inline std::optional<long double> takeNumber(std::string& strText)
 {
     long double number64 = 0;
@@ -81,14 +81,14 @@ inline bool isName(const std::string& strText)
            std::all_of(strText.begin(), strText.end(), isPart);
 }
 
-// Of a text, SQL gets what stands ahead of its first NUL.
+// SQL gets the part of a text before its first NUL.
 inline std::string textOf(Kind kind, const Json::Value& jValue)
 {
     return Kind::Json == kind ? jsonText(jValue) : jValue.asString().c_str();
 }
 
-// The library puts no separator between the elements of a list. Texts are quoted, so two quotes meet and
-// stand for one quote in the text.
+// The library puts no separator between the elements of a list. Texts are quoted, so two quotes meet, which
+// mean one quote in the text.
 inline std::string listText(Kind kind, const Json::Value& jList)
 {
     std::string strText;
@@ -98,7 +98,7 @@ inline std::string listText(Kind kind, const Json::Value& jList)
     return strText;
 }
 
-// The keyword from a position on, of which only 32 bits count.
+// The keyword from a position on; only 32 bits of the position count.
 inline std::string tail(const std::string& strKeyword, Json::Int64 nNumber)
 {
     return strKeyword.substr(std::min<size_t>(static_cast<uint32_t>(nNumber), strKeyword.size()));
@@ -184,9 +184,9 @@ private:
     struct Alternative {
         std::vector<Condition> conditions;
         bool blUnknownName = false; // of a column
-        bool blNever = false;       // SQLite notices that at once, and does not look for the column then
+        bool blNever = false;       // SQLite notices that at once, and then does not look for the column
     };
-    std::vector<Alternative> m_alternatives = {{}}; // one of which must hold
+    std::vector<Alternative> m_alternatives = {{}}; // one of these must hold
 };
 
 // Whether ordering and paging make the query invalid. They have no other effect.
@@ -195,7 +195,7 @@ inline bool isSpoiledByPaging(const Json::Value& jFilter, bool blWithoutFields)
     bool blSorted = false;
     std::string strTail;
     if (jFilter.isMember("sort_by")) {
-        static_cast<void>(jFilter["sort_by"].asCString()); // which throws unless it is a string
+        static_cast<void>(jFilter["sort_by"].asCString()); // throws unless it is a string
         static_cast<void>(jFilter["sort_direction"].asString());
         blSorted = true;
     }

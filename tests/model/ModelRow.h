@@ -14,7 +14,7 @@ enum class Kind { Text, Json, Number };
 struct Field {
     const char* szName;
     Kind kind;
-    Json::Value jDefault; // but for create_time, which is the time
+    Json::Value jDefault; // except for create_time: the present time
 };
 
 // In the order of the columns.

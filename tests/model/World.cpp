@@ -78,7 +78,7 @@ INTERPOSED int fdatasync(int)
     return 0;
 }
 
-// Formats the line, and drops it.
+// Formats the line and discards it.
 INTERPOSED void syslog(int, const char* szFormat, ...)
 {
     char szLine[256];

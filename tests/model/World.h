@@ -11,7 +11,7 @@
 // Seconds since the epoch; tests set it.
 time_t& worldClock();
 
-const time_t YEAR_10000 = 253402300800; // SQLite has no dates from then on
+const time_t YEAR_10000 = 253402300800; // SQLite's dates end before it
 
 // The user's name; null when there is no such user, or the look-up fails.
 const char* userName(uid_t uid);
