@@ -71,7 +71,7 @@ private:
 TEST_F(Batch, SpendsOnlyTheUsesThatItsEarlierCallsHaveLeft)
 {
     const struct {
-        const char* szChange;    // of a token that others are like
+        const char* szChange;    // of the token, whose other fields are the same in each row
         std::string strOutcomes; // of its calls one after the other: granted, refused or failed
         const char* szUses;      // afterwards
         gate::Figure figure;     // that counts the last of them

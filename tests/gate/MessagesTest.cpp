@@ -63,7 +63,7 @@ Reply told()
     return answer;
 }
 
-// Neighbouring bytes of a message, and how many other values each of them can have, all else being equal.
+// Runs of bytes in a message: how many bytes, and how many other values each can have while the rest stays.
 typedef std::vector<std::pair<int, int>> Freedom;
 
 template <typename Decode>
@@ -72,7 +72,7 @@ Freedom freedomOf(const std::string& strMessage, Decode decode)
     Freedom freedom;
     for (size_t nPlace = 0; nPlace < strMessage.size(); ++nPlace) {
         std::string strOther = strMessage;
-        int nValues = -1; // without its own
+        int nValues = -1; // its own value does not count
         for (int n = 0; n < 256; ++n) {
             strOther[nPlace] = static_cast<char>(n);
             nValues += decode(strOther).has_value();
@@ -85,7 +85,7 @@ Freedom freedomOf(const std::string& strMessage, Decode decode)
     return freedom;
 }
 
-// That a message comes back as it was, and that none of another size comes.
+// Checks that a message is read back equal, and that none of another size is accepted.
 template <typename Message, typename Decode>
 void expectWhole(const Message& message, Decode decode, size_t cbMax)
 {
@@ -102,7 +102,7 @@ void expectWhole(const Message& message, Decode decode, size_t cbMax)
 
 } // namespace
 
-TEST(Requests, ComeBackAsTheyWereIfTheyCanBe)
+TEST(Requests, AreReadBackEqualIfTheyAreValid)
 {
     Request cancel;
     cancel.ask = Ask::Cancel;
@@ -114,14 +114,14 @@ TEST(Requests, ComeBackAsTheyWereIfTheyCanBe)
           grantRequest(1, gate::API_MAX + 1), grantRequest(1, 1, gate::METHOD_MAX + 1)}) {
         EXPECT_FALSE(decodeRequest(encode(request)));
     }
-    // The number and the time; what is asked, and whether for a record; the sizes of the texts, and the
-    // texts.
+    // The number and the time; the kind of request, and whether it wants a record; the sizes of the texts,
+    // and the texts.
     EXPECT_EQ((Freedom{{16, 255}, {1, 0}, {1, 1}, {6, 0}, {3, 254}}),
               freedomOf(encode(grantRequest(1, 1, 1)), decodeRequest));
     EXPECT_EQ((Freedom{{16, 255}, {1, 2}, {1, 1}, {6, 0}}), freedomOf(encode(cancel), decodeRequest));
 }
 
-TEST(Answers, ComeBackAsTheyWereIfTheyCanBe)
+TEST(Answers, AreReadBackEqualIfTheyAreValid)
 {
     Reply refused;
     refused.outcome = Outcome::Refused;
@@ -132,8 +132,7 @@ TEST(Answers, ComeBackAsTheyWereIfTheyCanBe)
                                 granted(1, 1, gate::RECORD_MAX + 1)}) {
         EXPECT_FALSE(decodeReply(encode(answer)));
     }
-    // The number; the outcome, and whether the store is healthy; sizes, and what is unused; the uid; the
-    // rest.
+    // The number; the outcome, and whether the store is healthy; sizes, and unused bytes; the uid; the rest.
     EXPECT_EQ((Freedom{{8, 255}, {12, 0}, {4, 255}, {2, 254}, {1, 255}}),
               freedomOf(encode(granted(1, 1, 1)), decodeReply));
     EXPECT_EQ((Freedom{{8, 255}, {1, 0}, {1, 1}, {14, 0}, {sizeof(gate::Figures), 255}}),

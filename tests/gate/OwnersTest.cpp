@@ -10,7 +10,7 @@ using gate::Owners;
 
 namespace {
 
-// Waits until a name that was asked for is there.
+// Waits until a name that was asked for is known.
 void awaitName(Owners& owners)
 {
     struct pollfd event = {owners.descriptor(), POLLIN, 0};
@@ -23,7 +23,7 @@ void awaitName(Owners& owners)
 TEST(Owners, AreLookedUpOnceAndRemembered)
 {
     std::atomic<int> nLookUps{0};
-    // Never destroyed, as in the gate: its thread may stand still in a look-up.
+    // Never destroyed, as in the gate: its thread may be blocked in a look-up.
     auto& owners = *new Owners([&nLookUps](uid_t uid) {
         ++nLookUps;
         return uid ? Owners::Owner{Owners::State::Nobody, ""} : Owners::Owner{Owners::State::Known, "root"};

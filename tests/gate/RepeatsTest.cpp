@@ -20,7 +20,7 @@ Reply replyOf(uint64_t nNumber, Outcome outcome)
 
 } // namespace
 
-TEST(Repeats, TakeNothingFromACallThatCameLaterWithTheSameKey)
+TEST(Repeats, KeepTheEntryOfALaterCallWithTheSameKey)
 {
     Repeats repeats;
     repeats.find("key", 1, 0);

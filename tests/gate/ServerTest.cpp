@@ -1,5 +1,5 @@
-// The process that reads HTTP runs in a child of the test. The test plays its clients and the other process,
-// and moves its clock. A client's user is the number at the end of the client's address.
+// The process that reads HTTP runs in a child of the test. The test acts as its clients and as the other
+// process, and moves its clock. A client's user is the number at the end of the client's address.
 
 #include "gate/http/Server.h"
 
@@ -89,7 +89,7 @@ public:
     {
         return ::send(m_nSocket, strBytes.data(), strBytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
     }
-    // What comes next; "end" when nothing comes any more, and "error" when nothing has come, too.
+    // The next bytes; "end" after the last ones; "error" if receiving fails, also if nothing has come yet.
     std::string receive(int nFlags = 0) const
     {
         char rgBytes[32768];
@@ -142,7 +142,7 @@ protected:
         return socket;
     }
 
-    // Binds or connects to a name in the abstract name space, which leaves no files.
+    // Binds or connects to a name in the abstract name space, which needs no files.
     template <typename Function>
     void at(Function function, const Socket& socket, const std::string& strWhat) const
     {
@@ -154,7 +154,7 @@ protected:
                               sizeof(address)));
     }
 
-    // A client, of some user, that has sent something.
+    // A client of that user, which has sent something.
     Socket client(const std::string& strBytes = "", int nUser = 1000, const char* szWhere = "calls")
     {
         Socket socket(::socket(AF_UNIX, SOCK_STREAM, 0));
@@ -164,13 +164,13 @@ protected:
         return socket;
     }
 
-    // What is asked next. Figures are told, as the other process would.
+    // The next request to the other process. Requests for figures are answered here.
     Request asked()
     {
         for (;;) {
             const std::optional<Request> request = gate::decodeRequest(m_link.receive());
             if (!request) {
-                ADD_FAILURE() << "nothing is asked";
+                ADD_FAILURE() << "no request";
                 return {};
             }
             if (Ask::Figures != request->ask) {
@@ -193,7 +193,7 @@ protected:
         m_link.send(gate::encode(answer));
     }
 
-    // Ends when all that was there before has been looked at.
+    // Returns when the server has handled all earlier events.
     void settle() { EXPECT_EQ("404", client(NO_CALL, 0, "status").status()); }
 
     void pass(int64_t nTime)
@@ -211,8 +211,8 @@ protected:
         return strText.substr(nBegin, strText.find('\n', nBegin) - nBegin);
     }
 
-    // Sends the same over and over, up to so many bytes, until the server takes no more. Returns how many
-    // went.
+    // Sends the same text again and again, up to so many bytes, until the server accepts no more. Returns how
+    // many bytes it accepted.
     size_t fill(const Socket& socket, const std::string& strBytes, size_t cbMax)
     {
         size_t cbSent = 0;
@@ -301,16 +301,16 @@ TEST_F(Server, ClosesTheOldestIdleConnectionToMakeRoom)
     EXPECT_TRUE(idle[0].isOpen());
     const Socket one = client("", 1);
     settle();
-    EXPECT_EQ("end", idle[0].receive()) << "the oldest of the user who has too many";
+    EXPECT_EQ("end", idle[0].receive()) << "the oldest connection of the user who has too many";
     for (int i = 0; i < 254; ++i) {
         idle.push_back(client("", 2));
     }
-    settle(); // by the last connection that there is room for
+    settle(); // with the last connection that there is room for
     EXPECT_TRUE(oldest.isOpen());
     EXPECT_TRUE(std::all_of(idle.begin() + 1, idle.end(), [](const Socket& each) { return each.isOpen(); }));
     idle.push_back(client("", 2));
     settle();
-    EXPECT_EQ("end", oldest.receive()) << "the oldest of all";
+    EXPECT_EQ("end", oldest.receive()) << "the oldest connection of all";
     EXPECT_EQ("401", client(NO_CALL, 3).status());
     one.send(NO_CALL);
     EXPECT_EQ("401", one.status());
@@ -341,7 +341,7 @@ TEST_F(Server, AsksOnceForCallsWithTheSameKeyWithinFiveSeconds)
     }
 }
 
-TEST_F(Server, KeepsTheKeyOfAClientThatHasGoneUntilItsCallIsDecided)
+TEST_F(Server, KeepsTheKeyOfADisconnectedClientUntilItsCallIsDecided)
 {
     for (const bool blCancelled : {true, false}) {
         Socket gone = client(KEYED);
@@ -368,10 +368,10 @@ TEST_F(Server, KeepsTheKeyOfAClientThatHasGoneUntilItsCallIsDecided)
     }
 }
 
-TEST_F(Server, ReportsTheFiguresItWasToldAndNoOthers)
+TEST_F(Server, ReportsTheFiguresThatItReceivedAndNoOthers)
 {
     const Socket call = client(CALL);
-    answer(asked(), Outcome::Refused); // the figures too
+    answer(asked(), Outcome::Refused); // asked() also answers the request for figures
     EXPECT_EQ("403", call.status());
     EXPECT_EQ("4711", metric("vemo_gate_store_bytes"));
     Socket prober = client("GET /health HTTP/1.1\r\nHost: gate\r\n\r\n", 0, "status");
@@ -388,7 +388,7 @@ TEST_F(Server, LimitsTheQueueToTheOtherProcess)
     size_t nClients = 0;
     for (std::string strStatus; strStatus != "503" && ++nClients < 8000;) {
         const Socket one = client(CALL);
-        if (nClients % 100 == 0) { // all others have gone
+        if (nClients % 100 == 0) { // all others have disconnected
             const struct timeval timeout = {0, 50000};
             setsockopt(one.number(), SOL_SOCKET, SO_RCVTIMEO, &timeout, sizeof(timeout));
             const std::string strReceived = one.receive();
@@ -408,7 +408,7 @@ TEST_F(Server, LimitsTheQueueToTheOtherProcess)
     EXPECT_EQ("403", last.status());
 }
 
-TEST_F(Server, ServesThoseWhoHaveConnectedBeforeItStops)
+TEST_F(Server, ServesConnectedClientsBeforeItStops)
 {
     settle();
     kill(m_pid, SIGSTOP);

@@ -1,4 +1,4 @@
-// A table of tokens in memory, as a stranger can have made it: of one id there can be several, and any field
+// A table of tokens in memory, as another program can make it: several tokens can have one id, and any field
 // can be NULL.
 
 #ifndef TESTS_TOKEN_TABLE_H
@@ -14,14 +14,14 @@ protected:
     TokenTable()
     {
         EXPECT_EQ(SQLITE_OK, sqlite3_open(":memory:", &m_pDb));
-        // What it holds in reserve does not count for the limit of memory.
+        // SQLite's reserved memory does not count towards the limit of memory.
         sqlite3_db_config(m_pDb, SQLITE_DBCONFIG_LOOKASIDE, nullptr, 0, 0);
         run("CREATE TABLE token (tid, bind_sid, uid INTEGER, deadline INTEGER, count INTEGER, create_time "
             "INTEGER, "
             "function, webapi_allow, extra)");
     }
 
-    // Fails while there is a statement.
+    // Closing fails while a statement exists.
     void TearDown() override { EXPECT_EQ(SQLITE_OK, sqlite3_close(m_pDb)); }
 
     void run(const std::string& strSql)

@@ -14,7 +14,7 @@ const int64_t NO_LIMIT = 0;
 
 class Tokens : public TokenTable {
 protected:
-    // The error that SQLite tells of.
+    // The error that SQLite reports.
     template <typename Use>
     static std::string errorOf(Use use)
     {
@@ -26,7 +26,7 @@ protected:
         }
     }
 
-    // What it gives, or nothing, when there are so many bytes of memory left.
+    // The result of the call while so many bytes of memory are left, or nothing if it fails.
     template <typename Use>
     static auto within(int64_t cbLeft, Use use) -> std::optional<decltype(use())>
     {
@@ -55,10 +55,10 @@ TEST_F(Tokens, FailWithTheErrorOfSqlite)
     run("CREATE UNIQUE INDEX one ON token (tid)");
     EXPECT_EQ("none", errorOf([&] { insert.bind(1, strText).step(); }));
     EXPECT_EQ("2067 UNIQUE constraint failed: token.tid", errorOf([&] { insert.step(); }));
-    EXPECT_EQ("none", errorOf([&] { insert.bind(1, 2).step(); })) << "it has ended, and can be run again";
+    EXPECT_EQ("none", errorOf([&] { insert.bind(1, 2).step(); })) << "the statement can be run again";
 }
 
-TEST_F(Tokens, FailWithoutMemoryAndWorkAgainWhenThereIsSome)
+TEST_F(Tokens, FailWithoutMemoryAndThenWorkAgain)
 {
     EXPECT_FALSE(within(1, [&] { return Statement(m_pDb, "SELECT 1").step(); }));
 
@@ -66,7 +66,7 @@ TEST_F(Tokens, FailWithoutMemoryAndWorkAgainWhenThereIsSome)
     {
         Statement number(m_pDb, "SELECT deadline < 2 FROM token");
         EXPECT_TRUE(number.step());
-        EXPECT_FALSE(within(1, [&] { return number.text(0); })) << "which would be NULL";
+        EXPECT_FALSE(within(1, [&] { return number.text(0); })) << "it would read as NULL";
     }
     grant::Tokens tokens(m_pDb);
     std::optional<bool> blExpired;

@@ -1,7 +1,7 @@
 #!/usr/bin/python3 -B
-"""Answers and the uses that are spent agree, whatever happens to the gate. scene.py tells the usage.
+"""The gate's answers agree with the uses that are spent, whatever happens to the gate. scene.py has the usage.
 
-VEMO_TEST_FACTOR, a whole number, makes so many times as many kills; VEMO_TEST_SEED chooses other moments for them.
+There are VEMO_TEST_FACTOR times as many kills (a whole number); VEMO_TEST_SEED chooses other moments for them.
 """
 import collections
 import concurrent.futures
@@ -56,7 +56,7 @@ class Exactness(scene.Scene):
                 yield
             finally:
                 is_over.set()
-            list(spenders)  # raises what one of them raised
+            list(spenders)  # raises the exception of any of them
 
     @staticmethod
     def call(client, id):
@@ -95,7 +95,7 @@ class Exactness(scene.Scene):
             self.assertEqual(self.answer("calls", path=PATH, id=self.ids[0])[0], 503)
             self.assertEqual(self.left(), before)
         time.sleep(0.02)
-        # The gate had its turn when nobody waited for it any more, and did not keep it.
+        # The gate got the lock after the caller had its answer, and must have released it.
         self.assertTrue(scene.is_within(0.5, self.is_lock_free))
         self.assertEqual(self.answer("calls", path=PATH, id=self.ids[0])[0], 200)
         self.assertEqual(self.left(), before - 1)
@@ -126,7 +126,7 @@ class Exactness(scene.Scene):
             return int(children.read())
 
     def kill_some(self, name, victim):
-        """One that dies takes the other along. Of what was not answered, no more is spent than was under way."""
+        """When one process dies, the other ends too. Without an answer, only the calls under way may be spent."""
         kills = 10 * int(os.environ.get("VEMO_TEST_FACTOR", 1))
         moments = random.Random(os.environ.get("VEMO_TEST_SEED", "1"))
         made = 0

@@ -1,6 +1,6 @@
 #!/usr/bin/python3 -B
-"""The examples of examples/gate/ in front of the gate: nginx, Caddy, clients in four languages, and a
-front end on another machine. Of the examples, only paths and addresses are replaced. scene.py tells the usage.
+"""The examples of examples/gate/ with the gate: nginx, Caddy, clients in four languages, and a front end on
+another machine. Only paths and addresses are replaced in the examples. scene.py has the usage.
 """
 import http.server
 import json
@@ -22,7 +22,7 @@ FORGED = {"X-Token-User": "forged", "X-Token-Uid": "4711", "X-Token-Function": "
 
 
 class Application(http.server.BaseHTTPRequestHandler):
-    """Tells what reaches it."""
+    """Answers each request with a description of it."""
 
     def answer(self):
         body = self.rfile.read(int(self.headers.get("Content-Length", 0)))
@@ -112,9 +112,9 @@ class Clients(Scene):
         return result.returncode, result.stdout.strip(), result.stderr.strip()
 
 
-def users(told):
-    """What the application gets of the user's headers and the id."""
-    return {name: value for name, value in told["headers"].items()
+def users(asked):
+    """The headers about the user and the id that reach the application."""
+    return {name: value for name, value in asked["headers"].items()
             if name.replace("_", "-").startswith("x-token-") or name == "authorization"}
 
 
@@ -122,47 +122,47 @@ GRANTED = {"x-token-user": scene.OWNER, "x-token-uid": "0", "x-token-function": 
 
 
 class Proxy:
-    """What both proxies are asked."""
+    """The tests of both proxies."""
 
     def request(self, method="GET", path="/files/a?b=c", id=None, headers=None, body=None):
-        """The status, the headers, and what the application told, if it was asked."""
+        """The status, the headers, and the application's description of the request, if it got there."""
         status, headers, text = self.answer(self.PROGRAMS[0], method, path, id, headers, body)
         return status, headers, json.loads(text) if text.startswith('{"method"') else None
 
     def test_grants_and_refuses(self):
-        status, _, told = self.request(id=self.id)
-        self.assertEqual((status, told["method"], told["path"], users(told)),
+        status, _, asked = self.request(id=self.id)
+        self.assertEqual((status, asked["method"], asked["path"], users(asked)),
                          (200, "GET", "/files/a?b=c", GRANTED))
         self.assertEqual(self.uses(self.id), 2)
 
-        # Who forges the headers, in whatever case, gets one's own.
+        # Forged headers, in any case, are replaced by the token's own.
         for forged in (FORGED, {name.lower(): value for name, value in FORGED.items()}):
-            status, _, told = self.request(id=self.token(), headers=forged)
-            self.assertEqual((status, users(told)), (200, GRANTED))
+            status, _, asked = self.request(id=self.token(), headers=forged)
+            self.assertEqual((status, users(asked)), (200, GRANTED))
 
-        status, headers, told = self.request()
-        self.assertEqual((status, headers["WWW-Authenticate"], told), (401, "Bearer", None))
+        status, headers, asked = self.request()
+        self.assertEqual((status, headers["WWW-Authenticate"], asked), (401, "Bearer", None))
         for case, arguments in {"unknown": {"id": "0" * 127}, "method": {"id": self.id, "method": "DELETE"},
                                 "no such method": {"id": self.id, "method": "OPTIONS"},
                                 "preflight without a method": {"id": self.id, "method": "OPTIONS",
                                                                "headers": {"Origin": "https://example.net"}}}.items():
             with self.subTest(case):
-                status, _, told = self.request(**{"headers": FORGED, **arguments})
-                self.assertEqual((status, told), (403, None))
+                status, _, asked = self.request(**{"headers": FORGED, **arguments})
+                self.assertEqual((status, asked), (403, None))
         self.assertEqual(self.uses(self.id), 2)
 
     def test_lets_preflights_through_without_a_user(self):
-        status, _, told = self.request("OPTIONS", headers={**PREFLIGHT, **FORGED}, id=self.id)
-        self.assertEqual((status, told["method"], users(told)), (200, "OPTIONS", {}))
+        status, _, asked = self.request("OPTIONS", headers={**PREFLIGHT, **FORGED}, id=self.id)
+        self.assertEqual((status, asked["method"], users(asked)), (200, "OPTIONS", {}))
         self.assertEqual(self.uses(self.id), 3)
 
     def test_carries_bodies_and_large_cookies(self):
         body = "b" * 100000
-        status, _, told = self.request("POST", id=self.id, body=body)
-        self.assertEqual((status, told["method"], told["body"]), (200, "POST", body))
+        status, _, asked = self.request("POST", id=self.id, body=body)
+        self.assertEqual((status, asked["method"], asked["body"]), (200, "POST", body))
         cookie = "session=" + "c" * 30 * 1024
-        status, _, told = self.request(id=self.id, headers={"Cookie": cookie})
-        self.assertEqual((status, told["headers"]["cookie"]), (200, cookie))
+        status, _, asked = self.request(id=self.id, headers={"Cookie": cookie})
+        self.assertEqual((status, asked["headers"]["cookie"]), (200, cookie))
         self.assertEqual(self.uses(self.id), 1)
 
     def test_asks_under_a_key_that_the_client_cannot_choose(self):
@@ -173,13 +173,13 @@ class Proxy:
         self.assertEqual(self.request(id=self.id)[0], 200)
         with self.database() as other:
             other.execute("BEGIN EXCLUSIVE")
-            status, headers, told = self.request(id=self.id)
-            self.assertEqual((status, headers["Retry-After"], told), (503, "1", None))
+            status, headers, asked = self.request(id=self.id)
+            self.assertEqual((status, headers["Retry-After"], asked), (503, "1", None))
         self.assertEqual(self.uses(self.id), 2)
 
         self.assertEqual(self.end(self.gate), 0)
-        status, _, told = self.request(id=self.id)
-        self.assertEqual((status, told), (self.AWAY, None))
+        status, _, asked = self.request(id=self.id)
+        self.assertEqual((status, asked), (self.AWAY, None))
         self.assertEqual(self.uses(self.id), 2)
 
         self.start_gate()
@@ -222,7 +222,7 @@ class Caddy(Proxy, Scene):
 
 
 class ManyMachines(Scene):
-    """A front end asks the gate of another machine: two instances of nginx, and an authority of the test's own."""
+    """A front end asks the gate of another machine: two instances of nginx, and a certificate authority of the test."""
     PROGRAMS = ("nginx", "openssl")
 
     @classmethod
@@ -256,7 +256,7 @@ class ManyMachines(Scene):
         for name, path, status in ((None, "/grant/Example.File/get", 400), ("foreign", "/grant/Example.File/get", 400),
                                    ("front-end", "/metrics", 404)):
             tls = ssl.create_default_context(cafile=self.at("authority.pem"))
-            tls.verify_flags |= ssl.VERIFY_X509_STRICT # as newer versions of Python do by themselves
+            tls.verify_flags |= ssl.VERIFY_X509_STRICT # the default in newer versions of Python
             if name:
                 tls.load_cert_chain(self.at(name + ".pem"), self.at(name + ".key"))
             self.assertEqual(self.answer("tls", path=path, id=self.id, tls=tls)[0], status)

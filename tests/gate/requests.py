@@ -1,7 +1,7 @@
 #!/usr/bin/python3 -B
-"""What clients can send to the gate, and what they get for it: both of its processes, as they ship.
+"""What clients can send to the gate, and its answers, with both processes as they ship.
 
-scene.py tells the usage.
+scene.py has the usage.
 """
 import collections
 import contextlib
@@ -31,7 +31,7 @@ CLOSE = " close"
 
 USES = 1000
 LONGEST_ID = "x" * 1024
-BLANK_ID = "x " * 70 + "x"  # nobody's id can come so
+BLANK_ID = "x " * 70 + "x"  # a header cannot carry this id
 
 
 def call(headers="", line=LINE, auth=AUTH, host=HOST):
@@ -60,20 +60,20 @@ def head_of(size):
 
 
 def headers(text):
-    """A call with these headers besides, and what would be another call if they were taken for the end of a body."""
+    """A call with these headers too, and text that would be another call if they marked the end of a body."""
     return call(text + "\r\n") + "0\r\n\r\n" + GOOD
 
 
 def rows(name, send, expected, *texts):
-    """Rows of texts that are sent in the same form and get the same."""
+    """Rows for texts that are sent in the same form and get the same answer."""
     return [(f"{name} {text!r}", send(text), expected) for text in texts]
 
 
 GOOD = call()
 OLD = "GET /grant/Api/get HTTP/1.0\r\n"
 
-# What a client sends, and all that comes back, response by response. The client then sends nothing more and reads on
-# until the gate ends the connection. CLOSE: the response says that it does.
+# What a client sends, and all responses. The client then sends nothing more and reads until the gate ends the
+# connection. CLOSE: the response says that the gate ends it.
 ROWS = [
     ("a call", GOOD, [GRANTED]),
     ("two calls in one packet", GOOD + GOOD, [GRANTED, GRANTED]),
@@ -109,7 +109,7 @@ ROWS = [
     ("HTTP/1.0 without Host", call(line=OLD, host=""), [GRANTED + CLOSE]),
     ("HTTP/1.0 that goes on", call("Connection: Keep-Alive\r\n", line=OLD) + GOOD, [GRANTED + " keep-alive", GRANTED]),
     ("HTTP/1.0 in chunks", call("Transfer-Encoding: chunked\r\n", line=OLD), [MALFORMED + CLOSE]),
-    # bodies, and what else ends a connection
+    # bodies, and other reasons to end a connection
     *rows("behind", headers, [GRANTED + CLOSE], "Content-Length: 10", "Content-Length: " + "9" * 18,
           "Content-Length: 5\r\nExpect: 100-continue", "Transfer-Encoding:chunked", "Transfer-Encoding: CHUNKED",
           "Transfer-Encoding:\t chunked \t", "Connection: close", "Connection: x,\tCLOSE ,y",
@@ -202,7 +202,7 @@ def few_descriptors():
 
 
 def responses(received, sent):
-    """The responses in what was received, in words. Each must have what all have."""
+    """The responses in the received bytes, in words. Each must have the lines that all have in common."""
     found = []
     while received:
         head, separator, received = received.partition(b"\r\n\r\n")
@@ -246,7 +246,7 @@ class Requests(scene.Scene):
         return text.replace("{id:.126}", self.id[:126]).replace("{id}", self.id).encode(errors="surrogateescape")
 
     def received(self, client, sent):
-        """All that a client gets that sends nothing more, in words."""
+        """All that a client gets after it has ended its sending, in words."""
         with contextlib.suppress(OSError):
             client.shutdown(socket.SHUT_WR)
         received = b""
@@ -258,13 +258,13 @@ class Requests(scene.Scene):
 
     def test_each_is_answered_exactly(self):
         self.assertEqual(len({row[0] for row in ROWS}), len(ROWS))
-        before, told = self.told(), collections.Counter(["200"])  # that answer
-        idle = [self.connect() for _ in range(100)]  # more than the descriptors that it was started with
+        before, expected_counts = self.counts(), collections.Counter(["200"])  # of this request for the counts
+        idle = [self.connect() for _ in range(100)]  # more than the gate's descriptors at its start
         for name, text, expected in ROWS:
             with self.subTest(name):
                 left = self.left()
                 received = self.received(self.connect(text), text)
-                told.update(one[:3] for one in received)
+                expected_counts.update(one[:3] for one in received)
                 self.assertEqual(received, [GRANTED if one == AGAIN else one for one in expected])
                 spent = sum(one.startswith(GRANTED) and one != AGAIN for one in expected)
                 self.assertEqual(self.left(), left - spent)
@@ -272,14 +272,14 @@ class Requests(scene.Scene):
             for byte in self.bytes(GOOD):
                 idle[0].sendall(bytes([byte]))
             self.assertEqual(self.received(idle[0], GOOD), [GRANTED])
-            told["200"] += 1
-        with self.subTest("what no head begins with, before it has ended"):
+            expected_counts["200"] += 1
+        with self.subTest("a wrong beginning of a head, before its end"):
             idle[1].sendall(b"\r\n")
             self.assertTrue(idle[1].recv(4096).startswith(b"HTTP/1.1 400 "))
-            told["400"] += 1
-        self.assertEqual(self.told() - before, told)
+            expected_counts["400"] += 1
+        self.assertEqual(self.counts() - before, expected_counts)
 
-    def told(self):
+    def counts(self):
         """How often each status was answered, as the gate counts it."""
         text = self.answer("status", path="/metrics")[2]
         lines = re.findall(r'^vemo_gate_responses_total{status="(\d+)"} (\d+)$', text, re.MULTILINE)

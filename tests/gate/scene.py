@@ -2,7 +2,7 @@
 
 usage of each: NAME.py SOURCE-DIRECTORY GATE TOOL [CLASS...]
 GATE and TOOL are built with the redirection linked in. All runs below a throw-away directory, on Unix sockets, as the
-user who calls it. CLASS: the cases of this class only. Exit status 77: skipped, for the reason printed.
+user who runs it. CLASS: the cases of this class only. Exit status 77: skipped, for the reason printed.
 """
 import contextlib
 import http.client
@@ -47,7 +47,7 @@ def connected(path):
 
 
 def is_within(seconds, condition):
-    """Whether a condition comes to hold within this time."""
+    """Whether a condition becomes true within this time."""
     end = time.monotonic() + seconds
     while not condition():
         if time.monotonic() > end:
@@ -65,7 +65,7 @@ class Scene(unittest.TestCase):
         for program in cls.PROGRAMS:
             if not shutil.which(program, path=PATH):
                 raise unittest.SkipTest(f"{program} is not installed")
-        memory = os.environ.get("TMPDIR", "/dev/shm")  # no disk that each call waits for
+        memory = os.environ.get("TMPDIR", "/dev/shm")  # calls need not wait for a disk
         cls.directory = tempfile.mkdtemp(prefix="gate-", dir=memory if os.access(memory, os.W_OK) else None)
         cls.addClassCleanup(shutil.rmtree, cls.directory)
         cls.environment = {**os.environ, "PATH": PATH, "HOME": cls.directory, "GATE_SOCKET": cls.at("calls"),
@@ -92,7 +92,7 @@ class Scene(unittest.TestCase):
 
     @classmethod
     def socket(cls, name):
-        """The number of the file of a socket where a program listens."""
+        """The inode of the socket file where a program listens."""
         with contextlib.suppress(OSError), connected(cls.at(name)):
             return os.stat(cls.at(name)).st_ino
 
@@ -108,8 +108,8 @@ class Scene(unittest.TestCase):
 
     @classmethod
     def start_gate(cls, **options):
-        cls.gate = cls.start("status", *cls.gate_command(), **options)  # the socket that it makes last
-        cls.answer("status", path="/health")  # both of its processes
+        cls.gate = cls.start("status", *cls.gate_command(), **options)  # the gate makes this socket last
+        cls.answer("status", path="/health")  # both of its processes answer
         return cls.gate
 
     @classmethod
@@ -130,7 +130,7 @@ class Scene(unittest.TestCase):
 
     @classmethod
     def grant_by_tool(cls, id):
-        """As the gate would answer."""
+        """The status that the gate would answer."""
         status = subprocess.run([TOOL, "grant", "-", "Api", "get"], env=cls.environment, input=id.encode(),
                                 stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL).returncode
         return {0: 200, 1: 403}.get(status, status)
@@ -170,7 +170,7 @@ class Scene(unittest.TestCase):
 
     @classmethod
     def is_soon(cls, name, value):
-        """Whether a figure comes to be this: they can be a second old."""
+        """Whether a figure gets this value soon: figures can be a second old."""
         return is_within(3, lambda: cls.metric(name) == value)
 
 

@@ -1,5 +1,5 @@
 #!/usr/bin/python3 -B
-"""How the gate is started, by hand and by systemd, and what it finds then. scene.py tells the usage."""
+"""How the gate is started, by hand and by systemd, and the problems that it can meet. scene.py has the usage."""
 import fcntl
 import glob
 import os
@@ -30,7 +30,7 @@ class ByHand(scene.Scene):
         self.assertEqual(self.end(gate), 0)
 
     def serves_and_logs(self):
-        """Serves, and fails with a line in the log while others could open the lock."""
+        """The gate starts, but calls fail with a line in the log while others could open the lock."""
         self.assertEqual(self.call(), 200)
         os.chmod(self.at("session.lock"), 0o666)
         self.assertEqual(self.call(), 503)
@@ -68,7 +68,7 @@ class ByHand(scene.Scene):
 
 
 class BySystemd(scene.Scene):
-    """The gate's units: systemd has nothing to say against them, and hands both sockets over."""
+    """The gate's units: systemd finds nothing wrong with them, and passes both sockets to the gate."""
     PROGRAMS = ("systemd-analyze", "systemd-socket-activate")
 
     @classmethod
@@ -86,7 +86,7 @@ class BySystemd(scene.Scene):
                               stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True)
 
     def test_it_has_nothing_to_say_against_the_units(self):
-        # It looks up manual pages with man, which need not be there.
+        # systemd-analyze looks up manual pages with man, which may not be installed.
         result = self.analyze("--man=no", "verify", *glob.glob(self.at("*.socket")))
         self.assertEqual((result.returncode, result.stdout), (0, ""))
 

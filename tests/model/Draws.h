@@ -1,5 +1,4 @@
-// Draws the arguments of operations at random: from a few values, so that calls share them, and from odd
-// ones.
+// Draws the arguments of operations at random: from a few values, so that calls meet, or from odd ones.
 
 #ifndef TESTS_DRAWS_H
 #define TESTS_DRAWS_H
