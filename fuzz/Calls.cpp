@@ -2,8 +2,8 @@
 // method ("none" for none), and JSON, which is used as a record, as the options of a creation, as an update
 // and as a filter.
 //
-// The model does not know each filter with a string or a fraction for a number field (isOddFilter): such a
-// string becomes part of the statement. For these it is enough that the process survives.
+// The model does not cover each filter with a string or a fraction for a number field (isOddFilter): such a
+// string becomes part of the statement. With these the process must only survive.
 
 #include <algorithm>
 #include <map>
@@ -80,7 +80,7 @@ private:
     const TokenStore& m_files = emptyStore();
     Library m_library;
     Model m_model;
-    const fuzz::Database m_pDb = fuzz::open(m_files); // another connection
+    const fuzz::Database m_pDb = fuzz::open(m_files); // a second connection
 };
 
 // A value that is written and read again is equal.
@@ -153,7 +153,7 @@ void checkFilter(Pair& both, const Json::Value& jFilter)
     }
 }
 
-// An odd filter gives a result that the headers name. There may be no table behind it.
+// An odd filter gives a result that the headers name. It may have deleted the table.
 void checkOddFilter(AccessTokenDbApi& store, Json::Value jFilter)
 {
     Json::Value jFound(Json::arrayValue);

@@ -57,7 +57,7 @@ void requireSame(const Read& one, const Read& other)
     }
 }
 
-// Whether every reader finds the same lines: they end with CR LF, and there are no other control characters.
+// Whether any reader finds the same lines: they end with CR LF, and there are no other control characters.
 bool hasPlainLines(std::string_view strHead, size_t nLines)
 {
     size_t nFound = 0;
@@ -100,7 +100,7 @@ void requireSound(const Call& call)
     request.strTid = call.strTid;
     request.strApi = call.strApi;
     request.strMethod = call.strMethod;
-    FUZZ_REQUIRE(gate::decodeRequest(gate::encode(request))); // or the other process ends
+    FUZZ_REQUIRE(gate::decodeRequest(gate::encode(request))); // the other process ends if this fails
     FUZZ_REQUIRE(std::string::npos == call.strApi.find('/') && std::string::npos == call.strMethod.find('/'));
     const std::string strPlain = plain(call);
     Call again;

@@ -1,5 +1,5 @@
-// The library under the fuzzer. It works on a store of the tests (tests/faults/TokenStore.h) in their world
-// (tests/model/World.h).
+// The library under the fuzzer. It uses the tests' store (tests/faults/TokenStore.h) and their replacements
+// for the system (tests/model/World.h).
 
 #ifndef FUZZ_LIBRARY_H
 #define FUZZ_LIBRARY_H
@@ -26,7 +26,7 @@ inline std::string_view viewOf(const uint8_t* pData, size_t cbData)
     return {reinterpret_cast<const char*>(pData), cbData};
 }
 
-// Takes the first line off a text.
+// Removes the first line from a text and returns it.
 inline std::string takeLine(std::string_view& strRest)
 {
     const size_t cbLine = strRest.find('\n');

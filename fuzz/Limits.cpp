@@ -1,4 +1,4 @@
-// What SQL in a database or in a filter may do to the fuzzer: hardly anything.
+// Limits for SQL in a database or in a filter, which must not disturb the fuzzer.
 
 #include <sqlite3.h>
 #include <strings.h>
@@ -13,7 +13,7 @@ namespace {
 const int STEPS_MAX = 20000; // instructions of a statement
 const int LENGTH_MAX = 1 << 20;
 
-// Random values would make two readings differ.
+// With random values, two readings would differ.
 int isAllowed(void*, int nAction, const char* szName, const char* szFunction, const char*, const char*)
 {
     const bool blChance =

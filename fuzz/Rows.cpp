@@ -1,5 +1,5 @@
 // A hostile database: SQL that makes it, or the bytes of its file. Whatever it contains, the library decodes
-// the rows as SQLite returns them, or reports a failure.
+// the rows that SQLite returns, or reports a failure.
 
 #include <sqlite3.h>
 
@@ -32,8 +32,8 @@ Json::Value decoded(Kind kind, const char* szText)
                                 : Json::Value(Json::Int64{strtoll(szText, nullptr, 10)});
 }
 
-// Adds the token of a row, of which SQLite returns the texts. Ends the reading if a value is missing: it is
-// NULL, or the column's name has other letters than the field's.
+// Adds the token of a row, from the texts that SQLite returns. Ends the reading if a value is missing: it is
+// NULL, or the column's name differs from the field's.
 int addToken(void* pTokens, int nColumns, char** szTexts, char** szNames)
 {
     Json::Value& jToken = static_cast<Json::Value*>(pTokens)->append(Json::Value(Json::objectValue));
@@ -65,7 +65,7 @@ void checkReading(AccessTokenApi& api, sqlite3* pDb)
     Json::Value jAll(Json::objectValue);
     const int nResult = api.tokenList(jAll, jTokens);
     FUZZ_REQUIRE(0 == nResult || -1 == nResult);
-    if (strExpected == tokensOf(pDb)) { // and no view of the time
+    if (strExpected == tokensOf(pDb)) { // and the table is not a view that depends on the time
         FUZZ_REQUIRE(strExpected.has_value() == (0 == nResult));
         FUZZ_REQUIRE(!strExpected || fuzz::text(jTokens) == *strExpected);
     }

@@ -25,7 +25,7 @@ Texts argumentsOf(std::string_view strLines)
     return strArguments;
 }
 
-// The command, if the arguments begin with one; or else "".
+// The command if the arguments begin with one, otherwise "".
 std::string commandOf(const Texts& strArguments)
 {
     const bool blCommand =
@@ -54,7 +54,7 @@ const Parameter* find(const std::vector<Parameter>& parameters, IsIt isIt)
     return parameters.end() == pFound ? nullptr : &*pFound;
 }
 
-// What the command should read from the arguments behind its name, without getopt, by plain comparisons.
+// What the command should read from the arguments after its name, by plain comparisons, without getopt.
 // Nothing if they are not valid.
 std::optional<Reading> readPlainly(const tool::Command& command, const Texts& strArguments)
 {
@@ -119,7 +119,7 @@ std::optional<Reading> readPlainly(const tool::Command& command, const Texts& st
 // The exit status.
 int run(fuzz::ToolStore& store, const Texts& strArguments, const std::string& strInput)
 {
-    // To make all commands would take long.
+    // Making all commands would take long.
     const std::string strCommand = commandOf(strArguments);
     tool::Commands commands;
     for (const tool::CommandEntry& entry : tool::COMMANDS) {
@@ -172,7 +172,7 @@ bool endsWith(const std::string& strText, const std::string& strEnd)
            0 == strText.compare(strText.size() - strEnd.size(), strEnd.size(), strEnd);
 }
 
-// Notes on a file that was imported come first, when the next file fails.
+// If a later file fails, the notes on the files that were imported come first.
 std::string withoutNotes(std::string strComplaint)
 {
     for (;;) {

@@ -1,5 +1,5 @@
 // The text of a file to import. Either all of it is imported or nothing. What was imported can be exported
-// and imported again, and is the same without --partial if the import then succeeds.
+// and imported again. If an import succeeds without --partial, it imports the same.
 
 #include "ExportEnd.h"
 #include "Json.h"

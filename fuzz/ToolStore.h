@@ -117,7 +117,7 @@ public:
 
 private:
     const TokenStore m_directory;
-    const TokenStore m_store; // which the tool uses, since it is the newer one
+    const TokenStore m_store; // the tool uses it, because it is the newer store
     const Files m_inputs;
     Files m_first;
     char* m_szComplaints = nullptr;
@@ -127,7 +127,7 @@ private:
 
 } // namespace fuzz
 
-// To look at all processes of the machine takes long, and depends on what they do.
+// Reading about all processes of the machine takes long, and depends on them.
 extern "C" INTERPOSED DIR* opendir(const char* szPath)
 {
     return 0 == strcmp(szPath, "/proc") || 0 == strcmp(szPath, "/proc/") ? nullptr : NEXT(opendir)(szPath);
