@@ -1,5 +1,5 @@
 // The SQLite calls that the library must make, and nothing else: the baseline for the library's own cost.
-// Same calls, same statement texts, and the columns of a row are copied; no checks, no log, no JSON.
+// Same calls, same statement texts, and copies of the columns of a row; no checks, no log, no JSON.
 //
 // A failure throws std::runtime_error.
 

@@ -19,9 +19,9 @@
 
 namespace {
 
-const size_t CALLS_MAX = 200000; // of one process: far more than there is time for
+const size_t CALLS_MAX = 200000; // of one process: many more than it has time for
 
-// How often this process has written a token. A grant that has raised it has spent a use.
+// How often this process has written a token. A grant that increases it has spent a use.
 long long g_nWritten = 0;
 
 double now()
@@ -49,7 +49,7 @@ GrantCall timedGrant(int nToken, Calls calls)
 
 } // namespace
 
-// The library calls this one, which counts what is written.
+// The library calls this function, which counts the writes.
 extern "C" INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql,
                                        int (*callback)(void*, int, char**, char**), void* arg, char** pszErr)
 {
@@ -66,7 +66,7 @@ std::vector<GrantCall> grantAtOnce(int nProcesses, int nTokens, double dSeconds,
     const int nBad = runProcesses(nProcesses, [&](int nProcess) {
         const auto nFirst = static_cast<size_t>(nProcess);
         const double dEnd = now() + dSeconds;
-        // Failures are counted; a line about each would only fill the system log.
+        // Failures are counted; log lines about them would only fill the system log.
         VEMO_ACCESS_TOKEN::logToStdout(true);
         dup2(open("/dev/null", O_WRONLY), STDOUT_FILENO);
         for (int nToken = nProcess % nTokens; now() < dEnd; nToken = (nToken + nProcesses) % nTokens) {

@@ -11,7 +11,7 @@ BareToken freshToken(long long nCount)
 {
     BareToken token = tokenOf(FRESH);
     token.strFunction = FRESH_FUNCTION;
-    token.nUid = 0; // a user that there is everywhere
+    token.nUid = 0; // a user that exists everywhere
     token.nCount = nCount;
     return token;
 }

@@ -1,4 +1,4 @@
-// The operations that are measured: each exported function, and some calls of an object that is kept.
+// The measured operations: each exported function, and some calls of an object that stays open.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_MEASURED_CALLS_H
 #define VEMO_ACCESS_TOKEN_BENCH_MEASURED_CALLS_H
@@ -19,15 +19,15 @@ struct Call {
     Json::Value jResult;
     std::string strTid;
     char szUser[64];
-    std::unique_ptr<AccessTokenApi> pApi; // the held object
+    std::unique_ptr<AccessTokenApi> pApi; // the object that stays open
 };
 
 struct Operation {
     const char* szName;
-    void (*prepare)(Call&); // makes what the operation is to find; not measured
+    void (*prepare)(Call&); // makes what the operation needs; not measured
     int (*run)(Call&);
     int nExpected;          // what run returns
-    void (*runBare)(Call&); // what run must execute; null for a held object, and where that is nothing
+    void (*runBare)(Call&); // the calls of SQLite that run must make; null if none, or if pApi is used
 };
 
 const std::vector<Operation>& operations();

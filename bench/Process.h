@@ -1,4 +1,4 @@
-// Processes beside the benchmark.
+// Processes that run beside the benchmark.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_PROCESS_H
 #define VEMO_ACCESS_TOKEN_BENCH_PROCESS_H
@@ -13,7 +13,7 @@
 #include "AccessTokenApi.h"
 #include "Processes.h"
 
-// Runs as long as the object, or this process.
+// A process that runs until the object, or this process, ends.
 class Process {
 public:
     explicit Process(const std::function<void()>& body) : m_pid(startProcess(body)) {}

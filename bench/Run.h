@@ -8,11 +8,11 @@
 #include <string>
 
 // Registers the benchmarks, which main() then runs as the arguments say; the versions of compiler and
-// libraries go into the results. What fails throws: a benchmark of failures would be worth nothing.
+// libraries go into the results. A failure throws: the times of failures are worth nothing.
 void registerBenchmarks();
 
-// Registers run(state, arguments...). What it measures it reports as counters: the times that Google
-// Benchmark takes are of the preparations, too.
+// Registers run(state, arguments...). It reports its measurements as counters, because the times that Google
+// Benchmark measures include the preparations.
 template <typename Run, typename... Arguments>
 void add(const std::string& strName, int nIterations, Run run, Arguments... arguments)
 {

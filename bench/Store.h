@@ -15,10 +15,10 @@ enum class Place { Memory, Disk };
 
 const char* nameOf(Place place);
 
-// Exists as long as the object.
+// Removed with the object.
 class Store {
 public:
-    // Makes the store, and uses it.
+    // Makes the store and uses it.
     explicit Store(Place place);
     ~Store();
     Store(const Store&) = delete;
@@ -30,8 +30,8 @@ public:
     // Adds tokens until there are nTokens.
     void grow(int nTokens);
 
-    // What an administrator may do from outside: all that "tune" or "tune --wal" does, and what "tune
-    // --deadline-only" does.
+    // An administrator's tuning from outside: the same as "tune" or "tune --wal", and as "tune
+    // --deadline-only".
     void makeIndexes();
     void makeDeadlineIndex();
     void useWriteAheadLog();
@@ -43,15 +43,15 @@ private:
     int m_nTokens;
 };
 
-// The token of that number, which alone decides its id and texts. A store of n tokens holds those of 0 to
-// n - 1. Each has many uses left and allows two methods of one API. Tokens expire from a day on, ten a
-// second.
+// The token of that number; its id and texts depend on the number alone. A store of n tokens holds those of 0
+// to n - 1. Each has many uses left and allows two methods of one API. The first tokens expire after a day,
+// then ten in each second.
 BareToken tokenOf(int nNumber);
 
 // Its fields as texts, by their names.
 std::map<std::string, std::string> fieldsOf(const BareToken& token);
 
-const int FRESH = 100000000; // the number of a token that no store holds by itself
+const int FRESH = 100000000; // the number of a token that is in no store at first
 
 // An API and a method that the tokens allow.
 const char* const WEBAPI = "Example.File";

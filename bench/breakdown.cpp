@@ -8,12 +8,12 @@
 //
 //   open_us, close_us              sqlite3_open and sqlite3_close
 //   purge_us, select_us, save_us   sqlite3_exec of the DELETE, SELECT and REPLACE, without the row callback
-//   library_us                     all the rest, the row callback included
+//   library_us                     all the rest, including the row callback
 //   total_us                       the grant
 //
-// There are so many grants that those who count the system calls of a run, and divide by that number, need
-// not care what comes before and after the grants. Calls that read and set the effective uid are missing
-// there: the redirection of the database replaces them.
+// There are so many grants that the system calls of a run, divided by their number, are those of one grant:
+// the calls before and after the grants hardly count. Calls that read and set the effective uid are not among
+// them: the redirection of the database replaces these.
 
 #include <array>
 #include <chrono>
@@ -98,7 +98,7 @@ void breakdown(benchmark::State& state, bool blHeld, Place place, bool blWriteAh
     Samples total;
     std::string strTid = tokenOf(0).strTid;
     grant(held ? &*held : nullptr,
-          strTid); // reads the schema and begins the journal, as no other will have to
+          strTid); // only this first grant reads the schema and begins the journal
     for (auto _ : state) {
         g_rgdStep.fill(0);
         g_turnStart = Clock::now();

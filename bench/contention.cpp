@@ -1,7 +1,7 @@
 // Processes that grant one shared token at the same time, each as fast as it can for three seconds.
 //
-// Plain calls meet in the database, where SQLite's locks and the library's retries decide; serialised ones
-// queue for the call lock first. Each benchmark reports
+// Plain calls wait for SQLite's locks, which the library tries again; serialised calls wait for the call lock
+// first. Each benchmark reports
 //
 //   grants_per_second   calls that returned 0
 //   median_us, p99_us   times of single calls, those that returned -1 included

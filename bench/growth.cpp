@@ -1,9 +1,9 @@
-// What a grant costs as the number of tokens grows, without and with an administrator's indexes, beside the
-// bare engine's; and what the indexes cost that only deletions use.
+// The cost of a grant as the number of tokens grows, without and with an administrator's indexes, compared
+// with the bare engine's; and the cost of the indexes that only deletions use.
 //
-// A store takes turns with one of ten tokens, or of fewer indexes, so that the ratio of the two is not that
-// of two moments of the machine. The call that comes first in a turn finds the processor's caches as the
-// other store left them, and does not count. Each benchmark of growth reports
+// A store takes turns with one of ten tokens, or of fewer indexes, so that other load on the machine affects
+// both. The first call of a turn finds the other store's data in the processor's caches, and does not count.
+// Each benchmark of growth reports
 //
 //   median_us, few_us   of the library's grants in the two stores
 //   ratio, bare_ratio   of the two medians: the library's, and the bare engine's
@@ -54,7 +54,7 @@ std::unique_ptr<Store> makeStore(Place place, bool blIndexes, int nTokens)
     return pStore;
 }
 
-// The two take turns at being first. A different token each time: the pages of one would stay in the caches.
+// Each is first in every other turn. Each time another token: the pages of one would stay in the caches.
 void grantByBoth(const Store& store, int nTokens, int nTurn, Samples& ours, Samples& bare)
 {
     Samples first;
@@ -91,7 +91,7 @@ void growth(benchmark::State& state, Place place, bool blIndexes, int nTokens)
     state.counters["bare_ratio"] = bareMany.median() / bareFew.median();
 }
 
-// Grants and deletions with the index on the deadline alone beside those with all three.
+// Grants and deletions with the index on the deadline alone, compared with those with all three.
 void indexes(benchmark::State& state, Place place, int nTokens)
 {
     const auto pOne = makeStore(place, false, nTokens);

@@ -1,5 +1,5 @@
-// Runs each operation once, so that callgrind counts its instructions. instructions.sh runs this program and
-// reads the counts. With --environment it prints what the counts depend on instead.
+// Runs each operation, so that callgrind counts its instructions. instructions.sh runs this program and reads
+// the counts. With --environment it prints what the counts depend on instead.
 //
 // At the end of each turn (Turns.h) callgrind writes down the instructions since the turn began, under the
 // name of who executed them. The last part of an operation is the library's own, under the operation's name.
@@ -23,7 +23,7 @@
 namespace {
 
 enum { SQLITE = LIBRARY + 1, STANDIN };
-const char* const NAMES[] = {"own", "sqlite", "stand-in"}; // the last is no part of any count
+const char* const NAMES[] = {"own", "sqlite", "stand-in"}; // the last is not part of any count
 
 bool g_blCounting = false;
 
@@ -63,7 +63,7 @@ INTERPOSED int access(const char* szPath, int nMode) noexcept
     return NEXT(access)(szPath, nMode);
 }
 
-// Always the same bytes, so that generated ids have one length.
+// Always the same bytes, so that generated ids always have the same length.
 INTERPOSED ssize_t getrandom(void* pBuffer, size_t cbBuffer, unsigned int /* flags */)
 {
     const Turn turn(STANDIN);

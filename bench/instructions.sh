@@ -1,6 +1,6 @@
 #!/bin/bash
-# Counts the instructions of each operation with callgrind and holds them against a baseline, so that
-# what makes a call dearer shows on any machine, however busy it is.
+# Counts the instructions of each operation with callgrind and compares them with a baseline. So a change
+# that makes a call more expensive is found on any machine, however busy it is.
 # usage: instructions.sh PROGRAM BASELINE [--update]
 #   --update   writes the counts to BASELINE
 # Exit status 77: skipped, for the reason printed.
@@ -9,16 +9,16 @@ program=$(realpath "$1")
 baseline=$(realpath "$2")
 mode=${3-}
 
-# By how much, in per cent, a count may differ from the baseline's: that of all instructions of a call,
-# and that of the library's own, outside of sqlite3_open, sqlite3_exec and sqlite3_close. One build
-# counts the same within 0.02 %. The rest is for what moves pieces of the heap elsewhere, and for other
-# patch levels of compiler and libraries.
+# By how many per cent a count may differ from the baseline's: the count of all instructions of a call,
+# and that of the library's own, outside of sqlite3_open, sqlite3_exec and sqlite3_close. The counts of
+# one build differ by 0.02 % at most. The rest is for changes that move memory on the heap, and for
+# other patch levels of compiler and libraries.
 tolerance_total=2
 tolerance_own=1
 
-# Two things that the C library would choose by itself. The functions on strings and memory are those
-# that every x86-64 processor can run. And malloc keeps all small pieces that it gets back as they are:
-# the work of joining and dividing them depends on everything that went before.
+# Two things that the C library would choose by itself. It uses the functions on strings and memory
+# that every x86-64 processor can run. And malloc does not join or divide the small pieces that it gets
+# back: that work would depend on all earlier calls.
 functions=-AVX2,-AVX_Fast_Unaligned_Load,-ERMS,-Fast_Unaligned_Load,-SSE4_2,-SSSE3
 tunables=glibc.cpu.hwcaps=$functions:glibc.malloc.tcache_count=65535
 
@@ -28,8 +28,8 @@ skip()
     exit 77
 }
 
-# The environment without the last numbers of versions, which are taken to make no difference. Those of
-# jsoncpp do, where the library spends most of its own time.
+# The environment without the last numbers of versions, which should make no difference. jsoncpp keeps
+# them, because the library spends most of its own time there.
 comparable()
 {
     sed -E '/^jsoncpp/! s/([0-9]+\.[0-9]+)\.[0-9]+.*/\1/'
@@ -39,7 +39,7 @@ comparable()
 valgrind=$(command -v valgrind) || skip "valgrind is missing"
 [ -w /dev/shm ] || skip "there is no /dev/shm"
 
-# In memory, and by a name of the same length everywhere, since SQLite works on the path.
+# In memory, and with a name of the same length everywhere, since SQLite handles the path.
 dir=$(mktemp -d /dev/shm/vemo-instructions-XXXXXX)
 trap 'rm -rf "$dir"' EXIT
 
@@ -57,7 +57,7 @@ env -i LD_BIND_NOW=1 GLIBC_TUNABLES=$tunables VEMO_BENCH_MEMORY="$dir" \
     "$valgrind" --command-line-only=yes -q --vgdb=no --tool=callgrind --combine-dumps=yes \
     --callgrind-out-file="$dir/parts" "$program"
 
-# A part's summary is exact. Its "totals" are not: they take in some of what was executed before.
+# A part's summary is exact. Its "totals" are not: they include some earlier instructions.
 awk '
     /^desc: Trigger: / { who = /Client Request/ ? $NF : "" }
     /^summary: / && who != "" {
@@ -82,7 +82,7 @@ if [ "$mode" = --update ]; then
     exit
 fi
 
-# An operation that only one side has shows a 0 on the other.
+# An operation that only one side has gets a 0 on the other side.
 export LC_ALL=C
 join -a 1 -a 2 -e 0 -o 0,1.2,2.2,1.3,2.3 <(sort "$dir/counts") <(grep -v '^#' "$baseline" | sort) | awk \
     -v tolerance_total=$tolerance_total -v tolerance_own=$tolerance_own '

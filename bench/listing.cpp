@@ -1,4 +1,4 @@
-// What decoding costs, in time and memory: listing all tokens, compared with a plain query that builds the
+// The cost of decoding, in time and memory: listing all tokens, compared with a plain query that builds the
 // same values.
 
 #include <json/reader.h>
@@ -95,7 +95,7 @@ void listingMemory(benchmark::State& state)
     for (auto _ : state) {
         auto pApi = std::make_unique<AccessTokenApi>();
         malloc_trim(0);
-        if (!(std::ofstream("/proc/self/clear_refs") << "5" << std::flush)) { // the peak is now what there is
+        if (!(std::ofstream("/proc/self/clear_refs") << "5" << std::flush)) { // resets the peak
             throw std::runtime_error("the kernel does not forget the peak");
         }
         const double dBefore = procValue("self/status", "VmRSS:");

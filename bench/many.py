@@ -45,7 +45,7 @@ def make_store(path):
 
 
 def run(command):
-    """Seconds and kilobytes."""
+    """The seconds and kilobytes that a command takes."""
     start = time.monotonic()
     with subprocess.Popen([TOOL, *command], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
                           stderr=subprocess.DEVNULL) as tool:
@@ -57,7 +57,7 @@ def run(command):
 
 
 def run_beside(command):
-    """The same, and what the other program says."""
+    """The same, and the output of the other program."""
     with subprocess.Popen([CREATIONS, "100"], stdin=subprocess.PIPE, stdout=subprocess.PIPE) as beside:
         seconds, kilobytes = run(command)
         calls, there, longest = map(int, beside.communicate()[0].split())

@@ -20,7 +20,7 @@
 namespace {
 
 const int FEW = 10;      // tokens
-const int MANY = 100000; // with which a call takes so long that fewer calls must do
+const int MANY = 100000; // with these a call takes long, so fewer calls are made
 
 // Keeps the store for the other benchmarks of the same place and size.
 void useStore(Place place, int nTokens)

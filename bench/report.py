@@ -31,7 +31,7 @@ HALF_CHANGE = "no half change; the last one may be undone"
 RETURNED = "what returned is kept"
 ANSWERED = "what was answered is kept"
 SECONDS_LOST = "the last second or two of answers may be lost"
-PEERS = {  # what each promises at a power cut
+PEERS = {  # what each guarantees at a power cut
     "ours-plain-per-call": ("this library, a function per call", HALF_CHANGE),
     "ours-plain-held": ("this library, a held object", HALF_CHANGE),
     "ours-tuned-per-call": ("the same, tuned: a function per call", RETURNED),
@@ -44,14 +44,14 @@ PEERS = {  # what each promises at a power cut
     "postgresql-per-call": ("PostgreSQL, a connection per call", ANSWERED),
     "postgresql-held": ("PostgreSQL, a held connection", ANSWERED),
 }
-PEER_GOALS = (  # what, beside what, the most that the ratio may be
+PEER_GOALS = (  # what, compared with what, the greatest allowed ratio
     ("ours-tuned-held", "redis-always-held", 1),
     ("ours-plain-held", "redis-always-held", None),
     ("ours-plain-per-call", "postgresql-per-call", 1),
     ("ours-tuned-per-call", "postgresql-per-call", None),
 )
 
-GATE_GOALS = (  # what, beside what, the least ratio
+GATE_GOALS = (  # what, compared with what, the least allowed ratio
     ("write-ahead/8", "redis/8", 0.9),
     ("write-ahead/64", "redis/64", 1.0),
     ("write-ahead/256", "redis/256", 0.9),
@@ -86,7 +86,7 @@ def figures(content):
 
 
 def system_calls(path, grants):
-    """Of one grant: those that strace has counted in a whole run, divided by its grants."""
+    """The system calls of one grant: strace's counts of a whole run, divided by its grants."""
     numbers = dict.fromkeys(KINDS_OF_CALLS, 0)
     with open(path, encoding="utf-8") as file:
         for number, name in re.findall(r"^ *(\d+) (\w+)$", file.read(), re.MULTILINE):
@@ -96,7 +96,7 @@ def system_calls(path, grants):
 
 
 def measured(directory):
-    """What a run measured, as results.json keeps it."""
+    """The measurements of a run, as in results.json."""
     results = {}
     context = {}
     for program in PROGRAMS:
@@ -114,12 +114,12 @@ def measured(directory):
 
 
 def cells_of(results, program):
-    """The same by the parts of the names."""
+    """The same, by the parts of the names."""
     return {tuple(name.split("/")): cell for name, cell in results.get(program, {}).items()}
 
 
 def table(header, rows):
-    """A Markdown table that can be read as it stands."""
+    """A Markdown table that is readable as plain text."""
     texts = [header] + [[str(cell) for cell in row] for row in rows]
     widths = [max(len(row[i]) for row in texts) for i in range(len(header))]
     lines = ["| " + " | ".join(cell.ljust(width) for cell, width in zip(row, widths)) + " |" for row in texts]
@@ -141,15 +141,15 @@ def span(values, digits):
 
 
 def verdict(met):
-    """Of a goal, in each run."""
+    """In how many runs a goal was met."""
     if all(met):
         return "met"
     return f"met in {sum(met)} of {len(met)} runs" if any(met) else "missed"
 
 
 def machine(context, peers):
-    """What was measured, and on what."""
-    def told(command):
+    """The versions that were measured, and the machine."""
+    def printed(command):
         return subprocess.run(command, shell=True, capture_output=True, text=True, check=True).stdout.strip()
 
     with open("/proc/cpuinfo", encoding="utf-8") as file:
@@ -158,13 +158,13 @@ def machine(context, peers):
         platform.machine()
     lines = [
         f"{name}, {context['num_cpus']} processors, Linux {platform.release().split('-')[0]}",
-        f"memory: {told('df --output=fstype ${VEMO_BENCH_MEMORY:-/dev/shm} | tail -1')}, "
-        f"disk: {told('df --output=fstype ${VEMO_BENCH_DISK:-/var/tmp} | tail -1')}",
+        f"memory: {printed('df --output=fstype ${VEMO_BENCH_MEMORY:-/dev/shm} | tail -1')}, "
+        f"disk: {printed('df --output=fstype ${VEMO_BENCH_DISK:-/var/tmp} | tail -1')}",
         f"libvemoaccesstoken {context['library']}, {context['compiler']}, SQLite {context['sqlite']}, "
         f"jsoncpp {context['jsoncpp']}",
     ]
     if peers:
-        versions = told("redis-server --version; $(pg_config --bindir)/postgres --version")
+        versions = printed("redis-server --version; $(pg_config --bindir)/postgres --version")
         lines.append("Redis {}, PostgreSQL {}".format(*re.search(r"v=(\S+).*\) (\S+)", versions, re.DOTALL).groups()))
     return lines
 

@@ -16,7 +16,7 @@ typedef std::chrono::steady_clock Clock;
 
 struct Client {
     int nSocket = -1;
-    size_t nNext = 0; // the request
+    size_t nNext = 0; // the number of the next request
     std::string strReply;
     Clock::time_point sent;
 };

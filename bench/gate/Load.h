@@ -1,5 +1,5 @@
 // Clients of a server in a closed loop: each sends a request, waits for the whole reply, and sends the next.
-// All run in one thread, which needs much less time than a server does.
+// All run in one thread, which needs much less time than a server.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_LOAD_H
 #define VEMO_ACCESS_TOKEN_BENCH_LOAD_H
@@ -12,7 +12,7 @@
 
 struct Load {
     std::string strPath;          // of a Unix socket
-    std::string strBegin, strEnd; // of the replies, all of which grant
+    std::string strBegin, strEnd; // of the replies, which must all grant
     std::vector<std::string> strRequests;
 };
 

@@ -35,7 +35,7 @@ public:
     DiskStore(Journal journal, int nTokens) : Store(Place::Disk)
     {
         grow(nTokens);
-        BareEngine().run("UPDATE token SET uid = 0"); // an owner whom each machine knows
+        BareEngine().run("UPDATE token SET uid = 0"); // an owner who exists on each machine
         if (Journal::WriteAhead == journal) {
             useWriteAheadLog();
         }
@@ -86,7 +86,7 @@ private:
     const Process m_process;
 };
 
-// Lets the clients ask, and returns the number of replies. Each grants a use.
+// Runs the clients and returns the number of replies. Each reply grants a use.
 long long ask(benchmark::State& state, const Load& load, size_t nClients)
 {
     Loaded loaded;
@@ -149,7 +149,7 @@ void behindNginx(benchmark::State& state, bool blGate)
 
 void redis(benchmark::State& state, int nUsed, size_t nClients)
 {
-    // It reads and returns no more than the gate's answer needs.
+    // The script reads and returns only what the gate's answer needs.
     const Redis server(g_szRedis, TOKENS, {"count", "webapi_allow", "uid", "function"}, 3);
     Load load = {g_szRedis, "*2\r\n", "\r\n", {}};
     for (int i = 0; i < nUsed; ++i) {
@@ -164,7 +164,7 @@ void redis(benchmark::State& state, int nUsed, size_t nClients)
     ask(state, load, nClients);
 }
 
-// Programs that call the library; with blGate, while a gate holds the store open.
+// Programs that call the library; with blGate, while a gate has the store open.
 void callers(benchmark::State& state, Journal journal, int nProcesses, Calls calls, bool blGate)
 {
     const DiskStore store(journal, TOKENS);

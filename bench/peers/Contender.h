@@ -1,4 +1,4 @@
-// One way to store and grant tokens. Several are compared. What fails throws std::runtime_error.
+// One way to store and grant tokens. Several are compared. A failure throws std::runtime_error.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_CONTENDER_H
 #define VEMO_ACCESS_TOKEN_BENCH_CONTENDER_H
@@ -23,7 +23,7 @@ struct Contender {
 
 const int TOKENS = 1000;
 
-// Beside another: each call opens and closes the file while another process has it open.
+// With a second process: each call opens and closes the file while that process has it open.
 enum class Connection { PerCall, PerCallBesideAnother, Held };
 
 Contender makePostgresql(const char* szServer, Connection connection);

@@ -1,4 +1,4 @@
-// A Redis server that grants tokens. What fails throws std::runtime_error.
+// A Redis server that grants tokens. A failure throws std::runtime_error.
 
 #ifndef VEMO_ACCESS_TOKEN_BENCH_REDIS_H
 #define VEMO_ACCESS_TOKEN_BENCH_REDIS_H
@@ -21,8 +21,8 @@ public:
     typedef std::unique_ptr<redisReply, Deleter> Reply;
     typedef std::vector<const char*> Words;
 
-    // Replaces all that the server has by the tokens 0 to nTokens - 1. It keeps these fields of each, of
-    // which "count" and "webapi_allow" are the first two; a grant answers with those from number nFirst on.
+    // Replaces all data of the server by the tokens 0 to nTokens - 1. It stores these fields of each; "count"
+    // and "webapi_allow" are the first two. A grant returns the fields from number nFirst on.
     Redis(const char* szSocket, int nTokens, const Words& rgszField, int nFirst);
 
     void create(const BareToken& token) const;

@@ -24,7 +24,7 @@
 namespace {
 
 const int USES = 10;
-const int CALLS = 200; // of a repetition: the whole lives of some tokens
+const int CALLS = 200; // of a repetition: some tokens, from creation to deletion
 
 const char* const g_szRedisAlways = getenv("VEMO_BENCH_REDIS_ALWAYS");
 const char* const g_szRedisEverysec = getenv("VEMO_BENCH_REDIS_EVERYSEC");
@@ -63,7 +63,7 @@ Contender makeOurs(Tuning tuning, Connection connection)
     } else if (Connection::Held == connection) {
         pOurs->held.emplace();
     }
-    // A write-ahead journal that stays grows to some size, and is overwritten from then on. Only that later
+    // A write-ahead journal that stays grows to some size, and after that is overwritten. Only the later
     // phase is measured.
     std::string strTid = tokenOf(0).strTid;
     for (int i = 0; i < 400; ++i) {
