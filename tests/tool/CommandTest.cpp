@@ -6,7 +6,7 @@ using tool::Command;
 
 namespace {
 
-// What a command with a flag, an option and two arguments makes of a command line.
+// How a command with a flag, an option and two arguments reads a command line.
 class Reading {
 public:
     explicit Reading(std::vector<std::string> strArguments)
@@ -54,7 +54,7 @@ private:
 
 } // namespace
 
-// One after the other, so that nothing of one gets into the next.
+// One after the other, which also shows that nothing of one gets into the next.
 TEST(CommandLine, IsReadFromItsBeginning)
 {
     const std::pair<std::vector<std::string>, std::string> CASES[] = {

@@ -26,7 +26,7 @@ public:
         close(nSlave);
     }
 
-    // What it shows of what a function writes, which is not nothing.
+    // What it shows of a function's output, which must not be empty.
     template <typename Write>
     std::string shown(Write write) const
     {
@@ -45,7 +45,7 @@ const std::string ID(127, 'x');
 
 } // namespace
 
-TEST(Streams, AreAllThereAndNoMoreThanThese)
+TEST(Streams, AreAllOpenAndNoOtherDescriptorsAre)
 {
     tool::completeStreams();
     const int nFree = dup(STDOUT_FILENO);
@@ -109,7 +109,7 @@ TEST(LogLines, AreEscapedForATerminalAlone)
     EXPECT_EQ("\\xc3\\xa4\\x1b", tool::errorLine("\u00e4\x1b"));
 }
 
-// To another stdout than the program began with, too.
+// Also if stdout is not the one that the program began with.
 TEST(LogLines, GiveStdoutBack)
 {
     FILE* const pBefore = stdout;

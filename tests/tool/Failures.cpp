@@ -3,17 +3,17 @@
 //   VEMO_TEST_LOOKUP  an errno: each look-up of a user ends with it; ERANGE for buffers below 4 KiB only
 //   VEMO_TEST_VFS     the name of SQLite's way to work on files
 //   VEMO_TEST_ROOM    free blocks of a file system, their size, its files, and how many of these are free
-//   VEMO_TEST_CALLS   lines "CALL|ERRNO": all these calls fail; or "CALL|COMMAND": ahead of the first, the
-//                     command does what another program could. CALL is the name of a function below that
-//                     asks fails(), with that of its file behind it, if it has one.
+//   VEMO_TEST_CALLS   lines "CALL|ERRNO": all these calls fail; or "CALL|COMMAND": before the first call, the
+//                     command acts as another program. CALL is the name of a function below that asks
+//                     fails(), followed by the name of its file, if it has one.
 //   VEMO_TEST_HASTE   waiting for a locked database takes no time
-// And these name files that get what nobody sees otherwise:
-//   VEMO_TEST_WAITS   a line each time the library waits for a locked database; as a rule a fifo, so that who
-//                     holds the lock can let go just then
+// And these name files that record what is not visible otherwise:
+//   VEMO_TEST_WAITS   a line each time the library waits for a locked database; usually a fifo, so that the
+//                     holder of the lock can release it just then
 //   VEMO_TEST_WIPED   texts that are wiped from memory
 //   VEMO_TEST_SYSLOG  for each log line its priority, and whether the lock is "held" or "free" then; of lines
 //                     that tell of changes also the text, which does not get into the log of the machine
-// What is opened to be handed on to other programs ends the tool.
+// A descriptor that other programs would inherit ends the tool.
 
 #include <dirent.h>
 #include <fcntl.h>
@@ -65,7 +65,7 @@ void requireOwn(const char* szFile, int nFlags)
     }
 }
 
-// Nothing waits for the disk, which would be most of the tests' time.
+// No call waits for the disk: that would be most of the tests' time.
 int sync(int nFile)
 {
     if (fails("fsync")) {

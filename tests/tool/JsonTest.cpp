@@ -19,7 +19,7 @@ std::string nested(int nLevels)
     return std::string(static_cast<size_t>(nLevels), '[') + std::string(static_cast<size_t>(nLevels), ']');
 }
 
-// What is read, or why not.
+// The value that is read, or the reason why none is.
 std::string read(const std::string& strText)
 {
     try {
@@ -33,7 +33,7 @@ const std::string LONG(100, 'x');
 
 } // namespace
 
-TEST(Json, TellsHowDeepATextIsNested)
+TEST(Json, ShowsHowDeepATextIsNested)
 {
     const std::pair<const char*, int> CASES[] = {
         {"", 0},
@@ -98,7 +98,7 @@ TEST(Json, IsWrittenAsItIs)
               compactJson(jValue));
 }
 
-// What streams hide of it must not cut a text short, or turn a number into none.
+// Streams hide a lack of memory. It must not cut a text short, or make a number invalid.
 TEST(Json, IsWholeOrNoneWhenMemoryFails)
 {
     const std::string strText = R"({"a":[0.12345678901234559,")" + LONG + R"("]})";

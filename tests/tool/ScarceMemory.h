@@ -12,8 +12,8 @@
 
 inline int g_nUntilFailure = 0; // allocations
 
-// What a function gives, if anything, while one of its allocations fails: the first, the second and so on,
-// and none in the end.
+// The results of a function while one of its allocations fails: the first, the second and so on, and in the
+// end none.
 template <typename Call>
 auto resultsWhileMemoryFails(Call call)
 {
@@ -31,7 +31,7 @@ auto resultsWhileMemoryFails(Call call)
             results.insert(result);
         } catch (const std::bad_alloc&) {
             g_pAllocation = nullptr;
-        } catch (const Json::RuntimeError&) { // how jsoncpp can tell it
+        } catch (const Json::RuntimeError&) { // jsoncpp may report it so
             g_pAllocation = nullptr;
         }
     }

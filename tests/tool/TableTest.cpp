@@ -14,7 +14,7 @@ const size_t ENDLESS = SIZE_MAX;
 
 } // namespace
 
-TEST(Table, AlignsItsColumnsAndPutsNoBlanksBehindTheLast)
+TEST(Table, AlignsItsColumnsAndPutsNoBlanksAfterTheLast)
 {
     const std::vector<Table::Column> COLUMNS = {
         {"A", Kind::Short}, {"NUMBER", Kind::Right}, {"Z", Kind::Long}};
@@ -72,7 +72,7 @@ TEST(Table, GivesItsLongColumnsEqualSharesOfWhatIsLeft)
          "FIRST      N  LAST\n"
          "01 34567  12  0123\n"
          "              56789\n"},
-        // What the one does not need is for the other.
+        // One column gets the space that the other does not need.
         {"01234", "0 2 4 6 8 0 2 4 6 8", 23,
          "FIRST   N  LAST\n"
          "01234  12  0 2 4 6 8 0\n"
@@ -81,7 +81,7 @@ TEST(Table, GivesItsLongColumnsEqualSharesOfWhatIsLeft)
          "FIRST           N  LAST\n"
          "0 2 4 6 8 0 2  12  012\n"
          "4 6 8              \n"},
-        // No less than the titles and the words need; a word ends behind a comma, too.
+        // Not less than the titles and the words need; a word also ends after a comma.
         {"0 2 4 6", "0 2 4", 0,
          "FIRST   N  LAST\n"
          "0 2 4  12  0 2\n"

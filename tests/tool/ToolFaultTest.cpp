@@ -1,5 +1,5 @@
-// The commands of the tool while the system fails: each system call on a file and each allocation, once and
-// from then on; and a signal in front of each of these calls.
+// The commands of the tool while the system fails: each system call on a file and each allocation fails,
+// alone or with all later ones; and a signal comes before each of these calls.
 
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -22,8 +22,8 @@ namespace {
 
 namespace fs = std::filesystem;
 
-const int64_t STRIDE_OF_MEMORY = 32; // of the many allocations, these every day
-const int64_t LAST_CALLS = 12;       // each of them counts: they come when the change has been made
+const int64_t STRIDE_OF_MEMORY = 32; // of the many allocations, one in so many fails in a usual run
+const int64_t LAST_CALLS = 12;       // each of them is tried: they come after the change
 
 const std::string TID = idOf("three");
 const std::string OLD_FILE = "what was there\n";
@@ -69,8 +69,8 @@ const Command COMMANDS[] = {
     {"generate", {"generate"}},
 };
 
-// The sentences that name the cause. SQLite does not tell of a journal that it cannot make why, works on
-// where it may only read, and takes an error of reading for damage.
+// The sentences that name the cause. SQLite does not say why it cannot make a journal, continues where it may
+// only read, and takes an error of reading for damage.
 const std::map<Fault::Kind, std::vector<std::string>> CAUSES = {
     {Fault::Kind::Error,
      {"Input/output error", "disk I/O error", "unable to open database file",
@@ -94,8 +94,8 @@ std::string contentsOf(const fs::path& path)
     return contents.str();
 }
 
-// What the tool said, without what differs from run to run: fresh ids, times, and the name of a user, which
-// it leaves out where it cannot look it up.
+// The tool's output, without parts that differ between runs: new ids, times, and the name of a user, which it
+// omits if the look-up fails.
 std::string withoutChance(const std::string& strText)
 {
     std::string strOut;
@@ -117,7 +117,7 @@ std::string withoutChance(const std::string& strText)
     return strOut;
 }
 
-// The lines of what a run said on standard error, but for those that an undisturbed one says.
+// The lines of a run on standard error, without those of an undisturbed run.
 std::vector<std::string> sentences(const std::string& strError, const std::string& strUndisturbed)
 {
     std::vector<std::string> strLines;
@@ -201,7 +201,7 @@ protected:
     // - the store is sound and as before the command, after its purge or after all of it; the file OUT is the
     //   old one or the whole new one, and there is no other
     // - it succeeds, and all is done and said as undisturbed; or it fails with one sentence, which names the
-    //   cause, and says so when the change was made all the same
+    //   cause, and says so if the change was made even so
     // - it ends by itself, unless the fault is a signal
     void judge(const Fault& fault)
     {
@@ -273,7 +273,7 @@ protected:
         }
     }
 
-    // Each call fails, or each of a stride and each of the last: once, and from then on.
+    // Each call fails, or one in each stride and each of the last: alone, or with all later ones.
     void judgeEach(Fault::Kind kind, int64_t nStride)
     {
         const int64_t nCalls = calls(kind);
@@ -320,7 +320,7 @@ TEST_P(ToolFault, IsReportedForEachAllocation)
     print("allocations");
 }
 
-// Those that can be caught make a difference where a file must go, or an id must be told.
+// Signals that can be caught matter where a file must be removed, or an id must be printed.
 TEST_P(ToolFault, IsAllOrNothingAfterASignal)
 {
     const std::string& strCommand = GetParam().strArguments[0];

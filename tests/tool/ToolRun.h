@@ -1,4 +1,4 @@
-// A run of the tool in a process of its own, in which the system fails or kills it where a test wants that.
+// A run of the tool in its own process, in which the system fails or kills it where a test demands that.
 
 #ifndef TESTS_TOOL_TOOL_RUN_H
 #define TESTS_TOOL_TOOL_RUN_H
@@ -12,7 +12,7 @@ struct Fault {
     enum class Kind {
         Error,    // a system call on a file fails
         FullDisk, // a system call that takes room on the disk fails
-        Signal,   // the process gets a signal in front of a system call on a file
+        Signal,   // the process gets a signal before a system call on a file
         Memory,   // an allocation fails
     };
     Kind kind = Kind::Error;

@@ -1,5 +1,5 @@
 #!/usr/bin/env bats
-# What the system log tells of changes: who made them, and of which tokens.
+# The lines about changes in the system log: who made them, and of which tokens.
 
 load common
 
@@ -131,7 +131,7 @@ create: 1 token deleted (created-...)" ]
     [ "$status" -eq 143 ]
     [ "$(told)" = "revoke: 1 token deleted (token---...)" ]
 
-    # A change that is undone is not told.
+    # A change that is undone is not logged.
     row token---
     sql "CREATE TRIGGER refuse BEFORE DELETE ON token BEGIN SELECT RAISE(ABORT, 'no'); END"
     run_tool revoke token---

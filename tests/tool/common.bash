@@ -1,4 +1,4 @@
-# Loaded by the tests of the tool. Each test has a directory of its own, $DIR, with the private directory and the
+# Loaded by the tests of the tool. Each test has its own directory, $DIR, with the private directory and the
 # database in it.
 #
 # It calls the tool by one of these; each is explained below:
@@ -93,7 +93,7 @@ gives() {
     expect 0 "$1"
 }
 
-# says OUTPUT SENTENCE ARGUMENTS...: the same, but for that sentence on standard error
+# says OUTPUT SENTENCE ARGUMENTS...: the same, with that sentence on standard error
 says() {
     run_tool "${@:3}"
     expect 0 "$1" "vemo-access-token: $2"
@@ -111,7 +111,7 @@ fails() {
     expect "$1" "" "vemo-access-token: $2"
 }
 
-# expect_first FINDING: doctor has findings, and tells this one first
+# expect_first FINDING: doctor has findings, and prints this one first
 expect_first() {
     run_tool doctor
     [ "$status $stderr${lines[0]}" = "5 $1" ]
@@ -195,7 +195,7 @@ tune --dry-run
 TABLE
 }
 
-# need_store: makes the store, if there is none
+# need_store: makes the store if there is none
 need_store() {
     [ -e "$DB" ] || tool init >/dev/null
 }

@@ -125,7 +125,7 @@ TABLE
     cmp "$DB" "$DIR/before"
 }
 
-# As the manual page tells it.
+# As the manual page describes it.
 @test "what can be read of a damaged database can be saved" {
     a_store
     sql "WITH RECURSIVE n(i) AS (SELECT 10 UNION ALL SELECT i + 1 FROM n WHERE i < 99)

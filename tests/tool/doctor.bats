@@ -13,8 +13,8 @@ ELSEWHERE="the tokens stand elsewhere, or nowhere|find out who made it; move the
 NO_TOKENS="there are no tokens; the first call that needs it makes it"
 ALL_RIGHT="no findings"
 
-# found STATUS FINDINGS [SENTENCE]: doctor has ended with that, has told these findings, each of them here on one line
-# "SEVERITY: WHAT|MEANING|REMEDY", and has said the sentence, if any
+# found STATUS FINDINGS [SENTENCE]: doctor has ended with that status and printed these findings, each of them here on one
+# line "SEVERITY: WHAT|MEANING|REMEDY", and the sentence, if any
 found() {
     output=${output//$'\n    meaning: '/|}
     output=${output//$'\n    remedy: '/|}
@@ -165,7 +165,7 @@ no findings'
     rm "$DB"
     finds 0 "note: $no_file|vemo-access-token init"$'\n'"$ALL_RIGHT"
     [ ! -e "$DB" ]
-    # A journal without a database tells that there was one.
+    # A journal without a database shows that there was one.
     install -m 0600 /dev/null "$DB-journal"
     finds 5 "error: $no_file|vemo-access-token init"
     rm "$DB-journal"
@@ -286,7 +286,7 @@ error: $REAL_DIRECTORY cannot be written to: Read-only file system|$NO_CHANGE|ma
 }
 
 @test "directories above that others can change are left to the administrator" {
-    # Nothing below is opened: that the table is missing is neither told nor mended.
+    # Nothing below is opened: the missing table is neither reported nor mended.
     in_namespace 'mkdir /usr/vemo && chmod 0777 /usr/vemo && "$1" init >/dev/null && sqlite3 "$2" "DROP TABLE token" &&
         chmod 0755 "${2%/*}" && ! "$1" doctor --repair && mv /usr/vemo /usr/elsewhere && ln -s elsewhere /usr/vemo &&
         "$1" doctor' "$TOOL" "$REAL_DB"
@@ -788,7 +788,7 @@ END
     expect_left meant-to-last sound
 }
 
-# How it is told.
+# The output.
 
 @test "findings come as JSON, and say what was repaired" {
     rows <<'END'

@@ -9,8 +9,8 @@ WRITING="BEGIN IMMEDIATE;"
 # What a reader has open stands in the way when a change is committed, not when it begins.
 READING="BEGIN; SELECT count(*) FROM token;"
 
-# lock STATEMENTS: another process executes them and keeps the lock that they take, until stream 7 tells it
-# to commit and go
+# lock STATEMENTS: another process executes them and keeps the lock that they take, until it reads on stream 7
+# that it must commit and end
 lock() {
     rm -f "$DIR/to-holder" "$DIR/from-holder"
     mkfifo "$DIR/to-holder" "$DIR/from-holder"
@@ -208,7 +208,7 @@ TABLE
             [ "$status ${lines[0]}" = "5 error: $locked" ]
             [[ $output != *"move the file away"* ]]
         else
-            # It tells what it has repaired before, and leaves the rest.
+            # It reports what it has repaired before, and leaves the rest.
             chmod 0755 "$VEMO_REDIRECT_DIR"
             VEMO_TEST_HASTE=1 run_tool doctor --repair
             [ "$status ${lines[0]}" = "5 repaired: $REAL_DIRECTORY has mode 0755" ]

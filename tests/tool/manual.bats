@@ -39,7 +39,7 @@ long_options() {
         echo "$command:"
         options_of "$command" | grep -vxF -- "$common" >"$DIR/options" || true
         description "$command" | grep '^\.It Fl' | long_options | diff "$DIR/options" -
-        # None that it has not is told of it in passing either.
+        # Nor does the text mention an option that the command does not have.
         description "$command" | long_options | diff "$DIR/options" -
     done
     diff <(options_of) <(grep -vx -- --verbose <<<"$common")

@@ -34,7 +34,7 @@ VALUES += [str(integer).encode() for integer in [*INTEGERS, 2**64 - 1]] + list(m
 
 def rows():
     for i, piece in enumerate(PIECES):
-        text = piece + PIECES[-i] + b"a" + piece  # in front of, between and behind others
+        text = piece + PIECES[-i] + b"a" + piece  # before, between and after others
         numbers = [INTEGERS[(i + column) % len(INTEGERS)] for column in range(4)]
         data = b"{" + json_text(text) + b":[" + VALUES[i % len(VALUES)] + b"," + json_text(piece) + b"]}"
         yield (text + b"/%d" % i, piece, *numbers, text, data, data)

@@ -3,7 +3,7 @@
 
 load common
 
-# purges NUMBER: so many tokens; ahead of that, --dry-run tells how many, and changes nothing
+# purges NUMBER: so many tokens; before that, --dry-run prints how many, and changes nothing
 purges() {
     cp "$DB" "$DIR/before"
     gives "$1 would be purged" purge --dry-run
@@ -28,7 +28,7 @@ END
     expect_left kept kept-for-a-minute
 }
 
-# What a command tells of the store must be on the disk. Where it is not known to be, the command fails.
+# What a command prints about the store must be on the disk. If this is not certain, the command fails.
 @test "what a command shows outlasts a power cut, also when others changed it" {
     row token---
     while read -r arguments; do

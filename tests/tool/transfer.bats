@@ -418,7 +418,7 @@ TABLE
 1 holds a NUL byte~sed '1s/$/\x00/'~sed '1s/$/\x00{broken/'~sed '1s/^/\x00/'
 2 is nested too deeply for JSON~sed "2s/{}/$deep/"
 TABLE
-    # The message tells no other line's number.
+    # The message shows no other line's number.
     sed '2s/.*/{/' "$DIR/whole" >"$DIR/file"
     run_tool import "$DIR/file"
     [[ $stderr != *"Line 1"* ]]
