@@ -1,5 +1,5 @@
 #!/bin/bash
-# Runs scripts/demo and checks that it tells the whole story and leaves nothing behind.
+# Runs scripts/demo and checks that it shows every step and leaves nothing behind.
 # usage: demo.sh SOURCE-DIRECTORY [--system]
 # Exit status 77: skipped, for the reason printed.
 set -euo pipefail

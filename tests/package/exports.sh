@@ -1,5 +1,5 @@
 #!/bin/bash
-# What the shared object shows to the outside: its name, that it stays loaded, and what it exports.
+# The shared object as seen from outside: its name, that it stays loaded, and its exported symbols.
 # usage: exports.sh LIBRARY
 set -euo pipefail
 source=$(dirname "$0")/../..
@@ -14,7 +14,7 @@ if [ "$soname" != libvemoaccesstoken.so.6 ]; then
     status=1
 fi
 
-# Json::Value crosses the interface: another jsoncpp would be another interface.
+# Json::Value is part of the interface: another jsoncpp would be another interface.
 jsoncpp=$(objdump -p "$library" | awk '$1 == "NEEDED" && /jsoncpp/ { print $2 }')
 if [ "$jsoncpp" != "${JSONCPP[$RELEASE]-$jsoncpp}" ]; then
     echo "the library needs $jsoncpp, and not ${JSONCPP[$RELEASE]} as programs of Debian $RELEASE do"

@@ -1,5 +1,5 @@
 #!/bin/bash
-# What the build does to the library and the programs so that faults of the code are harder to exploit.
+# The options of the build that make faults of the library and the programs harder to exploit.
 # usage: hardening.sh LIBRARY PROGRAM...
 set -euo pipefail
 status=0
@@ -29,7 +29,7 @@ for program in "$@"; do
 
     if [ "$(uname -m)" = x86_64 ]; then
         code=$(objdump --disassemble --no-show-raw-insn "$program")
-        # In steps of a page, none jumps over the guard page.
+        # The stack grows in steps of a page, so that it cannot jump over the guard page.
         ! shows "$(grep -v 'sub *.0x1000,%rsp' <<<"$code")" 'sub +.0x[0-9a-f]{4,7},%rsp' ||
             fault "it takes more than a page of the stack at once"
         shows "$(grep -A 1 -E '<(main|VemoAccessTokenGrant)>:$' <<<"$code")" endbr64 ||

@@ -1,7 +1,7 @@
 #!/bin/bash
 # Installs the build below a prefix of its own, and builds and runs programs outside of the tree against that: README's
 # example, found by pkg-config, and the life of tokens, found by CMake. Installs it into a staging directory, too.
-# A project that takes this one in installs nothing of it.
+# A project that includes this one installs nothing of it.
 # usage: install.sh BUILD-DIRECTORY SOURCE-DIRECTORY JSONCPP-INCLUDE-DIRECTORY COMPILER
 set -euo pipefail
 build=$1

@@ -1,7 +1,7 @@
 #!/bin/bash
-# The manual pages: mandoc has nothing to say against them, they leave nothing of the interface and no log line out
-# and invent none, and their examples compile and print what the pages say.
-# They make HTML as CONTRIBUTING says.
+# The manual pages: mandoc finds nothing wrong, they describe the whole interface and every log line and no others, and
+# their examples compile and print what the pages say.
+# The command in CONTRIBUTING makes HTML of them.
 # usage: manual-pages.sh SOURCE-DIRECTORY BUILD-DIRECTORY JSONCPP-INCLUDE-DIRECTORY COMPILER
 # Exit status 77: skipped, for the reason printed.
 set -euo pipefail
@@ -30,7 +30,7 @@ section()
     sed -n "/^\.Sh $2\$/,/^\.Sh /p" "$1" | sed '/^\.Sh /d'
 }
 
-# plain: standard input without the escapes of mdoc; any that is not known here is left, and fails later
+# plain: standard input without the escapes of mdoc; an escape that is unknown here stays, and fails later
 plain()
 {
     sed 's/\\e/\x01/g; s/\\-/-/g; s/\\&//g; s/\\(aq/'"'"'/g; s/\\(dq/"/g; s/\\(ha/^/g; s/\\(ti/~/g; s/\\(ga/`/g
@@ -102,7 +102,7 @@ done <"$dir/names"
             s/jParam\.isMember\("[a-z_]+"\)/jParam.isMember("FIELD")/; /^Failed \[%s\]/d' | sort -u >"$dir/messages"
 [ "$(wc -l <"$dir/messages")" -gt 100 ]
 
-# Whatever stands in the place of an argument.
+# Any text may be in the place of an argument.
 sed 's/[][(){}.*+?^$|\\]/\\&/g; /^Failed/!s/%[ds]/.*/g' "$dir/messages" >"$dir/patterns"
 for page in "${functions[@]}" vemo-access-token.7; do
     section "$page" DIAGNOSTICS | sed -n '/^\.Bl -diag/,/^\.El/s/^\.It "\(.*\)"$/\1/p'
@@ -136,7 +136,7 @@ for file in "${programs[@]}" *.out; do
     mv text "$file"
 done
 
-# The system log is left in peace.
+# Nothing is written to the system log.
 echo 'extern "C" void syslog(int, const char*, ...) {}' >log.cc
 "$compiler" -c log.cc -o log.o
 

@@ -1,5 +1,5 @@
 #!/bin/bash
-# A part of the build for which something is missing is left out, and is an error when it was asked for.
+# A part of the build that needs something missing is left out, or is an error if it was asked for.
 # usage: parts.sh SOURCE-DIRECTORY COMPILER
 set -euo pipefail
 source=$1

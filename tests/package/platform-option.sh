@@ -1,6 +1,6 @@
 #!/bin/bash
-# Builds against a prefix with the platform's libraries (here the stand-ins, made into such) and
-# checks that the library then takes the three from there.
+# Builds against a prefix with the platform's libraries (here built from the stand-ins) and checks
+# that the library then uses all three from there.
 # usage: platform-option.sh SOURCE-DIRECTORY COMPILER
 set -euo pipefail
 source=$1
@@ -24,7 +24,7 @@ done
 mkdir "$dir/database"
 VEMO_REDIRECT_DIR=$dir/database "$dir/build/examples/token-life-redirected" | tail -n 2
 
-# A platform may also tell of a user whom it does not know by leaving the pointer alone.
+# A platform may also report an unknown user by leaving the pointer unchanged.
 "$compiler" -shared -fPIC -include "$dir/include/vemouser.h" -x c++ - -o "$dir/silent.so" \
     <<<'int VEMOUserGetByUID(uid_t, VEMOUser**) { return 0; }'
 VEMO_REDIRECT_DIR=$dir/database LD_PRELOAD=$dir/silent.so \
