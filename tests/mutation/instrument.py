@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Writes a copy of the sources that holds all mutants at once, and the list of these.
+"""Writes a copy of the sources that holds all mutants at the same time, and the list of these.
 
 usage: instrument.py PROJECT OUTPUT
 OUTPUT gets the sources in their directories, and mutants.txt: the names of the mutants, which tell what each changes
@@ -155,7 +155,7 @@ class Source:
     # Statements
 
     def statements(self, block, last):
-        """last: behind the block, the function ends."""
+        """last: the function ends after the block."""
         children = list(block.get_children())
         for i, child in enumerate(children):
             self.statement(self.labelled(child), last and i + 1 == len(children))

@@ -1,7 +1,7 @@
-// Included ahead of each mutated source file: what the mutated places call. One mutant at most is active, the
-// one whose number stands in the environment variable VEMO_MUTANT. Each place also notes, where
-// VEMO_MUTANTS_REACHED names a file, which of its mutants would have made a difference there: the byte of
-// that number becomes 1.
+// Included before each mutated source file: the functions that the mutated places call. At most one mutant is
+// active, the one whose number is in the environment variable VEMO_MUTANT. If VEMO_MUTANTS_REACHED names a
+// file, each place also notes there which of its mutants would have made a difference: the byte of that number
+// becomes 1.
 //
 // What the compiler evaluates stays as it is.
 
@@ -23,9 +23,9 @@ namespace mutants {
 inline int g_nActive = -1;
 inline unsigned char* g_pReached = nullptr;
 
-// Ahead of all that could reach a mutant. The plain system calls pass by the functions that the tests put in
-// front of the system's, and nothing stays open. The mapping outlives forks and notes what a killed process
-// did.
+// Runs before any mutant can be reached. The plain system calls bypass the functions by which the tests
+// replace the system's, and nothing stays open. The mapping stays in forked processes and also notes what a
+// killed process did.
 __attribute__((constructor(101))) static void start()
 {
     const char* szActive = getenv("VEMO_MUTANT");
@@ -42,7 +42,7 @@ __attribute__((constructor(101))) static void start()
     }
     const size_t cbReached = static_cast<size_t>(syscall(SYS_lseek, fd, 0, SEEK_END));
     void* pReached = mmap(nullptr, cbReached, PROT_READ | PROT_WRITE, MAP_SHARED, fd, 0);
-    if (MAP_FAILED != pReached) { // which a test can give too little memory for
+    if (MAP_FAILED != pReached) { // a test may leave too little memory for it
         g_pReached = static_cast<unsigned char*>(pReached);
     }
     syscall(SYS_close, fd);

@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Runs the tests against each mutant, and compares what survives with the list of those that may.
+"""Runs the tests against each mutant, and compares the survivors with the list of those that may survive.
 
 usage: run.py BUILD MUTANTS SURVIVORS [-j JOBS] [-k PATTERN] [-n N]
 BUILD is the build of the mutated sources, MUTANTS the list that instrument.py wrote. SURVIVORS explains the mutants
@@ -30,13 +30,13 @@ import tempfile
 import time
 
 DEMAND = 95  # of 100 mutants are killed
-QUICK = 0.2  # seconds that a test may take which is tried on explained mutants too
+QUICK = 0.2  # seconds that a test may take to be run on explained mutants too
 LONGEST = 60  # seconds that a test may take at all
-MEMORY = 4 << 30  # bytes that a test may take, so that a loop without an end does not take all
+MEMORY = 4 << 30  # bytes that a test may take, so that an endless loop does not take all
 
 
 def kill_all_in(place):
-    """What a test has started and left behind: all of it knows the place."""
+    """Kills the processes that a test has left behind: the place is in their environment."""
     for process in pathlib.Path("/proc").glob("[0-9]*"):
         try:
             if f"TMPDIR={place}".encode() in (process / "environ").read_bytes().split(b"\0"):
@@ -58,7 +58,7 @@ class Test:
         self.reached = b""
 
     def passes(self, limit, **settings):
-        """In a directory of its own for what it may leave behind when it is killed."""
+        """Runs it in its own directory, for the files that it may leave behind when it is killed."""
         with tempfile.TemporaryDirectory(ignore_cleanup_errors=True) as place:
             os.chmod(place, 0o755)  # some tests become another user
             environment = {**os.environ, **self.settings, **settings, "TMPDIR": place}

@@ -1,5 +1,5 @@
-// What the parser sees instead of the macros, so that it can tell where each argument of one stands:
-// functions and variables of the same names. Nothing of it is compiled or run.
+// Functions and variables that the parser sees instead of the macros of the same names, so that it knows the
+// place of each argument. They are neither compiled nor run.
 
 #include <json/value.h>
 #include <sqlite3.h>
