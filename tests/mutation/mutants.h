@@ -1,7 +1,7 @@
 // Included before each mutated source file: the functions that the mutated places call. At most one mutant is
 // active, the one whose number is in the environment variable VEMO_MUTANT. If VEMO_MUTANTS_REACHED names a
-// file, each place also notes there which of its mutants would have made a difference: the byte of that number
-// becomes 1.
+// file, each place also notes there which of its mutants would have made a difference: the byte of that
+// number becomes 1.
 //
 // What the compiler evaluates stays as it is.
 

@@ -19,7 +19,7 @@ const std::string SHOWN = "xxxxxxxx...";
 
 TEST(Masking, ShowsEightCharactersOf)
 {
-    const std::string strMarks(40, '\x80'); // which continue nothing
+    const std::string strMarks(40, '\x80'); // continuation bytes without a first byte
     const char* const FACE = "\U0001f600";
     std::string strFaces;
     for (int i = 0; i < 8; ++i) {
@@ -43,7 +43,7 @@ TEST(Masking, ShowsEightCharactersOf)
     }
 }
 
-TEST(Masking, ShortensWhatIsAsLongAsAnId)
+TEST(Masking, ShortensTextsAsLongAsAnId)
 {
     EXPECT_EQ("\"" + SHORT + "\"", tool::quoted(SHORT));
     EXPECT_EQ("\"" + SHOWN + "\"", tool::quoted(ID));
@@ -52,8 +52,8 @@ TEST(Masking, ShortensWhatIsAsLongAsAnId)
     EXPECT_EQ("/" + SHOWN + "/b", shownPath("/" + SHORT + "/b"));
 }
 
-// What is quoted in a reason, from the first to the last of the marks.
-TEST(Masking, ShortensWhatAReasonQuotes)
+// The quoted part of a reason, from the first to the last quotation mark.
+TEST(Masking, ShortensTheQuotedPartOfAReason)
 {
     const std::string CASES[][2] = {
         {"no such column: a", "no such column: a"},

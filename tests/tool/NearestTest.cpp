@@ -30,8 +30,8 @@ TEST(DidYouMean, NamesTheNearestIfItIsNear)
         {"li", ""}, // half of it
         {"gran", "did you mean \"grant\"?"},
         {"gra", ""},
-        {"lost", "did you mean \"list\"?"}, // as near to "last"
-        {"lxyt", ""},                       // half of it, too
+        {"lost", "did you mean \"list\"?"}, // "last" is as near
+        {"lxyt", ""},                       // also half of it
         {"--funct", "did you mean \"--function\"?"},
         {"--func", ""},
         {"list of tokens", ""},

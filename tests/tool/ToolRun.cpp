@@ -34,7 +34,7 @@
 
 namespace {
 
-// Not among them: close, whose descriptor is gone whatever it answers, and the calls for locks.
+// Without close, which closes the descriptor whatever it returns, and without the calls for locks.
 const std::vector<int> CALLS_ON_FILES = {
 #ifdef __NR_open // older ones, which not every machine has
     __NR_open,     __NR_stat,     __NR_lstat,      __NR_access,    __NR_mkdir,
@@ -65,8 +65,8 @@ bool takesRoom(const struct seccomp_data& call)
                : std::count(CALLS_THAT_TAKE_ROOM.begin(), CALLS_THAT_TAKE_ROOM.end(), call.nr);
 }
 
-// From now on, the calls on files of this thread, and of what it forks, wait to be answered. Returns the
-// descriptor that tells of them, or -1 where the kernel does not do that.
+// From now on, the calls on files of this thread, and of processes that it forks, wait for an answer. Returns
+// the descriptor that reports them, or -1 if the kernel cannot do this.
 int handOverCalls()
 {
     std::vector<struct sock_filter> program = {
@@ -77,12 +77,12 @@ int handOverCalls()
     }
     program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW));
     const struct sock_fprog filter = {static_cast<unsigned short>(program.size()), program.data()};
-    prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0); // without which only root may
+    prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0); // otherwise only root may do this
     return static_cast<int>(
         syscall(__NR_seccomp, SECCOMP_SET_MODE_FILTER, SECCOMP_FILTER_FLAG_NEW_LISTENER, &filter));
 }
 
-// The child: it is the tool from here on.
+// Runs in the child, which becomes the tool.
 [[noreturn]] void beTool(std::vector<std::string> strArguments, const Fault& fault, int64_t& nAllocations)
 {
     strArguments.insert(strArguments.begin(), "vemo-access-token");
@@ -94,7 +94,7 @@ int handOverCalls()
     if (0 != fault.nSignal) {
         signal(fault.nSignal, SIG_DFL); // which jobs in the background inherit as ignored
     }
-    sqlite3_shutdown(); // for it to begin from nothing
+    sqlite3_shutdown(); // so that it is initialised anew
     if (Fault::Kind::Memory == fault.kind) {
         g_allocations.nFirst = fault.nFirst;
         g_allocations.nLast = fault.nLast;
@@ -117,7 +117,7 @@ bool isMet(const struct seccomp_data& call, const Fault& fault)
            (Fault::Kind::FullDisk != fault.kind || takesRoom(call));
 }
 
-// The errno with which a call fails, or 0. Counts the calls that the fault can happen to.
+// The errno with which a call fails, or 0. Counts the calls to which the fault can happen.
 int errorOf(const struct seccomp_notif& call, const Fault& fault, int64_t& nMet)
 {
     if (__NR_openat == call.data.nr && O_TMPFILE == (call.data.args[2] & O_TMPFILE) &&
@@ -134,7 +134,7 @@ int errorOf(const struct seccomp_notif& call, const Fault& fault, int64_t& nMet)
     return Fault::Kind::Error == fault.kind ? EIO : ENOSPC;
 }
 
-// Answers until nobody calls any more. Returns how many calls the fault could happen to.
+// Answers until there are no more callers. Returns to how many calls the fault could happen.
 int64_t answerCalls(int nCalls, const Fault& fault)
 {
     int64_t nMet = 0;
@@ -167,7 +167,7 @@ std::string textOf(int nFile)
 
 } // namespace
 
-// Where syncs do nothing for the tests, the tool's must come to be answered.
+// Elsewhere in the tests a sync does nothing. The tool's must be a system call, to be answered.
 extern "C" int fsync(int nFile)
 {
     return static_cast<int>(syscall(__NR_fsync, nFile));
@@ -178,7 +178,7 @@ extern "C" int fdatasync(int nFile)
     return static_cast<int>(syscall(__NR_fdatasync, nFile));
 }
 
-// The processes of the machine are others in each run.
+// The other processes of the machine differ in each run.
 extern "C" DIR* opendir(const char* szPath)
 {
     if (0 == strcmp(szPath, "/proc/")) {

@@ -18,7 +18,7 @@ const int64_t MINUTE = 60;
 const int64_t HOUR = 60 * MINUTE;
 const int64_t DAY = 24 * HOUR;
 
-// What a reader says of a text that it refuses.
+// The message of a reader that refuses a text.
 template <typename Read>
 std::string refusal(Read read, const std::string& strText)
 {
@@ -29,7 +29,7 @@ std::string refusal(Read read, const std::string& strText)
     }
 }
 
-// The parts of a text, between bars.
+// The parts of a text, which are separated by bars.
 std::vector<std::string> split(const std::string& strText)
 {
     std::istringstream stream(strText);
@@ -58,7 +58,7 @@ TEST(Users, AreLookedUpOnceInAList)
               seam().callsOf({"getpwuid_r"}));
 }
 
-TEST(Users, AreNotLookedUpByNumbersThatNobodyCanHave)
+TEST(Users, AreNotLookedUpByImpossibleNumbers)
 {
     for (const int64_t nUid : {int64_t{-1}, int64_t{-4294967296}, int64_t{4294967296}}) {
         EXPECT_THROW(tool::userName(nUid), tool::Failure);
@@ -66,7 +66,7 @@ TEST(Users, AreNotLookedUpByNumbersThatNobodyCanHave)
     EXPECT_EQ(std::vector<std::string>(), seam().callsOf({"getpwuid_r"}));
 }
 
-TEST(Users, HaveNumbersButForTheLast)
+TEST(Users, HaveAnyNumberExceptTheLast)
 {
     EXPECT_EQ(4294967294U, tool::parseUid("4294967294"));
     EXPECT_EQ("\"4294967295\" is not a number from 0 to 4294967294", refusal(tool::parseUid, "4294967295"));
@@ -160,7 +160,7 @@ TEST(Times, ThatDoNotExistAreRefused)
                "2060-01-0112:00|2060-01-01  12:00|2060-01-01\n12:00")) {
         EXPECT_EQ(sentence(strText), refusal(parseTime, strText));
     }
-    setZone("Australia/Lord_Howe"); // where they leap over half an hour
+    setZone("Australia/Lord_Howe"); // its clocks change by half an hour
     EXPECT_EQ(sentence("2060-10-03 02:15"), refusal(parseTime, "2060-10-03 02:15"));
     for (const std::string& strSeconds : split("|-1| 1|1x|1.5|9223372036854775808|4000000000Z")) {
         EXPECT_EQ("\"" + strSeconds + "\" is not a number from 0 to 9223372036854775807",
@@ -190,7 +190,7 @@ TEST(RelativeText, HasOneUnit)
     for (const auto& [nLeft, szText] : CASES) {
         EXPECT_EQ(szText, relativeText(nNow + nLeft, nNow)) << nLeft;
     }
-    // What is too far away to be counted, and what is just not.
+    // Times that are too far away to be counted, and times just within the limit.
     EXPECT_EQ("far off", relativeText(INT64_MAX, -1));
     EXPECT_EQ("in 106751991167300 d", relativeText(INT64_MAX, 0));
     EXPECT_EQ("expired 106751991167300 d ago", relativeText(INT64_MIN + 1, 0));

@@ -11,7 +11,7 @@ using namespace std::string_literals;
 
 namespace {
 
-// The ends of what one, two, three and four bytes can say.
+// The first and last characters of one, two, three and four bytes.
 const std::string ENDS = "\u0080 \u07ff \u0800 \uffff \U00010000 \U0010fffe \U0010ffff";
 
 } // namespace
@@ -26,7 +26,7 @@ TEST(Visible, TextsAreEscapedByBytes)
         {R"(\ \x \\x \)", R"(\ \x5cx \\x5cx \)", R"(\ \x5cx \\x5cx \)"},
         {"\u00e4x\U0001f600x", "\u00e4x\U0001f600x", R"(\xc3\xa4x\xf0\x9f\x98\x80x)"},
         {"\xff\xe4x\xf0\x9f\x98", R"(\xff\xe4x\xf0\x9f\x98)", R"(\xff\xe4x\xf0\x9f\x98)"},
-        {"\xf4\x90\x80\x80", R"(\xf4\x90\x80\x80)", R"(\xf4\x90\x80\x80)"}, // behind the last character
+        {"\xf4\x90\x80\x80", R"(\xf4\x90\x80\x80)", R"(\xf4\x90\x80\x80)"}, // after the last character
         {"\u00a0\u200b", R"(\xc2\xa0\xe2\x80\x8b)", R"(\xc2\xa0\xe2\x80\x8b)"},
     };
     for (const auto& each : CASES) {

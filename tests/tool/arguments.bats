@@ -91,7 +91,7 @@ TABLE
     LC_ALL=C fails 2 'unknown command "café"' café # only of a terminal anything is known
 }
 
-# Behind a bad value stands an unknown option, so that it is the first mistake of a command that needs more.
+# An unknown option follows the bad value, so that the bad value is the first mistake of a command that needs more.
 @test "an option refuses the same values in every command that has it" {
     a_number='"VALUE" is not a number from 1 to 9223372036854775807'
     a_time='"VALUE" is not a time: write 2026-12-31, "2026-12-31 23:59", 2026-12-31T23:59:59Z or @1798761599'
@@ -145,7 +145,7 @@ TABLE
     [ "$(state)" = "$before" ]
 }
 
-# Two of the commands take other ids, and one none on standard input.
+# Two of the commands take other ids, and one takes none from standard input.
 @test "an id that can be none is refused by every command that takes one" {
     three_tokens
     for call in "create --uid 0 --function VPN --tid ID" "check ID Api" "grant ID Api" "show ID" "update ID --uses 2" \

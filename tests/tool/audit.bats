@@ -4,7 +4,7 @@
 load common
 
 # told [CALLER]: the lines so far, without what all of them have: priority, that the lock was free, and the caller;
-# that is who runs the test, or as given
+# the caller is the user who runs the test, unless it is given
 told() {
     local caller=${1-by uid $(id -u)} login line
     login=$(cat /proc/self/loginuid 2>/dev/null) || true
@@ -119,12 +119,12 @@ purge: 6 tokens deleted" ]
     [ "$(told)" = "create: 1 token created (created-...)
 create: 1 token deleted (created-...)" ]
 
-    # Somebody has the database open, so it looks for seconds whether the token comes back.
+    # Another program has the database open, so the tool watches for seconds whether the token is written back.
     run timeout 1 "$TOOL" revoke token--- 8<"$DB"
     [ "$status" -eq 124 ]
     [ "$(told)" = "revoke: 1 token deleted (token---...)" ]
 
-    # The change is made, and is just getting to the disk.
+    # The change is made and is being synced.
     row token---
     # shellcheck disable=SC2016 # the tool's shell knows its parent
     VEMO_TEST_CALLS='fsync|kill -TERM $PPID' run_tool revoke token---

@@ -1,5 +1,5 @@
 #!/usr/bin/env bats
-# check, and where grant must say the same
+# check, and grant where it must give the same answer
 
 load common
 

@@ -1,10 +1,10 @@
 #!/usr/bin/env bats
 # The completions for bash, zsh and fish. The shells run as they do for people: on a terminal, with the
-# tab key; fish has a command of its own for that.
+# tab key; fish has its own command for that.
 
 load common
 
-# Files to complete, and in the tool's place a program that tells that it was called.
+# Files to complete, and in the tool's place a program that records that it was called.
 prepare() {
     COMPLETION=${TOOL%/tests/*}/tools/completion
     mkdir -p "$DIR/bin" "$DIR/home" "$DIR/files/backups"
@@ -88,7 +88,7 @@ fish_tab() {
         true"
 }
 
-# What shells offer behind these words.
+# What shells offer after these words.
 OFFERED='vemo-access-token stats --output |json|jsonl|metrics|table
 vemo-access-token list --output |csv|json|jsonl|table
 vemo-access-token list --field |bind_sid|count|create_time|deadline|extra|function|tid|uid|webapi_allow
@@ -119,7 +119,7 @@ completes() {
     [ ! -e "$DIR/called" ]
 }
 
-# Words to type, with a tab behind, and the words that they become. The first is always the name of the
+# Words to type, followed by a tab, and the words that they become. The first is always the name of the
 # tool.
 CASES='li                            => list
 list --user roo                      => list,--user,root

@@ -8,7 +8,7 @@ column() {
     sql "SELECT $1 FROM token WHERE tid = '$2'"
 }
 
-# An id of the caller's own: as short as may be.
+# An id that the caller chooses, as short as allowed.
 OWN=own-$(printf '%0123d' 0)
 
 @test "create prints the id alone, and uses the library's defaults" {
@@ -83,7 +83,7 @@ END
     [ "$stderr" = 'vemo-access-token: --allow: "A *" stands for this name alone: "*" is no wildcard
 vemo-access-token: --allow: "A *" holds a blank, which is part of the name
 vemo-access-token: --allow: "c d" holds a blank, which is part of the name' ]
-    # A creation that fails tells nothing of this.
+    # A creation that fails does not print these warnings.
     run_tool create --uid 0 --function VPN --tid "$(sql "SELECT tid FROM token LIMIT 1")"
     expect 2 "" "vemo-access-token: --tid: there is a token with this id already"
 }
@@ -92,7 +92,7 @@ vemo-access-token: --allow: "c d" holds a blank, which is part of the name' ]
     tool init
     gives "$OWN" create --uid 0 --function VPN --allow Api --tid "$OWN"
     gives "${OWN/own/two}" create --uid 0 --function VPN --allow Api --tid - <<<"${OWN/own/two}"
-    # It may hold anything, and be as long as the caller likes.
+    # It may contain any character, and be of any greater length.
     odd="' \"Ä\\$(printf '%010000d' 0)"
     gives "$odd" create --uid 0 --function VPN --allow Api --tid - <<<"$odd"
     tool generate | tool create --uid 0 --function VPN --tid - >"$DIR/tid"
@@ -117,11 +117,11 @@ $OWN|1" ]
     succeeds create --uid 0 --function VPN --allow Api
     [ "$(sql "SELECT tid FROM token")" = "$output" ]
     [ "$(stat -c %a "$DB")" = 700 ]
-    # A creation that was caught half-way leaves an empty file.
+    # An interrupted creation leaves an empty file.
     : >"$DB"
     succeeds create --uid 0 --function VPN --allow Api
     [ "$(sql "SELECT tid FROM token; PRAGMA auto_vacuum" | xargs)" = "$output 1" ]
-    # The way to one that is there may be a link.
+    # The path to an existing one may be a link.
     ln -s session "$DIR/links"
     VEMO_REDIRECT_DIR=$DIR/links succeeds create --uid 0 --function VPN --allow Api
 }

@@ -1,6 +1,6 @@
-// A program beside the tool: creates a token each so many milliseconds until its standard input ends, and
-// says how many there were to be, how many of them are there, and how many milliseconds the longest call
-// took.
+// A program that runs beside the tool: creates a token each so many milliseconds until its standard input
+// ends, and prints how many it was to create, how many of them exist, and how many milliseconds the longest
+// call took.
 //
 // usage: creations MILLISECONDS
 
@@ -33,7 +33,7 @@ int main(int argc, char** argv)
         Json::Value jOption(Json::objectValue);
         const auto start = Clock::now();
         VemoAccessTokenCreateByTid(uid, strPurpose, jOption,
-                                   strTid); // a call that waited says that it failed
+                                   strTid); // a call that had to wait reports failure
         longest = std::max(longest, Clock::now() - start);
     }
     AccessTokenDbApi db;

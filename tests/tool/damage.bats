@@ -1,6 +1,6 @@
 #!/usr/bin/env bats
-# A database that is damaged, missing or out of reach, or a file that is none: each command says so in one sentence,
-# changes nothing, and never takes it for one without tokens
+# A database that is damaged, missing or out of reach, or a file that is not a database: each command says so in one
+# sentence, changes nothing, and never takes it for a database without tokens
 
 load common
 
@@ -12,7 +12,7 @@ teardown() {
     [ ! -d "$VEMO_REDIRECT_DIR" ] || chmod 0700 "$VEMO_REDIRECT_DIR"
 }
 
-# a_store: ten tokens, on several pages; $ID is one of them, and $DIR/other holds one that is none of them
+# a_store: ten tokens, on several pages; $ID is one of them, and $DIR/other holds another one
 a_store() {
     ID=$(a_token --allow Api:get --uses 5)
     tool export 2>/dev/null | sed '$d; s/"tid":"......../"tid":"________/' | whole >"$DIR/other"
@@ -34,7 +34,7 @@ all_fail() {
     [ ! -e "$DIR/exported" ]
 }
 
-# spoil PAGE: random bytes or, with /dev/zero as second argument, zeroes in the place of that page
+# spoil PAGE: replaces that page by random bytes or, with /dev/zero as second argument, by zeroes
 spoil() {
     dd if="${2-/dev/urandom}" of="$DB" bs=4096 seek=$(($1 - 1)) count=1 conv=notrunc status=none
 }
@@ -98,7 +98,7 @@ TABLE
     expect_first "error: $REAL_DIRECTORY is not a directory"
 }
 
-# Commands leave alone what they do not need: here the map of pages, which is for shrinking the file.
+# Commands do not read what they do not need: here the map of pages, which is for shrinking the file.
 @test "tokens can be listed as long as they can be read" {
     a_store
     cp "$DB" "$DIR/sound"

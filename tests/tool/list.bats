@@ -116,7 +116,7 @@ extra|{}|{"a":"ü"}
 END
     run --keep-empty-lines --separate-stderr tool list --field bind_sid
     [ "$output" = $'a b\n\n' ]
-    # It wins over a form.
+    # It overrides the form.
     gives "1
 -1" list --field count -o json
 }
@@ -138,7 +138,7 @@ END
     for arguments in "list --no-header" "list -o jsonl"; do
         tool $arguments 2>"$DIR/errors" | "$visible" compare
     done
-    # What goes to programs keeps a byte that is no UTF-8.
+    # Output for programs keeps a byte that is not UTF-8.
     sql "UPDATE token SET function = function || CAST(x'9b' AS TEXT)"
     printf '\x9b\n' >>"$DIR/all"
     tool list --field function | cmp - "$DIR/all"
@@ -239,7 +239,7 @@ END
         row "$(printf 'at%06d' $n)" "webapi_allow = '$stored'"
     done
     gives 0 list --count --opens A:m
-    # For the API alone, it does not matter what stands there: as for a grant.
+    # For the API alone, its methods do not matter: as for a grant.
     lists "at000006 at000007 at000008 at000009 at000010" --opens A --sort tid
     allowed=
     for tid in at0000{01..10}; do
@@ -326,7 +326,7 @@ END
     [[ $status = 0 && $output == "b-------  root  VPN "* && ${#lines[@]} -eq 1 && $stderr == *": $note" ]]
     says "$(tool list -o jsonl | head -n 2)" "2 of 3 tokens are shown" list --limit 2 -o jsonl
     says b------- "1 of 2 tokens are shown" list --limit 1 --function VPN --field tid
-    # Where nothing is left out, nothing is said.
+    # If nothing is left out, there is no note.
     lists "b------- a------- c-------" --limit 3
     lists "b------- a------- c-------" --limit 9223372036854775807
 }

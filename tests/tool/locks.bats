@@ -6,7 +6,7 @@ load common
 
 EXCLUSIVE="BEGIN EXCLUSIVE;"
 WRITING="BEGIN IMMEDIATE;"
-# What a reader has open stands in the way when a change is committed, not when it begins.
+# An open read transaction blocks a change when it is committed, not when it begins.
 READING="BEGIN; SELECT count(*) FROM token;"
 
 # lock STATEMENTS: another process executes them and keeps the lock that they take, until it reads on stream 7
@@ -31,8 +31,8 @@ unlock() {
 }
 
 # run_waiting STATEMENTS TIMES ARGUMENTS...: runs the tool while another process holds the lock that the statements
-# take, and lets that go when the tool has waited that often; ahead of that, it gets $SIGNAL, if that is set. Fails
-# when it has not waited.
+# take, and releases the lock when the tool has waited that often; before that, the tool gets $SIGNAL, if that is set.
+# Fails if the tool has not waited.
 run_waiting() {
     local times=$2 watcher
     lock "$1"
@@ -182,7 +182,7 @@ TABLE
     run_waiting "$WRITING UPDATE token SET count = 7;" 1 grant "$ID" Api get
     expect 0 granted
     [ "$(stored)" = 6/ ]
-    lock "$READING" # with the write-ahead journal, readers are in nobody's way
+    lock "$READING" # with the write-ahead journal, readers block no other program
     run_tool grant "$ID" Api get
     unlock
     expect 0 granted
@@ -192,7 +192,7 @@ TABLE
     locked="$REAL_DB stayed locked by another process for 5 seconds"
     a_store
     cp "$DB" "$DIR/before"
-    # Where somebody reads all the time, it is the commit that fails.
+    # While another program reads all the time, the commit fails.
     for kind in EXCLUSIVE READING; do
         pattern=.
         [ $kind = EXCLUSIVE ] || pattern="^(create|grant)"
@@ -275,7 +275,7 @@ calling() {
 CREATE TEMP TABLE read AS SELECT * FROM token;"
 }
 
-# until_sql NUMBER STATEMENT: waits until it gives that
+# until_sql NUMBER STATEMENT: waits until the statement gives the number
 until_sql() {
     until [ "$(sqlite3 -cmd ".timeout 5000" "$DB" "$2")" = "$1" ]; do :; done
 }
@@ -404,7 +404,7 @@ print(written)' "$DB"
 23|Too many open files in system
 24|Too many open files
 TABLE
-    # What it is not allowed to see is no reason to fail.
+    # A process that it may not see is not a reason to fail.
     VEMO_TEST_CALLS="opendir /proc/|13" gives "1 token revoked" revoke "$id"
 }
 
@@ -434,7 +434,7 @@ TABLE
     id=$(a_token)
     run --separate-stderr "${namespace[@]}" sh -c 'mount -t tmpfs none /proc && exec "$@"' - "$TOOL" revoke "$id"
     expect 0 "1 token revoked" "vemo-access-token: /proc does not tell who has the database open: what was read before can still be written back"
-    # Then it is not known who holds the lock, either.
+    # Then it does not know the holder of the lock, either.
     exec 6>"$VEMO_REDIRECT_DIR.lock"
     flock 6
     VEMO_TEST_HASTE=1 run --separate-stderr "${namespace[@]}" sh -c 'mount -t tmpfs none /proc && exec "$@"' - "$TOOL" purge

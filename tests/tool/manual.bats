@@ -1,5 +1,5 @@
 #!/usr/bin/env bats
-# The manual page beside the tool: it leaves nothing out, invents nothing, and its examples work.
+# The manual page compared with the tool: it describes everything, invents nothing, and its examples work.
 
 load common
 
@@ -105,14 +105,14 @@ TABLE
     section DIAGNOSTICS | sed -n 's/^\.It "\(.*\)"$/\1/p' | sed 's/\.\.\., /...\n/; s/, \.\.\. /\n... /' | diff "$DIR/sentences" -
 }
 
-# Prints each literal block of the examples as a file of its own, in order.
+# Writes each literal block of the examples into its own file, in order.
 example_blocks() {
     section EXAMPLES | sed 's/\\-/-/g; s/\\e/\\/g' |
         awk -v dir="$1" '/^\.Ed/ { file = "" } file { print >file } /^\.Bd -literal/ { file = dir "/" 100 + n++ }'
 }
 
-# Runs a command of the page, with paths and users of the test's own, and compares what it prints with
-# what the page shows of that.
+# Runs a command of the page, with the test's paths and users, and compares its output with the part that
+# the page shows.
 run_example() {
     local command shown=$2 expected=0
     command=$(sed "s|/usr/vemo/etc/private/session|$VEMO_REDIRECT_DIR|g; s|/root/|$DIR/|g
@@ -172,7 +172,7 @@ ssh() {
         esac
     done
 
-    # One, for the backup, moved to the other machine.
+    # One of them, for the backup, has moved to the other machine.
     [ "$(VEMO_REDIRECT_DIR=$DIR/new tool list --no-header --field function)" = nightly-backup ]
     [ "$(tool list --count)" -eq 0 ]
     [ "$(stat -c %a "$DIR/backup-token" "$DIR/tokens.jsonl" | sort -u)" = 600 ]
@@ -190,7 +190,7 @@ ssh() {
     [ "$(tail -n 1 "$DIR/commands" | grep -c 'revoke --all --yes')" -eq 1 ]
     before=$(state)
 
-    # What the new machine is asked, and what becomes of it.
+    # The commands on the new machine, and their results.
     while read -r fault; do
         echo "$fault"
         rm -rf "$DIR/new"

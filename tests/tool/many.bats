@@ -1,5 +1,5 @@
 #!/usr/bin/env bats
-# Many tokens: what the commands take of memory, and how long they hold other programs up
+# Many tokens: how much memory the commands take, and how long they delay other programs
 
 load common
 

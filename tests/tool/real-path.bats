@@ -34,7 +34,7 @@ $REAL_DB 0:0 700 regular file" "vemo-access-token: $NO_DIRECTORY
 vemo-access-token: refused: unknown token"
 }
 
-# What root does to another user's files; $secret is one of another user's, and repair says what becomes of it.
+# What root does to another user's files; $secret is such a file, and repair prints what happened to it.
 OTHERS='tool=$1 database=$2 directory=${2%/*} secret=/usr/vemo/secret
     repair() { "$tool" doctor --repair >/dev/null; echo "$? $(stat -c "%u %a" "$secret")"; }
     "$tool" init >/dev/null && echo secret >"$secret" && chown 1:1 "$secret" && chmod 0604 "$secret"

@@ -1,5 +1,5 @@
 #!/usr/bin/env bats
-# revoke, but for what it asks on a terminal
+# revoke, except for its questions on a terminal
 
 load common
 
@@ -34,7 +34,7 @@ END
         row "$tid" "tid = '$tid'"
     done
     gives "1 token revoked" revoke Abcdefgh2 Abcdefgh2
-    gives "1 token revoked" revoke Xbcdefgh # which is an id as well as a prefix
+    gives "1 token revoked" revoke Xbcdefgh # it is both an id and a prefix
     gives "1 token revoked" revoke -- -begins-
     says "0 tokens revoked" "1 id is unknown" revoke Abcdefgh11
     expect_left Abcdefgh1 Xbcdefghi
@@ -49,7 +49,7 @@ END
     says "0 tokens revoked" "no token matches" revoke - < <(tool list --show-ids --field tid --expired 2>/dev/null)
     says "0 tokens would be revoked" "no token matches" revoke --dry-run - </dev/null
     says "1 token revoked" "2 ids are unknown" revoke - - < <(printf 'ffffffff\nunknown1\nunknown2\n')
-    # Somebody has the database open, but of nothing that was revoked nothing can come back.
+    # Another program has the database open, but no token was revoked, so none can come back.
     says "0 tokens revoked" "1 id is unknown" revoke unknown1 8<"$DB"
     gives "0 tokens revoked" revoke --function none --yes 8<"$DB"
     expect_left eeeeeeee

@@ -44,8 +44,8 @@ kept() {
 TABLE
 }
 
-# interrupted SQL ARGUMENTS...: rotate, whose result has no room in its pipe; once the change is made, the SQL is
-# done behind its back, and it gets a signal
+# interrupted SQL ARGUMENTS...: rotate, whose result has no room in its pipe; once the change is made, another
+# program runs the SQL, and rotate gets a signal
 interrupted() {
     local pid change=$1
     shift

@@ -29,7 +29,7 @@ END
 @test "show marks expired and unlimited tokens, and owners that have no name" {
     row token--- "uid = 4294967294, deadline = strftime('%s') - 9000, count = -3, webapi_allow = '[1', extra = 'x'"
     deadline=$(date -d "@$(sql "SELECT deadline FROM token")" '+%Y-%m-%d %H:%M:%S')
-    # The empty session leaves its column's width behind.
+    # The empty session still takes the width of its column.
     [ "$(tool show token--- --no-header | sed 's/ *$//')" = "\
 tid           token---$ZEROS
 bind_sid
@@ -69,7 +69,7 @@ END
     export LC_ALL=C.UTF-8
     text=$'a\'b"c\\d\\x41\ne\tf\e[31m\xc2\x9bÄ漢\xff;--'
     shown='a'\''b"c\d\x5cx41\x0ae\x09f\x1b[31m\xc2\x9bÄ漢\xff;--'
-    # What is not UTF-8 stays as it is stored; whoever reads it decides.
+    # Bytes that are not UTF-8 stay as they are stored; the reader decides.
     json=$'a\'b\\"c\\\\d\\\\x41\\ne\\tf\\u001b[31m\\u009bÄ漢\xff;--'
     tool init
     tid=$(tool create --uid 0 --function "$text" --bind-sid "$text" --allow "$text:$text")
@@ -83,7 +83,7 @@ END
     json=${json//\\\\x41/\\\\x5cx41}
     json=${json//$'\xff'/'\xff'}
     [ "${lines[7]}" = "webapi_allow  {\"$json\":{\"method\":[\"$json\"]}}" ]
-    # In a locale of ASCII alone, all else is escaped.
+    # In a locale of ASCII only, all other characters are escaped.
     [[ "$(LC_ALL=C tool show "$tid" --no-header)" == *'\xc2\x9b\xc3\x84\xe6\xbc\xa2\xff'* ]]
 }
 

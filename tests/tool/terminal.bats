@@ -1,5 +1,5 @@
 #!/usr/bin/env bats
-# What is different on a terminal: hidden prompts, questions, colours, the width of tables, progress bars
+# The differences on a terminal: hidden prompts, questions, colours, the width of tables, progress bars
 
 load common
 
@@ -69,7 +69,7 @@ modes: as before" ]
     [ "$status" -eq 130 ]
     [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
     expect_left token---
-    # The same behind a bar, which goes on while the tool waits for the lock.
+    # The same after a bar, which goes on while the tool waits for the lock.
     exec 9>>"$VEMO_REDIRECT_DIR.lock"
     flock 9
     on_terminal --answer "Tuning [" "" --answer "Tuning [" "" --answer "Tuning [" $'\x03' -- tune 9>&-
@@ -305,7 +305,7 @@ shows_bar() {
     shows_bar Tuning "" --shell '"$0" tune >"$1"' -- "$DIR/result"
     [[ $(head -n 1 "$DIR/result") =~ ^WHAT\ +BEFORE\ +AFTER$ ]]
 
-    # A bar that does not get full is ended before the reason is told.
+    # A bar that does not get full ends before the reason is printed.
     sql "DELETE FROM token WHERE rowid = 1"
     on_terminal -- import "$DIR/lines"
     [[ ${lines[0]} == $'\r'"Importing ["* ]]
@@ -341,7 +341,7 @@ vemo-access-token: 2 tokens exported"
     tool export "$DIR/file"
     sql "DELETE FROM token"
     for arguments in "import $DIR/file" tune; do
-        # It is stopped as soon as the bar shows, and let go when another program has worked.
+        # It is stopped as soon as the bar shows, and continued when another program has worked.
         /usr/bin/python3 - "$TOOL" $arguments >"$DIR/id" <<'END'
 import os, pty, subprocess, sys, termios
 own, other = pty.openpty()

@@ -1,5 +1,5 @@
 #!/usr/bin/python3 -I
-"""Runs the tool on a terminal of its own and prints what the terminal shows.
+"""Runs the tool on its own terminal and prints what the terminal shows.
 
 terminal.py [--columns N] [--modes FILE] [--answer TEXT REPLY]... [--shell SCRIPT] -- ARGUMENTS...
 
@@ -24,7 +24,7 @@ TIMEOUT = 20  # seconds
 
 
 def wait_until_it_sleeps(pid):
-    """What shows a text and then reads takes a Ctrl-C that comes in between for none until the next key."""
+    """A program that shows a text and then reads does not see a Ctrl-C in between until the next key."""
     deadline = time.monotonic() + TIMEOUT
     while time.monotonic() < deadline:
         with open(f"/proc/{pid}/stat", encoding="ascii", errors="replace") as status:

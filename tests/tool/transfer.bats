@@ -14,7 +14,7 @@ a_tid() {
     printf '%s%0*d' "$1" $((ID_LENGTH - ${#1})) 0
 }
 
-# written NAME...: what export writes of these tokens, but for the end
+# written NAME...: what export writes of these tokens, without the end
 written() {
     local name
     for name; do
@@ -164,7 +164,7 @@ vemo-access-token: /run/vemo-access-token.lock belongs to the database; choose a
     written A | whole >"$DIR/secret"
     linked="has other names besides, and others can change its directory; copy it to a place of yours"
     theirs=$DIR/theirs/file secret=$DIR/secret
-    # They can also remove or replace it before or after it is opened.
+    # They can also remove or replace the file before or after it is opened.
     while IFS='|' read -r make calls sentence; do
         rm -f "$theirs"
         $make "$secret" "$theirs"
@@ -288,7 +288,7 @@ extra = '$(printf '{"a":%.0s' {1..1000})1$(printf '}%.0s' {1..1000})'~"extra" is
 TABLE
 }
 
-# Some versions of jsoncpp read such a number as an infinite one, which is then what programs get of the token.
+# Some versions of jsoncpp read such a number as infinite; programs then get this value from the token.
 @test "a number that is too large comes back as the library reads it, or is reported" {
     row A0000000 "extra = '{\"a\":1e400,\"b\":[-1e400]}'"
     run_tool show A0000000 --field extra
@@ -447,7 +447,7 @@ TABLE
     gives "0 tokens imported; 2 tokens there already" import --skip-existing "$DIR/file"
     expect_left A B
     [ "$(sql "SELECT count FROM token ORDER BY tid" | xargs)" = "7 1" ]
-    # An id that stands twice in the file is an error.
+    # An id that is twice in the file is an error.
     written C C | whole >"$DIR/file"
     refuses_file "line 2 has the id of line 1" --skip-existing
 }

@@ -54,7 +54,7 @@ END
     [ "$(sql "SELECT deadline - 777600 BETWEEN $before AND $(date +%s) FROM token")" = 1 ]
 }
 
-# What is malformed stays as it is, and cannot be changed in part.
+# A malformed value stays as it is, and cannot be changed in part.
 @test "what a token opens can be replaced, extended and reduced" {
     malformed="what the token opens is malformed and cannot be changed in part; replace it with --allow"
     row token---

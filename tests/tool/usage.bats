@@ -1,5 +1,5 @@
 #!/usr/bin/env bats
-# What all commands share: help, arguments, who may call, and what goes to which stream
+# What all commands share: help, arguments, the allowed users, and the streams
 
 load common
 
@@ -33,8 +33,8 @@ cannot_print() {
     expect 4 "" "vemo-access-token: cannot write the result: $1"
 }
 
-# into_closed_pipe ARGUMENTS...: standard output is a pipe that nobody reads any more. A shell may have
-# been told to ignore SIGPIPE; the tool is started as if it had not.
+# into_closed_pipe ARGUMENTS...: standard output is a pipe without a reader. The shell may ignore SIGPIPE; the
+# tool is started as if it did not.
 into_closed_pipe() {
     mkfifo "$DIR/pipe"
     exec 8<>"$DIR/pipe" 9>"$DIR/pipe" 8<&-
@@ -140,7 +140,7 @@ Examples:
     done
 }
 
-# Brackets, quotes, equals signs and the like mean nothing here: neither lists nor escapes.
+# Brackets, quotes, equals signs and the like have no meaning here: there are neither lists nor escapes.
 @test "arguments reach the commands byte for byte" {
     tool init
     for text in '[a,b]' '[]' '"x"' "'x'" '{a}' 'a=b' '=' '-' '--' '--all' '-v' '%%' '\\n' ' ' $'a\nb' $'\x9b' '!#:+'; do
@@ -242,7 +242,7 @@ TABLE
     run cannot_print "" - create --verbose --uid 0 --function VPN
     [[ $output == *"got:      status 4"* ]]
     [ "$(sql "SELECT tid FROM token")" = "$id" ]
-    # A result that is larger than any buffer.
+    # A result that is larger than all buffers.
     many_rows 300
     for arguments in "list --show-ids" "list -o json --show-ids" "list --field tid --show-ids"; do
         cannot_print "No space left on device" /dev/full $arguments
@@ -332,8 +332,8 @@ update token--- --remove-allow Api:$1
 TABLE
 }
 
-# Superfluous arguments are named, but this one may be an id that got there by mistake. One of somebody's own can
-# hold slashes, as Base64 does.
+# Superfluous arguments are named, but this one may be an id that got there by mistake. An id that a caller chose can
+# contain slashes, as Base64 does.
 @test "no id appears on standard error when it was given in a wrong place" {
     row token---
     for id in "$(printf 'Own+id-%08d/' {1..8})==" "$(a_token)"; do

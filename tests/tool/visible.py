@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Which characters can be seen, by Python's tables of Unicode, which are others than the C library's.
+"""Which characters can be seen, by Python's tables of Unicode, which are not those of the C library.
 
 visible.py all           prints every character, but NUL
 visible.py check         fails unless standard input holds nothing but characters that can be seen and line feeds
@@ -9,7 +9,7 @@ visible.py compare       the same; fails, too, unless it holds all of those
 import sys
 import unicodedata
 
-# What Unicode says is to be ignored, and Python prints: joiners, fillers, inherent vowels, variation selectors;
+# Characters that Unicode says to ignore, and Python prints: joiners, fillers, inherent vowels, variation selectors;
 # and the Braille pattern without dots.
 IGNORED = {0x034F, 0x115F, 0x1160, 0x17B4, 0x17B5, 0x180B, 0x180C, 0x180D, 0x180F, 0x2800, 0x3164, 0xFFA0,
            *range(0xFE00, 0xFE10), *range(0xE0100, 0xE01F0)}
