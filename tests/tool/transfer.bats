@@ -360,8 +360,10 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
         run_tool import "$DIR/file"
         expect 2 "" "vemo-access-token: $DIR/file: $flaw; nothing of this file was imported; --partial imports what is there"
         cmp "$DB" "$DIR/before"
-        says "$tokens imported" "standard input: $flaw; the whole lines were imported" import --partial - <"$DIR/file"
-        cp "$DIR/before" "$DB"
+        for steps in "" --in-steps; do
+            says "$tokens imported" "standard input: $flaw; the whole lines were imported" import --partial $steps - <"$DIR/file"
+            cp "$DIR/before" "$DB"
+        done
     done <<'TABLE'
 head -c 0;0 tokens;the export has no end
 VEMO_REDIRECT_DIR=$DIR/nowhere tool export 2>/dev/null;0 tokens;the export has no end

@@ -81,7 +81,7 @@ TEST_F(RunSql, ReturnsTheNumberOfTheLastChange)
         EXPECT_EQ(nChanges, run(szSql));
         EXPECT_EQ("", m_db.m_strErr);
         m_db.m_strErr = "stale";
-        EXPECT_LE(0, m_db.runSqlEx("SELECT 1", nullptr, nullptr));
+        EXPECT_EQ(nChanges, m_db.runSqlEx("SELECT 1", nullptr, nullptr));
         EXPECT_EQ("stale", m_db.m_strErr);
     };
     returns("UPDATE token SET uid = 1", 2);
