@@ -5,8 +5,6 @@
 #ifndef TESTS_HEAP_H
 #define TESTS_HEAP_H
 
-#include <malloc.h>
-
 #include <cerrno>
 #include <cstddef>
 
@@ -21,7 +19,7 @@ extern "C" void __libc_free(void* pBlock);
 namespace {
 
 Injection g_allocations;
-int64_t g_cbLive = 0;
+int64_t g_nLive = 0; // blocks, not bytes: how far a size is rounded up depends on the other blocks
 
 bool isFailing()
 {
@@ -30,14 +28,9 @@ bool isFailing()
     return blFails;
 }
 
-int64_t sizeOf(void* pBlock)
-{
-    return static_cast<int64_t>(malloc_usable_size(pBlock));
-}
-
 void* counted(void* pBlock)
 {
-    g_cbLive += sizeOf(pBlock);
+    g_nLive += pBlock ? 1 : 0;
     return pBlock;
 }
 
@@ -60,17 +53,16 @@ void* realloc(void* pBlock, size_t cb)
     if (isFailing()) {
         return nullptr;
     }
-    const int64_t cbBefore = sizeOf(pBlock);
     void* pMoved = __libc_realloc(pBlock, cb);
-    if (pMoved || 0 == cb) {
-        g_cbLive -= cbBefore;
+    if (pBlock && (pMoved || 0 == cb)) {
+        --g_nLive;
     }
     return counted(pMoved);
 }
 
 void free(void* pBlock)
 {
-    g_cbLive -= sizeOf(pBlock);
+    g_nLive -= pBlock ? 1 : 0;
     __libc_free(pBlock);
 }
 

@@ -21,19 +21,19 @@ class MemoryFault : public ::testing::TestWithParam<size_t> {};
 void failEachAllocation(const Operation& operation, bool blOwnThread = false)
 {
     const TokenStore store;
-    getpwuid(NOBODY_KNOWN);     // loads the user databases, which stay in memory
-    int64_t cbHeld = INT64_MAX; // after an undisturbed run
+    getpwuid(NOBODY_KNOWN);    // loads the user databases, which stay in memory
+    int64_t nHeld = INT64_MAX; // after an undisturbed run
     g_allocations.run = [&](const std::function<void()>& judge) {
         if (blOwnThread) {
             std::thread(judge).join();
         } else {
             judge();
         }
-        const int64_t cbLive = g_cbLive;
-        cbHeld = INT64_MAX == cbHeld ? cbLive : cbHeld;
-        EXPECT_GE(cbHeld, cbLive); // less if the library has released something that it held
+        const int64_t nLive = g_nLive;
+        nHeld = INT64_MAX == nHeld ? nLive : nHeld;
+        EXPECT_GE(nHeld, nLive); // less if the library has released something that it held
         if (0 == g_allocations.nFirst) {
-            EXPECT_EQ(cbHeld, cbLive);
+            EXPECT_EQ(nHeld, nLive);
         }
     };
     const int64_t nAllocations = failEach(store, operation, g_allocations);
