@@ -9,7 +9,7 @@ if(CMAKE_CXX_FLAGS MATCHES "-fsanitize=|--coverage|-fprofile-(arcs|generate|inst
 endif()
 set(optimised $<CONFIG:Release,RelWithDebInfo,MinSizeRel>)
 
-# Anew, since compilers and flags of distributions define it too. The C library lowers what it does not know.
+# Set again, since compilers and flags of distributions set it too. The C library lowers a level that it does not know.
 add_compile_options("$<${optimised}:SHELL:-U_FORTIFY_SOURCE -D_FORTIFY_SOURCE=3>"
                     $<${optimised}:-fstack-protector-strong>)
 # Not for all processors; the protection of control flow has one name on x86 and another on ARM.
