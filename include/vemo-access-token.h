@@ -4,9 +4,9 @@
 // function says otherwise), does its work and closes the database again; nothing is kept between calls.
 // The process must be able to set its effective uid to 0 and should have it (vemo-access-token(7) says why).
 //
-// Results: 0 or more is success; -1 is a failure or a refusal. Failures of these calls have written their
-// log lines (see AccessTokenUtil.h). An unknown token and a method that is not listed are logged in debug
-// mode only, except that VemoAccessTokenGrant always logs that a grant was refused.
+// Results: 0 or more is success; -1 is a failure or a refusal. A failure has written its log lines (see
+// AccessTokenUtil.h), unless it is VemoAccessTokenGenerate's. An unknown token and a method that is not
+// listed are logged in debug mode only, but VemoAccessTokenGrant always logs that a grant was refused.
 // Arguments that are not described as results are only read. Strings and JSON values are C++ objects, so
 // the caller must be built with the same libstdc++ and jsoncpp.
 //
