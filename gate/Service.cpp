@@ -117,7 +117,7 @@ void Service::take(std::string_view strMessage)
 {
     std::optional<Request> request = decodeRequest(strMessage);
     if (!request) {
-        log(LOG_ERR, "the process that reads HTTP sent what is no message");
+        log(LOG_ERR, "the process that reads HTTP sent a malformed message");
         _exit(EXIT_FAILURE); // an attacker has taken that process over
     }
     switch (request->ask) {

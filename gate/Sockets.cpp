@@ -58,7 +58,7 @@ Sockets handedOver()
         int nListens = 0;
         socklen_t cbListens = sizeof(nListens);
         if (0 != getsockopt(nSocket, SOL_SOCKET, SO_ACCEPTCONN, &nListens, &cbListens) || !nListens) {
-            throw std::runtime_error("what was handed over is no listening socket");
+            throw std::runtime_error("a descriptor that was handed over is not a listening socket");
         }
         fcntl(nSocket, F_SETFD, FD_CLOEXEC);
         fcntl(nSocket, F_SETFL, O_NONBLOCK);

@@ -31,12 +31,12 @@ const char* const HELP = R"(usage: vemo-access-token-gate [--socket PATH] [--sta
                               [--user NAME] [--once-header NAME]
 Grants access tokens over HTTP on a Unix socket, to the group vemo-access-token.
   --socket PATH         listen there for calls, unless the service manager
-                        hands sockets over
+                        passes sockets
   --status-socket PATH  listen there for /health and /metrics
-  --user NAME           who the process that reads HTTP becomes
-                        (vemo-access-token-gate)
-  --once-header NAME    the header that tells a call from its repetition
-  --help, --version     show this, or the version, and end
+  --user NAME           the user as whom the process that reads HTTP runs
+                        (default: vemo-access-token-gate)
+  --once-header NAME    the header by whose value a repeated call is recognised
+  --help, --version     print this, or the version, and exit
 The manual page vemo-access-token-gate(8) tells the rest.
 )";
 
