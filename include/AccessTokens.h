@@ -75,8 +75,8 @@ public:
     // After a grant *pToken is the record with the uses that are left (after the last use it still shows the
     // count before it). After any other answer it is unchanged. pToken may be null.
     //
-    // Failed is logged, and the call must not be allowed. No use is spent, unless the database could first
-    // not be written and then not be read either.
+    // Failed is logged, and the call must not be allowed. No use is spent, unless the database failed while
+    // the use was written, and then could not be read either.
     Answer grant(const std::string& strTid, const std::string& strApi, const std::string& strMethod = "",
                  Json::Value* pToken = nullptr) const;
 
