@@ -18,8 +18,8 @@ struct Child {
     std::string strOnceHeader; // "": there is none
 };
 
-// Starts the child with the sockets, which this closes here, and with standard error; nothing else stays open
-// in the child. Returns the other end of its link. Throws std::system_error.
+// Starts the child with the sockets, which it closes in this process, and with standard error. Nothing else
+// stays open in the child. Returns the other end of its link. Throws std::system_error.
 int start(const Child& child, const Sockets& sockets);
 
 } // namespace gate

@@ -1,5 +1,5 @@
 // The messages between the two processes of the gate. One reads HTTP and cannot read the database. The other
-// runs as root, holds the tokens, and reads nothing but these messages, of which it trusts no byte.
+// runs as root, holds the tokens, and reads nothing but these messages. It trusts no byte of them.
 //
 // Each message is one packet of a SOCK_SEQPACKET pair: a head of fixed size, and then, without gaps, the
 // texts, whose sizes are in the head. Numbers have the byte order of this machine.

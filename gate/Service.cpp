@@ -162,7 +162,7 @@ void Service::cancel(uint64_t nNumber)
     ++m_figures[CANCELLED];
 }
 
-// Looks at the store once for all who have asked. They wait while other programs are in the way.
+// Looks at the store once for all who have asked. They wait while other programs hold the database.
 void Service::look()
 {
     if (m_looks.empty()) {
@@ -218,14 +218,14 @@ void Service::expire()
     }
 }
 
-// Notes that other programs are in the way, and when to try again.
+// Notes that other programs hold the lock or the database, and when to try again.
 void Service::wait(int64_t nNow)
 {
     m_nWaitingSince = m_nWaitingSince ? m_nWaitingSince : nNow;
     m_nTryAt = nNow + TRY_AGAIN_AFTER;
 }
 
-// Ends the wait: other programs are no longer in the way, or no call is left that waits.
+// Ends the wait: other programs hold neither any more, or no call is left that waits.
 void Service::endWait()
 {
     m_figures[WAIT_NS] += m_nWaitingSince ? static_cast<uint64_t>(now() - m_nWaitingSince) : 0;

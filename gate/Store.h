@@ -21,8 +21,8 @@ public:
     // The tokens, within a transaction.
     grant::Tokens& tokens() { return m_connection->tokens; }
 
-    // Deletes the expired tokens, within a transaction, unless the last purge was less than a second ago, or
-    // less than 50 times as long ago as it took. Returns how many were deleted.
+    // Deletes the expired tokens, within a transaction, unless the last purge ended less than a second ago,
+    // or less than 50 times its own duration ago. Returns how many were deleted.
     uint64_t purge();
 
     // Commits the transaction, which then outlasts a power cut. Returns false if other programs hold the

@@ -5,7 +5,7 @@
 //
 // When all programs that share tokens do so, with the same file, a token of N uses is granted exactly N
 // times, no call fails because of another, and no deletion is undone. The administrator's tool and the gate
-// take this lock too. doc/concurrency.md says what to observe with threads, fork() and log lines.
+// take this lock too. doc/concurrency.md has the rules for threads, fork() and log lines.
 
 #ifndef CALL_LOCK_H
 #define CALL_LOCK_H

@@ -26,7 +26,7 @@ void restoreStdout();
 
 bool isTerminal(FILE* pStream);
 
-// The columns of the terminal that a stream is; SIZE_MAX for a stream that is no terminal.
+// The columns of the terminal that a stream is; SIZE_MAX for a stream that is not a terminal.
 size_t terminalWidth(FILE* pStream);
 
 // Whether output to a stream may be coloured: it is a terminal, and NO_COLOR is unset or empty.

@@ -138,7 +138,7 @@ Descriptor openToRead(const std::string& strPath)
     }
     if (canOthersWrite(statusOf(place.directory))) {
         const struct stat named = statusAt(place.directory, place.strName);
-        if (0 == named.st_mode && ENOENT != errno) { // a name that is gone is one that others gave
+        if (0 == named.st_mode && ENOENT != errno) { // a name that is gone counts as one of several
             throw badPath(strPath, strPath);
         }
         if (!hasThisNameOnly(file, named)) {

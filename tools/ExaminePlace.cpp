@@ -134,8 +134,8 @@ void examinePrivacy(const std::string& strPath, const struct stat& status,
     }
 }
 
-// Reports a path that cannot be opened as a directory, for the reason in errno. Returns whether there may be
-// files all the same.
+// Reports a path that cannot be opened as a directory, for the reason in errno. Returns whether there may
+// still be files.
 bool examineObstacle(const std::string& strPath, bool blLast, Findings& findings)
 {
     const std::function<void()> none;

@@ -140,7 +140,7 @@ std::vector<size_t> columnsOf(const Layout& layout)
     return nColumns;
 }
 
-// The columns of the table. None that the user has chosen is spare.
+// The columns of the table. A column that the user has chosen is never spare.
 std::vector<tool::Table::Column> titlesOf(const Layout& layout)
 {
     std::vector<tool::Table::Column> titles;

@@ -1,4 +1,4 @@
-// Ids are credentials. These functions make what messages show of ids, and of texts that may be ids.
+// Ids are credentials. These functions shorten ids, and texts that may be ids, for messages.
 
 #ifndef TOOLS_MASKING_H
 #define TOOLS_MASKING_H

@@ -123,7 +123,7 @@ NewFile::NewFile(const std::string& strPath)
 
 NewFile::~NewFile()
 {
-    removeUnfinished(); // while it is locked, so that no other export takes it for left behind
+    removeUnfinished(); // while it is locked, so that no other export removes it as left behind
 }
 
 // Fails if no file may be put there.
@@ -188,7 +188,7 @@ bool NewFile::giveName()
         if (link(m_place.strName)) {
             return true;
         }
-        flock(fileno(m_pStream.get()), LOCK_EX); // so that no other export takes it for left behind
+        flock(fileno(m_pStream.get()), LOCK_EX); // so that no other export removes it as left behind
         removeRemains(m_place.directory, m_strUnfinished);
         if (!link(m_strUnfinished)) { // fails too if the first link() failed although the name was free
             return false;

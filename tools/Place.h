@@ -26,9 +26,9 @@ const char* const JOURNAL_SUFFIXES[] = {"-journal", "-wal", "-shm"};
 // The status of a path, as by lstat; nothing if there is no such file. Throws Failure.
 std::optional<struct stat> statusOf(const std::string& strPath);
 
-// The first or last bytes of the journal with this suffix; "" means the database itself. Zeros where the file
-// has none, or if it cannot be read or is not a regular file. Do not read the database's bytes while this
-// process has it open: closing the file drops SQLite's locks.
+// The first or last bytes of the journal with this suffix; "" means the database itself. Bytes that the file
+// does not have are zeros, and all are if it cannot be read or is not a regular file. Do not read the
+// database's bytes while this process has it open: closing the file drops SQLite's locks.
 std::string firstBytes(const std::string& strSuffix, size_t cbWanted);
 std::string lastBytes(const std::string& strSuffix, size_t cbWanted);
 

@@ -7,8 +7,8 @@
 
 namespace tool {
 
-// Handles these signals with handle(), each once: the second signal of a kind has its default effect. Changes
-// only signals whose handler is before; so ignored signals stay ignored.
+// Handles these signals with handle(), each once: the second signal of a kind has its default effect. Leaves
+// all signals alone whose handler is not the argument "before"; so ignored signals stay ignored.
 void handleEndingSignals(void (*handle)(int), void (*before)(int) = SIG_DFL);
 
 // While this object lives, these signals wait. Its destructor then ends the process by the last of them. A

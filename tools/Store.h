@@ -21,16 +21,16 @@ class Store : public Transaction {
 public:
     using Transaction::Transaction;
 
-    // Passes the values that SQL expressions have for each token that a condition in SQL selects to take().
+    // Calls take() with the values of SQL expressions, for each token that a condition in SQL selects.
     void select(const std::string& strExpressions, const std::string& strWhere,
                 const std::function<void(Row)>& take);
 
-    // Passes each token that a condition in SQL selects to take(), with the columns that strColumns adds to
-    // the query (", COLUMN, ...").
+    // Calls take() with each token that a condition in SQL selects, and with the columns that strColumns adds
+    // to the query (", COLUMN, ...").
     typedef std::function<void(Json::Value jToken, const Row& columns)> TakeToken;
     void eachToken(const std::string& strWhere, const std::string& strColumns, const TakeToken& take);
 
-    // Counts the tokens that a condition in SQL selects; or passes the id of each to take(), nothing for
+    // Counts the tokens that a condition in SQL selects; or calls take() with the id of each, nothing for
     // NULL.
     uint64_t count(const std::string& strWhere);
     void eachTid(const std::string& strWhere,

@@ -1,6 +1,6 @@
-// Tells visible characters from others, and escapes the others.
+// Finds invisible characters, and escapes them.
 //
-// Invisible characters could command a terminal, change the order of its text, or make two different texts
+// Invisible characters could control a terminal, change the order of its text, or make two different texts
 // look the same. These are control and format characters, all blanks but the plain one, and other characters
 // that show nothing. Letters of all scripts, and the marks on them, are visible.
 

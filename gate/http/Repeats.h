@@ -22,7 +22,8 @@ public:
         Reply answer; // once blAnswered
     };
 
-    // Returns what is remembered of the call with this key; null if nothing was, and remembers it as nCall.
+    // Returns what is remembered of the call with this key. If that is nothing, returns null, and remembers
+    // the call as nCall.
     const Remembered* find(const std::string& strKey, uint64_t nCall, int64_t nNow);
 
     // Remembers the answer of a call. If something failed, forgets the call: the next try is a new one.

@@ -102,8 +102,8 @@ public:
     int tokenGet(Json::Value& jTokenParam, Json::Value& jTokenArrayOut);
 
     // Looks for a record whose field szName equals strValue. Returns 1 and sets jTokenOut to the first
-    // one; 0 and sets jTokenOut to an empty object when there is none; or -1, also for an empty name or
-    // value, when jTokenOut is unchanged. A szName that is not a token field selects every token.
+    // one; 0 and sets jTokenOut to an empty object when there is none; or -1. An empty name or value is a
+    // failure that leaves jTokenOut unchanged. A szName that is not a token field selects every token.
     int tokenGetOne(const char* szName, std::string& strValue, Json::Value& jTokenOut);
 
     // Deletes the tokens that the filter's fields select; sort_by, limit and so on have no effect. A
@@ -117,7 +117,7 @@ public:
 
     sqlite3* m_pDb;       // the connection; null when closed
     std::string m_strSql; // the statement that runSql runs, or ran last
-    std::string m_strErr; // why a statement failed or had to wait; only runSql empties it, before its own
+    std::string m_strErr; // why a statement failed or had to wait; only runSql empties it, before it runs one
 };
 
 #endif
