@@ -125,7 +125,7 @@ int AccessTokenDbApi::initDb()
     if (SQLITE_OK != nOpen) {
         VEMO_ATOKEN_FAIL("open sqlite failed, path=%s, errno=%d", VEMO_ATOKEN_HERE, VEMO_ATOKEN_DB_PATH,
                          nOpen);
-        // Only this failure leaves the process at effective uid 0. Callers depend on it.
+        // Of these failures, only this one leaves the process at effective uid 0. Callers depend on it.
         uidKeeper.forget();
         return -1;
     }
