@@ -23,7 +23,7 @@ Descriptor lockRemains(const Descriptor& directory, const std::string& strName);
 // Removes such a file. Returns true if none is left; otherwise false, with errno set.
 bool removeRemains(const Descriptor& directory, const std::string& strName);
 
-// Only the file's owner can read it. Until it is complete it has no name, so it goes with the process. Where
+// Only the file's owner can read it. Until it is complete it has no name, so it ends with the process. Where
 // the file system needs a name, it has a temporary one, which is removed by signals that can be caught, or by
 // the next NewFile of the same name. A process has one NewFile at a time. All members throw Failure.
 class NewFile {
