@@ -84,7 +84,7 @@ Options read(int nArguments, char** rgArguments)
         }
     }
     if (optind < nArguments) {
-        fprintf(stderr, "vemo-access-token-gate: \"%s\" is one argument too many\n", rgArguments[optind]);
+        fprintf(stderr, "vemo-access-token-gate: unexpected argument \"%s\"\n", rgArguments[optind]);
         exit(2);
     }
     return options;
