@@ -76,7 +76,8 @@ void Store::eachTid(const std::string& strWhere,
 
 bool Store::hasRowIds()
 {
-    return 0 == number("SELECT wr FROM pragma_table_list('token')");
+    return 0 == number("SELECT wr OR type <> 'table' OR EXISTS (SELECT 1 FROM pragma_table_xinfo('token') "
+                       "WHERE name = 'rowid' COLLATE NOCASE) FROM pragma_table_list('token')");
 }
 
 bool Store::has(const std::string& strTid)

@@ -36,7 +36,8 @@ public:
     void eachTid(const std::string& strWhere,
                  const std::function<void(const std::optional<std::string>& strTid)>& take);
 
-    // Whether the rows have numbers. Not those of a table that another program made WITHOUT ROWID.
+    // Whether the rows have numbers. Not those of a table that another program made WITHOUT ROWID or with a
+    // column of that name, or of a view in its place.
     bool hasRowIds();
 
     // Whether there is a token with this id.

@@ -345,3 +345,20 @@ no JSON|null
 {"A":{"method":[1,{"m":"n"},"o"]},"B":null}|A:1,{"m":"n"},o B:null
 END
 }
+
+@test "tokens whose rows have no numbers are listed and counted" {
+    row token-1-
+    row token-2- "function = 'Mail'"
+    cp "$DB" "$DIR/sound"
+    while read -r change; do
+        cp "$DIR/sound" "$DB"
+        sql "$change"
+        for arguments in "" "--sort function:desc" "--limit 2"; do
+            [ "$(tool list --field tid $arguments | sort)" = "token-1-"$'\n'"token-2-" ]
+        done
+        [[ $(tool stats -o jsonl) == *'"tokens":2,'* ]]
+    done <<'TABLE'
+ALTER TABLE token RENAME TO other; CREATE VIEW token AS SELECT * FROM other
+ALTER TABLE token ADD COLUMN RowId TEXT
+TABLE
+}
