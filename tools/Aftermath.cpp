@@ -4,6 +4,7 @@
 #include <chrono>
 #include <thread>
 
+#include "AccessTokenDefine.h"
 #include "Console.h"
 #include "Failure.h"
 #include "Processes.h"
@@ -19,6 +20,11 @@ const std::chrono::seconds CALL_MAX(6);
 const std::chrono::milliseconds LOOK_AGAIN_AFTER(10);
 const std::chrono::microseconds LOOK_FOR_CLOSED_AFTER(100);
 const int RESTORED_MAX = 20; // after that, some call has always read what another has just written back
+
+// No call has undone the change, but the database has.
+class UndoneByDatabase : public tool::Failure {
+    using Failure::Failure;
+};
 
 // Removes the closed descriptors. One that was closed and opened again between two looks counts as open.
 void forgetClosed(std::vector<std::string>& strOpen)
@@ -77,6 +83,11 @@ uint64_t restoreAndHold(const tool::Change& change, std::vector<std::string>& st
             waitForClosed(strOpen, CALL_MAX);
             return nUndone;
         }
+        if (0 != change.makeAgain(store)) { // although nobody else has written since
+            throw UndoneByDatabase(tool::EXIT_STATUS_STORE,
+                                   VEMO_ATOKEN_DB_PATH " itself undoes each change: a trigger does that",
+                                   "\"vemo-access-token doctor\" tells what helps");
+        }
         store.commit();
         nUndone += nAgain;
     }
@@ -106,6 +117,8 @@ void outlastCalls(const Change& change, const std::string& strUndone, const std:
     std::vector<std::string> strOpen;
     try {
         strOpen = outlast(change, nUndone);
+    } catch (const UndoneByDatabase&) {
+        throw;
     } catch (const Failure& failure) {
         throw Failure(failure.status(), failure.fact(),
                       "the change was made, but calls that were under way can have undone it");

@@ -25,7 +25,7 @@ struct Change {
 // function looks until no call can do so any more: each process has closed the database since the change, or
 // has had the time that the longest call takes. It makes the change again where it was undone. When calls
 // undo it again and again, it holds the lock and a transaction, so that nobody can write, for as long as the
-// longest call takes.
+// longest call takes. Fails if a trigger undoes the change.
 //
 // Says on standard error how often the change was undone ("a token came back 3 times ..."), and which
 // programs had the database open all the time. Throws Failure.

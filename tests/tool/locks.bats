@@ -391,6 +391,14 @@ print(written)' "$DB"
     [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }
 
+@test "a change that a trigger undoes again and again fails" {
+    row token---
+    sql "CREATE TRIGGER t AFTER DELETE ON token BEGIN INSERT INTO token VALUES (OLD.tid, OLD.bind_sid, OLD.uid,
+        OLD.deadline, OLD.count, OLD.create_time, OLD.function, OLD.webapi_allow, OLD.extra); END"
+    fails 4 "/usr/vemo/etc/private/session/vemo-access-token.db itself undoes each change: a trigger does that; \"vemo-access-token doctor\" tells what helps" revoke token---
+    expect_left token---
+}
+
 @test "a change fails where /proc cannot be read" {
     uses=1
     id=$(a_token)

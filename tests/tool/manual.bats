@@ -99,6 +99,7 @@ granted, but the user of the number ... could not be looked up: ...|VEMO_TEST_LO
 cannot write the result: ...|tool list >/dev/full
 ... the change may have been made|VEMO_TEST_SYNC=file tool revoke token---
 ... the change was made, but a power cut can undo it|VEMO_TEST_SYNC=directory tool revoke token---
+... itself undoes each change: a trigger does that|sql "CREATE TRIGGER t UPDATE ON token BEGIN SELECT RAISE(IGNORE); END"; tool update token--- --bind-sid x
 out of memory|head -c 60000000 /dev/zero | tr '\0' x >"$DIR/large"; (ulimit -v 100000; tool create --uid 0 --function VPN --extra "@$DIR/large")
 TABLE
     # One line of the page can hold two of them.
