@@ -303,13 +303,18 @@ std::optional<std::string> Transaction::queryWithin(std::chrono::milliseconds lo
     bool blEnded = false;
     bool blInterrupted = false;
     const SignalPause pause; // the thread inherits it, so that signals go to the main thread, which cleans up
-    std::thread watch([&] {
-        std::unique_lock guard(mutex);
-        blInterrupted = !ended.wait_for(guard, longest, [&blEnded] { return blEnded; });
-        if (blInterrupted) {
-            sqlite3_interrupt(m_db.m_pDb);
-        }
-    });
+    std::thread watch;
+    try {
+        watch = std::thread([&] {
+            std::unique_lock guard(mutex);
+            blInterrupted = !ended.wait_for(guard, longest, [&blEnded] { return blEnded; });
+            if (blInterrupted) {
+                sqlite3_interrupt(m_db.m_pDb);
+            }
+        });
+    } catch (const std::system_error&) { // then nothing could interrupt the statement
+        return std::nullopt;
+    }
     const std::string strErr = queryPartially(strSql, rows);
     {
         const std::lock_guard<std::mutex> guard(mutex);

@@ -62,7 +62,8 @@ protected:
     // Runs a statement that may fail after some rows. Adds the rows; returns the error, or "".
     std::string queryPartially(const std::string& strSql, Rows& rows);
 
-    // Like queryPartially(), but interrupts the statement after this time, and then returns nothing.
+    // Like queryPartially(), but interrupts the statement after this time, and then returns nothing. Returns
+    // nothing, too, if it gets no thread that can do so.
     std::optional<std::string> queryWithin(std::chrono::milliseconds longest, const std::string& strSql,
                                            Rows& rows);
 

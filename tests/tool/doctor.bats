@@ -419,6 +419,18 @@ TABLE
     expect_first "error: the database is damaged: no such collation sequence: x"
 }
 
+IN_PARTS="to hold no program up, the database is checked in parts, and pages that hold no token are not looked at; \"sqlite3 $REAL_DB 'PRAGMA integrity_check'\" looks at all"
+
+@test "a check of the database that no thread could end is done in parts" {
+    ! grep -q __asan_init "$TOOL" || skip "AddressSanitizer takes more memory"
+    [[ $(ldd "$TOOL" 2>&1) != *"not a dynamic executable"* ]] || skip "valgrind takes more memory"
+    row token---
+    ulimit -s 4000000 2>/dev/null || skip "the stack of a thread cannot be made larger than the memory"
+    ulimit -v 2000000
+    SENTENCE=$IN_PARTS
+    finds 0 "$ALL_RIGHT"
+}
+
 @test "a check of the database that takes long is done in parts" {
     many_rows 300
     sql "UPDATE token SET extra = json_object('long', hex(zeroblob(5000))) WHERE rowid = 150"
@@ -426,7 +438,7 @@ TABLE
     sql "CREATE TABLE slow (x CHECK (0 = instr(printf('%.*c', 60000, 'a'), printf('%.*c', 30000, 'a') || x)));
          PRAGMA ignore_check_constraints = ON; INSERT INTO slow SELECT 'b' FROM token;
          CREATE TABLE other (tid TEXT PRIMARY KEY); INSERT INTO other SELECT tid FROM token WHERE rowid <= 298"
-    SENTENCE="to hold no program up, the database is checked in parts, and pages that hold no token are not looked at; \"sqlite3 $REAL_DB 'PRAGMA integrity_check'\" looks at all"
+    SENTENCE=$IN_PARTS
     finds 0 "$ALL_RIGHT"
     cp "$DB" "$DIR/sound"
     sqlite3 -cmd '.dbconfig defensive off' "$DB" "
