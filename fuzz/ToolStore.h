@@ -5,6 +5,7 @@
 #define FUZZ_TOOL_STORE_H
 
 #include <dirent.h>
+#include <getopt.h>
 
 #include <cstdio>
 #include <cstring>
@@ -74,6 +75,7 @@ public:
         std::stringbuf input(strInput);
         std::streambuf* const pBefore = std::cin.rdbuf(&input);
         int nStatus = tool::EXIT_STATUS_DONE;
+        optind = 0; // 0, unlike 1, resets getopt_long() completely
         try {
             nStatus = commands.run(static_cast<int>(rgArguments.size()), rgArguments.data());
         } catch (const tool::Failure& failure) {

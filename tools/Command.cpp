@@ -221,7 +221,6 @@ void Command::readWords(int nArguments, char** rgArguments)
 {
     const std::string strShort = shortOptions();
     const std::vector<struct option> rgLong = longOptions();
-    optind = 0; // 0, unlike 1, resets getopt_long() completely
     int nNext = 1;
     for (; nNext < nArguments; nNext = optind) {
         requireLongName(longNameOf(rgArguments[nNext]));

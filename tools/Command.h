@@ -74,7 +74,7 @@ public:
 
     // Reads a command line that begins with the command's name, and keeps the texts byte for byte. Throws
     // Failure for what cannot be read, and if Take refuses a text before that. take() checks what is required
-    // and excluded.
+    // and excluded. Once in a process, unless getopt_long() is reset before.
     void read(int nArguments, char** rgArguments);
 
     // What was read, in the order of the command line.

@@ -29,7 +29,11 @@ help list show|unexpected argument "show"
 -x|unknown option "-x"
 --|unknown option "--"
 --hlep|unknown option "--hlep"; did you mean "--help"?
+list --=|unknown option "--"
 list --help=1|--help: takes no value
+list --uid|--uid: needs a value
+list -o|--output: needs a value
+list --uid 0 --uid 0|--uid: can be given once only
 list --funct TAG|unknown option "--funct"; did you mean "--function"?
 list --limit x --uid y --bogus|--limit: "x" is not a number from 1 to 9223372036854775807
 list --help --bogus|unknown option "--bogus"

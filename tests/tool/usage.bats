@@ -135,7 +135,7 @@ Examples:
 @test "arguments may come before, between and after options, also with POSIXLY_CORRECT" {
     id=$(a_token --allow Api:get)
     for arguments in "$id Api get -o json" "-o json $id Api get" "$id -ojson Api get" "$id Api --output=json get" \
-        "-vo json -- $id Api get"; do
+        "-vvo json -- $id Api get"; do
         POSIXLY_CORRECT=1 gives '{"allowed":true,"reason":""}' check $arguments
     done
 }
