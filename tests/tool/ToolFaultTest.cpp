@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cctype>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -36,12 +37,6 @@ struct Command {
     int64_t nStride = 1;  // more for one that does the same over and over
     bool blNoName = true; // the file system has files without a name
 };
-
-// For the messages of GoogleTest.
-void PrintTo(const Command& command, std::ostream* pStream)
-{
-    *pStream << command.szName;
-}
 
 const Command COMMANDS[] = {
     {"create", {"create", "--uid", "0", "--function", "VPN", "--allow", "Example.Api:get"}},
@@ -94,27 +89,20 @@ std::string contentsOf(const fs::path& path)
     return contents.str();
 }
 
-// The tool's output, without parts that differ between runs: new ids, times, and the name of a user, which it
-// omits if the look-up fails.
-std::string withoutChance(const std::string& strText)
+// The tool's output, without parts that differ between runs: a new id, which comes first, times, and the name
+// of a user, which it omits if the look-up fails.
+std::string withoutChance(std::string strText)
 {
-    std::string strOut;
-    std::string strWord;
-    for (const char c : strText + "\n") {
-        if (isalnum(static_cast<unsigned char>(c))) {
-            strWord += c;
-            continue;
-        }
-        if (strWord.size() >= VEMO_ATOKEN_LENGTH_MIN) {
-            strOut += "ID";
-        } else if (strWord != "root") {
-            std::copy_if(strWord.begin(), strWord.end(), std::back_inserter(strOut),
-                         [](unsigned char cOf) { return !isdigit(cOf); });
-        }
-        strOut += contains(" ()", {c}) ? "" : std::string(1, c);
-        strWord.clear();
+    const auto idEnd = std::find_if_not(strText.begin(), strText.end(), ::isalnum);
+    if (idEnd - strText.begin() >= VEMO_ATOKEN_LENGTH_MIN) {
+        strText.replace(strText.begin(), idEnd, "ID");
     }
-    return strOut;
+    for (size_t nAt = 0; std::string::npos != (nAt = strText.find("root", nAt));) {
+        strText.erase(nAt, strlen("root"));
+    }
+    const auto isChance = [](char c) { return contains("0123456789 ()", {c}); };
+    strText.erase(std::remove_if(strText.begin(), strText.end(), isChance), strText.end());
+    return strText;
 }
 
 // The lines of a run on standard error, without those of an undisturbed run.

@@ -21,6 +21,7 @@
 #include <cstddef>
 #include <cstdlib>
 #include <cstring>
+#include <map>
 #include <thread>
 
 #include "Heap.h"
@@ -34,35 +35,24 @@
 
 namespace {
 
-// Without close, which closes the descriptor whatever it returns, and without the calls for locks.
-const std::vector<int> CALLS_ON_FILES = {
-#ifdef __NR_open // older ones, which not every machine has
-    __NR_open,     __NR_stat,     __NR_lstat,      __NR_access,    __NR_mkdir,
-    __NR_unlink,   __NR_rename,   __NR_chmod,      __NR_chown,     __NR_link,
+// The system calls on files, and whether each takes room on the disk. Without close, which closes the
+// descriptor whatever it returns, and without the calls for locks.
+const std::map<int, bool> CALLS_ON_FILES = {
+#ifdef __NR_access // older ones, which not every machine has
+    {__NR_access, false},    {__NR_chmod, false},      {__NR_chown, false},      {__NR_link, true},
+    {__NR_mkdir, true},      {__NR_rename, true},      {__NR_unlink, false},
 #endif
-    __NR_openat,   __NR_read,     __NR_pread64,    __NR_write,     __NR_writev,
-    __NR_pwrite64, __NR_fsync,    __NR_fdatasync,  __NR_ftruncate, __NR_lseek,
-    __NR_fstat,    __NR_statx,    __NR_newfstatat, __NR_faccessat, __NR_mkdirat,
-    __NR_linkat,   __NR_unlinkat, __NR_renameat2,  __NR_renameat,  __NR_fchmod,
-    __NR_fchmodat, __NR_fchown,   __NR_fchownat,   __NR_getrandom, __NR_getdents64};
-
-const std::vector<int> CALLS_THAT_TAKE_ROOM = {
-#ifdef __NR_open
-    __NR_mkdir,     __NR_rename,  __NR_link,
-#endif
-    __NR_write,     __NR_writev,  __NR_pwrite64, __NR_ftruncate, __NR_fsync,
-    __NR_fdatasync, __NR_mkdirat, __NR_linkat,   __NR_renameat,  __NR_renameat2};
+    {__NR_faccessat, false}, {__NR_fchmod, false},     {__NR_fchmodat, false},   {__NR_fchown, false},
+    {__NR_fchownat, false},  {__NR_fdatasync, true},   {__NR_fstat, false},      {__NR_fsync, true},
+    {__NR_ftruncate, true},  {__NR_getdents64, false}, {__NR_getrandom, false},  {__NR_linkat, true},
+    {__NR_lseek, false},     {__NR_mkdirat, true},     {__NR_newfstatat, false}, {__NR_openat, false},
+    {__NR_pread64, false},   {__NR_pwrite64, true},    {__NR_read, false},       {__NR_renameat, true},
+    {__NR_renameat2, true},  {__NR_statx, false},      {__NR_unlinkat, false},   {__NR_write, true},
+    {__NR_writev, true}};
 
 bool takesRoom(const struct seccomp_data& call)
 {
-#ifdef __NR_open
-    if (__NR_open == call.nr) {
-        return 0 != (call.args[1] & O_CREAT);
-    }
-#endif
-    return __NR_openat == call.nr
-               ? 0 != (call.args[2] & O_CREAT)
-               : std::count(CALLS_THAT_TAKE_ROOM.begin(), CALLS_THAT_TAKE_ROOM.end(), call.nr);
+    return __NR_openat == call.nr ? 0 != (call.args[2] & O_CREAT) : CALLS_ON_FILES.at(call.nr);
 }
 
 // From now on, the calls on files of this thread, and of processes that it forks, wait for an answer. Returns
@@ -71,7 +61,7 @@ int handOverCalls()
 {
     std::vector<struct sock_filter> program = {
         BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(struct seccomp_data, nr))};
-    for (const int nCall : CALLS_ON_FILES) {
+    for (const auto& [nCall, blTakesRoom] : CALLS_ON_FILES) {
         program.push_back(BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<uint32_t>(nCall), 0, 1));
         program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_USER_NOTIF));
     }
