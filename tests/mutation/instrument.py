@@ -136,21 +136,20 @@ class Source:
     def slice(self, cursor):
         return self.text[cursor.extent.start.offset : cursor.extent.end.offset]
 
-    def add(self, cursor, *changes):
-        """Numbers the mutants of one place; returns the first number."""
+    def add(self, cursor, change):
+        """Adds a mutant, and returns its number."""
         text = one_line(self.slice(cursor))
         parts = [text] + [part for part in (self.context, self.branch) if part not in ("", text)]
         parts = [part if len(part) <= 80 else part[:77] + "..." for part in parts]
-        number = len(self.mutants)
-        self.mutants += [f"{self.name} {self.where}: {change}: " + " | ".join(parts) for change in changes]
-        return number
+        self.mutants.append(f"{self.name} {self.where}: {change}: " + " | ".join(parts))
+        return len(self.mutants) - 1
 
     def wrap(self, cursor, before, after):
         self.edits.append((*place(cursor), before, after))
 
-    def change(self, cursor, function, *changes):
-        """Passes an expression through that function of mutants.h."""
-        self.wrap(cursor, f"{function}({self.add(cursor, *changes)}, ", ")")
+    def change(self, cursor, change, value, kind=""):
+        """A mutant that has another value in the place of an expression, which becomes of that type."""
+        self.wrap(cursor, f"mutant({self.add(cursor, change)}, {kind}(", f"), {value})")
 
     # Statements
 
@@ -177,17 +176,13 @@ class Source:
                 self.branch = f"{word} ({one_line(self.slice(condition))})"
                 self.statement(branch, last)
             self.branch = outer
-        elif cursor.kind == Kind.FOR_STMT:
-            *head, body = cursor.get_children()
-            for part in head:
+        elif cursor.kind in (Kind.FOR_STMT, Kind.WHILE_STMT, Kind.DO_STMT):
+            for part in cursor.get_children():
                 before = self.text[cursor.extent.start.offset : part.extent.start.offset]
-                self.expression_of_statement(part, condition=before.count(";") == 1)
-            self.statement(body, False)
-        elif cursor.kind in (Kind.WHILE_STMT, Kind.DO_STMT):
-            children = list(cursor.get_children())
-            condition, body = children if cursor.kind == Kind.WHILE_STMT else reversed(children)
-            self.expression_of_statement(condition, condition=True)
-            self.statement(body, False)
+                if part.kind == Kind.COMPOUND_STMT:
+                    self.statement(part, False)
+                else:
+                    self.expression_of_statement(part, cursor.kind != Kind.FOR_STMT or before.count(";") == 1)
         elif cursor.kind == Kind.SWITCH_STMT:
             value, body = cursor.get_children()
             self.expression_of_statement(value)
@@ -217,7 +212,7 @@ class Source:
 
     def removable(self, cursor):
         number = self.add(cursor, "statement removed")
-        self.wrap(cursor, f"if (mutant_present({number})) ", "")
+        self.wrap(cursor, f"if (mutant({number}, true, false)) ", "")
 
     def expression_removable(self, cursor, last):
         """What ends a function with a result, or another one without a condition, does not return."""
@@ -229,7 +224,7 @@ class Source:
 
     def empty_result(self, change, cursor):
         number = self.add(cursor, change)
-        self.wrap(cursor, f"if (!mutant_present({number})) return {{}}; ", "")
+        self.wrap(cursor, f"if (mutant({number}, false, true)) return {{}}; ", "")
 
     def return_statement(self, cursor, last):
         value = [inside(child) for child in cursor.get_children()]
@@ -257,16 +252,15 @@ class Source:
         for variable in cursor.get_children():
             if variable.kind != Kind.VAR_DECL:
                 continue
-            if variable.type.get_canonical().kind == TypeKind.RECORD and self.is_guard(variable):
+            if variable.type.get_canonical().kind == TypeKind.RECORD and not self.is_used(variable):
                 self.guard(variable)
             for child in variable.get_children():
                 if self.text[child.extent.end.offset] not in "]>":  # the size of an array, a template's argument
                     self.expression_of_statement(child, context=self.slice(cursor))
 
-    def is_guard(self, variable):
-        uses = [1 for child in self.cursor.walk_preorder()
-                if child.kind == Kind.DECL_REF_EXPR and child.referenced == variable]
-        return not uses
+    def is_used(self, variable):
+        return any(child.kind == Kind.DECL_REF_EXPR and child.referenced == variable
+                   for child in self.cursor.walk_preorder())
 
     def guard(self, variable):
         number = self.add(variable, "statement removed")
@@ -303,7 +297,7 @@ class Source:
             if operator == "|" and CONSTANT.fullmatch(self.slice(child)):
                 if self.slice(child) == "O_RDONLY":
                     continue  # no flag at all
-                self.change(child, "mutant_flag", "flag removed")
+                self.change(child, "flag removed", 0)
                 continue
             if operator in ("&&", "||"):
                 self.operand(child, operator, i == 0, place(cursor) == self.unused)
@@ -328,8 +322,8 @@ class Source:
         if place(cursor) in self.done:
             return
         self.done.add(place(cursor))
-        number = self.add(cursor, "condition true", "condition false")
-        self.wrap(cursor, f"mutant_condition({number}, static_cast<bool>(", "))")
+        for forced in ("true", "false"):
+            self.change(cursor, "condition " + forced, forced, "bool")
 
     def operand(self, cursor, operator, is_first, is_of_unused):
         cursor = inside(cursor)
@@ -339,8 +333,7 @@ class Source:
             return
         self.done.add(place(cursor))
         forced = "true" if operator == "&&" else "false"
-        number = self.add(cursor, "operand " + forced)
-        self.wrap(cursor, f"mutant_{forced}({number}, static_cast<bool>(", "))")
+        self.change(cursor, "operand " + forced, forced, "bool")
 
     def check(self, cursor, children):
         callee, condition, *others = children
@@ -353,16 +346,16 @@ class Source:
             self.expression(child)
 
     def constant(self, cursor):
-        kind = cursor.kind
-        if kind == Kind.CXX_BOOL_LITERAL_EXPR:
-            self.change(cursor, "mutant_bool", "constant flipped")
+        text = self.slice(cursor)
+        if cursor.kind == Kind.CXX_BOOL_LITERAL_EXPR:
+            self.change(cursor, "constant flipped", "!" + text)
         elif self.is_enumerator(cursor):
-            self.change(cursor, "mutant_enumerator", "constant changed")
-        elif kind == Kind.INTEGER_LITERAL and self.is_number(cursor) or self.is_named_constant(cursor):
-            if self.text[cursor.extent.start.offset - 1] == "[" and self.slice(cursor) in ("0", "0U"):
-                self.change(cursor, "mutant_up", "constant +1")
-            else:
-                self.change(cursor, "mutant_constant", "constant +1", "constant -1")
+            value = cursor.referenced.enum_value
+            self.change(cursor, "constant changed", value - 1 if value else 1)
+        elif cursor.kind == Kind.INTEGER_LITERAL and self.is_number(cursor) or self.is_named_constant(cursor):
+            self.change(cursor, "constant +1", f"({text}) + 1ULL")
+            if self.text[cursor.extent.start.offset - 1] != "[" or text not in ("0", "0U"):
+                self.change(cursor, "constant -1", f"({text}) - 1ULL")
 
     def is_number(self, cursor):
         """Or a macro that stands for one, however many make it up."""

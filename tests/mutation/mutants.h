@@ -1,9 +1,7 @@
-// Included before each mutated source file: the functions that the mutated places call. At most one mutant is
-// active, the one whose number is in the environment variable VEMO_MUTANT. If VEMO_MUTANTS_REACHED names a
-// file, each place also notes there which of its mutants would have made a difference: the byte of that
-// number becomes 1.
-//
-// What the compiler evaluates stays as it is.
+// Included before each mutated source file: what the mutated places call. At most one mutant is active, the
+// one whose number is in the environment variable VEMO_MUTANT. If VEMO_MUTANTS_REACHED names a file, each
+// place also notes there which of its mutants would have made a difference: the byte of that number
+// becomes 1.
 
 #ifndef TESTS_MUTATION_MUTANTS_H
 #define TESTS_MUTATION_MUTANTS_H
@@ -58,59 +56,13 @@ inline bool isActive(int nMutant)
 
 } // namespace mutants
 
-// A statement: is it still there?
-constexpr bool mutant_present(int nMutant)
+// A value, or what this mutant puts in its place. What the compiler evaluates stays as it is.
+template <typename Value, typename Other>
+constexpr Value mutant(int nMutant, Value value, Other other)
 {
-    return __builtin_is_constant_evaluated() || !mutants::isActive(nMutant);
-}
-
-// A condition that one mutant makes true, or false, or one the one and the next the other.
-constexpr bool mutant_true(int nMutant, bool blCondition)
-{
-    return blCondition || !mutant_present(nMutant);
-}
-
-constexpr bool mutant_false(int nMutant, bool blCondition)
-{
-    return blCondition && mutant_present(nMutant);
-}
-
-constexpr bool mutant_condition(int nMutant, bool blCondition)
-{
-    return blCondition ? mutant_present(nMutant + 1) : !mutant_present(nMutant);
-}
-
-// A number one higher; or one higher, and one lower in the next mutant.
-template <typename Number>
-constexpr Number mutant_up(int nMutant, Number nValue)
-{
-    return mutant_present(nMutant) ? nValue : static_cast<Number>(nValue + 1);
-}
-
-template <typename Number>
-constexpr Number mutant_constant(int nMutant, Number nValue)
-{
-    return mutant_present(nMutant + 1) ? mutant_up(nMutant, nValue) : static_cast<Number>(nValue - 1);
-}
-
-constexpr bool mutant_bool(int nMutant, bool blValue)
-{
-    return blValue == mutant_present(nMutant);
-}
-
-// One of several flags, which are joined.
-template <typename Flag>
-constexpr Flag mutant_flag(int nMutant, Flag flag)
-{
-    return mutant_present(nMutant) ? flag : Flag();
-}
-
-// The enumerator below, and of the first the one above.
-template <typename Enum>
-constexpr Enum mutant_enumerator(int nMutant, Enum value)
-{
-    const int nValue = static_cast<int>(value);
-    return mutant_present(nMutant) ? value : static_cast<Enum>(nValue ? nValue - 1 : 1);
+    const Value mutated = static_cast<Value>(other);
+    const bool blSame = mutated == value || __builtin_is_constant_evaluated();
+    return blSame || !mutants::isActive(nMutant) ? value : mutated;
 }
 
 // A variable that acts by its life alone.
@@ -120,7 +72,7 @@ public:
     template <typename... Arguments>
     explicit mutant_guard(Arguments&&... arguments)
     {
-        if (mutant_present(N_MUTANT)) {
+        if (mutant(N_MUTANT, true, false)) {
             m_guard.emplace(std::forward<Arguments>(arguments)...);
         }
     }
