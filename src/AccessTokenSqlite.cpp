@@ -211,18 +211,15 @@ Failed:
 
 int AccessTokenDbApi::runSql(int (*callback)(void*, int, char**, char**), void* arg)
 {
-    int nResult = 0;
-
     if (m_strSql.empty()) {
         VEMO_ATOKEN_FAIL("no correct sql", VEMO_ATOKEN_HERE);
         return -1;
     }
     VEMO_ATOKEN_CHECK_RETURN(0 > initDb(), -1);
     m_strErr.clear();
-    nResult = runSqlEx(m_strSql, callback, arg);
+    const int nResult = runSqlEx(m_strSql, callback, arg);
     if (0 > nResult) {
         VEMO_ATOKEN_FAIL("run sql failed, sql=%s", VEMO_ATOKEN_HERE, m_strSql.c_str());
-        return -1;
     }
     return nResult;
 }

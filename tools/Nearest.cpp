@@ -35,9 +35,6 @@ std::string didYouMean(const std::string& strWord, const std::vector<std::string
     size_t nNearest = SIZE_MAX;
     for (const std::string& strName : strNames) {
         const size_t nLongest = std::max(strName.size(), strWord.size());
-        if (nLongest - std::min(strName.size(), strWord.size()) > nLongest / 3) {
-            continue; // skips the work for a very long argument in the wrong place
-        }
         const size_t nDistance = distance(strWord, strName);
         if (nDistance < nNearest && nDistance <= nLongest / 3) {
             nNearest = nDistance;
