@@ -26,14 +26,11 @@ auto resultsWhileMemoryFails(Call call)
             }
         };
         try {
-            auto result = call();
-            g_pAllocation = nullptr;
-            results.insert(result);
+            results.insert(call());
         } catch (const std::bad_alloc&) {
-            g_pAllocation = nullptr;
         } catch (const Json::RuntimeError&) { // jsoncpp may report it so
-            g_pAllocation = nullptr;
         }
+        g_pAllocation = nullptr;
     }
     g_nUntilFailure = 0;
     return results;
