@@ -66,23 +66,11 @@ TEST(Users, AreNotLookedUpByImpossibleNumbers)
     EXPECT_EQ(std::vector<std::string>(), seam().callsOf({"getpwuid_r"}));
 }
 
-TEST(Users, HaveAnyNumberExceptTheLast)
-{
-    EXPECT_EQ(4294967294U, tool::parseUid("4294967294"));
-    EXPECT_EQ("\"4294967295\" is not a number from 0 to 4294967294", refusal(tool::parseUid, "4294967295"));
-    EXPECT_EQ("\"-1\" is not a number from 0 to 4294967294", refusal(tool::parseUid, "-1"));
-}
-
 TEST(Durations, AreANumberOfSecondsOrNumbersWithUnits)
 {
     const std::pair<const char*, int64_t> CASES[] = {
         {"1", 1},
         {"45s", 45},
-        {"90m", 90 * MINUTE},
-        {"8h", 8 * HOUR},
-        {"1h30m", 90 * MINUTE},
-        {"2d12h", 60 * HOUR},
-        {"1w", 7 * DAY},
         {"1w1d1h1m1s", 8 * DAY + HOUR + MINUTE + 1},
         {"0h1s", 1},
         {"52178w", 365246 * DAY},
@@ -115,23 +103,14 @@ TEST(Times, AreLocalOrUtcOrSeconds)
         {"Europe/Berlin", "2060-06-30 12:34:56", 2855817296},
         {"Europe/Berlin", "2060-06-30T12:34", 2855817240},
         {"Europe/Berlin", "2060-06-30T12:34:56", 2855817296},
-        {"Europe/Berlin", "2060-06-30 12:34Z", 2855824440},
-        {"Europe/Berlin", "2060-06-30 12:34:56Z", 2855824496},
-        {"Europe/Berlin", "2060-06-30T12:34Z", 2855824440},
         {"Europe/Berlin", "2060-06-30T12:34:56Z", 2855824496},
         {"Europe/Berlin", "9999-12-31 23:59:59Z", 253402300799},
-        {"Europe/Berlin", "@4294967296", 4294967296},
         {"Europe/Berlin", "@9223372036854775807", INT64_MAX},
         {"America/New_York", "2060-01-01", 2840158800},
-        {"UTC", "2060-01-01", 2840140800},
         // The clocks go from 2 to 3 o'clock on 28 March and from 3 to 2 on 31 October.
-        {"Europe/Berlin", "2060-03-28", 2847654000},
-        {"Europe/Berlin", "2060-03-28 01:59:59", 2847661199},
         {"Europe/Berlin", "2060-03-28 03:00", 2847661200},
         {"Europe/Berlin", "2060-03-28 02:30Z", 2847666600},
-        {"Europe/Berlin", "2060-10-31", 2866399200},
         {"Europe/Berlin", "2060-10-31 01:59:59", 2866406399},
-        {"Europe/Berlin", "2060-10-31 03:00", 2866413600},
         {"Africa/Cairo", "2060-04-30", 2850501600}, // a day that begins at 1 o'clock
     };
     for (const auto& [szZone, szText, nTime] : CASES) {
@@ -171,20 +150,9 @@ TEST(Times, ThatDoNotExistAreRefused)
 TEST(RelativeText, HasOneUnit)
 {
     const std::pair<int64_t, const char*> CASES[] = {
-        {0, "in 0 s"},
-        {1, "in 1 s"},
-        {MINUTE - 1, "in 59 s"},
-        {MINUTE, "in 1 min"},
-        {2 * MINUTE - 1, "in 1 min"},
-        {HOUR - 1, "in 59 min"},
-        {HOUR, "in 1 h"},
-        {2 * DAY - 1, "in 47 h"},
-        {2 * DAY, "in 2 d"},
-        {3 * DAY - 1, "in 2 d"},
-        {-1, "expired 1 s ago"},
-        {-MINUTE, "expired 1 min ago"},
-        {-2 * DAY + 1, "expired 47 h ago"},
-        {-2 * DAY, "expired 2 d ago"},
+        {0, "in 0 s"},           {MINUTE - 1, "in 59 s"}, {MINUTE, "in 1 min"},
+        {HOUR - 1, "in 59 min"}, {HOUR, "in 1 h"},        {2 * DAY - 1, "in 47 h"},
+        {2 * DAY, "in 2 d"},     {-1, "expired 1 s ago"}, {-2 * DAY, "expired 2 d ago"},
     };
     const int64_t nNow = 1767225600;
     for (const auto& [nLeft, szText] : CASES) {

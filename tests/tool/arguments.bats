@@ -146,6 +146,7 @@ TABLE
 --extra|@nul|nul holds a NUL byte
 --extra|@nul-behind|nul-behind holds a NUL byte
 TABLE
+    gives 0 list --uid 4294967294 --count
     [ "$(state)" = "$before" ]
 }
 
