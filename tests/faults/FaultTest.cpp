@@ -97,7 +97,7 @@ TEST_P(SystemCallFault, LeavesAStateThatTheCallerKnows)
 {
     g_szFunction = GetParam();
     g_injection.uidAfter = [] { return g_blUidLost ? 0 : UID_CALLER; };
-    failEachOfAll("system calls", g_szFunction, g_injection);
+    failEachOfAll(g_injection);
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, SystemCallFault,
@@ -123,7 +123,7 @@ TEST_P(IoFault, LeavesAStateThatTheCallerKnows)
         }
         return nAnswer;
     });
-    failEachOfAll("I/O faults", strFault, injection);
+    failEachOfAll(injection);
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, IoFault, ::testing::Values("Error", "FullDisk", "TornWrite", "Locked"),

@@ -12,7 +12,6 @@
 #include <stdexcept>
 
 #include "AccessTokenApi.h"
-#include "Figures.h"
 #include "ProcessState.h"
 
 namespace {
@@ -137,12 +136,12 @@ int64_t failEach(const TokenStore& store, const Operation& operation, Injection&
     return nCalls;
 }
 
-void failEachOfAll(const std::string& strKind, const std::string& strName, Injection& injection)
+void failEachOfAll(Injection& injection)
 {
     const TokenStore store;
-    int64_t nRuns = 0;
+    int64_t nCalls = 0;
     for (const Operation& operation : operations()) {
-        nRuns += 2 * failEach(store, operation, injection) + 2;
+        nCalls += failEach(store, operation, injection);
     }
-    figure(strKind, strName + ": " + std::to_string(nRuns) + " runs of 12 operations");
+    EXPECT_LT(0, nCalls);
 }

@@ -65,7 +65,7 @@ struct Injection {
 // that call and all later ones failing; and without a fault again. Returns the number of calls.
 int64_t failEach(const TokenStore& store, const Operation& operation, Injection& injection);
 
-// The same for all operations; prints the number of runs.
-void failEachOfAll(const std::string& strKind, const std::string& strName, Injection& injection);
+// The same for all operations. At least one of them must make such a call.
+void failEachOfAll(Injection& injection);
 
 #endif
