@@ -6,72 +6,31 @@
 #include <algorithm>
 #include <cctype>
 #include <cstdint>
-#include <functional>
+#include <cstdlib>
+#include <iomanip>
+#include <map>
 #include <optional>
+#include <sstream>
 
 #include "ModelRow.h"
 
-typedef std::function<bool(const Row&)> Condition;
-
-// A text for a number field that contains SQL. It ends the conditions so far and adds an alternative that
-// always holds; later conditions belong to that alternative.
-const char* const TEXT_OR_TRUE = "0 or 1=1";
-
-inline bool never(const Row&)
-{
-    return false;
-}
-
-inline Condition textIs(size_t nField, const std::string& strText)
-{
-    return [=](const Row& row) { return row.columns[nField] == strText; };
-}
-
-inline Json::Int64 number(const Row& row, size_t nField)
-{
-    return row.jRecord[FIELDS[nField].szName].asInt64();
-}
-
-// A long double holds every 64-bit integer exactly.
-inline Condition numberIs(size_t nField, long double number64)
-{
-    return [=](const Row& row) { return static_cast<long double>(number(row, nField)) == number64; };
-}
-
-// Removes "12", "2.5" or "true" from the beginning of a text.
-inline std::optional<long double> takeNumber(std::string& strText)
-{
-    long double number64 = 0;
-    size_t cch = 0;
-    if (0 == strText.compare(0, 4, "true")) {
-        number64 = 1;
-        cch = 4;
-    } else if (0 == strText.compare(0, 5, "false")) {
-        cch = 5;
-    } else if (!strText.empty() && isdigit(static_cast<unsigned char>(strText[0]))) {
-        number64 = std::stold(strText, &cch);
-    } else {
-        return std::nullopt;
-    }
-    strText.erase(0, cch);
-    return number64;
-}
-
 // The library puts no separator between the numbers of a list: 1 and 2 become 12. A negative number is
-// subtracted: 3 and -2 become 1. Returns nothing if the text is not valid SQL.
-inline std::optional<long double> valueOf(std::string strText)
+// subtracted: 3 and -2 become 1. Returns nothing for other texts.
+inline std::optional<std::string> valueOf(const std::string& strText)
 {
-    long double sum = 0;
-    do {
-        const bool blMinus = 0 == strText.compare(0, 1, "-");
-        strText.erase(0, blMinus ? 1 : 0);
-        const std::optional<long double> next = takeNumber(strText);
-        if (!next) {
+    long double sum = 0; // holds every 64-bit integer exactly
+    std::istringstream parts(strText);
+    std::string strPart;
+    for (int nSign = 1; std::getline(parts, strPart, '-'); nSign = -1) {
+        char* szRest = strPart.data();
+        sum += nSign * ("true" == strPart ? 1 : strtold(szRest, &szRest));
+        if (*szRest && "true" != strPart && "false" != strPart) {
             return std::nullopt;
         }
-        sum += blMinus ? -*next : *next;
-    } while (0 == strText.compare(0, 1, "-"));
-    return strText.empty() ? std::optional<long double>(sum) : std::nullopt;
+    }
+    std::ostringstream value;
+    value << std::setprecision(20) << sum;
+    return strText.empty() ? std::nullopt : std::optional(value.str());
 }
 
 inline bool isName(const std::string& strText)
@@ -120,16 +79,13 @@ struct Where {
             }
             add(nField, jFilter[strName]);
         }
-        for (const Alternative& alternative : m_alternatives) {
-            blBroken = blBroken || (alternative.blUnknownName && !alternative.blNever);
-        }
+        blBroken = blBroken || (m_blUnknownName && !m_blNever);
     }
 
     bool matches(const Row& row) const
     {
-        return std::any_of(m_alternatives.begin(), m_alternatives.end(), [&](const Alternative& alternative) {
-            return std::all_of(alternative.conditions.begin(), alternative.conditions.end(),
-                               [&](const Condition& condition) { return condition(row); });
+        return !m_blNever && std::all_of(m_expected.begin(), m_expected.end(), [&](const auto& expected) {
+            return row.columns[expected.first] == expected.second;
         });
     }
 
@@ -145,48 +101,22 @@ private:
         const std::string strText = blList ? listText(kind, jValue) : textOf(kind, jValue);
         if (blList && jValue.empty()) {
             blBroken = true;
-        } else if (Kind::Number == kind) {
-            addNumber(nField, strText, blList);
-        } else {
-            addCondition(textIs(nField, strText));
-        }
-    }
-
-    // The text becomes part of the statement without quotes, so it may contain SQL.
-    void addNumber(size_t nField, const std::string& strText, bool blList)
-    {
-        const size_t nOther = fieldNumber(strText);
-        if (strText == TEXT_OR_TRUE) {
-            addCondition(numberIs(nField, blList ? 1 : 0));
-            if (!blList) {
-                m_alternatives.emplace_back();
-            }
-        } else if (nOther < FIELDS.size()) {
-            addCondition([=](const Row& row) { return number(row, nField) == number(row, nOther); });
-        } else if ("null" == strText || "'" == strText) {
-            addCondition(&never); // a quote is doubled, and becomes an empty text
-        } else if (blList && strText.empty()) {
-            addCondition(&never);
-            m_alternatives.back().blNever = true;
-        } else if (const std::optional<long double> value = valueOf(strText)) {
-            addCondition(numberIs(nField, *value));
+        } else if (Kind::Number != kind) {
+            m_expected[nField] = strText;
+        } else if (const std::optional<std::string> strValue = valueOf(strText)) {
+            m_expected[nField] = *strValue;
         } else if (isName(strText)) {
-            addCondition(&never);
-            m_alternatives.back().blUnknownName = true;
+            m_blUnknownName = true;
+        } else if (blList && strText.empty()) {
+            m_blNever = true;
         } else {
             blBroken = true;
         }
     }
 
-    void addCondition(const Condition& condition) { m_alternatives.back().conditions.push_back(condition); }
-
-    // Holds when all its conditions do.
-    struct Alternative {
-        std::vector<Condition> conditions;
-        bool blUnknownName = false; // of a column
-        bool blNever = false;       // SQLite notices that at once, and then does not look for the column
-    };
-    std::vector<Alternative> m_alternatives = {{}}; // one of these must hold
+    std::map<size_t, std::string> m_expected; // the columns of a row that matches, by their numbers
+    bool m_blUnknownName = false;             // of a column
+    bool m_blNever = false; // SQLite notices that at once, and then does not look for the column
 };
 
 // Whether ordering and paging make the query invalid. They have no other effect.
