@@ -11,6 +11,7 @@
 #include <stdexcept>
 
 #include "AccessTokenDefine.h"
+#include "Interpose.h"
 
 namespace {
 
@@ -45,12 +46,12 @@ std::string contentsOf(const std::filesystem::path& path)
 
 // No test needs files to survive a crash of the machine, so nothing is synced. Weak, because PowerCutTest
 // defines its own.
-extern "C" __attribute__((weak)) int fsync(int)
+extern "C" INTERPOSED __attribute__((weak)) int fsync(int)
 {
     return 0;
 }
 
-extern "C" __attribute__((weak)) int fdatasync(int)
+extern "C" INTERPOSED __attribute__((weak)) int fdatasync(int)
 {
     return 0;
 }

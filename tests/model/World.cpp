@@ -68,16 +68,6 @@ INTERPOSED int getpwnam_r(const char* szName, struct passwd* pEntry, char*, size
     return 0;
 }
 
-INTERPOSED int fsync(int)
-{
-    return 0;
-}
-
-INTERPOSED int fdatasync(int)
-{
-    return 0;
-}
-
 // Formats the line and discards it.
 INTERPOSED void syslog(int, const char* szFormat, ...)
 {

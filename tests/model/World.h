@@ -1,5 +1,5 @@
-// Replaces parts of the system for the library and SQLite: a clock that only the test moves, a few users, no
-// syncs and no log.
+// Replaces parts of the system for the library and SQLite: a clock that only the test moves, a few users and
+// no log.
 
 #ifndef TESTS_WORLD_H
 #define TESTS_WORLD_H
