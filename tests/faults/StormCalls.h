@@ -52,13 +52,9 @@ public:
     void prepare(const Tokens& tokens) const
     {
         makeTable(m_store);
-        std::string strSql;
         for (const auto& [strName, nUses] : tokens) {
-            strSql += (strSql.empty() ? "INSERT INTO token VALUES ('" : ",('") + idOf(strName) +
-                      "','',0,4102444800," + std::to_string(nUses) +
-                      R"(,1,'VPN','{"Example.Api":{"method":["get"]}}','{}'))";
+            insertToken(m_store, strName, "'',0,4102444800," + std::to_string(nUses) + ",1,'VPN'");
         }
-        m_store.run(strSql);
     }
 
     // The tokens in the store, which must be sound. None if there is no table.

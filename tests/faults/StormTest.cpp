@@ -23,12 +23,12 @@ struct Tally {
     int64_t nFalse = 0;   // reported failure, but took effect
     int64_t nMissing = 0; // reported success, but had no effect
 
-    void add(bool blTold, bool blDone)
+    void add(bool blReported, bool blDone)
     {
         ++nCalls;
-        nMissing += blTold && !blDone;
-        nFalse += !blTold && blDone;
-        nFailed += !blTold && !blDone;
+        nMissing += blReported && !blDone;
+        nFalse += !blReported && blDone;
+        nFailed += !blReported && !blDone;
     }
 };
 
@@ -81,12 +81,12 @@ public:
     void takePart(int nProcess)
     {
         for (int nRound = 0; nRound < m_nRounds; ++nRound) {
-            Round& told = round(nProcess, nRound);
-            told.nCreated = m_calls.create(nameOf("new", nProcess, nRound));
-            told.nGrantedOwn = m_calls.grant(nameOf("own", nProcess));
-            told.nGrantedShared = m_calls.grant("shared");
+            Round& results = round(nProcess, nRound);
+            results.nCreated = m_calls.create(nameOf("new", nProcess, nRound));
+            results.nGrantedOwn = m_calls.grant(nameOf("own", nProcess));
+            results.nGrantedShared = m_calls.grant("shared");
             m_calls.grant(nameOf("revoked", (nProcess + 1) % m_nProcesses, nRound));
-            told.nRevoked = m_calls.revoke(nameOf("revoked", nProcess, nRound));
+            results.nRevoked = m_calls.revoke(nameOf("revoked", nProcess, nRound));
         }
     }
 
@@ -102,16 +102,16 @@ public:
             const int64_t nSpent = m_nRounds + 1 - found.at(nameOf("own", nProcess));
             int64_t nGrantedOwn = 0;
             for (int nRound = 0; nRound < m_nRounds; ++nRound) {
-                const Round& told = round(nProcess, nRound);
-                tally.add(0 == told.nCreated, has(found, nameOf("new", nProcess, nRound)));
-                nGrantedOwn += 0 == told.nGrantedOwn;
-                nGranted += 0 == told.nGrantedShared;
+                const Round& results = round(nProcess, nRound);
+                tally.add(0 == results.nCreated, has(found, nameOf("new", nProcess, nRound)));
+                nGrantedOwn += 0 == results.nGrantedOwn;
+                nGranted += 0 == results.nGrantedShared;
                 // A grant may have written the deleted token back, so only a missing one proves a deletion.
                 const bool blThere = has(found, nameOf("revoked", nProcess, nRound));
-                const bool blTold = 1 == told.nRevoked;
-                tally.add(blTold, blTold || !blThere);
-                nDeleted += blTold;
-                nUndone += blTold && blThere;
+                const bool blReported = 1 == results.nRevoked;
+                tally.add(blReported, blReported || !blThere);
+                nDeleted += blReported;
+                nUndone += blReported && blThere;
             }
             for (int nRound = 0; nRound < m_nRounds; ++nRound) {
                 tally.add(nRound < nGrantedOwn, nRound < nSpent);
@@ -150,17 +150,17 @@ private:
     SharedArray<Round> m_rounds{static_cast<size_t>(m_nProcesses * m_nRounds)};
 };
 
-void raise(Calls calls, int nProcesses)
+void storm(Calls calls, int nProcesses)
 {
-    Storm storm(calls, nProcesses);
-    EXPECT_EQ(0, runProcesses(nProcesses, [&](int nProcess) { storm.takePart(nProcess); }));
-    storm.judge(calls);
+    Storm processes(calls, nProcesses);
+    EXPECT_EQ(0, runProcesses(nProcesses, [&](int nProcess) { processes.takePart(nProcess); }));
+    processes.judge(calls);
 }
 
 // All processes start without a file. The file exists before its table: calls in between fail.
 void makeStores(Calls calls, int nProcesses)
 {
-    struct Told {
+    struct Creation {
         int nCreated;
         bool blNoTable;
     };
@@ -170,21 +170,21 @@ void makeStores(Calls calls, int nProcesses)
     int64_t nNoTable = 0; // failed because there was no table
     int64_t nBroken = 0;  // stores that stayed without one
     for (int64_t nStore = 0; nStore < nStores; ++nStore) {
-        SharedArray<Told> rgTold(static_cast<size_t>(nProcesses));
+        SharedArray<Creation> creations(static_cast<size_t>(nProcesses));
         stormCalls.store().setFiles({});
         EXPECT_EQ(0, runProcesses(nProcesses, [&](int nProcess) {
                       Log::clear();
-                      Told& told = rgTold[static_cast<size_t>(nProcess)];
-                      told.nCreated = stormCalls.create(nameOf("new", nProcess));
-                      told.blNoTable = nullptr != strstr(Log::text(), "no such table: token");
+                      Creation& creation = creations[static_cast<size_t>(nProcess)];
+                      creation.nCreated = stormCalls.create(nameOf("new", nProcess));
+                      creation.blNoTable = nullptr != strstr(Log::text(), "no such table: token");
                   }));
         const Tokens found = stormCalls.tokens();
         nBroken += STATE_NO_TABLE == stormCalls.store().state();
         for (int nProcess = 0; nProcess < nProcesses; ++nProcess) {
-            const Told& told = rgTold[static_cast<size_t>(nProcess)];
+            const Creation& creation = creations[static_cast<size_t>(nProcess)];
             const bool blDone = has(found, nameOf("new", nProcess));
-            tally.add(0 == told.nCreated, blDone);
-            nNoTable += 0 > told.nCreated && !blDone && told.blNoTable;
+            tally.add(0 == creation.nCreated, blDone);
+            nNoTable += 0 > creation.nCreated && !blDone && creation.blNoTable;
         }
     }
     report("First creation", nProcesses, calls, tally,
@@ -193,7 +193,7 @@ void makeStores(Calls calls, int nProcesses)
 }
 
 // 1 to 64, and VEMO_TEST_PROCESSES.
-void forEachSize(Calls calls, void (*storm)(Calls calls, int nProcesses))
+void forEachSize(Calls calls, void (*test)(Calls calls, int nProcesses))
 {
     std::vector<int> nSizes = {1, 2, 4, 8, 16, 32, 64};
     if (const char* szMore = getenv("VEMO_TEST_PROCESSES")) {
@@ -201,7 +201,7 @@ void forEachSize(Calls calls, void (*storm)(Calls calls, int nProcesses))
     }
     for (const int nProcesses : nSizes) {
         SCOPED_TRACE(nProcesses);
-        storm(calls, nProcesses);
+        test(calls, nProcesses);
     }
 }
 
@@ -209,12 +209,12 @@ void forEachSize(Calls calls, void (*storm)(Calls calls, int nProcesses))
 
 TEST(Storm, OfPlainCallsEndsAndCorruptsNothing)
 {
-    forEachSize(Calls::Plain, &raise);
+    forEachSize(Calls::Plain, &storm);
 }
 
 TEST(Storm, OfSerialisedCallsIsExact)
 {
-    forEachSize(Calls::Serialised, &raise);
+    forEachSize(Calls::Serialised, &storm);
 }
 
 TEST(FirstCreation, ByPlainCallsEndsAndCorruptsNothing)
