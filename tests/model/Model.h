@@ -1,8 +1,6 @@
 // A model of the library: a table in memory, and operations with the same names and arguments. It uses
 // neither the library nor SQL.
-//
-// Operations do not change arguments that they only read. They throw Json::LogicError where the library does:
-// when a value cannot be converted.
+// Operations throw Json::LogicError where the library does: when a value cannot be converted.
 
 #ifndef TESTS_MODEL_H
 #define TESTS_MODEL_H
@@ -13,6 +11,8 @@
 #include "ModelFilter.h"
 #include "ModelRow.h"
 #include "World.h"
+
+typedef std::vector<std::string> Texts;
 
 const unsigned int UID_NOBODY = 4294967295;
 const size_t TID_MIN = 127;
@@ -49,7 +49,7 @@ int removeIf(std::vector<Row>& rows, Predicate predicate)
 class Model {
 public:
     // Returns 0 if the record's fields have their types.
-    int checkJsonType(Json::Value& jToken)
+    int checkJsonType(const Json::Value& jToken)
     {
         const bool blSound =
             jToken.isObject() && std::all_of(FIELDS.begin(), FIELDS.end(), [&](const Field& field) {
@@ -73,13 +73,12 @@ public:
         return 0;
     }
 
-    int checkPermission(Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod)
+    int checkPermission(const Json::Value& jToken, const char* szWebapiName, const char* szWebapiMethod)
     {
-        const Json::Value& jRecord = jToken;
-        if (!jRecord.isObject() || !isGiven(szWebapiName)) {
+        if (!jToken.isObject() || !isGiven(szWebapiName)) {
             return -1;
         }
-        const Json::Value& jAllow = jRecord["webapi_allow"];
+        const Json::Value& jAllow = jToken["webapi_allow"];
         if (!jAllow.isObject() || !jAllow.isMember(szWebapiName)) {
             return -1;
         }
@@ -109,7 +108,7 @@ public:
         return 0;
     }
 
-    int tokenGet(Json::Value& jFilter, Json::Value& jTokenArrayOut)
+    int tokenGet(const Json::Value& jFilter, Json::Value& jTokenArrayOut)
     {
         if (!jFilter.isObject() || (!jTokenArrayOut.isNull() && !jTokenArrayOut.isArray())) {
             return -1;
@@ -126,9 +125,9 @@ public:
         return 0;
     }
 
-    int tokenGetOne(const char* szName, std::string& strValue, Json::Value& jTokenOut)
+    int tokenGetOne(const char* szName, const std::string& strValue, Json::Value& jTokenOut)
     {
-        if (!szName || !szName[0] || strValue.empty()) {
+        if (!isGiven(szName) || strValue.empty()) {
             return -1;
         }
         jTokenOut = Json::Value(Json::objectValue);
@@ -145,7 +144,7 @@ public:
         return 1;
     }
 
-    int tokenDelete(Json::Value& jFilter, bool blAll)
+    int tokenDelete(const Json::Value& jFilter, bool blAll)
     {
         if (!jFilter.isObject()) {
             return -1;
@@ -183,8 +182,8 @@ public:
         return 0;
     }
 
-    int tokenCreateByTid(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
-                         std::string& strTidIn)
+    int tokenCreateByTid(unsigned int uid, const std::string& strFunction, const Json::Value& jTokenOption,
+                         const std::string& strTidIn)
     {
         if (!isObjectOrNull(jTokenOption) || uid == UID_NOBODY || strFunction.empty() ||
             strTidIn.length() < TID_MIN) {
@@ -205,33 +204,25 @@ public:
         return 0 == checkJsonType(jToken) ? tokenSave(jToken, true) : -1;
     }
 
-    int tokenCreate(unsigned int& uid, std::string& strFunction, Json::Value& jTokenOption,
+    int tokenCreate(unsigned int uid, const std::string& strFunction, const Json::Value& jTokenOption,
                     std::string& strTidOut)
     {
-        std::string strTid;
-        tokenGenerate(strTid);
-        if (0 > tokenCreateByTid(uid, strFunction, jTokenOption, strTid)) {
-            return -1;
-        }
-        strTidOut = strTid;
-        return 0;
+        const int nResult = tokenCreateByTid(uid, strFunction, jTokenOption, m_strGenerated);
+        return 0 > nResult ? nResult : tokenGenerate(strTidOut);
     }
 
-    int tokenList(Json::Value& jFilter, Json::Value& jTokenArrayOut)
+    int tokenList(const Json::Value& jFilter, Json::Value& jTokenArrayOut)
     {
-        if (!isObjectOrNull(jFilter) || !jTokenArrayOut.isArray()) {
-            return -1;
-        }
-        Json::Value jAll(Json::objectValue);
-        return tokenGet(jFilter.isNull() ? jAll : jFilter, jTokenArrayOut);
+        const bool blUsable = isObjectOrNull(jFilter) && jTokenArrayOut.isArray();
+        return blUsable ? tokenGet(jFilter.isNull() ? Json::objectValue : jFilter, jTokenArrayOut) : -1;
     }
 
-    int tokenGetByTid(std::string& strTid, Json::Value& jTokenOut)
+    int tokenGetByTid(const std::string& strTid, Json::Value& jTokenOut)
     {
         return tokenGetOne("tid", strTid, jTokenOut);
     }
 
-    int VectorParamToJson(std::vector<std::string>& strVector, const char* szField, Json::Value& jParamOut)
+    int VectorParamToJson(const Texts& strVector, const char* szField, Json::Value& jParamOut)
     {
         if (!isObjectOrNull(jParamOut) || !isGiven(szField)) {
             return -1;
@@ -243,7 +234,7 @@ public:
         return 0;
     }
 
-    int tokenGetByTidArray(std::vector<std::string>& strTidVector, Json::Value& jTokenArrayOut)
+    int tokenGetByTidArray(const Texts& strTidVector, Json::Value& jTokenArrayOut)
     {
         Json::Value jFilter;
         if (!jTokenArrayOut.isArray() || strTidVector.empty()) {
@@ -253,7 +244,7 @@ public:
         return tokenGet(jFilter, jTokenArrayOut);
     }
 
-    int tokenUpdateByTid(std::string& strTid, Json::Value& jParam)
+    int tokenUpdateByTid(const std::string& strTid, const Json::Value& jParam)
     {
         Json::Value jToken;
         if (!jParam.isObject()) {
@@ -273,11 +264,10 @@ public:
 
     int tokenSaveByOverwrite(Json::Value& jToken)
     {
-        const bool blSound = 0 == checkJsonType(jToken) && 0 == fillDefaultValue(jToken, true);
-        return blSound ? tokenSave(jToken, false) : -1;
+        return 0 == checkJsonType(jToken) ? tokenSave(jToken, false) : -1;
     }
 
-    int tokenDeleteByArray(std::vector<std::string>& strVector, const char* szName)
+    int tokenDeleteByArray(const Texts& strVector, const char* szName)
     {
         const size_t nField = szName ? fieldNumber(szName) : FIELDS.size();
         if (strVector.empty() || FIELDS.size() == nField || Kind::Text != FIELDS[nField].kind) {
@@ -288,26 +278,18 @@ public:
         return tokenDelete(jFilter, false);
     }
 
-    int tokenDeleteByName(std::string& strValue, const char* szName)
+    int tokenDeleteByName(const std::string& strValue, const char* szName)
     {
-        std::vector<std::string> strVector = {strValue};
-        return strValue.empty() ? -1 : tokenDeleteByArray(strVector, szName);
+        return strValue.empty() ? -1 : tokenDeleteByArray({strValue}, szName);
     }
 
-    int tokenDeleteByTid(std::string& strTid) { return tokenDeleteByName(strTid, "tid"); }
-    int tokenDeleteByBindSid(std::string& strSid) { return tokenDeleteByName(strSid, "bind_sid"); }
-    int tokenDeleteByFunction(std::string& strFunction) { return tokenDeleteByName(strFunction, "function"); }
-    int tokenDeleteByTidArray(std::vector<std::string>& strTids)
-    {
-        return tokenDeleteByArray(strTids, "tid");
-    }
-    int tokenDeleteAll()
-    {
-        Json::Value jAll(Json::objectValue);
-        return tokenDelete(jAll, true);
-    }
+    int tokenDeleteByTid(const std::string& strTid) { return tokenDeleteByName(strTid, "tid"); }
+    int tokenDeleteByBindSid(const std::string& strSid) { return tokenDeleteByName(strSid, "bind_sid"); }
+    int tokenDeleteByFunction(const std::string& strName) { return tokenDeleteByName(strName, "function"); }
+    int tokenDeleteByTidArray(const Texts& strTids) { return tokenDeleteByArray(strTids, "tid"); }
+    int tokenDeleteAll() { return tokenDelete(Json::objectValue, true); }
 
-    int tokenGrant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
+    int tokenGrant(const std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
                    Json::Value& jTokenOut)
     {
         Json::Value jToken;
@@ -335,12 +317,11 @@ public:
         if (!jToken.isMember("tid") || !jToken["tid"].isString()) {
             return -1;
         }
-        std::string strTid = jToken["tid"].asString();
-        return std::min(0, tokenDeleteByTid(strTid));
+        return std::min(0, tokenDeleteByTid(jToken["tid"].asString()));
     }
 
     // As tokenGrant(), and writes the name of the token's user.
-    int grant(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod, char* szUser,
+    int grant(const std::string& strTid, const char* szWebapiName, const char* szWebapiMethod, char* szUser,
               size_t cbUser)
     {
         Json::Value jToken;
@@ -360,11 +341,7 @@ public:
         return cchWritten < strlen(szName) ? -1 : 0;
     }
 
-    int deleteByBindSid(const char* szSid)
-    {
-        std::string strSid = szSid ? szSid : "";
-        return tokenDeleteByBindSid(strSid);
-    }
+    int deleteByBindSid(const char* szSid) { return tokenDeleteByBindSid(szSid ? szSid : ""); }
 
 private:
     std::vector<Row> m_rows;

@@ -50,10 +50,7 @@ template <typename Function, size_t... I>
 int invoke(const Function& function, [[maybe_unused]] Json::Value& jCall, const Names& szArguments,
            std::index_sequence<I...>)
 {
-    if (sizeof...(I) != szArguments.size()) {
-        throw std::logic_error("another number of arguments");
-    }
-    return function(Argument(jCall[szArguments[I]])...);
+    return function(Argument(jCall[szArguments.at(I)])...);
 }
 
 // A call of that function, or of that member of a Library or a Model.
