@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 #include <pwd.h>
 
-#include <algorithm>
 #include <functional>
 #include <thread>
 
@@ -51,8 +50,4 @@ TEST(MemoryFaultInAFreshThread, LeavesNothingBehind)
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, MemoryFault, ::testing::Range<size_t>(0, operations().size()),
-                         [](const auto& instance) {
-                             std::string strName = operations()[instance.param].szName;
-                             std::replace(strName.begin(), strName.end(), ' ', '_');
-                             return strName;
-                         });
+                         [](const auto& instance) { return operations()[instance.param].szName; });

@@ -58,57 +58,57 @@ const std::vector<Operation>& operations()
         return VemoAccessTokenCreate(g_uid, g_strFunction, jOption, strTid);
     };
     static const std::vector<Operation> all = {
-        {"first creation", true, true, create},
-        {"creation", false, true, create},
-        {"creation under a given id", false, true,
+        {"FirstCreation", true, true, create},
+        {"Creation", false, true, create},
+        {"CreationUnderAGivenId", false, true,
          [] {
              Json::Value jOption = options();
              std::string strTid = idOf("given");
              return VemoAccessTokenCreateByTid(g_uid, g_strFunction, jOption, strTid);
          }},
-        {"grant of one use of three", false, true,
+        {"GrantOfOneUseOfThree", false, true,
          [] {
              std::string strTid = idOf("three");
              Json::Value jToken;
              return VemoAccessTokenGrantEx(strTid, "Example.Api", "get", jToken);
          }},
-        {"grant of the last use", false, true,
+        {"GrantOfTheLastUse", false, true,
          [] {
              std::string strTid = idOf("one");
              char szUser[64];
              return VemoAccessTokenGrant(strTid, "Example.Api", "get", szUser, sizeof(szUser));
          }},
-        {"deletion by id", false, true,
+        {"DeletionById", false, true,
          [] {
              std::string strTid = idOf("one");
              return VemoAccessTokenDeleteByTid(strTid);
          }},
-        {"deletion by session", false, false, [] { return VemoAccessTokenDeleteByBindSid("session"); }},
-        {"deletion by purpose", false, true,
+        {"DeletionBySession", false, false, [] { return VemoAccessTokenDeleteByBindSid("session"); }},
+        {"DeletionByPurpose", false, true,
          [] {
              std::string strFunction = "Mail";
              return VemoAccessTokenDeleteByFunction(strFunction);
          }},
-        {"update", false, false,
+        {"Update", false, false,
          [] {
              std::string strTid = idOf("three");
              Json::Value jParam(Json::objectValue);
              jParam["extra"]["note"] = std::string(6000, 'n'); // more than a page
              return AccessTokenApi().tokenUpdateByTid(strTid, jParam);
          }},
-        {"listing", false, false,
+        {"Listing", false, false,
          [] {
              Json::Value jFilter(Json::objectValue);
              Json::Value jTokenArray(Json::arrayValue);
              const int nResult = AccessTokenApi().tokenList(jFilter, jTokenArray);
              return 0 > nResult ? nResult : static_cast<int>(jTokenArray.size());
          }},
-        {"deletion by a list of ids", false, false,
+        {"DeletionByAListOfIds", false, false,
          [] {
              std::vector<std::string> strTidVector = {idOf("large")};
              return AccessTokenApi().tokenDeleteByTidArray(strTidVector);
          }},
-        {"deletion of all", false, false, [] { return AccessTokenApi().tokenDeleteAll(); }},
+        {"DeletionOfAll", false, false, [] { return AccessTokenApi().tokenDeleteAll(); }},
     };
     return all;
 }
