@@ -85,7 +85,8 @@ protected:
         EXPECT_NE(std::string::npos, m_store.state().find("new||0|new|2|new|VPN"));
         if (operation.blCreatesStore) {
             const bool blHalf = STATE_MISSING == strState || STATE_NO_TABLE == strState;
-            ++m_leftovers[blHalf ? strState : strState.empty() ? "no token" : "all"];
+            const std::string strLeft = blHalf ? strState : strState.empty() ? "no token" : "all";
+            ++m_counts["first creations left " + strLeft];
         }
     }
 
@@ -94,34 +95,29 @@ protected:
                  const std::function<std::function<void()>(const Operation&, int64_t nFatal)>& fatal)
     {
         const int64_t nEach = scaled(500) / static_cast<int64_t>(operations().size());
-        int64_t nKilled = 0;
-        int64_t nEnded = 0;
         for (const Operation& operation : operations()) {
             SCOPED_TRACE(operation.szName);
             prepareStore(m_store, operation);
             const int64_t nLife = lifeOf(operation);
             const Oracle oracle(m_store, operation);
-            for (const int64_t nEnough = nKilled + nEach; nKilled < nEnough && !HasFailure();) {
+            for (int64_t nLeft = nEach; 0 < nLeft && !HasFailure();) {
                 const auto run = fatal(operation, 1 + static_cast<int64_t>(m_random() >> 1) % nLife);
                 prepareStore(m_store, operation);
-                if (isKilledIn(run)) {
-                    ++nKilled;
+                const bool blKilled = isKilledIn(run);
+                ++m_counts[blKilled ? "killed" : "ended before"];
+                if (blKilled) {
+                    --nLeft;
                     judge(operation, oracle);
-                } else {
-                    ++nEnded;
                 }
             }
         }
-        std::string strText =
-            std::to_string(nKilled) + " killed, " + std::to_string(nEnded) + " ended before";
-        for (const auto& [strLeft, nTimes] : m_leftovers) {
-            strText += ", " + std::to_string(nTimes) + " first creations left " + strLeft;
+        for (const auto& [strWhat, nTimes] : m_counts) {
+            figure("kill, " + strName, std::to_string(nTimes) + " " + strWhat);
         }
-        figure("kill, " + strName, strText);
     }
 
     const TokenStore m_store;
-    std::map<std::string, int64_t> m_leftovers; // of a first creation
+    std::map<std::string, int64_t> m_counts; // what happened, and how often
     std::mt19937_64 m_random{seed()};
 };
 

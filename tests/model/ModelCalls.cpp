@@ -98,7 +98,9 @@ const std::vector<Operation>& operations()
         {"exported GrantEx",
          10,
          {"granted", "webapi", "method", "answer"},
-         on<Library>(&Library::grantEx),
+         [](Library& library, Json::Value& jCall, const Names& szArguments) {
+             return on<Library>(library.pGrantEx)(library, jCall, szArguments);
+         },
          purged(&Model::tokenGrant)},
         EXPORTED(Grant, 10, purged(&Model::grant), "granted", "webapi", "method", "user", "size"),
         EXPORTED(DeleteByTid, 3, purged(&Model::tokenDeleteByTid), "tid"),

@@ -20,12 +20,6 @@ int grantAtTheGate(std::string& strTid, const char* szWebapiName, const char* sz
 
 struct Library : AccessTokenDbApi, AccessTokenApi {
     int (*pGrantEx)(std::string&, const char*, const char*, Json::Value&) = &VemoAccessTokenGrantEx;
-
-    int grantEx(std::string& strTid, const char* szWebapiName, const char* szWebapiMethod,
-                Json::Value& jToken)
-    {
-        return pGrantEx(strTid, szWebapiName, szWebapiMethod, jToken);
-    }
 };
 
 // The outcome of an operation.
