@@ -10,6 +10,7 @@
 #include <csignal>
 #include <cstdlib>
 #include <deque>
+#include <filesystem>
 #include <optional>
 #include <random>
 #include <thread>
@@ -24,6 +25,8 @@
 #include "StormCalls.h"
 
 namespace {
+
+namespace fs = std::filesystem;
 
 // The errno with which the next calls of flock() and fstat() fail; 0 makes the real call. When the list is
 // empty, all calls are real.
@@ -139,16 +142,12 @@ TEST_F(SerialisingLock, BelongsToItsMakerAlone)
 
 TEST_F(SerialisingLock, MakesAPrivateFileAndFollowsNoLink)
 {
-    struct stat status = {};
     const std::string strBefore = processState();
-    {
-        const CallLock lock(m_strFile.c_str());
-    }
-    ASSERT_EQ(0, stat(m_strFile.c_str(), &status));
-    EXPECT_EQ(0600U, status.st_mode & 07777);
+    EXPECT_EQ(0, lockOnce(m_strFile));
+    EXPECT_EQ(fs::perms(0600), fs::status(m_strFile).permissions());
     EXPECT_EQ(strBefore, processState());
     const std::string strLink = m_strFile + ".link";
-    ASSERT_EQ(0, symlink(m_strFile.c_str(), strLink.c_str()));
+    fs::create_symlink(m_strFile, strLink);
     EXPECT_EQ(ELOOP, lockOnce(strLink));
     EXPECT_EQ(ENOENT, lockOnce(m_strFile + ".missing/lock"));
 }
@@ -186,16 +185,16 @@ TEST_F(SerialisingLock, MayHaveTheFirstDescriptor)
 TEST_F(SerialisingLock, RefusesAFileThatIsNotItsOwnersAlone)
 {
     EXPECT_EQ(0, lockOnce(m_strFile));
-    for (const mode_t mode : {0644, 0620, 0604, 0601}) {
-        ASSERT_EQ(0, chmod(m_strFile.c_str(), mode));
+    for (const int nMode : {0644, 0620, 0604, 0601}) {
+        fs::permissions(m_strFile, fs::perms(nMode));
         EXPECT_EQ(EPERM, lockOnce(m_strFile));
     }
-    ASSERT_EQ(0, chmod(m_strFile.c_str(), 0700));
+    fs::permissions(m_strFile, fs::perms(0700));
     EXPECT_EQ(0, lockOnce(m_strFile));
     if (0 == getuid() && 0 == chown(m_strFile.c_str(), 1, 1)) {
         EXPECT_EQ(EPERM, lockOnce(m_strFile));
     }
-    ASSERT_EQ(0, unlink(m_strFile.c_str()));
+    fs::remove(m_strFile);
     ASSERT_EQ(0, mkfifo(m_strFile.c_str(), 0600));
     EXPECT_EQ(EPERM, lockOnce(m_strFile));
 }

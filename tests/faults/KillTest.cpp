@@ -47,9 +47,7 @@ void runFor(const Operation& operation, int64_t nNanoseconds)
     event.sigev_notify = SIGEV_SIGNAL;
     event.sigev_signo = SIGKILL;
     timer_t timer;
-    itimerspec when = {};
-    when.it_value.tv_sec = nNanoseconds / 1000000000;
-    when.it_value.tv_nsec = nNanoseconds % 1000000000;
+    const itimerspec when = {{0, 0}, {nNanoseconds / 1000000000, nNanoseconds % 1000000000}};
     if (0 != timer_create(CLOCK_MONOTONIC, &event, &timer) || 0 != timer_settime(timer, 0, &when, nullptr)) {
         _exit(1);
     }

@@ -29,8 +29,7 @@ Files makeStore(const TokenStore& store)
     insertToken(store, "bound", "'session',0,4102444800,-1,1,'VPN'");
     insertToken(store, "mail", "'',0,4102444800,5,1,'Mail'");
     insertToken(store, "large", "'" + std::string(10000, 'l') + "',0,4102444800,5,1,'Large'");
-    insertToken(store, "expired", "'session',0,1,5,1,'VPN'");
-    insertToken(store, "expired-large", "'" + std::string(5000, 'e') + "',0,1,5,1,'VPN'");
+    insertExpired(store);
     return store.files();
 }
 
@@ -48,6 +47,12 @@ void insertToken(const TokenStore& store, const std::string& strName, const std:
 {
     store.run("INSERT INTO token VALUES ('" + idOf(strName) + "'," + strColumns +
               R"(,'{"Example.Api":{"method":["get"]}}','{"ratio":1.25}');)");
+}
+
+void insertExpired(const TokenStore& store)
+{
+    insertToken(store, "expired", "'session',0,1,5,1,'VPN'");
+    insertToken(store, "expired-large", "'" + std::string(5000, 'e') + "',0,1,5,1,'VPN'");
 }
 
 const std::vector<Operation>& operations()

@@ -28,8 +28,9 @@ inline const Operation& DELETION = operations()[5];
 inline const Operation& LISTING = operations()[9];
 inline const Operation& DELETION_OF_ALL = operations()[11];
 
-// Makes the store that the operation starts from.
+// Makes the store that the operation starts from. insertExpired() adds the expired tokens that it has.
 void prepareStore(const TokenStore& store, const Operation& operation);
+void insertExpired(const TokenStore& store);
 
 // For stores of other tokens. makeTable() runs strSettings and makes an empty table. insertToken() adds a
 // token with these values in the columns from bind_sid to function; it allows the method "get" of

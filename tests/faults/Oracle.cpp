@@ -6,34 +6,10 @@
 
 #include <cstring>
 #include <new>
-#include <numeric>
-#include <set>
-#include <sstream>
 #include <stdexcept>
 
 #include "AccessTokenApi.h"
 #include "ProcessState.h"
-
-namespace {
-
-// The lines of strState, and those lines of strOther that show expired tokens.
-std::string withExpired(const std::string& strState, const std::string& strOther)
-{
-    std::multiset<std::string> lines;
-    const auto take = [&](const std::string& strText, const char* szPart) {
-        std::istringstream text(strText);
-        for (std::string strLine; std::getline(text, strLine);) {
-            if (std::string::npos != strLine.find(szPart)) {
-                lines.insert(strLine + "\n");
-            }
-        }
-    };
-    take(strState, "");
-    take(strOther, "|past|5|");
-    return std::accumulate(lines.begin(), lines.end(), std::string());
-}
-
-} // namespace
 
 Oracle::Oracle(const TokenStore& store, const Operation& operation) : m_store(store), m_operation(operation)
 {
@@ -44,10 +20,13 @@ Oracle::Oracle(const TokenStore& store, const Operation& operation) : m_store(st
     prepareStore(store, operation);
     m_nResult = run().value_or(-1);
     m_strAfter = store.state();
-    m_strAfterWithoutPurge = operation.blPurges ? withExpired(m_strAfter, m_strBefore) : m_strAfter;
     if (0 > m_nResult) {
         throw std::logic_error(std::string("fails undisturbed: ") + operation.szName);
     }
+    if (operation.blPurges && !operation.blCreatesStore) {
+        insertExpired(store);
+    }
+    m_strAfterWithoutPurge = store.state();
 }
 
 std::optional<int> Oracle::run() const
