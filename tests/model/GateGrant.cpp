@@ -1,3 +1,4 @@
+#include <cstring>
 #include <stdexcept>
 
 #include "ModelCalls.h"
@@ -49,7 +50,7 @@ int grantAtTheGate(std::string& strTid, const char* szWebapiName, const char* sz
     const auto askLibrary = [&] {
         return VemoAccessTokenGrantEx(strTid, szWebapiName, szWebapiMethod, jToken);
     };
-    if (request.strTid.empty() || request.strApi.empty()) {
+    if (strlen(strTid.c_str()) != strTid.size() || strTid.empty() || request.strApi.empty()) {
         return askLibrary(); // a message cannot hold such a call
     }
     const auto [answer, figures] = call(request);
