@@ -44,10 +44,9 @@ const Json::Value g_jSession =
 const Json::Value g_jPurpose =
     list("VPN", "VPN", "Mail", "VPN'Mail", "it's", "\xf0\x9f\x94\x91", withNul("", "x"), "");
 
-const Json::Value g_jWebapi = list("Example.Api", "Example.Api", "Example.Api", "Example.Api", "Example.Api",
-                                   "Example.File", "a\"b\\c\n", "\xff", withNul("Example.Api", "x"), "");
+const Json::Value g_jWebapi = list("Example.File", "a\"b\\c\n", "\xff", withNul("Example.Api", "x"), "");
 
-const Json::Value g_jMethod = list("get", "get", "get", "get", "get", "list", "Get", "5", "it's", "");
+const Json::Value g_jMethod = list("list", "Get", "5", "it's", "");
 
 const Json::Value g_jExtra = list(jsonValue("{}"), jsonValue(R"({"note":"it's"})"),
                                   jsonValue(R"({"a":{"b":[1,-2,3.5,true,null,"x"]},"":0})"),
@@ -129,38 +128,22 @@ private:
     // Mostly the id of a row.
     Json::Value tid() { return m_rows.empty() || oneIn(4) ? oneOf(g_jTid) : row().columns[0]; }
 
-    // The same; webapi() then mostly draws what that row allows.
-    Json::Value granted()
-    {
-        m_jAllow = Json::Value();
-        if (m_rows.empty() || oneIn(3)) {
-            return tid();
-        }
-        const Row& granted = row();
-        m_jAllow = granted.jRecord["webapi_allow"];
-        return granted.columns[0];
-    }
-
-    // Random ones would rarely be among those that the token allows.
-    Json::Value webapi()
-    {
-        return m_jAllow.isObject() && !m_jAllow.empty() ? m_jAllow.getMemberNames()[below(m_jAllow.size())]
-               : oneIn(30)                              ? Json::Value()
-                                                        : oneOf(g_jWebapi);
-    }
+    // Mostly the same, so that many grants are of a method that the token allows.
+    Json::Value webapi() { return oneIn(3) ? oneOf(g_jWebapi) : "Example.Api"; }
+    Json::Value method() { return oneIn(3) ? oneOf(g_jMethod) : "get"; }
 
     Json::Value allow()
     {
         Json::Value jAllow(Json::objectValue);
         for (size_t i = oneIn(8) ? 0 : 1 + below(3); 0 < i; --i) {
-            Json::Value& jEntry = jAllow[oneOf(g_jWebapi).asString()];
+            Json::Value& jEntry = jAllow[webapi().asString()];
             if (oneIn(8)) {
                 jEntry = anything();
                 continue;
             }
             Json::Value jMethods(Json::arrayValue);
             for (size_t j = 1 + below(3); 0 < j; --j) {
-                jMethods.append(oneIn(8) ? anything() : oneOf(g_jMethod));
+                jMethods.append(oneIn(8) ? anything() : method());
             }
             jEntry = Json::Value(Json::objectValue);
             jEntry["method"] = jMethods;
@@ -337,9 +320,9 @@ private:
     const std::map<std::string, std::function<Json::Value()>> m_draws = {
         {"tid", [this] { return tid(); }},
         {"fresh", [this] { return oneOf(g_jTid); }},
-        {"granted", [this] { return granted(); }},
-        {"webapi", [this] { return webapi(); }},
-        {"method", [this] { return oneIn(10) ? Json::Value() : oneOf(g_jMethod); }},
+        {"granted", [this] { return tid(); }},
+        {"webapi", [this] { return oneIn(30) ? Json::Value() : webapi(); }},
+        {"method", [this] { return oneIn(10) ? Json::Value() : method(); }},
         {"uid", [this] { return oneOf(g_jUid); }},
         {"function", [this] { return oneOf(g_jPurpose); }},
         {"sid", [this] { return oneOf(g_jSession); }},
@@ -363,7 +346,6 @@ private:
     std::mt19937_64 m_source;
     const std::vector<Row>& m_rows;
     std::optional<time_t> m_usualTime; // while the clock is wrong
-    Json::Value m_jAllow;              // of the row whose id was drawn last for a grant
 };
 
 #endif
