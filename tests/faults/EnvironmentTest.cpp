@@ -40,7 +40,7 @@ struct Unavailable : std::runtime_error {
 };
 
 const uid_t UID_NOBODY = 65534;
-const uid_t UID_ORDINARY = 0 == getuid() ? UID_NOBODY : getuid();
+const uid_t UID_ORDINARY = 0 == getuid() ? UID_NOBODY : getuid(); // not root
 
 void provide(bool blSucceeded, const char* szWhat)
 {

@@ -188,7 +188,7 @@ void makeStores(Calls calls, int nProcesses)
         }
     }
     report("First creation", nProcesses, calls, tally,
-           " (for want of the table " + share(nNoTable, tally.nCalls) + "), stores without a table " +
+           " (no table yet " + share(nNoTable, tally.nCalls) + "), stores without a table " +
                share(nBroken, nStores));
 }
 
