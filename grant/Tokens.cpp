@@ -41,7 +41,8 @@ std::string findSql()
     for (const char* szField : FIELDS) {
         strSql.append(szField).append(", ");
     }
-    return strSql + EXPIRED " FROM token" WHERE_TID;
+    // After the year 9999 SQLite has no date to compare with, and nothing expires.
+    return strSql + "ifnull(" EXPIRED ", 0) FROM token" WHERE_TID;
 }
 
 // As the library's checkPermission(), and also -1 if it throws: the list of methods holds an array or object.

@@ -3,6 +3,7 @@
 #include <new>
 #include <optional>
 
+#include "Seam.h"
 #include "TokenTable.h"
 
 using grant::Error;
@@ -78,6 +79,14 @@ TEST_F(Tokens, FailWithoutMemoryAndThenWorkAgain)
     }
     EXPECT_TRUE(*blExpired);
     EXPECT_LT(1, nFailures);
+}
+
+// SQLite has no dates then; the library's purge finds nothing either.
+TEST_F(Tokens, DoNotExpireAfterTheYear9999)
+{
+    add("one", "count = 2");
+    seam().clock = 253402300800;
+    EXPECT_FALSE(grant::Tokens(m_pDb).find("one")->blExpired);
 }
 
 TEST_F(Tokens, GiveTheFirstRowOfAnIdAndWhetherAllRowsCanBeRead)
