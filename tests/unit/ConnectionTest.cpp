@@ -1,12 +1,11 @@
 // The connection to the database: the calls that open it, how opening fails, and how it is closed.
+// EnvironmentTest shows what else can be in the place of the file.
 
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cstddef>
 #include <filesystem>
 #include <fstream>
-#include <functional>
 #include <type_traits>
 
 #include "Statements.h"
@@ -41,13 +40,6 @@ protected:
     {
         StoreTest::SetUp();
         ASSERT_EQ(0, seteuid(UID_CALLER));
-    }
-
-    mode_t mode() const
-    {
-        struct stat status;
-        EXPECT_EQ(0, stat(path().c_str(), &status));
-        return status.st_mode & 07777;
     }
 
     // SQLite refuses to open a directory, and returns a handle that can only be closed.
@@ -90,7 +82,8 @@ TEST_F(Connection, OpensInAFixedOrderOfCallsAndRestoresTheUid)
     opens([] {}, OPENED, created + back, {});
     opens([&] { std::ofstream{path()}; }, OPENED, {UID, RAISE, ACCESS, OPEN, BACK}, {});
     // A file that cannot be examined is treated as missing, which does not harm it.
-    opens([&] { std::ofstream{path()}, seam().fail("access", EACCES); }, OPENED, created + back, {});
+    opens([&] { makeTable(), insert(), seam().fail("access", EACCES); }, OPENED, created + back, {});
+    EXPECT_EQ("t", tids());
     opens([] { seam().fail("seteuid", EPERM); }, REFUSED, {UID, RAISE, BACK}, {NOT_ROOT});
     opens([] { seam().fail("open", EROFS); }, REFUSED, {UID, RAISE, ACCESS, TOUCH, BACK},
           {failed(STORE, "0 > PLIBCFileTouch(VEMO_ATOKEN_DB_PATH)", EROFS)});
@@ -115,21 +108,6 @@ TEST_F(Connection, OpensInAFixedOrderOfCallsAndRestoresTheUid)
     opens([] { seam().fail("seteuid", EAGAIN, 2, 2); }, {0, true, 0}, created + back, {});
 }
 
-TEST_F(Connection, CreatesAPrivateFileWithTheTableWhateverTheUmask)
-{
-    for (const mode_t mask : {0000u, 0022u, 0077u, 0777u}) {
-        SCOPED_TRACE(mask);
-        std::filesystem::remove(path());
-        const mode_t maskBefore = umask(mask);
-        EXPECT_EQ(0, AccessTokenDbApi().initDb());
-        umask(maskBefore);
-        EXPECT_EQ(0700u, mode());
-    }
-    EXPECT_EQ((Texts{"1"}), query("PRAGMA auto_vacuum"));
-    EXPECT_EQ((Texts{"CREATE TABLE token " + SCHEMA.substr(SCHEMA.find('('))}),
-              query("SELECT sql || ';' FROM sqlite_schema WHERE sql <> ''"));
-}
-
 TEST_F(Connection, OpensOnceAndNotBeforeItMust)
 {
     {
@@ -150,28 +128,6 @@ TEST_F(Connection, OpensOnceAndNotBeforeItMust)
         seam().calls.clear();
     }
     EXPECT_EQ((Texts{CLOSE}), seam().calls); // by the destructor
-}
-
-// The table is created only with the file.
-TEST_F(Connection, LeavesExistingFilesUnchanged)
-{
-    const std::string strForeign(4096, 'x');
-    for (const auto& [strContent, strError] :
-         {std::pair<std::string, std::string>{"", "no such table: token"},
-          {strForeign, "file is not a database"}}) {
-        std::ofstream{path()} << strContent;
-        ASSERT_EQ(0, chmod(path().c_str(), 0640));
-        AccessTokenDbApi db;
-        db.m_strSql = UPDATE;
-        EXPECT_EQ(-1, db.runSql());
-        EXPECT_EQ(strError, db.m_strErr);
-        EXPECT_LINES(failureOf(UPDATE, strError));
-        EXPECT_EQ(0640u, mode());
-        std::string strAfter;
-        std::ifstream{path()} >> strAfter;
-        EXPECT_EQ(strContent, strAfter);
-    }
-    EXPECT_EQ((Texts{UPDATE, UPDATE}), seam().statements());
 }
 
 TEST_F(Connection, RestoresTheUidWhenAnExceptionPasses)
