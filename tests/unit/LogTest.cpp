@@ -39,42 +39,32 @@ void checkACountOfText()
     EXPECT_EQ(-1, checkJsonType(jToken));
 }
 
-// Tests of the log before any switch is set.
+// The log before any switch is set.
 class Log : public SeamTest {
 protected:
     Log() { m_blStdout = false; }
-
-    static void expectLatch(bool (*pSwitch)(bool), bool (*pGet)(), bool (*pGetOther)())
-    {
-        EXPECT_FALSE(pGet() || pSwitch(false) || pGet());
-        EXPECT_TRUE(pSwitch(true) && pGet() && pSwitch(false) && pGet() && pSwitch(true));
-        EXPECT_FALSE(pGetOther());
-    }
 };
 
-TEST_F(Log, ToStdoutStaysOn)
+TEST_F(Log, FollowsItsTwoSwitchesWhichStayOn)
 {
-    expectLatch(logToStdout, logToStdoutGet, debugInfoGet);
-}
-
-TEST_F(Log, OfDebugLinesStaysOn)
-{
-    expectLatch(debugInfo, debugInfoGet, logToStdoutGet);
-}
-
-TEST_F(Log, FollowsTheSwitchesAtOnce)
-{
-    for (const bool blDebug : {false, true, false}) {
-        debugInfo(blDebug);
+    bool blOn = false;
+    for (const bool blSwitch : {false, true, false, true}) {
+        blOn = blOn || blSwitch;
+        EXPECT_EQ(blOn, debugInfo(blSwitch));
+        EXPECT_EQ(blOn, debugInfoGet());
+        EXPECT_FALSE(logToStdoutGet());
         missTheId();
         askForAnApi("get");
-        EXPECT_EQ(debugInfoGet() ? 2u : 1u, takeLines().size());
+        EXPECT_EQ(blOn ? 2u : 1u, takeLines().size());
     }
-    for (const bool blStdout : {false, true, false}) {
-        logToStdout(blStdout);
+    blOn = false;
+    for (const bool blSwitch : {false, true, false, true}) {
+        blOn = blOn || blSwitch;
+        EXPECT_EQ(blOn, logToStdout(blSwitch));
+        EXPECT_EQ(blOn, logToStdoutGet());
         missTheId();
         EXPECT_LINES(ordinary(fieldList(2), "lost data member=tid"));
-        EXPECT_NE(logToStdoutGet(), seam().blInSystemLog);
+        EXPECT_NE(blOn, seam().blInSystemLog);
     }
 }
 
