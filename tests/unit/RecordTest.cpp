@@ -36,18 +36,8 @@ TEST_F(TypeTable, IsBuiltOnceAndItsTimeDoesNotReachRecords)
     EXPECT_EQ(Json::Value(Json::Int64(NOW + 5)), jToken["create_time"]);
 }
 
-// The test of the model covers records that have some of the members.
+// The test of the model shows what records are completed with.
 class Defaults : public SeamTest {};
-
-TEST_F(Defaults, CompleteARecord)
-{
-    Json::Value jToken;
-    EXPECT_EQ(0, fillDefaultValue(jToken, false));
-    for (const Field& field : fields()) {
-        EXPECT_EQ(field.jDefault, jToken[field.szName]);
-    }
-    EXPECT_EQ(fields().size(), jToken.size());
-}
 
 TEST_F(Defaults, CheckLogsTheFirstMissingFieldAndAddsNothing)
 {
@@ -119,9 +109,6 @@ TEST_F(TypeCheck, StopsAtTheFirstMemberOfAWrongType)
     // In the order of the names, whatever the other members are.
     checkFails(json(R"({"uid":"0","tid":1,"count":"%s%n%m%%","bind_sid":"","a":1,"z":1,"Count":[]})"),
                "count");
-    Json::Value jLong = json(R"({"count":"5"})");
-    jLong["tid"] = std::string(200000, 'x');
-    checkFails(jLong, "count");
 }
 
 TEST_F(TypeCheck, RefusesOtherValuesThanObjectsAndUnknownTypeNames)
