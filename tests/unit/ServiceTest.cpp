@@ -18,25 +18,6 @@ const Json::Value UNTOUCHED = "what the caller had";
 
 class ServiceObject : public StoreTest {};
 
-TEST_F(ServiceObject, OpensItsOwnDatabaseAndClosesItAtItsEnd)
-{
-    for (const bool blNew : {true, false}) {
-        seam().calls.clear();
-        {
-            AccessTokenApi api;
-            EXPECT_EQ((Texts{"operator new", UID, RAISE, ACCESS}) +
-                          (blNew ? Texts{TOUCH, CHMOD, OPEN, CREATE, CHANGES} : Texts{OPEN}) + Texts{RAISE},
-                      seam().calls);
-            seam().calls.clear();
-            AccessTokenApi another;
-            EXPECT_EQ((Texts{OPEN}), seam().callsOf({"sqlite3_open"}));
-            seam().calls.clear();
-        }
-        EXPECT_EQ((Texts{CLOSE, CLOSE}), seam().calls);
-    }
-    EXPECT_EQ(Texts{}, rows());
-}
-
 TEST_F(ServiceObject, OpensAgainAfterAFailedOpening)
 {
     Json::Value jFilter;
