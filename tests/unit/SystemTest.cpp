@@ -8,7 +8,6 @@
 
 #include "Processes.h"
 #include "StoreTest.h"
-#include "vemo-access-token.h"
 
 namespace {
 
@@ -42,35 +41,9 @@ protected:
         SeamTest::TearDown();
     }
 
-    static int create(std::string& strTid)
-    {
-        unsigned int uid = 0;
-        std::string strFunction = "VPN";
-        Json::Value jOption = json(R"({"webapi_allow": {"Api": {}}})");
-        return VemoAccessTokenCreate(uid, strFunction, jOption, strTid);
-    }
-
-    static void expectPrivateFileOfRoot()
-    {
-        struct stat status;
-        ASSERT_EQ(0, stat(VEMO_ATOKEN_DB_PATH, &status));
-        EXPECT_EQ(S_IFREG | 0700u, status.st_mode);
-        EXPECT_EQ(0u, status.st_uid);
-    }
-
 private:
     bool m_blMade = false;
 };
-
-TEST_F(System, KeepsTokensInAPrivateFileOfRoot)
-{
-    std::string strTid;
-    char szUser[16] = "";
-    EXPECT_EQ(0, create(strTid));
-    EXPECT_EQ(0, VemoAccessTokenGrant(strTid, "Api", nullptr, szUser, sizeof(szUser)));
-    EXPECT_STREQ("root", szUser);
-    expectPrivateFileOfRoot();
-}
 
 // This is why a process should stay at effective uid 0: SQLite opens the journal anew for each change.
 TEST_F(System, OpensAsRootButCannotWriteAtAnotherEffectiveUid)
@@ -85,16 +58,18 @@ TEST_F(System, OpensAsRootButCannotWriteAtAnotherEffectiveUid)
     EXPECT_EQ(-1, db.tokenDelete(jAll, true));
     EXPECT_EQ("attempt to write a readonly database", db.m_strErr);
     EXPECT_EQ(3u, takeLines().size());
+    struct stat status;
     ASSERT_EQ(0, seteuid(0));
-    expectPrivateFileOfRoot();
+    ASSERT_EQ(0, stat(VEMO_ATOKEN_DB_PATH, &status));
+    EXPECT_EQ(S_IFREG | 0700u, status.st_mode);
+    EXPECT_EQ(0u, status.st_uid);
 }
 
 TEST_F(System, NeedsTheRightToBecomeRoot)
 {
     EXPECT_TRUE(endsWell(startProcess([] {
-        std::string strTid;
-        if (0 != setresuid(UID_NOBODY, UID_NOBODY, UID_NOBODY) || -1 != create(strTid) ||
-            NOT_ROOT != takeLines().front()) {
+        if (0 != setresuid(UID_NOBODY, UID_NOBODY, UID_NOBODY) || -1 != AccessTokenDbApi().initDb() ||
+            Texts{NOT_ROOT} != takeLines()) {
             throw std::runtime_error("not refused");
         }
     })));
