@@ -1,6 +1,5 @@
 // Rows of the database as records.
 
-#include <algorithm>
 #include <climits>
 #include <new>
 
@@ -165,15 +164,9 @@ TEST_F(Decoding, NeverThrowsOnDeepNesting)
 {
     const auto nested = [](size_t nLevels) { return std::string(nLevels, '[') + std::string(nLevels, ']'); };
     EXPECT_TRUE(json(nested(1000)) == member("extra", nested(1000)));
-    // What was read down to the limit is kept.
-    Json::Value jLeft;
-    for (int nLevel = 0; nLevel < 1000; ++nLevel) {
-        Json::Value jOuter;
-        jOuter.append(jLeft);
-        jLeft.swap(jOuter);
-    }
-    EXPECT_TRUE(jLeft == member("extra", nested(1001)));
-    EXPECT_TRUE(jLeft == member("extra", std::string(100000, '[')));
+    const std::string strLeft = std::string(1000, '[') + "null" + std::string(1000, ']'); // what was read
+    EXPECT_EQ(strLeft, text(member("extra", nested(1001))));
+    EXPECT_EQ(strLeft, text(member("extra", std::string(100000, '['))));
     EXPECT_EQ(json("{\"a\":1}"), member("extra", "{\"a\":1}")) << "the reader works as before";
 }
 
@@ -292,36 +285,29 @@ TEST_F(Decoding, TreatsARowOfAllFieldsLikeAnyOther)
         row.names.push_back(field.szName);
     }
     row.values = {"1", "2", "3", "4", "5", "6", "7", "8", "9"};
-    Row reversed = row;
-    std::reverse(reversed.names.begin(), reversed.names.end());
-    std::reverse(reversed.values.begin(), reversed.values.end());
+    const Row reversed = {{row.names.rbegin(), row.names.rend()}, {row.values.rbegin(), row.values.rend()}};
     Row more = row;
     more.names.push_back("count");
     more.values.push_back("0");
     Row unnamed = row;
     unnamed.names.back() = nullptr;
-    Row withoutValue = row;
-    withoutValue.values.back() = nullptr;
 
-    const Json::Value jRecord =
-        json(R"({"tid":"1","bind_sid":"2","uid":3,"deadline":4,"count":5,"create_time":6,
-                                         "function":"7","webapi_allow":8,"extra":9})");
-    Json::Value jMore = jRecord;
-    jMore["count"] = 0;
-    Json::Value jText = jRecord;
-    jText["extra"] = "9";
+    const Json::Value jRecord = json(R"({"tid":"1","bind_sid":"2","uid":3,"deadline":4,"count":5,
+                                         "create_time":6,"function":"7","webapi_allow":8,"extra":9})");
+    Json::Value jExpected;
+    for (int i = 0; i < 4; ++i) {
+        jExpected.append(jRecord);
+    }
+    jExpected[2]["count"] = 0;
+    jExpected[3]["extra"] = "9";
     EXPECT_EQ(0, decode(row));
     EXPECT_EQ(0, decode(reversed));
     EXPECT_EQ(0, decode(more));
     tokenType()["extra"][0] = "string";
     EXPECT_EQ(0, decode(row));
-    EXPECT_EQ((std::vector<Json::Value>{jRecord, jRecord, jMore, jText}),
-              std::vector<Json::Value>(m_jArray.begin(), m_jArray.end()));
+    EXPECT_EQ(jExpected, m_jArray);
 
     expectRefused(unnamed, allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED}));
-    expectRefused(withoutValue, allFailed(STORE, {NULL_COLUMN, TOKEN_FAILED}));
-    tokenType()["extra"][0] = "bool";
-    expectRefused(row, columnLines(fail(STORE, "type error, strType=bool")));
     tokenType().removeMember("extra");
     expectRefused(row, columnLines(failed(STORE, NO_FIELD)));
 }
