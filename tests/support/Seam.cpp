@@ -286,14 +286,6 @@ int sqlite3_exec(sqlite3* pDb, const char* szSql, SqlCallback callback, void* pA
                              : Seam::exec(pDb, szSql, callback, pArgument, pszError);
 }
 
-int sqlite3_changes(sqlite3* pDb)
-{
-    if (CALLED_BY_LIBRARY) {
-        record("sqlite3_changes");
-    }
-    return NEXT(sqlite3_changes)(pDb);
-}
-
 int sqlite3_close(sqlite3* pDb)
 {
     if (!CALLED_BY_LIBRARY) {

@@ -23,7 +23,7 @@ typedef int (*SqlCallback)(void*, int, char**, char**);
 
 struct Seam {
     // The calls in order: "geteuid", "seteuid 0", "access PATH", "open PATH", "chmod PATH 0700",
-    // "sqlite3_open PATH", "sqlite3_exec SQL", "sqlite3_changes", "sqlite3_close", "usleep 10000",
+    // "sqlite3_open PATH", "sqlite3_exec SQL", "sqlite3_close", "usleep 10000",
     // "time", "sqlite3_mprintf FORMAT", "getrandom", "getpwuid_r UID", "operator new", "operator new[]".
     // usleep never really sleeps.
     std::vector<std::string> calls;

@@ -20,11 +20,10 @@ const char* const TOUCH = "open " VEMO_ATOKEN_DB_PATH;
 const char* const CHMOD = "chmod " VEMO_ATOKEN_DB_PATH " 0700";
 const char* const OPEN = "sqlite3_open " VEMO_ATOKEN_DB_PATH;
 const std::string CREATE = "sqlite3_exec " + SCHEMA;
-const char* const CHANGES = "sqlite3_changes";
 const char* const BACK = "seteuid 1000";
 const char* const CLOSE = "sqlite3_close";
-const Texts OPENING_CALLS = {"geteuid",      "seteuid",      "access",          "open",         "chmod",
-                             "sqlite3_open", "sqlite3_exec", "sqlite3_changes", "sqlite3_close"};
+const Texts OPENING_CALLS = {"geteuid", "seteuid",      "access",       "open",
+                             "chmod",   "sqlite3_open", "sqlite3_exec", "sqlite3_close"};
 
 // Tests that need no database. A log line that a test does not expect is an error.
 class SeamTest : public ::testing::Test {
