@@ -1,4 +1,4 @@
-// What deletions by value refuse. QueryTest and the test of the model show what is deleted.
+// What deletions by value refuse. The test of the model shows what is deleted.
 
 #include "AccessTokenUtil.h"
 #include "StoreTest.h"

@@ -1,9 +1,11 @@
-// Filters as SQL: conditions, order and paging.
+// Filters as SQL: conditions, order and paging; and queries and deletions that are refused or fail. The test
+// of the model shows what is found and deleted.
 
 #include <algorithm>
 #include <cstdint>
 
 #include "AccessTokenUtil.h"
+#include "Statements.h"
 #include "StoreTest.h"
 
 using VEMO_ACCESS_TOKEN::tokenType;
@@ -107,11 +109,9 @@ TEST_F(Filter, KeepsWhatItWroteBeforeAFailure)
     keeps(R"({"extra":{"a":1}})", 0, "held (", "", "");
     keeps(R"({"count":1,"uid":{"a":1},"webapi_allow":{}})", 0, "held (count=1 and ", "", "");
     keeps(R"({"tid":"a"})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED);
-    keeps(R"({"uid":7})", 1, "held (", MATCH_TEXT_FAILED, MATCH_FAILED);
     keeps(R"({"extra":7})", 1, "held (", MATCH_JSON_FAILED, MATCH_FAILED);
     keeps(R"({"count":1,"uid":7})", 2, "held (count=1 and ", MATCH_TEXT_FAILED, MATCH_FAILED);
     keeps(R"({"tid":["a"]})", 1, "held (", LIST_TEXT_FAILED, LIST_FAILED);
-    keeps(R"({"uid":[7]})", 1, "held (", LIST_TEXT_FAILED, LIST_FAILED);
     keeps(R"({"extra":[{}]})", 1, "held (", LIST_JSON_FAILED, LIST_FAILED);
     keeps(R"({"tid":["a","b"]})", 2, "held (", LIST_TEXT_FAILED, LIST_FAILED);
     keeps(R"({"count":[1],"uid":[1,2,3]})", 4, "held (count in (1 ) and ", LIST_TEXT_FAILED, LIST_FAILED);
@@ -277,6 +277,95 @@ TEST_F(Filter, WritesTheTailOfTheKeywordThatTheNumberPointsTo)
     for (const Json::Int64 nNumber : {Json::Int64(-1), n2To32 / 2, n2To32 - 1, Json::Int64(INT64_MAX)}) {
         points(nNumber, 9); // or more
     }
+}
+
+// Reading and deleting what a filter selects
+
+class Query : public TableTest {
+protected:
+    // The operations, with the filter as text.
+    int get(const std::string& strFilter, const char* szOut = "null")
+    {
+        Json::Value jFilter = json(strFilter);
+        m_jOut = json(szOut);
+        return m_db.tokenGet(jFilter, m_jOut);
+    }
+    int remove(const std::string& strFilter, bool bAll = false)
+    {
+        Json::Value jFilter = json(strFilter);
+        return m_db.tokenDelete(jFilter, bAll);
+    }
+    int getOne(const char* szName, std::string strValue)
+    {
+        m_jOut = json(R"({"old":1})");
+        return m_db.tokenGetOne(szName, strValue, m_jOut);
+    }
+
+    Json::Value m_jOut;
+};
+
+TEST_F(Query, FailsWhenSqliteRefusesTheStatement)
+{
+    const auto fails = [&](const char* szFilter, const std::string& strCondition,
+                           const std::string& strError) {
+        SCOPED_TRACE(szFilter);
+        const std::string strSql = SELECT + " WHERE " + strCondition + ";";
+        errno = EIO;
+        EXPECT_EQ(-1, get(szFilter));
+        EXPECT_EQ(strError, m_db.m_strErr);
+        EXPECT_TRUE(m_jOut.isNull());
+        EXPECT_LINES(failureOf(strSql, strError, EIO) +
+                     Texts{failed(STORE, "0 > runSql(FillList, &jTokenArrayOut)", EIO)});
+    };
+    fails(R"({"sort_by":"uid"})", " order by 'uid'", "near \"order\": syntax error");
+    fails(R"({"function":"VPN","limit":0})", " (function='VPN' ) LIMIT ", "near \";\": syntax error");
+    fails(R"({"limit":2})", "IMIT ", "no such column: IMIT");
+    fails(R"({"uid":[]})", " ( )", "near \")\": syntax error");
+}
+
+TEST_F(Query, RefusesUnusableArgumentsAndRunsNothing)
+{
+    const std::string strNoFilter = failed(STORE, "jTokenParam.type() != Json::objectValue");
+    const std::string strNoName = failed(STORE, "!szName || !szName[0]");
+    const Texts nested = {fail(STORE, "err input type, jTokenParam=(null)"),
+                          failed(STORE, "0 > SqlWhereFromJson(jTokenParam, strSql, true)")};
+    m_db.m_strSql = "earlier";
+    EXPECT_FAILURE(get("null", "{}"), strNoFilter);
+    EXPECT_FAILURE(remove("[1,2]", true), strNoFilter);
+    EXPECT_FAILURE(get("{}", "{}"), failed(STORE, "jTokenArrayOut.type() != Json::nullValue && "
+                                                  "jTokenArrayOut.type() != Json::arrayValue"));
+    EXPECT_FAILURE(getOne(nullptr, ""), strNoName);
+    EXPECT_FAILURE(getOne("", "x"), strNoName);
+    EXPECT_FAILURE(getOne("tid", ""), failed(STORE, "strValue.empty()"));
+    EXPECT_EQ(json(R"({"old":1})"), m_jOut);
+    EXPECT_FAILURE(get(R"({"tid":{"a":1}})"), nested);
+    EXPECT_FAILURE(remove(R"({"tid":{"a":1}})", true), nested);
+    EXPECT_FAILURE(remove("{}"), failed(STORE, "strSql.empty()"));
+    // The first text is the field's, the second the order's.
+    seam().fail("sqlite3_mprintf", ENOMEM, 2, 2);
+    EXPECT_FAILURE(
+        get(R"({"uid":7,"sort_by":"uid"})"),
+        allFailed(STORE, {"!szSql", "0 > SqlFilterConditionFromJson(jTokenParam, strSql)"}, ENOMEM));
+    EXPECT_EQ("earlier", m_db.m_strSql);
+    EXPECT_EQ(Texts{}, seam().callsOf(OPENING_CALLS));
+}
+
+// FailedStore in ServiceTest shows how the service reports it.
+TEST_F(Query, FailsAfterWaitingForALockAlthoughItHasTakenEffect)
+{
+    Json::Value jToken = token();
+    failStatements("INSERT", LOCKED);
+    EXPECT_FAILURE(m_db.tokenCreate(jToken), fail(STORE, "sql error, sql=" + saveSql("INSERT", jToken), EIO));
+    failStatements("SELECT", LOCKED);
+    EXPECT_FAILURE(get("{}"), fail(STORE, "sql error, sql=" + SELECT + ";", EIO));
+    EXPECT_EQ(1u, m_jOut.size());
+    failStatements("SELECT", LOCKED);
+    EXPECT_EQ(-1, getOne("tid", "t"));
+    EXPECT_EQ(json("{}"), m_jOut);
+    EXPECT_EQ(2u, takeLines().size());
+    failStatements("DELETE", LOCKED);
+    EXPECT_FAILURE(remove("{}", true), fail(STORE, "sql error, sql=DELETE FROM token;", EIO));
+    EXPECT_EQ("", tids());
 }
 
 } // namespace
