@@ -1,4 +1,4 @@
-// The service object: its database, what it does without one, and what its lookups refuse.
+// The service object: its database, what it does without one, and what its lookups and deletions refuse.
 
 #include <type_traits>
 
@@ -179,19 +179,10 @@ TEST_F(FailedStore, FailsEachOperation)
     EXPECT_EQ(0, apiWithoutStore.tokenCountDegrade(jToken = counted(-1)));
 }
 
-// QueryTest and the test of the model show the rest.
-class Lookup : public TableTest {};
+// The test of the model shows what is found and deleted.
+class Arguments : public TableTest {};
 
-TEST_F(Lookup, TakesAListOfIdsForOneTextWithoutSeparators)
-{
-    Texts ids = {"a", "b"};
-    Json::Value jArray(Json::arrayValue);
-    insert(R"({"tid":"a'b"})");
-    EXPECT_EQ(0, api().tokenGetByTidArray(ids, jArray));
-    EXPECT_EQ(token(R"({"tid":"a'b"})"), jArray[0]);
-}
-
-TEST_F(Lookup, RefusesArgumentsInOrder)
+TEST_F(Arguments, OfLookupsAreCheckedInOrder)
 {
     const std::string strFilter = "jFilter.type() != Json::objectValue && jFilter.type() != Json::nullValue";
     const std::string strList = "jTokenArrayOut.type() != Json::arrayValue";
@@ -216,6 +207,49 @@ TEST_F(Lookup, RefusesArgumentsInOrder)
     refuses(api().VectorParamToJson(none, "", jNull), strName);
     EXPECT_EQ(UNTOUCHED, jText);
     EXPECT_EQ(Texts{}, seam().calls);
+    // A list of ids is taken for one text.
+    Texts ids = {"a", "b"};
+    insert(R"({"tid":"a'b"})");
+    EXPECT_EQ(0, api().tokenGetByTidArray(ids, jArray));
+    EXPECT_EQ(token(R"({"tid":"a'b"})"), jArray[0]);
+}
+
+TEST_F(Arguments, OfDeletionsAreCheckedInOrder)
+{
+    const std::string strField = "!jType.isMember(szName)";
+    const std::string strNoName = "!szName || !szName[0]";
+    const std::string strNoString = "jType[szName][0].asString() != \"string\"";
+    // The operation's own line shows its arguments.
+    const auto byArray = [&](Texts values, const char* szName, const std::string& strCondition,
+                             const std::string& strShown) {
+        EXPECT_FAILURE(api().tokenDeleteByArray(values, szName), failed(SERVICE, strCondition, EACCES),
+                       ordinary(SERVICE, "tokenDeleteByArray failed, " + strShown));
+    };
+    const auto byName = [&](std::string strValue, const char* szName, const std::string& strCondition,
+                            const std::string& strShown) {
+        EXPECT_FAILURE(api().tokenDeleteByName(strValue, szName), failed(SERVICE, strCondition, EACCES),
+                       ordinary(SERVICE, "tokenDeleteByName failed, " + strShown));
+    };
+    errno = EACCES;
+    byArray({}, nullptr, "0 >= strVector.size()", "name=(null), strVector=");
+    byArray({"a", "b", "c"}, nullptr, strNoName, "name=(null), strVector=a,b,c");
+    byArray({"a", "b", "c"}, "", strNoName, "name=, strVector=a,b,c");
+    byArray({"a"}, "x", strField, "name=x, strVector=a");
+    byArray({"a,b", "%s%n"}, "create_time", strNoString, "name=create_time, strVector=a,b,%s%n");
+    byName("", nullptr, "strValue.empty()", "name=(null), strValue=");
+    byName("a", nullptr, strNoName, "name=(null), strValue=a");
+    byName("a", "", strNoName, "name=, strValue=a");
+    byName("a", "x", strField, "name=x, strValue=a");
+    // tokenDeleteByName leaves the check of the type to tokenDeleteByArray, and both log.
+    std::string strUid = "1000";
+    EXPECT_FAILURE(api().tokenDeleteByName(strUid, "uid"), failed(SERVICE, strNoString, EACCES),
+                   ordinary(SERVICE, "tokenDeleteByArray failed, name=uid, strVector=1000"),
+                   failed(SERVICE, "0 > (err = tokenDeleteByArray(strVector, szName))", EACCES),
+                   ordinary(SERVICE, "tokenDeleteByName failed, name=uid, strValue=1000"));
+    EXPECT_EQ(Texts{}, seam().statements());
+    // The present table of types decides.
+    VEMO_ACCESS_TOKEN::tokenType()["uid"][0] = "string";
+    EXPECT_EQ(0, api().tokenDeleteByName(strUid, "uid"));
 }
 
 } // namespace
