@@ -9,7 +9,7 @@ files of other runs, on other machines perhaps: ratios are then given as ranges 
 """
 
 import json
-import os
+import pathlib
 import platform
 import re
 import subprocess
@@ -88,28 +88,22 @@ def figures(content):
 def system_calls(path, grants):
     """The system calls of one grant: strace's counts of a whole run, divided by its grants."""
     numbers = dict.fromkeys(KINDS_OF_CALLS, 0)
-    with open(path, encoding="utf-8") as file:
-        for number, name in re.findall(r"^ *(\d+) (\w+)$", file.read(), re.MULTILINE):
-            if name not in ("total", "getuid"):  # the redirection of the database asks for the uid
-                numbers[SYSTEM_CALLS.get(name, "others")] += int(number)
+    for number, name in re.findall(r"^ *(\d+) (\w+)$", path.read_text("utf-8"), re.MULTILINE):
+        if name not in ("total", "getuid"):  # the redirection of the database asks for the uid
+            numbers[SYSTEM_CALLS.get(name, "others")] += int(number)
     return {kind: round(number / grants) for kind, number in numbers.items()}
 
 
 def measured(directory):
     """The measurements of a run, as in results.json."""
-    results = {}
-    context = {}
-    for program in PROGRAMS:
-        path = os.path.join(directory, program + ".json")
-        if os.path.exists(path):
-            with open(path, encoding="utf-8") as file:
-                content = json.load(file)
-            results[program] = figures(content)
-            if program == "breakdown":
-                for benchmark, cell in zip(content["benchmarks"], results[program].values()):
-                    calls = os.path.join(directory, benchmark["run_name"].replace("/", "-") + ".calls")
-                    cell.update(system_calls(calls, benchmark["iterations"]))
-            context = context or content["context"]
+    contents = {program: json.loads((directory / f"{program}.json").read_text("utf-8"))
+                for program in PROGRAMS if (directory / f"{program}.json").exists()}
+    results = {program: figures(content) for program, content in contents.items()}
+    if "breakdown" in results:
+        for benchmark, cell in zip(contents["breakdown"]["benchmarks"], results["breakdown"].values()):
+            calls = directory / (benchmark["run_name"].replace("/", "-") + ".calls")
+            cell.update(system_calls(calls, benchmark["iterations"]))
+    context = next(iter(contents.values()))["context"]
     return {"machine": machine(context, "peers" in results), **results}
 
 
@@ -135,8 +129,8 @@ def percent(value):
     return f"{100 * value:.2f} %" if value else "0"
 
 
-def span(values, digits):
-    low, high = (f"{value:.{digits}f}" for value in (min(values), max(values)))
+def span(values):
+    low, high = (f"{value:.3f}" for value in (min(values), max(values)))
     return low if low == high else f"{low} to {high}"
 
 
@@ -152,8 +146,8 @@ def machine(context, peers):
     def printed(command):
         return subprocess.run(command, shell=True, capture_output=True, text=True, check=True).stdout.strip()
 
-    with open("/proc/cpuinfo", encoding="utf-8") as file:
-        processor = dict(re.findall(r"^(model name|cpu family|model)\s*: (.*)$", file.read(), re.MULTILINE))
+    cpuinfo = pathlib.Path("/proc/cpuinfo").read_text("utf-8")
+    processor = dict(re.findall(r"^(model name|cpu family|model)\s*: (.*)$", cpuinfo, re.MULTILINE))
     name = "{model name} (family {cpu family}, model {model})".format_map(processor) if "model name" in processor else \
         platform.machine()
     lines = [
@@ -202,33 +196,36 @@ def ratios(runs, is_shown):
     rows = []
     for what, ours, beside, _, goal in comparisons(runs[0]):
         if is_shown(what, goal):
-            rows.append([what, ours, beside, span(spans[what], 3),
+            rows.append([what, ours, beside, span(spans[what]),
                          "" if goal is None else f"{goal:g}: "
                          + verdict([round(ratio, 3) <= goal for ratio in spans[what]])])
     return table(["Measured", "Ours", "Beside", "Ratio", "Goal"], rows)
 
 
 def peers_table(results):
-    cells = cells_of(results, "peers")
+    peers = results["peers"]
     return table(
         ["Grant", "Median", "99th percentile", "At a power cut"],
-        [[name, microseconds(cells[(slug,)]["median_us"]), microseconds(cells[(slug,)]["p99_us"]), promise]
-         for slug, (name, promise) in PEERS.items() if (slug,) in cells])
+        [[name, microseconds(peers[slug]["median_us"]), microseconds(peers[slug]["p99_us"]), promise]
+         for slug, (name, promise) in PEERS.items() if slug in peers])
 
 
 def gate_table(results):
-    cells = cells_of(results, "gate")
+    gate = results["gate"]
+
+    def goal(text, is_met):
+        return f"{text}: " + ("met" if is_met else "missed")
+
     rows = []
-    for ours, other, goal in GATE_GOALS:
-        rate, beside = (cells[tuple(name.split("/"))]["per_second"] for name in (ours, other))
+    for ours, other, least in GATE_GOALS:
+        rate, beside = gate[ours]["per_second"], gate[other]["per_second"]
         rows.append([ours, f"{rate:,.0f}", other, f"{beside:,.0f}", f"{rate / beside:.2f}",
-                     f"{goal:g}: " + ("met" if rate / beside >= goal else "missed")])
-    busy, many = cells[("write-ahead", "64")], cells[("write-ahead", "256")]
-    spread = busy["p99_us"] / busy["median_us"]
-    rows.append(["99th percentile, 64 clients", microseconds(busy["p99_us"]), "median", microseconds(busy["median_us"]),
-                 f"{spread:.2f}", "at most 2.5: " + ("met" if spread <= 2.5 else "missed")])
-    rows.append(["memory, 256 clients", f"{many['memory_MB']:.1f} MB", "", "", "",
-                 "30 MB: " + ("met" if many["memory_MB"] < 30 else "missed")])
+                     goal(f"{least:g}", rate / beside >= least)])
+    p99, median = gate["write-ahead/64"]["p99_us"], gate["write-ahead/64"]["median_us"]
+    rows.append(["99th percentile, 64 clients", microseconds(p99), "median", microseconds(median),
+                 f"{p99 / median:.2f}", goal("at most 2.5", p99 / median <= 2.5)])
+    memory = gate["write-ahead/256"]["memory_MB"]
+    rows.append(["memory, 256 clients", f"{memory:.1f} MB", "", "", "", goal("30 MB", memory < 30)])
     return table(["Grants/s (clients)", "Gate", "Beside", "Grants/s", "Ratio", "Goal"], rows)
 
 
@@ -245,15 +242,12 @@ def growth_table(results):
 
 
 def indexes_table(results):
-    rows = []
-    for (place, kind, tokens), cell in cells_of(results, "growth").items():
-        if kind == "indexes":
-            rows.append([f"{int(tokens):,}, {place}", microseconds(cell["one_us"]), microseconds(cell["three_us"]),
-                         f"{cell['three_us'] / cell['one_us']:.2f}", f"{cell['one_kB']:.0f} kB",
-                         f"{cell['three_kB']:.0f} kB", microseconds(cell["one_delete_us"]),
-                         microseconds(cell["three_delete_us"])])
-    return table(["Tokens", "grant, one index", "three", "ratio", "written, one", "three", "deletion, one", "three"],
-                 rows)
+    return table(
+        ["Tokens", "grant, one index", "three", "ratio", "written, one", "three", "deletion, one", "three"],
+        [[f"{int(tokens):,}, {place}", microseconds(cell["one_us"]), microseconds(cell["three_us"]),
+          f"{cell['three_us'] / cell['one_us']:.2f}", f"{cell['one_kB']:.0f} kB", f"{cell['three_kB']:.0f} kB",
+          microseconds(cell["one_delete_us"]), microseconds(cell["three_delete_us"])]
+         for (place, kind, tokens), cell in cells_of(results, "growth").items() if kind == "indexes"])
 
 
 def contention_table(results):
@@ -334,42 +328,36 @@ def plot_gate(results, path):
 def main():
     if len(sys.argv) < 2:
         sys.exit("usage: report.py DIRECTORY [EARLIER...]")
-    directory = sys.argv[1]
+    directory, *earlier = map(pathlib.Path, sys.argv[1:])
     results = measured(directory)
-    with open(os.path.join(directory, "results.json"), "w", encoding="utf-8") as file:
-        file.write(json.dumps(results).replace("}, ", "},\n") + "\n")  # a line for each benchmark
-    runs = [results]
-    for path in sys.argv[2:]:
-        with open(path, encoding="utf-8") as file:
-            run = json.load(file)
-        if run not in runs:
-            runs.append(run)
+    lines = json.dumps(results).replace("}, ", "},\n") + "\n"  # a line for each benchmark
+    (directory / "results.json").write_text(lines, "utf-8")
+    runs = [results] + [run for path in earlier if (run := json.loads(path.read_text("utf-8"))) != results]
     machines = dict.fromkeys("".join(f"- {line}\n" for line in run["machine"]) for run in runs)
 
     def matters(what, goal):
         return goal is not None or what.endswith(", 10 tokens")
 
     goals = ratios(runs, matters)
-    sections = [
-        ("Goals", "\n".join(machines) + "\n" + goals),
-        ("Other ratios", ratios(runs, lambda what, goal: not matters(what, goal))),
-        ("Where the time of a grant goes",
-         breakdown_table(results, "Grant (µs)", ("open", "purge", "select", "save", "close", "library", "total"), "_us")
-         + "\n"
-         + breakdown_table(results, "System calls", KINDS_OF_CALLS)),
-        ("Growth", growth_table(results)),
-        ("Indexes", indexes_table(results)),
-        ("Contention", contention_table(results)),
-    ]
+    times = ("open", "purge", "select", "save", "close", "library", "total")
+    sections = {
+        "Goals": "\n".join(machines) + "\n" + goals,
+        "Other ratios": ratios(runs, lambda what, goal: not matters(what, goal)),
+        "Where the time of a grant goes": breakdown_table(results, "Grant (µs)", times, "_us") + "\n"
+                                          + breakdown_table(results, "System calls", KINDS_OF_CALLS),
+        "Growth": growth_table(results),
+        "Indexes": indexes_table(results),
+        "Contention": contention_table(results),
+    }
     if "peers" in results:
-        sections.append(("Peers", peers_table(results)))
+        sections["Peers"] = peers_table(results)
     if "gate" in results:
-        sections.append(("The gate", gate_table(results)))
+        sections["The gate"] = gate_table(results)
     for name, plot in (("growth", plot_growth), ("contention", plot_contention), ("gate", plot_gate)):
         if name in results:
-            plot(results, os.path.join(directory, name + ".png"))
-    with open(os.path.join(directory, "report.md"), "w", encoding="utf-8") as file:
-        file.write("\n".join(f"## {title}\n\n{text}" for title, text in sections))
+            plot(results, directory / f"{name}.png")
+    report = "\n".join(f"## {title}\n\n{text}" for title, text in sections.items())
+    (directory / "report.md").write_text(report, "utf-8")
     print(goals)
     print(f"All tables, plots and figures are in {directory}.")
 
