@@ -4,6 +4,7 @@
 #define VEMO_ACCESS_TOKEN_BENCH_PROCESS_H
 
 #include <signal.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <functional>
@@ -20,6 +21,7 @@ public:
     ~Process()
     {
         kill(m_pid, SIGTERM);
+        kill(m_pid, SIGCONT);
         statusOf(m_pid);
     }
     Process(const Process&) = delete;
@@ -31,26 +33,18 @@ private:
     const pid_t m_pid;
 };
 
-// A process that holds a connection to the store in use. A connection of this process would not do: SQLite
-// shares descriptors and locks within a process.
+// A process that holds a connection to the store in use, and is stopped. A connection of this process would
+// not do: SQLite shares descriptors and locks within a process.
 inline std::unique_ptr<Process> startBystander()
 {
-    int rgnEnd[2];
-    char cByte = 0;
-    if (0 != pipe(rgnEnd)) {
-        throw std::runtime_error("no pipe");
-    }
-    auto pBystander = std::make_unique<Process>([&] {
+    auto pBystander = std::make_unique<Process>([] {
         AccessTokenApi api;
-        // SQLite opens the journal with the first statement only.
-        if (0 == api.cleanExpireToken(false) && 1 == write(rgnEnd[1], &cByte, 1)) {
-            pause();
+        if (0 == api.cleanExpireToken(false)) { // SQLite opens the journal with the first statement only
+            raise(SIGSTOP);
         }
     });
-    close(rgnEnd[1]);
-    const bool blConnected = 1 == read(rgnEnd[0], &cByte, 1);
-    close(rgnEnd[0]);
-    if (!blConnected) {
+    int nStatus = 0;
+    if (pBystander->pid() != waitpid(pBystander->pid(), &nStatus, WUNTRACED) || !WIFSTOPPED(nStatus)) {
         throw std::runtime_error("the other process has no connection");
     }
     return pBystander;

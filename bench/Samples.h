@@ -23,13 +23,10 @@ public:
     }
 
     // The value that nPercent of the samples do not exceed. There must be samples.
-    double percentile(int nPercent)
+    double percentile(size_t nPercent)
     {
-        const size_t nRank = m_rgdSample.size() * static_cast<size_t>(nPercent) / 100;
-        const auto it =
-            m_rgdSample.begin() + static_cast<std::ptrdiff_t>(std::min(nRank, m_rgdSample.size() - 1));
-        std::nth_element(m_rgdSample.begin(), it, m_rgdSample.end());
-        return *it;
+        std::sort(m_rgdSample.begin(), m_rgdSample.end());
+        return m_rgdSample[std::min(m_rgdSample.size() * nPercent / 100, m_rgdSample.size() - 1)];
     }
 
     double median() { return percentile(50); }

@@ -13,11 +13,9 @@ namespace {
 
 const char* baseOf(Place place)
 {
-    const char* szBase = getenv(Place::Memory == place ? "VEMO_BENCH_MEMORY" : "VEMO_BENCH_DISK");
-    if (szBase) {
-        return szBase;
-    }
-    return Place::Memory == place ? "/dev/shm" : "/var/tmp";
+    const bool blMemory = Place::Memory == place;
+    const char* szBase = getenv(blMemory ? "VEMO_BENCH_MEMORY" : "VEMO_BENCH_DISK");
+    return szBase ? szBase : blMemory ? "/dev/shm" : "/var/tmp";
 }
 
 std::string randomText(std::mt19937& source, size_t cchText)
@@ -38,7 +36,7 @@ const char* nameOf(Place place)
     return Place::Memory == place ? "memory" : "disk";
 }
 
-Store::Store(Place place) : m_nTokens(0)
+Store::Store(Place place, int nTokens, const std::string& strTuning)
 {
     std::string strTemplate = std::string(baseOf(place)) + "/vemo-bench-XXXXXX";
     if (!mkdtemp(strTemplate.data())) {
@@ -46,7 +44,13 @@ Store::Store(Place place) : m_nTokens(0)
     }
     m_strDirectory = strTemplate;
     use();
-    const AccessTokenApi creator;
+    AccessTokenApi(); // makes the database
+    BareEngine engine;
+    engine.run("PRAGMA cache_size = -2000000; BEGIN;");
+    for (int nToken = 0; nToken < nTokens; ++nToken) {
+        engine.create(tokenOf(nToken));
+    }
+    engine.run(("COMMIT;" + strTuning).c_str());
 }
 
 Store::~Store()
@@ -58,36 +62,6 @@ Store::~Store()
 void Store::use() const
 {
     setenv("VEMO_REDIRECT_DIR", m_strDirectory.c_str(), 1);
-}
-
-void Store::grow(int nTokens)
-{
-    use();
-    BareEngine engine;
-    engine.run("PRAGMA cache_size = -2000000; BEGIN;");
-    for (; m_nTokens < nTokens; ++m_nTokens) {
-        engine.create(tokenOf(m_nTokens));
-    }
-    engine.run("COMMIT;");
-}
-
-void Store::makeIndexes()
-{
-    makeDeadlineIndex();
-    BareEngine().run("CREATE INDEX token_bind_sid ON token (bind_sid);"
-                     "CREATE INDEX token_function ON token (function);");
-}
-
-void Store::makeDeadlineIndex()
-{
-    use();
-    BareEngine().run("CREATE INDEX token_deadline ON token (deadline);");
-}
-
-void Store::useWriteAheadLog()
-{
-    use();
-    BareEngine().run("PRAGMA journal_mode = WAL;");
 }
 
 BareToken tokenOf(int nNumber)

@@ -18,8 +18,8 @@ const char* nameOf(Place place);
 // Removed with the object.
 class Store {
 public:
-    // Makes the store and uses it.
-    explicit Store(Place place);
+    // Makes a store with the tokens 0 to nTokens - 1, runs the statements of a tuning, and uses the store.
+    Store(Place place, int nTokens, const std::string& strTuning = "");
     ~Store();
     Store(const Store&) = delete;
     Store& operator=(const Store&) = delete;
@@ -27,25 +27,20 @@ public:
     // Lets the library and the bare engine open this store from now on.
     void use() const;
 
-    // Adds tokens until there are nTokens.
-    void grow(int nTokens);
-
-    // An administrator's tuning from outside: the same as "tune" or "tune --wal", and as "tune
-    // --deadline-only".
-    void makeIndexes();
-    void makeDeadlineIndex();
-    void useWriteAheadLog();
-
     const std::string& directory() const { return m_strDirectory; }
 
 private:
     std::string m_strDirectory;
-    int m_nTokens;
 };
 
-// The token of that number; its id and texts depend on the number alone. A store of n tokens holds those of 0
-// to n - 1. Each has many uses left and allows two methods of one API. The first tokens expire after a day,
-// then ten in each second.
+// An administrator's tuning from outside: the same as "tune --deadline-only", "tune" and "tune --wal".
+const std::string DEADLINE_INDEX = "CREATE INDEX token_deadline ON token (deadline);";
+const std::string INDEXES = DEADLINE_INDEX + "CREATE INDEX token_bind_sid ON token (bind_sid);"
+                                             "CREATE INDEX token_function ON token (function);";
+const std::string WRITE_AHEAD = "PRAGMA journal_mode = WAL;";
+
+// The token of that number; its id and texts depend on the number alone. Each has many uses left and allows
+// two methods of one API. The first tokens expire after a day, then ten in each second.
 BareToken tokenOf(int nNumber);
 
 // Its fields as texts, by their names.

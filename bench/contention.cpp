@@ -48,16 +48,12 @@ void report(benchmark::State& state, const std::vector<GrantCall>& calls, long l
     state.counters["beyond_count"] = (dSpent - static_cast<double>(nLowered)) / dSpent;
 }
 
-void contention(benchmark::State& state, bool blWriteAheadLog, Calls calls, int nProcesses)
+void contention(benchmark::State& state, const std::string& strTuning, Calls calls, int nProcesses)
 {
-    Store store(Place::Disk);
-    store.grow(TOKENS);
+    const Store store(Place::Disk, TOKENS, strTuning);
     BareToken token = tokenOf(0);
     token.nCount = USES;
     BareEngine().save(token);
-    if (blWriteAheadLog) {
-        store.useWriteAheadLog();
-    }
     for (auto _ : state) {
         const std::vector<GrantCall> made = grantAtOnce(nProcesses, 1, SECONDS, calls);
         report(state, made, USES - BareEngine().read(token.strTid).nCount);
@@ -68,12 +64,12 @@ void contention(benchmark::State& state, bool blWriteAheadLog, Calls calls, int 
 
 void registerBenchmarks()
 {
-    for (const bool blWriteAheadLog : {false, true}) {
+    for (const std::string& strTuning : {std::string(), WRITE_AHEAD}) {
         for (const Calls calls : {Calls::Plain, Calls::Serialised}) {
             for (int nProcesses = 1; nProcesses <= 64; nProcesses *= 2) {
-                add(std::string("Contention/") + (blWriteAheadLog ? "wal/" : "rollback/") +
+                add(std::string("Contention/") + (strTuning.empty() ? "rollback/" : "wal/") +
                         (Calls::Plain == calls ? "plain/" : "serialised/") + std::to_string(nProcesses),
-                    1, contention, blWriteAheadLog, calls, nProcesses);
+                    1, contention, strTuning, calls, nProcesses);
             }
         }
     }

@@ -9,7 +9,6 @@
 //   ratio, bare_ratio   of the two medians: the library's, and the bare engine's
 
 #include <algorithm>
-#include <memory>
 #include <stdexcept>
 #include <string>
 
@@ -44,16 +43,6 @@ void grantBare(int nToken, Samples& samples)
     });
 }
 
-std::unique_ptr<Store> makeStore(Place place, bool blIndexes, int nTokens)
-{
-    auto pStore = std::make_unique<Store>(place);
-    pStore->grow(nTokens);
-    if (blIndexes) {
-        pStore->makeIndexes();
-    }
-    return pStore;
-}
-
 // Each is first in every other turn. Each time another token: the pages of one would stay in the caches.
 void grantByBoth(const Store& store, int nTokens, int nTurn, Samples& ours, Samples& bare)
 {
@@ -71,18 +60,18 @@ void grantByBoth(const Store& store, int nTokens, int nTurn, Samples& ours, Samp
     }
 }
 
-void growth(benchmark::State& state, Place place, bool blIndexes, int nTokens)
+void growth(benchmark::State& state, Place place, const std::string& strTuning, int nTokens)
 {
-    const auto pMany = makeStore(place, blIndexes, nTokens);
-    const auto pFew = makeStore(place, blIndexes, FEW);
+    const Store storeOfMany(place, nTokens, strTuning);
+    const Store storeOfFew(place, FEW, strTuning);
     Samples many;
     Samples few;
     Samples bareMany;
     Samples bareFew;
     int nTurn = 0;
     for (auto _ : state) {
-        grantByBoth(*pMany, nTokens, nTurn, many, bareMany);
-        grantByBoth(*pFew, FEW, nTurn, few, bareFew);
+        grantByBoth(storeOfMany, nTokens, nTurn, many, bareMany);
+        grantByBoth(storeOfFew, FEW, nTurn, few, bareFew);
         ++nTurn;
     }
     state.counters["median_us"] = many.median();
@@ -94,9 +83,8 @@ void growth(benchmark::State& state, Place place, bool blIndexes, int nTokens)
 // Grants and deletions with the index on the deadline alone, compared with those with all three.
 void indexes(benchmark::State& state, Place place, int nTokens)
 {
-    const auto pOne = makeStore(place, false, nTokens);
-    pOne->makeDeadlineIndex();
-    const auto pThree = makeStore(place, true, nTokens);
+    const Store one(place, nTokens, DEADLINE_INDEX);
+    const Store three(place, nTokens, INDEXES);
     Samples grants[2];
     Samples deletions[2];
     Samples written[2];
@@ -104,8 +92,7 @@ void indexes(benchmark::State& state, Place place, int nTokens)
     int nCall = 0;
     for (auto _ : state) {
         for (const bool blThree : {false, true}) {
-            const Store& store = blThree ? *pThree : *pOne;
-            store.use();
+            (blThree ? three : one).use();
             deletions[blThree].time(
                 [] { return VemoAccessTokenDeleteByBindSid("a session without tokens"); });
             grant(nCall * 7919 % nTokens, firsts);
@@ -136,7 +123,7 @@ void registerBenchmarks()
             for (const int nTokens : {10, 100, 1000, 10000, 100000, 1000000}) {
                 const int nCalls = blIndexes || nTokens <= 10000 ? 300 : 3000000 / nTokens;
                 add(strName + (blIndexes ? "/indexed/" : "/plain/") + std::to_string(nTokens),
-                    std::max(nCalls, 15), growth, place, blIndexes, nTokens);
+                    std::max(nCalls, 15), growth, place, blIndexes ? INDEXES : "", nTokens);
             }
         }
     }

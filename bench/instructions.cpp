@@ -105,8 +105,7 @@ int count(const Operation& operation, Call& call)
 bool measure(const Operation& operation)
 {
     for (const bool blCounted : {false, true}) {
-        Store store(Place::Memory);
-        store.grow(TOKENS);
+        const Store store(Place::Memory, TOKENS);
         Call call;
         operation.prepare(call);
         const int nResult = blCounted ? count(operation, call) : operation.run(call);

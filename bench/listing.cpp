@@ -73,8 +73,7 @@ void timeList(Samples& samples, List list)
 
 void listingTime(benchmark::State& state)
 {
-    Store store(Place::Memory);
-    store.grow(TOKENS);
+    const Store store(Place::Memory, TOKENS);
     AccessTokenApi api;
     BareEngine engine;
     Samples ours;
@@ -90,8 +89,7 @@ void listingTime(benchmark::State& state)
 
 void listingMemory(benchmark::State& state)
 {
-    Store store(Place::Memory);
-    store.grow(TOKENS);
+    const Store store(Place::Memory, TOKENS);
     for (auto _ : state) {
         auto pApi = std::make_unique<AccessTokenApi>();
         malloc_trim(0);

@@ -26,8 +26,7 @@ const int MANY = 100000; // with these a call takes long, so fewer calls are mad
 void useStore(Place place, int nTokens)
 {
     static std::map<std::pair<Place, int>, Store> stores;
-    const auto it = stores.try_emplace({place, nTokens}, place).first;
-    it->second.grow(nTokens);
+    stores.try_emplace({place, nTokens}, place, nTokens).first->second.use();
 }
 
 double runOurs(const Operation& operation, Call& call, Samples& samples)

@@ -28,19 +28,7 @@ const double SECONDS = 2;
 
 const char* const g_szRedis = getenv("VEMO_BENCH_REDIS_ALWAYS");
 
-enum class Journal { Rollback, WriteAhead };
-
-class DiskStore : public Store {
-public:
-    DiskStore(Journal journal, int nTokens) : Store(Place::Disk)
-    {
-        grow(nTokens);
-        BareEngine().run("UPDATE token SET uid = 0"); // an owner who exists on each machine
-        if (Journal::WriteAhead == journal) {
-            useWriteAheadLog();
-        }
-    }
-};
+const std::string OWNED = "UPDATE token SET uid = 0;"; // by a user who exists on each machine
 
 // Requests with the tokens 0 to nTokens - 1.
 Load httpLoad(const std::string& strSocket, int nTokens, const std::string& strTarget, const char* szReplyEnd)
@@ -121,9 +109,9 @@ void requireSpent(long long nReplies, long long nSpent)
     }
 }
 
-void gate(benchmark::State& state, Journal journal, int nTokens, int nUsed, size_t nClients)
+void gate(benchmark::State& state, const std::string& strTuning, int nTokens, int nUsed, size_t nClients)
 {
-    const DiskStore store(journal, nTokens);
+    const Store store(Place::Disk, nTokens, OWNED + strTuning);
     const Gate gate(store);
     const long long nBefore = usesLeft();
     const long long nReplies = ask(state, gate.load(nUsed), nClients);
@@ -133,7 +121,7 @@ void gate(benchmark::State& state, Journal journal, int nTokens, int nUsed, size
 
 void behindNginx(benchmark::State& state, bool blGate)
 {
-    const DiskStore store(Journal::WriteAhead, TOKENS);
+    const Store store(Place::Disk, TOKENS, OWNED + WRITE_AHEAD);
     const Gate gate(store);
     std::ofstream(store.directory() + "/page") << "a page\n";
     const Process nginx([&] {
@@ -165,9 +153,9 @@ void redis(benchmark::State& state, int nUsed, size_t nClients)
 }
 
 // Programs that call the library; with blGate, while a gate has the store open.
-void callers(benchmark::State& state, Journal journal, int nProcesses, Calls calls, bool blGate)
+void callers(benchmark::State& state, const std::string& strTuning, int nProcesses, Calls calls, bool blGate)
 {
-    const DiskStore store(journal, TOKENS);
+    const Store store(Place::Disk, TOKENS, OWNED + strTuning);
     std::optional<Gate> gate;
     if (blGate) {
         gate.emplace(store);
@@ -186,17 +174,17 @@ void registerBenchmarks()
     }
     for (const size_t nClients : {1, 8, 64, 256}) {
         const std::string strClients = "/" + std::to_string(nClients);
-        add("Gate/write-ahead" + strClients, 1, gate, Journal::WriteAhead, TOKENS, TOKENS, nClients);
-        add("Gate/rollback" + strClients, 1, gate, Journal::Rollback, TOKENS, TOKENS, nClients);
+        add("Gate/write-ahead" + strClients, 1, gate, WRITE_AHEAD, TOKENS, TOKENS, nClients);
+        add("Gate/rollback" + strClients, 1, gate, "", TOKENS, TOKENS, nClients);
         add("Gate/redis" + strClients, 1, redis, TOKENS, nClients);
     }
-    add("Gate/one-token/64", 1, gate, Journal::WriteAhead, TOKENS, 1, CLIENTS);
+    add("Gate/one-token/64", 1, gate, WRITE_AHEAD, TOKENS, 1, CLIENTS);
     add("Gate/redis-one-token/64", 1, redis, 1, CLIENTS);
-    add("Gate/many-tokens/64", 1, gate, Journal::WriteAhead, MANY_TOKENS, TOKENS, CLIENTS);
+    add("Gate/many-tokens/64", 1, gate, WRITE_AHEAD, MANY_TOKENS, TOKENS, CLIENTS);
     add("Gate/nginx-at-once/64", 1, behindNginx, false);
     add("Gate/nginx/64", 1, behindNginx, true);
-    add("Gate/calls/64", 1, callers, Journal::Rollback, 64, Calls::Plain, false);
-    add("Gate/calls-locked/64", 1, callers, Journal::Rollback, 64, Calls::Serialised, false);
-    add("Gate/call/1", 1, callers, Journal::WriteAhead, 1, Calls::Plain, false);
-    add("Gate/call-beside/1", 1, callers, Journal::WriteAhead, 1, Calls::Plain, true);
+    add("Gate/calls/64", 1, callers, "", 64, Calls::Plain, false);
+    add("Gate/calls-locked/64", 1, callers, "", 64, Calls::Serialised, false);
+    add("Gate/call/1", 1, callers, WRITE_AHEAD, 1, Calls::Plain, false);
+    add("Gate/call-beside/1", 1, callers, WRITE_AHEAD, 1, Calls::Plain, true);
 }

@@ -30,11 +30,13 @@ const char* const g_szRedisAlways = getenv("VEMO_BENCH_REDIS_ALWAYS");
 const char* const g_szRedisEverysec = getenv("VEMO_BENCH_REDIS_EVERYSEC");
 const char* const g_szPostgresql = getenv("VEMO_BENCH_POSTGRESQL");
 
-// Tuned: with the write-ahead journal and the indexes that an administrator can make.
-enum class Tuning { Plain, Tuned };
+// What an administrator can do.
+const std::string TUNED = INDEXES + WRITE_AHEAD;
 
 struct Ours {
-    Store store{Place::Disk};
+    explicit Ours(const std::string& strTuning) : store(Place::Disk, TOKENS, strTuning) {}
+
+    const Store store;
     std::unique_ptr<Process> pBystander;
     std::optional<AccessTokenApi> held;
 
@@ -50,14 +52,9 @@ struct Ours {
     }
 };
 
-Contender makeOurs(Tuning tuning, Connection connection)
+Contender makeOurs(const std::string& strTuning, Connection connection)
 {
-    const auto pOurs = std::make_shared<Ours>();
-    pOurs->store.grow(TOKENS);
-    if (Tuning::Tuned == tuning) {
-        pOurs->store.makeIndexes();
-        pOurs->store.useWriteAheadLog();
-    }
+    const auto pOurs = std::make_shared<Ours>(strTuning);
     if (Connection::PerCallBesideAnother == connection) {
         pOurs->pBystander = startBystander();
     } else if (Connection::Held == connection) {
@@ -96,12 +93,11 @@ struct Entry {
 };
 
 const Entry g_rgEntry[] = {
-    {"ours-plain-per-call", [] { return makeOurs(Tuning::Plain, Connection::PerCall); }},
-    {"ours-plain-held", [] { return makeOurs(Tuning::Plain, Connection::Held); }},
-    {"ours-tuned-per-call", [] { return makeOurs(Tuning::Tuned, Connection::PerCall); }},
-    {"ours-tuned-per-call-beside-another",
-     [] { return makeOurs(Tuning::Tuned, Connection::PerCallBesideAnother); }},
-    {"ours-tuned-held", [] { return makeOurs(Tuning::Tuned, Connection::Held); }},
+    {"ours-plain-per-call", [] { return makeOurs("", Connection::PerCall); }},
+    {"ours-plain-held", [] { return makeOurs("", Connection::Held); }},
+    {"ours-tuned-per-call", [] { return makeOurs(TUNED, Connection::PerCall); }},
+    {"ours-tuned-per-call-beside-another", [] { return makeOurs(TUNED, Connection::PerCallBesideAnother); }},
+    {"ours-tuned-held", [] { return makeOurs(TUNED, Connection::Held); }},
     {"redis-always-per-call", [] { return makeRedis(g_szRedisAlways, Connection::PerCall); }},
     {"redis-always-held", [] { return makeRedis(g_szRedisAlways, Connection::Held); }},
     {"redis-everysec-per-call", [] { return makeRedis(g_szRedisEverysec, Connection::PerCall); }},
