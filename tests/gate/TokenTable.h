@@ -16,9 +16,8 @@ protected:
         EXPECT_EQ(SQLITE_OK, sqlite3_open(":memory:", &m_pDb));
         // SQLite's reserved memory does not count towards the limit of memory.
         sqlite3_db_config(m_pDb, SQLITE_DBCONFIG_LOOKASIDE, nullptr, 0, 0);
-        run("CREATE TABLE token (tid, bind_sid, uid INTEGER, deadline INTEGER, count INTEGER, create_time "
-            "INTEGER, "
-            "function, webapi_allow, extra)");
+        run("CREATE TABLE token (tid, bind_sid, uid INTEGER, deadline INTEGER, count INTEGER, "
+            "create_time INTEGER, function, webapi_allow, extra)");
     }
 
     // Closing fails while a statement exists.
