@@ -24,6 +24,13 @@ const size_t CALLS_MAX = 200000; // of one process: many more than it has time f
 // How often this process has written a token. A grant that increases it has spent a use.
 long long g_nWritten = 0;
 
+struct GrantCall {
+    double dStart; // seconds on the clock that all processes share
+    double dEnd;
+    bool blGranted;
+    bool blSpent;
+};
+
 double now()
 {
     return std::chrono::duration<double>(std::chrono::steady_clock::now().time_since_epoch()).count();
@@ -58,10 +65,10 @@ extern "C" INTERPOSED int sqlite3_exec(sqlite3* pDb, const char* szSql,
     return nResult;
 }
 
-std::vector<GrantCall> grantAtOnce(int nProcesses, int nTokens, double dSeconds, Calls calls)
+CallsMade grantAtOnce(int nProcesses, int nTokens, double dSeconds, Calls calls)
 {
     const auto nSize = static_cast<size_t>(nProcesses);
-    SharedArray<GrantCall> made(nSize * CALLS_MAX);
+    SharedArray<GrantCall> all(nSize * CALLS_MAX);
     SharedArray<size_t> numbers(nSize);
     const int nBad = runProcesses(nProcesses, [&](int nProcess) {
         const auto nFirst = static_cast<size_t>(nProcess);
@@ -73,29 +80,32 @@ std::vector<GrantCall> grantAtOnce(int nProcesses, int nTokens, double dSeconds,
             if (CALLS_MAX == numbers[nFirst]) {
                 throw std::logic_error("too many calls");
             }
-            made[nFirst * CALLS_MAX + numbers[nFirst]++] = timedGrant(nToken, calls);
+            all[nFirst * CALLS_MAX + numbers[nFirst]++] = timedGrant(nToken, calls);
         }
     });
     if (0 != nBad) {
         throw std::runtime_error("a process failed");
     }
-    std::vector<GrantCall> all;
-    for (size_t nProcess = 0; nProcess < nSize; ++nProcess) {
-        const GrantCall* const pFirst = &made[nProcess * CALLS_MAX];
-        all.insert(all.end(), pFirst, pFirst + numbers[nProcess]);
-    }
-    return all;
-}
-
-double grantsPerSecond(const std::vector<GrantCall>& calls)
-{
-    double dStart = calls.front().dStart;
-    double dEnd = dStart;
+    CallsMade made;
     double dGranted = 0;
-    for (const GrantCall& call : calls) {
-        dStart = std::min(dStart, call.dStart);
-        dEnd = std::max(dEnd, call.dEnd);
-        dGranted += call.blGranted;
+    double dStart = now();
+    double dEnd = 0;
+    for (size_t nProcess = 0; nProcess < nSize; ++nProcess) {
+        for (size_t nCall = 0; nCall < numbers[nProcess]; ++nCall) {
+            const GrantCall& call = all[nProcess * CALLS_MAX + nCall];
+            if (call.blGranted && !call.blSpent) {
+                throw std::runtime_error("a grant spent no use");
+            }
+            dStart = std::min(dStart, call.dStart);
+            dEnd = std::max(dEnd, call.dEnd);
+            dGranted += call.blGranted;
+            made.took.add((call.dEnd - call.dStart) * 1e6);
+            ++made.dAll;
+            made.dSpent += call.blSpent;
+            made.dFailed += !call.blGranted && !call.blSpent;
+            made.dFalse += !call.blGranted && call.blSpent;
+        }
     }
-    return dGranted / (dEnd - dStart);
+    made.dGrantsPerSecond = dGranted / (dEnd - dStart);
+    return made;
 }

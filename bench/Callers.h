@@ -3,22 +3,21 @@
 #ifndef VEMO_ACCESS_TOKEN_BENCH_CALLERS_H
 #define VEMO_ACCESS_TOKEN_BENCH_CALLERS_H
 
-#include <vector>
-
-struct GrantCall {
-    double dStart; // seconds on the clock that all processes share
-    double dEnd;
-    bool blGranted;
-    bool blSpent; // whether it spent a use, whatever it returned
-};
+#include "Samples.h"
 
 enum class Calls { Plain, Serialised };
 
-// nProcesses processes grant the first nTokens tokens of the store in use, as fast as they can. Returns all
-// their calls. Serialised calls wait for the call lock, and their time includes that.
-std::vector<GrantCall> grantAtOnce(int nProcesses, int nTokens, double dSeconds, Calls calls);
+struct CallsMade {
+    Samples took;                // µs
+    double dGrantsPerSecond = 0; // from the start of the first call to the end of the last
+    double dAll = 0;
+    double dSpent = 0;  // those that spent a use, whatever they returned
+    double dFailed = 0; // those that returned -1 and had no effect
+    double dFalse = 0;  // those that returned -1 although the use was spent
+};
 
-// Granted calls a second, from the start of the first call to the end of the last.
-double grantsPerSecond(const std::vector<GrantCall>& calls);
+// nProcesses processes grant the first nTokens tokens of the store in use, as fast as they can. Serialised
+// calls wait for the call lock, and their time includes that.
+CallsMade grantAtOnce(int nProcesses, int nTokens, double dSeconds, Calls calls);
 
 #endif

@@ -134,19 +134,9 @@ const std::vector<Operation>& operations()
         {"tokenGrant.saved", holdConnection,
          [](Call& call) { return call.pApi->tokenGrant(call.token.strTid, WEBAPI, METHOD, call.jResult); }, 0,
          nullptr},
+        {"Control", useStoredToken, nullptr, 0, bareGrant},
     };
     return rgOperation;
-}
-
-const Operation& control()
-{
-    static const Operation operation = {"Control", useStoredToken,
-                                        [](Call& call) {
-                                            bareGrant(call);
-                                            return 0;
-                                        },
-                                        0, bareGrant};
-    return operation;
 }
 
 void removeFreshTokens()

@@ -25,15 +25,12 @@ struct Call {
 struct Operation {
     const char* szName;
     void (*prepare)(Call&); // makes what the operation needs; not measured
-    int (*run)(Call&);
+    int (*run)(Call&);      // null for the control, which runs the bare engine twice
     int nExpected;          // what run returns
     void (*runBare)(Call&); // the calls of SQLite that run must make; null if none, or if pApi is used
 };
 
 const std::vector<Operation>& operations();
-
-// Runs the bare engine instead of the library.
-const Operation& control();
 
 // Deletes the tokens that operations and their preparation leave behind.
 void removeFreshTokens();

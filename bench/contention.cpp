@@ -10,12 +10,10 @@
 //   beyond_count        share of the spent uses that did not lower the stored count: overlapping calls
 //                       had read the same count, or wrote back an older one
 
-#include <stdexcept>
 #include <string>
 
 #include "Callers.h"
 #include "Run.h"
-#include "Samples.h"
 #include "Store.h"
 
 namespace {
@@ -24,30 +22,6 @@ const int TOKENS = 1000;
 const long long USES = 100000000;
 const double SECONDS = 3;
 
-void report(benchmark::State& state, const std::vector<GrantCall>& calls, long long nLowered)
-{
-    Samples times;
-    double dSpent = 0;
-    double dFailed = 0;
-    double dFalse = 0;
-    for (const GrantCall& call : calls) {
-        if (call.blGranted && !call.blSpent) {
-            throw std::runtime_error("a grant spent no use");
-        }
-        times.add((call.dEnd - call.dStart) * 1e6);
-        dSpent += call.blSpent;
-        dFailed += !call.blGranted && !call.blSpent;
-        dFalse += !call.blGranted && call.blSpent;
-    }
-    const double dCalls = static_cast<double>(calls.size());
-    state.counters["grants_per_second"] = grantsPerSecond(calls);
-    state.counters["median_us"] = times.median();
-    state.counters["p99_us"] = times.percentile(99);
-    state.counters["failed"] = dFailed / dCalls;
-    state.counters["false_failures"] = dFalse / dCalls;
-    state.counters["beyond_count"] = (dSpent - static_cast<double>(nLowered)) / dSpent;
-}
-
 void contention(benchmark::State& state, const std::string& strTuning, Calls calls, int nProcesses)
 {
     const Store store(Place::Disk, TOKENS, strTuning);
@@ -55,8 +29,14 @@ void contention(benchmark::State& state, const std::string& strTuning, Calls cal
     token.nCount = USES;
     BareEngine().save(token);
     for (auto _ : state) {
-        const std::vector<GrantCall> made = grantAtOnce(nProcesses, 1, SECONDS, calls);
-        report(state, made, USES - BareEngine().read(token.strTid).nCount);
+        CallsMade made = grantAtOnce(nProcesses, 1, SECONDS, calls);
+        const auto dLowered = static_cast<double>(USES - BareEngine().read(token.strTid).nCount);
+        state.counters["grants_per_second"] = made.dGrantsPerSecond;
+        state.counters["median_us"] = made.took.median();
+        state.counters["p99_us"] = made.took.percentile(99);
+        state.counters["failed"] = made.dFailed / made.dAll;
+        state.counters["false_failures"] = made.dFalse / made.dAll;
+        state.counters["beyond_count"] = (made.dSpent - dLowered) / made.dSpent;
     }
 }
 

@@ -143,7 +143,7 @@ int main(int argc, char** argv)
         return 0;
     }
     for (const Operation& operation : operations()) {
-        if (!measure(operation)) {
+        if (operation.run && !measure(operation)) {
             return 1;
         }
     }

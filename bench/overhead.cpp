@@ -29,8 +29,17 @@ void useStore(Place place, int nTokens)
     stores.try_emplace({place, nTokens}, place, nTokens).first->second.use();
 }
 
+double runBare(const Operation& operation, Call& call, Samples& samples)
+{
+    operation.prepare(call);
+    return samples.time([&] { operation.runBare(call); });
+}
+
 double runOurs(const Operation& operation, Call& call, Samples& samples)
 {
+    if (!operation.run) {
+        return runBare(operation, call, samples);
+    }
     operation.prepare(call);
     int nResult = 0;
     const double dTime = samples.time([&] { nResult = operation.run(call); });
@@ -38,12 +47,6 @@ double runOurs(const Operation& operation, Call& call, Samples& samples)
         throw std::runtime_error("the library failed");
     }
     return dTime;
-}
-
-double runBare(const Operation& operation, Call& call, Samples& samples)
-{
-    operation.prepare(call);
-    return samples.time([&] { operation.runBare(call); });
 }
 
 void overhead(benchmark::State& state, const Operation& operation, Place place, int nTokens)
@@ -79,11 +82,9 @@ int turnsOf(Place place, int nTokens)
 
 void registerBenchmarks()
 {
-    std::vector<Operation> rgOperation = operations();
-    rgOperation.push_back(control());
     for (const Place place : {Place::Memory, Place::Disk}) {
         for (const int nTokens : {FEW, 1000, MANY}) {
-            for (const Operation& operation : rgOperation) {
+            for (const Operation& operation : operations()) {
                 if (operation.runBare) {
                     add(std::string("Overhead/") + operation.szName + "/" + nameOf(place) + "/" +
                             std::to_string(nTokens),

@@ -161,7 +161,7 @@ void callers(benchmark::State& state, const std::string& strTuning, int nProcess
         gate.emplace(store);
     }
     for (auto _ : state) {
-        state.counters["per_second"] = grantsPerSecond(grantAtOnce(nProcesses, TOKENS, SECONDS, calls));
+        state.counters["per_second"] = grantAtOnce(nProcesses, TOKENS, SECONDS, calls).dGrantsPerSecond;
     }
 }
 
