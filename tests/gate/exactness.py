@@ -74,7 +74,7 @@ class Exactness(scene.Scene):
 
     def test_grants_are_the_uses_spent_beside_the_tool(self):
         self.ids.append(self.token(100))
-        before = self.left()
+        before = self.uses()
         by_tool = collections.Counter()
         with self.clients():
             for number in range(30):
@@ -82,23 +82,23 @@ class Exactness(scene.Scene):
                 for path in ("/health", "/metrics"):
                     self.assertEqual(self.answer("status", path=path)[0], 200, "nothing is in the way of a look")
             self.assertTrue(scene.is_within(10, lambda: self.answers[403]), "the third token has few uses")
-        self.assertEqual(before - self.left(), self.answers[200] + by_tool[200, False] + by_tool[200, True])
+        self.assertEqual(before - self.uses(), self.answers[200] + by_tool[200, False] + by_tool[200, True])
         self.assertEqual(by_tool[200, False], 20, "nothing is in the way of the tool")
         self.expect_answers(200, 403)
         print(f"\nfigure: gate beside the tool: {self.answers[200]} and {by_tool[200, False] + by_tool[200, True]} "
               "grants, all of them exact")
 
     def test_calls_are_answered_while_another_program_holds_the_lock(self):
-        before = self.left()
+        before = self.uses()
         with open(self.at("session.lock"), "a") as lock:
             fcntl.flock(lock, fcntl.LOCK_EX)
             self.assertEqual(self.answer("calls", path=PATH, id=self.ids[0])[0], 503)
-            self.assertEqual(self.left(), before)
+            self.assertEqual(self.uses(), before)
         time.sleep(0.02)
         # The gate got the lock after the caller had its answer, and must have released it.
         self.assertTrue(scene.is_within(0.5, self.is_lock_free))
         self.assertEqual(self.answer("calls", path=PATH, id=self.ids[0])[0], 200)
-        self.assertEqual(self.left(), before - 1)
+        self.assertEqual(self.uses(), before - 1)
 
     def is_lock_free(self):
         with open(self.at("session.lock"), "a") as lock, contextlib.suppress(BlockingIOError):
@@ -106,13 +106,13 @@ class Exactness(scene.Scene):
             return True
 
     def test_nobody_is_turned_away_while_another_gate_takes_over(self):
-        before = self.left()
+        before = self.uses()
         with self.clients(connect_each_time=True):
             for _ in range(5):
                 last = self.gate
                 self.start_gate()
                 self.assertEqual(self.end(last), 0)
-        self.assertEqual(before - self.left(), self.answers[200])
+        self.assertEqual(before - self.uses(), self.answers[200])
         self.expect_answers(200)
 
     def test_nothing_answered_is_lost_when_the_one_that_holds_the_tokens_is_killed(self):
@@ -131,12 +131,12 @@ class Exactness(scene.Scene):
         moments = random.Random(os.environ.get("VEMO_TEST_SEED", "1"))
         made = 0
         for _ in range(kills):
-            before, unanswered = self.left() + self.answers[200], self.answers[UNANSWERED]
+            before, unanswered = self.uses() + self.answers[200], self.answers[UNANSWERED]
             with self.clients():
                 time.sleep(moments.uniform(0, 0.1))
                 os.kill(victim(), signal.SIGKILL)
                 self.assertNotEqual(self.gate.wait(10), 0)
-            extra = before - self.left() - self.answers[200]
+            extra = before - self.uses() - self.answers[200]
             self.assertGreaterEqual(extra, 0, "a use was answered and not spent")
             self.assertLessEqual(extra, self.answers[UNANSWERED] - unanswered)
             made += extra

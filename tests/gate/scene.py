@@ -143,16 +143,10 @@ class Scene(unittest.TestCase):
             yield database
 
     @classmethod
-    def uses(cls, id):
-        """The uses that are left of a token."""
+    def uses(cls, id="*"):
+        """The uses that are left of a token, or of all."""
         with cls.database() as database:
-            return database.execute("SELECT count FROM token WHERE tid = ?", (id,)).fetchone()[0]
-
-    @classmethod
-    def left(cls):
-        """The uses that are left of all tokens."""
-        with cls.database() as database:
-            return database.execute("SELECT coalesce(sum(count), 0) FROM token").fetchone()[0]
+            return database.execute("SELECT coalesce(sum(count), 0) FROM token WHERE tid GLOB ?", (id,)).fetchone()[0]
 
     @classmethod
     def answer(cls, name, method="GET", path="/", id=None, headers=None, body=None, tls=None):
