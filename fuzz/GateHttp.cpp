@@ -16,20 +16,12 @@ struct Read {
     size_t cbHead = 0;
 };
 
-Read readAtOnce(std::string_view strBytes)
+// The first bytes arrive at once, and the others one by one.
+Read readFrom(size_t cbFirst, std::string_view strBytes)
 {
     Read read;
     size_t cbSeen = 0;
-    read.reading = gate::readHead(strBytes, cbSeen, read.head, read.cbHead);
-    return read;
-}
-
-// The same, but the bytes arrive one by one.
-Read readSlowly(std::string_view strBytes)
-{
-    Read read;
-    size_t cbSeen = 0;
-    for (size_t cb = 0; cb <= strBytes.size() && Reading::Incomplete == read.reading; ++cb) {
+    for (size_t cb = cbFirst; cb <= strBytes.size() && Reading::Incomplete == read.reading; ++cb) {
         read.reading = gate::readHead(strBytes.substr(0, cb), cbSeen, read.head, read.cbHead);
     }
     return read;
@@ -45,6 +37,11 @@ std::string plain(const Head& head)
         strPlain.append(header.strName).append(":").append(header.strValue).append("\r\n");
     }
     return strPlain + "\r\n";
+}
+
+Read readAtOnce(std::string_view strBytes)
+{
+    return readFrom(strBytes.size(), strBytes);
 }
 
 void requireSame(const Read& one, const Read& other)
@@ -114,7 +111,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pBytes, size_t cbBytes)
 {
     const std::string_view strBytes(reinterpret_cast<const char*>(pBytes), cbBytes);
     const Read read = readAtOnce(strBytes);
-    const Read slowly = readSlowly(strBytes);
+    const Read slowly = readFrom(0, strBytes);
     requireSame(read, slowly);
     if (Reading::Whole != read.reading) {
         return 0;
