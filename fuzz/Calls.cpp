@@ -80,7 +80,7 @@ private:
     const TokenStore& m_files = emptyStore();
     Library m_library;
     Model m_model;
-    const fuzz::Database m_pDb = fuzz::open(m_files); // a second connection
+    const Database m_pDb = m_files.open(); // a second connection
 };
 
 // A value that is written and read again is equal.

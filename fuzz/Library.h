@@ -5,11 +5,9 @@
 #define FUZZ_LIBRARY_H
 
 #include <json/value.h>
-#include <sqlite3.h>
 
 #include <cstddef>
 #include <cstdint>
-#include <memory>
 #include <string>
 #include <string_view>
 
@@ -46,16 +44,6 @@ inline Json::Value json(std::string_view strText)
 inline std::string text(const Json::Value& jValue)
 {
     return VEMO_ACCESS_TOKEN::toString(jValue);
-}
-
-typedef std::unique_ptr<sqlite3, decltype(&sqlite3_close)> Database;
-
-// The database of a store, with the limits that the library's own connections have.
-inline Database open(const TokenStore& store)
-{
-    sqlite3* pDb = nullptr;
-    FUZZ_REQUIRE(SQLITE_OK == sqlite3_open(store.path().c_str(), &pDb));
-    return Database(pDb, sqlite3_close);
 }
 
 // All tokens of the store.

@@ -1,4 +1,5 @@
-// Limits for SQL in a database or in a filter, which must not disturb the fuzzer.
+// Limits for SQL in a database or in a filter, which must not disturb the fuzzer. Each new connection gets
+// them.
 
 #include <sqlite3.h>
 #include <strings.h>
@@ -28,23 +29,19 @@ int stop(void*)
     return 1;
 }
 
-} // namespace
-
-extern "C" {
-
-INTERPOSED int sqlite3_open(const char* szPath, sqlite3** ppDb)
+int limit(sqlite3* pDb, char**, const struct sqlite3_api_routines*)
 {
-    const int nResult = NEXT(sqlite3_open)(szPath, ppDb);
-    sqlite3_limit(*ppDb, SQLITE_LIMIT_LENGTH, LENGTH_MAX);
-    sqlite3_progress_handler(*ppDb, STEPS_MAX, stop, nullptr);
-    sqlite3_set_authorizer(*ppDb, isAllowed, nullptr);
-    return nResult;
+    sqlite3_limit(pDb, SQLITE_LIMIT_LENGTH, LENGTH_MAX);
+    sqlite3_progress_handler(pDb, STEPS_MAX, stop, nullptr);
+    return sqlite3_set_authorizer(pDb, isAllowed, nullptr);
 }
 
+const int g_nLimited = sqlite3_auto_extension(reinterpret_cast<void (*)()>(limit));
+
+} // namespace
+
 // A trigger can feign a lock.
-INTERPOSED int usleep(useconds_t)
+extern "C" INTERPOSED int usleep(useconds_t)
 {
     return 0;
 }
-
-} // extern "C"

@@ -21,7 +21,7 @@ void makeHostile(const TokenStore& store, const std::string& strInput)
     const bool blFile = 0 == strInput.compare(0, sizeof(FILE_START), FILE_START, sizeof(FILE_START));
     store.setFiles({{DATABASE, blFile ? strInput : ""}});
     if (!blFile) {
-        sqlite3_exec(fuzz::open(store).get(), strInput.c_str(), nullptr, nullptr, nullptr);
+        sqlite3_exec(store.open().get(), strInput.c_str(), nullptr, nullptr, nullptr);
     }
 }
 
@@ -105,7 +105,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* pData, size_t cbData)
     static const TokenStore store;
     makeHostile(store, std::string(fuzz::viewOf(pData, cbData)));
     AccessTokenApi api;
-    checkReading(api, fuzz::open(store).get());
+    checkReading(api, store.open().get());
     checkOperations(api);
     return 0;
 }
