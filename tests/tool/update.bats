@@ -119,6 +119,13 @@ END
     gives 7 show token--- --field count
 }
 
+@test "an update that a trigger undoes each time fails" {
+    row token---
+    sql "CREATE TRIGGER t UPDATE ON token BEGIN SELECT RAISE(IGNORE); END"
+    fails 4 "$REAL_DB itself undoes each change: a trigger does that; \"vemo-access-token doctor\" tells what helps" \
+        update token--- --bind-sid x
+}
+
 @test "what a token does not list cannot be removed, and no deadline lies in the past" {
     row token---
     refuses update token--- <<'END'
