@@ -15,20 +15,6 @@ shows() {
     expect "$1" "$2"
 }
 
-# below TITLE: all that stands below a title of the table in $output, joined, without blanks
-below() {
-    awk -v title="$1" '
-        NR == 1 {
-            start = index($0, title)
-            next_title = substr($0, start + length(title))
-            match(next_title, /^ */)
-            width = RLENGTH < length(next_title) ? length(title) + RLENGTH : 10000
-            next
-        }
-        { cells = cells substr($0, start, width) }
-        END { gsub(/ /, "", cells); print cells }' <<<"$output"
-}
-
 @test "an id is asked for, and not shown" {
     id=$(a_token --allow Api --unlimited)
     while IFS='|' read -r arguments shown; do
@@ -162,47 +148,38 @@ TABLE
     [[ $(cat "$DIR/result") == "warning: "* ]]
 }
 
-@test "long values go on in the next line, and lose nothing" {
-    function=$(printf 'function-%.0s' {1..10})
-    allow=Example.$(printf 'Long%.0s' {1..20}):get,list,$(printf 'put%.0s' {1..20})
-    tool init
-    id=$(tool create --uid 0 --ttl 9d12h --function "$function" --bind-sid $'session-\a' --allow "$allow" --allow Api)
-    on_terminal --columns 60 -- list --show-ids
-    [ "$status" -eq 0 ]
-    [ "${#lines[@]}" -gt 4 ]
-    [ "$(below TID)" = "$id" ]
-    [ "$(below FUNCTION)" = "$function" ]
-    [ "$(below ALLOWS)" = "Api$allow" ]
-    on_terminal --columns 60 -- stats
-    [ "$(wc -L <<<"$output")" -eq 60 ]
-    # A terminal that does not know its width is taken for one of 80 columns.
-    on_terminal --columns 80 -- list
-    known=$output
-    shows 0 "$known" --columns 0 -- list
-    on_terminal --columns 60 -- show "$id"
-    [ "$status" -eq 0 ]
-    [ "$(awk 'length > 60' <<<"$output")" = "" ]
-    values=$(below VALUE)
-    [[ $values == "$id"'session-\x070'* ]]
-    [[ $values == *"$function$(tool show "$id" --field webapi_allow){}" ]]
-}
-
-# Short values are what people copy or compare; other columns can become narrower.
-@test "short values are not broken for the sake of long ones, and words only where they are very long" {
-    id=$(a_token --allow "$(printf 'Example.Long%.0s' {1..20})" --allow Api:get,list --bind-sid "$(printf 's%.0s' {1..100})")
-    sql "UPDATE token SET function = 'nightly backup', uid = 1, deadline = $(($(date +%s) + 1000 * 86400 + 600))"
-    on_terminal --columns 60 -- list --utc
-    [ "${lines[0]}" = "TID       USER    FUNCTION  USES  DEADLINE              ALLOWS" ]
-    [[ ${lines[1]} =~ ^${id:0:8}\ \ daemon\ \ nightly\ {6}1\ \ 2[0-9]{3}-[0-9]{2}-[0-9]{2}\ [0-9]{2}:[0-9]{2}:[0-9]{2}Z\ \ Api:get,list$ ]]
-    [[ ${lines[2]} =~ ^\ {18}backup\ +Example.LongExample.LongExample.LongExam$ ]]
+# Short values are what people copy or compare. Words are broken only where they are very long.
+@test "long values go on in the next line and lose nothing, and short values are not broken for their sake" {
+    row token--- "uid = 1, function = 'nightly backup', bind_sid = 'session-' || char(7), webapi_allow =
+        '{\"Api\":{\"method\":[\"get\",\"list\"]},\"Example$(printf '.Long%.0s' {1..7})\":{\"method\":[\"put\"]}}'"
+    shows 0 "\
+TID       USER    FUNCTION  USES  DEADLINE              ALLOWS
+token---  daemon  nightly      1  2286-11-20 17:46:39Z  Api:get,list
+                  backup                                Example.Long.Long.Long.Long.Long.Long.Lo
+                                                        ng:put" --columns 60 -- list --utc
+    on_terminal --columns 60 -- show token--- --utc
+    [ "$(sed 's/in [0-9]* d/in N d/' <<<"$output")" = "\
+FIELD         VALUE
+tid           token---00000000000000000000000000000000000000
+              0000000000000000000000000000000000000000000000
+              00000000000000000000000000000000000
+bind_sid      session-\x07
+uid           1 (daemon)
+deadline      2286-11-20 17:46:39Z (in N d)
+count         1
+create_time   2001-09-09 01:46:40Z
+function      nightly backup
+webapi_allow  {\"Api\":{\"method\":[\"get\",\"list\"]},
+              \"Example.Long.Long.Long.Long.Long.Long.Long\":{
+              \"method\":[\"put\"]}}
+extra         {}" ]
     on_terminal --columns 10 -- stats
-    [[ $output == *$'\nfree pages of 4096 bytes       0\n'* && $output == *$'\n  1  daemon       1' ]]
-    on_terminal --columns 24 -- show "$id"
-    for field in tid bind_sid uid deadline count create_time function webapi_allow extra; do
-        grep -q "^$field  " <<<"$output"
-    done
+    [[ $output == *$'\nfree pages of 4096 bytes       0\n'*$'\nnightly        1\nbackup '*$'\n  1  daemon       1' ]]
     on_terminal --columns 80 -- tune
     grep -qE "^look for a session's tokens +[0-9.]+ ms +[0-9.]+ ms" <<<"$output"
+    # A terminal that does not know its width is taken for one of 80 columns.
+    on_terminal --columns 80 -- list
+    shows 0 "$output" --columns 0 -- list
 }
 
 @test "a list leaves out what a terminal has no room for, unless it was asked for" {
@@ -225,41 +202,35 @@ TABLE
 # last, of the first bytes of Û, too, a terminal with a character set of 8 bits takes one for ESC [.
 EVIL=$'x\e[31my\a\x7f\xc2\x9b2Jz\x9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\U000e0041\ufe0fÛ\U00010000'
 
-# in_all_forms [LOCALE]: prints on a terminal what the tool says of tokens that hold $EVIL, in each form
+# in_all_forms LOCALE: prints on a terminal what the tool says of tokens that hold $EVIL, in each form
 in_all_forms() {
-    export EVIL ID EVIL_ID=${EVIL:6}$ZEROS NO_COLOR=1
-    cat >"$DIR/commands" <<'TABLE'
-list
-list -o json
-list -o jsonl
-list --field function
-list --field webapi_allow
-list --field tid --show-ids
-show $ID
-show $ID -o json
-show $ID --field bind_sid
-show $ID --field extra
-stats
-stats -o json
-stats --prometheus
-export
-create --uid 0 --function x --tid "$EVIL_ID"
-doctor
-doctor -o json
-list --user "$EVIL"
-list --"$EVIL"
-list --sort "$EVIL"
-"$EVIL"
-import "$EVIL"
-export "$EVIL/x"
-list --verbose --function "$EVIL" # which lacks its table now
-TABLE
+    export DB EVIL ID EVIL_ID=${EVIL:6}$ZEROS NO_COLOR=1
     LC_ALL=$1 on_terminal --columns 200 --shell '
-        while read -r arguments; do
-            case $arguments in *--verbose*) sqlite3 "$2" "DROP TABLE token" ;; esac
-            echo "$arguments"
-            eval "\"\$0\" $arguments"
-        done <"$1"' -- "$DIR/commands" "$DB"
+        "$0" list
+        "$0" list -o json
+        "$0" list -o jsonl
+        "$0" list --field function
+        "$0" list --field webapi_allow
+        "$0" list --field tid --show-ids
+        "$0" show $ID
+        "$0" show $ID -o json
+        "$0" show $ID --field bind_sid
+        "$0" show $ID --field extra
+        "$0" stats
+        "$0" stats -o json
+        "$0" stats --prometheus
+        "$0" export
+        "$0" create --uid 0 --function x --tid "$EVIL_ID"
+        "$0" doctor
+        "$0" doctor -o json
+        "$0" list --user "$EVIL"
+        "$0" list --"$EVIL"
+        "$0" list --sort "$EVIL"
+        "$0" "$EVIL"
+        "$0" import "$EVIL"
+        "$0" export "$EVIL/x"
+        sqlite3 "$DB" "DROP TABLE token"
+        "$0" list --verbose --function "$EVIL"' --
 }
 
 @test "no text of a token or an argument can control the terminal" {
