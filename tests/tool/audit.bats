@@ -3,37 +3,30 @@
 
 load common
 
-# told [CALLER]: the lines so far, without what all of them have: priority, that the lock was free, and the caller;
-# the caller is the user who runs the test, unless it is given
-told() {
-    local caller=${1-by uid $(id -u)} login line
+# logged [CALLER]: the lines so far, without what all of them have: priority, that the lock was free, and the caller, who is
+# the user who runs the test, unless it is given. Other lines stay whole, behind a mark.
+logged() {
+    local caller=${1-by uid $(id -u)} login
     login=$(cat /proc/self/loginuid 2>/dev/null) || true
     case $login in
         '' | 4294967295) caller+=", no login uid" ;;
         *) caller+=", login uid $login" ;;
     esac
-    [ -e "$DIR/log" ] || return 0
-    while IFS= read -r line; do
-        [[ $line == "85 free "*"; $caller" ]] || {
-            echo "a line of its own: $line"
-            continue
-        }
-        line=${line#85 free }
-        echo "${line%"; $caller"}"
-    done <"$DIR/log"
-    rm "$DIR/log"
+    [ ! -e "$DIR/log" ] || sed "s/^85 free \(.*\); $caller\$/\1/; t; s/^/another line: /" "$DIR/log"
+    rm -f "$DIR/log"
 }
 
-setup_log() {
+# begin_log: what is logged from now on is kept, and no sudo is seen
+begin_log() {
     unset SUDO_UID
     export VEMO_TEST_SYSLOG=$DIR/log
 }
 
 @test "each change has its line, and nothing else has one" {
-    setup_log
+    begin_log
     while IFS='|' read -r arguments expected; do
         run_tool $arguments
-        [ "$(told)" = "$expected" ]
+        [ "$(logged)" = "$expected" ]
         case $arguments in
             init)
                 row token--- "count = 2"
@@ -73,9 +66,8 @@ TABLE
 }
 
 @test "for many tokens, a line says only how many" {
-    setup_log
     many_rows 6 "deadline = 5"
-    told >/dev/null
+    begin_log
     tool export "$DIR/lines"
     tool revoke --all --yes
     tool import "$DIR/lines"
@@ -83,7 +75,7 @@ TABLE
     tool doctor --repair
     tool import "$DIR/lines"
     tool purge
-    [ "$(told)" = "revoke: 6 tokens deleted
+    [ "$(logged)" = "revoke: 6 tokens deleted
 import: 6 tokens created
 doctor: 6 tokens updated
 doctor: 6 tokens deleted
@@ -92,44 +84,42 @@ purge: 6 tokens deleted" ]
 }
 
 @test "a line names the user who became root by sudo" {
-    setup_log
     tool init
-    told >/dev/null
+    begin_log
     SUDO_UID=1000 tool create --uid 0 --function VPN --tid "created-$ZEROS"
-    [ "$(told "by uid 1000 (sudo)")" = "create: 1 token created (created-...)" ]
+    [ "$(logged "by uid 1000 (sudo)")" = "create: 1 token created (created-...)" ]
     for uid in "" root -1 4294967295 4294967296 1000x " 1000" $'1000\nby uid 7'; do
         SUDO_UID=$uid tool update created- --uses 2
-        [ "$(told)" = "update: 1 token updated (created-...)" ]
+        [ "$(logged)" = "update: 1 token updated (created-...)" ]
     done
 }
 
 @test "a change has its line even if the command then fails or is ended" {
-    setup_log
     row token---
-    told >/dev/null
+    begin_log
     VEMO_TEST_SYNC=directory run_tool update token--- --uses 3
     [ "$status" -eq 4 ]
-    [ "$(told)" = "update: 1 token updated (token---...)" ]
+    [ "$(logged)" = "update: 1 token updated (token---...)" ]
 
     VEMO_TEST_SYNC=file fails 4 "$REAL_DB failed: disk I/O error; the change may have been made" revoke token---
-    [ "$(told | grep -v '^a line of its own: 3 ')" = "revoke: perhaps 1 token deleted (token---...)" ]
+    [ "$(logged | grep -v '^another line: 3 ')" = "revoke: perhaps 1 token deleted (token---...)" ]
 
     run bash -c '"$@" >/dev/full' - "$TOOL" create --uid 0 --function VPN --tid "created-$ZEROS"
     [ "$status" -eq 4 ]
-    [ "$(told)" = "create: 1 token created (created-...)
+    [ "$(logged)" = "create: 1 token created (created-...)
 create: 1 token deleted (created-...)" ]
 
     # Another program has the database open, so the tool watches for seconds whether the token is written back.
     run timeout 1 "$TOOL" revoke token--- 8<"$DB"
     [ "$status" -eq 124 ]
-    [ "$(told)" = "revoke: 1 token deleted (token---...)" ]
+    [ "$(logged)" = "revoke: 1 token deleted (token---...)" ]
 
     # The change is made and is being synced.
     row token---
     # shellcheck disable=SC2016 # the tool's shell knows its parent
     VEMO_TEST_CALLS='fsync|kill -TERM $PPID' run_tool revoke token---
     [ "$status" -eq 143 ]
-    [ "$(told)" = "revoke: 1 token deleted (token---...)" ]
+    [ "$(logged)" = "revoke: 1 token deleted (token---...)" ]
 
     # A change that is undone is not logged.
     row token---
@@ -139,15 +129,14 @@ o'); END"
     run_tool revoke token---
     [ "$status" -eq 4 ]
     # The library's line is as long as the reason, whose empty line is left out.
-    [ "$(told)" = "a line of its own: 3 free
-a line of its own: 3 free" ]
+    [ "$(logged)" = "another line: 3 free
+another line: 3 free" ]
 }
 
 @test "a line shows no whole id, and no character that could make two lines of one" {
-    setup_log
     row short "tid = 'short'"
     row odd----- "tid = char(10) || 'by uid' || tid"
-    told >/dev/null
+    begin_log
     tool revoke --all --yes
-    [ "$(told)" = 'revoke: 2 tokens deleted (\x0aby uido..., ...)' ]
+    [ "$(logged)" = 'revoke: 2 tokens deleted (\x0aby uido..., ...)' ]
 }

@@ -232,23 +232,6 @@ END
     gives "301 tokens revoked" revoke --all --yes
 }
 
-@test "a token opens nothing where that cannot be read" {
-    for stored in '' 'no JSON' '[]' 'null' '"A"' '{"A":1}' '{"A":{}}' '{"A":{"method":"m"}}' '{"A":{"method":[["m"]]}}' \
-        "$(printf '{"A":%.0s' {1..1001})1$(printf '}%.0s' {1..1001})"; do
-        n=$((n + 1))
-        row "$(printf 'at%06d' $n)" "webapi_allow = '$stored'"
-    done
-    gives 0 list --count --opens A:m
-    # For the API alone, its methods do not matter: as for a grant.
-    lists "at000006 at000007 at000008 at000009 at000010" --opens A --sort tid
-    allowed=
-    for tid in at0000{01..10}; do
-        [ "$(tool check $tid A m)" = "refused: malformed token" ]
-        [ "$(tool check $tid A)" != allowed ] || allowed+=" $tid"
-    done
-    [ "$allowed" = " at000006 at000007 at000008 at000009 at000010" ]
-}
-
 @test "no owner counts as gone when users cannot be looked up" {
     row token---
     VEMO_TEST_LOOKUP=5 fails 4 "the user of the number 0 could not be looked up: Input/output error" list --no-owner
