@@ -22,7 +22,7 @@ prepare() {
 tab() {
     local line answers=(--answer '$ ' ". '$DIR/setup'"$'\r' --answer READY)
     cat >>"$DIR/setup" <<END
-told() {
+end_line() {
     offered=\$(LC_ALL=C sort -u '$DIR/offered' | sed '/^\$/d' | paste -sd '|')
     echo "\${offered:+|\$offered}EN""D"
     : >'$DIR/offered'
@@ -32,7 +32,7 @@ echo REA""DY
 END
     while IFS= read -r line; do
         # Then to the beginning of the line, to make it the arguments of another command.
-        answers+=("$line"$'\t\x01printf "<%s>" \x05; told\r' --answer $'END\r\n')
+        answers+=("$line"$'\t\x01printf "<%s>" \x05; end_line\r' --answer $'END\r\n')
     done
     TERM=xterm PS1='$ ' INPUTRC=/dev/null on_terminal --columns 300 "${answers[@]}" $'exit\r' --shell 'exec "$@"' -- "$@"
     grep -aoE '<vemo-access-token>.*END$' <<<"$output" | sed 's/END$//; s/^<//; s/></,/g; s/>//'
@@ -44,8 +44,8 @@ bash_tab() {
     cat >"$DIR/setup" <<END
 . $framework
 . '$COMPLETION/vemo-access-token.bash'
-noted() { _vemo_access_token "\$@"; printf '%s\n' "\${COMPREPLY[@]}" >'$DIR/offered'; }
-complete -F noted vemo-access-token
+note_offers() { _vemo_access_token "\$@"; printf '%s\n' "\${COMPREPLY[@]}" >'$DIR/offered'; }
+complete -F note_offers vemo-access-token
 bind 'set enable-bracketed-paste off'
 END
     tab bash --norc --noprofile -i

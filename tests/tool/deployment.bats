@@ -69,8 +69,7 @@ paths() {
     echo old >"$DIR/elsewhere"
     ln -s "$DIR/elsewhere" "$DIR/collected/vemo-access-token.new"
     task metrics "$DIR/collected"
-    [ "$status" -eq 0 ]
-    [ "$output$stderr" = "" ]
+    expect 0 ""
     [ "$(stat -c '%n %a' "$DIR"/collected/*)" = "$DIR/collected/vemo-access-token.prom 644" ]
     tool stats --prometheus | diff "$DIR/collected/vemo-access-token.prom" -
     [ "$(<"$DIR/elsewhere")" = old ]
@@ -79,22 +78,20 @@ paths() {
     cp "$DIR/collected/vemo-access-token.prom" "$DIR/before"
     echo "no database" >"$DB"
     task metrics "$DIR/collected"
-    [ "$status" -eq 4 ]
+    expect 4 "" "vemo-access-token: $NO_DATABASE"
     cmp "$DIR/collected/vemo-access-token.prom" "$DIR/before"
 }
 
 @test "a notice says which tokens expire soon" {
     a_token --ttl 30d >/dev/null
     task expiry-notice
-    [ "$status-$output$stderr" = 0- ]
+    expect 0 ""
     a_token --ttl 6d >/dev/null
     task expiry-notice
-    [ "$status-$stderr" = 0- ]
-    [ "$output" = "<5>tokens that expire within 7d: 1; see vemo-access-token list --expiring 7d" ]
+    expect 0 "<5>tokens that expire within 7d: 1; see vemo-access-token list --expiring 7d"
     rm "$DB"
     task expiry-notice
-    [ "$status" -eq 4 ]
-    [ "$output" = "" ]
+    expect 4 "" "vemo-access-token: $NO_FILE"
 }
 
 @test "a backup is root's alone, can be imported, and is one of seven" {
@@ -120,33 +117,34 @@ paths() {
     [ "$(find "$DIR/backups" -type f | wc -l)" -eq 8 ]
 }
 
-# logout [NAME=VALUE...]: runs the hook as pam_exec does; $told is what it logs
+BOOT=$(</proc/sys/kernel/random/boot_id)
+
+# logout [NAME=VALUE...]: runs the hook as pam_exec does; $logged is what it logs
 logout() {
     local hook=$DIR/revoke-session bin=$DIR/bin
     tool_on_path
-    printf '#!/bin/sh\necho "$@" >>"%s/told"\n' "$DIR" >"$bin/logger"
+    printf '#!/bin/sh\necho "$@" >>"%s/logged"\n' "$DIR" >"$bin/logger"
     chmod +x "$bin/logger"
     sed "s,^export PATH=.*,export PATH=$bin:/usr/bin:/bin,; s,^database=.*,database=$DB," "$CONFIGURED/revoke-session" \
         >"$hook"
-    : >"$DIR/told"
+    : >"$DIR/logged"
     run env -i "VEMO_REDIRECT_DIR=$VEMO_REDIRECT_DIR" PAM_SERVICE=sshd PAM_TYPE=close_session XDG_SESSION_ID=42 "$@" \
         sh "$hook"
     [ "$status-$output" = 0- ]
-    told=$(<"$DIR/told")
-    echo "told: $told"
+    logged=$(<"$DIR/logged")
+    echo "logged: $logged"
 }
 
 @test "the end of a session revokes its tokens, and no others" {
-    boot=$(</proc/sys/kernel/random/boot_id)
     logout
-    [ "$told" = "" ] # there is no store
-    others=$(a_token --bind-sid "$boot-421" && a_token --bind-sid 42 && a_token)
+    [ "$logged" = "" ] # there is no store
+    others=$(a_token --bind-sid "$BOOT-421" && a_token --bind-sid 42 && a_token)
     logout
-    [ "$told" = "" ]
-    a_token --bind-sid "$boot-42" >/dev/null
+    [ "$logged" = "" ]
+    a_token --bind-sid "$BOOT-42" >/dev/null
     while read -r arguments; do
         logout $arguments
-        [ "$told" = "" ]
+        [ "$logged" = "" ]
         [ "$(sql "SELECT count(*) FROM token")" -eq 4 ]
     done <<'TABLE'
 PAM_TYPE=open_session
@@ -158,18 +156,17 @@ XDG_SESSION_ID=43
 PAM_SERVICE=sudo
 TABLE
     logout
-    [ "$told" = "-t vemo-access-token -p authpriv.info -- session 42: its tokens are revoked" ]
+    [ "$logged" = "-t vemo-access-token -p authpriv.info -- session 42: its tokens are revoked" ]
     [ "$(tool list --field tid --show-ids | sort)" = "$(sort <<<"$others")" ]
 }
 
 @test "the end of a session reports tokens that it could not revoke, and does not wait for them" {
-    boot=$(</proc/sys/kernel/random/boot_id)
-    a_token --bind-sid "$boot-42" >/dev/null
+    a_token --bind-sid "$BOOT-42" >/dev/null
     start=$SECONDS
     exec 8<>"$VEMO_REDIRECT_DIR.lock"
     flock 8
     logout
     exec 8>&-
     [ $((SECONDS - start)) -le 6 ]
-    [ "$told" = "-t vemo-access-token -p authpriv.err -- session 42: its tokens may be there still, see vemo-access-token list --bind-sid $boot-42" ]
+    [ "$logged" = "-t vemo-access-token -p authpriv.err -- session 42: its tokens may be there still, see vemo-access-token list --bind-sid $BOOT-42" ]
 }
