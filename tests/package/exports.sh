@@ -8,24 +8,22 @@ source=$(dirname "$0")/../..
 library=$1
 status=0
 
-soname=$(objdump -p "$library" | awk '$1 == "SONAME" { print $2 }')
-if [ "$soname" != libvemoaccesstoken.so.6 ]; then
-    echo "SONAME is $soname"
+fault()
+{
+    echo "$1"
     status=1
-fi
+}
+
+soname=$(objdump -p "$library" | awk '$1 == "SONAME" { print $2 }')
+[ "$soname" = libvemoaccesstoken.so.6 ] || fault "SONAME is $soname"
 
 # Json::Value is part of the interface: another jsoncpp would be another interface.
 jsoncpp=$(objdump -p "$library" | awk '$1 == "NEEDED" && /jsoncpp/ { print $2 }')
-if [ "$jsoncpp" != "${JSONCPP[$RELEASE]-$jsoncpp}" ]; then
-    echo "the library needs $jsoncpp, and not ${JSONCPP[$RELEASE]} as programs of Debian $RELEASE do"
-    status=1
-fi
+[ "$jsoncpp" = "${JSONCPP[$RELEASE]-$jsoncpp}" ] ||
+    fault "the library needs $jsoncpp, and not ${JSONCPP[$RELEASE]} as programs of Debian $RELEASE do"
 
 # Records that callers keep point at names in the library.
-if ! readelf -d "$library" | grep -q NODELETE; then
-    echo "the library can be unloaded"
-    status=1
-fi
+readelf -d "$library" | grep -q NODELETE || fault "the library can be unloaded"
 
 echo "Exported symbols (< the list, > the library):"
 diff <(sed -nE 's/^ (\(c\+\+\)")?([^"@]*)@Base.*/\2/p' "$source/debian/libvemoaccesstoken6.symbols" | LC_ALL=C sort) \

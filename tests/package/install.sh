@@ -77,20 +77,15 @@ run "$dir/consumer/consumer" || { cat "$dir/output"; exit 1; }
 
 echo "Another major version is refused:"
 sed 's/VemoAccessToken 6/VemoAccessToken 7/' "$consumer/CMakeLists.txt" >"$dir/CMakeLists.txt"
-if cmake -S "$dir" -B "$dir/refused" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" -DCMAKE_PREFIX_PATH="$dir/usr" \
-    >"$dir/log" 2>&1
-then
-    exit 1
-fi
+! cmake -S "$dir" -B "$dir/refused" -G Ninja -DCMAKE_CXX_COMPILER="$compiler" -DCMAKE_PREFIX_PATH="$dir/usr" \
+    >"$dir/log" 2>&1 || exit 1
 grep 'version: 6' "$dir/log"
 
 echo "Installed into a staging directory, the same files:"
 DESTDIR=$dir/stage cmake --install "$build" --prefix /usr >"$dir/log"
 diff <(cd "$dir/usr" && find . | LC_ALL=C sort) <(cd "$dir/stage/usr" && find . | LC_ALL=C sort)
-if grep -rl "$dir" "$dir/stage" --include='*.cmake' --include='*.pc'; then
-    echo "These files name the directory that they were installed to."
-    exit 1
-fi
+echo "Files that name the directory that they were installed to:"
+! grep -rl "$dir" "$dir/stage" --include='*.cmake' --include='*.pc' || exit 1
 
 echo "A project that takes this one in, unless it asks:"
 cat >"$dir/CMakeLists.txt" <<'END'
