@@ -24,44 +24,36 @@ begin_log() {
 
 @test "each change has its line, and nothing else has one" {
     begin_log
-    while IFS='|' read -r arguments expected; do
-        run_tool $arguments
+    while IFS='|' read -r call expected; do
+        eval "$call" >"$DIR/printed" 2>&1 || true
         [ "$(logged)" = "$expected" ]
-        case $arguments in
-            init)
-                row token--- "count = 2"
-                row expired- "deadline = 5"
-                ;;
-            "revoke token---")
-                for name in one two three four five six; do
-                    row "$name" "function = '$name'"
-                done
-                ;;
-        esac
     done <<TABLE
-init|init: the store was changed
-list|
-check token---$ZEROS Api get|
-grant token---$ZEROS Api put|grant: 1 token purged
-grant token---$ZEROS Api put|
-grant token---$ZEROS Api get|grant: 1 token granted (token---...)
-update token--- --unlimited|update: 1 token updated (token---...)
-grant token---$ZEROS Api get|grant: 1 token granted (token---...)
-update unknown- --unlimited|
-export $DIR/lines|
-revoke --all --dry-run|
-revoke token--- token---$ZEROS|revoke: 1 token deleted (token---...)
-revoke token---|
-revoke --function one --yes|revoke: 1 token deleted (one00000...)
-revoke --all --yes|revoke: 5 tokens deleted (five0000..., four0000..., six00000..., three000..., two00000...)
-import $DIR/lines|import: 1 token created (token---...)
-import $DIR/lines|
-create --uid 0 --function VPN --tid created-$ZEROS|create: 1 token created (created-...)
-create --uid 0 --function VPN --tid created-$ZEROS|
-purge|
-tune --dry-run|
-tune|tune: the store was changed
-doctor|
+tool init|init: the store was changed
+row token--- "count = 2"|
+row expired- "deadline = 5"|
+tool list|
+tool check token---$ZEROS Api get|
+tool grant token---$ZEROS Api put|grant: 1 token purged
+tool grant token---$ZEROS Api put|
+tool grant token---$ZEROS Api get|grant: 1 token granted (token---...)
+tool update token--- --unlimited|update: 1 token updated (token---...)
+tool grant token---$ZEROS Api get|grant: 1 token granted (token---...)
+tool update unknown- --unlimited|
+tool export $DIR/lines|
+tool revoke --all --dry-run|
+tool revoke token--- token---$ZEROS|revoke: 1 token deleted (token---...)
+tool revoke token---|
+for name in one two three four five six; do row \$name "function = '\$name'"; done|
+tool revoke --function one --yes|revoke: 1 token deleted (one00000...)
+tool revoke --all --yes|revoke: 5 tokens deleted (five0000..., four0000..., six00000..., three000..., two00000...)
+tool import $DIR/lines|import: 1 token created (token---...)
+tool import $DIR/lines|
+tool create --uid 0 --function VPN --tid created-$ZEROS|create: 1 token created (created-...)
+tool create --uid 0 --function VPN --tid created-$ZEROS|
+tool purge|
+tool tune --dry-run|
+tool tune|tune: the store was changed
+tool doctor|
 TABLE
 }
 

@@ -3,22 +3,6 @@
 
 load common
 
-# checks: each line "ARGUMENTS|RESULT" of standard input is what check answers for a call; all of them
-# change nothing
-checks() {
-    local arguments result before
-    before=$(state)
-    while IFS='|' read -r arguments result; do
-        eval "run_tool check $arguments" </dev/null
-        if [ "$result" = allowed ]; then
-            expect 0 allowed
-        else
-            expect 1 "refused: $result"
-        fi
-    done
-    [ "$(state)" = "$before" ]
-}
-
 @test "check says whether a call would be granted, and why not; it spends and purges nothing" {
     rows <<'END'
 token---|webapi_allow = '{"Äpi":{"method":["list","-x","a b","\u001b\n"]},"Bare":{"method":[]},"create":{"method":[]}}'
@@ -28,7 +12,15 @@ none----|count = 0
 many----|count = 9223372036854775807
 endless-|count = -1
 END
-    checks <<END
+    before=$(state)
+    while IFS='|' read -r arguments result; do
+        eval "run_tool check $arguments" </dev/null
+        if [ "$result" = allowed ]; then
+            expect 0 allowed
+        else
+            expect 1 "refused: $result"
+        fi
+    done <<END
 token---$ZEROS Äpi list|allowed
 token--- Äpi 'a b'|allowed
 token--- Äpi \$'\e\n'|allowed
@@ -52,6 +44,7 @@ none---- Api get|allowed
 many---- Api get|allowed
 endless- Api get|allowed
 END
+    [ "$(state)" = "$before" ]
 }
 
 # What a token opens counts for list --opens as it does for a grant, which reads the data as well.

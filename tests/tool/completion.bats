@@ -4,18 +4,6 @@
 
 load common
 
-# Files to complete, and in the tool's place a program that records that it was called.
-prepare() {
-    COMPLETION=${TOOL%/tests/*}/tools/completion
-    mkdir -p "$DIR/bin" "$DIR/home" "$DIR/files/backups"
-    touch "$DIR/files/data file.json" "$DIR/files/backups/tokens"
-    printf '#!/bin/sh\ntouch "%s/called"\n' "$DIR" >"$DIR/bin/vemo-access-token"
-    chmod +x "$DIR/bin/vemo-access-token"
-    export PATH=$DIR/bin:$PATH HOME=$DIR/home LC_ALL=C.UTF-8
-    unset XDG_CONFIG_HOME XDG_DATA_HOME XDG_CACHE_HOME
-    cd "$DIR/files"
-}
-
 # tab SHELL ARGUMENTS...: types each line of standard input with a tab behind it into this interactive shell, which
 # has read $DIR/setup and writes what it offers into $DIR/offered. Prints, for each line, the words that it has become,
 # and what was offered, behind bars.
@@ -101,7 +89,15 @@ vemo-access-token show '
 completes() {
     local command
     command -v "$1" >/dev/null || skip "$1 is not installed"
-    prepare
+    # Files to complete, and in the tool's place a program that records that it was called.
+    COMPLETION=${TOOL%/tests/*}/tools/completion
+    mkdir -p "$DIR/bin" "$DIR/home" "$DIR/files/backups"
+    touch "$DIR/files/data file.json" "$DIR/files/backups/tokens"
+    printf '#!/bin/sh\ntouch "%s/called"\n' "$DIR" >"$DIR/bin/vemo-access-token"
+    chmod +x "$DIR/bin/vemo-access-token"
+    export PATH=$DIR/bin:$PATH HOME=$DIR/home LC_ALL=C.UTF-8
+    unset XDG_CONFIG_HOME XDG_DATA_HOME XDG_CACHE_HOME
+    cd "$DIR/files"
     {
         echo "vemo-access-token |$(commands_of_tool | LC_ALL=C sort | paste -sd '|')"
         echo "vemo-access-token --|$(options_of | paste -sd '|')"

@@ -48,9 +48,7 @@ long_options() {
 }
 
 @test "the page describes the fields of a token, and in their order" {
-    a_token >/dev/null
-    diff <(section "OUTPUT FORMS" | sed -n 's/^\.It Ar //p') \
-        <(tool list --no-header --limit 1 | cut -c 1-8 | tool show - --no-header | cut -d ' ' -f 1)
+    diff <(section "OUTPUT FORMS" | sed -n 's/^\.It Ar //p') <(a_token | tool show - --no-header | cut -d ' ' -f 1)
 }
 
 # Each sentence of the page, in which "..." means any text, is one that other tests expect of the tool.
@@ -66,10 +64,11 @@ long_options() {
     done <"$DIR/sentences"
 }
 
-# Writes each literal block of the examples into its own file, in order.
-example_blocks() {
+# write_examples: writes each literal block of the examples into its own file in $DIR/blocks, in order
+write_examples() {
+    mkdir "$DIR/blocks"
     section EXAMPLES | sed 's/\\-/-/g; s/\\e/\\/g' |
-        awk -v dir="$1" '/^\.Ed/ { file = "" } file { print >file } /^\.Bd -literal/ { file = dir "/" 100 + n++ }'
+        awk -v dir="$DIR/blocks" '/^\.Ed/ { file = "" } file { print >file } /^\.Bd -literal/ { file = dir "/" 100 + n++ }'
 }
 
 # run_example COMMAND SHOWN: runs a command of the page, with the test's paths and users; it prints what the page shows, if
@@ -108,7 +107,6 @@ ssh() {
 }
 
 @test "the examples of the page do what it says, one after the other" {
-    mkdir "$DIR/blocks"
     tool_on_path
     tool init
     tool create --uid 0 --function VPN --tid "21IRmWbM$(tool generate)"
@@ -118,7 +116,7 @@ ssh() {
     tool create --uid 5 --function VPN --bind-sid 5f0c91ab
     tool create --uid 6 --function VPN --bind-sid 5f0c91ab
 
-    example_blocks "$DIR/blocks"
+    write_examples
     [ "$(find "$DIR/blocks" -type f | wc -l)" -ge 10 ]
     for block in "$DIR"/blocks/*; do
         [[ $(head -n 1 "$block") == "# "* ]]
@@ -132,11 +130,10 @@ ssh() {
 }
 
 @test "the move to another machine deletes nothing unless all has arrived" {
-    mkdir "$DIR/blocks"
     tool_on_path
     a_token >/dev/null
     a_token >/dev/null
-    example_blocks "$DIR/blocks"
+    write_examples
     grep -lF root@new "$DIR"/blocks/* >"$DIR/move"
     [ "$(wc -l <"$DIR/move")" -eq 1 ]
     sed -n 's/^# //p; s/^    //p' "$(cat "$DIR/move")" >"$DIR/commands"
