@@ -1,6 +1,6 @@
 #!/bin/bash
-# The options of the build. A part that needs something missing is left out, or is an error if it was asked for. With the
-# platform's libraries in a prefix (here built from the stand-ins), the library uses all three from there.
+# The options of the build. A part that needs something missing is left out, or is an error if it was asked for. Where a
+# prefix has the platform's libraries (here built from the stand-ins), the library uses all three from there.
 # usage: build-options.sh SOURCE-DIRECTORY COMPILER
 set -euo pipefail
 source=$1

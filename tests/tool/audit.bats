@@ -3,8 +3,8 @@
 
 load common
 
-# logged [CALLER]: the lines so far, without what all of them have: priority, that the lock was free, and the caller, who is
-# the user who runs the test, unless it is given. Other lines stay whole, behind a mark.
+# logged [CALLER]: the lines so far, without what all of them have: priority, that the lock was free, and the caller. This
+# is the user who runs the test, unless it is given. Other lines stay whole, behind a mark.
 logged() {
     local caller=${1-by uid $(id -u)} login
     login=$(cat /proc/self/loginuid 2>/dev/null) || true

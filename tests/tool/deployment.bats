@@ -1,6 +1,6 @@
 #!/usr/bin/env bats
-# deployment/: what systemd, AppArmor and PAM are given for programs that use tokens, and the tasks of the
-# administrator's. (The units of the gate have a test of their own.)
+# The files of deployment/: those for systemd, AppArmor and PAM, and the administrator's regular tasks. The units of the
+# gate have a test of their own.
 
 load common
 
@@ -10,13 +10,13 @@ CONFIGURED=$(dirname "$TOOL")/../../tools
 SESSION=/usr/vemo/etc/private/session
 LOCK=/run/vemo-access-token.lock
 
-# task NAME ARGUMENTS...: runs one, as run_tool does the tool
+# task NAME ARGUMENTS...: runs this task, and sets what run_tool sets
 task() {
     tool_on_path
     run --separate-stderr "$DEPLOYMENT/libexec/$1" "${@:2}"
 }
 
-# paths FILE [BEGINNING]: what stands behind that on lines of the file, sorted
+# paths FILE [BEGINNING]: the absolute paths in the file, one on a line, behind that beginning; sorted
 paths() {
     sed -n "s,^ *${2-}/,/,p" "$DEPLOYMENT/$1" | LC_ALL=C sort
 }

@@ -6,12 +6,12 @@ load common
 ROW="'session-1', 0, 9999999999, 5, 1000000000, 'VPN',
      '{\"Api\":{\"method\":[\"get\",\"list\"]},\"Bare\":{\"method\":[]}}', '{\"n\":[0.5,\"ü\"]}'"
 
-# all_tokens: but for the order, which a saved token loses
+# all_tokens: all fields of all tokens
 all_tokens() {
     sql "SELECT * FROM token ORDER BY tid"
 }
 
-# uses: of each token
+# uses: the uses that each token has left
 uses() {
     sql "SELECT substr(tid, 1, 8), count FROM token ORDER BY tid" | xargs
 }
@@ -79,7 +79,7 @@ END
     fails 1 "refused: unknown token" grant "expired-$ZEROS" Api get
 }
 
-@test "--print-user prints the owner's name; one without a name is a failure after the use was spent" {
+@test "--print-user prints the owner's name; an owner without a name is a failure after the use was spent" {
     rows <<'END'
 root----
 nobody--|uid = 65534, count = 1
@@ -106,7 +106,7 @@ END
     [ "$(uses)" = "token---|2" ]
     VEMO_TEST_LOOKUP=0 fails 4 "granted, but there is no user of the number 0" \
         grant "token---$ZEROS" Api -o json --print-user
-    # So it is with the last use.
+    # The last use shows the token, too.
     gives "{\"granted\":true,\"reason\":\"\",\"token\":${record/:3,/:1,}}" grant "token---$ZEROS" Api get -o json
     [ "$(uses)" = "" ]
 }

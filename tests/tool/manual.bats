@@ -54,7 +54,8 @@ long_options() {
 # Each sentence of the page, in which "..." means any text, is one that other tests expect of the tool.
 @test "the page explains messages that the tool prints" {
     # One line of the page can hold two of them.
-    section DIAGNOSTICS | sed -n 's/^\.It "\(.*\)"$/\1/p' | sed 's/\.\.\., /...\n/; s/, \.\.\. /\n... /' >"$DIR/sentences"
+    section DIAGNOSTICS | sed -n 's/^\.It "\(.*\)"$/\1/p' |
+        sed 's/\.\.\., /...\n/; s/, \.\.\. /\n... /' >"$DIR/sentences"
     [ "$(wc -l <"$DIR/sentences")" -ge 23 ]
     grep -hv '^ *#\|^@test' "$BATS_TEST_DIRNAME"/*.ba* >"$DIR/expected"
     while IFS= read -r sentence; do
@@ -71,8 +72,8 @@ write_examples() {
         awk -v dir="$DIR/blocks" '/^\.Ed/ { file = "" } file { print >file } /^\.Bd -literal/ { file = dir "/" 100 + n++ }'
 }
 
-# run_example COMMAND SHOWN: runs a command of the page, with the test's paths and users; it prints what the page shows, if
-# that shows anything
+# run_example COMMAND SHOWN: runs a command of the page, with the test's paths and users. It prints what the page shows, if
+# the page shows anything.
 run_example() {
     local command shown=$2 expected=0 got=0
     [[ $shown != refused:* ]] || expected=1

@@ -3,8 +3,8 @@
 
 load common
 
-# some_tokens: tokens of several purposes and owners, two of them expired, two without limit. Sets $size and $free to the
-# bytes of the file and its free pages, numbers of six and two digits.
+# some_tokens: tokens of several purposes and owners, two of them expired, two without limit. Sets $size to the bytes of
+# the file, and $free to its free pages: six and two digits.
 some_tokens() {
     ROW="'', 0, 9999999999, 1, 0, 'VPN',  '{}', hex(zeroblob(20000))"
     rows <<'END'
@@ -61,7 +61,7 @@ Web            1
         stats -o jsonl
 }
 
-# labels NAME: the samples of that label, in the metrics, without their common beginning
+# labels NAME: the metrics that have this label, without the beginning that all have
 labels() {
     tool stats --prometheus | sed -n "s/^vemo_access_token_[a-z]*_tokens{$1=/{$1=/p"
 }
@@ -111,10 +111,10 @@ vemo_access_token_old_unlimited_tokens 0' ]
     [ "${lines[5]}" = 'a"b\c\x0ad\x09é\n  4' ]
 }
 
-# For one bad sample, or one that comes twice, the collector refuses the whole file.
-@test "metrics stay valid where a purpose is no valid UTF-8, and owners are no users' numbers" {
+# The collector refuses the whole file for one metric that is not valid, or that comes twice.
+@test "metrics stay valid where a purpose is not valid UTF-8, and an owner is not the number of a user" {
     some_tokens
-    # Stray bytes, half a surrogate pair, and beyond the last code point; two purposes stay two.
+    # Two bytes that begin no character, half a surrogate pair, and a number beyond the last character.
     sql "UPDATE token SET function = CAST(CASE tid WHEN 'a' THEN x'61ff62' WHEN 'b' THEN x'61fe62' WHEN 'c' THEN x'eda080'
          ELSE x'f4908080' END AS TEXT), uid = CASE tid WHEN 'b' THEN NULL WHEN 'c' THEN 'x' ELSE 4294967296 END"
     [ "$(labels function)" = '{function="\\xed\\xa0\\x80"} 1

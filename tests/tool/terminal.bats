@@ -1,5 +1,5 @@
 #!/usr/bin/env bats
-# The differences on a terminal: hidden prompts, questions, colours, the width of tables, progress bars
+# What is different on a terminal: hidden prompts, questions, colours, the width of tables, progress bars
 
 load common
 
@@ -55,7 +55,7 @@ modes: as before" ]
     [ "$status" -eq 130 ]
     [ "$(tail -n 1 "$DIR/modes")" = "modes: as before" ]
     expect_left token---
-    # The same after a bar, which goes on while the tool waits for the lock.
+    # The same while a bar shows that the tool waits for the lock.
     exec 9>>"$VEMO_REDIRECT_DIR.lock"
     flock 9
     on_terminal --answer "Tuning [" "" --answer "Tuning [" "" --answer "Tuning [" $'\x03' -- tune 9>&-
@@ -198,8 +198,8 @@ TABLE
     shows 0 $'SESSION    EXPIRES\nsession-1  in 1000 d' --columns 20 -- list --columns session,expires
 }
 
-# Bytes that are no UTF-8, control characters, and characters that order the text anew or cannot be seen; of the
-# last, of the first bytes of Û, too, a terminal with a character set of 8 bits takes one for ESC [.
+# Bytes that are not UTF-8, control characters, characters that change the direction of the text, and some that cannot
+# be seen. A terminal with a character set of 8 bits takes the second byte of Û for ESC [.
 EVIL=$'x\e[31my\a\x7f\xc2\x9b2Jz\x9b31m\u202eabc\u2066\u200b\u00ad\u2028\u3164\ufeff\U000e0041\ufe0fÛ\U00010000'
 
 # in_all_forms LOCALE: prints on a terminal what the tool says of tokens that hold $EVIL, in each form
@@ -285,7 +285,7 @@ vemo-access-token: $DIR/lines: line 2 has the id of a token that is there alread
     sql "DELETE FROM token"
     shows_bar Importing "2 tokens imported" -- import "$DIR/lines"
 
-    # The bar stays on its line. A table that is wider than the terminal keeps its words.
+    # On a narrow terminal the bar stays on its line, and no word of the table is broken.
     on_terminal --columns 10 -- tune --undo
     [[ ${lines[0]} == *$'\rTuning []' ]]
     on_terminal --columns 20 -- tune --undo

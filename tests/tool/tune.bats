@@ -29,8 +29,8 @@ without_times() {
     sed -E 's/[0-9]+\.[0-9][0-9] ms/T/g; s/  +/|/g; s/\|$//' <<<"$output"
 }
 
-# figures TIMES JOURNAL DEADLINE OTHERS: the lines that tell the journal, whether there is an index on the deadline and
-# whether on the other two, behind those that look; each with its columns
+# figures TIMES JOURNAL DEADLINE OTHERS: the lines about the searches, the journal, the index on the deadline and the
+# other two indexes, with these columns
 figures() {
     printf '%s\n' "look for expired tokens, as every call does|$1" "look for a session's tokens|$1" \
         "look for a purpose's tokens|$1" "journal|$2" "index token_deadline|$3" "index token_bind_sid|$4" \
@@ -83,7 +83,8 @@ write a small change|T|T" ]
 
 @test "tune says why it fails, and what it has changed" {
     a_store
-    VEMO_TEST_VFS=unix-dotfile fails 4 'the journal cannot be made "wal" here' tune --wal # no memory that processes share
+    # This way to work on files has no memory that processes share.
+    VEMO_TEST_VFS=unix-dotfile fails 4 'the journal cannot be made "wal" here' tune --wal
     VEMO_TEST_SYNC=file fails 4 "$REAL_DB failed: disk I/O error" tune
     [ "$(indexes)" = "" ]
     [ "$(sql "PRAGMA journal_mode")" = delete ]

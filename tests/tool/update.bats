@@ -148,7 +148,9 @@ expired-|5|7" ]
     [ "$(sql "SELECT extra FROM token")" = '{"a":[1.5,"ü"]}' ]
     for stored in '' '[]' null '{"a":1'; do
         sql "UPDATE token SET extra = '$stored'"
-        refuses update token--- <<<"--note x|the data of the token are malformed and cannot hold a note; replace them with --extra"
+        fails 2 "the data of the token are malformed and cannot hold a note; replace them with --extra" \
+            update token--- --note x
+        [ "$(sql "SELECT extra FROM token")" = "$stored" ]
         tool update token--- --note x --extra '{}'
         [ "$(sql "SELECT extra FROM token")" = '{"note":"x"}' ]
     done

@@ -3,9 +3,9 @@
 
 load common
 
-# plain ARGUMENTS...: the tool as it ships, without the redirection, as a user who is not root; of root, the effective
-# uid is another, as a program of mode 4755 would have it. But AddressSanitizer's search for leaks must trace the
-# process, which is not possible then; and a script in the tool's place would make its effective uid the real one again.
+# plain ARGUMENTS...: the tool as it ships, without the redirection, as a user who is not root. If root runs the test,
+# only the effective uid changes, as for a program of mode 4755. The real uid changes, too, for AddressSanitizer, which
+# must trace the process to find leaks, and for a script in the tool's place, whose shell would go back to the real uid.
 plain() {
     local plain drop=()
     plain=$(dirname "$TOOL")/../../tools/vemo-access-token
