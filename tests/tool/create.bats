@@ -45,8 +45,6 @@ OWN=own-$(printf '%0123d' 0)
 --allow A:m --allow B --allow A:n,m|webapi_allow|{"A":{"method":["m","n"]},"B":{"method":[]}}
 --allow A --allow A:m --allow A|webapi_allow|{"A":{"method":["m"]}}
 --allow A:m:n|webapi_allow|{"A":{"method":["m:n"]}}
---allow '"\'|webapi_allow|{"\"\\":{"method":[]}}
---allow Äpi:ü|webapi_allow|{"Äpi":{"method":["ü"]}}
 TABLE
     [ "$(column extra "$(a_token --extra "$nested")")" = "$nested" ]
     [ "$(column "uid, function" "$(tool create --user root --function 'File share')")" = "0|File share" ]

@@ -191,9 +191,7 @@ extra         {}" ]
     done <<'TABLE'
 82|TID       USER  FUNCTION  USES  DEADLINE             EXPIRES    SESSION    ALLOWS
 81|TID       USER  FUNCTION  USES  DEADLINE             EXPIRES    ALLOWS
-71|TID       USER  FUNCTION  USES  DEADLINE             EXPIRES    ALLOWS
 70|TID       USER  FUNCTION  USES  DEADLINE             ALLOWS
-20|TID       USER  FUNCTION  USES  DEADLINE             ALLOWS
 TABLE
     shows 0 $'SESSION    EXPIRES\nsession-1  in 1000 d' --columns 20 -- list --columns session,expires
 }

@@ -26,14 +26,10 @@ cannot_print() {
     expect 4 "" "vemo-access-token: cannot write the result: $1"
 }
 
-# into_closed_pipe ARGUMENTS...: standard output is a pipe without a reader. The shell may ignore SIGPIPE; the
+# into_closed_pipe ARGUMENTS...: standard output is a pipe whose reader has ended. The shell may ignore SIGPIPE; the
 # tool is started as if it did not.
 into_closed_pipe() {
-    mkfifo "$DIR/pipe"
-    exec 8<>"$DIR/pipe" 9>"$DIR/pipe" 8<&-
-    run --separate-stderr bash -c 'exec env --default-signal=PIPE "$@" >&9' - "$TOOL" "$@"
-    exec 9>&-
-    rm "$DIR/pipe"
+    run --separate-stderr bash -c 'exec 9> >(:); wait $!; exec env --default-signal=PIPE "$@" >&9' - "$TOOL" "$@"
 }
 
 @test "--help lists commands, options and exit statuses, and --version is the same everywhere" {
