@@ -26,9 +26,7 @@ token--- Äpi 'a b'|allowed
 token--- Äpi \$'\e\n'|allowed
 -- token--- Äpi -x|allowed
 token--- Äpi|allowed
-token--- Äpi ''|allowed
 token--- Bare|allowed
-token--- create|allowed
 - create <<<token---|allowed
 token--- Äpi put|method not listed
 token--- Äpi list,a|method not listed

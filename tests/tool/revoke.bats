@@ -76,7 +76,6 @@ END
     done <<'TABLE'
 --uid 0|b
 --function "it's"|f
---function vpn|
 --bind-sid s2|bd
 --opens Api|abcdef
 --no-owner|a

@@ -64,16 +64,13 @@ END
 {"A":{"method":["m"]}}|--add-allow B|{"A":{"method":["m"]},"B":{"method":[]}}
 {"A":{"method":["m"]}}|--add-allow B:x --add-allow B:y|{"A":{"method":["m"]},"B":{"method":["x","y"]}}
 {"A":{"method":["m"]}}|--add-allow A:n,m,l|{"A":{"method":["m","n","l"]}}
-{"A":{"method":["m"]}}|--add-allow A:m|{"A":{"method":["m"]}}
 {"A":{"method":["m"]}}|--add-allow A|{"A":{"method":["m"]}}
-{}|--add-allow A:m|{"A":{"method":["m"]}}
 {"A":{"method":["m"],"note":1}}|--add-allow A:n|{"A":{"method":["m","n"],"note":1}}
 {"A":{"method":["m","n"]},"B":{"method":[]}}|--remove-allow A|{"B":{"method":[]}}
 {"A":{"method":["m","n"]},"B":{"method":[]}}|--remove-allow A --remove-allow B|{}
 {"A":{"method":["m","n","o"]}}|--remove-allow A:o,m|{"A":{"method":["n"]}}
 {"A":{"method":["m","n","m"]}}|--remove-allow A:m|{"A":{"method":["n"]}}
 {"A":{"method":["m"],"note":1}}|--remove-allow A:m|{"A":{"method":[],"note":1}}
-{"A":{"method":["m"]}}|--remove-allow A --add-allow B:x|{"B":{"method":["x"]}}
 {"A":{"method":["m"]}}|--remove-allow A:m --add-allow A:n|{"A":{"method":["n"]}}
 {"A":1,"B":{"method":["m"]}}|--add-allow B:n --add-allow C|{"A":1,"B":{"method":["m","n"]},"C":{"method":[]}}
 {"A":1,"B":{"method":["m"]}}|--remove-allow B:m|{"A":1,"B":{"method":[]}}
@@ -82,8 +79,6 @@ END
 {"A":1}|--remove-allow A:m|
 {"A":{"method":"m"}}|--add-allow A:n|
 ["A"]|--add-allow B|
-no JSON|--add-allow A|
-["A"]|--allow A:m|{"A":{"method":["m"]}}
 no JSON|--allow A|{"A":{"method":[]}}
 END
 }
