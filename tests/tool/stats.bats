@@ -3,7 +3,7 @@
 
 load common
 
-# some_tokens: tokens of several purposes and owners, two of them expired, two without limit. Sets $size to the bytes of
+# some_tokens: tokens of several purposes and owners, two of them expired, three without limit. Sets $size to the bytes of
 # the file, and $free to its free pages: six and two digits.
 some_tokens() {
     ROW="'', 0, 9999999999, 1, 0, 'VPN',  '{}', hex(zeroblob(20000))"
@@ -11,7 +11,7 @@ some_tokens() {
 a|tid = 'a', count = -1
 b|tid = 'b', uid = 4000000000, deadline = 1, count = -5, function = 'Mail'
 c|tid = 'c', deadline = -1
-d|tid = 'd', count = 0, function = 'Web'
+d|tid = 'd', count = -2, function = 'Web'
 END
     sql "PRAGMA auto_vacuum = NONE; VACUUM; UPDATE token SET extra = '{}'"
     size=$(stat -c %s "$DB")
@@ -23,7 +23,7 @@ END
     gives "STORE                     NUMBER
 tokens                         4
 expired                        2
-unlimited uses                 2
+unlimited uses                 3
 file size in bytes        $size
 free pages of 4096 bytes      $free
 
@@ -45,7 +45,7 @@ Web            1
 
 @test "stats -o json and jsonl give the same" {
     some_tokens
-    line="{\"expired\":2,\"file_bytes\":$size,\"free_pages\":$free,"'"functions":[{"function":"VPN","tokens":2},{"function":"Mail","tokens":1},{"function":"Web","tokens":1}],"page_bytes":4096,"tokens":4,"unlimited":2,"users":[{"tokens":3,"uid":0,"user":"root"},{"tokens":1,"uid":4000000000,"user":""}]}'
+    line="{\"expired\":2,\"file_bytes\":$size,\"free_pages\":$free,"'"functions":[{"function":"VPN","tokens":2},{"function":"Mail","tokens":1},{"function":"Web","tokens":1}],"page_bytes":4096,"tokens":4,"unlimited":3,"users":[{"tokens":3,"uid":0,"user":"root"},{"tokens":1,"uid":4000000000,"user":""}]}'
     gives "$line" stats -o jsonl
     succeeds stats --output json
     [ "${lines[0]}" = "{" ]
@@ -75,7 +75,7 @@ labels() {
     done <<TABLE
 tokens|Tokens in the store.| 4
 expired_tokens|Tokens whose deadline has passed.| 2
-unlimited_tokens|Tokens with any number of uses.| 2
+unlimited_tokens|Tokens with any number of uses.| 3
 database_bytes|Size of the database file.| $size
 database_free_pages|Unused pages of the database file.| $free
 database_page_bytes|Size of a page of the database file.| 4096
@@ -84,7 +84,7 @@ user_tokens|Tokens by the user who owns them.|{uid="0",user="root"} 3;{uid="4000
 expiring_tokens|Tokens that expire within this time.|{within="day"} 0;{within="week"} 0
 no_owner_tokens|Tokens whose owner is not a user of this machine.| 1
 no_api_tokens|Tokens that open nothing.| 4
-old_unlimited_tokens|Tokens with any number of uses that are older than a year.| 2
+old_unlimited_tokens|Tokens with any number of uses that are older than a year.| 3
 TABLE
     )
     gives "$metrics" stats --prometheus
@@ -98,7 +98,7 @@ TABLE
 vemo_access_token_expiring_tokens{within="week"} 2
 vemo_access_token_no_owner_tokens 2
 vemo_access_token_no_api_tokens 2
-vemo_access_token_old_unlimited_tokens 0' ]
+vemo_access_token_old_unlimited_tokens 1' ]
 }
 
 @test "what a purpose may hold is escaped in each form" {
