@@ -193,7 +193,7 @@ extra         {}" ]
 81|TID       USER  FUNCTION  USES  DEADLINE             EXPIRES    ALLOWS
 70|TID       USER  FUNCTION  USES  DEADLINE             ALLOWS
 TABLE
-    shows 0 $'SESSION    EXPIRES\nsession-1  in 1000 d' --columns 20 -- list --columns session,expires
+    shows 0 $'SESSION    EXPIRES\nsession-1  in 1000 d' --columns 19 -- list --columns session,expires
 }
 
 # Bytes that are not UTF-8, control characters, characters that change the direction of the text, and some that cannot
