@@ -236,7 +236,7 @@ warning: expired for more than an hour: 1 token (old${ID:0:5})
     status=0 stderr=
     wait "$importer" || status=$?
     unlock
-    text_of output "$DIR/out"
+    output=$(<"$DIR/out")
     expect 4 "1 token imported
 vemo-access-token: $REAL_DB stayed locked by another process for 5 seconds"
 }
@@ -290,8 +290,8 @@ beside_call() {
     unlock
     status=0
     wait $! || status=$?
-    text_of output "$DIR/out"
-    text_of stderr "$DIR/err"
+    output=$(<"$DIR/out")
+    stderr=$(<"$DIR/err")
 }
 
 @test "a token that a call writes back is revoked again, but no new token" {
