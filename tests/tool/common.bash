@@ -52,7 +52,7 @@ run_tool() {
     status=0
     "$TOOL" "$@" >"$streams" 2>"$streams.errors" || status=$?
     output=$(<"$streams") stderr=$(<"$streams.errors")
-    IFS=$'\n' read -r -d '' -a lines <<<"$output" || true
+    IFS=$'\n' read -r -d '' -a lines <"$streams" || true
 }
 
 # expect STATUS OUTPUT [STDERR]: the result of run_tool, exactly
@@ -189,28 +189,20 @@ a_token() {
     tool create --uid 0 --function VPN "$@"
 }
 
-# inserted NAME [COLUMN = VALUE, ...]: sets $inserted to statements that insert a token as $ROW has it, but for
-# these columns. Its id is the name and zeros.
-inserted() {
-    printf -v inserted "INSERT INTO token VALUES ('%s%0*d', %s);" "$1" $((ID_LENGTH - ${#1})) 0 "$ROW"
-    [ -z "${2-}" ] || inserted+="UPDATE token SET $2 WHERE rowid = last_insert_rowid();"
-}
-
-# row NAME [COLUMN = VALUE, ...]: inserts that token behind the tool's back
+# row NAME [COLUMN = VALUE, ...]: inserts a token as $ROW has it, but for these columns, behind the tool's back. Its id
+# is the name and zeros.
 row() {
-    local inserted
-    need_store
-    inserted "$@"
-    sql "$inserted"
+    rows <<<"$1|${2//$'\n'/ }"
 }
 
 # rows: the same for each line "NAME|COLUMN = VALUE, ..." of standard input
 rows() {
-    local name columns inserted statements=
+    local name columns statements=
     need_store
     while IFS='|' read -r name columns; do
-        inserted "$name" "$columns"
-        statements+=$inserted
+        name+=$ZEROS$ZEROS
+        statements+="INSERT INTO token VALUES ('${name:0:ID_LENGTH}', $ROW);"
+        statements+=${columns:+"UPDATE token SET $columns WHERE rowid = last_insert_rowid();"}
     done
     sql "BEGIN; $statements COMMIT"
 }
@@ -241,10 +233,8 @@ sql() {
 expect_left() {
     local left
     left=$(sql "SELECT rtrim(tid, '0') FROM token ORDER BY 1" | xargs)
-    [ "$left" = "$*" ] || {
-        echo "there are: $left"
-        return 1
-    }
+    echo "there are: $left"
+    [ "$left" = "$*" ]
 }
 
 # state: what there is of the private directory, to the byte
