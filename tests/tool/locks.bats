@@ -7,58 +7,52 @@ load common
 EXCLUSIVE="BEGIN EXCLUSIVE;"
 WRITING="BEGIN IMMEDIATE;"
 # An open read transaction blocks a change when it is committed, not when it begins.
-READING="BEGIN; SELECT count(*) FROM token;"
+READING="BEGIN; SELECT tid FROM token WHERE tid = '';"
 
-# lock STATEMENTS: another process executes them and keeps the lock that they take, until it reads on stream 7
-# that it must commit and end
+# lock STATEMENTS: another program executes them, and keeps the lock that they take
 lock() {
-    rm -f "$DIR/to-holder" "$DIR/from-holder"
-    mkfifo "$DIR/to-holder" "$DIR/from-holder"
-    sqlite3 "$DB" <"$DIR/to-holder" >"$DIR/from-holder" 3>&- 9>&- &
-    HOLDER=$!
-    exec 7>"$DIR/to-holder" 8<"$DIR/from-holder"
-    echo "$1 SELECT 'held';" >&7
-    local line=
-    until [ "$line" = held ]; do
-        read -r -t 20 -u 8 line
-    done
+    coproc other { exec sqlite3 "$DB" 3>&-; }
+    OTHER=$!
+    other "$1"
 }
 
-# unlock: ends that process
+# other STATEMENTS: that program executes these, too
+other() {
+    echo "$1 SELECT 'done';" >&"${other[1]}"
+    read -r -t 20 -u "${other[0]}"
+}
+
+# unlock [STATEMENTS]: it executes these, and ends
 unlock() {
-    exec 7>&- 8<&-
-    wait "$HOLDER"
+    printf '%s\n.quit\n' "${1-}" >&"${other[1]}"
+    wait "$OTHER"
 }
 
-# run_waiting STATEMENTS TIMES ARGUMENTS...: runs the tool while another process holds the lock that the statements
-# take, and releases the lock when the tool has waited that often; before that, the tool gets $SIGNAL, if that is set.
-# Fails if the tool has not waited.
-run_waiting() {
-    local times=$2 watcher
-    lock "$1"
-    shift 2
-    rm -f "$DIR/waits" "$DIR/waited"
+# start ARGUMENTS...: the tool runs in the background. Stream 9 has a line for each time that it waits for a lock.
+start() {
+    rm -f "$DIR/waits"
     mkfifo "$DIR/waits"
-    local shell=$BASHPID
     exec 9<>"$DIR/waits" # open for reading before the tool writes
-    {
-        for ((i = 0; i < times; ++i)); do
-            read -r -u 9
-        done
-        touch "$DIR/waited"
-        [ -z "${SIGNAL-}" ] || pkill "-$SIGNAL" -P "$shell" vemo-access
-        printf 'COMMIT;\n.quit\n' >&7
-    } 3>&- &
-    watcher=$!
-    VEMO_TEST_WAITS=$DIR/waits run_tool "$@"
-    [ -e "$DIR/waited" ] || {
-        kill "$watcher"
-        echo "did not wait $times times; status $status, $stderr"
-        return 1
-    }
-    wait "$watcher"
-    exec 9>&-
-    unlock
+    VEMO_TEST_WAITS=$DIR/waits "$TOOL" "$@" <&0 >"$DIR/out" 2>"$DIR/err" 3>&- 9>&- &
+    STARTED=$!
+}
+
+# finish: waits for its end; sets $status, $output and $stderr as run_tool does
+finish() {
+    status=0
+    wait "$STARTED" || status=$?
+    output=$(<"$DIR/out") stderr=$(<"$DIR/err")
+}
+
+# run_waiting STATEMENTS ARGUMENTS...: as run_tool, while another program holds the lock that the statements take. When
+# the tool waits for it, the tool gets $SIGNAL, if that is set, and the other program commits and ends.
+run_waiting() {
+    lock "$1"
+    start "${@:2}"
+    read -r -t 20 -u 9
+    [ -z "${SIGNAL-}" ] || kill "-$SIGNAL" "$STARTED"
+    unlock "COMMIT;"
+    finish
 }
 
 # a_store: a token with five uses, $ID, and an expired one; $DIR/other holds a third that is not in it
@@ -78,7 +72,7 @@ stored() {
     a_store
     while read -r arguments; do
         expected=$(tool $arguments 2>/dev/null)
-        run_waiting "$EXCLUSIVE" 1 $arguments
+        run_waiting "$EXCLUSIVE" $arguments
         expect 0 "$expected" "$([ "$arguments" != export ] || echo "vemo-access-token: 2 tokens exported")"
     done <<TABLE
 list
@@ -92,12 +86,12 @@ revoke --dry-run --all
 revoke --dry-run $ID
 TABLE
     tool purge >/dev/null
-    run_waiting "$EXCLUSIVE" 3 doctor
+    run_waiting "$EXCLUSIVE" doctor
     [ "$status" -eq 0 ]
     [ "$(tail -n 1 <<<"$output")" = "no findings" ]
-    run_waiting "$EXCLUSIVE" 1 tune --dry-run
+    run_waiting "$EXCLUSIVE" tune --dry-run
     [ "$status$stderr" = 0 ]
-    [ "${lines[-1]}" = "would run: COMMIT" ]
+    [ "$(tail -n 1 <<<"$output")" = "would run: COMMIT" ]
 }
 
 @test "a change that had to wait is reported as done, and a refusal as a refusal" {
@@ -106,11 +100,9 @@ TABLE
     cp "$DB" "$DIR/before"
     while IFS='|' read -r arguments status_then output_then sentence stored_then; do
         for kind in EXCLUSIVE READING; do
-            times=1
-            [ $kind = EXCLUSIVE ] || times=3
             [ $kind = EXCLUSIVE ] || [ "$status_then" = 0 ] || continue # not all refusals have something to commit
             cp "$DIR/before" "$DB"
-            run_waiting "${!kind}" $times $arguments
+            run_waiting "${!kind}" $arguments
             expect "$status_then" "$output_then" "${sentence:+vemo-access-token: $sentence}"
             [ "$(stored)" = "$stored_then" ]
         done
@@ -134,20 +126,20 @@ TABLE
 @test "create prints the id of a token that had to wait" {
     tool init
     for kind in EXCLUSIVE READING; do
-        run_waiting "${!kind}" 1 create --uid 0 --function VPN --allow Api
+        run_waiting "${!kind}" create --uid 0 --function VPN --allow Api
         [ "$status$stderr" = 0 ]
         [ "$(sql "SELECT tid FROM token")" = "$output" ]
         sql "DELETE FROM token"
     done
     # A signal that its caller ignores does not interrupt it.
     trap '' HUP
-    SIGNAL=HUP run_waiting "$READING" 1 create --uid 0 --function VPN --allow Api
+    SIGNAL=HUP run_waiting "$READING" create --uid 0 --function VPN --allow Api
     trap - HUP
     [ "$status" -eq 0 ]
     [ "$(sql "SELECT tid FROM token")" = "$output" ]
     # A signal that interrupts it leaves no token whose id nobody knows.
     sql "DELETE FROM token"
-    SIGNAL=TERM run_waiting "$READING" 1 create --uid 0 --function VPN --allow Api
+    SIGNAL=TERM run_waiting "$READING" create --uid 0 --function VPN --allow Api
     expect 143 "" "vemo-access-token: interrupted; the token was taken back"
     [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }
@@ -155,14 +147,14 @@ TABLE
 @test "tuning that had to wait is done" {
     a_store
     for kind in EXCLUSIVE WRITING READING; do
-        run_waiting "${!kind}" 1 tune --wal
+        run_waiting "${!kind}" tune --wal
         [ "$status$stderr" = 0 ]
         [[ $(grep "^journal" <<<"$output") =~ ^journal\ +delete\ +wal$ ]]
         [ "$(sql "PRAGMA journal_mode")" = wal ]
         wanted="token_bind_sid token_deadline token_function"
         [ "$(sql "SELECT group_concat(name, ' ') FROM (SELECT name FROM sqlite_schema
                   WHERE name LIKE 'token\__%' ESCAPE '\' ORDER BY 1)")" = "$wanted" ]
-        run_waiting "$WRITING" 1 tune --undo
+        run_waiting "$WRITING" tune --undo
         [ "$status$stderr" = 0 ]
         [ "$(sql "PRAGMA journal_mode; SELECT count(*) FROM sqlite_schema WHERE sql LIKE 'CREATE INDEX%'")" = "delete
 0" ]
@@ -173,13 +165,13 @@ TABLE
 @test "reading does not wait for a change that is not being committed yet" {
     a_store
     lock "$WRITING"
-    VEMO_TEST_WAITS=$DIR/none gives 2 list --count
+    gives 2 list --count
     unlock
     tool tune --wal >/dev/null
     lock "$WRITING UPDATE token SET count = 7;"
     gives 5 show "$ID" --field count
     unlock
-    run_waiting "$WRITING UPDATE token SET count = 7;" 1 grant "$ID" Api get
+    run_waiting "$WRITING UPDATE token SET count = 7;" grant "$ID" Api get
     expect 0 granted
     [ "$(stored)" = 6/ ]
     lock "$READING" # with the write-ahead journal, readers block no other program
@@ -225,20 +217,17 @@ warning: expired for more than an hour: 1 token (old${ID:0:5})
 @test "after a first change, the failure of a lock does not say that nothing was changed" {
     a_store
     sql "DELETE FROM token"
+    lock "" # no lock yet
     mkfifo "$DIR/lines"
-    VEMO_TEST_HASTE=1 "$TOOL" import "$DIR/other" - <"$DIR/lines" >"$DIR/out" 2>&1 3>&- &
-    exec 9>"$DIR/lines"
-    local importer=$!
+    exec 5<>"$DIR/lines"
+    VEMO_TEST_HASTE=1 start import "$DIR/other" - <"$DIR/lines" 5>&-
     until [ -s "$DIR/out" ]; do :; done # the first commit is made
-    lock "$EXCLUSIVE"
-    whole </dev/null >&9
-    exec 9>&-
-    status=0 stderr=
-    wait "$importer" || status=$?
+    other "$EXCLUSIVE"
+    whole </dev/null >&5
+    exec 5>&-
+    finish
     unlock
-    output=$(<"$DIR/out")
-    expect 4 "1 token imported
-vemo-access-token: $REAL_DB stayed locked by another process for 5 seconds"
+    expect 4 "1 token imported" "vemo-access-token: $REAL_DB stayed locked by another process for 5 seconds"
 }
 
 # at_once NUMBER ARGUMENTS...: prints what so many runs at the same time print, and their statuses, sorted
@@ -268,8 +257,7 @@ at_once() {
     sql "SELECT tid FROM token ORDER BY 1" | diff "$DIR/created" -
 }
 
-# calling: a program that has read the tokens, opens no transaction and takes no lock. It does what
-# stream 7 says, and ends with it.
+# calling: a program that has read the tokens, opens no transaction and takes no lock
 calling() {
     lock ".timeout 5000
 CREATE TEMP TABLE read AS SELECT * FROM token;"
@@ -284,14 +272,10 @@ until_sql() {
 # the statement gives the number, and ends
 beside_call() {
     calling
-    "$TOOL" "${@:4}" >"$DIR/out" 2>"$DIR/err" 3>&- 7>&- 8<&- &
+    start "${@:4}"
     until_sql "$1" "$2"
-    echo "$3;" >&7
-    unlock
-    status=0
-    wait $! || status=$?
-    output=$(<"$DIR/out")
-    stderr=$(<"$DIR/err")
+    unlock "$3;"
+    finish
 }
 
 @test "a token that a call writes back is revoked again, but no new token" {
@@ -377,14 +361,11 @@ print(written)' "$DB"
 
 @test "a token that calls write back again and again is revoked all the same" {
     id=$(a_token)
-    mkfifo "$DIR/calls"
-    overlapping_calls >"$DIR/calls" 3>&- &
-    exec 5<"$DIR/calls"
+    coproc calls { overlapping_calls 3>&-; }
+    exec 5<&"${calls[0]}"
     read -r -t 20 -u 5 # that the first has read the token
-    run_tool revoke "$id" 5<&-
-    wait $!
+    run_tool revoke "$id"
     read -r -u 5 written
-    exec 5<&-
     [ "$written" -ge 20 ]
     [ "$written" -lt 200 ]
     expect 0 "1 token revoked" "vemo-access-token: a token came back $written times, by calls that do not take the lock, and was revoked again"
@@ -419,21 +400,16 @@ TABLE
 @test "the tool waits for a program that has read a token, and does not name the program when it ends without writing" {
     id=$(a_token)
     calling
-    mkfifo "$DIR/waits"
-    exec 9<>"$DIR/waits"
-    VEMO_TEST_WAITS=$DIR/waits "$TOOL" revoke "$id" >"$DIR/out" 2>&1 3>&- 7>&- 8<&- 9>&- &
+    start revoke "$id"
     until_sql 0 "SELECT count(*) FROM token"
-    echo "$EXCLUSIVE SELECT 'held';" >&7
-    line=
-    read -r -t 20 -u 8 line
+    other "$EXCLUSIVE"
     while read -r -t 0 -u 9; do
         read -r -u 9 # what it had waited for before
     done
     read -r -t 20 -u 9 # to look again
     unlock
-    wait $!
-    exec 9>&-
-    diff "$DIR/out" - <<< "1 token revoked"
+    finish
+    expect 0 "1 token revoked"
 }
 
 @test "a change says so where /proc does not show who may still write back" {
@@ -451,26 +427,20 @@ TABLE
 }
 
 @test "programs that may still write back are named" {
-    pids=()
     first=$(a_token --uses 5)
     second=$(a_token --uses 5)
     calling
-    sleep 60 6<"$DB" 3>&- 7>&- 8<&- &
+    sleep 60 6<"$DB" 3>&- &
     reader=$!
-    "$TOOL" revoke "$first" >"$DIR/out1" 2>&1 3>&- 7>&- 8<&- &
-    pids+=($!)
-    "$TOOL" update "$second" --uses 3 >"$DIR/out2" 2>&1 3>&- 7>&- 8<&- &
-    pids+=($!)
-    wait "${pids[0]}"
-    wait "${pids[1]}"
-    kill "$reader"
-    open=$(printf '%s\n' "$HOLDER:sqlite3" "$reader:sleep" | LC_ALL=C sort | sed -E 's/(.*):(.*)/\2 (process \1)/')
+    open=$(printf '%s\n' "$OTHER:sqlite3" "$reader:sleep" | LC_ALL=C sort | sed -E 's/(.*):(.*)/\2 (process \1)/')
     open="vemo-access-token: ${open/$'\n'/, } had the database open all the time: what it read before can still be written back; look again when it has ended"
+    start revoke "$first"
+    run_tool update "$second" --uses 3
+    expect 0 "1 token updated" "$open"
+    finish
+    expect 0 "1 token revoked" "$open"
+    kill "$reader"
     unlock
-    [ "$(sort "$DIR/out1")" = "1 token revoked
-$open" ]
-    [ "$(sort "$DIR/out2")" = "1 token updated
-$open" ]
     [ "$(sql "SELECT tid || count FROM token")" = "${second}3" ]
 }
 
