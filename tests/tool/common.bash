@@ -6,7 +6,7 @@
 # makes what there is to work on with these:
 #   a_token, row, rows, many_rows, whole
 # and looks at the result with these:
-#   sql, expect_left, state
+#   sql, expect_left, expect_made, state
 
 bats_require_minimum_version 1.5.0
 
@@ -235,6 +235,17 @@ expect_left() {
     left=$(sql "SELECT rtrim(tid, '0') FROM token ORDER BY 1" | xargs)
     echo "there are: $left"
     [ "$left" = "$*" ]
+}
+
+# expect_made: the directory, the file and an empty table are there, as programs expect them, and nothing else
+expect_made() {
+    [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" | xargs)" = "700 700" ]
+    [ "$(ls -A "$VEMO_REDIRECT_DIR")" = vemo-access-token.db ]
+    [ "$(sql "PRAGMA auto_vacuum; SELECT count(*) FROM token; SELECT sql FROM sqlite_schema WHERE name = 'token'")" = "\
+1
+0
+CREATE TABLE token (tid TEXT primary key NOT NULL,bind_sid TEXT,uid INTEGER,deadline INTEGER default -1,\
+count INTEGER default 1,create_time INTEGER default CURRENT_TIMESTAMP,function TEXT NOT NULL,webapi_allow TEXT,extra TEXT)" ]
 }
 
 # state: what there is of the private directory, to the byte

@@ -89,12 +89,6 @@ replace_database() {
     gives "2 tokens imported" import "$1"
 }
 
-# expect_made: the directory, the file and an empty table are there, as programs expect them
-expect_made() {
-    [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" | xargs)" = "700 700" ]
-    [ "$(sql "PRAGMA auto_vacuum; SELECT count(*) FROM token" | xargs)" = "1 0" ]
-}
-
 # remake OLD NEW: another table of tokens in the place of the library's, with one for the other in its statement
 remake() {
     local made

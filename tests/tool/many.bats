@@ -21,9 +21,7 @@ setup() {
     DIR=$BATS_TEST_TMPDIR
     export VEMO_REDIRECT_DIR=$DIR/session
     DB=$VEMO_REDIRECT_DIR/vemo-access-token.db
-    mkdir -m 0700 "$VEMO_REDIRECT_DIR"
-    cp --sparse=never "$BATS_FILE_TMPDIR/many/vemo-access-token.db" "$DB"
-    chmod 0700 "$DB"
+    cp -a --sparse=never "$BATS_FILE_TMPDIR/many" "$VEMO_REDIRECT_DIR"
 }
 
 # beside ARGUMENTS...: runs the tool, with 64 MB in all, beside a program that creates a token each 20 ms. Each creation

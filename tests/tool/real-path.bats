@@ -3,10 +3,7 @@
 
 load common
 
-setup() {
-    DIR=$BATS_TEST_TMPDIR
-    PLAIN=$(realpath "$(dirname "$TOOL")/../../tools/vemo-access-token")
-}
+PLAIN=$(realpath "$(dirname "$TOOL")/../../tools/vemo-access-token")
 
 # As the drop-in for services has it (deployment/systemd), root needs none of its capabilities.
 @test "on the real path a token goes from its creation to its last use, without a capability" {
