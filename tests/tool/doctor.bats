@@ -43,9 +43,10 @@ fresh() {
     cp -rp "$DIR.fresh/." .
 }
 
-# leaves: each line of standard input is "CHANGE|SEVERITY: WHAT|MEANING|REMEDY". After the change of a fresh store,
-# doctor finds that and no more, and leaves all as it is, with --repair too. Where the remedy is commands, they help.
-leaves() {
+# each_is left|mended: each line of standard input is "CHANGE|SEVERITY: WHAT|MEANING|REMEDY". After the change of a fresh
+# store, doctor finds that and no more. --repair mends it; or it leaves all as it is, and the remedy helps, where that is
+# commands.
+each_is() {
     local change finding remedy before
     while IFS='|' read -r change finding; do
         echo "$change"
@@ -53,30 +54,20 @@ leaves() {
         eval "$change"
         before=$(find "$DIR" -printf '%P %i %m %T@ %l\n')
         finds 5 "$finding"
-        finds 5 "$finding" --repair
-        [ "$(find "$DIR" -printf '%P %i %m %T@ %l\n')" = "$before" ]
-        remedy=${finding##*|}
-        case $remedy in
-            "$SAVE_AND_REPLACE") replace_database saved ;;
-            "$REPLACE") replace_database backup ;;
-            *"sqlite3 $REAL_DB"*) eval "sqlite3 $DB${remedy##*"sqlite3 $REAL_DB"}" ;;
-            *) continue ;;
-        esac
-        expect_sound
-    done
-}
-
-# mends: the same, but with --repair all becomes right
-mends() {
-    local change finding
-    while IFS='|' read -r change finding; do
-        echo "$change"
-        fresh
-        eval "$change"
-        finds 5 "$finding"
-        finding=${finding#*: }
-        finds 0 "repaired: ${finding%|*}
-$ALL_RIGHT" --repair
+        if [ "$1" = mended ]; then
+            finding=${finding#*: }
+            finds 0 "repaired: ${finding%|*}"$'\n'"$ALL_RIGHT" --repair
+        else
+            finds 5 "$finding" --repair
+            [ "$(find "$DIR" -printf '%P %i %m %T@ %l\n')" = "$before" ]
+            remedy=${finding##*|}
+            case $remedy in
+                "$SAVE_AND_REPLACE") replace_database saved ;;
+                "$REPLACE") replace_database backup ;;
+                *"sqlite3 $REAL_DB"*) eval "sqlite3 $DB${remedy##*"sqlite3 $REAL_DB"}" ;;
+                *) continue ;;
+            esac
+        fi
         expect_sound
     done
 }
@@ -174,18 +165,15 @@ no findings'
 }
 
 @test "modes that let others in are tightened" {
-    while read -r path name mode; do
-        echo "chmod $mode $path|error: $name has mode $mode|$NOT_PRIVATE|chmod 0700 $name"
-    done >"$DIR.table" <<END
-$VEMO_REDIRECT_DIR $REAL_DIRECTORY 0755
-$VEMO_REDIRECT_DIR $REAL_DIRECTORY 0701
-$VEMO_REDIRECT_DIR $REAL_DIRECTORY 0710
-$DB $REAL_DB 0644
-$DB $REAL_DB 0604
-$DB $REAL_DB 0720
-END
-    echo "install -m 0640 /dev/null $DB-journal|error: $REAL_DB-journal has mode 0640|$NOT_PRIVATE|chmod 0700 $REAL_DB-journal" >>"$DIR.table"
-    mends <"$DIR.table"
+    each_is mended <<TABLE
+chmod 0755 session|error: $REAL_DIRECTORY has mode 0755|$NOT_PRIVATE|chmod 0700 $REAL_DIRECTORY
+chmod 0701 session|error: $REAL_DIRECTORY has mode 0701|$NOT_PRIVATE|chmod 0700 $REAL_DIRECTORY
+chmod 0710 session|error: $REAL_DIRECTORY has mode 0710|$NOT_PRIVATE|chmod 0700 $REAL_DIRECTORY
+chmod 0644 $DB|error: $REAL_DB has mode 0644|$NOT_PRIVATE|chmod 0700 $REAL_DB
+chmod 0604 $DB|error: $REAL_DB has mode 0604|$NOT_PRIVATE|chmod 0700 $REAL_DB
+chmod 0720 $DB|error: $REAL_DB has mode 0720|$NOT_PRIVATE|chmod 0700 $REAL_DB
+install -m 0640 /dev/null $DB-journal|error: $REAL_DB-journal has mode 0640|$NOT_PRIVATE|chmod 0700 $REAL_DB-journal
+TABLE
     [ "$(stat -c %a "$VEMO_REDIRECT_DIR" "$DB" "$DB-journal" | xargs)" = "700 700 700" ]
     chmod 0600 "$DB"
     expect_sound
@@ -194,7 +182,7 @@ END
 @test "owners other than root are replaced" {
     [ "$(id -u)" -eq 0 ] || skip "only root can give files away"
     meaning="its owner can read and change every token, and may have done so"
-    mends <<TABLE
+    each_is mended <<TABLE
 chown 4000000000 $DB|error: $REAL_DB belongs to uid 4000000000|$meaning|chown root $REAL_DB, and look at the tokens
 chown 4000000000:1 session|error: $REAL_DIRECTORY belongs to uid 4000000000|$meaning|chown root $REAL_DIRECTORY, and look at the tokens
 TABLE
@@ -225,7 +213,7 @@ TABLE
             echo "$hide; ln -s nowhere $DB-$suffix|error: $REAL_DB-$suffix is a symbolic link|$journal"
         done
     } >"$DIR.table"
-    leaves <"$DIR.table"
+    each_is left <"$DIR.table"
 
     # Of what is not private, nothing is opened either, and what has other names is not made private.
     fresh
@@ -316,29 +304,23 @@ error: there is no database $REAL_DB|$NO_TOKENS|vemo-access-token init" --repair
 }
 
 @test "a repair does not follow what others change in the middle of it" {
-    while IFS='|' read -r between reason; do
+    # What is repaired first is the journal; or the directory, and then another program takes or removes the other file.
+    journal="install -m 0640 /dev/null $DB-journal"
+    part="chmod 0750 session; install -m 0600 /dev/null session/backup.part"
+    while IFS='|' read -r prepare between failure status_and_mode; do
         fresh
         chmod 0640 "$DB"
-        install -m 0640 /dev/null "$DB-journal" # which is repaired first
+        eval "$prepare"
         VEMO_TEST_CALLS="fchmod|cd $DIR && $between" run_tool doctor --repair
-        [ "$status $stderr" = "5 vemo-access-token: cannot repair: $reason" ]
-        [ "$(stat -L -c %a "$DB")" = 640 ]
+        [ "$stderr" = "${failure:+vemo-access-token: cannot repair: $failure}" ]
+        [ "$status $(stat -L -c %a "$DB")" = "$status_and_mode" ]
     done <<TABLE
-ln $DB second|$REAL_DB has several hard links
-mv $DB second && ln -s $DIR/second $DB|$REAL_DB is a symbolic link; name the place that it leads to
-chmod 0750 session|$REAL_DIRECTORY is not root's alone
-mv session second && ln -s second session|$REAL_DIRECTORY is a symbolic link; name the place that it leads to
-TABLE
-    # What an export has left behind: another program takes it, or it is gone.
-    while IFS='|' read -r between reason; do
-        fresh
-        chmod 0750 "$VEMO_REDIRECT_DIR"
-        install -m 0600 /dev/null "$VEMO_REDIRECT_DIR/backup.part"
-        VEMO_TEST_CALLS="fchmod|$between $VEMO_REDIRECT_DIR/backup.part" run_tool doctor --repair
-        [ "$stderr" = "$reason" ]
-    done <<TABLE
-chmod 0640|vemo-access-token: cannot repair: backup.part: File exists
-rm|
+$journal|ln $DB second|$REAL_DB has several hard links|5 640
+$journal|mv $DB second && ln -s $DIR/second $DB|$REAL_DB is a symbolic link; name the place that it leads to|5 640
+$journal|chmod 0750 session|$REAL_DIRECTORY is not root's alone|5 640
+$journal|mv session second && ln -s second session|$REAL_DIRECTORY is a symbolic link; name the place that it leads to|5 640
+$part|chmod 0640 session/backup.part|backup.part: File exists|5 640
+$part|rm session/backup.part||0 700
 TABLE
 }
 
@@ -368,7 +350,7 @@ error: $REAL_DIRECTORY: Too many levels of symbolic links|$cause"
 
 @test "a file that an export left in the private directory is removed, but not while it is written" {
     part=$VEMO_REDIRECT_DIR/backup.part
-    mends <<<"install -m 0600 /dev/null $part; touch session/x|warning: $REAL_DIRECTORY/backup.part was left behind|an export was cut off; the file can hold whole ids|remove it"
+    each_is mended <<<"install -m 0600 /dev/null $part; touch session/x|warning: $REAL_DIRECTORY/backup.part was left behind|an export was cut off; the file can hold whole ids|remove it"
     [ ! -e "$part" ]
     install -m 0600 /dev/null "$part"
     run flock "$part" "$TOOL" doctor
@@ -385,7 +367,7 @@ $undone" ]
 }
 
 @test "the room that a file system has left is enough for a change and for another file, or is a finding" {
-    leaves <<TABLE
+    each_is left <<TABLE
 export VEMO_TEST_ROOM="65535 1 2 1"|error: the file system of $REAL_DIRECTORY has no room for a change|$NO_CHANGE|remove what is not needed there: "df $REAL_DIRECTORY" tells how full it is
 export VEMO_TEST_ROOM="16 4096 1 0"|error: the file system of $REAL_DIRECTORY has no room for another file|$NO_CHANGE|remove what is not needed there: "df -i $REAL_DIRECTORY" tells how full it is
 TABLE
@@ -487,7 +469,7 @@ sql "ALTER TABLE token RENAME TO other; CREATE VIEW Token AS SELECT * FROM other
 sql "DROP TABLE token; CREATE VIRTUAL TABLE token USING fts4(tid, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra)"|error: a virtual table stands $place|$made_up
 sql "ALTER TABLE token DROP COLUMN extra; ALTER TABLE token RENAME uid TO owner"|error: the table of tokens lacks columns: uid, extra|every call that reads or writes a token fails|$REPLACE
 TABLE
-    leaves <"$DIR.table"
+    each_is left <"$DIR.table"
 }
 
 @test "the library's table in other words is no other table, but one that only looks like it is" {
@@ -531,7 +513,7 @@ TABLE
     runs="it runs in every change that it is for: calls can report what did not happen, change other tokens, fail, or never end"
     index='error: an index on the table of tokens that does not only find them: "i"|changes can fail, and a grant can delete other tokens: those that a unique index takes for the same'
     schema="sqlite3 $REAL_DB '.schema token' shows what it does; sqlite3 $REAL_DB"
-    leaves <<TABLE
+    each_is left <<TABLE
 sql 'CREATE TRIGGER t AFTER INSERT ON token BEGIN DELETE FROM token; END'|$trigger"t"|$runs|$schema 'DROP TRIGGER "t";'
 sql 'CREATE TRIGGER b UPDATE ON token BEGIN SELECT 1; END; CREATE TRIGGER a DELETE ON TOKEN BEGIN SELECT 1; END'|$trigger"a", "b"|$runs|$schema 'DROP TRIGGER "a"; DROP TRIGGER "b";'
 sql 'CREATE TRIGGER "it'\''s ""\$(false)""" UPDATE ON token BEGIN SELECT 1; END'|$trigger"it's "\$(false)""|$runs|$schema 'DROP TRIGGER "it'\''s ""\$(false)""";'
@@ -559,7 +541,7 @@ TABLE
 }
 
 @test "a large table without an index on the deadline is a finding" {
-    leaves <<<"many_rows 9999|warning: 10001 tokens, and no index on their deadline|every call reads the whole table for expired tokens|vemo-access-token tune"
+    each_is left <<<"many_rows 9999|warning: 10001 tokens, and no index on their deadline|every call reads the whole table for expired tokens|vemo-access-token tune"
     sql "CREATE INDEX of_another_column ON token (function, deadline)"
     expect_first "warning: 10001 tokens, and no index on their deadline"
     sql "DROP INDEX of_another_column; CREATE INDEX own ON token (deadline)"
@@ -570,22 +552,22 @@ TABLE
 
 # Journals.
 
-# half_change [WHEN]: a store as it is when a program or the machine stops in the middle of a change: with a journal,
-# of an hour ago, or of then
-half_change() {
-    if [ ! -e "$DIR/half" ]; then
-        many_rows 40 "extra = json_object('data', hex(zeroblob(1000)))"
-        # What does not fit into the cache is written before the end of the change.
-        sqlite3 "$DB" >/dev/null <<SQL
-PRAGMA cache_size = 1;
-BEGIN;
-UPDATE token SET function = 'half', extra = json_object('data', hex(randomblob(1000)));
-.shell cp "$DB" "$DIR/half"; cp "$DB-journal" "$DIR/half-journal"
-ROLLBACK;
+# stopped STATEMENTS: the store as a program leaves it that has executed these, and is stopped then
+stopped() {
+    sqlite3 "$DB" >/dev/null <<SQL
+$1
+.shell cp -a "$VEMO_REDIRECT_DIR" "$DIR/stopped"
 SQL
-    fi
-    cp "$DIR/half" "$DB"
-    cp "$DIR/half-journal" "$DB-journal"
+    rm -r "$VEMO_REDIRECT_DIR"
+    mv "$DIR/stopped" "$VEMO_REDIRECT_DIR"
+}
+
+# half_change [WHEN]: the store as it is in the middle of a change: with a journal, of an hour ago, or of then
+half_change() {
+    [ -e "$DB" ] || many_rows 40 "extra = json_object('data', hex(zeroblob(1000)))"
+    # What does not fit into the cache is written before the end of the change.
+    stopped "PRAGMA cache_size = 1; BEGIN;
+        UPDATE token SET function = 'half', extra = json_object('data', hex(randomblob(1000)));"
     touch -d "${1-1 hour ago}" "$DB-journal"
     grep -q half "$DB"
     [ -s "$DB-journal" ]
@@ -628,15 +610,9 @@ expect_undone() {
 @test "a write-ahead journal that belongs to the database is no finding" {
     row aaaaaaaa
     # Of a program that still has the database open, and of one that was stopped.
-    sqlite3 "$DB" >/dev/null <<SQL
-PRAGMA journal_mode = WAL;
-UPDATE token SET function = 'changed';
-.shell cp "$DB" "$DIR/copy"; cp "$DB-wal" "$DIR/copy-wal"
-.shell "$TOOL" doctor >"$DIR/doctor"
-SQL
+    stopped "PRAGMA journal_mode = WAL; UPDATE token SET function = 'changed';
+.shell \"$TOOL\" doctor >\"$DIR/doctor\""
     [ "$(cat "$DIR/doctor")" = "no findings" ]
-    cp "$DIR/copy" "$DB"
-    cp "$DIR/copy-wal" "$DB-wal"
     touch -d "1 hour ago" "$DB-wal"
     expect_sound
     [ "$(sql "SELECT function FROM token")" = changed ]
@@ -645,13 +621,8 @@ SQL
 @test "a write-ahead journal that does not belong to the database is left to the administrator, and not mixed into it" {
     row aaaaaaaa
     cp "$DB" "$DIR/backup"
-    sqlite3 "$DB" >/dev/null <<SQL
-PRAGMA journal_mode = WAL;
-UPDATE token SET function = 'changed';
-.shell cp "$DB-wal" "$DIR/copy-wal"
-SQL
+    stopped "PRAGMA journal_mode = WAL; UPDATE token SET function = 'changed';"
     cp "$DIR/backup" "$DB"
-    cp "$DIR/copy-wal" "$DB-wal"
     run_tool doctor
     [ "$status" -eq 5 ]
     cmp "$DB" "$DIR/backup"
@@ -722,16 +693,14 @@ warning: JSON of more than 100 levels in 2 tokens (deep---1, deep---2)|a program
 }
 
 @test "an id that no call can name is left to the administrator, and its token can be deleted" {
-    condition="typeof(tid) = 'text' AND (tid = '' OR instr(tid, char(0)))"
+    finding="error: an id that is empty or holds a NUL byte in 1 token"
     unnamed="no call can name such a token: it is listed, but cannot be granted or revoked"
-    while IFS='|' read -r value shown; do
-        echo "sql \"UPDATE token SET tid = $value WHERE tid LIKE 'a%'\"|error: an id that is empty or holds a NUL byte in 1 token ($shown)|$unnamed|sqlite3 $REAL_DB \"DELETE FROM token WHERE $condition\""
-    done >"$DIR.table" <<TABLE
-''|
-replace('N$ZEROS$ZEROS', 'N', char(0))|
-replace('aaaaaaaaN$ZEROS', 'N', char(0))|aaaaaaaa
+    remedy="sqlite3 $REAL_DB \"DELETE FROM token WHERE typeof(tid) = 'text' AND (tid = '' OR instr(tid, char(0)))\""
+    each_is left <<TABLE
+sql "UPDATE token SET tid = '' WHERE tid LIKE 'a%'"|$finding ()|$unnamed|$remedy
+sql "UPDATE token SET tid = replace('N$ZEROS$ZEROS', 'N', char(0)) WHERE tid LIKE 'a%'"|$finding ()|$unnamed|$remedy
+sql "UPDATE token SET tid = replace('aaaaaaaaN$ZEROS', 'N', char(0)) WHERE tid LIKE 'a%'"|$finding (aaaaaaaa)|$unnamed|$remedy
 TABLE
-    leaves <"$DIR.table"
     expect_left bbbbbbbb
 }
 
@@ -746,7 +715,7 @@ null---5|extra = NULL
 null---6|webapi_allow = '[]', extra = NULL
 null---7|webapi_allow = '[]', uid = NULL
 END
-    mends <<<"rows <$DIR.rows|error: a NULL in 8 tokens (null---0, null---1, null---2, null---3, null---4, ...)|such a token cannot be read or granted, and every listing that meets it fails|delete them: vemo-access-token doctor --repair"
+    each_is mended <<<"rows <$DIR.rows|error: a NULL in 8 tokens (null---0, null---1, null---2, null---3, null---4, ...)|such a token cannot be read or granted, and every listing that meets it fails|delete them: vemo-access-token doctor --repair"
     expect_left aaaaaaaa bbbbbbbb
 }
 
