@@ -61,8 +61,7 @@ made the table of tokens" init
     while IFS='|' read -r call act sentence; do
         rm -rf "$VEMO_REDIRECT_DIR"
         VEMO_TEST_CALLS="$call|$act" run_tool init
-        [ "$status" -eq 4 ]
-        [ "$stderr" = "vemo-access-token: $sentence" ]
+        [ "$status $stderr" = "4 vemo-access-token: $sentence" ]
         [ ! -e "$DB" ]
     done <<TABLE
 open /|24|/: Too many open files

@@ -146,18 +146,15 @@ TABLE
 
 @test "tuning that had to wait is done" {
     a_store
+    journal_and_indexes="PRAGMA journal_mode; SELECT name FROM sqlite_schema WHERE sql LIKE 'CREATE INDEX%' ORDER BY 1"
     for kind in EXCLUSIVE WRITING READING; do
         run_waiting "${!kind}" tune --wal
         [ "$status$stderr" = 0 ]
         [[ $(grep "^journal" <<<"$output") =~ ^journal\ +delete\ +wal$ ]]
-        [ "$(sql "PRAGMA journal_mode")" = wal ]
-        wanted="token_bind_sid token_deadline token_function"
-        [ "$(sql "SELECT group_concat(name, ' ') FROM (SELECT name FROM sqlite_schema
-                  WHERE name LIKE 'token\__%' ESCAPE '\' ORDER BY 1)")" = "$wanted" ]
+        [ "$(sql "$journal_and_indexes" | xargs)" = "wal token_bind_sid token_deadline token_function" ]
         run_waiting "$WRITING" tune --undo
         [ "$status$stderr" = 0 ]
-        [ "$(sql "PRAGMA journal_mode; SELECT count(*) FROM sqlite_schema WHERE sql LIKE 'CREATE INDEX%'")" = "delete
-0" ]
+        [ "$(sql "$journal_and_indexes")" = delete ]
     done
     [ "$(stored)" = "5/old 5/" ]
 }
@@ -204,9 +201,7 @@ TABLE
             chmod 0755 "$VEMO_REDIRECT_DIR"
             VEMO_TEST_HASTE=1 run_tool doctor --repair
             [ "$status ${lines[0]}" = "5 repaired: $REAL_DIRECTORY has mode 0755" ]
-            [[ $output == *"
-warning: expired for more than an hour: 1 token (old${ID:0:5})
-"* ]]
+            [[ $output == *$'\n'"warning: expired for more than an hour: 1 token (old${ID:0:5})"$'\n'* ]]
             [[ $stderr == *"$locked"* ]]
             cmp "$DB" "$DIR/before"
         fi
@@ -354,8 +349,6 @@ for written in range(200):
         break
     call.close()
     call = following
-else:
-    written = 200
 print(written)' "$DB"
 }
 
@@ -367,7 +360,7 @@ print(written)' "$DB"
     run_tool revoke "$id"
     read -r -u 5 written
     [ "$written" -ge 20 ]
-    [ "$written" -lt 200 ]
+    [ "$written" -lt 199 ]
     expect 0 "1 token revoked" "vemo-access-token: a token came back $written times, by calls that do not take the lock, and was revoked again"
     [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
 }

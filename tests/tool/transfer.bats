@@ -12,6 +12,7 @@ NAMELESS='openat O_TMPFILE|95'
 
 # written LETTER...: what export writes of these tokens, without the end
 written() {
+    # shellcheck disable=SC2059 # the letters are what it formats
     printf "$LINE" "$@"
 }
 
@@ -128,9 +129,7 @@ TABLE
         fails 2 "$file belongs to the database; choose another name" export "$file"
     done
     cmp "$DB" "$DIR/before"
-    [ "$(ls "$VEMO_REDIRECT_DIR")" = "${DB##*/}
-${DB##*/}-backup
-${DB##*/}-wal" ]
+    [ "$(cd "$VEMO_REDIRECT_DIR" && echo ./*)" = "./${DB##*/} ./${DB##*/}-backup ./${DB##*/}-wal" ]
     # In other directories any name may be used.
     for file in "$DIR/${DB##*/}" "$DIR/vemo-access-token.lock" "$VEMO_REDIRECT_DIR/backup"; do
         fails 0 "1 token exported" export "$file"
@@ -194,7 +193,8 @@ TABLE
     mkdir "$DIR/out"
     VEMO_TEST_CALLS="fdopen|ls $DIR/out >$DIR/names" fails 0 "1 token exported" export "$DIR/out/file"
     [ ! -s "$DIR/names" ]
-    VEMO_TEST_CALLS="renameat file.part|! flock -ns $DIR/out/file.part true" fails 0 "1 token exported" export "$DIR/out/file"
+    VEMO_TEST_CALLS="renameat file.part|! flock -ns $DIR/out/file.part true" \
+        fails 0 "1 token exported" export "$DIR/out/file"
     install -m 0600 /dev/null "$DIR/out/file.part" # what another one has left behind
     VEMO_TEST_CALLS="$NAMELESS
 fdopen|ls $DIR/out >$DIR/names; ! flock -ns $DIR/out/file.part true" fails 0 "1 token exported" export "$DIR/out/file"
