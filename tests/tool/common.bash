@@ -122,14 +122,16 @@ on_terminal() {
 OVERLAY='mount -t tmpfs tmpfs "$0" && mkdir "$0/upper" "$0/work" &&
     mount -t overlay overlay -o "lowerdir=/usr,upperdir=$0/upper,workdir=$0/work" /usr && mount -t tmpfs tmpfs /run'
 
-# in_namespace COMMANDS ARGUMENTS...: bash executes them as root of such a namespace; there the tool works on the real
-# paths, and nothing is there yet. What is not root maps itself alone to root.
+# in_namespace COMMANDS [ARGUMENTS...]: bash executes them as root of such a namespace. There "tool" works on the real
+# paths, $REAL_DIRECTORY and $REAL_DB, and nothing is there yet. What is not root maps itself alone to root.
 in_namespace() {
     local namespace=(unshare --mount --propagation private)
     [ "$(id -u)" -eq 0 ] || namespace=(unshare --mount --user --map-root-user)
     [ ! -e /usr/vemo ] || skip "/usr/vemo exists"
     mkdir -p "$DIR/layer"
     "${namespace[@]}" bash -c "$OVERLAY" "$DIR/layer" 2>/dev/null || skip "no namespace with an overlay here"
+    export -f tool
+    export TOOL REAL_DIRECTORY REAL_DB
     run --separate-stderr "${namespace[@]}" bash -c "unset VEMO_REDIRECT_DIR; $OVERLAY; $1" "$DIR/layer" "${@:2}"
 }
 

@@ -43,9 +43,9 @@ fresh() {
     cp -rp "$DIR.fresh/." .
 }
 
-# each_is left|mended: each line of standard input is "CHANGE|SEVERITY: WHAT|MEANING|REMEDY". After the change of a fresh
-# store, doctor finds that and no more. --repair mends it; or it leaves all as it is, and the remedy helps, where that is
-# commands.
+# each_is left|mended: each line of standard input is "CHANGE|SEVERITY: WHAT|MEANING|REMEDY". After the change of a
+# fresh store, doctor finds that and no more. --repair mends it; or it leaves all as it is, and the remedy helps, where
+# that is commands.
 each_is() {
     local change finding remedy before
     while IFS='|' read -r change finding; do
@@ -254,14 +254,14 @@ error: $REAL_DB is immutable|$NO_CHANGE|chattr -i $REAL_DB" --repair || wrong=1
 }
 
 @test "a place that cannot be written to is left to the administrator, and a repair that fails is reported" {
-    in_namespace '"$1" init >/dev/null && chmod 0755 "$3" && chmod 0750 "$2" && mount --bind "$2" "$2" &&
-        mount -o remount,bind,ro "$2" && "$1" doctor --repair' "$TOOL" "$REAL_DB" "$REAL_DIRECTORY"
+    in_namespace 'tool init >/dev/null && chmod 0755 "$REAL_DIRECTORY" && chmod 0750 "$REAL_DB" &&
+        mount --bind "$REAL_DB" "$REAL_DB" && mount -o remount,bind,ro "$REAL_DB" && tool doctor --repair'
     found 5 "repaired: $REAL_DIRECTORY has mode 0755|$NOT_PRIVATE
 error: $REAL_DB has mode 0750|$NOT_PRIVATE|chmod 0700 $REAL_DB
 error: $REAL_DB cannot be written to: Read-only file system|$NO_CHANGE|make the file system writable, or the file" \
         "cannot repair: $REAL_DB: Read-only file system"
-    in_namespace '"$1" init >/dev/null && chmod 0755 "$2" && mount -o remount,ro /usr && "$1" doctor --repair' \
-        "$TOOL" "$REAL_DIRECTORY"
+    in_namespace 'tool init >/dev/null && chmod 0755 "$REAL_DIRECTORY" &&
+        mount -o remount,ro /usr && tool doctor --repair'
     found 5 "error: $REAL_DIRECTORY has mode 0755|$NOT_PRIVATE|chmod 0700 $REAL_DIRECTORY
 error: $REAL_DIRECTORY cannot be written to: Read-only file system|$NO_CHANGE|make the file system writable, or the directory" \
         "cannot repair: $REAL_DIRECTORY: Read-only file system"
@@ -269,9 +269,9 @@ error: $REAL_DIRECTORY cannot be written to: Read-only file system|$NO_CHANGE|ma
 
 @test "directories above that others can change are left to the administrator" {
     # Nothing below is opened: the missing table is neither reported nor mended.
-    in_namespace 'mkdir /usr/vemo && chmod 0777 /usr/vemo && "$1" init >/dev/null && sqlite3 "$2" "DROP TABLE token" &&
-        chmod 0755 "${2%/*}" && ! "$1" doctor --repair && mv /usr/vemo /usr/elsewhere && ln -s elsewhere /usr/vemo &&
-        "$1" doctor' "$TOOL" "$REAL_DB"
+    in_namespace 'mkdir /usr/vemo && chmod 0777 /usr/vemo && tool init >/dev/null && chmod 0755 "$REAL_DIRECTORY" &&
+        sqlite3 "$REAL_DB" "DROP TABLE token" && ! tool doctor --repair &&
+        mv /usr/vemo /usr/elsewhere && ln -s elsewhere /usr/vemo && tool doctor'
     found 5 "warning: /usr/vemo belongs to uid 0 and has mode 0777|others than root can replace the private directory below it\
 |chown root /usr/vemo && chmod go-w /usr/vemo
 error: $REAL_DIRECTORY has mode 0755|$NOT_PRIVATE|chmod 0700 $REAL_DIRECTORY
@@ -281,8 +281,7 @@ error: /usr/vemo is a symbolic link|the tokens stand elsewhere, or nowhere\
 
 @test "a repair that does not help is reported, and not called one" {
     echo '#include <errno.h>
-        int chmod() { return 0; } int fchmod() { return 0; } int fchmodat() { return 0; }
-        int unlinkat() { errno = EPERM; return -1; }' |
+        int fchmod() { return 0; } int unlinkat() { errno = EPERM; return -1; }' |
         cc -shared -fPIC -w -fno-builtin -x c -o "$DIR.no-chmod.so" - || skip "no C compiler"
     fresh
     chmod 0750 "$DB"
@@ -325,8 +324,8 @@ TABLE
 }
 
 @test "a user who can change a directory above gets nothing from root in the middle of a repair" {
-    in_namespace '"$1" init >/dev/null && chmod 0640 "$2" && install -m 0640 /dev/null "$2-journal" &&
-        VEMO_TEST_CALLS="fchmod|chmod 0777 /usr/vemo/etc" "$1" doctor --repair || stat -c %a "$2"' "$TOOL" "$REAL_DB"
+    in_namespace 'tool init >/dev/null && chmod 0640 "$REAL_DB" && install -m 0640 /dev/null "$REAL_DB-journal" &&
+        VEMO_TEST_CALLS="fchmod|chmod 0777 /usr/vemo/etc" tool doctor --repair || stat -c %a "$REAL_DB"'
     [ "${lines[-1]}" = 640 ]
     [ "$stderr" = "vemo-access-token: cannot repair: others than root can change /usr/vemo/etc" ]
 }

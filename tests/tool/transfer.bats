@@ -137,8 +137,8 @@ TABLE
 }
 
 @test "an export does not take the place of the lock, even while there is none" {
-    in_namespace '"$1" init >/dev/null && rm /run/* &&
-        "$1" export /run/another.lock && "$1" export /run/vemo-access-token.lock' "$TOOL"
+    in_namespace 'tool init >/dev/null && rm /run/* &&
+        tool export /run/another.lock && tool export /run/vemo-access-token.lock'
     expect 2 "" "vemo-access-token: 0 tokens exported
 vemo-access-token: /run/vemo-access-token.lock belongs to the database; choose another name"
 }
