@@ -27,14 +27,13 @@ setup() {
 # beside ARGUMENTS...: runs the tool, with 64 MB in all, beside a program that creates a token each 20 ms. Each creation
 # is made, and none waits for a second.
 beside() {
-    local creations absent calls longest there
+    local creations calls longest there
     coproc creations { exec "$VEMO_TEST_CREATIONS"; }
     local pid=$!
-    # shellcheck disable=SC2154 # coproc sets it
-    exec {absent}>&"${creations[1]}" 4<&"${creations[0]}"
+    exec 4<&"${creations[0]}"
     status=0
     (ulimit -v 64000 && exec "$TOOL" "$@") >"$DIR/output" 2>"$DIR/stderr" 3>&- 4<&- || status=$?
-    eval "exec {absent}>&- ${creations[1]}>&-"
+    eval "exec ${creations[1]}>&-"
     read -r calls longest <&4
     exec 4<&-
     there=$(sql "SELECT count(*) FROM token WHERE function = 'beside-$pid'")
