@@ -267,9 +267,7 @@ beside_call() {
 @test "a token that a call writes back is revoked again, but no new token" {
     id=$(a_token)
     while IFS='|' read -r arguments tokens times; do
-        [[ $arguments != *--uid* ]] || sql "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 8)
-            INSERT INTO token SELECT i || tid, bind_sid, uid, deadline, count, create_time, function, webapi_allow, extra
-            FROM token, n"
+        [[ $arguments != *--uid* ]] || many_rows 8
         beside_call 0 "SELECT count(*) FROM token" "CREATE TEMP TABLE new AS SELECT * FROM read;
             UPDATE new SET tid = 'new' || tid; INSERT INTO token SELECT * FROM read UNION ALL SELECT * FROM new" $arguments
         expect 0 "$tokens revoked" "vemo-access-token: a token came back $times, by calls that do not take the lock, and was revoked again"
@@ -369,8 +367,8 @@ print(written)' "$DB"
     id=$(a_token)
     while IFS='|' read -r error reason; do
         uses=$((uses + 1))
-        VEMO_TEST_CALLS="opendir /proc/|$error" run_tool update "$id" --uses $uses
-        expect 4 "" "vemo-access-token: /proc/: $reason; the change was made, but calls that were under way can have undone it"
+        VEMO_TEST_CALLS="opendir /proc/|$error" fails 4 "/proc/: $reason; the change was made, but calls that were \
+under way can have undone it" update "$id" --uses $uses
         [ "$(sql "SELECT count FROM token")" -eq $uses ]
     done <<'TABLE'
 12|Cannot allocate memory
@@ -452,8 +450,7 @@ TABLE
 @test "a lock that others could hold is refused, and found" {
     a_token >/dev/null
     chmod 0601 "$VEMO_REDIRECT_DIR.lock"
-    run_tool purge
-    expect 4 "" "vemo-access-token: /run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs"
+    fails 4 "/run/vemo-access-token.lock is not root's alone, and others could hold the lock for ever; remove it while no program that uses tokens runs" purge
     ends 5 "error: /run/vemo-access-token.lock is not root's alone: it belongs to uid 0 and has mode 0601
     meaning: others can hold the lock for ever; programs that take it refuse this file
     remedy: remove it while no program that uses tokens runs" doctor
