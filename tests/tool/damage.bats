@@ -22,13 +22,11 @@ a_store() {
 # all_fail SENTENCE [PATTERN]: the commands that match the pattern end with that, and leave everything as it was
 all_fail() {
     local before arguments
-    [ ! -f "$DB" ] || cp -f "$DB" "$DIR/before"
-    before=$(ls -Al "$VEMO_REDIRECT_DIR" 2>&1 || true)
+    before=$(state)
     while read -r arguments; do
         fails 4 "$1" $arguments </dev/null
     done < <(calls | grep -E -- "${2-.}")
-    [ ! -f "$DB" ] || cmp "$DB" "$DIR/before"
-    [ "$(ls -Al "$VEMO_REDIRECT_DIR" 2>&1 || true)" = "$before" ]
+    [ "$(state)" = "$before" ]
     [ ! -e "$DIR/exported" ]
 }
 

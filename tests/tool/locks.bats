@@ -116,20 +116,18 @@ TABLE
 
 @test "create prints the id of a token that had to wait" {
     tool init
-    for kind in EXCLUSIVE READING; do
+    trap '' HUP # a signal that the caller ignores does not interrupt it
+    while read -r kind SIGNAL; do
         run_waiting "${!kind}" create --uid 0 --function VPN --allow Api
         [ "$status$stderr" = 0 ]
         [ "$(sql "SELECT tid FROM token")" = "$output" ]
         sql "DELETE FROM token"
-    done
-    # A signal that its caller ignores does not interrupt it.
-    trap '' HUP
-    SIGNAL=HUP run_waiting "$READING" create --uid 0 --function VPN --allow Api
-    trap - HUP
-    [ "$status" -eq 0 ]
-    [ "$(sql "SELECT tid FROM token")" = "$output" ]
+    done <<'TABLE'
+EXCLUSIVE
+READING
+READING HUP
+TABLE
     # A signal that interrupts it leaves no token whose id nobody knows.
-    sql "DELETE FROM token"
     SIGNAL=TERM run_waiting "$READING" create --uid 0 --function VPN --allow Api
     expect 143 "" "vemo-access-token: interrupted; the token was taken back"
     [ "$(sql "SELECT count(*) FROM token")" -eq 0 ]
