@@ -17,13 +17,6 @@ setup_file() {
     "$VEMO_TEST_TOOL" export "$BATS_FILE_TMPDIR/exported" 2>/dev/null
 }
 
-setup() {
-    DIR=$BATS_TEST_TMPDIR
-    export VEMO_REDIRECT_DIR=$DIR/session
-    DB=$VEMO_REDIRECT_DIR/vemo-access-token.db
-    cp -a --sparse=never "$BATS_FILE_TMPDIR/many" "$VEMO_REDIRECT_DIR"
-}
-
 # beside ARGUMENTS...: runs the tool, with 64 MB in all, beside a program that creates a token each 20 ms. Each creation
 # is made, and none waits for a second.
 beside() {
@@ -43,6 +36,7 @@ beside() {
 }
 
 @test "reading many tokens takes little memory and holds nobody up" {
+    cp -a --sparse=never "$BATS_FILE_TMPDIR/many" "$VEMO_REDIRECT_DIR"
     while read -r lines arguments; do
         # shellcheck disable=SC2086 # several arguments
         beside $arguments
@@ -62,6 +56,7 @@ END
 }
 
 @test "changing many tokens goes in steps, which can be repeated" {
+    cp -a --sparse=never "$BATS_FILE_TMPDIR/many" "$VEMO_REDIRECT_DIR"
     beside revoke --created-before @1000010000 --yes
     [ "$(cat "$DIR/output")" = "9999 tokens revoked" ]
     [ "$(sql "SELECT count(*) FROM token WHERE create_time < 1000010000")" = 0 ]
@@ -95,10 +90,7 @@ command can be repeated without harm" && $stderr != *nothing* ]]
 }
 
 @test "large tokens take little memory, too" {
-    sql "DELETE FROM token;
-        WITH RECURSIVE c(n) AS (SELECT 1 UNION ALL SELECT n + 1 FROM c WHERE n < 600)
-        INSERT INTO token SELECT printf('%0127d', n), '', 0, 1990000000, 1, 1, 'f', '{}',
-            '{\"a\":\"' || n || printf('%0100000d', 1) || '\"}' FROM c"
+    many_rows 600 "extra = '{\"a\":\"' || rowid || printf('%0100000d', 1) || '\"}'"
     [ "$(ulimit -v 64000 && "$TOOL" export 2>/dev/null | wc -l)" = 601 ]
     (ulimit -v 64000 && "$TOOL" doctor >/dev/null)
 }

@@ -16,11 +16,6 @@ written() {
     printf "$LINE" "$@"
 }
 
-all_rows() {
-    sql "SELECT hex(tid), hex(bind_sid), uid, deadline, count, create_time, hex(function), hex(webapi_allow), hex(extra)
-         FROM token ORDER BY tid"
-}
-
 # --- export
 
 @test "export writes each token as a line of JSON, its id included, and an end, and purges nothing" {
@@ -296,12 +291,14 @@ vemo-access-token: 1 token exported; without 2 tokens, the export has no end; \"
 @test "tokens come back from an export as they were, whatever they hold" {
     row without-id "tid = '', deadline = 1"
     /usr/bin/python3 "$BATS_TEST_DIRNAME/odd_rows.py" "$DB"
-    all_rows >"$DIR/rows"
+    all="SELECT hex(tid), hex(bind_sid), uid, deadline, count, create_time, hex(function), hex(webapi_allow), hex(extra)
+         FROM token ORDER BY tid"
+    sql "$all" >"$DIR/rows"
     [ "$(wc -l <"$DIR/rows")" -gt 250 ]
     tool export "$DIR/file"
     sql "DELETE FROM token"
     tool import "$DIR/file"
-    all_rows | cmp "$DIR/rows" -
+    sql "$all" | cmp "$DIR/rows" -
     tool export "$DIR/again"
     cmp "$DIR/file" "$DIR/again"
 }
