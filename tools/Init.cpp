@@ -6,6 +6,7 @@
 #include "Console.h"
 #include "Failure.h"
 #include "Place.h"
+#include "Signals.h"
 #include "Store.h"
 
 namespace {
@@ -24,6 +25,7 @@ Made makeStore()
 
 int init()
 {
+    const tool::EndingPause pause; // from the first change to the line about all of them
     const bool blDirectory = tool::makeDirectory();
     if (blDirectory) {
         tool::settleChange();

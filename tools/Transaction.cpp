@@ -137,6 +137,7 @@ Transaction::Transaction(Access access, Missing missing) : m_access(access)
         lock();
     }
     if (Missing::Make == missing && !statusOf(VEMO_ATOKEN_DB_PATH)) {
+        holdSignals();
         m_blMadeFile = makeFile();
         settleChange();
     }
@@ -184,17 +185,31 @@ void Transaction::lock()
 
 void Transaction::commit()
 {
-    const uint64_t nChanges = number("SELECT total_changes()");
-    m_blCommitting = 0 != nChanges;
-    m_pause.emplace();
+    if (0 != number("SELECT total_changes()")) {
+        commitChange();
+        return;
+    }
+    holdSignals();
     query("COMMIT");
-    if (0 != nChanges) {
-        settleChange();
-    } else {
-        if (audit::hasNotes()) {
-            audit::made(); // a grant of an unlimited token, which changes nothing
-        }
-        syncDirectory("a power cut can undo what others changed last");
+    if (audit::hasNotes()) {
+        audit::made(); // a grant of an unlimited token, which changes nothing
+    }
+    syncDirectory("a power cut can undo what others changed last");
+}
+
+void Transaction::commitChange()
+{
+    holdSignals();
+    m_blCommitting = true;
+    query("COMMIT");
+    m_blCommitting = false;
+    settleChange();
+}
+
+void Transaction::holdSignals()
+{
+    if (!m_pause) {
+        m_pause.emplace();
     }
 }
 
@@ -270,8 +285,7 @@ bool Transaction::makeTable()
     query("PRAGMA auto_vacuum = FULL"); // as in the library; has no effect within a transaction
     query("BEGIN IMMEDIATE");
     require(m_db.createTable()); // does nothing if another program has just made it
-    query("COMMIT");
-    settleChange();
+    commitChange();
     return true;
 }
 

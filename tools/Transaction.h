@@ -43,6 +43,13 @@ public:
     // the lock must wait until this object is destroyed.
     void commit();
 
+    // The same for a change of the structure, of which SQLite counts no rows.
+    void commitChange();
+
+    // From now on, a signal that would end the process waits until this object is destroyed and the system
+    // log has the line about the change.
+    void holdSignals();
+
     // What has the name of the table of tokens: "table", "view" or "virtual table"; "" for nothing.
     std::string tableKind();
 

@@ -99,16 +99,19 @@ std::vector<std::string> statements(const Options& options)
 void execute(Schema& schema, const Options& options, tool::Progress& progress)
 {
     const std::string strJournal = options.blUndo ? "delete" : "wal";
-    const std::vector<std::string> strStatements = statements(options);
-    for (const std::string& strStatement : strStatements) {
-        const std::string strResult = schema.run(strStatement);
-        // Only the statement for the journal returns a row. It can have no effect without reporting an error.
-        if (!strResult.empty() && strResult != strJournal) {
+    if (options.blUndo || options.blWal) {
+        schema.holdSignals(); // the statement for the journal commits by itself
+    }
+    for (const std::string& strStatement : statements(options)) {
+        if (strStatement == "COMMIT") {
+            schema.commitChange();
+        } else if (const std::string strResult = schema.run(strStatement); strResult == strJournal) {
+            tool::settleChange();
+        } else if (!strResult.empty()) {
+            // Only the statement for the journal returns a row. It can have no effect without reporting an
+            // error.
             throw tool::Failure(tool::EXIT_STATUS_STORE,
                                 "the journal cannot be made \"" + strJournal + "\" here");
-        }
-        if (!strResult.empty() || strStatement == "COMMIT") {
-            tool::settleChange();
         }
         progress.step();
     }
@@ -140,8 +143,17 @@ std::pair<Figures, Figures> change(const Options& options)
     tool::Progress progress("Tuning", [&options] { return statements(options).size(); });
     Schema schema(Store::Access::Locked);
     const Figures before = measured(schema, true);
-    execute(schema, options, progress);
-    return {before, measured(schema, true)};
+    try {
+        execute(schema, options, progress);
+        return {before, measured(schema, true)};
+    } catch (const tool::Failure& failure) {
+        if (!tool::hasChanged() || failure.what() != failure.fact()) {
+            throw; // nothing has changed, or the sentence says what has
+        }
+        throw tool::Failure(
+            failure.status(), failure.fact(),
+            "the store has changed: \"vemo-access-token tune --dry-run\" shows it as it is now");
+    }
 }
 
 int tune(const Options& options)

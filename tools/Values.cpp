@@ -6,9 +6,11 @@
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
+#include <cstdio>
 #include <cstring>
 #include <ctime>
 #include <map>
+#include <memory>
 
 #include "AccessTokenDefine.h"
 #include "Failure.h"
@@ -92,6 +94,23 @@ std::string userOfNumber(Json::Int64 nUid)
     return "user of the number " + std::to_string(nUid);
 }
 
+// Fails if /etc/passwd has the user, or cannot be read. Where another user database follows that file, the C
+// library looks on there, and then only says that it has found nobody.
+void requireNotInFile(uid_t uid)
+{
+    const std::unique_ptr<FILE, int (*)(FILE*)> pFile(fopen("/etc/passwd", "re"), fclose);
+    const struct passwd* pEntry = nullptr;
+    do {
+        pEntry = pFile ? fgetpwent(pFile.get()) : nullptr;
+    } while (pEntry && pEntry->pw_uid != uid);
+    if (pEntry || !pFile || 0 != ferror(pFile.get())) {
+        throw tool::Failure(tool::EXIT_STATUS_STORE,
+                            "the " + userOfNumber(uid) + " could not be looked up: /etc/passwd " +
+                                (pEntry ? "has it, but the user database does not"
+                                        : "cannot be read: " + std::string(strerror(errno))));
+    }
+}
+
 // Reads the decimal number at the beginning of a text, and moves szText past it. Nothing if there is none.
 std::optional<int64_t> readNumber(const char*& szText, const char* szEnd)
 {
@@ -146,7 +165,11 @@ std::optional<std::string> findUserName(Json::Int64 nUid)
     }
     const auto found =
         lookUp(userOfNumber(nUid), [uid](auto... arguments) { return getpwuid_r(uid, arguments...); });
-    return found ? std::optional(found->strName) : std::nullopt;
+    if (!found) {
+        requireNotInFile(uid);
+        return std::nullopt;
+    }
+    return found->strName;
 }
 
 std::string userName(Json::Int64 nUid)

@@ -125,6 +125,40 @@ o'); END"
 another line: 3 free" ]
 }
 
+@test "a change of the structure has its line, and its sentence, whatever comes in the middle" {
+    # An unlink() that ends the tool before the removal of a journal with this number, or fails if that is negative. Each
+    # change removes its journal; tune measures five small changes before its own, and five after it.
+    cc -shared -fPIC -x c -o "$DIR/unlink.so" - <<'END' || skip "no C compiler"
+#include <errno.h>
+#include <signal.h>
+#include <stdlib.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+int unlink(const char* szFile)
+{
+    static int nUnlinked = 0;
+    const int nAt = atoi(getenv("AT"));
+    ++nUnlinked;
+    if (nUnlinked == nAt) {
+        raise(SIGTERM);
+    }
+    errno = EIO;
+    return nUnlinked == -nAt ? -1 : (int)syscall(SYS_unlink, szFile);
+}
+END
+    begin_log
+    while IFS='|' read -r at arguments; do
+        AT=$at LD_PRELOAD=$DIR/unlink.so run_tool $arguments
+        [ "$status" -eq 143 ]
+        [ "$(logged)" = "${arguments%% *}: the store was changed" ]
+    done <<<$'1|init\n6|tune\n9|tune\n6|tune --undo\n6|tune --wal'
+    tool tune --undo >/dev/null
+    logged >/dev/null
+    AT=-7 LD_PRELOAD=$DIR/unlink.so fails 4 \
+        "$REAL_DB failed: disk I/O error; the store has changed: \"vemo-access-token tune --dry-run\" shows it as it is now" tune
+    [ "$(logged | grep -v '^another line: 3 ')" = "tune: the store was changed" ]
+}
+
 @test "a line shows no whole id, and no character that could make two lines of one" {
     row short "tid = 'short'"
     row odd----- "tid = char(10) || 'by uid' || tid"

@@ -101,7 +101,7 @@ END
     ends 1 '{"granted":false,"reason":"method not listed"}' grant "token---$ZEROS" Api put -o json --print-user
     ends 1 '{"granted":false,"reason":"unknown token"}' grant token--- Api get -o json
     [ "$(uses)" = "token---|2" ]
-    VEMO_TEST_LOOKUP=0 fails 4 "granted, but there is no user of the number 0" \
+    VEMO_TEST_LOOKUP=5 fails 4 "granted, but the user of the number 0 could not be looked up: Input/output error" \
         grant "token---$ZEROS" Api -o json --print-user
     # The last use shows the token, too.
     gives "{\"granted\":true,\"reason\":\"\",\"token\":${record/:3,/:1,}}" grant "token---$ZEROS" Api get -o json

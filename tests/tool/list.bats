@@ -234,7 +234,14 @@ END
 
 @test "no owner counts as gone when users cannot be looked up" {
     row token---
-    VEMO_TEST_LOOKUP=5 fails 4 "the user of the number 0 could not be looked up: Input/output error" list --no-owner
+    failed="the user of the number 0 could not be looked up:"
+    VEMO_TEST_LOOKUP=5 fails 4 "$failed Input/output error" list --no-owner
+    VEMO_TEST_LOOKUP=0 fails 4 "$failed /etc/passwd has it, but the user database does not" list --no-owner
+    sql "UPDATE token SET uid = 4000000000"
+    VEMO_TEST_LOOKUP=0 gives 1 list --no-owner --count
+    in_namespace '(tool init && tool create --uid 0 --function VPN --allow Api) >/dev/null && mount -t tmpfs tmpfs /etc &&
+        tool revoke --no-owner --yes'
+    expect 4 "" "vemo-access-token: $failed /etc/passwd cannot be read: No such file or directory"
 }
 
 @test "CSV holds every value as it is" {

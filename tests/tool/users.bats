@@ -22,8 +22,8 @@ END
 
 @test "grant spends the use, and says whether the user database failed or the owner has no name" {
     for errno in 0 2 3; do
-        row "none---$errno" "count = 2"
-        VEMO_TEST_LOOKUP=$errno fails 4 "granted, but there is no user of the number 0" \
+        row "none---$errno" "count = 2, uid = 4000000000"
+        VEMO_TEST_LOOKUP=$errno fails 4 "granted, but there is no user of the number 4000000000" \
             grant "none---$errno$ZEROS" Api --print-user
     done
     row failing- "count = 2"
