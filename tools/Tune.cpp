@@ -105,13 +105,17 @@ void execute(Schema& schema, const Options& options, tool::Progress& progress)
     for (const std::string& strStatement : statements(options)) {
         if (strStatement == "COMMIT") {
             schema.commitChange();
-        } else if (const std::string strResult = schema.run(strStatement); strResult == strJournal) {
-            tool::settleChange();
-        } else if (!strResult.empty()) {
+        } else {
+            const std::string strResult = schema.run(strStatement);
             // Only the statement for the journal returns a row. It can have no effect without reporting an
             // error.
-            throw tool::Failure(tool::EXIT_STATUS_STORE,
-                                "the journal cannot be made \"" + strJournal + "\" here");
+            if (!strResult.empty() && strResult != strJournal) {
+                throw tool::Failure(tool::EXIT_STATUS_STORE,
+                                    "the journal cannot be made \"" + strJournal + "\" here");
+            }
+            if (!strResult.empty()) {
+                tool::settleChange();
+            }
         }
         progress.step();
     }
